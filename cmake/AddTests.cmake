@@ -1,0 +1,20 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+# add_unit_test(NAME LIBS lib… SOURCES file…): one GoogleTest program, one ctest entry for each program.
+#
+# Whole programs, not single cases, are ctest's entries: starting a process for each of a thousand
+# cases would cost more than the cases do.
+function(add_unit_test name)
+  cmake_parse_arguments(arg "" "TIMEOUT" "LIBS;SOURCES;LABELS" ${ARGN})
+  add_executable(${name} ${arg_SOURCES})
+  target_link_libraries(${name} PRIVATE project_flags ${arg_LIBS} GTest::gtest_main GTest::gmock)
+  set_target_properties(${name} PROPERTIES
+    RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/tests-bin")
+  add_test(NAME ${name} COMMAND ${name} --gtest_brief=1)
+  if(NOT arg_TIMEOUT)
+    set(arg_TIMEOUT 300)
+  endif()
+  if(NOT arg_LABELS)
+    set(arg_LABELS unit)
+  endif()
+  set_tests_properties(${name} PROPERTIES TIMEOUT ${arg_TIMEOUT} LABELS "${arg_LABELS}")
+endfunction()

@@ -1,0 +1,31 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// One entry of an index.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+#include "index/kind.h"
+#include "state/belonging.h"
+
+namespace fileindexd {
+
+// Times are nanoseconds since the epoch.
+struct Entry {
+  int64_t id = 0;
+  std::string path;  // normal
+  Thing thing = Thing::NONE;
+  Kind kind = Kind::OTHER;
+  bool content_wanted = false;
+  uint64_t inode = 0;
+  int64_t size = 0;   // bytes; 0 for a directory
+  int64_t mtime = 0;  // 0 for a directory
+  int64_t ctime = 0;
+  int64_t birth_time = 0;  // 0: not known
+  int64_t first_seen = 0;  // when the entry was added
+  uint32_t owner = 0;
+  uint32_t group = 0;
+  uint32_t mode = 0;
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,36 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Reading one share's entries. One thread at a time; sees one consistent state per call. Never
+// hinders the writer for longer than its call.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+
+#include "index/database.h"
+#include "index/entry.h"
+
+namespace fileindexd {
+
+class EntryReader {
+ public:
+  // NONE, or why the index of that share cannot be read.
+  IndexError Open(const std::string& share_name);
+
+  struct Summary {
+    uint64_t entries = 0;
+    int64_t last_commit = 0;  // seconds since the epoch; 0: none yet
+  };
+  bool Summarise(Summary& summary);
+
+  // Calls `visit` with each entry at or below normal path `under` in byte order of the paths, until
+  // it returns false. False when reading failed.
+  bool ForEach(const std::string& under, const std::function<bool(const Entry&)>& visit);
+
+  // The entry at exactly that path. False when there is none, or reading failed.
+  bool Find(const std::string& path, Entry& entry);
+
+  IndexDatabase database;
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,40 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Questions to the indexes.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "index/entry.h"
+
+namespace fileindexd {
+
+// All words must match a word of the name; a word that ends with '*' matches words that begin with
+// it. Letter case and accents do not count.
+struct Question {
+  std::string text;
+  std::optional<Kind> kind;
+  std::string under;                // normal path, or empty: everywhere
+  std::vector<std::string> shares;  // names to ask
+  uint64_t limit = 20;
+  uint64_t offset = 0;
+};
+
+struct Hit {
+  std::string share;
+  Entry entry;
+  double score = 0;  // greater is better
+};
+
+struct Answer {
+  std::vector<Hit> hits;              // best first, at most `limit`
+  uint64_t total = 0;                 // matching entries, whatever the limit
+  std::vector<std::string> failures;  // a line for each share that could not be asked
+};
+
+// False when the question makes no sense (nothing to search for), and `error` then says why.
+bool Ask(const Question& question, Answer& answer, std::string& error);
+
+}  // namespace fileindexd

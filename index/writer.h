@@ -1,0 +1,51 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The writer of one share's entries. It converges: whatever order operations come in, each leaves
+// the entries that it touches as the disk shows them now.
+//
+// One thread at a time. Nothing throws. Between slices of long work it calls `between_slices`,
+// where nothing is half done; that call may unwind.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "index/database.h"
+#include "state/settings.h"
+#include "state/store.h"
+
+namespace fileindexd {
+
+enum class DeleteMode { ENTRY = 0, STALE = 1, ALL = 2 };
+
+class EntryWriter {
+ public:
+  // `share_name` names the share whose index this is; `store` outlives the writer. Opens the
+  // database; IsOpen and last_error tell how that ended.
+  EntryWriter(std::string share_name, StateStore& store, std::function<void()> between_slices);
+  ~EntryWriter();
+  EntryWriter(const EntryWriter&) = delete;
+  EntryWriter& operator=(const EntryWriter&) = delete;
+
+  bool IsOpen() const;
+
+  // Brings the entry at `path` in line with the disk, adding it where it is missing and belongs,
+  // removing it with all below it that is gone or does not belong where it is gone or does not
+  // belong. A path that is no longer the thing that was known has everything below it looked at.
+  // `wanted`: the flags in force for it. `decide`: for which kinds it is decided anew whether
+  // content is wanted; an entry that is new has it decided in any case.
+  bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide);
+  // Like Refresh with every kind decided.
+  bool Add(const std::string& path, const ContentFlags& wanted);
+  bool Delete(const std::string& path, DeleteMode mode);
+  // True when everything since the last good commit is durable.
+  bool Commit();
+
+  IndexError last_error = IndexError::NONE;
+
+  struct Impl;
+  std::unique_ptr<Impl> impl;
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,78 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The one rule: what belongs in a share's index.
+//
+// A path belongs when an indexed folder covers it, no component below the share's root has a
+// preserved or passing name, and it lies neither below a nested mount point, nor behind a symbolic
+// link, nor in a snapshot, nor in our own state folder; and when it is a directory, a regular file
+// or a symbolic link. The path of a nested mount point itself belongs, as one entry.
+//
+// Everything here may be called from any thread at any time.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "state/settings.h"
+
+namespace fileindexd {
+
+enum class Verdict {
+  BELONGS,
+  BAD_PATH,      // relative, or with a "." or ".." component, or a NUL
+  NO_SHARE,      // in no share
+  NOT_COVERED,   // by no indexed folder
+  SKIPPED_NAME,  // a component below the share's root has a preserved or passing name
+  OWN_STATE,     // in our own state folder
+  GONE,          // does not exist
+  BEHIND_LINK,   // a directory on the way is a symbolic link
+  BELOW_MOUNT,   // below a nested mount point
+  IN_SNAPSHOT,
+  SPECIAL_FILE,  // socket, pipe or device
+  UNKNOWN,       // the file system did not answer: errno tells
+};
+
+enum class Thing { NONE, FILE, DIRECTORY, LINK };
+
+// What was seen at a path. Only `verdict` means anything unless the thing exists.
+struct Look {
+  Verdict verdict = Verdict::UNKNOWN;
+  Thing thing = Thing::NONE;
+  uint64_t inode = 0;
+  uint64_t links = 0;
+  int64_t size = 0;        // bytes
+  int64_t mtime = 0;       // nanoseconds since the epoch
+  int64_t ctime = 0;       // nanoseconds since the epoch
+  int64_t birth_time = 0;  // nanoseconds since the epoch; 0: the file system keeps none
+  uint32_t owner = 0;
+  uint32_t group = 0;
+  uint32_t mode = 0;      // permission bits
+  uint64_t mount_id = 0;  // of the mount that shows the thing
+  uint64_t device = 0;
+};
+
+// Looks at a path and judges it. Three system calls for an ordinary file.
+Look LookAt(const Settings& settings, const std::string& path);
+
+// The same judged by the path alone: BELONGS when nothing in its letters speaks against it.
+Verdict JudgeName(const Settings& settings, const std::string& path);
+
+// What exists at `path`: the last component not followed, and nothing below a share's root behind a
+// symbolic link. NONE for special files, and when it cannot be told.
+Thing ThingAt(const Settings& settings, const std::string& path);
+
+// "#snapshot", ".snapshots", "lost+found".
+bool IsPreservedName(std::string_view name);
+// ".nfs*", ".fuse_hidden*", "~$*", ".~lock.*#".
+bool IsPassingName(std::string_view name);
+
+// Whether a share's root is what is on record.
+enum class RootState { SOUND, MISSING, FOREIGN, UNKNOWN };
+RootState LookAtRoot(const Share& share);
+
+// The verdict in a few words, for people.
+const char* VerdictText(Verdict verdict);
+
+}  // namespace fileindexd

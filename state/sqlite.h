@@ -1,0 +1,38 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Thin owners around SQLite's handles. Nothing here throws; results are SQLite's own codes.
+#pragma once
+
+#include <sqlite3.h>
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace fileindexd {
+
+// A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
+class Statement {
+ public:
+  Statement() = default;
+  Statement(const Statement&) = delete;
+  Statement& operator=(const Statement&) = delete;
+  ~Statement() { sqlite3_finalize(handle); }
+
+  int Prepare(sqlite3* db, const char* sql);
+  // Numbered from 1. Bytes are bound without a copy: they must outlive the step.
+  void BindInt(int column, int64_t value) { sqlite3_bind_int64(handle, column, value); }
+  void BindText(int column, std::string_view text);
+  void BindBlob(int column, std::string_view bytes);
+  int Step() { return sqlite3_step(handle); }
+  // Steps once, resets, and returns the step's result; SQLITE_DONE of a statement without rows
+  // comes as SQLITE_OK.
+  int Run();
+  void Reset() { sqlite3_reset(handle); }
+
+  int64_t Int(int column) const { return sqlite3_column_int64(handle, column); }
+  std::string Bytes(int column) const;
+
+  sqlite3_stmt* handle = nullptr;
+};
+
+}  // namespace fileindexd
