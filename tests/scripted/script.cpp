@@ -36,11 +36,6 @@ class BlockedCount {
 
 }  // namespace
 
-Script::Script() {
-  pthread_mutex_init(&mutex, nullptr);
-  pthread_cond_init(&changed, nullptr);
-}
-
 Script& TheScript() {
   static auto* const script = new Script;  // outlives every thread and every static
   return *script;

@@ -10,7 +10,8 @@
 // 2. A call is recorded, then runs what the test gave it, then waits if it is to block, then
 //    answers: what was told for this call, else for this subject, else the plain answer. The
 //    subject is the path, share or name that the operation is asked about.
-// 3. Any thread may call. The fields are guarded by `mutex`; a test that knows that no other thread
+// 3. Some calls of the C library can be told too, see host_calls.cpp: the answer is the error.
+// 4. Any thread may call. The fields are guarded by `mutex`; a test that knows that no other thread
 //    runs may skip it.
 #pragma once
 
@@ -58,7 +59,7 @@ struct Rule {
 
 class Script {
  public:
-  Script();
+  Script() = default;
   Script(const Script&) = delete;
   Script& operator=(const Script&) = delete;
 
@@ -99,8 +100,8 @@ class Script {
   std::optional<int> EnterUnrecorded(const std::string& operation, const std::string& subject);
   void Record(LogLine line);
 
-  pthread_mutex_t mutex;
-  pthread_cond_t changed;
+  pthread_mutex_t mutex = PTHREAD_MUTEX_INITIALIZER;
+  pthread_cond_t changed = PTHREAD_COND_INITIALIZER;
 
   std::vector<Share> shares;
   std::vector<TALO::FILEINDEX::Folder> folders;
