@@ -132,4 +132,12 @@ int pthread_timedjoin_np(pthread_t thread, void** result, const timespec* until)
   return Library("pthread_timedjoin_np", pthread_timedjoin_np)(thread, result, &limit);
 }
 
+// Told about, so that a test knows that a thread waits: once it has the thread's mutex itself.
+int pthread_cond_wait(pthread_cond_t* cond, pthread_mutex_t* mutex) {
+  if (cond != &TheScript().changed) {
+    TheScript().EnterUnrecorded("pthread_cond_wait", "");
+  }
+  return Library("pthread_cond_wait", pthread_cond_wait)(cond, mutex);
+}
+
 }  // extern "C"
