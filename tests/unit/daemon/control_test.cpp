@@ -194,7 +194,7 @@ TEST_F(ControlTest, AConnectionThatCannotBeAcceptedIsTold) {
 
 TEST_F(ControlTest, AShortRequestIsReadFailed) {
   const std::string reset = "Failed to read from domain socket, reason=Connection reset by peer";
-  for (const std::string bytes : {std::string(), std::string(3, '\1')}) {
+  for (const std::string& bytes : {std::string(), std::string(3, '\1')}) {
     script.Forget();
     EXPECT_EQ(Exchange(bytes), -1);
     EXPECT_THAT(Log(), ElementsAre(reset, "Receive command length failed"));

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // The whole run inside the test's process: daemon() is told to do nothing, and the start of the
 // content service brings the signal that ends the loop.
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
