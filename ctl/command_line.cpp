@@ -157,9 +157,12 @@ void AddQuestions(Declarer& declare) {
   CLI::App* status = declare.Add(&declare.app, "status", Status, "Show what is going on");
   AddJson(status, into, "One JSON document");
 
-  // The words of the query never come here: see SplitSearchArguments.
   CLI::App* search = declare.Add(&declare.app, "search", Search, "Search the index, best first");
-  search->usage("fileindexctl search [OPTIONS] QUERY...");
+  // For the help alone: the words are taken out before, see SplitSearchArguments.
+  search
+      ->add_option_function<std::vector<std::string>>(
+          "QUERY", [](const std::vector<std::string>&) {}, "Words, joined by a blank")
+      ->type_name("");
   search->set_help_flag("--help", "Print this help message and exit");
   AddOption(search, "--share", into.in_share, "NAME", "In that share alone");
   AddOption(search, "--kind", into.kind, "KIND", "document, audio, video, photo, other or folder")
