@@ -17,6 +17,7 @@ using ::Json::arrayValue;
 using ::Json::nullValue;
 using ::Json::objectValue;
 using ::Json::stringValue;
+using ::Json::uintValue;
 using ::Json::ValueType;
 
 class Value : public ::Json::Value {

@@ -1,0 +1,167 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <sys/inotify.h>
+#include <sys/select.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <csignal>
+#include <cstddef>
+#include <cstring>
+
+#include "daemon/daemon.h"
+#include "platform/log.h"
+#include "worker/worker.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int BACKLOG = 10;
+constexpr time_t SELECT_TIMEOUT = 10;  // seconds
+constexpr size_t EVENT_BUFFER_SIZE = 16384;
+constexpr const char QUEUE_NAME[] = "TALO@file_index_queue";
+// Its final NUL is part of the comparison, so that longer names do not match.
+constexpr size_t QUEUE_NAME_SIZE = sizeof(QUEUE_NAME);
+
+bool IsQueueWritten(const inotify_event& event) {
+  return (event.mask & IN_CLOSE_WRITE) != 0 && event.len >= QUEUE_NAME_SIZE &&
+         memcmp(event.name, QUEUE_NAME, QUEUE_NAME_SIZE) == 0;
+}
+
+// Waits for one of the two to be readable, with SIGTERM and SIGINT let through. As select.
+int WaitReadable(int inotify_fd, int socket_fd, fd_set* readable) {
+  FD_ZERO(readable);
+  FD_SET(inotify_fd, readable);
+  FD_SET(socket_fd, readable);
+
+  sigset_t mask;
+  pthread_sigmask(SIG_BLOCK, nullptr, &mask);
+  sigdelset(&mask, SIGTERM);
+  sigdelset(&mask, SIGINT);
+
+  const timespec timeout = {SELECT_TIMEOUT, 0};
+  return pselect(std::max(inotify_fd, socket_fd) + 1, readable, nullptr, nullptr, &timeout, &mask);
+}
+
+}  // namespace
+
+bool Daemon::SetupDomainSocket() {
+  socket_fd = socket(AF_UNIX, SOCK_STREAM, 0);
+  if (socket_fd < 0) {
+    FI_LOG("socket failed, reason=%m");
+    return false;
+  }
+
+  unlink(SOCKET_PATH);  // left by an earlier run; usually there is none
+
+  // The length counts the family and the path without its NUL.
+  constexpr socklen_t ADDRESS_SIZE = 26;
+  sockaddr_un address = {};
+  address.sun_family = AF_UNIX;
+  static_assert(offsetof(sockaddr_un, sun_path) + 24 == ADDRESS_SIZE);
+  strncpy(address.sun_path, SOCKET_PATH, sizeof(address.sun_path) - 1);
+  if (bind(socket_fd, reinterpret_cast<const sockaddr*>(&address), ADDRESS_SIZE) != 0) {
+    FI_LOG("bind failed, reason=%m");
+    return false;
+  }
+
+  if (listen(socket_fd, BACKLOG) != 0) {
+    FI_LOG("listen failed, reason=%m");
+    return false;
+  }
+  return true;
+}
+
+bool Daemon::SetupInotify() {
+  inotify_fd = inotify_init();  // NOLINT(android-cloexec-inotify-init): children close what is ours
+  if (inotify_fd < 0) {
+    FI_LOG("inotify_init failed, reason=%m");
+    return false;
+  }
+  return true;
+}
+
+void Daemon::MainLoop() {
+  while (stop_requested == 0) {
+    LoopOnce();
+  }
+  FI_LOG("Daemon Leaving main loop");
+}
+
+void Daemon::LoopOnce() {
+  fd_set readable;
+  if (WaitReadable(inotify_fd, socket_fd, &readable) <= 0) {
+    // Quiet, or a signal: housekeeping. Wanted: under a steady stream of work it waits.
+    ReapFinishedWorkers();
+    CheckResumeTime();
+    return;
+  }
+
+  try {
+    if (FD_ISSET(inotify_fd, &readable)) {
+      HandleQueueEvents();
+    }
+    if (FD_ISSET(socket_fd, &readable)) {
+      HandleCommand();
+    }
+  } catch (...) {  // the main thread is never cancelled
+    FI_LOG("MainLoop exception ...");
+  }
+}
+
+void Daemon::HandleQueueEvents() {
+  alignas(inotify_event) char buffer[EVENT_BUFFER_SIZE] = {};
+  const ssize_t size = read(inotify_fd, buffer, sizeof(buffer));
+
+  for (ssize_t offset = 0; offset < size;) {
+    const auto& event = *reinterpret_cast<const inotify_event*>(buffer + offset);
+    offset += static_cast<ssize_t>(sizeof(inotify_event) + event.len);
+    if (!IsQueueWritten(event)) {
+      continue;
+    }
+
+    Worker* worker = FindWorkerByWd(event.wd);
+    if (worker == nullptr) {
+      FI_LOG("Failed to get worker for wd=%d", event.wd);
+      continue;
+    }
+
+    // A running thread looks for the queue file again after each pass.
+    if (worker->state == WORKER_IDLE) {
+      worker->Respawn();
+    } else if (worker->state == WORKER_FINISHED) {
+      StopWorkerThread(worker);
+      if (!worker->abandoned) {
+        worker->Respawn();
+      }
+    }
+  }
+}
+
+Worker* Daemon::FindWorkerByWd(int wd) {
+  for (const auto& [share_name, worker] : workers) {
+    if (worker->wd == wd) {
+      return worker;
+    }
+  }
+  return nullptr;
+}
+
+void Daemon::ReapFinishedWorkers() {
+  for (auto it = workers.begin(); it != workers.end();) {
+    Worker* worker = (it++)->second;  // stopping may take the entry out
+    if (worker->state == WORKER_FINISHED && !StopWorkerThread(worker)) {
+      FI_LOG("Failed to stop worker=%s", worker->share_name.c_str());
+    }
+  }
+}
+
+void Daemon::CheckResumeTime() {
+  if (resume_time >= 1 && resume_time < time(nullptr)) {
+    Resume();
+  }
+}
+
+}  // namespace fileindexd
