@@ -188,8 +188,8 @@ void AddQuestions(Declarer& declare) {
   AddJson(verify, into, "One JSON object a line");
 }
 
-// "folder add": the commands that were recognised, for an error line.
-std::string ChosenName(const CLI::App& app) {
+// What is wrong, with the commands that were recognised in front: "folder add: PATH is required".
+std::string Complaint(const CLI::App& app, const CLI::Error& error) {
   std::string name;
   const CLI::App* inner = &app;
   while (!inner->get_subcommands().empty()) {
@@ -200,7 +200,12 @@ std::string ChosenName(const CLI::App& app) {
     name.back() = ':';
     name += ' ';
   }
-  return name;
+
+  const std::vector<std::string> unknown = inner->remaining();
+  if (inner->get_require_subcommand_min() == 0) {
+    return name + error.what();
+  }
+  return name + (unknown.empty() ? "a command is required" : unknown.front() + ": no such command");
 }
 
 }  // namespace
@@ -237,7 +242,7 @@ Command ParseCommandLine(const std::vector<std::string>& given, Arguments& argum
     code = EXIT_DONE;
     return nullptr;
   } catch (const CLI::Error& error) {
-    code = Fail(EXIT_USAGE, "%s%s", ChosenName(app).c_str(), error.what());
+    code = Fail(EXIT_USAGE, "%s", Complaint(app, error).c_str());
     return nullptr;
   }
 

@@ -24,6 +24,14 @@ namespace {
 constexpr size_t OUTPUT_BUFFER = 256 * 1024;
 
 int output_error = 0;  // errno of the first write that failed; 0 while all is well
+bool progress_shown = false;
+
+void EraseProgress() {
+  if (progress_shown) {
+    (void)fprintf(stderr, "\r\033[K");  // to the line's start, and erase it
+    progress_shown = false;
+  }
+}
 
 void Remember() {
   if (output_error == 0) {
@@ -59,6 +67,7 @@ int Fail(int code, const char* format, ...) {
     free(text);
   }
 
+  EraseProgress();
   (void)fprintf(stderr, "fileindexctl: %s\n", line.c_str());  // nowhere left to tell of a failure
   return code;
 }
@@ -68,6 +77,7 @@ bool Put(std::string_view bytes) {
     return false;
   }
 
+  EraseProgress();
   errno = 0;
   if (fwrite(bytes.data(), 1, bytes.size(), stdout) != bytes.size()) {
     Remember();
@@ -162,17 +172,15 @@ std::string Printable(std::string_view text) {
   return line;
 }
 
-Progress::Progress(const std::string& text)
-    : shown(isatty(STDERR_FILENO) == 1 && isatty(STDOUT_FILENO) == 0) {
-  if (shown) {
+Progress::Progress(const std::string& text) {
+  progress_shown = isatty(STDERR_FILENO) == 1;
+  if (progress_shown) {
     (void)fprintf(stderr, "\r%s", Printable(text).c_str());
   }
 }
 
 Progress::~Progress() {
-  if (shown) {
-    (void)fprintf(stderr, "\r\033[K");  // to the line's start, and erase it
-  }
+  EraseProgress();
 }
 
 }  // namespace fileindexd

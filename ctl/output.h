@@ -48,16 +48,14 @@ int64_t WholeSeconds(int64_t nanoseconds);
 // The text with its control characters shown as "\xNN".
 std::string Printable(std::string_view text);
 
-// A word about long work, on standard error if that is a terminal and standard output is not the
-// same screen's; gone when destroyed.
+// A word about long work, on standard error if that is a terminal. Gone when anything else is
+// written, or it is destroyed. One at a time.
 class Progress {
  public:
   explicit Progress(const std::string& text);
   Progress(const Progress&) = delete;
   Progress& operator=(const Progress&) = delete;
   ~Progress();
-
-  bool shown;
 };
 
 }  // namespace fileindexd

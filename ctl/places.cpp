@@ -57,10 +57,14 @@ void AppendComponent(std::string& path, const std::string& name) {
   }
 }
 
+bool RefuseEmpty() {
+  (void)Fail(EXIT_FAILED, "an empty path names nothing");
+  return false;
+}
+
 bool MakeAbsolute(const std::string& given, std::string& path) {
   if (given.empty()) {
-    (void)Fail(EXIT_FAILED, "an empty path names nothing");
-    return false;
+    return RefuseEmpty();
   }
   if (given.front() == '/') {
     path = given;
@@ -160,6 +164,10 @@ bool ResolveInShare(const Settings& settings, const std::string& given, std::str
 }
 
 bool ResolveDirectory(const std::string& given, std::string& path) {
+  if (given.empty()) {
+    return RefuseEmpty();
+  }
+
   const std::optional<std::string> resolved = RealPath(given);
   struct stat status = {};
   if (!resolved || stat(resolved->c_str(), &status) != 0) {
