@@ -68,6 +68,22 @@ size_t CountFolders(const Settings& settings, const std::string& share) {
                     [&share](const IndexedFolder& folder) { return folder.share == share; }));
 }
 
+// An index that a folder's removal could not discard holds entries that no folder covers any more:
+// all of it is looked at again. False, with its line written, on failure.
+bool SweepLeftIndex(Session& session, const std::string& share) {
+  std::error_code error;
+  if (!std::filesystem::exists(IndexPath(share), error)) {
+    return true;
+  }
+
+  if (!session.store->UpdateStatus(share,
+                                   [](ShareStatus& status) { status.needs_reindex = true; })) {
+    (void)Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
+    return false;
+  }
+  return true;
+}
+
 // False, with its line written, when nothing at or below `path` could get into the index.
 bool CanBeIndexed(const Settings& settings, const IndexedFolder& added) {
   Settings changed = settings;
@@ -160,11 +176,15 @@ int FolderAdd(const Arguments& arguments) {
   if (!CanBeIndexed(*session.settings, folder)) {
     return EXIT_FAILED;
   }
+
+  const bool first = CountFolders(*session.settings, folder.share) == 0;
+  if (first && !SweepLeftIndex(session, folder.share)) {
+    return EXIT_FAILED;
+  }
   if (!session.store->AddFolder(folder.path, folder.wanted)) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
 
-  const bool first = CountFolders(*session.settings, folder.share) == 0;
   const std::string line = EventLine(CUSTOM_EVENT_REINDEX, folder.path);
   int queued = first ? Queue(session, folder.share, line) : EXIT_DONE;
   const int told = CodeOfReply(TellDaemon("upsert_folder_setting", folder.path), folder.path);
