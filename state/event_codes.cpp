@@ -1,0 +1,51 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "state/event_codes.h"
+
+#include <charconv>
+
+namespace fileindexd {
+
+namespace {
+
+struct NamedCode {
+  std::string_view name;
+  uint32_t code;
+};
+
+constexpr NamedCode NAMED_CODES[] = {
+    {"QLIB_NOTIFY_MODIFY", QLIB_NOTIFY_MODIFY},
+    {"QLIB_NOTIFY_ATTRIB", QLIB_NOTIFY_ATTRIB},
+    {"QLIB_NOTIFY_CLOSE_WRITE", QLIB_NOTIFY_CLOSE_WRITE},
+    {"QLIB_NOTIFY_CREATE", QLIB_NOTIFY_CREATE},
+    {"QLIB_NOTIFY_DELETE", QLIB_NOTIFY_DELETE},
+    {"QLIB_NOTIFY_RENAME", QLIB_NOTIFY_RENAME},
+    {"QLIB_NOTIFY_RENAME_FULL", QLIB_NOTIFY_RENAME_FULL},
+    {"QLIB_NOTIFY_QUEUE_RESET", QLIB_NOTIFY_QUEUE_RESET},
+    {"CUSTOM_EVENT_REINDEX", CUSTOM_EVENT_REINDEX},
+    {"CUSTOM_EVENT_UPDATE", CUSTOM_EVENT_UPDATE},
+};
+
+}  // namespace
+
+std::optional<uint32_t> EventCode(std::string_view text) {
+  for (const NamedCode& named : NAMED_CODES) {
+    if (named.name == text) {
+      return named.code;
+    }
+  }
+
+  int base = 10;
+  if (text.starts_with("0x") || text.starts_with("0X")) {
+    text.remove_prefix(2);
+    base = 16;
+  }
+  uint32_t code = 0;
+  const char* end = text.data() + text.size();
+  const auto result = std::from_chars(text.data(), end, code, base);
+  if (result.ec != std::errc() || result.ptr != end) {
+    return std::nullopt;
+  }
+  return code;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,263 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What the disk says about a path.
+//
+// DESIGN. An ordinary file costs three calls: open, statx, close. The share's root is needed beside
+// it, for the mount and the device that everything in the share has to be on. Where mounts have
+// numbers that are never given twice, the root's are kept for a second in each thread: a thing with
+// the same mount number lies in the share's mount, and any difference is looked into with care,
+// the root asked before and after. Where mount numbers are reused, the root is asked every time.
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+
+#include <cerrno>
+#include <ctime>
+
+#include "base/scoped_fd.h"
+#include "state/belonging.h"
+#include "state/filesystem.h"
+#include "state/layout.h"
+#include "state/open_path.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Since Linux 6.8; older headers lack it, older kernels ignore it.
+constexpr unsigned UNIQUE_MOUNT_ID = 0x4000;
+constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME | STATX_MNT_ID | UNIQUE_MOUNT_ID;
+constexpr int64_t ROOT_KEPT_NS = 1'000'000'000;
+constexpr int CAREFUL_TRIES = 3;
+
+struct RootView {
+  std::string path;
+  uint64_t mount_id = 0;
+  uint64_t device = 0;
+  bool unique = false;    // mount_id is never given to another mount
+  int64_t seen_time = 0;  // nanoseconds, monotonic
+};
+
+bool IsSameMount(const RootView& a, const RootView& b) {
+  return a.mount_id == b.mount_id && a.device == b.device;
+}
+
+int64_t Now() {
+  timespec now{};
+  (void)clock_gettime(CLOCK_MONOTONIC_COARSE, &now);  // cannot fail for this clock
+  return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
+}
+
+int64_t Nanoseconds(const statx_timestamp& time) {
+  return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
+}
+
+bool HasMountId(const struct statx& st) {
+  if ((st.stx_mask & (STATX_MNT_ID | UNIQUE_MOUNT_ID)) != 0) {
+    return true;
+  }
+  errno = ENOSYS;  // a kernel before 5.8
+  return false;
+}
+
+bool SeeRoot(const std::string& root, RootView& view) {
+  struct statx st {};
+  if (statx(AT_FDCWD, root.c_str(), 0, WANTED, &st) != 0 || !HasMountId(st)) {
+    return false;
+  }
+  view.path = root;
+  view.mount_id = st.stx_mnt_id;
+  view.device = makedev(st.stx_dev_major, st.stx_dev_minor);
+  view.unique = (st.stx_mask & UNIQUE_MOUNT_ID) != 0;
+  view.seen_time = Now();
+  return true;
+}
+
+// The root as it was at most a second ago if that is good enough. Null with errno on failure.
+const RootView* RecentRoot(const std::string& root) {
+  thread_local RootView kept;
+  if (kept.path == root && kept.unique && Now() - kept.seen_time < ROOT_KEPT_NS) {
+    return &kept;
+  }
+  return SeeRoot(root, kept) ? &kept : nullptr;
+}
+
+Thing ThingOfMode(unsigned mode) {
+  if (S_ISREG(mode)) {
+    return Thing::FILE;
+  }
+  if (S_ISDIR(mode)) {
+    return Thing::DIRECTORY;
+  }
+  return S_ISLNK(mode) ? Thing::LINK : Thing::NONE;
+}
+
+void Fill(const struct statx& st, Look& look) {
+  look.thing = ThingOfMode(st.stx_mode);
+  look.inode = st.stx_ino;
+  look.links = st.stx_nlink;
+  look.size = static_cast<int64_t>(st.stx_size);
+  look.mtime = Nanoseconds(st.stx_mtime);
+  look.ctime = Nanoseconds(st.stx_ctime);
+  look.birth_time = (st.stx_mask & STATX_BTIME) != 0 ? Nanoseconds(st.stx_btime) : 0;
+  look.owner = st.stx_uid;
+  look.group = st.stx_gid;
+  look.mode = st.stx_mode & 07777U;
+  look.mount_id = st.stx_mnt_id;
+  look.device = makedev(st.stx_dev_major, st.stx_dev_minor);
+}
+
+// GONE only where the call says for certain that nothing is there.
+Verdict VerdictOfError(int reason) {
+  switch (reason) {
+    case ENOENT:
+    case ENOTDIR:
+    case ENAMETOOLONG:
+      return Verdict::GONE;
+    case ELOOP:
+      return Verdict::BEHIND_LINK;
+    default:
+      return Verdict::UNKNOWN;
+  }
+}
+
+// BELONGS when there is something to judge further.
+Verdict See(const std::string& root, const std::string& path, struct statx& st) {
+  const ScopedFd thing(OpenInShare(root, path));
+  if (thing.fd < 0) {
+    return VerdictOfError(errno);
+  }
+  if (statx(thing.fd, "", AT_EMPTY_PATH, WANTED, &st) != 0 || !HasMountId(st)) {
+    return Verdict::UNKNOWN;
+  }
+  return Verdict::BELONGS;
+}
+
+std::string ParentOf(const std::string& path) {
+  const size_t slash = path.rfind('/');
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+// What is left to judge of a thing in the share's own mount, or of a mount point there; `device` is
+// that of the thing, or of the folder that holds the mount point.
+Verdict JudgeInMount(const RootView& root, const std::string& path, uint64_t device, Thing thing) {
+  if (device != root.device && IsInSnapshot(root.path, path)) {
+    return Verdict::IN_SNAPSHOT;
+  }
+  return thing == Thing::NONE ? Verdict::SPECIAL_FILE : Verdict::BELONGS;
+}
+
+// One attempt; `st` is the thing as seen, `root` as it was before that.
+Verdict JudgeAcrossMounts(const RootView& root, const std::string& path, const struct statx& st,
+                          Look& look) {
+  if (look.mount_id == root.mount_id) {
+    return JudgeInMount(root, path, look.device, look.thing);
+  }
+  if ((st.stx_attributes & STATX_ATTR_MOUNT_ROOT) == 0 || path == root.path) {
+    return Verdict::BELOW_MOUNT;
+  }
+  struct statx parent {};
+  const std::string folder = ParentOf(path);
+  const Verdict seen = See(root.path, folder, parent);
+  if (seen != Verdict::BELONGS) {
+    return seen;
+  }
+  if (parent.stx_mnt_id != root.mount_id) {
+    return Verdict::BELOW_MOUNT;
+  }
+  return JudgeInMount(root, folder, makedev(parent.stx_dev_major, parent.stx_dev_minor),
+                      look.thing);
+}
+
+// A share that is mounted or unmounted between two calls would look as if everything in it lay
+// below a nested mount. So the verdict counts only if the root was the same before and after.
+Look LookWithCare(const std::string& root_path, const std::string& path) {
+  for (int i = 0; i < CAREFUL_TRIES; ++i) {
+    Look look;
+    RootView before;
+    RootView after;
+    struct statx st {};
+    if (!SeeRoot(root_path, before)) {
+      look.verdict = Verdict::UNKNOWN;
+      return look;
+    }
+    look.verdict = See(root_path, path, st);
+    if (look.verdict != Verdict::BELONGS) {
+      return look;
+    }
+    Fill(st, look);
+    look.verdict = JudgeAcrossMounts(before, path, st, look);
+    const int reason = errno;
+    if (SeeRoot(root_path, after) && IsSameMount(before, after)) {
+      errno = reason;
+      return look;
+    }
+  }
+  errno = EAGAIN;
+  return Look{};
+}
+
+}  // namespace
+
+Look LookAt(const Settings& settings, const std::string& path) {
+  Look look;
+  look.verdict = JudgeName(settings, path);
+  if (look.verdict != Verdict::BELONGS) {
+    return look;
+  }
+
+  const std::string normal = NormalPath(path).value_or(path);
+  const std::string& root_path = settings.ShareOfPath(normal)->path;
+  struct statx st {};
+  look.verdict = See(root_path, normal, st);
+  if (look.verdict != Verdict::BELONGS) {
+    return look;
+  }
+
+  Fill(st, look);
+  const RootView* root = RecentRoot(root_path);
+  if (root == nullptr || root->mount_id != look.mount_id) {
+    return LookWithCare(root_path, normal);
+  }
+  look.verdict = JudgeInMount(*root, normal, look.device, look.thing);
+  return look;
+}
+
+Thing ThingAt(const Settings& settings, const std::string& path) {
+  const auto normal = NormalPath(path);
+  if (!normal.has_value()) {
+    return Thing::NONE;
+  }
+  struct stat st {};
+  const Share* share = settings.ShareOfPath(*normal);
+  if (share == nullptr) {
+    return lstat(normal->c_str(), &st) == 0 ? ThingOfMode(st.st_mode) : Thing::NONE;
+  }
+  const ScopedFd thing(OpenInShare(share->path, *normal));
+  if (thing.fd < 0 || fstat(thing.fd, &st) != 0) {
+    return Thing::NONE;
+  }
+  return ThingOfMode(st.st_mode);
+}
+
+RootState LookAtRoot(const Share& share) {
+  struct stat st {};
+  if (stat(share.path.c_str(), &st) != 0) {
+    const bool gone =
+        errno == ENOENT || errno == ENOTDIR || errno == ENAMETOOLONG || errno == ELOOP;
+    return gone ? RootState::MISSING : RootState::UNKNOWN;
+  }
+  if (!S_ISDIR(st.st_mode)) {
+    return RootState::MISSING;
+  }
+  if (share.filesystem.empty()) {
+    return RootState::SOUND;  // nothing on record to differ from
+  }
+
+  const std::string identity = FilesystemIdentity(share.path);
+  if (identity.empty()) {
+    return errno == ENOENT ? RootState::MISSING : RootState::UNKNOWN;
+  }
+  return identity == share.filesystem ? RootState::SOUND : RootState::FOREIGN;
+}
+
+}  // namespace fileindexd

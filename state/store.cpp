@@ -1,0 +1,309 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <syslog.h>
+
+#include <climits>
+#include <cstdlib>
+
+#include "state/layout.h"
+#include "state/store_impl.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Links on the way are resolved, so that a share that shows the folder by its real path leaves it
+// out. It exists: the database in it is open.
+std::string ResolvedStateRoot() {
+  const std::string root = StateRoot();
+  char resolved[PATH_MAX];
+  return realpath(root.c_str(), resolved) != nullptr ? resolved : root;
+}
+
+void BindFlags(Statement& statement, int first, const ContentFlags& wanted) {
+  statement.BindInt(first, wanted.document ? 1 : 0);
+  statement.BindInt(first + 1, wanted.audio ? 1 : 0);
+  statement.BindInt(first + 2, wanted.video ? 1 : 0);
+  statement.BindInt(first + 3, wanted.photo ? 1 : 0);
+}
+
+}  // namespace
+
+bool StateStore::Impl::Open() {
+  cached.reset();
+  data_version.reset();
+  connection.reset();
+  connection = OpenStateDatabase(error);
+  if (connection == nullptr) {
+    return false;
+  }
+  data_version.emplace();
+  if (!Prepare(*data_version, "PRAGMA data_version")) {
+    connection.reset();
+    return false;
+  }
+  return true;
+}
+
+bool StateStore::Impl::Ready() {
+  return (connection != nullptr && !HasStateMoved(*connection)) || Open();
+}
+
+bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
+  if (!Ready() || !Exec("BEGIN IMMEDIATE")) {
+    return false;
+  }
+  const Outcome outcome = body();
+  const bool committed = outcome == Outcome::CHANGED && Exec("COMMIT");
+  if (!committed) {
+    // Without a look at its result: what failed may have undone everything already.
+    sqlite3_exec(connection->db, "ROLLBACK", nullptr, nullptr, nullptr);
+    return outcome == Outcome::UNCHANGED;
+  }
+
+  std::string reason;
+  if (!LeaveStateCopy(*connection, reason)) {
+    syslog(LOG_ERR, "%s", reason.c_str());  // the change itself is safe
+  }
+  return true;
+}
+
+bool StateStore::Impl::ChangeSettings(const std::function<Outcome()>& body) {
+  const bool good = Change(body);
+  cached.reset();  // also when it failed: a commit whose result is lost may have happened
+  return good;
+}
+
+bool StateStore::Impl::HasRow(const char* sql, const std::string& key, bool& found) {
+  Statement ask;
+  if (!Prepare(ask, sql)) {
+    return false;
+  }
+  ask.BindBlob(1, key);
+  const int result = ask.Step();
+  if (result != SQLITE_ROW && result != SQLITE_DONE) {
+    return FailSql();
+  }
+  found = result == SQLITE_ROW;
+  return true;
+}
+
+bool StateStore::Impl::LoadTables(Settings& settings) {
+  Statement shares;
+  if (!Prepare(shares, "SELECT name, path, filesystem FROM share ORDER BY name")) {
+    return false;
+  }
+  int result = SQLITE_OK;
+  while ((result = shares.Step()) == SQLITE_ROW) {
+    settings.shares.push_back({shares.Bytes(0), shares.Bytes(1), shares.Bytes(2)});
+  }
+  if (result != SQLITE_DONE) {
+    return FailSql();
+  }
+
+  Statement folders;
+  if (!Prepare(folders,
+               "SELECT share, path, document, audio, video, photo FROM folder"
+               " ORDER BY path")) {
+    return false;
+  }
+  while ((result = folders.Step()) == SQLITE_ROW) {
+    const ContentFlags wanted = {folders.Int(2) != 0, folders.Int(3) != 0, folders.Int(4) != 0,
+                                 folders.Int(5) != 0};
+    settings.folders.push_back({folders.Bytes(0), folders.Bytes(1), wanted});
+  }
+  return result == SQLITE_DONE || FailSql();
+}
+
+// Both tables as they were at one moment.
+bool StateStore::Impl::Load(Settings& settings) {
+  const bool own = sqlite3_get_autocommit(connection->db) != 0;
+  if (own && !Exec("BEGIN")) {
+    return false;
+  }
+  const bool good = LoadTables(settings);
+  if (own) {
+    sqlite3_exec(connection->db, "ROLLBACK", nullptr, nullptr, nullptr);  // nothing was written
+  }
+  settings.state_root = ResolvedStateRoot();
+  return good;
+}
+
+StateStore::StateStore() : impl(std::make_unique<Impl>()) {}
+
+StateStore::~StateStore() = default;
+
+std::unique_ptr<StateStore> StateStore::Open(std::string& error) {
+  std::unique_ptr<StateStore> store(new StateStore);
+  if (!store->impl->Open()) {
+    error = store->impl->error;
+    return nullptr;
+  }
+  return store;
+}
+
+std::string StateStore::Error() {
+  const std::lock_guard guard(impl->mutex);
+  return impl->error;
+}
+
+bool StateStore::Touch() {
+  const std::lock_guard guard(impl->mutex);
+  const bool written = impl->Change([&] {
+    return impl->Done(
+        impl->Exec("INSERT INTO number VALUES('touched', 1)"
+                   " ON CONFLICT DO UPDATE SET value = value + 1"));
+  });
+  bool found = false;
+  return written && impl->HasRow("SELECT 1 FROM share WHERE name = ?", {}, found);
+}
+
+bool StateStore::GetSettings(std::shared_ptr<const Settings>& settings) {
+  const std::lock_guard guard(impl->mutex);
+  if (!impl->Ready()) {
+    return false;
+  }
+  // The number first: what is loaded may then be newer than it, never older.
+  if (impl->data_version->Step() != SQLITE_ROW) {
+    impl->data_version->Reset();
+    return impl->FailSql();
+  }
+  const int64_t version = impl->data_version->Int(0);
+  impl->data_version->Reset();
+  if (impl->cached == nullptr || version != impl->cached_version) {
+    auto loaded = std::make_shared<Settings>();
+    if (!impl->Load(*loaded)) {
+      return false;
+    }
+    impl->cached = loaded;
+    impl->cached_version = version;
+  }
+  settings = impl->cached;
+  return true;
+}
+
+bool StateStore::AddShare(const Share& share) {
+  const std::lock_guard guard(impl->mutex);
+  if (!IsValidShareName(share.name)) {
+    return impl->Fail("not a valid share name: " + share.name);
+  }
+  if (NormalPath(share.path) != share.path) {
+    return impl->Fail("not a plain absolute path: " + share.path);
+  }
+  return impl->ChangeSettings([&] {
+    Settings settings;
+    if (!impl->Load(settings)) {
+      return Impl::Outcome::FAILED;
+    }
+    if (settings.ShareByName(share.name) != nullptr) {
+      return impl->Done(impl->Fail("there is a share " + share.name + " already"));
+    }
+    for (const Share& other : settings.shares) {
+      if (Covers(other.path, share.path) || Covers(share.path, other.path)) {
+        return impl->Done(impl->Fail(share.path + " and " + other.path + " of share " + other.name +
+                                     " must not lie one inside the other"));
+      }
+    }
+    Statement insert;
+    if (!impl->Prepare(insert, "INSERT INTO share VALUES(?, ?, ?)")) {
+      return Impl::Outcome::FAILED;
+    }
+    insert.BindBlob(1, share.name);
+    insert.BindBlob(2, share.path);
+    insert.BindText(3, share.filesystem);
+    return impl->Done(impl->Run(insert));
+  });
+}
+
+StateStore::Impl::Outcome StateStore::Impl::Remove(const std::string& share_name) {
+  for (const char* sql :
+       {"DELETE FROM folder WHERE share = ?", "DELETE FROM status WHERE share = ?",
+        "DELETE FROM share WHERE name = ?"}) {
+    Statement remove;
+    if (!Prepare(remove, sql)) {
+      return Outcome::FAILED;
+    }
+    remove.BindBlob(1, share_name);
+    if (!Run(remove)) {
+      return Outcome::FAILED;
+    }
+  }
+  return Done(sqlite3_changes(connection->db) == 1 || Fail("there is no share " + share_name));
+}
+
+bool StateStore::RemoveShare(const std::string& name) {
+  const std::lock_guard guard(impl->mutex);
+  return impl->ChangeSettings([&] { return impl->Remove(name); });
+}
+
+bool StateStore::SetShareFilesystem(const std::string& name, const std::string& filesystem) {
+  const std::lock_guard guard(impl->mutex);
+  return impl->ChangeSettings([&] {
+    Statement update;
+    if (!impl->Prepare(update, "UPDATE share SET filesystem = ? WHERE name = ?")) {
+      return Impl::Outcome::FAILED;
+    }
+    update.BindText(1, filesystem);
+    update.BindBlob(2, name);
+    return impl->Done(impl->Run(update) && (sqlite3_changes(impl->connection->db) == 1 ||
+                                            impl->Fail("there is no share " + name)));
+  });
+}
+
+bool StateStore::AddFolder(const std::string& path, const ContentFlags& wanted) {
+  const std::lock_guard guard(impl->mutex);
+  if (NormalPath(path) != path) {
+    return impl->Fail("not a plain absolute path: " + path);
+  }
+  return impl->ChangeSettings([&] {
+    Settings settings;
+    if (!impl->Load(settings)) {
+      return Impl::Outcome::FAILED;
+    }
+    const Share* share = settings.ShareOfPath(path);
+    if (share == nullptr) {
+      return impl->Done(impl->Fail(path + " lies in no share"));
+    }
+    if (settings.FolderAt(path) != nullptr) {
+      return impl->Done(impl->Fail(path + " is an indexed folder already"));
+    }
+    Statement insert;
+    if (!impl->Prepare(insert, "INSERT INTO folder VALUES(?, ?, ?, ?, ?, ?)")) {
+      return Impl::Outcome::FAILED;
+    }
+    insert.BindBlob(1, path);
+    insert.BindBlob(2, share->name);
+    BindFlags(insert, 3, wanted);
+    return impl->Done(impl->Run(insert));
+  });
+}
+
+bool StateStore::SetFolder(const std::string& path, const ContentFlags& wanted) {
+  const std::lock_guard guard(impl->mutex);
+  return impl->ChangeSettings([&] {
+    Statement update;
+    if (!impl->Prepare(update,
+                       "UPDATE folder SET document = ?, audio = ?, video = ?, photo = ?"
+                       " WHERE path = ?")) {
+      return Impl::Outcome::FAILED;
+    }
+    BindFlags(update, 1, wanted);
+    update.BindBlob(5, path);
+    return impl->Done(impl->Run(update) && (sqlite3_changes(impl->connection->db) == 1 ||
+                                            impl->Fail(path + " is no indexed folder")));
+  });
+}
+
+bool StateStore::RemoveFolder(const std::string& path) {
+  const std::lock_guard guard(impl->mutex);
+  return impl->ChangeSettings([&] {
+    Statement remove;
+    if (!impl->Prepare(remove, "DELETE FROM folder WHERE path = ?")) {
+      return Impl::Outcome::FAILED;
+    }
+    remove.BindBlob(1, path);
+    return impl->Done(impl->Run(remove) && (sqlite3_changes(impl->connection->db) == 1 ||
+                                            impl->Fail(path + " is no indexed folder")));
+  });
+}
+
+}  // namespace fileindexd

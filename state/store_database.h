@@ -1,0 +1,47 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The state database's file: its opening, its schema, the sound copy beside it.
+//
+//   state.db          the database (SQLite, WAL)
+//   state.db.copy     as it was after the last change
+//   state.db.damaged  what was set aside last
+//
+// Opening and copying are one program's at a time, under a lock on the state root. Nothing throws.
+// Functions that fail set `error` to one line that names the file.
+#pragma once
+
+#include <sqlite3.h>
+
+#include <memory>
+#include <string>
+
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+// Owns a connection.
+class StateConnection {
+ public:
+  StateConnection() = default;
+  StateConnection(const StateConnection&) = delete;
+  StateConnection& operator=(const StateConnection&) = delete;
+  ~StateConnection() { sqlite3_close_v2(db); }
+
+  sqlite3* db = nullptr;
+  std::string path;
+};
+
+// Opens the database: makes it where there is none, upgrades an older one, refuses a newer one, and
+// puts the copy in the place of a damaged one. Null on failure.
+std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
+
+// Leaves a copy of what is committed beside the database. It is checked before it replaces the one
+// that is there. False on failure, and that one stays.
+bool LeaveStateCopy(const StateConnection& connection, std::string& error);
+
+// True when the open file is no longer the one at its path: it was set aside or removed.
+bool HasStateMoved(const StateConnection& connection);
+
+// The connection's last error in one line.
+std::string StateError(const StateConnection& connection, const char* what);
+
+}  // namespace fileindexd
