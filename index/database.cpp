@@ -21,9 +21,10 @@ namespace {
 
 constexpr int BUSY_TIMEOUT_MS = 5000;
 
-// auto_vacuum counts only before the first table. The tables are made before the log is: so the main
-// file's own first page tells from the beginning whose it is.
-constexpr const char* PRAGMAS_FOR_CREATING = "PRAGMA auto_vacuum = INCREMENTAL; PRAGMA synchronous = FULL";
+// auto_vacuum counts only before the first table. The tables are made before the log is: so the
+// main file's own first page tells from the beginning whose it is.
+constexpr const char* PRAGMAS_FOR_CREATING =
+    "PRAGMA auto_vacuum = INCREMENTAL; PRAGMA synchronous = FULL";
 // Sizes: cache in KiB, checkpoint in pages of 4 KiB, limit in bytes.
 constexpr const char* PRAGMAS_FOR_WRITING =
     "PRAGMA synchronous = FULL; PRAGMA cache_size = -8192; PRAGMA temp_store = MEMORY;"
@@ -50,7 +51,8 @@ int ReadNumber(sqlite3* db, const char* sql, int64_t& number) {
 }
 
 int OpenFile(const std::string& file, sqlite3*& db) {
-  const int code = sqlite3_open_v2(file.c_str(), &db, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
+  const int code =
+      sqlite3_open_v2(file.c_str(), &db, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
   if (db == nullptr) {
     return SQLITE_NOMEM;
   }
@@ -234,7 +236,9 @@ IndexError IndexDatabase::OpenForReading(const std::string& index_path) {
   return OpenExisting(index_path, PRAGMAS_FOR_READING, db);
 }
 
-void IndexDatabase::Close() { sqlite3_close_v2(std::exchange(db, nullptr)); }
+void IndexDatabase::Close() {
+  sqlite3_close_v2(std::exchange(db, nullptr));
+}
 
 bool IndexDatabase::HasMoved() const {
   int moved = 0;

@@ -14,12 +14,12 @@ namespace {
 constexpr int64_t FREE_PAGES_KEPT = 256;
 
 void BindAttributes(Statement& statement, int column, const Entry& entry) {
-  for (const int64_t value : {
-           static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
-           static_cast<int64_t>(entry.content_wanted), static_cast<int64_t>(entry.inode),
-           entry.size, entry.mtime, entry.ctime, entry.birth_time, entry.first_seen,
-           static_cast<int64_t>(entry.owner), static_cast<int64_t>(entry.group),
-           static_cast<int64_t>(entry.mode)}) {
+  for (const int64_t value :
+       {static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
+        static_cast<int64_t>(entry.content_wanted), static_cast<int64_t>(entry.inode), entry.size,
+        entry.mtime, entry.ctime, entry.birth_time, entry.first_seen,
+        static_cast<int64_t>(entry.owner), static_cast<int64_t>(entry.group),
+        static_cast<int64_t>(entry.mode)}) {
     statement.BindInt(column++, value);
   }
 }

@@ -53,7 +53,9 @@ Kind KindOfName(std::string_view name) {
   return found == ENDINGS.end() ? Kind::OTHER : found->second;
 }
 
-const char* KindText(Kind kind) { return KIND_TEXTS.at(static_cast<size_t>(kind)); }
+const char* KindText(Kind kind) {
+  return KIND_TEXTS.at(static_cast<size_t>(kind));
+}
 
 std::optional<Kind> KindFromText(std::string_view text) {
   const auto found = std::find(KIND_TEXTS.begin(), KIND_TEXTS.end(), text);

@@ -3,7 +3,8 @@
 
 namespace fileindexd {
 
-static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 1, "numbers in the text below");
+static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 1,
+              "numbers in the text below");
 
 const char* const ENTRIES_SCHEMA = R"sql(
 CREATE TABLE entries(

@@ -5,7 +5,8 @@
 //
 //   entries      one row for each thing that belongs
 //     id              rowid; the same number in `names` and `parts`
-//     path            BLOB, unique, normal path byte for byte; '/' sorts as a byte, so that what lies
+//     path            BLOB, unique, normal path byte for byte; '/' sorts as a byte, so that what
+//     lies
 //                     below P is the range ("P/", "P0")
 //     thing           1 file, 2 directory, 3 symbolic link
 //     kind            0 other, 1 document, 2 audio, 3 video, 4 photo, 5 folder
@@ -36,9 +37,9 @@ constexpr int64_t ENTRIES_VERSION = 1;
 extern const char* const ENTRIES_SCHEMA;
 
 // All columns of `entries`, in the order in which EntryTable binds and reads them.
-#define FILEINDEX_ENTRY_COLUMNS                                                                \
-  "entries.id, entries.path, entries.thing, entries.kind, entries.content_wanted, "            \
-  "entries.inode, entries.size, entries.mtime, entries.ctime, entries.birth_time, "            \
+#define FILEINDEX_ENTRY_COLUMNS                                                     \
+  "entries.id, entries.path, entries.thing, entries.kind, entries.content_wanted, " \
+  "entries.inode, entries.size, entries.mtime, entries.ctime, entries.birth_time, " \
   "entries.first_seen, entries.owner, entries.grp, entries.mode"
 
 }  // namespace fileindexd
