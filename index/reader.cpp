@@ -45,15 +45,19 @@ IndexError EntryReader::Open(const std::string& share_name) {
 }
 
 bool EntryReader::Summarise(Summary& summary) {
+  // Counting what is wanted reads its own small index alone.
   Statement statement;
-  if (statement.Prepare(database.db, "SELECT entries, last_commit FROM meta WHERE id = 1") !=
-          SQLITE_OK ||
+  if (statement.Prepare(database.db,
+                        "SELECT entries, last_commit,"
+                        " (SELECT count(*) FROM entries WHERE content_wanted <> 0)"
+                        " FROM meta WHERE id = 1") != SQLITE_OK ||
       statement.Step() != SQLITE_ROW) {
     return false;
   }
 
   summary.entries = static_cast<uint64_t>(statement.Int(0));
   summary.last_commit = statement.Int(1);
+  summary.wanted = static_cast<uint64_t>(statement.Int(2));
   return true;
 }
 

@@ -23,6 +23,7 @@ CREATE TABLE entries(
   grp INTEGER NOT NULL,
   mode INTEGER NOT NULL);
 CREATE INDEX entries_by_inode ON entries(inode);
+CREATE INDEX entries_wanted ON entries(id) WHERE content_wanted <> 0;
 CREATE VIRTUAL TABLE names USING fts5(
   name, content='', columnsize=0, tokenize='unicode61 remove_diacritics 2');
 CREATE VIRTUAL TABLE parts USING fts5(
