@@ -25,8 +25,8 @@ constexpr const char* PID_FILE_NAME = "fileindexd.pid";
 constexpr const char* SEARCH_SERVICE = "talocontentsearchd";
 
 // Both error categories exist from start-up on, before there is any thread.
-inline const boost::system::error_category& SYSTEM_CATEGORY = boost::system::system_category();
-inline const boost::system::error_category& GENERIC_CATEGORY = boost::system::generic_category();
+inline const boost::system::error_category& system_errors = boost::system::system_category();
+inline const boost::system::error_category& generic_errors = boost::system::generic_category();
 
 class Daemon {
  public:

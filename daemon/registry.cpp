@@ -50,6 +50,7 @@ Worker* MakeWorker(const std::string& share_name, Daemon* daemon) {
 int WatchQueueFolder(int inotify_fd, const std::string& queue_path) {
   char path[PATH_SIZE];
   snprintf(path, sizeof(path), "%s", queue_path.c_str());
+  // NOLINTNEXTLINE(concurrency-mt-unsafe): works in the buffer it is given
   return inotify_add_watch(inotify_fd, dirname(path), IN_CLOSE_WRITE);
 }
 

@@ -79,7 +79,7 @@ void QueueLock::MoveAside(const std::string& queue_path, const std::string& drai
     if (rename(queue_path.c_str(), drained_path.c_str()) == 0) {
       return;
     }
-    sleep(1);
+    sleep(1);  // NOLINT(concurrency-mt-unsafe): leaves signals alone here
   }
   // Wanted: passed over in silence. Opening the drained copy will fail, and say so.
 }

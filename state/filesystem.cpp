@@ -49,11 +49,16 @@ int OpenFolder(const std::string& path) {
   return open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NONBLOCK);
 }
 
+// The ioctl was seen to answer 1, not 0, for subvolumes other than the top one, with all that is
+// used here filled in: only a negative answer is a failure.
+bool AskSubvolume(int folder, btrfs_ioctl_get_subvol_info_args& info) {
+  return ioctl(folder, BTRFS_IOC_GET_SUBVOL_INFO, &info) >= 0;
+}
+
 std::string BtrfsIdentity(int folder) {
   btrfs_ioctl_fs_info_args info{};
   btrfs_ioctl_get_subvol_info_args subvolume{};
-  if (ioctl(folder, BTRFS_IOC_FS_INFO, &info) != 0 ||
-      ioctl(folder, BTRFS_IOC_GET_SUBVOL_INFO, &subvolume) != 0) {
+  if (ioctl(folder, BTRFS_IOC_FS_INFO, &info) != 0 || !AskSubvolume(folder, subvolume)) {
     return {};
   }
   return "btrfs:" + Hex(info.fsid, sizeof info.fsid) + ":" + std::to_string(subvolume.treeid);
@@ -98,7 +103,7 @@ std::string ParentOf(const std::string& path) {
 // True when the subvolume that holds the folder is read-only and a copy of another.
 bool IsSnapshotSubvolume(int folder) {
   btrfs_ioctl_get_subvol_info_args info{};
-  if (ioctl(folder, BTRFS_IOC_GET_SUBVOL_INFO, &info) != 0) {
+  if (!AskSubvolume(folder, info)) {
     return false;
   }
   const bool copied = std::any_of(std::begin(info.parent_uuid), std::end(info.parent_uuid),

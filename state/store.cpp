@@ -1,22 +1,15 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include "state/store.h"
-
 #include <syslog.h>
 
 #include <climits>
 #include <cstdlib>
-#include <mutex>
-#include <optional>
 
 #include "state/layout.h"
-#include "state/sqlite.h"
-#include "state/store_database.h"
+#include "state/store_impl.h"
 
 namespace fileindexd {
 
 namespace {
-
-constexpr const char* PAUSE = "pause";
 
 // Links on the way are resolved, so that a share that shows the folder by its real path leaves it
 // out. It exists: the database in it is open.
@@ -24,21 +17,6 @@ std::string ResolvedStateRoot() {
   const std::string root = StateRoot();
   char resolved[PATH_MAX];
   return realpath(root.c_str(), resolved) != nullptr ? resolved : root;
-}
-
-ShareStatus ReadStatus(const Statement& row) {
-  ShareStatus status;
-  status.needs_reindex = row.Int(0) != 0;
-  status.reindex_begun = row.Int(1) != 0;
-  status.no_space = row.Int(2) != 0;
-  status.missing = row.Int(3) != 0;
-  status.rebuild_wanted = row.Int(4) != 0;
-  return status;
-}
-
-bool IsSame(const ShareStatus& a, const ShareStatus& b) {
-  return a.needs_reindex == b.needs_reindex && a.reindex_begun == b.reindex_begun &&
-         a.no_space == b.no_space && a.missing == b.missing && a.rebuild_wanted == b.rebuild_wanted;
 }
 
 void BindFlags(Statement& statement, int first, const ContentFlags& wanted) {
@@ -49,45 +27,6 @@ void BindFlags(Statement& statement, int first, const ContentFlags& wanted) {
 }
 
 }  // namespace
-
-// `mutex` guards everything here, and is held by whoever calls an operation of it.
-struct StateStore::Impl {
-  bool Fail(const std::string& reason) {
-    error = reason;
-    return false;
-  }
-  bool FailSql() { return Fail(StateError(*connection, "cannot use")); }
-
-  bool Open();
-  // Opens anew where another program set the file aside: changes to it would be lost.
-  bool Ready();
-  bool Prepare(Statement& statement, const char* sql) {
-    return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
-  }
-  bool Run(Statement& statement) { return statement.Run() == SQLITE_OK || FailSql(); }
-  bool Exec(const char* sql) {
-    return sqlite3_exec(connection->db, sql, nullptr, nullptr, nullptr) == SQLITE_OK || FailSql();
-  }
-
-  enum class Outcome { CHANGED, UNCHANGED, FAILED };
-  // Runs `body` in one transaction that is undone unless it answers CHANGED.
-  bool Change(const std::function<Outcome()>& body);
-  Outcome Done(bool good) { return good ? Outcome::CHANGED : Outcome::FAILED; }
-
-  // True with `found` when the text that is bound to column 1 has a row.
-  bool HasRow(const char* sql, const std::string& key, bool& found);
-  bool Load(Settings& settings);
-  bool LoadTables(Settings& settings);
-  Outcome Remove(const std::string& share_name);
-  bool LoadStatus(const std::string& share, ShareStatus& status);
-
-  std::mutex mutex;
-  std::string error;
-  std::unique_ptr<StateConnection> connection;
-  std::optional<Statement> data_version;  // goes before the connection
-  int64_t cached_version = 0;
-  std::shared_ptr<const Settings> cached;  // null: to be loaded
-};
 
 bool StateStore::Impl::Open() {
   cached.reset();
@@ -121,12 +60,17 @@ bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
     return outcome == Outcome::UNCHANGED;
   }
 
-  cached.reset();
   std::string reason;
   if (!LeaveStateCopy(*connection, reason)) {
     syslog(LOG_ERR, "%s", reason.c_str());  // the change itself is safe
   }
   return true;
+}
+
+bool StateStore::Impl::ChangeSettings(const std::function<Outcome()>& body) {
+  const bool good = Change(body);
+  cached.reset();  // also when it failed: a commit whose result is lost may have happened
+  return good;
 }
 
 bool StateStore::Impl::HasRow(const char* sql, const std::string& key, bool& found) {
@@ -245,7 +189,7 @@ bool StateStore::AddShare(const Share& share) {
   if (NormalPath(share.path) != share.path) {
     return impl->Fail("not a plain absolute path: " + share.path);
   }
-  return impl->Change([&] {
+  return impl->ChangeSettings([&] {
     Settings settings;
     if (!impl->Load(settings)) {
       return Impl::Outcome::FAILED;
@@ -288,12 +232,12 @@ StateStore::Impl::Outcome StateStore::Impl::Remove(const std::string& share_name
 
 bool StateStore::RemoveShare(const std::string& name) {
   const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] { return impl->Remove(name); });
+  return impl->ChangeSettings([&] { return impl->Remove(name); });
 }
 
 bool StateStore::SetShareFilesystem(const std::string& name, const std::string& filesystem) {
   const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] {
+  return impl->ChangeSettings([&] {
     Statement update;
     if (!impl->Prepare(update, "UPDATE share SET filesystem = ? WHERE name = ?")) {
       return Impl::Outcome::FAILED;
@@ -310,7 +254,7 @@ bool StateStore::AddFolder(const std::string& path, const ContentFlags& wanted) 
   if (NormalPath(path) != path) {
     return impl->Fail("not a plain absolute path: " + path);
   }
-  return impl->Change([&] {
+  return impl->ChangeSettings([&] {
     Settings settings;
     if (!impl->Load(settings)) {
       return Impl::Outcome::FAILED;
@@ -335,7 +279,7 @@ bool StateStore::AddFolder(const std::string& path, const ContentFlags& wanted) 
 
 bool StateStore::SetFolder(const std::string& path, const ContentFlags& wanted) {
   const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] {
+  return impl->ChangeSettings([&] {
     Statement update;
     if (!impl->Prepare(update,
                        "UPDATE folder SET document = ?, audio = ?, video = ?, photo = ?"
@@ -351,7 +295,7 @@ bool StateStore::SetFolder(const std::string& path, const ContentFlags& wanted) 
 
 bool StateStore::RemoveFolder(const std::string& path) {
   const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] {
+  return impl->ChangeSettings([&] {
     Statement remove;
     if (!impl->Prepare(remove, "DELETE FROM folder WHERE path = ?")) {
       return Impl::Outcome::FAILED;
@@ -359,107 +303,6 @@ bool StateStore::RemoveFolder(const std::string& path) {
     remove.BindBlob(1, path);
     return impl->Done(impl->Run(remove) && (sqlite3_changes(impl->connection->db) == 1 ||
                                             impl->Fail(path + " is no indexed folder")));
-  });
-}
-
-// A share without a row has had nothing to remember yet.
-bool StateStore::Impl::LoadStatus(const std::string& share, ShareStatus& status) {
-  bool known = false;
-  if (!HasRow("SELECT 1 FROM share WHERE name = ?", share, known)) {
-    return false;
-  }
-  if (!known) {
-    return Fail("there is no share " + share);
-  }
-  Statement ask;
-  if (!Prepare(ask,
-               "SELECT needs_reindex, reindex_begun, no_space, missing, rebuild_wanted"
-               " FROM status WHERE share = ?")) {
-    return false;
-  }
-  ask.BindBlob(1, share);
-  const int result = ask.Step();
-  if (result != SQLITE_ROW && result != SQLITE_DONE) {
-    return FailSql();
-  }
-  status = result == SQLITE_ROW ? ReadStatus(ask) : ShareStatus();
-  return true;
-}
-
-bool StateStore::GetStatus(const std::string& share, ShareStatus& status) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->Ready() && impl->LoadStatus(share, status);
-}
-
-bool StateStore::UpdateStatus(const std::string& share,
-                              const std::function<void(ShareStatus&)>& change) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] {
-    ShareStatus before;
-    if (!impl->LoadStatus(share, before)) {
-      return Impl::Outcome::FAILED;
-    }
-    ShareStatus after = before;
-    change(after);
-    if (IsSame(before, after)) {
-      return Impl::Outcome::UNCHANGED;
-    }
-    Statement write;
-    if (!impl->Prepare(write, "INSERT OR REPLACE INTO status VALUES(?, ?, ?, ?, ?, ?)")) {
-      return Impl::Outcome::FAILED;
-    }
-    write.BindBlob(1, share);
-    write.BindInt(2, after.needs_reindex ? 1 : 0);
-    write.BindInt(3, after.reindex_begun ? 1 : 0);
-    write.BindInt(4, after.no_space ? 1 : 0);
-    write.BindInt(5, after.missing ? 1 : 0);
-    write.BindInt(6, after.rebuild_wanted ? 1 : 0);
-    return impl->Done(impl->Run(write));
-  });
-}
-
-bool StateStore::GetPause(int64_t& resume_time) {
-  const std::lock_guard guard(impl->mutex);
-  Statement ask;
-  if (!impl->Ready() || !impl->Prepare(ask, "SELECT value FROM number WHERE name = ?")) {
-    return false;
-  }
-  ask.BindText(1, PAUSE);
-  const int result = ask.Step();
-  if (result != SQLITE_ROW && result != SQLITE_DONE) {
-    return impl->FailSql();
-  }
-  resume_time = result == SQLITE_ROW ? ask.Int(0) : -1;
-  return true;
-}
-
-bool StateStore::SetPause(int64_t resume_time) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] {
-    Statement write;
-    if (!impl->Prepare(write, "INSERT OR REPLACE INTO number VALUES(?, ?)")) {
-      return Impl::Outcome::FAILED;
-    }
-    write.BindText(1, PAUSE);
-    write.BindInt(2, resume_time);
-    return impl->Done(impl->Run(write));
-  });
-}
-
-bool StateStore::HasMarker(const std::string& marker, bool& has) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->Ready() && impl->HasRow("SELECT 1 FROM marker WHERE name = ?", marker, has);
-}
-
-bool StateStore::SetMarker(const std::string& marker) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->Change([&] {
-    Statement write;
-    if (!impl->Prepare(write, "INSERT OR IGNORE INTO marker VALUES(?)")) {
-      return Impl::Outcome::FAILED;
-    }
-    write.BindBlob(1, marker);
-    return impl->Done(impl->Run(write));
   });
 }
 

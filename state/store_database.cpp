@@ -172,6 +172,14 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
   return version < SCHEMA_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
 }
 
+// Whether closing writes the log back into the database and removes it. Off while the database is
+// not known to be sound: what is set aside must be what was found.
+void TidyOnClose(const StateConnection& connection, bool tidy) {
+  int keep_log = tidy ? 0 : 1;
+  sqlite3_db_config(connection.db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep_log, nullptr);
+  sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_PERSIST_WAL, &keep_log);
+}
+
 Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) {
   // No mutex of SQLite's own: the store serialises its users.
   constexpr int FLAGS = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX;
@@ -181,12 +189,17 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
   }
   sqlite3_extended_result_codes(connection.db, 1);
   sqlite3_busy_timeout(connection.db, BUSY_WAIT_MS);
+  TidyOnClose(connection, false);
   const Opened outcome = CheckAndUpgrade(connection, has_copy, error);
   if (outcome != Opened::GOOD) {
     return outcome;
   }
   result = Exec(connection, "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL");
-  return result == SQLITE_OK ? Opened::GOOD : Failed(connection, "cannot set up", result, error);
+  if (result != SQLITE_OK) {
+    return Failed(connection, "cannot set up", result, error);
+  }
+  TidyOnClose(connection, true);
+  return Opened::GOOD;
 }
 
 bool ReadAll(const std::string& path, std::string& bytes) {

@@ -1,0 +1,143 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "platform/standalone/environment.h"
+
+#include <map>
+#include <mutex>
+
+#include "platform/log.h"
+#include "state/queue_writer.h"
+
+namespace fileindexd {
+
+namespace {
+
+struct Environment {
+  std::mutex mutex;
+  std::unique_ptr<StateStore> store;
+  bool open_failure_told = false;
+  std::shared_ptr<const Settings> settings = std::make_shared<Settings>();
+  std::map<std::string, bool> commits;  // by share: whether the last one was good
+  rlimit descriptors = {RLIM_INFINITY, RLIM_INFINITY};
+};
+
+// Never destroyed: a thread that outlives main may still ask.
+Environment& Process() {
+  static Environment& environment = *new Environment;
+  return environment;
+}
+
+// A walk needs a descriptor for each level of the tree, and skips in silence what it has none for.
+void RaiseDescriptorLimit(rlimit& before) {
+  if (getrlimit(RLIMIT_NOFILE, &before) != 0) {
+    return;
+  }
+  rlimit raised = before;
+  raised.rlim_cur = raised.rlim_max;
+  (void)setrlimit(RLIMIT_NOFILE, &raised);  // as good as it gets
+}
+
+}  // namespace
+
+StateStore* Store() {
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  if (process.store != nullptr) {
+    return process.store.get();
+  }
+
+  std::string error;
+  std::unique_ptr<StateStore> opened = StateStore::Open(error);
+  if (opened != nullptr && !opened->Touch()) {
+    error = opened->Error();
+    opened.reset();
+  }
+  if (opened == nullptr) {
+    if (!process.open_failure_told) {
+      FI_LOG("Failed to open the state database: %s", error.c_str());
+    }
+    process.open_failure_told = true;
+    return nullptr;
+  }
+
+  process.open_failure_told = false;
+  process.store = std::move(opened);
+  RaiseDescriptorLimit(process.descriptors);
+  return process.store.get();
+}
+
+std::shared_ptr<const Settings> CurrentSettings() {
+  StateStore* store = Store();
+  std::shared_ptr<const Settings> settings;
+  const bool read = store != nullptr && store->GetSettings(settings);
+  if (store != nullptr && !read) {
+    FI_LOG("Failed to read settings: %s", store->Error().c_str());
+  }
+
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  if (read) {
+    process.settings = std::move(settings);
+  }
+  return process.settings;
+}
+
+ShareStatus StatusOf(const std::string& share) {
+  ShareStatus status;
+  StateStore* store = Store();
+  if (store != nullptr && !store->GetStatus(share, status)) {
+    FI_LOG("Failed to read status of share[%s]: %s", share.c_str(), store->Error().c_str());
+  }
+  return status;
+}
+
+bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus&)>& change) {
+  StateStore* store = Store();
+  if (store == nullptr) {
+    return false;
+  }
+  if (!store->UpdateStatus(share, change)) {
+    FI_LOG("Failed to store status of share[%s]: %s", share.c_str(), store->Error().c_str());
+    return false;
+  }
+  return true;
+}
+
+bool RequestReindex(const std::string& share) {
+  bool stood = false;
+  if (!ChangeStatus(share, [&stood](ShareStatus& status) {
+        stood = status.needs_reindex || status.reindex_begun;
+        status.needs_reindex = true;
+      })) {
+    return false;
+  }
+  if (stood) {
+    return true;  // asked for already: another wake-up would only make a failing pass spin
+  }
+
+  std::string error;
+  if (!AppendToQueue(share, {}, error)) {
+    FI_LOG("Failed to wake share[%s]: %s", share.c_str(), error.c_str());
+  }
+  return true;
+}
+
+void NoteCommit(const std::string& share, bool good) {
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  process.commits[share] = good;
+}
+
+bool WasLastCommitGood(const std::string& share) {
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  const auto found = process.commits.find(share);
+  return found == process.commits.end() || found->second;
+}
+
+rlimit InheritedDescriptorLimit() {
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  return process.descriptors;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,38 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What this platform keeps for the whole process: the store, the settings in force, what became of
+// each share's last commit. Thread-safe. Nothing here tests for cancellation.
+#pragma once
+
+#include <sys/resource.h>
+
+#include <memory>
+#include <string>
+
+#include "state/settings.h"
+#include "state/store.h"
+
+namespace fileindexd {
+
+// The process's one connection to the store, opened by the first call. Null, after a log line, when
+// it cannot be opened; the next call tries again.
+StateStore* Store();
+
+// The settings in force. When they cannot be read, the last ones that could, or empty ones.
+std::shared_ptr<const Settings> CurrentSettings();
+
+// The share's status; the default, after a log line, when it cannot be read.
+ShareStatus StatusOf(const std::string& share);
+bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus&)>& change);
+
+// Makes the share's next pass a whole reindex, and sees to it that there is one. False when that
+// could not be recorded.
+bool RequestReindex(const std::string& share);
+
+void NoteCommit(const std::string& share, bool good);
+// False while the last commit of the share's index failed.
+bool WasLastCommitGood(const std::string& share);
+
+// The limit on descriptors that the process was started with; its own is raised by Store().
+rlimit InheritedDescriptorLimit();
+
+}  // namespace fileindexd

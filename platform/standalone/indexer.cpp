@@ -1,0 +1,124 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "platform/indexer.h"
+
+#include <mutex>
+
+#include "index/writer.h"
+#include "platform/paths.h"
+#include "platform/standalone/environment.h"
+#include "platform/standalone/uncancelled.h"
+
+namespace fileindexd::TALO::IR {
+
+namespace {
+
+thread_local int last_error = 0;
+
+// Between two slices of long work nothing is half done: a thread may end here.
+void TestBetweenSlices() {
+  int off = 0;
+  pthread_setcancelstate(PTHREAD_CANCEL_ENABLE, &off);
+  pthread_testcancel();
+  pthread_setcancelstate(off, nullptr);
+}
+
+// The database's path is ROOT/shares/NAME/index.
+std::string ShareOfDatabase(const std::string& db_path) {
+  const size_t end = db_path.rfind('/');
+  if (end == std::string::npos || end == 0) {
+    return {};
+  }
+  const size_t start = db_path.rfind('/', end - 1);
+  return db_path.substr(start + 1, end - start - 1);
+}
+
+ContentFlags FlagsOf(const Json::Value& object) {
+  ContentFlags flags;
+  FILEINDEX::RetrieveBoolFromJsonObj(flags.document, "document", object);
+  FILEINDEX::RetrieveBoolFromJsonObj(flags.audio, "audio", object);
+  FILEINDEX::RetrieveBoolFromJsonObj(flags.video, "video", object);
+  FILEINDEX::RetrieveBoolFromJsonObj(flags.photo, "photo", object);
+  return flags;
+}
+
+}  // namespace
+
+struct Indexer::Handle {
+  Handle(const std::string& share, StateStore& store)
+      : share_name(share), writer(share, store, TestBetweenSlices) {}
+
+  // Runs one operation of the writer.
+  template <typename Operation>
+  bool Do(Operation operation) {
+    return Uncancelled([&] {
+      const std::lock_guard guard(inside);
+      const bool done = operation(writer);
+      if (!done) {
+        last_error = static_cast<int>(writer.last_error);
+      }
+      return done;
+    });
+  }
+
+  const std::string share_name;
+  std::mutex inside;
+  EntryWriter writer;
+};
+
+Indexer::Indexer(const std::string& db_path, _tag_backend_ir /*backend*/) {
+  Uncancelled([&] {
+    last_error = static_cast<int>(IndexError::OTHER);
+    StateStore* store = Store();
+    if (store == nullptr) {
+      return false;
+    }
+    handle = std::make_unique<Handle>(ShareOfDatabase(db_path), *store);
+    last_error = static_cast<int>(handle->writer.last_error);
+    return true;
+  });
+}
+
+Indexer::~Indexer() {
+  const CancelOff off;
+  if (handle != nullptr) {
+    handle->inside.lock();  // until no operation is inside
+    handle->inside.unlock();
+  }
+  handle.reset();
+}
+
+bool Indexer::IsOpen() const {
+  return handle != nullptr && handle->writer.IsOpen();
+}
+
+bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
+  return handle != nullptr &&
+         handle->Do([&](EntryWriter& writer) { return writer.Add(path, FlagsOf(cfg)); });
+}
+
+bool Indexer::UpdateFSDocument(const std::string& path, const Json::Value& cfg,
+                               const Json::Value& data) {
+  return handle != nullptr && handle->Do([&](EntryWriter& writer) {
+    return writer.Refresh(path, FlagsOf(cfg), FlagsOf(data));
+  });
+}
+
+bool Indexer::DelFSDocument(const std::string& path, _tag_delete_mode mode) {
+  return handle != nullptr && handle->Do([&](EntryWriter& writer) {
+    return writer.Delete(path, static_cast<DeleteMode>(mode));
+  });
+}
+
+bool Indexer::Commit() {
+  return handle != nullptr && handle->Do([this](EntryWriter& writer) {
+    const bool good = writer.Commit();
+    NoteCommit(handle->share_name, good);
+    return good;
+  });
+}
+
+int ErrorHandler::GetError() {
+  return last_error;
+}
+
+}  // namespace fileindexd::TALO::IR

@@ -1,0 +1,60 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The inside of the store, for its own sources only.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "state/settings.h"
+#include "state/sqlite.h"
+#include "state/store.h"
+#include "state/store_database.h"
+
+namespace fileindexd {
+
+// `mutex` guards everything here, and is held by whoever calls an operation of it.
+struct StateStore::Impl {
+  bool Fail(const std::string& reason) {
+    error = reason;
+    return false;
+  }
+  bool FailSql() { return Fail(StateError(*connection, "cannot use")); }
+
+  bool Open();
+  // Opens anew where another program set the file aside: changes to it would be lost.
+  bool Ready();
+  bool Prepare(Statement& statement, const char* sql) {
+    return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
+  }
+  bool Run(Statement& statement) { return statement.Run() == SQLITE_OK || FailSql(); }
+  bool Exec(const char* sql) {
+    return sqlite3_exec(connection->db, sql, nullptr, nullptr, nullptr) == SQLITE_OK || FailSql();
+  }
+
+  enum class Outcome { CHANGED, UNCHANGED, FAILED };
+  // Runs `body` in one transaction that is undone unless it answers CHANGED.
+  bool Change(const std::function<Outcome()>& body);
+  // The same for what GetSettings shows.
+  bool ChangeSettings(const std::function<Outcome()>& body);
+  Outcome Done(bool good) { return good ? Outcome::CHANGED : Outcome::FAILED; }
+
+  // True with `found` when the text that is bound to column 1 has a row.
+  bool HasRow(const char* sql, const std::string& key, bool& found);
+  bool Load(Settings& settings);
+  bool LoadTables(Settings& settings);
+  Outcome Remove(const std::string& share_name);
+  bool LoadStatus(const std::string& share, ShareStatus& status);
+
+  std::mutex mutex;
+  std::string error;
+  std::unique_ptr<StateConnection> connection;
+  std::optional<Statement> data_version;  // goes before the connection
+  int64_t cached_version = 0;
+  std::shared_ptr<const Settings> cached;  // null: to be loaded
+};
+
+}  // namespace fileindexd

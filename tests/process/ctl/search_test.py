@@ -1,0 +1,122 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""search: options, output, and what is no question."""
+
+import os
+
+from harness import IndexTest, main, namespace
+from harness.machine import full_path
+
+FILES = [
+    "holiday/beach.jpg",
+    "holiday/beach.mp4",
+    "holiday/plan.txt",
+    "music/beach boys.mp3",
+    "work/report beach.pdf",
+    "work/budget.xyz",
+]
+
+
+class SearchTest(IndexTest):
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(files=FILES)
+        self.other = self.make_share("beta", files=("beach.txt",))
+        self.start()
+        for share in ("alpha", "beta"):
+            self.await_drained(share)
+
+    def hits(self, *arguments):
+        """Paths below the data disk, in byte order."""
+        paths = self.ctl("search", "-0", *arguments).out.split(b"\0")
+        self.assertEqual(paths.pop(), b"")
+        return sorted(os.path.relpath(os.fsdecode(path), namespace.DATA) for path in paths)
+
+    def test_finds_by_name_in_all_shares(self):
+        self.assertEqual(
+            self.hits("beach"),
+            [
+                "alpha/holiday/beach.jpg",
+                "alpha/holiday/beach.mp4",
+                "alpha/music/beach boys.mp3",
+                "alpha/work/report beach.pdf",
+                "beta/beach.txt",
+            ],
+        )
+
+    def test_several_words_are_joined(self):
+        self.assertEqual(self.hits("beach", "boys"), ["alpha/music/beach boys.mp3"])
+        self.assertEqual(self.hits("beach boys"), ["alpha/music/beach boys.mp3"])
+
+    def test_options(self):
+        self.assertEqual(self.hits("--share", "beta", "beach"), ["beta/beach.txt"])
+        self.assertEqual(self.hits("--kind", "photo", "beach"), ["alpha/holiday/beach.jpg"])
+        self.assertEqual(self.hits("beach", "--kind=video"), ["alpha/holiday/beach.mp4"])
+        self.assertEqual(self.hits("--kind", "folder", "holiday"), ["alpha/holiday"])
+        self.assertEqual(
+            self.hits("--under", f"{self.root}/work", "beach"), ["alpha/work/report beach.pdf"]
+        )
+
+    def test_limit_offset_and_count(self):
+        everything = self.ctl("search", "beach").out.splitlines()
+        self.assertEqual(len(everything), 5)
+
+        self.assertEqual(self.ctl("search", "--limit", "2", "beach").out.splitlines(), everything[:2])
+        rest = self.ctl("search", "--offset", "2", "beach").out.splitlines()
+        self.assertEqual(rest, everything[2:])
+        self.assertEqual(self.ctl("search", "--limit", "0", "beach").out, b"")
+        self.assertEqual(self.ctl("search", "--count", "beach").out, b"5\n")
+
+    def test_twenty_hits_without_a_limit(self):
+        self.make_files(self.root, *(f"many/number{n}.txt" for n in range(30)))
+        self.ctl("reindex", self.root)
+        self.await_drained("alpha")
+
+        self.assertEqual(len(self.ctl("search", "--under", f"{self.root}/many", "txt").out.splitlines()), 20)
+        self.assertEqual(self.ctl("search", "--count", "--under", f"{self.root}/many", "txt").out, b"30\n")
+
+    def test_json(self):
+        hits = self.ctl("search", "--json", "budget").objects()
+
+        (hit,) = hits
+        path = f"{self.root}/work/budget.xyz"
+        self.assertEqual(full_path(hit), path.encode())
+        self.assertEqual((hit["share"], hit["kind"]), ("alpha", "other"))
+        info = os.stat(path)
+        self.assertEqual((hit["size"], hit["mtime"]), (info.st_size, int(info.st_mtime)))
+        self.assertIsInstance(hit["score"], (int, float))
+        self.assertIsInstance(hit["snippet"], str)
+
+    def test_no_hits_are_no_failure(self):
+        self.assertEqual(self.ctl("search", "nowhere").out, b"")
+        self.assertEqual(self.ctl("search", "--count", "nowhere").out, b"0\n")
+
+    def test_works_with_the_daemon_stopped(self):
+        self.stop(self.daemon_pid())
+
+        self.assertEqual(len(self.hits("beach")), 5)
+
+    def test_minus_in_front_belongs_to_the_query(self):
+        found = self.hits("beach", "-boys")
+
+        self.assertNotIn("alpha/music/beach boys.mp3", found)
+        self.assertEqual(len(found), 4)
+
+    def test_what_is_refused(self):
+        for arguments in (
+            (),
+            ("--kind", "film", "beach"),
+            ("--limit", "x", "beach"),
+            ("--limit", "-1", "beach"),
+            ("--offset", "1.5", "beach"),
+            ("--nope", "beach"),
+            ("--json", "-0", "beach"),
+            ("--share",),
+        ):
+            with self.subTest(arguments=arguments):
+                self.ctl("search", *arguments, code=2)
+        self.ctl("search", "--share", "nope", "beach", code=1)
+        self.ctl("search", "--under", "/nowhere", "beach", code=1)
+
+
+if __name__ == "__main__":
+    main()

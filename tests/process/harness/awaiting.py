@@ -1,0 +1,86 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Waiting for what happens: files and processes. Nothing here sleeps."""
+
+import ctypes
+import os
+import select
+import time
+
+LIMIT = 60.0  # seconds; far beyond what anything takes that works
+
+IN_ANY = 0x00000FFE  # all changes of a folder and of what is in it, but reading
+IN_CLOEXEC = 0o2000000
+
+_libc = ctypes.CDLL(None, use_errno=True)
+
+
+def _deepest_folder(path):
+    while not os.path.isdir(path):
+        path = os.path.dirname(path)
+    return path
+
+
+class FolderWatch:
+    """Tells when something happens in a folder. Watch first, then look, then wait."""
+
+    def __init__(self, folder):
+        self.fd = _libc.inotify_init1(IN_CLOEXEC)
+        if self.fd < 0 or _libc.inotify_add_watch(self.fd, os.fsencode(folder), IN_ANY) < 0:
+            error = ctypes.get_errno()
+            raise OSError(error, os.strerror(error), folder)
+
+    def wait(self, seconds):
+        """False when nothing happened in that time."""
+        ready, _, _ = select.select([self.fd], [], [], max(seconds, 0))
+        if ready:
+            os.read(self.fd, 65536)
+        return bool(ready)
+
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *_):
+        os.close(self.fd)
+
+
+def await_in_folder(path, condition, limit=LIMIT):
+    """Waits until condition() holds, looking again at each change in the folder of `path`.
+
+    False when it does not hold within the limit.
+    """
+    deadline = time.monotonic() + limit
+    while True:
+        folder = _deepest_folder(os.path.dirname(path))
+        with FolderWatch(folder) as watch:
+            while folder == _deepest_folder(os.path.dirname(path)):
+                if condition():
+                    return True
+                if not watch.wait(deadline - time.monotonic()):
+                    return False
+
+
+def await_exit(pid, limit=LIMIT):
+    """Exit status as os.waitstatus_to_exitcode gives it; None when it still runs at the limit."""
+    fd = os.pidfd_open(pid)
+    try:
+        poll = select.poll()
+        poll.register(fd, select.POLLIN)
+        if not poll.poll(limit * 1000):
+            return None
+    finally:
+        os.close(fd)
+    return os.waitstatus_to_exitcode(os.waitpid(pid, 0)[1])
+
+
+def children():
+    """{pid: program} of the processes whose parent is this one, those that have ended included."""
+    found = {}
+    for name in filter(str.isdigit, os.listdir("/proc")):
+        try:
+            with open(f"/proc/{name}/stat", encoding="utf-8", errors="replace") as file:
+                text = file.read()
+        except OSError:
+            continue  # it has ended meanwhile
+        if int(text.rpartition(")")[2].split()[1]) == os.getpid():
+            found[int(name)] = text.partition("(")[2].rpartition(")")[0]
+    return found

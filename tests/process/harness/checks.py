@@ -1,0 +1,33 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Index and disk agree: the criterion of most tests."""
+
+from harness.machine import MachineTest, full_path
+from harness.oracle import expected_entries
+
+
+class IndexTest(MachineTest):
+    def assert_index(self, root, share="alpha", folders=None, left_out=()):
+        """The index holds what an independent walk finds, and `verify` has nothing to say."""
+        expected = expected_entries(root, folders, left_out)
+        shown = self.ctl("dump", share, "--json").objects()
+        entries = {
+            full_path(entry): {key: entry[key] for key in ("dir", "kind", "size", "mtime")}
+            for entry in shown
+        }
+        self.assertEqual(entries, expected)
+        self.assertEqual(len(shown), len(entries))
+        self.assertEqual(self.dump(share), sorted(expected))
+
+        verified = self.ctl("verify", share)
+        self.assertEqual((verified.out, verified.err), (b"", b""))
+
+    def assert_paths(self, root, wanted, share="alpha"):
+        """The index holds exactly these paths below `root`, and the root itself."""
+        prefix = root.encode()
+        paths = [path.removeprefix(prefix + b"/") for path in self.dump(share) if path != prefix]
+        self.assertEqual(paths, sorted(name.encode() for name in wanted))
+
+    def flags(self, share="alpha"):
+        """{path: whether its content is wanted} as the index has it."""
+        entries = self.ctl("dump", share, "--json").objects()
+        return {full_path(entry).decode(): entry["content"] for entry in entries}

@@ -1,0 +1,283 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""What a test can do and wait for. Each test gets empty disks and a new log."""
+
+import contextlib
+import dataclasses
+import fcntl
+import json
+import os
+import re
+import signal
+import subprocess
+import sys
+import unittest
+
+from harness import control, namespace
+from harness.awaiting import LIMIT, await_exit, await_in_folder, children
+from harness.system_log import PREFIX, SystemLog
+
+PID_FILE = "/run/fileindexd.pid"
+SERVICE_PID_FILE = "/run/talocontentsearchd.pid"
+QUEUE = "TALO@file_index_queue"
+LOG_ERR = 3
+SANITIZERS = ("ASAN_OPTIONS", "LSAN_OPTIONS", "TSAN_OPTIONS", "UBSAN_OPTIONS")
+NUDGE_SECONDS = 10.0  # after which a queue that nobody took is touched again
+
+
+@dataclasses.dataclass
+class Result:
+    code: int
+    out: bytes
+    err: bytes
+
+    def json(self):
+        return json.loads(self.out)
+
+    def objects(self):
+        """Of output that is one JSON object a line."""
+        return [json.loads(line) for line in self.out.splitlines()]
+
+
+def environment(**more):
+    """What the programs run with. Sanitizers report into files: a daemon has no standard error."""
+    result = {**os.environ, "FILEINDEXD_STATE_DIR": namespace.STATE, **more}
+    for name in SANITIZERS:
+        given = result.get(name)
+        result[name] = (given + ":" if given else "") + f"log_path={namespace.REPORTS}/sanitizer"
+    return {name: value for name, value in result.items() if value is not None}
+
+
+def program(name):
+    return os.path.join(os.environ["FILEINDEXD_BIN_DIR"], name)
+
+
+def full_path(shown):
+    """The bytes of the path that a JSON object of fileindexctl shows."""
+    return bytes.fromhex(shown["path_hex"]) if "path_hex" in shown else shown["path"].encode()
+
+
+class MachineTest(unittest.TestCase):
+    maxDiff = None
+    state_size = "256m"
+
+    def setUp(self):
+        namespace.fresh_world(self.state_size)
+        self.log = SystemLog()
+        self.prefixed = True  # every line of the daemon has its source in front
+
+    def tearDown(self):
+        for pid in children():
+            with contextlib.suppress(ProcessLookupError):
+                os.kill(pid, signal.SIGKILL)
+        while left := children():  # whose children come to us in turn
+            for pid in left:
+                with contextlib.suppress(ProcessLookupError):
+                    os.kill(pid, signal.SIGKILL)
+                os.waitpid(pid, 0)
+        self.log.close()
+        self._check_reports()
+        self._check_lines()
+
+    def _check_reports(self):
+        for name in sorted(os.listdir(namespace.REPORTS)):
+            with open(f"{namespace.REPORTS}/{name}", encoding="utf-8", errors="replace") as file:
+                self.fail(f"a sanitizer's report, {name}:\n{file.read()}")
+
+    def _check_lines(self):
+        for line in self.log.lines:
+            if line.program == "fileindexd" and self.prefixed:
+                self.assertEqual(line.priority, LOG_ERR, line)
+                self.assertRegex(line.message, PREFIX, line)
+
+    def run(self, result=None):
+        result = result if result is not None else self.defaultTestResult()
+        before = len(result.failures) + len(result.errors)
+        super().run(result)
+        if len(result.failures) + len(result.errors) > before and hasattr(self, "log"):
+            print(f"log of {self.id()}:", flush=True)
+            self.log.print()
+        return result
+
+    # The daemon.
+
+    def launch(self, debug=True, **more):
+        """Runs the daemon's program to the end of its first process."""
+        level = "debug" if debug else None
+        done = subprocess.run(
+            [program("fileindexd")],
+            env=environment(FILEINDEXD_LOG_LEVEL=level, **more),
+            check=False,
+            timeout=LIMIT,
+        )
+        self.assertEqual(done.returncode, 0)
+
+    def start(self, debug=True, **more):
+        """Starts the daemon; returns its pid once it serves."""
+        after = self.log.mark()
+        self.launch(debug, **more)
+        if debug:
+            self.await_line("Search daemon launched ...", after)
+        else:
+            self.await_file(SERVICE_PID_FILE)
+        return self.daemon_pid()
+
+    def daemon_pid(self):
+        with open(PID_FILE, encoding="ascii") as file:
+            return int(file.read())
+
+    def service_pid(self):
+        """The content service's pid, once it has written it down."""
+        self.await_file(SERVICE_PID_FILE)
+
+        def written():
+            return os.path.getsize(SERVICE_PID_FILE) > 0
+
+        self.assertTrue(await_in_folder(SERVICE_PID_FILE, written))
+        with open(SERVICE_PID_FILE, encoding="ascii") as file:
+            return int(file.read())
+
+    def detached_pid(self):
+        """The daemon, when its pid file is not to be had."""
+        found = [pid for pid, name in children().items() if name == "fileindexd"]
+        self.assertEqual(len(found), 1, children())
+        return found[0]
+
+    def await_exit(self, pid):
+        status = await_exit(pid)
+        self.assertIsNotNone(status, f"process {pid} still runs after {LIMIT} s")
+        return status
+
+    def stop(self, pid, number=signal.SIGTERM):
+        os.kill(pid, number)
+        self.assertEqual(self.await_exit(pid), 0)
+
+    def kill(self, pid):
+        os.kill(pid, signal.SIGKILL)
+        self.assertEqual(self.await_exit(pid), -signal.SIGKILL)
+
+    # Its log.
+
+    def await_line(self, wanted, after=0, count=1):
+        """Position behind the line. `wanted`: the text after the prefix, or a pattern for it."""
+        position = self.log.find(wanted, after, count)
+        self.assertIsNotNone(position, f"not logged within {LIMIT} s: {wanted!r}")
+        return position
+
+    def await_lines(self, wanted, after=0):
+        """All of them, in this order, whatever lies between."""
+        for text in wanted:
+            after = self.await_line(text, after)
+        return after
+
+    def assert_not_logged(self, pattern, after=0):
+        found = [text for text in self.log.texts(after) if re.fullmatch(pattern, text)]
+        self.assertEqual(found, [])
+
+    # Files.
+
+    def await_file(self, path):
+        self.assertTrue(await_in_folder(path, lambda: os.path.lexists(path)), f"no {path}")
+
+    def await_gone(self, path):
+        gone = await_in_folder(path, lambda: not os.path.lexists(path))
+        self.assertTrue(gone, f"still there: {path}")
+
+    # The control socket.
+
+    def command(self, kind, **data):
+        return control.exchange(control.request(kind, data))
+
+    # Queues.
+
+    def queue(self, share):
+        return f"{namespace.STATE}/shares/{share}/{QUEUE}"
+
+    def append(self, share, *lines):
+        """Appends lines (bytes, or objects) as the notification service does."""
+        texts = [line if isinstance(line, bytes) else json.dumps(line).encode() for line in lines]
+        self.append_bytes(share, b"".join(text + b"\n" for text in texts))
+
+    def append_bytes(self, share, data):
+        path = self.queue(share)
+        while True:
+            with open(path, "ab", buffering=0) as file:
+                fcntl.flock(file, fcntl.LOCK_EX)
+                with contextlib.suppress(FileNotFoundError):
+                    if os.path.samestat(os.fstat(file.fileno()), os.stat(path)):
+                        file.write(data)
+                        return  # closing is the unlock
+
+    def await_drained(self, share):
+        """Until all that was queued is executed and committed.
+
+        A line that comes between a Worker's last look and its end waits for the next one: the
+        queue is touched when nobody takes it, as the notification service does.
+        """
+        queue = self.queue(share)
+
+        def drained():
+            return not os.path.lexists(queue) and not os.path.lexists(queue + ".tmp")
+
+        for _ in range(int(LIMIT / NUDGE_SECONDS)):
+            if await_in_folder(queue, drained, NUDGE_SECONDS):
+                return
+            if os.path.lexists(queue):
+                self.append_bytes(share, b"")
+        self.fail(f"not drained: {os.listdir(os.path.dirname(queue))}")
+
+    # fileindexctl.
+
+    def ctl(self, *arguments, code=0, **more):
+        """Runs the command, which has to end with that code; None: with any but 0."""
+        command = [os.fsencode(program("fileindexctl")), *map(os.fsencode, arguments)]
+        done = subprocess.run(
+            command,
+            env=environment(**more),
+            stdin=subprocess.DEVNULL,
+            capture_output=True,
+            check=False,
+            timeout=LIMIT * 2,
+        )
+        result = Result(done.returncode, done.stdout, done.stderr)
+        if code is None:
+            self.assertNotEqual(result.code, 0, f"{arguments}: {result}")
+        else:
+            self.assertEqual(result.code, code, f"{arguments}: {result}")
+        if code == 0:
+            self.assertEqual(result.err, b"", arguments)
+        elif result.err or arguments[:1] != ("verify",):  # a difference is no error
+            self.assertRegex(result.err, rb"\Afileindexctl: [^\n]+\n\Z", arguments)
+        return result
+
+    def make_share(self, name="alpha", files=(), folders=("",), flags=()):
+        """A share with these files (ending in "/": folders), and these folders of it indexed."""
+        root = f"{namespace.DATA}/{name}"
+        os.makedirs(root, exist_ok=True)
+        self.make_files(root, *files)
+        self.ctl("share", "add", name, root)
+        for folder in folders:
+            self.ctl("folder", "add", os.path.join(root, folder), *flags)
+        return root
+
+    def make_files(self, root, *names):
+        for name in names:
+            path = os.path.join(root, name)
+            if name.endswith("/"):
+                os.makedirs(path, exist_ok=True)
+                continue
+            os.makedirs(os.path.dirname(path), exist_ok=True)
+            with open(path, "w", encoding="utf-8") as file:
+                file.write(name)
+
+    def dump(self, share="alpha"):
+        """The paths of the index, as bytes, in its order."""
+        paths = self.ctl("dump", share, "-0").out.split(b"\0")
+        self.assertEqual(paths.pop(), b"")
+        return paths
+
+
+def main():
+    """Runs the tests of the calling file inside the namespaces."""
+    namespace.enter()
+    sys.stdout.reconfigure(errors="backslashreplace")
+    unittest.main(verbosity=2)

@@ -1,0 +1,101 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""The system log as the programs see it: /dev/log, always drained.
+
+Searched are the lines of one program, the daemon's; printed are all.
+"""
+
+import dataclasses
+import os
+import re
+import socket
+import threading
+import time
+
+from harness.awaiting import LIMIT
+
+LINE = re.compile(r"<(\d+)>(?:\w{3} [ \d]\d \d\d:\d\d:\d\d )?([^:\[\]]+)(?:\[\d+\])?: ?(.*)", re.S)
+PREFIX = re.compile(r"[a-z/_]+\.cpp:\d+ ")
+
+
+@dataclasses.dataclass
+class Line:
+    priority: int  # without the facility
+    program: str
+    message: str  # with the source's prefix; bytes that are not UTF-8 as surrogates
+
+    @property
+    def text(self):
+        """The message without the source file and line in front."""
+        prefix = PREFIX.match(self.message)
+        return self.message[prefix.end() :] if prefix else self.message
+
+
+class SystemLog:
+    def __init__(self, path="/dev/log", program="fileindexd"):
+        if os.path.lexists(path):
+            os.unlink(path)
+        self.socket = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
+        self.socket.setsockopt(socket.SOL_SOCKET, socket.SO_RCVBUF, 8 << 20)
+        self.socket.bind(path)
+        os.chmod(path, 0o666)
+        self.path = path
+        self.program = program
+        self.lines = []
+        self.changed = threading.Condition()
+        self.thread = threading.Thread(target=self._drain, daemon=True)
+        self.thread.start()
+
+    def _drain(self):
+        while True:
+            datagram = self.socket.recv(1 << 20)
+            if not datagram:
+                return  # the end that close() sends
+            text = datagram.rstrip(b"\0\n").decode("utf-8", "surrogateescape")
+            match = LINE.fullmatch(text)
+            line = Line(int(match[1]) % 8, match[2], match[3]) if match else Line(-1, "?", text)
+            with self.changed:
+                self.lines.append(line)
+                self.changed.notify_all()
+
+    def close(self):
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as end:
+            end.connect(self.path)
+            end.send(b"")
+        self.thread.join()
+        self.socket.close()
+        os.unlink(self.path)
+
+    def mark(self):
+        """A position: what is logged from now on lies behind it."""
+        with self.changed:
+            return len(self.lines)
+
+    def texts(self, after=0, before=None):
+        with self.changed:
+            return [line.text for line in self.lines[after:before] if line.program == self.program]
+
+    def find(self, wanted, after=0, count=1, limit=LIMIT):
+        """Position behind the count-th line with that text; None when it does not come.
+
+        `wanted`: the whole text, or a compiled pattern for the whole text.
+        """
+        matches = wanted.fullmatch if isinstance(wanted, re.Pattern) else wanted.__eq__
+        deadline = time.monotonic() + limit
+        position = after
+        with self.changed:
+            while True:
+                for line in self.lines[position:]:
+                    position += 1
+                    if line.program == self.program and matches(line.text):
+                        count -= 1
+                        if count == 0:
+                            return position
+                left = deadline - time.monotonic()
+                if left <= 0:
+                    return None
+                self.changed.wait(left)
+
+    def print(self):
+        with self.changed:
+            for line in self.lines:
+                print(f"  log <{line.priority}> {line.program}: {ascii(line.message)}", flush=True)

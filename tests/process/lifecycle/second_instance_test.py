@@ -1,0 +1,61 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""One instance at a time: later starts, and starts at the same moment."""
+
+import os
+import subprocess
+
+from harness import MachineTest, control, main
+from harness.awaiting import LIMIT
+from harness.machine import PID_FILE, environment, program
+
+ROUNDS = 10
+
+
+class SecondInstanceTest(MachineTest):
+    def test_second_start_leaves_the_first_alone(self):
+        pid = self.start()
+        socket = os.stat(control.SOCKET)
+        after = self.log.mark()
+
+        self.launch()
+
+        self.await_line("Daemon alive. No need to start", after)
+        self.assert_not_logged(r"Daemonized \.\.\.|Cleaning resource", after)
+        self.assertEqual(self.daemon_pid(), pid)
+        self.assertEqual(os.stat(control.SOCKET).st_ino, socket.st_ino)
+        self.assertEqual(self.command("resume"), 0)
+
+    def test_second_start_says_nothing_without_debug(self):
+        self.start(debug=False)
+
+        self.launch(debug=False)
+
+        self.assertEqual(self.log.texts(), [])
+
+    def start_two(self):
+        command = [program("fileindexd")]
+        starts = [
+            subprocess.Popen(command, env=environment(FILEINDEXD_LOG_LEVEL="debug"))
+            for _ in range(2)
+        ]
+        self.assertEqual([start.wait(LIMIT) for start in starts], [0, 0])
+
+    def test_of_two_simultaneous_starts_one_goes_on(self):
+        for _ in range(ROUNDS):
+            after = self.log.mark()
+
+            self.start_two()
+
+            self.await_line("Search daemon launched ...", after)
+            texts = self.log.texts(after)
+            self.assertEqual(texts.count("Daemonized ..."), 1)
+            self.assertEqual(texts.count("Daemon alive. No need to start"), 1)
+            self.assertEqual(self.command("resume"), 0)
+            pid = self.daemon_pid()
+            self.assertTrue(os.path.exists(f"/proc/{pid}"))
+            self.stop(pid)
+            self.assertFalse(os.path.lexists(PID_FILE))
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,114 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""A pause holds every Worker before its next step, and outlives a restart."""
+
+import os
+import re
+import time
+
+from harness import IndexTest, main
+
+FILES = 1500
+TURNS = 50
+REINDEX = 0x10000
+ADDED = re.compile(r"\[alpha\] Document\[.*\] added")
+
+
+class PauseTest(IndexTest):
+    def make_big_share(self):
+        root = self.make_share(files=[f"d{n % 30}/f{n}.txt" for n in range(FILES)])
+        return root
+
+    def test_nothing_is_read_while_paused(self):
+        root = self.make_share()
+        self.start()
+        self.await_drained("alpha")
+        self.make_files(root, "a.txt")
+        self.assertEqual(self.command("pause"), 0)
+        after = self.log.mark()
+
+        self.append("alpha", {"event": 0x40, "path": f"{root}/a.txt"})
+
+        self.await_line("Worker[alpha] respawned", after)
+        self.assertEqual(self.command("pause"), 0)
+        self.assertTrue(os.path.exists(self.queue("alpha")))
+        self.assert_not_logged("In cleaner", after)
+        self.assertEqual(self.command("resume"), 0)
+        self.await_line("In cleaner", after)
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+    def test_pause_in_the_middle_of_a_walk(self):
+        root = self.make_big_share()
+        self.start()
+        self.await_line(ADDED, count=100)
+
+        self.assertEqual(self.command("pause"), 0)
+        after = self.await_line("SetPaused: true")
+        # The operation that was under way ends; the next one waits.
+        self.assertIsNone(self.log.find(ADDED, after, count=2, limit=1.0))
+
+        self.assertEqual(self.command("resume"), 0)
+        self.await_line("In cleaner", after)
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+    def test_many_pauses_under_load(self):
+        root = self.make_big_share()
+        self.start()
+
+        for _ in range(TURNS):
+            self.assertEqual(self.command("pause"), 0)
+            self.assertEqual(self.command("resume"), 0)
+        self.ctl("resume")  # one that falls between a test and its wait is missed
+
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+    def test_worker_is_dropped_while_it_waits(self):
+        root = self.make_share()
+        self.start()
+        self.await_drained("alpha")
+        self.assertEqual(self.command("pause"), 0)
+        self.append("alpha", {"event": REINDEX, "path": root})
+        self.await_line("Worker[alpha] respawned")
+        # Ends the wait before the stop does: a stopped Worker in a pause waits out 50 s.
+        self.assertEqual(self.command("resume"), 0)
+
+        self.assertEqual(self.command("delete_share_worker", share_name="alpha"), 0)
+        self.assertEqual(self.command("revive_share_worker", share_name="alpha"), 0)
+
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+    def test_sigterm_while_a_worker_waits(self):
+        root = self.make_big_share()
+        pid = self.start()
+        self.await_line(ADDED, count=100)
+        self.assertEqual(self.command("pause"), 0)
+        # Until the Worker waits it still finishes an operation.
+        self.log.find(ADDED, self.await_line("SetPaused: true"), count=2, limit=1.0)
+        began = time.monotonic()
+
+        self.stop(pid)
+
+        self.assertLess(time.monotonic() - began, 40)  # no wait of 50 s for the thread
+        self.await_lines(["Cleaning resource", "In cleaner"])
+        self.assert_not_logged(r"Failed to wait thread.*")
+        self.start()
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+    def test_stored_pause_holds_from_the_start(self):
+        root = self.make_share(files=("a.txt",))
+        self.ctl("pause")
+
+        self.start()
+
+        self.assertTrue(os.path.exists(self.queue("alpha")))
+        self.ctl("resume")
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,149 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <sqlite3.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "state/store.h"
+#include "tests/unit/state/fixture.h"
+
+namespace fileindexd {
+namespace {
+
+class StoreDamageTest : public StateTest {
+ protected:
+  StoreDamageTest() : database(state_root + "/state.db"), copy(database + ".copy") {
+    const auto store = OpenStore();
+    EXPECT_TRUE(store->AddShare({"a", "/v/a", ""})) << store->Error();
+    EXPECT_TRUE(store->AddFolder("/v/a", {})) << store->Error();
+  }
+
+  static void Sql(const std::string& path, const char* sql) {
+    sqlite3* db = nullptr;
+    ASSERT_EQ(sqlite3_open(path.c_str(), &db), SQLITE_OK);
+    EXPECT_EQ(sqlite3_exec(db, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
+    sqlite3_close(db);
+  }
+
+  void ExpectAllThere(StateStore& store) {
+    std::shared_ptr<const Settings> settings;
+    ASSERT_TRUE(store.GetSettings(settings)) << store.Error();
+    EXPECT_EQ(settings->shares.size(), 1U);
+    EXPECT_EQ(settings->folders.size(), 1U);
+  }
+
+  std::string database;
+  std::string copy;
+};
+
+TEST_F(StoreDamageTest, ANewerVersionIsRefusedByNameAndLeftAlone) {
+  Sql(database, "PRAGMA user_version=99");
+  const std::string before = ReadFile(database);
+  std::string error;
+
+  EXPECT_EQ(StateStore::Open(error), nullptr);
+
+  EXPECT_NE(error.find(database), std::string::npos) << error;
+  EXPECT_NE(error.find("99"), std::string::npos) << error;
+  EXPECT_EQ(ReadFile(database), before);
+}
+
+TEST_F(StoreDamageTest, TheCopyTakesTheDatabasesPlace) {
+  const std::string good = ReadFile(database);
+  std::string scribbled = good;
+  scribbled.replace(4096, scribbled.size() - 4096, scribbled.size() - 4096, '\x5a');
+  std::string no_version = good;
+  no_version.replace(60, 4, 4, '\0');
+  for (const std::string& damaged :
+       {std::string("not a database, but long enough to look like one; ") + std::string(5000, 'x'),
+        std::string(), good.substr(0, 5000), scribbled, no_version,
+        std::string(good.size(), '\0')}) {
+    WriteFile(database, damaged);
+
+    const auto store = OpenStore();
+
+    ASSERT_NE(store, nullptr);
+    ExpectAllThere(*store);
+    EXPECT_EQ(ReadFile(database + ".damaged"), damaged);
+    EXPECT_EQ(ModeOf(database), 0600U);
+  }
+}
+
+TEST_F(StoreDamageTest, AMissingDatabaseBesideItsCopyIsPutBack) {
+  std::filesystem::remove(database);
+  ExpectAllThere(*OpenStore());
+}
+
+TEST_F(StoreDamageTest, TheLogOfADamagedDatabaseIsNotPlayedIntoTheCopy) {
+  auto writer = OpenStore();
+  ASSERT_TRUE(writer->SetPause(5));
+  const std::string log = ReadFile(database + "-wal");
+  writer.reset();
+  ASSERT_FALSE(log.empty());
+  WriteFile(database, std::string(8192, 'x'));
+  WriteFile(database + "-wal", log);
+
+  ExpectAllThere(*OpenStore());
+  EXPECT_TRUE(ReadFile(database + ".damaged-wal") == log);  // too long to be printed
+}
+
+TEST_F(StoreDamageTest, WithoutASoundCopyItFailsAndRebuildsNothing) {
+  const std::string garbage(8192, 'x');
+  for (const std::string& bad_copy : {garbage, std::string(), ReadFile(copy).substr(0, 5000)}) {
+    WriteFile(database, garbage);
+    WriteFile(copy, bad_copy);
+    std::string error;
+
+    EXPECT_EQ(StateStore::Open(error), nullptr);
+    EXPECT_NE(error.find(database), std::string::npos) << error;
+    EXPECT_EQ(ReadFile(database), garbage);
+  }
+  std::filesystem::remove(copy);
+  std::string error;
+  EXPECT_EQ(StateStore::Open(error), nullptr);
+  EXPECT_EQ(ReadFile(database), garbage);
+}
+
+TEST_F(StoreDamageTest, AnOpenStoreFollowsADatabaseThatWasReplaced) {
+  const auto old = OpenStore();
+  ExpectAllThere(*old);
+  std::filesystem::rename(database, database + ".aside");
+  std::filesystem::remove(database + "-wal");
+  std::filesystem::remove(database + "-shm");
+  ASSERT_TRUE(OpenStore()->AddFolder("/v/a/new", {}));
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(old->GetSettings(settings)) << old->Error();
+  EXPECT_EQ(settings->folders.size(), 2U);
+}
+
+TEST_F(StoreDamageTest, TheCopyHoldsTheLastChangeAndStandsAlone) {
+  const auto store = OpenStore();
+  ASSERT_TRUE(store->SetPause(1234));
+  EXPECT_EQ(ModeOf(copy), 0600U);
+
+  // Opened elsewhere, with no log beside it.
+  const std::string other = folder + "/other";
+  std::filesystem::create_directories(other);
+  std::filesystem::copy_file(copy, other + "/state.db");
+  setenv("FILEINDEXD_STATE_DIR", other.c_str(), 1);
+  int64_t resume_time = 0;
+  const auto second = OpenStore();
+  ASSERT_TRUE(second->GetPause(resume_time)) << second->Error();
+  EXPECT_EQ(resume_time, 1234);
+  ExpectAllThere(*second);
+}
+
+TEST_F(StoreDamageTest, ACopyThatCannotBeLeftDoesNotFailTheChange) {
+  std::filesystem::remove(copy);
+  std::filesystem::create_directories(copy + "/in/its/place");
+  const auto store = OpenStore();
+  EXPECT_TRUE(store->SetPause(5)) << store->Error();
+  int64_t resume_time = 0;
+  ASSERT_TRUE(store->GetPause(resume_time));
+  EXPECT_EQ(resume_time, 5);
+}
+
+}  // namespace
+}  // namespace fileindexd
