@@ -24,9 +24,11 @@ class FullStateDiskTest(FilesystemTest):
 
     def test_full_while_indexing(self):
         self.make_files(self.root, *(f"d{n % 40}/name of file {n}.txt" for n in range(FILES)))
+        pid = self.start()
+        self.assertEqual(self.command("pause"), 0)
         self.add_share()
         self.fill(namespace.DISK)
-        pid = self.start()
+        self.assertEqual(self.command("resume"), 0)
         self.await_line("Worker[alpha] finished all task, stopping")
         os.unlink(f"{namespace.DISK}/filler")
 

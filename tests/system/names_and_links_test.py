@@ -87,7 +87,7 @@ class Names(FilesystemTest):
         path = self.root
         while len(path) < LONGEST:
             path += "/d"
-        os.makedirs(path)
+            os.mkdir(path)
 
         self.begin()
 

@@ -96,10 +96,14 @@ class SearchTest(IndexTest):
         self.assertEqual(len(self.hits("beach")), 5)
 
     def test_minus_in_front_belongs_to_the_query(self):
-        found = self.hits("beach", "-boys")
+        self.make_files(self.root, "minus -x.txt", "two --json.txt")
+        self.ctl("reindex", self.root)
+        self.await_drained("alpha")
 
-        self.assertNotIn("alpha/music/beach boys.mp3", found)
-        self.assertEqual(len(found), 4)
+        for words in (("minus", "-x"), ("-x", "minus"), ("--", "minus", "-x"), ("minus -x",)):
+            with self.subTest(words=words):
+                self.assertEqual(self.hits(*words), ["alpha/minus -x.txt"])
+        self.assertEqual(self.hits("--", "two", "--json"), ["alpha/two --json.txt"])
 
     def test_what_is_refused(self):
         for arguments in (
