@@ -91,7 +91,7 @@ int Verify(const Arguments& arguments) {
       },
       comparison, error);
   if (!compared && written) {
-    return Fail(EXIT_FAILED, "%s: %s", share->name.c_str(), error.c_str());
+    return Fail(EXIT_FAILED, "%s", error.c_str());
   }
   return comparison.differences == 0 ? EXIT_DONE : EXIT_FAILED;
 }

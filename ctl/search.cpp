@@ -63,7 +63,8 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
     const bool named = !arguments.in_share || share.name == *arguments.in_share;
     const bool reached = question.under.empty() || Covers(question.under, share.path) ||
                          Covers(share.path, question.under);
-    if (named && reached) {
+    // A share without an index yet holds nothing to find: that is no failure.
+    if (named && reached && !IsDirectoryGone(IndexPath(share.name))) {
       question.shares.push_back(share.name);
     }
   }
