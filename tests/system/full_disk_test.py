@@ -2,11 +2,15 @@
 """Full disks: nothing is lost for good, and the index is whole once there is space again."""
 
 import os
+import re
 
 from harness import main, namespace
 from harness.filesystems import CREATE, REINDEX, FilesystemTest
 
 FILES = 3000
+ENDED = re.compile(
+    r"Worker\[alpha\] (finished all task, stopping|stopped while processing command queue)"
+)
 
 
 class FullStateDiskTest(FilesystemTest):
@@ -29,7 +33,7 @@ class FullStateDiskTest(FilesystemTest):
         self.add_share()
         self.fill(namespace.DISK)
         self.assertEqual(self.command("resume"), 0)
-        self.await_line("Worker[alpha] finished all task, stopping")
+        self.await_line(ENDED)
         os.unlink(f"{namespace.DISK}/filler")
 
         self.make_files(self.root, "late.txt")
@@ -89,6 +93,8 @@ class FullShareTest(FilesystemTest):
         self.make_files(self.root, "c.txt")
         self.event(CREATE, "c.txt")
         self.check()
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertIs(share["no_space"], False)
 
 
 if __name__ == "__main__":
