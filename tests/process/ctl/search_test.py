@@ -60,7 +60,9 @@ class SearchTest(IndexTest):
         everything = self.ctl("search", "beach").out.splitlines()
         self.assertEqual(len(everything), 5)
 
-        self.assertEqual(self.ctl("search", "--limit", "2", "beach").out.splitlines(), everything[:2])
+        self.assertEqual(
+            self.ctl("search", "--limit", "2", "beach").out.splitlines(), everything[:2]
+        )
         rest = self.ctl("search", "--offset", "2", "beach").out.splitlines()
         self.assertEqual(rest, everything[2:])
         self.assertEqual(self.ctl("search", "--limit", "0", "beach").out, b"")
@@ -71,8 +73,12 @@ class SearchTest(IndexTest):
         self.ctl("reindex", self.root)
         self.await_drained("alpha")
 
-        self.assertEqual(len(self.ctl("search", "--under", f"{self.root}/many", "txt").out.splitlines()), 20)
-        self.assertEqual(self.ctl("search", "--count", "--under", f"{self.root}/many", "txt").out, b"30\n")
+        self.assertEqual(
+            len(self.ctl("search", "--under", f"{self.root}/many", "txt").out.splitlines()), 20
+        )
+        self.assertEqual(
+            self.ctl("search", "--count", "--under", f"{self.root}/many", "txt").out, b"30\n"
+        )
 
     def test_json(self):
         hits = self.ctl("search", "--json", "budget").objects()

@@ -77,6 +77,8 @@ def expected_entries(root, folders=None, left_out=()):
             if any(path == folder or path.startswith(folder + b"/") for folder in covering):
                 found[path] = _describe(path, info)
             if stat.S_ISDIR(mode) and (path == root or path not in mounts):
-                children = {path + b"/" + name for name in os.listdir(path) if not _is_left_out(name)}
+                children = {
+                    path + b"/" + name for name in os.listdir(path) if not _is_left_out(name)
+                }
                 pending += children - left_out
     return found
