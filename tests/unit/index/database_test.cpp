@@ -220,7 +220,7 @@ TEST_F(DatabaseTest, FreedPagesGoBack) {
     Commit();
   }
   Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
-  EXPECT_LT(std::filesystem::file_size(file), before - 500000);
+  EXPECT_LT(std::filesystem::file_size(file), before - 200000);
 }
 
 }  // namespace fileindexd
