@@ -19,6 +19,7 @@ class EntryReader {
 
   struct Summary {
     uint64_t entries = 0;
+    uint64_t wanted = 0;      // those whose content is wanted
     int64_t last_commit = 0;  // seconds since the epoch; 0: none yet
   };
   bool Summarise(Summary& summary);

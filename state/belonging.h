@@ -49,7 +49,7 @@ struct Look {
   uint32_t owner = 0;
   uint32_t group = 0;
   uint32_t mode = 0;      // permission bits
-  uint64_t mount_id = 0;  // of the mount that shows the thing
+  uint64_t mount_id = 0;  // of the mount that shows the thing; to be compared with other looks only
   uint64_t device = 0;
 };
 

@@ -54,8 +54,10 @@ class StateStore {
   bool SetFolder(const std::string& path, const ContentFlags& wanted);
   bool RemoveFolder(const std::string& path);
 
+  // Both fail for a share that is not registered.
   bool GetStatus(const std::string& share, ShareStatus& status);
   // Changes what `change` changes, in one transaction; writes nothing when it changes nothing.
+  // `change` is called at most once, under the store's mutex: it must not use the store.
   bool UpdateStatus(const std::string& share, const std::function<void(ShareStatus&)>& change);
 
   // Seconds since the epoch, 0 without end, -1 not paused (as on first use).

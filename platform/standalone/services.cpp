@@ -3,7 +3,6 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <sys/file.h>
-#include <sys/pidfd.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -138,6 +137,15 @@ int StartService(const std::string& name) {
   return 0;
 }
 
+// The C library's own header declares these two without C linkage.
+int OpenPidFd(pid_t process) {
+  return static_cast<int>(syscall(SYS_pidfd_open, process, 0));
+}
+
+bool SendSignal(int pid_fd, int number) {
+  return syscall(SYS_pidfd_send_signal, pid_fd, number, nullptr, 0) == 0;
+}
+
 // 1 when the process has ended within the time.
 int AwaitExit(int pid_fd, int timeout_ms) {
   pollfd waiting = {pid_fd, POLLIN, 0};
@@ -154,18 +162,18 @@ int StopService(const std::string& name) {
     return 0;
   }
 
-  const ScopedFd target(pidfd_open(process, 0));
+  const ScopedFd target(OpenPidFd(process));
   if (target.fd < 0) {
     return errno == ESRCH ? 0 : FI_FAIL();
   }
-  if (pidfd_send_signal(target.fd, SIGTERM, nullptr, 0) != 0) {
+  if (!SendSignal(target.fd, SIGTERM)) {
     return errno == ESRCH ? 0 : FI_FAIL();
   }
   if (AwaitExit(target.fd, STOP_WAIT_MS) == 1) {
     return 0;
   }
 
-  (void)pidfd_send_signal(target.fd, SIGKILL, nullptr, 0);
+  (void)SendSignal(target.fd, SIGKILL);
   if (AwaitExit(target.fd, KILL_WAIT_MS) != 1) {
     errno = ETIMEDOUT;
     return FI_FAIL();

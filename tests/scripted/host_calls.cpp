@@ -36,6 +36,15 @@ bool Fails(const char* name) {
   return error.has_value();
 }
 
+using CondWait = int(pthread_cond_t*, pthread_mutex_t*);
+
+[[gnu::noinline]] CondWait* EnterCondWait(const pthread_cond_t* cond) {
+  if (cond != &TheScript().changed) {
+    TheScript().EnterUnrecorded("pthread_cond_wait", "");
+  }
+  return Library<CondWait>("pthread_cond_wait", nullptr);
+}
+
 }  // namespace
 
 extern "C" {
@@ -130,6 +139,14 @@ int pthread_timedjoin_np(pthread_t thread, void** result, const timespec* until)
     clock_gettime(CLOCK_REALTIME, &limit);
   }
   return Library("pthread_timedjoin_np", pthread_timedjoin_np)(thread, result, &limit);
+}
+
+// Told about, so that a test knows that a thread waits: once it has the thread's mutex itself.
+// Not instrumented: a cancelled thread unwinds through this frame, and the address sanitizer takes
+// what such a frame leaves on the stack for an overflow.
+[[gnu::no_sanitize("address")]] int pthread_cond_wait(pthread_cond_t* cond,
+                                                      pthread_mutex_t* mutex) {
+  return EnterCondWait(cond)(cond, mutex);
 }
 
 }  // extern "C"

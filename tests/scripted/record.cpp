@@ -50,6 +50,10 @@ bool Script::AwaitCall(const std::string& part, size_t times) {
   });
 }
 
+bool Script::AwaitCount(const std::string& operation, int count) {
+  return Await([&] { return counts[operation] >= count; });
+}
+
 bool Script::AwaitBlocked() {
   return Await([&] { return blocked > 0; });
 }

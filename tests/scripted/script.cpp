@@ -167,6 +167,7 @@ std::optional<int> Script::EnterUnrecorded(const std::string& operation,
   {
     const MutexGuard lock(&mutex);
     plan = Count(operation, subject);
+    pthread_cond_broadcast(&changed);
   }
   for (const auto& action : plan.run) {
     action();

@@ -79,6 +79,7 @@ class Script {
   // Wait for an event; false when the limit passes first. A line or call matches by a part of it.
   bool AwaitLine(const std::string& part, size_t times = 1);
   bool AwaitCall(const std::string& part, size_t times = 1);
+  bool AwaitCount(const std::string& operation, int count);
   bool AwaitBlocked();
 
   std::vector<std::string> Calls();

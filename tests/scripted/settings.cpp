@@ -85,7 +85,10 @@ bool IsFullPathIndexed(const std::string& path, const std::vector<Folder>& folde
 }  // namespace IndexMgr
 
 Json::Value GetMostSuitableCfg(std::vector<Folder> folders, const std::string& path) {
-  TheScript().Enter("GetMostSuitableCfg", path, path);
+  const auto answer = TheScript().Enter("GetMostSuitableCfg", path, path);
+  if (answer && *answer == 0) {
+    return Json::Value(Json::nullValue);
+  }
   const Folder* best = nullptr;
   for (const Folder& folder : folders) {
     if (Covers(folder, path) && (best == nullptr || folder.path.size() > best->path.size())) {

@@ -17,7 +17,7 @@ class CommandsTest(MachineTest):
         self.assertEqual(self.command(kind, **data), reply)
 
         end = self.await_line(f"Replying socket: {reply}", after)
-        seen = self.log.texts(after)[: end - after]
+        seen = self.log.texts(after, end)
         self.assertRegex(seen[0], rf'Got command: .*"{kind}"')
         self.assertEqual(seen[1:-1], lines)
 

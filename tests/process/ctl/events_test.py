@@ -97,6 +97,7 @@ class EventsTest(IndexTest):
         self.assertEqual(os.stat(self.queue("alpha")).st_mode & 0o777, 0o600)
 
     def test_locked_queue_is_waited_for_but_not_for_ever(self):
+        os.makedirs(os.path.dirname(self.queue("alpha")), exist_ok=True)
         with open(self.queue("alpha"), "wb") as file:
             fcntl.flock(file, fcntl.LOCK_EX)
 

@@ -19,7 +19,7 @@ from harness.system_log import PREFIX, SystemLog
 PID_FILE = "/run/fileindexd.pid"
 SERVICE_PID_FILE = "/run/talocontentsearchd.pid"
 QUEUE = "TALO@file_index_queue"
-LOG_ERR_OF_USERS = 8 + 3  # facility "user", priority "err"
+LOG_ERR = 3
 SANITIZERS = ("ASAN_OPTIONS", "LSAN_OPTIONS", "TSAN_OPTIONS", "UBSAN_OPTIONS")
 NUDGE_SECONDS = 10.0  # after which a queue that nobody took is touched again
 
@@ -86,7 +86,7 @@ class MachineTest(unittest.TestCase):
     def _check_lines(self):
         for line in self.log.lines:
             if line.program == "fileindexd" and self.prefixed:
-                self.assertEqual(line.priority, LOG_ERR_OF_USERS, line)
+                self.assertEqual(line.priority, LOG_ERR, line)
                 self.assertRegex(line.message, PREFIX, line)
 
     def run(self, result=None):
@@ -123,6 +123,17 @@ class MachineTest(unittest.TestCase):
 
     def daemon_pid(self):
         with open(PID_FILE, encoding="ascii") as file:
+            return int(file.read())
+
+    def service_pid(self):
+        """The content service's pid, once it has written it down."""
+        self.await_file(SERVICE_PID_FILE)
+
+        def written():
+            return os.path.getsize(SERVICE_PID_FILE) > 0
+
+        self.assertTrue(await_in_folder(SERVICE_PID_FILE, written))
+        with open(SERVICE_PID_FILE, encoding="ascii") as file:
             return int(file.read())
 
     def detached_pid(self):

@@ -1,5 +1,8 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
-"""The system log as the programs see it: /dev/log, always drained."""
+"""The system log as the programs see it: /dev/log, always drained.
+
+Searched are the lines of one program, the daemon's; printed are all.
+"""
 
 import dataclasses
 import os
@@ -16,7 +19,7 @@ PREFIX = re.compile(r"[a-z/_]+\.cpp:\d+ ")
 
 @dataclasses.dataclass
 class Line:
-    priority: int
+    priority: int  # without the facility
     program: str
     message: str  # with the source's prefix; bytes that are not UTF-8 as surrogates
 
@@ -28,7 +31,7 @@ class Line:
 
 
 class SystemLog:
-    def __init__(self, path="/dev/log"):
+    def __init__(self, path="/dev/log", program="fileindexd"):
         if os.path.lexists(path):
             os.unlink(path)
         self.socket = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
@@ -36,6 +39,7 @@ class SystemLog:
         self.socket.bind(path)
         os.chmod(path, 0o666)
         self.path = path
+        self.program = program
         self.lines = []
         self.changed = threading.Condition()
         self.thread = threading.Thread(target=self._drain, daemon=True)
@@ -48,7 +52,7 @@ class SystemLog:
                 return  # the end that close() sends
             text = datagram.rstrip(b"\0\n").decode("utf-8", "surrogateescape")
             match = LINE.fullmatch(text)
-            line = Line(int(match[1]), match[2], match[3]) if match else Line(-1, "?", text)
+            line = Line(int(match[1]) % 8, match[2], match[3]) if match else Line(-1, "?", text)
             with self.changed:
                 self.lines.append(line)
                 self.changed.notify_all()
@@ -66,9 +70,9 @@ class SystemLog:
         with self.changed:
             return len(self.lines)
 
-    def texts(self, after=0):
+    def texts(self, after=0, before=None):
         with self.changed:
-            return [line.text for line in self.lines[after:]]
+            return [line.text for line in self.lines[after:before] if line.program == self.program]
 
     def find(self, wanted, after=0, count=1, limit=LIMIT):
         """Position behind the count-th line with that text; None when it does not come.
@@ -82,7 +86,7 @@ class SystemLog:
             while True:
                 for line in self.lines[position:]:
                     position += 1
-                    if matches(line.text):
+                    if line.program == self.program and matches(line.text):
                         count -= 1
                         if count == 0:
                             return position

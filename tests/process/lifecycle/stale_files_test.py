@@ -99,8 +99,7 @@ class StaleFilesTest(MachineTest):
 
     def test_stop_of_a_service_that_was_killed(self):
         pid = self.start()
-        with open("/run/talocontentsearchd.pid", encoding="ascii") as file:
-            service = int(file.read())
+        service = self.service_pid()
         os.kill(service, signal.SIGKILL)
         self.await_exit(service)
 

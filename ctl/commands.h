@@ -1,0 +1,64 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The commands, and what the command line gave them.
+//
+// Each takes the arguments as they were written, writes its results and its error line, and returns
+// the exit code (output.h).
+#pragma once
+
+#include <optional>
+#include <string>
+
+namespace fileindexd {
+
+// Filled by the command line; a command reads those that it has. None: not given.
+struct Arguments {
+  std::string share;
+  std::string path;
+  std::string code;   // of an event
+  std::string level;  // "debug" or "error"
+  std::string query;
+  std::optional<std::string> path_old;
+  std::optional<std::string> data;
+  std::optional<std::string> until;
+  std::optional<std::string> duration;
+  std::optional<std::string> in_share;
+  std::optional<std::string> kind;
+  std::optional<std::string> under;
+  std::optional<std::string> limit;
+  std::optional<std::string> offset;
+  std::optional<bool> document;
+  std::optional<bool> audio;
+  std::optional<bool> video;
+  std::optional<bool> photo;
+  bool all = false;
+  bool json = false;
+  bool count = false;
+  bool nul_ended = false;
+};
+
+using Command = int (*)(const Arguments& arguments);
+
+int ShareAdd(const Arguments& arguments);
+int ShareRemove(const Arguments& arguments);
+int ShareList(const Arguments& arguments);
+
+int FolderAdd(const Arguments& arguments);
+int FolderSet(const Arguments& arguments);
+int FolderRemove(const Arguments& arguments);
+int FolderList(const Arguments& arguments);
+
+int Reindex(const Arguments& arguments);
+int Event(const Arguments& arguments);
+
+int Pause(const Arguments& arguments);
+int Resume(const Arguments& arguments);
+int LogLevel(const Arguments& arguments);
+int WorkerDrop(const Arguments& arguments);
+int WorkerRevive(const Arguments& arguments);
+
+int Status(const Arguments& arguments);
+int Search(const Arguments& arguments);
+int Dump(const Arguments& arguments);
+int Verify(const Arguments& arguments);
+
+}  // namespace fileindexd

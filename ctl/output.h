@@ -1,0 +1,61 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What fileindexctl writes: results to standard output, through a big buffer; errors to standard
+// error, one line each. One thread.
+#pragma once
+
+#include <json/value.h>
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace fileindexd {
+
+constexpr int EXIT_DONE = 0;
+constexpr int EXIT_FAILED = 1;
+constexpr int EXIT_USAGE = 2;
+constexpr int EXIT_NO_DAEMON = 3;
+
+// Once, before anything is opened or written: the three standard descriptors exist, so that no
+// database is opened under the number of standard output; a closed pipe comes as an error.
+void PrepareStreams();
+
+// Writes the line "fileindexctl: …" and returns `code`. Control characters are shown as "\xNN", so
+// that a file's name cannot break the line.
+[[gnu::format(printf, 2, 3)]] int Fail(int code, const char* format, ...);
+
+// Each is false once writing has failed: the caller may stop then. FinishOutput tells of it.
+bool Put(std::string_view bytes);
+bool PutLine(std::string_view bytes, char end = '\n');
+bool PutJson(const Json::Value& value);  // on one line
+
+// Writes out what is buffered. `code`, or EXIT_FAILED with its line when anything was not written.
+int FinishOutput(int code);
+
+// Sets `key` to the path; when it is not UTF-8, its bad bytes are replaced and `key`_hex holds all
+// bytes in lower-case hexadecimal digits.
+void SetPath(Json::Value& object, const std::string& path, const std::string& key = "path");
+
+// Compact JSON text. Bytes that are not UTF-8 stay as they are.
+std::string ToText(const Json::Value& value);
+
+// "2031-01-31 08:15:00", local.
+std::string LocalTime(int64_t seconds);
+
+// The whole seconds of a time in nanoseconds, rounded down.
+int64_t WholeSeconds(int64_t nanoseconds);
+
+// The text with its control characters shown as "\xNN".
+std::string Printable(std::string_view text);
+
+// A word about long work, on standard error if that is a terminal. Gone when anything else is
+// written, or it is destroyed. One at a time.
+class Progress {
+ public:
+  explicit Progress(const std::string& text);
+  Progress(const Progress&) = delete;
+  Progress& operator=(const Progress&) = delete;
+  ~Progress();
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,213 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "ctl/values.h"
+
+#include <algorithm>
+#include <charconv>
+#include <ctime>
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t MAX_DURATION = int64_t{100000} * 24 * 60 * 60;  // seconds
+
+template <typename Number>
+std::optional<Number> WholeNumber(std::string_view text) {
+  Number number = 0;
+  const char* end = text.data() + text.size();
+  const auto [stop, error] = std::from_chars(text.data(), end, number);
+  if (error != std::errc() || stop != end) {
+    return std::nullopt;
+  }
+
+  return number;
+}
+
+// Reads a text from its front.
+struct Scanner {
+  bool Take(char wanted) {
+    if (rest.empty() || rest.front() != wanted) {
+      return false;
+    }
+
+    rest.remove_prefix(1);
+    return true;
+  }
+
+  // Exactly `digits` digits, within [low, high].
+  bool TakeNumber(size_t digits, int low, int high, int& number) {
+    if (rest.size() < digits || !IsDigits(rest.substr(0, digits))) {
+      return false;
+    }
+
+    const int taken = *WholeNumber<int>(rest.substr(0, digits));
+    if (taken < low || taken > high) {
+      return false;
+    }
+
+    number = taken;
+    rest.remove_prefix(digits);
+    return true;
+  }
+
+  static bool IsDigits(std::string_view text) {
+    return !text.empty() && text.find_first_not_of("0123456789") == std::string_view::npos;
+  }
+
+  std::string_view rest;
+};
+
+int DaysInMonth(int year, int month) {
+  constexpr int DAYS[] = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
+  const bool leap = (year % 4 == 0 && year % 100 != 0) || year % 400 == 0;
+  return month == 2 && leap ? 29 : DAYS[month - 1];
+}
+
+bool TakeDate(Scanner& scanner, std::tm& time) {
+  int year = 0;
+  int month = 0;
+  if (!scanner.TakeNumber(4, 1, 9999, year) || !scanner.Take('-') ||
+      !scanner.TakeNumber(2, 1, 12, month) || !scanner.Take('-') ||
+      !scanner.TakeNumber(2, 1, DaysInMonth(year, month), time.tm_mday)) {
+    return false;
+  }
+
+  time.tm_year = year - 1900;
+  time.tm_mon = month - 1;
+  return true;
+}
+
+bool TakeClock(Scanner& scanner, std::tm& time) {
+  if (!scanner.TakeNumber(2, 0, 23, time.tm_hour) || !scanner.Take(':') ||
+      !scanner.TakeNumber(2, 0, 59, time.tm_min)) {
+    return false;
+  }
+  if (!scanner.Take(':')) {
+    return true;
+  }
+
+  if (!scanner.TakeNumber(2, 0, 60, time.tm_sec)) {  // 60: a leap second
+    return false;
+  }
+  if (!scanner.Take('.')) {
+    return true;
+  }
+
+  const size_t digits = std::min(scanner.rest.find_first_not_of("0123456789"), scanner.rest.size());
+  scanner.rest.remove_prefix(digits);
+  return digits > 0;
+}
+
+// The zone that ends the text: seconds east of Greenwich. The text is not empty.
+bool TakeZone(Scanner& scanner, int64_t& east) {
+  if (scanner.Take('Z') || scanner.Take('z')) {
+    east = 0;
+    return true;
+  }
+
+  const bool west = scanner.Take('-');
+  int hours = 0;
+  int minutes = 0;
+  if ((!west && !scanner.Take('+')) || !scanner.TakeNumber(2, 0, 23, hours)) {
+    return false;
+  }
+  const bool colon = scanner.Take(':');
+  if ((colon || !scanner.rest.empty()) && !scanner.TakeNumber(2, 0, 59, minutes)) {
+    return false;
+  }
+
+  east = (west ? -1 : 1) * (hours * 3600 + minutes * 60);
+  return true;
+}
+
+}  // namespace
+
+std::optional<int64_t> ParseTime(std::string_view text) {
+  if (const std::optional<int64_t> seconds = WholeNumber<int64_t>(text)) {
+    return seconds;
+  }
+
+  Scanner scanner{text};
+  std::tm time = {};
+  time.tm_isdst = -1;
+  if (!TakeDate(scanner, time)) {
+    return std::nullopt;
+  }
+  if (scanner.rest.empty()) {
+    return std::mktime(&time);
+  }
+  if ((!scanner.Take('T') && !scanner.Take(' ')) || !TakeClock(scanner, time)) {
+    return std::nullopt;
+  }
+  if (scanner.rest.empty()) {
+    return std::mktime(&time);
+  }
+
+  int64_t east = 0;
+  if (!TakeZone(scanner, east) || !scanner.rest.empty()) {
+    return std::nullopt;
+  }
+
+  return int64_t{timegm(&time)} - east;
+}
+
+std::optional<int64_t> ParseDuration(std::string_view text) {
+  if (text.size() < 2 || !Scanner::IsDigits(text.substr(0, text.size() - 1))) {
+    return std::nullopt;
+  }
+
+  int64_t unit = 0;
+  switch (text.back()) {
+    case 's':
+      unit = 1;
+      break;
+    case 'm':
+      unit = 60;
+      break;
+    case 'h':
+      unit = 60 * 60;
+      break;
+    case 'd':
+      unit = 24 * 60 * 60;
+      break;
+    default:
+      return std::nullopt;
+  }
+
+  const std::optional<int64_t> number = WholeNumber<int64_t>(text.substr(0, text.size() - 1));
+  if (!number || *number > MAX_DURATION / unit) {
+    return std::nullopt;
+  }
+
+  return *number * unit;
+}
+
+std::optional<uint64_t> ParseCount(std::string_view text) {
+  return Scanner::IsDigits(text) ? WholeNumber<uint64_t>(text) : std::nullopt;
+}
+
+SearchArguments SplitSearchArguments(const std::vector<std::string>& arguments,
+                                     const std::vector<std::string>& valued) {
+  SearchArguments split;
+  for (auto argument = arguments.begin(); argument != arguments.end(); ++argument) {
+    if (*argument == "--") {
+      split.words.insert(split.words.end(), argument + 1, arguments.end());
+      break;
+    }
+
+    if (*argument != "-0" && !argument->starts_with("--")) {
+      split.words.push_back(*argument);
+      continue;
+    }
+
+    split.options.push_back(*argument);
+    const bool takes_value = std::find(valued.begin(), valued.end(), *argument) != valued.end();
+    if (takes_value && argument + 1 != arguments.end()) {
+      // Joined, so that a value with '-' in front is not taken for another option.
+      split.options.back() += "=" + *++argument;
+    }
+  }
+  return split;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,394 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/converger.h"
+
+#include <ctime>
+
+#include "index/disk_walk.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int SLICE = 500;  // rows
+// Comparing a new name with all others of its inode is quadratic in their number.
+constexpr uint64_t MANY_LINKS = 1000;
+constexpr size_t LOOKED_AT_LIMIT = 10000;
+
+int64_t Now() {
+  timespec now{};
+  clock_gettime(CLOCK_REALTIME, &now);
+  return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
+}
+
+bool Decides(Kind kind, const ContentFlags& decide) {
+  return IsContentWanted(kind, decide);
+}
+
+Entry EntryOf(const std::string& path, const Look& look) {
+  Entry entry;
+  entry.path = path;
+  entry.thing = look.thing;
+  entry.inode = look.inode;
+  entry.ctime = look.ctime;
+  entry.birth_time = look.birth_time;
+  entry.owner = look.owner;
+  entry.group = look.group;
+  entry.mode = look.mode;
+  if (look.thing == Thing::DIRECTORY) {
+    entry.kind = Kind::FOLDER;
+    return entry;
+  }
+
+  entry.size = look.size;
+  entry.mtime = look.mtime;
+  entry.kind = look.thing == Thing::FILE ? KindOfName(LastComponent(path)) : Kind::OTHER;
+  return entry;
+}
+
+bool IsOtherThing(const Entry& known, const Entry& seen) {
+  return known.thing != seen.thing || known.inode != seen.inode ||
+         (known.birth_time != 0 && seen.birth_time != 0 && known.birth_time != seen.birth_time);
+}
+
+// A directory's change time moves with every name in it, and is not worth a write.
+bool IsSame(const Entry& known, const Entry& seen) {
+  return known.thing == seen.thing && known.kind == seen.kind &&
+         known.content_wanted == seen.content_wanted && known.inode == seen.inode &&
+         known.size == seen.size && known.mtime == seen.mtime &&
+         known.birth_time == seen.birth_time && known.owner == seen.owner &&
+         known.group == seen.group && known.mode == seen.mode &&
+         (known.ctime == seen.ctime || known.thing == Thing::DIRECTORY);
+}
+
+}  // namespace
+
+IndexError Converger::Sql(int code) {
+  sql_failed = code != SQLITE_OK;
+  return FromSqlite(code);
+}
+
+IndexError Converger::CheckRoot() {
+  switch (LookAtRoot(*share)) {
+    case RootState::SOUND:
+      return IndexError::NONE;
+    case RootState::MISSING:
+    case RootState::FOREIGN:
+      mount_known = false;
+      return IndexError::ROOT;
+    case RootState::UNKNOWN:
+      break;
+  }
+  mount_known = false;
+  return IndexError::IO;
+}
+
+IndexError Converger::CheckMount(const Look& look) {
+  if (mount_known && look.mount_id == mount_id && look.device == device) {
+    return IndexError::NONE;
+  }
+
+  const IndexError error = CheckRoot();
+  if (error == IndexError::NONE) {
+    mount_known = true;
+    mount_id = look.mount_id;
+    device = look.device;
+  }
+  return error;
+}
+
+IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
+                              const std::string& path, const ContentFlags& wanted,
+                              const ContentFlags& decide) {
+  settings = &in_force;
+  share = &in_share;
+  sql_failed = false;
+  const Look look = LookAt(*settings, path);
+  switch (look.verdict) {
+    case Verdict::BELONGS:
+      return Settle(path, look, wanted, decide);
+    case Verdict::UNKNOWN:
+      return IndexError::IO;
+    case Verdict::BAD_PATH:
+    case Verdict::NO_SHARE:
+      return IndexError::NONE;
+    default:
+      break;
+  }
+
+  const IndexError error = RemoveAt(path, look.verdict == Verdict::GONE);
+  return error == IndexError::NONE ? RemoveBelow(path, false) : error;
+}
+
+IndexError Converger::Settle(const std::string& path, const Look& look, const ContentFlags& wanted,
+                             const ContentFlags& decide) {
+  Outcome outcome = Outcome::SAME;
+  IndexError error = Put(path, look, wanted, decide, outcome);
+  if (error == IndexError::NONE && look.links > 1 && look.thing == Thing::FILE &&
+      outcome != Outcome::SAME) {
+    error = RefreshTwins(path, look, outcome == Outcome::NEW);
+  }
+  if (error != IndexError::NONE) {
+    return error;
+  }
+
+  bool look_below = outcome == Outcome::REPLACED;
+  if (outcome == Outcome::NEW) {
+    // Entries below without one here: left by a deletion of this entry alone.
+    error = Sql(table.HasBelow(PathRange(path), look_below));
+    if (error != IndexError::NONE) {
+      return error;
+    }
+  }
+
+  std::vector<std::string> walks;
+  if (look_below && look.thing == Thing::DIRECTORY) {
+    walks.push_back(path);
+  }
+  // Without birth times, another directory with the inode of the old one looks the same.
+  const bool doubtful =
+      look.thing == Thing::DIRECTORY && look.birth_time == 0 && outcome != Outcome::NEW;
+  if (look_below || (doubtful && !IsLookedAt(path))) {
+    error = LookBelow(path, walks);
+  }
+  for (size_t i = 0; i < walks.size() && error == IndexError::NONE; ++i) {
+    error = AddBelow(walks[i]);
+  }
+  if (error == IndexError::NONE && doubtful) {
+    if (looked_at.size() >= LOOKED_AT_LIMIT) {
+      looked_at.clear();
+    }
+    if (!IsLookedAt(path)) {
+      looked_at.insert(path);
+    }
+  }
+  return error;
+}
+
+IndexError Converger::Put(const std::string& path, const Look& look, const ContentFlags& wanted,
+                          const ContentFlags& decide, Outcome& outcome) {
+  IndexError error = CheckMount(look);
+  if (error != IndexError::NONE) {
+    return error;
+  }
+
+  Entry known;
+  bool found = false;
+  error = Sql(table.Find(path, known, found));
+  if (error != IndexError::NONE) {
+    return error;
+  }
+  if (found) {
+    return Change(known, look, wanted, decide, outcome);
+  }
+
+  outcome = Outcome::NEW;
+  Entry entry = EntryOf(path, look);
+  entry.first_seen = Now();
+  entry.content_wanted = entry.thing == Thing::FILE && IsContentWanted(entry.kind, wanted);
+  return Sql(table.Insert(entry));
+}
+
+IndexError Converger::Change(const Entry& known, const Look& look, const ContentFlags& wanted,
+                             const ContentFlags& decide, Outcome& outcome) {
+  Entry seen = EntryOf(known.path, look);
+  const bool replaced = IsOtherThing(known, seen);
+  seen.id = known.id;
+  seen.first_seen = replaced ? Now() : known.first_seen;
+  if (seen.thing == Thing::FILE) {
+    const bool anew = replaced || seen.kind != known.kind || Decides(seen.kind, decide);
+    seen.content_wanted = anew ? IsContentWanted(seen.kind, wanted) : known.content_wanted;
+  }
+
+  outcome = Outcome::SAME;
+  if (IsSame(known, seen)) {
+    return IndexError::NONE;
+  }
+  outcome = replaced ? Outcome::REPLACED : Outcome::CHANGED;
+  return Sql(table.Update(seen));
+}
+
+IndexError Converger::RefreshTwins(const std::string& path, const Look& look, bool is_new) {
+  if (is_new && look.links > MANY_LINKS) {
+    return IndexError::NONE;
+  }
+
+  std::vector<std::string> paths;
+  IndexError error = Sql(table.StaleTwins(EntryOf(path, look), paths));
+  for (const std::string& twin : paths) {
+    if (error != IndexError::NONE) {
+      return error;
+    }
+    const Look twin_look = LookAt(*settings, twin);
+    if (twin_look.verdict == Verdict::UNKNOWN) {
+      return IndexError::IO;
+    }
+    if (twin_look.verdict != Verdict::BELONGS) {
+      error = RemoveAt(twin, true);
+      continue;
+    }
+    Outcome ignored = Outcome::SAME;
+    error = Put(twin, twin_look, settings->FolderOfPath(twin)->wanted, {}, ignored);
+  }
+  return error;
+}
+
+// Appends to `replaced` the directories below that are not the ones that were known.
+IndexError Converger::LookBelow(const std::string& path, std::vector<std::string>& replaced) {
+  const PathRange range(path);
+  std::string after = range.first;
+  std::vector<Entry> rows;
+  for (;;) {
+    IndexError error = Sql(table.Slice(after, range.end, SLICE, rows));
+    if (error == IndexError::NONE) {
+      error = SettleSlice(rows, replaced);
+    }
+    if (error != IndexError::NONE || rows.size() < SLICE) {
+      return error;
+    }
+    after = rows.back().path;
+    between();
+  }
+}
+
+IndexError Converger::SettleSlice(const std::vector<Entry>& rows,
+                                  std::vector<std::string>& replaced) {
+  IndexError error = IndexError::NONE;
+  std::vector<Entry> gone;
+  for (const Entry& known : rows) {
+    const Look look = LookAt(*settings, known.path);
+    if (look.verdict == Verdict::UNKNOWN) {
+      return IndexError::IO;
+    }
+    if (look.verdict != Verdict::BELONGS) {
+      gone.push_back(known);
+      continue;
+    }
+
+    Outcome outcome = Outcome::SAME;
+    error = CheckMount(look);
+    if (error == IndexError::NONE) {
+      error = Change(known, look, settings->FolderOfPath(known.path)->wanted, {}, outcome);
+    }
+    if (error != IndexError::NONE) {
+      return error;
+    }
+    if (outcome == Outcome::REPLACED && look.thing == Thing::DIRECTORY) {
+      replaced.push_back(known.path);
+    }
+  }
+
+  if (!gone.empty()) {
+    error = CheckRoot();
+  }
+  for (size_t i = 0; i < gone.size() && error == IndexError::NONE; ++i) {
+    error = Sql(table.Remove(gone[i]));
+  }
+  return error;
+}
+
+// Adds what is missing. What is known below has just been looked at.
+IndexError Converger::AddBelow(const std::string& directory) {
+  DiskWalk walk(*settings);
+  walk.StartBelow(directory);
+  std::string path;
+  Look look;
+  for (int count = 1;; ++count) {
+    const DiskWalk::Step step = walk.Next(path, look);
+    if (step != DiskWalk::Step::FOUND) {
+      return step == DiskWalk::Step::END ? IndexError::NONE : IndexError::IO;
+    }
+
+    Outcome ignored = Outcome::SAME;
+    const IndexError error = Put(path, look, settings->FolderOfPath(path)->wanted, {}, ignored);
+    if (error != IndexError::NONE) {
+      return error;
+    }
+    if (count % SLICE == 0) {
+      between();
+    }
+  }
+}
+
+IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
+                             const std::string& path, DeleteMode mode) {
+  settings = &in_force;
+  share = &in_share;
+  sql_failed = false;
+  if (mode == DeleteMode::ALL) {
+    const IndexError error = RemoveAt(path, true);
+    return error == IndexError::NONE ? RemoveBelow(path, true) : error;
+  }
+
+  const Look look = LookAt(*settings, path);
+  if (look.verdict == Verdict::UNKNOWN) {
+    return IndexError::IO;
+  }
+  IndexError error = IndexError::NONE;
+  if (mode == DeleteMode::ENTRY || look.verdict != Verdict::BELONGS) {
+    error = RemoveAt(path, look.verdict == Verdict::GONE);
+  }
+  return error == IndexError::NONE ? RemoveBelow(path, false) : error;
+}
+
+// `root_counts`: the root is looked at even if no entry stands there.
+IndexError Converger::RemoveAt(const std::string& path, bool root_counts) {
+  Entry known;
+  bool found = false;
+  IndexError error = Sql(table.Find(path, known, found));
+  if (error == IndexError::NONE && (found || root_counts)) {
+    error = CheckRoot();
+  }
+  return error == IndexError::NONE && found ? Sql(table.Remove(known)) : error;
+}
+
+IndexError Converger::RemoveBelow(const std::string& path, bool even_what_belongs) {
+  const PathRange range(path);
+  std::string after = range.first;
+  std::vector<Entry> rows;
+  for (;;) {
+    IndexError error = Sql(table.Slice(after, range.end, SLICE, rows));
+    if (error == IndexError::NONE) {
+      error = RemoveFromSlice(rows, even_what_belongs);
+    }
+    if (error != IndexError::NONE || rows.size() < SLICE) {
+      return error;
+    }
+    after = rows.back().path;
+    between();
+  }
+}
+
+IndexError Converger::RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs) {
+  std::vector<const Entry*> leaving;
+  for (const Entry& known : rows) {
+    Verdict verdict = Verdict::GONE;
+    if (!even_what_belongs) {
+      verdict = LookAt(*settings, known.path).verdict;
+    }
+    if (verdict == Verdict::UNKNOWN) {
+      return IndexError::IO;
+    }
+    if (verdict != Verdict::BELONGS) {
+      leaving.push_back(&known);
+    }
+  }
+
+  IndexError error = leaving.empty() ? IndexError::NONE : CheckRoot();
+  for (size_t i = 0; i < leaving.size() && error == IndexError::NONE; ++i) {
+    error = Sql(table.Remove(*leaving[i]));
+  }
+  return error;
+}
+
+// Only subtrees that hold the path count: a second event for the same directory looks again.
+bool Converger::IsLookedAt(const std::string& path) const {
+  for (size_t slash = path.rfind('/'); slash != std::string::npos && slash != 0;
+       slash = path.rfind('/', slash - 1)) {
+    if (looked_at.contains(path.substr(0, slash))) {
+      return true;
+    }
+  }
+  return looked_at.contains("/");
+}
+
+}  // namespace fileindexd

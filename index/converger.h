@@ -1,0 +1,71 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Brings entries in line with the disk, inside the caller's transaction.
+//
+// Nothing is removed unless the share's root is sound after the path was found gone, and nothing is
+// added from a mount that was not seen below a sound root: an unmounted disk must not empty an
+// index, nor what lies under its mount point fill it. An operation that fails may have changed rows
+// already: `EntryTable::changes` tells, and the caller rolls back.
+#pragma once
+
+#include <functional>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "index/database.h"
+#include "index/entry_table.h"
+#include "index/writer.h"
+
+namespace fileindexd {
+
+class Converger {
+ public:
+  // Both outlive it. `between_slices` may unwind.
+  Converger(EntryTable& rows, const std::function<void()>& between_slices)
+      : table(rows), between(between_slices) {}
+
+  // `path` is normal and lies in `in_share`, one of `in_force`; both stay for the length of the
+  // call.
+  IndexError Refresh(const Settings& in_force, const Share& in_share, const std::string& path,
+                     const ContentFlags& wanted, const ContentFlags& decide);
+  IndexError Delete(const Settings& in_force, const Share& in_share, const std::string& path,
+                    DeleteMode mode);
+
+  bool sql_failed = false;  // whether the last failure was the database's
+
+ private:
+  enum class Outcome { SAME, CHANGED, NEW, REPLACED };
+
+  IndexError Sql(int code);
+  IndexError CheckRoot();
+  IndexError CheckMount(const Look& look);
+
+  IndexError Settle(const std::string& path, const Look& look, const ContentFlags& wanted,
+                    const ContentFlags& decide);
+  IndexError Put(const std::string& path, const Look& look, const ContentFlags& wanted,
+                 const ContentFlags& decide, Outcome& outcome);
+  IndexError Change(const Entry& known, const Look& look, const ContentFlags& wanted,
+                    const ContentFlags& decide, Outcome& outcome);
+  IndexError RefreshTwins(const std::string& path, const Look& look, bool is_new);
+
+  IndexError LookBelow(const std::string& path, std::vector<std::string>& replaced);
+  IndexError SettleSlice(const std::vector<Entry>& rows, std::vector<std::string>& replaced);
+  IndexError AddBelow(const std::string& directory);
+
+  IndexError RemoveAt(const std::string& path, bool root_counts);
+  IndexError RemoveBelow(const std::string& path, bool even_what_belongs);
+  IndexError RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs);
+
+  bool IsLookedAt(const std::string& path) const;
+
+  EntryTable& table;
+  const std::function<void()>& between;
+  const Settings* settings = nullptr;  // of the operation that runs
+  const Share* share = nullptr;
+  bool mount_known = false;
+  uint64_t mount_id = 0;  // last mount and device that were seen below a sound root
+  uint64_t device = 0;
+  std::set<std::string> looked_at;  // subtrees, where the file system has no birth times
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,249 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// DESIGN: the log and its shared memory stay when a connection is closed, and closing does not copy
+// the log back: the daemon opens anew for each commit, and would pay for both each time. The log is
+// copied back when it has grown, at the end of a commit, and then cut to its limit.
+#include "index/database.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <utility>
+
+#include "base/scoped_fd.h"
+#include "index/schema.h"
+#include "index/set_aside.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int BUSY_TIMEOUT_MS = 5000;
+
+// auto_vacuum counts only before the first table. The tables are made before the log is: so the
+// main file's own first page tells from the beginning whose it is.
+constexpr const char* PRAGMAS_FOR_CREATING =
+    "PRAGMA auto_vacuum = INCREMENTAL; PRAGMA synchronous = FULL";
+// Sizes: cache in KiB, checkpoint in pages of 4 KiB, limit in bytes.
+constexpr const char* PRAGMAS_FOR_WRITING =
+    "PRAGMA synchronous = FULL; PRAGMA cache_size = -8192; PRAGMA temp_store = MEMORY;"
+    "PRAGMA wal_autocheckpoint = 2000; PRAGMA journal_size_limit = 16777216";
+constexpr const char* PRAGMAS_FOR_READING = "PRAGMA cache_size = -8192; PRAGMA query_only = 1";
+
+int Execute(sqlite3* db, const char* sql) {
+  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
+}
+
+int ReadNumber(sqlite3* db, const char* sql, int64_t& number) {
+  Statement statement;
+  int code = statement.Prepare(db, sql);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  code = statement.Step();
+  if (code == SQLITE_ROW) {
+    number = statement.Int(0);
+    return SQLITE_OK;
+  }
+  return code == SQLITE_DONE ? SQLITE_ERROR : code;
+}
+
+int OpenFile(const std::string& file, sqlite3*& db) {
+  const int code =
+      sqlite3_open_v2(file.c_str(), &db, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
+  if (db == nullptr) {
+    return SQLITE_NOMEM;
+  }
+
+  sqlite3_extended_result_codes(db, 1);
+  sqlite3_busy_timeout(db, BUSY_TIMEOUT_MS);
+  sqlite3_db_config(db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+  sqlite3_db_config(db, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
+  return code;
+}
+
+void KeepLog(sqlite3* db) {
+  int persist = 1;
+  sqlite3_file_control(db, "main", SQLITE_FCNTL_PERSIST_WAL, &persist);
+}
+
+// NONE when a regular file stands where the database should be.
+IndexError FindFile(const std::string& index_path, const std::string& file) {
+  struct stat status {};
+  if (lstat(index_path.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
+    const bool absent = errno == ENOENT || errno == ENOTDIR;
+    return absent || status.st_mode != 0 ? IndexError::PATH_NOT_FOUND : IndexError::IO;
+  }
+  if (lstat(file.c_str(), &status) != 0) {
+    return errno == ENOENT ? IndexError::PATH_NOT_FOUND : IndexError::IO;
+  }
+
+  // An empty file is a valid database to SQLite, without a schema.
+  return S_ISREG(status.st_mode) && status.st_size > 0 ? IndexError::NONE
+                                                       : IndexError::PATH_NOT_FOUND;
+}
+
+// Whether the open database is ours. Cheap: two numbers and the schema's text.
+IndexError CheckSchema(sqlite3* db) {
+  int64_t application = 0;
+  int64_t version = 0;
+  int64_t entries = 0;
+  int code = ReadNumber(db, "PRAGMA application_id", application);
+  if (code == SQLITE_OK) {
+    code = ReadNumber(db, "PRAGMA user_version", version);
+  }
+  if (code != SQLITE_OK) {
+    return FromSqlite(code);
+  }
+  if (application != ENTRIES_APPLICATION || version != ENTRIES_VERSION) {
+    return IndexError::PATH_NOT_FOUND;
+  }
+
+  code = ReadNumber(db, "SELECT entries FROM meta WHERE id = 1", entries);
+  // Our numbers without our tables: somebody's knife.
+  return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
+}
+
+IndexError OpenExisting(const std::string& index_path, const char* pragmas, sqlite3*& db) {
+  const std::string file = index_path + "/" + ENTRIES_FILE;
+  const IndexError found = FindFile(index_path, file);
+  if (found != IndexError::NONE) {
+    return found;
+  }
+
+  IndexError error = FromSqlite(OpenFile(file, db));
+  if (error == IndexError::NONE) {
+    KeepLog(db);
+    error = CheckSchema(db);
+  }
+  if (error == IndexError::NONE) {
+    error = FromSqlite(Execute(db, pragmas));
+  }
+  if (error != IndexError::NONE) {
+    sqlite3_close_v2(std::exchange(db, nullptr));
+  }
+  return error;
+}
+
+IndexError FromErrno() {
+  return errno == ENOSPC || errno == EDQUOT ? IndexError::FULL : IndexError::IO;
+}
+
+// Made under SQLite's own lock, with the file's mode set first: SQLite gives its log the same.
+IndexError CreateDatabase(const std::string& index_path) {
+  if (!MakeEmptyIndex(index_path)) {
+    return FromErrno();
+  }
+
+  const std::string file = index_path + "/" + ENTRIES_FILE;
+  ScopedFd made(open(file.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+  if (made.fd < 0 || fchmod(made.fd, 0600) != 0) {
+    return FromErrno();
+  }
+  made.Close();
+
+  sqlite3* db = nullptr;
+  int code = OpenFile(file, db);
+  for (const char* sql : {PRAGMAS_FOR_CREATING, "BEGIN EXCLUSIVE", ENTRIES_SCHEMA, "COMMIT",
+                          "PRAGMA journal_mode = WAL"}) {
+    if (code == SQLITE_OK) {
+      code = Execute(db, sql);
+    }
+  }
+  if (code == SQLITE_OK) {
+    KeepLog(db);
+  }
+  sqlite3_close_v2(db);
+  return FromSqlite(code);
+}
+
+}  // namespace
+
+IndexError FromSqlite(int code) {
+  if (code == SQLITE_IOERR_NOMEM) {
+    return IndexError::NO_MEMORY;
+  }
+  switch (code & 0xff) {
+    case SQLITE_OK:
+    case SQLITE_ROW:
+    case SQLITE_DONE:
+      return IndexError::NONE;
+    case SQLITE_NOMEM:
+      return IndexError::NO_MEMORY;
+    case SQLITE_BUSY:
+    case SQLITE_LOCKED:
+      return IndexError::BUSY;
+    case SQLITE_IOERR:
+    case SQLITE_CANTOPEN:
+    case SQLITE_READONLY:
+    case SQLITE_PERM:
+      return IndexError::IO;
+    case SQLITE_FULL:
+      return IndexError::FULL;
+    case SQLITE_CORRUPT:
+    case SQLITE_NOTADB:
+      return IndexError::DAMAGED;
+    default:
+      return IndexError::OTHER;
+  }
+}
+
+const char* IndexErrorText(IndexError error) {
+  switch (error) {
+    case IndexError::NONE:
+      return "no error";
+    case IndexError::NO_MEMORY:
+      return "out of memory";
+    case IndexError::BUSY:
+      return "the index is in use by another program";
+    case IndexError::PATH_NOT_FOUND:
+      return "there is no index";
+    case IndexError::IO:
+      return "input or output failed";
+    case IndexError::FULL:
+      return "the disk is full";
+    case IndexError::ROOT:
+      return "the share's folder is missing or lies on another file system";
+    case IndexError::DAMAGED:
+      return "the index is damaged";
+    case IndexError::OTHER:
+      return "unexpected error";
+  }
+  return "unexpected error";
+}
+
+IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create) {
+  Close();
+  IndexError error = OpenExisting(index_path, PRAGMAS_FOR_WRITING, db);
+  if (error == IndexError::DAMAGED) {
+    if (!SetAside(index_path, "found at opening")) {
+      return FromErrno();
+    }
+    error = IndexError::PATH_NOT_FOUND;
+  }
+  if (error != IndexError::PATH_NOT_FOUND || !create) {
+    return error;
+  }
+
+  error = CreateDatabase(index_path);
+  return error == IndexError::NONE ? OpenExisting(index_path, PRAGMAS_FOR_WRITING, db) : error;
+}
+
+IndexError IndexDatabase::OpenForReading(const std::string& index_path) {
+  Close();
+  return OpenExisting(index_path, PRAGMAS_FOR_READING, db);
+}
+
+void IndexDatabase::Close() {
+  sqlite3_close_v2(std::exchange(db, nullptr));
+}
+
+bool IndexDatabase::HasMoved() const {
+  int moved = 0;
+  const int code = sqlite3_file_control(db, "main", SQLITE_FCNTL_HAS_MOVED, &moved);
+  return code == SQLITE_OK && moved != 0;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,239 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/entry_table.h"
+
+#include <utility>
+
+#include "index/schema.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Pages given back in one commit: small enough not to be felt, enough to keep up with deletions.
+constexpr int64_t FREE_PAGES_KEPT = 256;
+
+void BindAttributes(Statement& statement, int column, const Entry& entry) {
+  for (const int64_t value :
+       {static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
+        static_cast<int64_t>(entry.content_wanted), static_cast<int64_t>(entry.inode), entry.size,
+        entry.mtime, entry.ctime, entry.birth_time, entry.first_seen,
+        static_cast<int64_t>(entry.owner), static_cast<int64_t>(entry.group),
+        static_cast<int64_t>(entry.mode)}) {
+    statement.BindInt(column++, value);
+  }
+}
+
+}  // namespace
+
+PathRange::PathRange(const std::string& path) : first(path), end() {
+  if (path != "/") {
+    first += '/';
+  }
+  end = first;
+  end.back() = '/' + 1;
+}
+
+std::string_view LastComponent(std::string_view path) {
+  return path == "/" ? path : path.substr(path.rfind('/') + 1);
+}
+
+void ReadEntry(const Statement& statement, Entry& entry) {
+  entry.id = statement.Int(0);
+  entry.path = statement.Bytes(1);
+  entry.thing = static_cast<Thing>(statement.Int(2));
+  entry.kind = static_cast<Kind>(statement.Int(3));
+  entry.content_wanted = statement.Int(4) != 0;
+  entry.inode = static_cast<uint64_t>(statement.Int(5));
+  entry.size = statement.Int(6);
+  entry.mtime = statement.Int(7);
+  entry.ctime = statement.Int(8);
+  entry.birth_time = statement.Int(9);
+  entry.first_seen = statement.Int(10);
+  entry.owner = static_cast<uint32_t>(statement.Int(11));
+  entry.group = static_cast<uint32_t>(statement.Int(12));
+  entry.mode = static_cast<uint32_t>(statement.Int(13));
+}
+
+int EntryTable::Prepare(sqlite3* db) {
+  handle = db;
+  const std::pair<Statement*, const char*> statements[] = {
+      {&begin, "BEGIN IMMEDIATE"},
+      {&commit, "COMMIT"},
+      {&read_meta, "SELECT entries FROM meta WHERE id = 1"},
+      {&write_meta, "UPDATE meta SET entries = ?1, last_commit = ?2 WHERE id = 1"},
+      {&free_pages, "PRAGMA freelist_count"},
+      {&give_back, "PRAGMA incremental_vacuum(64)"},
+      {&find, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1"},
+      {&below, "SELECT 1 FROM entries WHERE path > ?1 AND path < ?2 LIMIT 1"},
+      {&slice, "SELECT " FILEINDEX_ENTRY_COLUMNS
+               " FROM entries WHERE path > ?1 AND path < ?2 ORDER BY path LIMIT ?3"},
+      {&twins,
+       "SELECT path FROM entries WHERE inode = ?1 AND path <> ?2 AND (size <> ?3 OR mtime <> ?4 "
+       "OR owner <> ?5 OR grp <> ?6 OR mode <> ?7)"},
+      {&insert,
+       "INSERT INTO entries(path, thing, kind, content_wanted, inode, size, mtime, ctime, "
+       "birth_time, first_seen, owner, grp, mode) VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, "
+       "?11, ?12, ?13)"},
+      {&update,
+       "UPDATE entries SET thing = ?2, kind = ?3, content_wanted = ?4, inode = ?5, size = ?6, "
+       "mtime = ?7, ctime = ?8, birth_time = ?9, first_seen = ?10, owner = ?11, grp = ?12, "
+       "mode = ?13 WHERE id = ?1"},
+      {&remove, "DELETE FROM entries WHERE id = ?1"},
+      {&insert_name, "INSERT INTO names(rowid, name) VALUES(?1, ?2)"},
+      {&insert_part, "INSERT INTO parts(rowid, name) VALUES(?1, ?2)"},
+      {&remove_name, "INSERT INTO names(names, rowid, name) VALUES('delete', ?1, ?2)"},
+      {&remove_part, "INSERT INTO parts(parts, rowid, name) VALUES('delete', ?1, ?2)"},
+  };
+
+  for (const auto& [statement, sql] : statements) {
+    const int code = statement->Prepare(db, sql);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+  }
+  return SQLITE_OK;
+}
+
+int EntryTable::Begin() {
+  int code = begin.Run();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  code = read_meta.Step();
+  entries = code == SQLITE_ROW ? read_meta.Int(0) : 0;
+  read_meta.Reset();
+  if (code == SQLITE_ROW) {
+    return SQLITE_OK;
+  }
+
+  Rollback();
+  return code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+}
+
+int EntryTable::Commit(int64_t now) {
+  write_meta.BindInt(1, entries);
+  write_meta.BindInt(2, now);
+  int code = write_meta.Run();
+  if (code == SQLITE_OK) {
+    code = GiveBackPages();
+  }
+  return code == SQLITE_OK ? commit.Run() : code;
+}
+
+// A failure has usually rolled back already, and then this one has nothing to do.
+void EntryTable::Rollback() {
+  if (sqlite3_get_autocommit(handle) == 0) {
+    (void)sqlite3_exec(handle, "ROLLBACK", nullptr, nullptr, nullptr);
+  }
+}
+
+int EntryTable::GiveBackPages() {
+  int code = free_pages.Step();
+  const int64_t pages = code == SQLITE_ROW ? free_pages.Int(0) : 0;
+  free_pages.Reset();
+  if (code != SQLITE_ROW || pages <= FREE_PAGES_KEPT) {
+    return code == SQLITE_ROW ? SQLITE_OK : code;
+  }
+
+  do {
+    code = give_back.Step();
+  } while (code == SQLITE_ROW);
+  give_back.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryTable::Find(const std::string& path, Entry& entry, bool& found) {
+  find.BindBlob(1, path);
+  const int code = find.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    ReadEntry(find, entry);
+  }
+  find.Reset();
+  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryTable::HasBelow(const PathRange& range, bool& has) {
+  below.BindBlob(1, range.first);
+  below.BindBlob(2, range.end);
+  const int code = below.Step();
+  has = code == SQLITE_ROW;
+  below.Reset();
+  return has || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryTable::Slice(const std::string& after, const std::string& end, int limit,
+                      std::vector<Entry>& slice_entries) {
+  slice_entries.clear();
+  slice.BindBlob(1, after);
+  slice.BindBlob(2, end);
+  slice.BindInt(3, limit);
+  int code = slice.Step();
+  for (; code == SQLITE_ROW; code = slice.Step()) {
+    ReadEntry(slice, slice_entries.emplace_back());
+  }
+  slice.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryTable::StaleTwins(const Entry& entry, std::vector<std::string>& paths) {
+  twins.BindInt(1, static_cast<int64_t>(entry.inode));
+  twins.BindBlob(2, entry.path);
+  twins.BindInt(3, entry.size);
+  twins.BindInt(4, entry.mtime);
+  twins.BindInt(5, entry.owner);
+  twins.BindInt(6, entry.group);
+  twins.BindInt(7, entry.mode);
+  int code = twins.Step();
+  for (; code == SQLITE_ROW; code = twins.Step()) {
+    paths.push_back(twins.Bytes(0));
+  }
+  twins.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryTable::Insert(const Entry& entry) {
+  insert.BindBlob(1, entry.path);
+  BindAttributes(insert, 2, entry);
+  ++changes;
+  int code = insert.Run();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  ++entries;
+  const int64_t id = sqlite3_last_insert_rowid(handle);
+  code = RunText(insert_name, id, entry.path);
+  return code == SQLITE_OK ? RunText(insert_part, id, entry.path) : code;
+}
+
+int EntryTable::Update(const Entry& entry) {
+  update.BindInt(1, entry.id);
+  BindAttributes(update, 2, entry);
+  ++changes;
+  return update.Run();
+}
+
+int EntryTable::Remove(const Entry& entry) {
+  remove.BindInt(1, entry.id);
+  ++changes;
+  int code = remove.Run();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  --entries;
+  code = RunText(remove_name, entry.id, entry.path);
+  return code == SQLITE_OK ? RunText(remove_part, entry.id, entry.path) : code;
+}
+
+int EntryTable::RunText(Statement& statement, int64_t id, const std::string& path) {
+  const std::string text = ToUtf8(LastComponent(path));
+  statement.BindInt(1, id);
+  statement.BindText(2, text);
+  return statement.Run();
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,66 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Rows of an entries database: the statements, prepared once for each connection.
+//
+// Results are SQLite's codes, SQLITE_OK for success. Every statement is reset when an operation
+// returns. A change of several tables that fails in between leaves it half done: the caller then
+// rolls its transaction back.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "index/entry.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+// The range of paths below normal path `path`: greater than `first`, less than `end`.
+struct PathRange {
+  explicit PathRange(const std::string& path);
+
+  std::string first;
+  std::string end;
+};
+
+std::string_view LastComponent(std::string_view path);
+// Reads the columns of FILEINDEX_ENTRY_COLUMNS.
+void ReadEntry(const Statement& statement, Entry& entry);
+
+class EntryTable {
+ public:
+  int Prepare(sqlite3* db);
+
+  int Begin();
+  // Writes the number of entries and the time into `meta`, and commits.
+  int Commit(int64_t now);
+  void Rollback();
+
+  int Find(const std::string& path, Entry& entry, bool& found);
+  int HasBelow(const PathRange& range, bool& has);
+  // Up to `limit` entries of paths greater than `after` and less than `end`, in byte order.
+  int Slice(const std::string& after, const std::string& end, int limit,
+            std::vector<Entry>& entries);
+  // Other paths of the same inode whose attributes differ from those of `entry`.
+  int StaleTwins(const Entry& entry, std::vector<std::string>& paths);
+
+  int Insert(const Entry& entry);  // `id` does not count
+  int Update(const Entry& entry);  // by `id`; the path does not change
+  int Remove(const Entry& entry);  // by `id`; needs the path
+
+  uint64_t changes = 0;  // rows changed since Prepare
+  sqlite3* handle = nullptr;
+
+ private:
+  int RunText(Statement& statement, int64_t id, const std::string& path);
+  int GiveBackPages();
+
+  Statement begin, commit, read_meta, write_meta, free_pages, give_back;
+  Statement find, below, slice, twins;
+  Statement insert, update, remove;
+  Statement insert_name, insert_part, remove_name, remove_part;
+  int64_t entries = 0;  // rows, as this transaction sees them
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,86 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/kind.h"
+
+#include <algorithm>
+#include <array>
+#include <unordered_map>
+
+#include "index/kind_table.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr std::array<const char*, 6> KIND_TEXTS = {"other", "document", "audio",
+                                                   "video", "photo",    "folder"};
+
+using EndingMap = std::unordered_map<std::string_view, Kind>;
+
+EndingMap MakeEndingMap() {
+  EndingMap map;
+  const auto add = [&map](std::span<const std::string_view> endings, Kind kind) {
+    for (const std::string_view ending : endings) {
+      map.emplace(ending, kind);
+    }
+  };
+  add(DocumentEndings(), Kind::DOCUMENT);
+  add(AudioEndings(), Kind::AUDIO);
+  add(VideoEndings(), Kind::VIDEO);
+  add(PhotoEndings(), Kind::PHOTO);
+  return map;
+}
+
+}  // namespace
+
+Kind KindOfName(std::string_view name) {
+  static const EndingMap ENDINGS = MakeEndingMap();
+  constexpr size_t LONGEST = 16;
+
+  const size_t dot = name.rfind('.');
+  // A dot in front makes a name hidden; it does not begin an ending.
+  if (dot == std::string_view::npos || dot == 0 || name.size() - dot - 1 > LONGEST) {
+    return Kind::OTHER;
+  }
+
+  std::array<char, LONGEST> lower{};
+  const std::string_view ending = name.substr(dot + 1);
+  // Not tolower(): the locale must not decide what a file is.
+  std::transform(ending.begin(), ending.end(), lower.begin(), [](char c) {
+    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+  });
+
+  const auto found = ENDINGS.find(std::string_view(lower.data(), ending.size()));
+  return found == ENDINGS.end() ? Kind::OTHER : found->second;
+}
+
+const char* KindText(Kind kind) {
+  return KIND_TEXTS.at(static_cast<size_t>(kind));
+}
+
+std::optional<Kind> KindFromText(std::string_view text) {
+  const auto found = std::find(KIND_TEXTS.begin(), KIND_TEXTS.end(), text);
+  if (found == KIND_TEXTS.end()) {
+    return std::nullopt;
+  }
+  return static_cast<Kind>(found - KIND_TEXTS.begin());
+}
+
+bool IsContentWanted(Kind kind, const ContentFlags& flags) {
+  switch (kind) {
+    case Kind::DOCUMENT:
+      return flags.document;
+    case Kind::AUDIO:
+      return flags.audio;
+    case Kind::VIDEO:
+      return flags.video;
+    case Kind::PHOTO:
+      return flags.photo;
+    case Kind::OTHER:
+      return flags.Any();
+    case Kind::FOLDER:
+      return false;
+  }
+  return false;
+}
+
+}  // namespace fileindexd

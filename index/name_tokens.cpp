@@ -1,0 +1,59 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/name_tokens.h"
+
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+namespace {
+
+int Collect(void* context, int /*flags*/, const char* token, int size, int /*start*/, int /*end*/) {
+  static_cast<std::vector<std::string>*>(context)->emplace_back(token, static_cast<size_t>(size));
+  return SQLITE_OK;
+}
+
+fts5_api* ApiOf(sqlite3* db) {
+  fts5_api* api = nullptr;
+  Statement statement;
+  if (statement.Prepare(db, "SELECT fts5(?1)") != SQLITE_OK) {
+    return nullptr;
+  }
+  sqlite3_bind_pointer(statement.handle, 1, static_cast<void*>(&api), "fts5_api_ptr", nullptr);
+  (void)statement.Run();  // what counts is the pointer
+  return api;
+}
+
+}  // namespace
+
+NameTokenizer::~NameTokenizer() {
+  if (tokenizer != nullptr) {
+    functions.xDelete(tokenizer);
+  }
+  sqlite3_close_v2(db);
+}
+
+bool NameTokenizer::Open() {
+  if (sqlite3_open_v2(":memory:", &db, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr) !=
+      SQLITE_OK) {
+    return false;
+  }
+
+  fts5_api* api = ApiOf(db);
+  void* context = nullptr;
+  if (api == nullptr || api->xFindTokenizer(api, "unicode61", &context, &functions) != SQLITE_OK) {
+    return false;
+  }
+
+  // The arguments of the schema's `names`.
+  const char* arguments[] = {"remove_diacritics", "2"};
+  return functions.xCreate(context, arguments, 2, &tokenizer) == SQLITE_OK;
+}
+
+std::vector<std::string> NameTokenizer::Tokens(std::string_view text) const {
+  std::vector<std::string> tokens;
+  (void)functions.xTokenize(tokenizer, &tokens, FTS5_TOKENIZE_QUERY, text.data(),
+                            static_cast<int>(text.size()), Collect);
+  return tokens;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,104 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/reader.h"
+
+#include "index/entry_table.h"
+#include "index/schema.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Two statements that read the same state. Closing it needs no disk, so its result does not count.
+class ReadTransaction {
+ public:
+  explicit ReadTransaction(sqlite3* opened) : db(opened) {
+    code = sqlite3_exec(db, "BEGIN", nullptr, nullptr, nullptr);
+  }
+  ReadTransaction(const ReadTransaction&) = delete;
+  ReadTransaction& operator=(const ReadTransaction&) = delete;
+  ~ReadTransaction() { (void)sqlite3_exec(db, "COMMIT", nullptr, nullptr, nullptr); }
+
+  sqlite3* db;
+  int code;
+};
+
+// False when reading failed. `going` is false once `visit` wanted no more.
+bool VisitAll(Statement& statement, const std::function<bool(const Entry&)>& visit, bool& going) {
+  Entry entry;
+  while (going) {
+    const int code = statement.Step();
+    if (code != SQLITE_ROW) {
+      return code == SQLITE_DONE;
+    }
+    ReadEntry(statement, entry);
+    going = visit(entry);
+  }
+  return true;
+}
+
+}  // namespace
+
+IndexError EntryReader::Open(const std::string& share_name) {
+  return database.OpenForReading(IndexPath(share_name));
+}
+
+bool EntryReader::Summarise(Summary& summary) {
+  // Counting what is wanted reads its own small index alone.
+  Statement statement;
+  if (statement.Prepare(database.db,
+                        "SELECT entries, last_commit,"
+                        " (SELECT count(*) FROM entries WHERE content_wanted <> 0)"
+                        " FROM meta WHERE id = 1") != SQLITE_OK ||
+      statement.Step() != SQLITE_ROW) {
+    return false;
+  }
+
+  summary.entries = static_cast<uint64_t>(statement.Int(0));
+  summary.last_commit = statement.Int(1);
+  summary.wanted = static_cast<uint64_t>(statement.Int(2));
+  return true;
+}
+
+bool EntryReader::ForEach(const std::string& under,
+                          const std::function<bool(const Entry&)>& visit) {
+  Statement at;
+  Statement below;
+  const ReadTransaction transaction(database.db);
+  if (transaction.code != SQLITE_OK ||
+      at.Prepare(database.db, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1") !=
+          SQLITE_OK ||
+      below.Prepare(database.db,
+                    "SELECT " FILEINDEX_ENTRY_COLUMNS
+                    " FROM entries WHERE path > ?1 AND path < ?2 ORDER BY path") != SQLITE_OK) {
+    return false;
+  }
+
+  const PathRange range(under);
+  at.BindBlob(1, under);
+  below.BindBlob(1, range.first);
+  below.BindBlob(2, range.end);
+  bool going = true;
+  const bool read = VisitAll(at, visit, going) && VisitAll(below, visit, going);
+  at.Reset();
+  below.Reset();
+  return read;
+}
+
+bool EntryReader::Find(const std::string& path, Entry& entry) {
+  Statement statement;
+  if (statement.Prepare(database.db, "SELECT " FILEINDEX_ENTRY_COLUMNS
+                                     " FROM entries WHERE path = ?1") != SQLITE_OK) {
+    return false;
+  }
+
+  statement.BindBlob(1, path);
+  if (statement.Step() != SQLITE_ROW) {
+    return false;
+  }
+  ReadEntry(statement, entry);
+  return true;
+}
+
+}  // namespace fileindexd

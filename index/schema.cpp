@@ -1,0 +1,40 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/schema.h"
+
+namespace fileindexd {
+
+static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 1,
+              "numbers in the text below");
+
+const char* const ENTRIES_SCHEMA = R"sql(
+CREATE TABLE entries(
+  id INTEGER PRIMARY KEY,
+  path BLOB NOT NULL UNIQUE,
+  thing INTEGER NOT NULL,
+  kind INTEGER NOT NULL,
+  content_wanted INTEGER NOT NULL,
+  inode INTEGER NOT NULL,
+  size INTEGER NOT NULL,
+  mtime INTEGER NOT NULL,
+  ctime INTEGER NOT NULL,
+  birth_time INTEGER NOT NULL,
+  first_seen INTEGER NOT NULL,
+  owner INTEGER NOT NULL,
+  grp INTEGER NOT NULL,
+  mode INTEGER NOT NULL);
+CREATE INDEX entries_by_inode ON entries(inode);
+CREATE INDEX entries_wanted ON entries(id) WHERE content_wanted <> 0;
+CREATE VIRTUAL TABLE names USING fts5(
+  name, content='', columnsize=0, tokenize='unicode61 remove_diacritics 2');
+CREATE VIRTUAL TABLE parts USING fts5(
+  name, content='', columnsize=0, detail=none, tokenize='trigram');
+CREATE TABLE meta(
+  id INTEGER PRIMARY KEY CHECK (id = 1),
+  entries INTEGER NOT NULL,
+  last_commit INTEGER NOT NULL);
+INSERT INTO meta VALUES(1, 0, 0);
+PRAGMA application_id = 1179209285;
+PRAGMA user_version = 1;
+)sql";
+
+}  // namespace fileindexd

@@ -1,0 +1,45 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Schema of the entries database, shared by all who read or write it.
+//
+//   INDEX/entries.db
+//
+//   entries      one row for each thing that belongs
+//     id              rowid; the same number in `names` and `parts`
+//     path            BLOB, unique, normal path byte for byte; '/' sorts as a byte, so that what
+//     lies
+//                     below P is the range ("P/", "P0")
+//     thing           1 file, 2 directory, 3 symbolic link
+//     kind            0 other, 1 document, 2 audio, 3 video, 4 photo, 5 folder
+//     content_wanted  0, 1
+//     inode           64 bits, as a signed number
+//     size            bytes; 0 for a directory
+//     mtime ctime birth_time first_seen   nanoseconds since the epoch; mtime 0 for a directory,
+//                     birth_time 0 where the file system keeps none
+//     owner grp mode  as the system counts them
+//   names        words of the last path component, made valid UTF-8; no stored copy, so deleting
+//                needs the text that was inserted
+//   parts        the same text by trigrams, for substrings
+//   meta         one row: number of rows in `entries`, and when the last commit was made (seconds)
+//
+// application_id tells that a database is ours, user_version which schema it holds. A change of the
+// tables, of the tokenizers or of the text that is given to them is a new version.
+#pragma once
+
+#include <cstdint>
+
+namespace fileindexd {
+
+constexpr const char* ENTRIES_FILE = "entries.db";
+constexpr int64_t ENTRIES_APPLICATION = 0x46494e45;
+constexpr int64_t ENTRIES_VERSION = 1;
+
+// Makes the tables in an empty database, and sets both numbers.
+extern const char* const ENTRIES_SCHEMA;
+
+// All columns of `entries`, in the order in which EntryTable binds and reads them.
+#define FILEINDEX_ENTRY_COLUMNS                                                     \
+  "entries.id, entries.path, entries.thing, entries.kind, entries.content_wanted, " \
+  "entries.inode, entries.size, entries.mtime, entries.ctime, entries.birth_time, " \
+  "entries.first_seen, entries.owner, entries.grp, entries.mode"
+
+}  // namespace fileindexd

@@ -1,0 +1,247 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/writer.h"
+
+#include <algorithm>
+#include <ctime>
+#include <exception>
+#include <utility>
+
+#include "index/writer_impl.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t LIST_LIMIT = 100000;
+// A longer list is carried out again at most once a second: on a disk that stays full, each
+// operation would otherwise repeat all that came before it.
+constexpr size_t SHORT_LIST = 500;
+constexpr int64_t REPLAY_INTERVAL_MS = 1000;
+constexpr ContentFlags EVERY_KIND = {true, true, true, true};
+
+}  // namespace
+
+EntryWriter::EntryWriter(std::string share_name, StateStore& store,
+                         std::function<void()> between_slices)
+    : impl(std::make_unique<Impl>(std::move(share_name), store, std::move(between_slices))) {
+  last_error = impl->OpenFirst();
+}
+
+EntryWriter::~EntryWriter() {
+  impl->CloseAll();
+}
+
+bool EntryWriter::IsOpen() const {
+  return impl->database.IsOpen();
+}
+
+bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
+                          const ContentFlags& decide) {
+  EntryOperation operation;
+  operation.wanted = wanted;
+  operation.decide = decide;
+  last_error = impl->Do(path, std::move(operation));
+  return last_error == IndexError::NONE;
+}
+
+bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted) {
+  return Refresh(path, wanted, EVERY_KIND);
+}
+
+bool EntryWriter::Delete(const std::string& path, DeleteMode mode) {
+  EntryOperation operation;
+  operation.removal = true;
+  operation.mode = mode;
+  last_error = impl->Do(path, std::move(operation));
+  return last_error == IndexError::NONE;
+}
+
+bool EntryWriter::Commit() {
+  last_error = impl->Commit();
+  return last_error == IndexError::NONE;
+}
+
+IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& operation) {
+  auto normal = NormalPath(path);
+  if (!normal.has_value()) {
+    return IndexError::NONE;  // belongs nowhere, and is held nowhere
+  }
+  operation.path = std::move(*normal);
+
+  IndexError error = EnsureOpen(false);
+  if (error == IndexError::NONE) {
+    error = EnsureApplied(false);
+  }
+  if (error != IndexError::NONE) {
+    Remember(std::move(operation));
+    return error;
+  }
+
+  const uint64_t before = table->changes;
+  error = Apply(operation);
+  if (error == IndexError::NONE) {
+    operation.applied = true;
+    // What changed nothing has nothing to repeat.
+    if (table->changes != before) {
+      Remember(std::move(operation));
+    }
+    return error;
+  }
+
+  if (converger->sql_failed || table->changes != before) {
+    error = Fail(error);
+  }
+  // A root that is missing refuses the operation for good: when it is back, it is compared.
+  if (error != IndexError::ROOT) {
+    Remember(std::move(operation));
+  }
+  return error;
+}
+
+void EntryWriter::Impl::Remember(EntryOperation&& operation) {
+  replay_needed = replay_needed || !operation.applied;
+  list.push_back(std::move(operation));
+  if (list.size() > LIST_LIMIT) {
+    list.clear();
+    list.shrink_to_fit();
+    replay_needed = false;
+    WantReindex(false);
+  }
+}
+
+// Carries the operation out in the transaction that runs, beginning one where there is none.
+IndexError EntryWriter::Impl::Apply(const EntryOperation& operation) {
+  std::shared_ptr<const Settings> settings;
+  converger->sql_failed = false;
+  if (!store.GetSettings(settings)) {
+    return IndexError::IO;
+  }
+  const Share* share = settings->ShareOfPath(operation.path);
+  if (share == nullptr || share->name != share_name) {
+    return IndexError::NONE;
+  }
+
+  if (sqlite3_get_autocommit(database.db) != 0) {
+    const int code = table->Begin();
+    if (code != SQLITE_OK) {
+      converger->sql_failed = true;
+      return FromSqlite(code);
+    }
+    changes_begun = table->changes;
+  }
+  return operation.removal ? converger->Delete(*settings, *share, operation.path, operation.mode)
+                           : converger->Refresh(*settings, *share, operation.path, operation.wanted,
+                                                operation.decide);
+}
+
+// Gives the transaction up: whatever failed in it left it half done.
+IndexError EntryWriter::Impl::Fail(IndexError error) {
+  table->Rollback();
+  for (EntryOperation& operation : list) {
+    operation.applied = false;
+  }
+  replay_needed = !list.empty();
+  if (error == IndexError::DAMAGED) {
+    CloseDamaged();
+  }
+  return error;
+}
+
+IndexError EntryWriter::Impl::EnsureApplied(bool at_once) {
+  if (!replay_needed) {
+    return IndexError::NONE;
+  }
+  if (!at_once && list.size() > SHORT_LIST && MonotonicMs() < next_replay) {
+    return replay_error;
+  }
+
+  replay_error = Replay();
+  next_replay = MonotonicMs() + REPLAY_INTERVAL_MS;
+  return replay_error;
+}
+
+// NONE when all that the database itself could take is in.
+IndexError EntryWriter::Impl::Replay() {
+  IndexError error = IndexError::NONE;
+  for (bool again = true; again;) {
+    again = false;
+    error = ReplayOnce(again);
+  }
+
+  for (EntryOperation& operation : list) {
+    operation.passed_over = false;
+  }
+  if (error == IndexError::NONE) {
+    replay_needed = false;
+  }
+  return error;
+}
+
+IndexError EntryWriter::Impl::ReplayOnce(bool& again) {
+  for (EntryOperation& operation : list) {
+    if (operation.applied || operation.passed_over) {
+      continue;
+    }
+
+    const uint64_t before = table->changes;
+    const IndexError error = Apply(operation);
+    operation.applied = error == IndexError::NONE;
+    if (operation.applied) {
+      continue;
+    }
+    if (converger->sql_failed) {
+      return Fail(error);
+    }
+    operation.passed_over = true;
+    if (table->changes != before) {
+      (void)Fail(error);
+      again = true;
+      return IndexError::NONE;
+    }
+  }
+  return IndexError::NONE;
+}
+
+IndexError EntryWriter::Impl::CommitTransaction() {
+  if (sqlite3_get_autocommit(database.db) != 0) {
+    return IndexError::NONE;
+  }
+  if (table->changes == changes_begun) {
+    table->Rollback();
+    return IndexError::NONE;
+  }
+
+  const int code = table->Commit(static_cast<int64_t>(time(nullptr)));
+  return code == SQLITE_OK ? IndexError::NONE : Fail(FromSqlite(code));
+}
+
+IndexError EntryWriter::Impl::Commit() {
+  IndexError error = EnsureOpen(true);
+  // Twice at most: a database that was removed is written into nowhere without an error. So the
+  // file is asked for after the commit, while the list still holds all that was in it.
+  for (int round = 0; error == IndexError::NONE && round < 2; ++round) {
+    replay_needed =
+        replay_needed || std::any_of(list.begin(), list.end(),
+                                     [](const auto& operation) { return !operation.applied; });
+    error = EnsureApplied(true);
+    if (error == IndexError::NONE) {
+      error = CommitTransaction();
+    }
+    if (error != IndexError::NONE || !database.HasMoved()) {
+      break;
+    }
+    error = Reopen();
+  }
+  if (error != IndexError::NONE) {
+    return error;
+  }
+
+  std::erase_if(list, [](const EntryOperation& operation) { return operation.applied; });
+  if (!list.empty()) {
+    return IndexError::IO;
+  }
+  return PayReindex() ? IndexError::NONE : IndexError::IO;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,150 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Opening the writer's database, and what is recorded about it.
+#include <ctime>
+
+#include "index/set_aside.h"
+#include "index/writer_impl.h"
+#include "state/layout.h"
+#include "state/queue_writer.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t OPEN_INTERVAL_MS = 1000;
+
+}  // namespace
+
+int64_t MonotonicMs() {
+  timespec now{};
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  return static_cast<int64_t>(now.tv_sec) * 1000 + now.tv_nsec / 1'000'000;
+}
+
+IndexError EntryWriter::Impl::Prepare() {
+  table.emplace();
+  const int code = table->Prepare(database.db);
+  if (code != SQLITE_OK) {
+    // SQLITE_ERROR: our numbers in the header without our tables.
+    const IndexError error = code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
+    CloseAll();
+    return error;
+  }
+  converger.emplace(*table, between);
+  return IndexError::NONE;
+}
+
+IndexError EntryWriter::Impl::TryOpen(bool create) {
+  const std::string path = IndexPath(share_name);
+  if (create) {
+    std::string ignored;  // the opening that follows tells
+    (void)MakeShareFolder(share_name, ignored);
+  }
+
+  IndexError error = database.OpenForWriting(path, create);
+  if (error == IndexError::NONE) {
+    error = Prepare();
+  }
+  if (error == IndexError::DAMAGED) {
+    if (!SetAside(path, "its tables are not whole")) {
+      return IndexError::IO;
+    }
+    error = create ? database.OpenForWriting(path, true) : IndexError::PATH_NOT_FOUND;
+    if (error == IndexError::NONE) {
+      error = Prepare();
+    }
+  }
+
+  // Best effort: a status that cannot be written is written by the next opening.
+  if (error == IndexError::NONE) {
+    (void)store.UpdateStatus(share_name, [](ShareStatus& status) {
+      status.missing = false;
+      status.rebuild_wanted = false;
+    });
+  } else if (error == IndexError::PATH_NOT_FOUND) {
+    (void)store.UpdateStatus(share_name, [](ShareStatus& status) { status.missing = true; });
+  }
+  open_error = error;
+  next_open = MonotonicMs() + OPEN_INTERVAL_MS;
+  return error;
+}
+
+IndexError EntryWriter::Impl::OpenFirst() {
+  ShareStatus status;
+  const bool create = store.GetStatus(share_name, status) && status.rebuild_wanted;
+  return TryOpen(create);
+}
+
+IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
+  if (database.IsOpen()) {
+    return IndexError::NONE;
+  }
+  if (!at_once && MonotonicMs() < next_open) {
+    return open_error;
+  }
+
+  const IndexError error = TryOpen(false);
+  return error == IndexError::PATH_NOT_FOUND ? Reopen() : error;
+}
+
+// In place of a database that is gone. What it held comes back by a reindex; what is on the list,
+// at once.
+IndexError EntryWriter::Impl::Reopen() {
+  CloseAll();
+  const IndexError error = TryOpen(true);
+  if (error == IndexError::NONE) {
+    WantReindex(true);
+  }
+  return error;
+}
+
+void EntryWriter::Impl::CloseAll() {
+  converger.reset();
+  table.reset();
+  database.Close();
+  for (EntryOperation& operation : list) {
+    operation.applied = false;
+  }
+  replay_needed = !list.empty();
+}
+
+// Set aside now, so that whoever opens next finds that there is none.
+void EntryWriter::Impl::CloseDamaged() {
+  CloseAll();
+  (void)SetAside(IndexPath(share_name), "found at work");
+  open_error = IndexError::DAMAGED;
+  next_open = MonotonicMs() + OPEN_INTERVAL_MS;
+}
+
+// `lost`: what was committed is gone, so a reindex that is under way does not suffice.
+void EntryWriter::Impl::WantReindex(bool lost) {
+  reindex_owed = true;
+  reindex_lost = reindex_lost || lost;
+  (void)PayReindex();  // if it fails, the next commit tries again and fails until it is done
+}
+
+bool EntryWriter::Impl::PayReindex() {
+  if (!reindex_owed) {
+    return true;
+  }
+
+  bool set = false;
+  const bool updated = store.UpdateStatus(share_name, [&](ShareStatus& status) {
+    set = !status.needs_reindex && (reindex_lost || !status.reindex_begun);
+    status.needs_reindex = status.needs_reindex || set;
+  });
+  if (!updated) {
+    return false;
+  }
+
+  // The flag stands, and whoever touches stale queues helps where this touch fails.
+  std::string ignored;
+  if (set) {
+    (void)AppendToQueue(share_name, {}, ignored);
+  }
+  reindex_owed = false;
+  reindex_lost = false;
+  return true;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,142 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "search/watches.h"
+
+#include <sys/inotify.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdint>
+#include <cstring>
+
+#include "search/log.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr uint32_t CAME_OR_WENT =
+    IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_DELETE_SELF | IN_MOVE_SELF;
+// Only writing counts: closing does not, because readers open a database's files for writing too,
+// and our own look would wake us again.
+constexpr uint32_t CHANGED = CAME_OR_WENT | IN_MODIFY;
+
+// Rounds of one Read. What is left comes with the next one.
+constexpr int MAX_READS = 64;
+
+// A database's shared memory changes with every reader.
+bool IsDatabaseFile(const std::string& name, std::string_view database) {
+  return name.starts_with(database) && !name.ends_with("-shm");
+}
+
+}  // namespace
+
+bool Watches::Open() {
+  ScopedFd opened(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
+  if (opened.fd < 0) {
+    return false;
+  }
+
+  inotify.Swap(opened);
+  return true;
+}
+
+void Watches::Set(const Settings& settings) {
+  // A parent before its child: what appears after the parent's watch is set raises an event.
+  std::map<int, Target> kept;
+  refused = false;
+  Add(StateRoot(), {Target::ROOT, ""}, kept);
+  Add(StateRoot() + "/shares", {Target::SHARES, ""}, kept);
+  for (const Share& share : settings.shares) {
+    Add(ShareFolder(share.name), {Target::SHARE, share.name}, kept);
+    Add(IndexPath(share.name), {Target::INDEX, share.name}, kept);
+  }
+  told = refused && told;
+
+  for (const auto& [watch, target] : targets) {
+    if (!kept.contains(watch)) {
+      (void)inotify_rm_watch(inotify.fd, watch);  // gone already if its folder is
+    }
+  }
+  targets.swap(kept);
+}
+
+void Watches::Add(const std::string& path, const Target& target, std::map<int, Target>& kept) {
+  const bool holds_database = target.place == Target::ROOT || target.place == Target::INDEX;
+  const uint32_t mask = (holds_database ? CHANGED : CAME_OR_WENT) | IN_ONLYDIR | IN_DONT_FOLLOW;
+  // The state root itself may be named by a link.
+  const uint32_t links = target.place == Target::ROOT ? mask & ~IN_DONT_FOLLOW : mask;
+  const int watch = inotify_add_watch(inotify.fd, path.c_str(), links);
+  if (watch >= 0) {
+    kept[watch] = target;
+    return;
+  }
+  if (errno == ENOENT || errno == ENOTDIR) {
+    return;
+  }
+
+  refused = true;
+  if (!told) {
+    ServiceLog("cannot watch %s, looking every minute instead, reason=%m", path.c_str());
+    told = true;
+  }
+}
+
+void Watches::Read(Hints& hints) {
+  alignas(inotify_event) char buffer[16 * 1024];
+  for (int round = 0; round < MAX_READS; ++round) {
+    const ssize_t length = read(inotify.fd, buffer, sizeof(buffer));
+    if (length <= 0) {  // EAGAIN: nothing is waiting
+      return;
+    }
+
+    for (const char* at = buffer; at < buffer + length;) {
+      inotify_event event = {};
+      memcpy(&event, at, sizeof(event));
+      const std::string name = event.len > 0 ? at + sizeof(event) : "";
+      Judge(event.wd, event.mask, name, hints);
+      at += sizeof(event) + event.len;
+    }
+  }
+}
+
+void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hints) const {
+  if ((mask & IN_Q_OVERFLOW) != 0) {
+    hints.everything = true;
+    for (const auto& [other, target] : targets) {
+      if (target.place == Target::INDEX) {
+        hints.shares.insert(target.share);
+      }
+    }
+    return;
+  }
+
+  const auto found = targets.find(watch);
+  if (found == targets.end()) {  // of a watch that was given up
+    return;
+  }
+  if ((mask & (IN_IGNORED | IN_DELETE_SELF | IN_MOVE_SELF)) != 0) {
+    hints.everything = true;
+    return;
+  }
+
+  const Target& target = found->second;
+  switch (target.place) {
+    case Target::ROOT:
+      hints.everything = hints.everything || name == "shares" || IsDatabaseFile(name, "state.db");
+      break;
+    case Target::SHARES:
+      hints.everything = true;
+      break;
+    case Target::SHARE:
+      hints.everything = hints.everything || name == "index";
+      break;
+    case Target::INDEX:
+      if (IsDatabaseFile(name, "entries.db")) {
+        hints.shares.insert(target.share);
+      }
+      break;
+  }
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,95 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Shares on real file systems: ext4 and btrfs on loop devices, tmpfs."""
+
+import os
+import subprocess
+import sys
+
+from harness import namespace
+from harness.awaiting import LIMIT
+from harness.checks import IndexTest
+
+IMAGE_SIZE = {"ext4": 512 << 20, "btrfs": 512 << 20}
+MAKE = {"ext4": ["mkfs.ext4", "-q", "-F"], "btrfs": ["mkfs.btrfs", "-q", "-f"]}
+MODIFY = 0x2
+ATTRIB = 0x4
+CLOSE_WRITE = 0x8
+CREATE = 0x40
+DELETE = 0x80
+RENAME = 0x100
+RENAME_FULL = 0x200
+QUEUE_RESET = 0x400
+REINDEX = 0x10000
+UPDATE = 0x20000
+
+
+def run(*command):
+    done = subprocess.run(
+        list(map(os.fsencode, command)), capture_output=True, check=False, timeout=LIMIT
+    )
+    assert done.returncode == 0, f"{command}: {done.stderr!r}"
+
+
+def make_image(kind, name):
+    image = f"{namespace.RUN}/{name}.image"
+    with open(image, "wb") as file:
+        file.truncate(IMAGE_SIZE[kind])
+    run(*MAKE[kind], image)
+    return image
+
+
+def can_use_loop_devices():
+    return os.geteuid() == 0 and os.path.exists("/dev/loop-control")
+
+
+class FilesystemTest(IndexTest):
+    """A disk of the kind is mounted at `disk`; the share is the folder "share" on it."""
+
+    kind = "tmpfs"
+
+    def setUp(self):
+        super().setUp()
+        self.disk = f"{namespace.DATA}/disk"
+        os.mkdir(self.disk)
+        if self.kind != "tmpfs" and not can_use_loop_devices():
+            self.skipTest("no loop devices here")
+        self.image = make_image(self.kind, "disk") if self.kind != "tmpfs" else None
+        self.mount_disk()
+        self.root = f"{self.disk}/share"
+        os.mkdir(self.root)
+
+    def mount_disk(self):
+        if self.image:
+            run("mount", "-o", "loop", self.image, self.disk)
+        else:
+            namespace.mount("tmpfs", self.disk, "tmpfs")
+
+    def unmount_disk(self):
+        run("umount", self.disk)
+
+    def add_share(self, *folders, flags=()):
+        self.ctl("share", "add", "alpha", self.root)
+        for folder in folders or ("",):
+            self.ctl("folder", "add", os.path.join(self.root, folder), *flags)
+
+    def event(self, code, name, *more):
+        """Queues one event at a path below the root, and waits until it is done."""
+        path = os.fsencode(self.root) + (b"/" + os.fsencode(name) if name else b"")
+        self.ctl("event", "alpha", str(code), path, *more)
+        self.await_drained("alpha")
+
+    def check(self, **more):
+        self.assert_index(self.root, **more)
+
+
+def on_each(*kinds):
+    """Class decorator: the same tests once on each of these kinds of file system."""
+
+    def make(cls):
+        module = sys.modules[cls.__module__]
+        for kind in kinds:
+            name = f"{cls.__name__}On{kind.capitalize()}"
+            setattr(module, name, type(name, (cls,), {"kind": kind, "__module__": cls.__module__}))
+        return None
+
+    return make

@@ -1,0 +1,93 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Full disks: nothing is lost for good, and the index is whole once there is space again."""
+
+import os
+
+from harness import main, namespace
+from harness.filesystems import CREATE, REINDEX, FilesystemTest
+
+FILES = 3000
+
+
+class FullStateDiskTest(FilesystemTest):
+    state_size = "16m"
+
+    def fill(self, path):
+        """Takes all space of the disk at `path`."""
+        with open(f"{path}/filler", "wb", buffering=0) as file:
+            for size in (1 << 20, 4096, 1):
+                try:
+                    while True:
+                        file.write(b"\1" * size)
+                except OSError:
+                    pass
+
+    def test_full_while_indexing(self):
+        self.make_files(self.root, *(f"d{n % 40}/name of file {n}.txt" for n in range(FILES)))
+        self.add_share()
+        self.fill(namespace.DISK)
+        pid = self.start()
+        self.await_line("Worker[alpha] finished all task, stopping")
+        os.unlink(f"{namespace.DISK}/filler")
+
+        self.make_files(self.root, "late.txt")
+        self.event(CREATE, "late.txt")
+
+        self.stop(pid)
+        self.start()
+        self.await_drained("alpha")
+        self.check()
+
+    def test_full_for_a_while(self):
+        self.add_share()
+        self.start()
+        self.await_drained("alpha")
+        self.make_files(self.root, *(f"d{n % 40}/name of file {n}.txt" for n in range(FILES)))
+        self.append("alpha", {"event": REINDEX, "path": self.root})
+        self.fill(namespace.DISK)
+        self.await_line(f"IndexDirAdd: {self.root}")
+        os.unlink(f"{namespace.DISK}/filler")
+
+        self.make_files(self.root, "late.txt")
+        self.event(CREATE, "late.txt")
+
+        self.await_drained("alpha")
+        self.check()
+
+    def test_tools_say_so(self):
+        self.add_share()
+        self.fill(namespace.DISK)
+
+        result = self.ctl("share", "add", "beta", namespace.DATA, code=1)
+
+        self.assertEqual(result.out, b"")
+
+
+class FullShareTest(FilesystemTest):
+    kind = "ext4"
+
+    def test_full_share_stops_and_goes_on(self):
+        self.make_files(self.root, "a.txt")
+        self.add_share()
+        self.start()
+        self.await_drained("alpha")
+        filler = f"{self.disk}/filler"
+        with open(filler, "wb") as file:
+            space = os.statvfs(self.disk)
+            os.posix_fallocate(file.fileno(), 0, space.f_bavail * space.f_frsize * 999 // 1000)
+        self.make_files(self.root, "b.txt")
+        after = self.log.mark()
+
+        self.append("alpha", {"event": CREATE, "path": f"{self.root}/b.txt"})
+
+        self.await_line("Share[alpha] is running out space", after)
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertIs(share["no_space"], True)
+        os.unlink(filler)
+        self.make_files(self.root, "c.txt")
+        self.event(CREATE, "c.txt")
+        self.check()
+
+
+if __name__ == "__main__":
+    main()

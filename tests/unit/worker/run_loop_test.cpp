@@ -1,0 +1,370 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <stdexcept>
+
+#include "platform/log.h"
+#include "unit/worker/worker_fixture.h"
+
+namespace fileindexd {
+namespace {
+
+using scripted::EVERY_CALL;
+using ::testing::Contains;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+
+class WorkerRunLoopTest : public WorkerFixture {
+ protected:
+  WorkerRunLoopTest() {
+    Create();
+    script.Forget();
+  }
+
+  // One pass on this thread, as the Worker's own would run it.
+  int Pass() {
+    worker->state = WORKER_RUNNING;
+    return worker->ProcessQueue();
+  }
+
+  bool HasQueue() { return folder.Exists("queue/TALO@file_index_queue"); }
+  bool HasDrained() { return folder.Exists("queue/TALO@file_index_queue.tmp"); }
+  std::string File(const std::string& name) { return folder.Write("share/" + name, ""); }
+  std::string RemoveDrained() const { return "QLIBCExec /bin/rm -rf " + queue_path + ".tmp"; }
+};
+
+TEST_F(WorkerRunLoopTest, EachCodeDoesItsAction) {
+  const std::string d = folder.MakeDir("share/d");
+  const std::string f = File("d/f");
+  const std::string cfg = " {\"document\":false}";
+  const struct {
+    std::string line;
+    std::vector<std::string> changes;
+  } TABLE[] = {
+      {Event(64, f), {"AddFSDocument " + f + cfg}},
+      {Event(128, f), {"DelFSDocument " + f + " 0"}},
+      {Event(2, f, R"("data":{"photo":true})"), {"UpdateFSDocument " + f + cfg + " null"}},
+      {Event(131072, d, R"("data":{"photo":true})"),
+       {"UpdateFSDocument " + d + cfg + " {\"photo\":true}",
+        "UpdateFSDocument " + f + cfg + " {\"photo\":true}"}},
+      {Event(65536, d),
+       {"DelFSDocument " + d + " 1", "AddFSDocument " + d + cfg, "AddFSDocument " + f + cfg}},
+      {Event(256, d, "\"path_old\":\"" + In("old") + "\""),
+       {"DelFSDocument " + In("old") + " 1", "AddFSDocument " + d + cfg,
+        "AddFSDocument " + f + cfg}},
+      {Event(1024, f), {}},
+      {Event(1, f), {}},
+  };
+  for (auto row : TABLE) {
+    script.Forget();
+    Queue({row.line});
+    EXPECT_EQ(Pass(), PASS_DONE) << row.line;
+    row.changes.emplace_back("Commit");
+    EXPECT_EQ(Changes(), row.changes) << row.line;
+  }
+}
+
+TEST_F(WorkerRunLoopTest, AnUpdateOfASubtreeIsFollowedByACleanOfIt) {
+  const std::string d = folder.MakeDir("share/d");
+  script.Say("IsFullPathIndexed", d, 0);
+  Queue({Event(131072, d)});
+
+  Pass();
+
+  EXPECT_THAT(Changes(), ElementsAre(HasSubstr("UpdateFSDocument " + d),
+                                     "DelFSDocument " + d + " 0", "Commit"));
+}
+
+TEST_F(WorkerRunLoopTest, APassWithoutQueueReadsNothingAndStillRemovesTheCopy) {
+  EXPECT_EQ(Pass(), PASS_NOTHING);
+
+  EXPECT_THAT(script.Calls(), ElementsAre("ShareIsNeedReindex s", RemoveDrained()));
+}
+
+TEST_F(WorkerRunLoopTest, ACopyOfAnEarlierDrainIsExecutedFirst) {
+  folder.Write("queue/TALO@file_index_queue.tmp", Event(128, In("old")) + "\n");
+  Queue({Event(128, In("new"))});
+
+  EXPECT_EQ(Pass(), PASS_DONE);
+
+  EXPECT_THAT(Changes(), ElementsAre("DelFSDocument " + In("old") + " 0", "Commit"));
+  EXPECT_TRUE(HasQueue());
+  EXPECT_FALSE(HasDrained());
+}
+
+TEST_F(WorkerRunLoopTest, APassThatStartsStoppedTouchesNothing) {
+  for (const int state : {WORKER_IDLE, WORKER_OUT_OF_SPACE}) {
+    Queue({Event(64, In("x"))});
+    worker->state = state;
+    EXPECT_EQ(worker->ProcessQueue(), PASS_STOPPED);
+  }
+  EXPECT_TRUE(HasQueue());
+  EXPECT_THAT(script.Calls(), IsEmpty());
+}
+
+TEST_F(WorkerRunLoopTest, AStopEndsThePassAfterTheNodeWithoutCommitAndKeepsTheCopy) {
+  for (const int state : {WORKER_IDLE, WORKER_OUT_OF_SPACE}) {
+    Queue({Event(128, In("a")), Event(128, In("b"))});
+    script.Run("DelFSDocument", script.CallCount("DelFSDocument") + 1,
+               [&, state] { worker->state = state; });
+    script.Forget();
+
+    EXPECT_EQ(Pass(), PASS_STOPPED);
+
+    EXPECT_THAT(script.Calls(),
+                ElementsAre("ShareIsNeedReindex s", "DelFSDocument " + In("a") + " 0"));
+    EXPECT_TRUE(HasDrained());
+  }
+}
+
+TEST_F(WorkerRunLoopTest, NeedsReindexThrowsTheQueueAwayAndIndexesTheShare) {
+  const std::string f = File("f");
+  folder.Write("queue/TALO@file_index_queue.tmp", "rest");
+  Queue({Event(128, In("x"))});
+  script.need_reindex.insert("s");
+
+  EXPECT_EQ(Pass(), INDEX_CHANGED);
+
+  EXPECT_THAT(script.CallsOf(
+                  {"ShareSetNeedReindex", "QLIBCExec", "AddFSDocument", "DelFSDocument", "Commit"}),
+              ElementsAre("ShareSetNeedReindex s false", "QLIBCExec /bin/rm -rf " + queue_path,
+                          "DelFSDocument " + share_path + " 1",
+                          HasSubstr("AddFSDocument " + share_path + " "),
+                          HasSubstr("AddFSDocument " + f), "Commit", RemoveDrained()));
+  EXPECT_FALSE(HasQueue());
+  EXPECT_FALSE(HasDrained());
+  EXPECT_FALSE(script.need_reindex.contains("s"));
+}
+
+TEST_F(WorkerRunLoopTest, AStoppedReindexStillCommitsAndKeepsTheCopy) {
+  folder.Write("queue/TALO@file_index_queue.tmp", "rest");
+  script.need_reindex.insert("s");
+  script.Run("DelFSDocument", 1, [&] { worker->state = WORKER_IDLE; });
+
+  EXPECT_EQ(Pass(), PASS_STOPPED);
+
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+  EXPECT_TRUE(HasDrained());
+}
+
+TEST_F(WorkerRunLoopTest, AReindexOfAShareThatCannotBeOpenedEndsThePassAsDone) {
+  script.need_reindex.insert("s");
+  script.Answer("opendir", 1, EACCES);
+
+  EXPECT_EQ(Pass(), INDEX_UNCHANGED);
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+}
+
+TEST_F(WorkerRunLoopTest, ABatchOfNothingToDoIsCommittedToo) {
+  Queue({Event(1024, In("a")), Event(1, In("b"))});
+
+  EXPECT_EQ(Pass(), PASS_DONE);
+  EXPECT_THAT(Changes(), ElementsAre("Commit"));
+}
+
+TEST_F(WorkerRunLoopTest, EachNodeIsToldAtDebugLevelOnly) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  Queue({Event(128, In("a"), R"("data":{"k":1})"), Event(1024, In("b")), Event(1, In("c"))});
+
+  Pass();
+
+  EXPECT_THAT(Log(), Contains("TREE COMMAND 2: path=" + In("a") + ", data={\"k\":1}"));
+  EXPECT_THAT(Log(), Contains("TREE COMMAND 0: path=" + In("c") + ", data=null"));
+  EXPECT_EQ(script.CountLines("TREE COMMAND"), 2U);
+}
+
+TEST_F(WorkerRunLoopTest, ANodeThatThrowsIsToldAndTheNextOneIsExecuted) {
+  Queue({Event(128, In("a")), Event(128, In("b"))});
+  script.Run("DelFSDocument", 1, [] { throw std::runtime_error("host"); });
+
+  EXPECT_EQ(Pass(), PASS_DONE);
+
+  EXPECT_THAT(Log(), ElementsAre("Failed to execute op 2, path=" + In("a")));
+  EXPECT_EQ(script.CallCount("DelFSDocument"), 2);
+}
+
+TEST_F(WorkerRunLoopTest, ANodeThatThrowsWhileAStopIsAskedForEndsThePass) {
+  Queue({Event(128, In("a")), Event(128, In("b"))});
+  script.Run("DelFSDocument", 1, [&] {
+    worker->state = WORKER_IDLE;
+    throw std::runtime_error("host");
+  });
+
+  EXPECT_EQ(Pass(), PASS_STOPPED);
+  EXPECT_EQ(script.CallCount("DelFSDocument"), 1);
+}
+
+TEST_F(WorkerRunLoopTest, ACommitIsFollowedByAFreshIndexer) {
+  worker->op_count = 5;
+  worker->last_commit = 0;
+  worker->CommitIndex();
+
+  EXPECT_THAT(script.Calls(), ElementsAre("Commit", "~Indexer", "Indexer " + db_path + " 0",
+                                          "IsShareSpaceEnough s"));
+  EXPECT_EQ(worker->op_count, 0);
+  EXPECT_GT(worker->last_commit, 0);
+  EXPECT_THAT(Log(), IsEmpty());
+}
+
+TEST_F(WorkerRunLoopTest, ACommitIsToldAtDebugLevelOnly) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  worker->CommitIndex();
+  script.Fail("Commit", 2);
+  worker->CommitIndex();
+
+  EXPECT_THAT(Log(),
+              ElementsAre("Worker[s] fileindex db committed", "Worker[s] failed to commit db"));
+}
+
+TEST_F(WorkerRunLoopTest, AFailedCommitKeepsTheIndexerAndRestartsTheInterval) {
+  const auto* before = worker->indexer;
+  script.Fail("Commit");
+  worker->op_count = 7;
+  worker->last_commit = 0;
+
+  worker->CommitIndex();
+
+  EXPECT_THAT(script.Calls(), ElementsAre("Commit", "IsShareSpaceEnough s"));
+  EXPECT_EQ(worker->indexer, before);
+  EXPECT_EQ(worker->op_count, 0);
+  EXPECT_GT(worker->last_commit, 0);
+  EXPECT_THAT(Log(), IsEmpty());
+}
+
+TEST_F(WorkerRunLoopTest, AnIndexerThatDoesNotOpenAgainIsToldOnceAndKept) {
+  script.Fail("Indexer", 2);
+
+  worker->CommitIndex();
+
+  ASSERT_NE(worker->indexer, nullptr);
+  EXPECT_FALSE(worker->indexer->IsOpen());
+  EXPECT_THAT(Log(), ElementsAre("Failed to initiate indexer, dbpath=" + db_path));
+  EXPECT_EQ(script.CallCount("Indexer"), 2);
+}
+
+TEST_F(WorkerRunLoopTest, WithoutAnIndexerACommitDoesNothing) {
+  delete std::exchange(worker->indexer, nullptr);
+  script.Forget();
+  worker->op_count = 9;
+
+  worker->CommitIndex();
+
+  EXPECT_THAT(script.Calls(), IsEmpty());
+  EXPECT_EQ(worker->op_count, 9);
+}
+
+TEST_F(WorkerRunLoopTest, ACommitThatFindsNoSpaceSetsTheStateAndTheFlag) {
+  for (const char* commit_fails : {"", "Commit"}) {
+    script.no_space.clear();
+    script.Forget();
+    script.Fail("IsShareSpaceEnough");
+    script.Fail(commit_fails);
+    worker->state = WORKER_RUNNING;
+
+    worker->CommitIndex();
+
+    EXPECT_EQ(worker->state, WORKER_OUT_OF_SPACE);
+    EXPECT_TRUE(script.no_space.contains("s"));
+    EXPECT_THAT(Log(), ElementsAre("Share[s] is running out space"));
+  }
+}
+
+TEST_F(WorkerRunLoopTest, ANoSpaceFlagThatCannotBeStoredIsTold) {
+  script.Fail("IsShareSpaceEnough");
+  script.Fail("ShareSetNoSpace");
+
+  worker->CommitIndex();
+
+  EXPECT_THAT(Log(), ElementsAre("Share[s] is running out space", "ShareSetNoSpace failed"));
+  EXPECT_EQ(worker->state, WORKER_OUT_OF_SPACE);
+}
+
+TEST_F(WorkerRunLoopTest, The2000thChangeCommitsAndThe1999thDoesNot) {
+  worker->op_count = 1998;
+  worker->CountChange();
+  EXPECT_EQ(script.CallCount("Commit"), 0);
+  EXPECT_EQ(worker->op_count, 1999);
+
+  worker->CountChange();
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+  EXPECT_EQ(worker->op_count, 0);
+}
+
+TEST_F(WorkerRunLoopTest, AnyChangeCommitsOnceTheLastCommitIs600SecondsOld) {
+  worker->last_commit = time(nullptr) - 595;
+  worker->CountChange();
+  EXPECT_EQ(script.CallCount("Commit"), 0);
+
+  worker->last_commit = time(nullptr) - 600;
+  worker->CountChange();
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+
+  worker->last_commit = time(nullptr) + 5000;  // the clock was set back
+  worker->CountChange();
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+}
+
+TEST_F(WorkerRunLoopTest, NoSpaceInTheMiddleOfABatchKeepsTheCopy) {
+  Queue({Event(128, In("a")), Event(128, In("b"))});
+  worker->op_count = 1999;
+  script.Fail("IsShareSpaceEnough");
+
+  RunThread();
+
+  EXPECT_EQ(script.CallCount("DelFSDocument"), 1);
+  EXPECT_TRUE(HasDrained());
+  EXPECT_EQ(worker->state, WORKER_FINISHED);
+  EXPECT_EQ(Log().back(), "Worker[s] stopped while processing command queue");
+}
+
+TEST_F(WorkerRunLoopTest, NoSpaceAtTheEndOfABatchRemovesTheCopyAndStopsTheNextPass) {
+  Queue({Event(128, In("a"))});
+  script.Fail("IsShareSpaceEnough");
+  script.Run("Commit", 1, [&] { Queue({Event(128, In("b"))}); });
+
+  RunThread();
+
+  EXPECT_FALSE(HasDrained());
+  EXPECT_TRUE(HasQueue());
+  EXPECT_EQ(worker->state, WORKER_FINISHED);
+  EXPECT_EQ(Log().back(), "Worker[s] stopped while processing command queue");
+}
+
+TEST_F(WorkerRunLoopTest, TheThreadEndsWhenAPassLeavesNoQueue) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  Queue({Event(128, In("a"))});
+
+  RunThread();
+
+  EXPECT_EQ(worker->state, WORKER_FINISHED);
+  EXPECT_EQ(Log().back(), "Worker[s] finished all task, stopping");
+  EXPECT_FALSE(HasDrained());
+  ExpectMutexesFree();
+}
+
+TEST_F(WorkerRunLoopTest, EventsThatArriveDuringAPassAreTakenByTheNextOne) {
+  Queue({Event(128, In("a"))});
+  script.Run("DelFSDocument", 1, [&] { Queue({Event(128, In("b"))}); });
+
+  RunThread();
+
+  EXPECT_THAT(Changes(), ElementsAre("DelFSDocument " + In("a") + " 0", "Commit",
+                                     "DelFSDocument " + In("b") + " 0", "Commit"));
+}
+
+TEST_F(WorkerRunLoopTest, AStopAskedForBeforeTheFirstPassLeavesTheQueueUnread) {
+  // Between two passes: the first ends with state 0 set by the last question about the queue.
+  Queue({Event(128, In("a"))});
+  script.Run("IsFileExist", 1, [&] {
+    worker->state = WORKER_IDLE;
+    Queue({Event(128, In("b"))});
+  });
+
+  RunThread();
+
+  EXPECT_TRUE(HasQueue());
+  EXPECT_EQ(worker->state, WORKER_FINISHED);
+  EXPECT_THAT(Log(), ElementsAre("Worker[s] stopped while processing command queue"));
+}
+
+}  // namespace
+}  // namespace fileindexd
