@@ -81,10 +81,6 @@ bool QuestionWords::Read(const std::string& text, std::string& error) {
 
   for (const std::string& part : parts) {
     const std::vector<std::string> found = tokenizer.Tokens(part);
-    if (part.front() == '-' && !found.empty()) {
-      excluded.push_back({part.substr(1), part.back() == '*'});
-      continue;
-    }
     if (found.empty()) {
       signs.push_back(part);
       continue;
@@ -96,11 +92,6 @@ bool QuestionWords::Read(const std::string& text, std::string& error) {
     }
     tokens.back().prefix = prefix;
   }
-
-  if (!excluded.empty() && words.empty()) {
-    error = "only words to leave out: one to find is needed";
-    return false;
-  }
   return true;
 }
 
@@ -108,9 +99,6 @@ std::string QuestionWords::NamesQuery() const {
   std::string query;
   for (const Word& word : words) {
     query += (query.empty() ? "" : " AND ") + Quoted(word.text) + (word.prefix ? " *" : "");
-  }
-  for (const Word& word : excluded) {
-    query = "(" + query + ") NOT " + Quoted(word.text) + (word.prefix ? " *" : "");
   }
   return query;
 }

@@ -40,7 +40,6 @@ class QuestionWords {
 
   NameTokenizer tokenizer;
   std::vector<Word> words;
-  std::vector<Word> excluded;
   std::vector<Token> tokens;       // of all words, in order
   std::vector<std::string> signs;  // words without a token
 };

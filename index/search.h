@@ -12,7 +12,7 @@
 namespace fileindexd {
 
 // All words must match a word of the name; a word that ends with '*' matches words that begin with
-// it; a word with '-' in front must not match. Letter case and accents do not count.
+// it. Letter case and accents do not count.
 struct Question {
   std::string text;
   std::optional<Kind> kind;
