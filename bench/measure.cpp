@@ -56,10 +56,6 @@ std::string SecondsText(double seconds) {
   return text;
 }
 
-void PrintHeading() {
-  printf("%-52s %12s %12s %8s %8s\n", "name", "ours", "reference", "ratio", "target");
-}
-
 void PrintRow(const std::string& name, const std::string& ours, const std::string& reference,
               double ratio, double target) {
   printf("%-52s %12s %12s %8.3f %8.3f\n", name.c_str(), ours.c_str(), reference.c_str(), ratio,

@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What every measuring program shares: rounds, medians, and the rows of the table.
 //
-//   row = name, ours, reference, ratio, target     columns of fixed width, one row a line
+//   row = name, ours, reference, ratio, target     columns of fixed width; bench/run prints the
+//   heading
 //
 // Ours and the reference are measured in turns within one run, so that a busy machine slows both.
 #pragma once
@@ -34,7 +35,6 @@ uint64_t DivisorFrom(int argc, char** argv);
 // "12.3 ms", with the unit that suits.
 std::string SecondsText(double seconds);
 
-void PrintHeading();
 void PrintRow(const std::string& name, const std::string& ours, const std::string& reference,
               double ratio, double target);
 // A time against a time.

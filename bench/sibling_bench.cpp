@@ -73,8 +73,8 @@ void Fill(OpTree& tree, uint64_t siblings) {
 }
 
 struct Cost {
-  double seconds = 0;         // for each test
-  uint64_t allocations = 0;   // of all insertions
+  double seconds = 0;        // for each test
+  uint64_t allocations = 0;  // of all insertions
 };
 
 Cost InsertionCost(uint64_t siblings) {
