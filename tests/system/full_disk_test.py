@@ -72,15 +72,40 @@ class FullStateDiskTest(FilesystemTest):
 class FullShareTest(FilesystemTest):
     kind = "ext4"
 
+    def fill_share(self):
+        """Leaves less space than an index wants to be kept free. The file that takes the rest."""
+        filler = f"{self.disk}/filler"
+        with open(filler, "wb") as file:
+            space = os.statvfs(self.disk)
+            os.posix_fallocate(file.fileno(), 0, space.f_bavail * space.f_frsize * 999 // 1000)
+        return filler
+
+    def test_share_that_is_full_at_the_start_gets_no_worker_until_it_is_revived(self):
+        self.make_files(self.root, "a.txt")
+        self.add_share()
+        filler = self.fill_share()
+
+        self.start()
+
+        self.await_lines(
+            [
+                "Share[alpha] is running out space",
+                "Failed to initiate worker for share=alpha",
+                "CreateWorker failed, share=alpha",
+            ]
+        )
+        self.ctl("worker", "revive", "alpha", code=1)
+        os.unlink(filler)
+        self.ctl("worker", "revive", "alpha")
+        self.await_drained("alpha")
+        self.check()
+
     def test_full_share_stops_and_goes_on(self):
         self.make_files(self.root, "a.txt")
         self.add_share()
         self.start()
         self.await_drained("alpha")
-        filler = f"{self.disk}/filler"
-        with open(filler, "wb") as file:
-            space = os.statvfs(self.disk)
-            os.posix_fallocate(file.fileno(), 0, space.f_bavail * space.f_frsize * 999 // 1000)
+        filler = self.fill_share()
         self.make_files(self.root, "b.txt")
         after = self.log.mark()
 

@@ -170,6 +170,7 @@ class MachineTest(unittest.TestCase):
         return after
 
     def assert_not_logged(self, pattern, after=0):
+        self.log.mark()  # so that all that was sent is seen
         found = [text for text in self.log.texts(after) if re.fullmatch(pattern, text)]
         self.assertEqual(found, [])
 

@@ -14,6 +14,8 @@ import time
 from harness.awaiting import LIMIT
 
 LINE = re.compile(r"<(\d+)>(?:\w{3} [ \d]\d \d\d:\d\d:\d\d )?([^:\[\]]+)(?:\[\d+\])?: ?(.*)", re.S)
+MARK_PRIORITY = 7
+MARK_PROGRAM = "mark of the test"
 PREFIX = re.compile(r"[a-z/_]+\.cpp:\d+ ")
 
 
@@ -41,6 +43,8 @@ class SystemLog:
         self.path = path
         self.program = program
         self.lines = []
+        self.marks = 0
+        self.marked = {}  # number of a mark: its position
         self.changed = threading.Condition()
         self.thread = threading.Thread(target=self._drain, daemon=True)
         self.thread.start()
@@ -54,7 +58,10 @@ class SystemLog:
             match = LINE.fullmatch(text)
             line = Line(int(match[1]) % 8, match[2], match[3]) if match else Line(-1, "?", text)
             with self.changed:
-                self.lines.append(line)
+                if line.program == MARK_PROGRAM:
+                    self.marked[line.message] = len(self.lines)
+                else:
+                    self.lines.append(line)
                 self.changed.notify_all()
 
     def close(self):
@@ -66,9 +73,19 @@ class SystemLog:
         os.unlink(self.path)
 
     def mark(self):
-        """A position: what is logged from now on lies behind it."""
+        """A position: what is logged from now on lies behind it, all earlier lines before.
+
+        The line of our own that is waited for comes out behind all that was sent earlier.
+        """
+        self.marks += 1
+        number = str(self.marks)
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
+            sender.connect(self.path)
+            sender.send(f"<{MARK_PRIORITY}>{MARK_PROGRAM}: {number}".encode())
         with self.changed:
-            return len(self.lines)
+            if not self.changed.wait_for(lambda: number in self.marked, LIMIT):
+                raise TimeoutError("the log is not drained")
+            return self.marked.pop(number)
 
     def texts(self, after=0, before=None):
         with self.changed:

@@ -2,11 +2,14 @@
 """Starting and stopping: files, log lines in their order, the content service, exit status 0."""
 
 import os
+import re
+import shutil
 import signal
 import stat
+import unittest.mock
 
 from harness import MachineTest, control, main, namespace
-from harness.machine import PID_FILE, SERVICE_PID_FILE
+from harness.machine import PID_FILE, SERVICE_PID_FILE, program
 
 STARTED = [
     "Daemonized ...",
@@ -93,6 +96,20 @@ class StartStopTest(MachineTest):
 
         self.assertNotEqual(first, second)
         self.assertEqual(self.command("resume"), 0)
+
+    def test_missing_content_service_does_not_keep_the_daemon_from_starting(self):
+        alone = f"{namespace.RUN}/alone"
+        os.mkdir(alone)
+        shutil.copy(program("fileindexd"), alone)
+
+        with unittest.mock.patch.dict(os.environ, FILEINDEXD_BIN_DIR=alone):
+            self.start()
+
+        error = r"err=\[0x[0-9A-F]{4} [a-z/_]+\.cpp:\d+\]"
+        after = self.await_line(re.compile("QLIBServiceStart failed: " + error))
+        self.await_line("Search daemon launched ...", after)
+        self.assertEqual(self.command("resume"), 0)
+        self.stop(self.daemon_pid())
 
     def test_share_with_a_folder_gets_one_worker_at_start(self):
         root = self.make_share(folders=("", "docs"), files=("docs/",))
