@@ -330,6 +330,11 @@ void* DeleteUntilCancelled(void* argument) {
 }
 
 TEST_P(ConvergeTest, CancelledThreadLeavesBetweenSlices) {
+#ifdef __SANITIZE_ADDRESS__
+  // A forced unwind leaves the sanitizer's marks of the frames that it passed, and the sanitizer
+  // then stumbles over them itself; a program of ten lines shows the same.
+  GTEST_SKIP() << "the address sanitizer does not know forced unwinds";
+#endif
   MakeFolder(At("d"));
   for (int i = 0; i < 1200; ++i) {
     WriteFile(At("d/" + std::to_string(i)), "");
