@@ -42,8 +42,13 @@ int64_t NowMs() {
 // One read of at most `size` bytes, before `deadline`. As read; a peer that has gone and a time
 // that has run out are errors.
 ssize_t ReadBefore(int fd, void* buffer, size_t size, int64_t deadline) {
+  const int64_t left = deadline - NowMs();
+  if (left <= 0) {
+    errno = ETIMEDOUT;
+    return -1;
+  }
+
   pollfd poll_fd = {fd, POLLIN, 0};
-  const int64_t left = std::max<int64_t>(deadline - NowMs(), 0);
   const int ready = poll(&poll_fd, 1, static_cast<int>(left));
   if (ready < 0) {
     return -1;

@@ -5,7 +5,9 @@
 // Threads: everything here runs on the main thread, but for IsPaused, which the Workers ask.
 //
 // Locks: `pause_mutex` goes with `pause_cond`; `platform_mutex` serialises the Workers' path
-// checks; each Worker's own `mutex` covers its thread's start. No thread ever holds two of them.
+// checks; each Worker's own `mutex` covers its thread's start. No thread waits for one of them
+// while it holds another, save at clean-up; the main thread may own several Workers' start mutexes,
+// each of which the new thread gives back.
 #pragma once
 
 #include <pthread.h>

@@ -33,6 +33,13 @@ void BlockKillSignals() {
   pthread_sigmask(SIG_BLOCK, &blocked, nullptr);
 }
 
+bool LockWithin(pthread_mutex_t* mutex, time_t seconds) {
+  timespec until = {};
+  clock_gettime(CLOCK_REALTIME, &until);
+  until.tv_sec += seconds;
+  return pthread_mutex_timedlock(mutex, &until) == 0;
+}
+
 }  // namespace
 
 volatile unsigned char stop_requested = 0;
@@ -144,21 +151,31 @@ void Daemon::StopSearchService() {
 }
 
 // Ends a pause first, so that no Worker that waits in it holds the clean-up up for ever.
+//
+// Wanted: both mutexes are destroyed while they are held. The C library refuses that and leaves
+// them usable. It does not refuse while threads merely wait for one: the first of them would get
+// it, fail to give it back, and leave the others waiting for a lock that no cancellation
+// interrupts.
 void Daemon::DestroyPrimitives() {
   if (primitives == 3) {
     pthread_mutex_lock(&pause_mutex);
     resume_time = -1;
     pthread_cond_broadcast(&pause_cond);
-    pthread_mutex_unlock(&pause_mutex);
   }
 
   if (primitives >= 1) {
+    // A path check on a dead disk holds it for longer; then it is held by somebody else.
+    const bool held = LockWithin(&platform_mutex, 1);
     pthread_mutex_destroy(&platform_mutex);
+    if (held) {
+      pthread_mutex_unlock(&platform_mutex);
+    }
   }
   if (primitives >= 2) {
     pthread_mutex_destroy(&pause_mutex);
   }
   if (primitives >= 3) {
+    pthread_mutex_unlock(&pause_mutex);
     pthread_cond_destroy(&pause_cond);
   }
   primitives = 0;
