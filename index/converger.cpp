@@ -9,7 +9,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int SLICE = 500;  // rows
 // Comparing a new name with all others of its inode is quadratic in their number.
 constexpr uint64_t MANY_LINKS = 1000;
 constexpr size_t LOOKED_AT_LIMIT = 10000;
@@ -307,81 +306,6 @@ IndexError Converger::AddBelow(const std::string& directory) {
       between();
     }
   }
-}
-
-IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
-                             const std::string& path, DeleteMode mode) {
-  settings = &in_force;
-  share = &in_share;
-  sql_failed = false;
-  if (mode == DeleteMode::ALL) {
-    const IndexError error = RemoveAt(path, true);
-    return error == IndexError::NONE ? RemoveBelow(path, true) : error;
-  }
-
-  const Look look = LookAt(*settings, path);
-  if (look.verdict == Verdict::UNKNOWN) {
-    return IndexError::IO;
-  }
-  // What is there on a foreign disk tells nothing about what is known.
-  IndexError error = look.verdict == Verdict::BELONGS ? CheckMount(look) : IndexError::NONE;
-  if (error != IndexError::NONE) {
-    return error;
-  }
-  if (mode == DeleteMode::ENTRY || look.verdict != Verdict::BELONGS) {
-    error = RemoveAt(path, look.verdict == Verdict::GONE);
-  }
-  return error == IndexError::NONE ? RemoveBelow(path, false) : error;
-}
-
-// `root_counts`: the root is looked at even if no entry stands there.
-IndexError Converger::RemoveAt(const std::string& path, bool root_counts) {
-  Entry known;
-  bool found = false;
-  IndexError error = Sql(table.Find(path, known, found));
-  if (error == IndexError::NONE && (found || root_counts)) {
-    error = CheckRoot();
-  }
-  return error == IndexError::NONE && found ? Sql(table.Remove(known)) : error;
-}
-
-IndexError Converger::RemoveBelow(const std::string& path, bool even_what_belongs) {
-  const PathRange range(path);
-  std::string after = range.first;
-  std::vector<Entry> rows;
-  for (;;) {
-    IndexError error = Sql(table.Slice(after, range.end, SLICE, rows));
-    if (error == IndexError::NONE) {
-      error = RemoveFromSlice(rows, even_what_belongs);
-    }
-    if (error != IndexError::NONE || rows.size() < SLICE) {
-      return error;
-    }
-    after = rows.back().path;
-    between();
-  }
-}
-
-IndexError Converger::RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs) {
-  std::vector<const Entry*> leaving;
-  for (const Entry& known : rows) {
-    Verdict verdict = Verdict::GONE;
-    if (!even_what_belongs) {
-      verdict = LookAt(*settings, known.path).verdict;
-    }
-    if (verdict == Verdict::UNKNOWN) {
-      return IndexError::IO;
-    }
-    if (verdict != Verdict::BELONGS) {
-      leaving.push_back(&known);
-    }
-  }
-
-  IndexError error = leaving.empty() ? IndexError::NONE : CheckRoot();
-  for (size_t i = 0; i < leaving.size() && error == IndexError::NONE; ++i) {
-    error = Sql(table.Remove(*leaving[i]));
-  }
-  return error;
 }
 
 // Only subtrees that hold the path count: a second event for the same directory looks again.

@@ -34,6 +34,7 @@ class Converger {
   bool sql_failed = false;  // whether the last failure was the database's
 
  private:
+  static constexpr int SLICE = 500;  // rows, or things on disk, between two calls of `between`
   enum class Outcome { SAME, CHANGED, NEW, REPLACED };
 
   IndexError Sql(int code);

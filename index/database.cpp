@@ -25,11 +25,25 @@ constexpr int BUSY_TIMEOUT_MS = 5000;
 // main file's own first page tells from the beginning whose it is.
 constexpr const char* PRAGMAS_FOR_CREATING =
     "PRAGMA auto_vacuum = INCREMENTAL; PRAGMA synchronous = FULL";
-// Sizes: cache in KiB, checkpoint in pages of 4 KiB, limit in bytes.
+// The cache's size is in KiB. The log is asked for at every opening: on a full disk the switch to
+// it can have failed when the database was made.
 constexpr const char* PRAGMAS_FOR_WRITING =
     "PRAGMA synchronous = FULL; PRAGMA cache_size = -8192; PRAGMA temp_store = MEMORY;"
-    "PRAGMA wal_autocheckpoint = 2000; PRAGMA journal_size_limit = 16777216";
+    "PRAGMA journal_mode = WAL";
+constexpr int MOST_LOG_FRAMES = 1000;  // of 4 KiB
 constexpr const char* PRAGMAS_FOR_READING = "PRAGMA cache_size = -8192; PRAGMA query_only = 1";
+
+// Called at each commit. A log that was only copied back would grow for ever: a connection is
+// closed after each commit, and the next one, which reads the whole log, no longer knows what was
+// copied. So it is cut. A reader that is in the way is not waited for: the next commit tries again.
+int CutLongLog(void* /*unused*/, sqlite3* db, const char* name, int frames) {
+  if (frames >= MOST_LOG_FRAMES) {
+    sqlite3_busy_timeout(db, 0);
+    (void)sqlite3_wal_checkpoint_v2(db, name, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+    sqlite3_busy_timeout(db, BUSY_TIMEOUT_MS);
+  }
+  return SQLITE_OK;
+}
 
 int Execute(sqlite3* db, const char* sql) {
   return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
@@ -223,12 +237,17 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
     }
     error = IndexError::PATH_NOT_FOUND;
   }
-  if (error != IndexError::PATH_NOT_FOUND || !create) {
-    return error;
+  if (error == IndexError::PATH_NOT_FOUND && create) {
+    error = CreateDatabase(index_path);
+    if (error == IndexError::NONE) {
+      error = OpenExisting(index_path, PRAGMAS_FOR_WRITING, db);
+    }
   }
 
-  error = CreateDatabase(index_path);
-  return error == IndexError::NONE ? OpenExisting(index_path, PRAGMAS_FOR_WRITING, db) : error;
+  if (error == IndexError::NONE) {
+    sqlite3_wal_hook(db, CutLongLog, nullptr);
+  }
+  return error;
 }
 
 IndexError IndexDatabase::OpenForReading(const std::string& index_path) {

@@ -11,32 +11,27 @@ namespace fileindexd {
 
 namespace {
 
-// Tests nodes against one path. Both sides get a slash at their end, so that /a/b does not cover
-// /a/bc. An insertion tests every sibling on its way down: the two strings are built in buffers
-// that each thread keeps, so that a test costs no heap allocation.
+// Tests nodes against one path: path + "/" begins with the node's path + "/", so that /a/b does not
+// cover /a/bc. An insertion tests every sibling on its way down. So the first string is built once,
+// in a buffer that each thread keeps, and the second one is compared where it lies, its slash
+// apart: a test writes nothing and allocates nothing.
 class CoverTest {
  public:
-  explicit CoverTest(const std::string& path) : buffers(Kept()) {
-    buffers.text.assign(path).push_back('/');
-  }
+  explicit CoverTest(const std::string& path) : text(Kept()) { text.assign(path).push_back('/'); }
 
   bool IsCoveredBy(const OpNode& node) const {
-    buffers.prefix.assign(node.name).push_back('/');
-    return TALO::FILEINDEX::StringStartWith(buffers.text, buffers.prefix);
+    const size_t length = node.name.size();
+    return length < text.size() && text[length] == '/' &&
+           TALO::FILEINDEX::StringStartWith(text, node.name);
   }
 
  private:
-  struct Buffers {
-    std::string text;
-    std::string prefix;
-  };
-
-  static Buffers& Kept() {
-    thread_local Buffers kept;
+  static std::string& Kept() {
+    thread_local std::string kept;
     return kept;
   }
 
-  Buffers& buffers;
+  std::string& text;
 };
 
 // The first child that covers the path, the node itself when none does, null when not even that.

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/paths.h"
 
-#include <algorithm>
+#include <ctime>
 
 #include "platform/standalone/environment.h"
 #include "platform/standalone/uncancelled.h"
@@ -11,18 +11,53 @@
 
 namespace fileindexd {
 
+namespace {
+
+constexpr int64_t GLANCE_NS = 5'000'000;
+
+// One operation on a document asks several questions about its path in a row. The answers are taken
+// from one look, which is not kept for longer than such a row takes.
+struct Glance {
+  std::string path;
+  int64_t time = 0;  // monotonic
+  std::shared_ptr<const Settings> settings;
+  Thing thing = Thing::NONE;
+};
+
+int64_t Now() {
+  timespec now = {};
+  clock_gettime(CLOCK_MONOTONIC_COARSE, &now);
+  return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
+}
+
+const Glance& GlanceAt(const std::string& path) {
+  thread_local Glance kept;
+  const int64_t now = Now();
+  if (kept.settings == nullptr || kept.path != path || now - kept.time >= GLANCE_NS) {
+    kept.settings = CurrentSettings();
+    kept.thing = ThingAt(*kept.settings, path);
+    kept.path = path;
+    // Between two passes a queue file is asked for. That look is not kept, and so nothing that was
+    // seen before the drain is believed after it.
+    kept.time = Covers(kept.settings->state_root, path) ? 0 : now;
+  }
+  return kept;
+}
+
+}  // namespace
+
 namespace TALO::FILEINDEX {
 
 bool IsDirExist(const std::string& path) {
-  return Uncancelled([&path] { return ThingAt(*CurrentSettings(), path) == Thing::DIRECTORY; });
+  return Uncancelled([&path] { return GlanceAt(path).thing == Thing::DIRECTORY; });
 }
 
 bool IsFileExist(const std::string& path) {
   return Uncancelled([&path] {
-    const std::shared_ptr<const Settings> settings = CurrentSettings();
-    const Thing thing = ThingAt(*settings, path);
+    const Glance& glance = GlanceAt(path);
     // What lies in our own state is a queue file: those are regular files or nothing.
-    return thing == Thing::FILE || (thing == Thing::LINK && !Covers(settings->state_root, path));
+    return glance.thing == Thing::FILE ||
+           (glance.thing == Thing::LINK && !Covers(glance.settings->state_root, path));
   });
 }
 
@@ -52,7 +87,7 @@ bool IsSystemPreservedFileName(const std::string& name) {
 // what is gone, and tells what failed.
 bool IsSkipIndex(const std::string& path) {
   const CancelOff off;
-  const Verdict verdict = LookAt(*CurrentSettings(), path).verdict;
+  const Verdict verdict = LookAt(*GlanceAt(path).settings, path).verdict;
   return verdict != Verdict::BELONGS && verdict != Verdict::GONE && verdict != Verdict::UNKNOWN;
 }
 

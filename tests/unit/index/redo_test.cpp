@@ -36,6 +36,19 @@ TEST_F(RedoTest, DatabaseRemovedUnderTheWriterIsMadeAnew) {
   EXPECT_TRUE(Exists(QueuePath("s")));
 }
 
+TEST_F(RedoTest, LogStaysShortOverManyCommitsThatNobodyReads) {
+  constexpr off_t MOST_BYTES = 1100 * (4096 + 24) + 32;  // the limit, and one commit beyond it
+  for (int i = 0; i < 300; ++i) {
+    OpenWriter();
+    Files(i * 10, 10);
+    Commit();
+
+    struct stat log = {};
+    ASSERT_EQ(stat((IndexPath("s") + "/entries.db-wal").c_str(), &log), 0);
+    ASSERT_LE(log.st_size, MOST_BYTES) << "after " << i << " commits";
+  }
+}
+
 TEST_F(RedoTest, DatabaseRemovedBetweenCommitsIsMadeAnew) {
   AddAll();
   RemoveTree(IndexPath("s"));
