@@ -110,9 +110,7 @@ class UnmountedShare(FilesystemTest):
         self.check_goes_on()
 
     def test_unmounted_between_drain_and_walk(self):
-        self.assertEqual(self.command("pause"), 0)
-        self.append("alpha", {"event": REINDEX, "path": self.root})
-        self.await_line("Worker[alpha] respawned")
+        self.hold_in_pause("alpha", {"event": REINDEX, "path": self.root})
         self.unmount_disk()
 
         self.ctl("resume")

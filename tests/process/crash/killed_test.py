@@ -55,6 +55,7 @@ class KilledTest(IndexTest):
                 after = self.log.mark()
 
                 self.append("alpha", *events)
+                self.await_taken("alpha")
                 self.kill_after(pid, ADDED, after, count)
 
                 self.check_restart(root)
@@ -65,6 +66,7 @@ class KilledTest(IndexTest):
         pid = self.start()
         self.await_drained("alpha")
         self.append("alpha", {"event": REINDEX, "path": root})
+        self.await_taken("alpha")
         self.await_drained("alpha")
         events = list(self.events(root, "top", DELETE))
         for folder in os.listdir(f"{root}/top"):
@@ -72,6 +74,7 @@ class KilledTest(IndexTest):
         after = self.log.mark()
 
         self.append("alpha", *events)
+        self.await_taken("alpha")
         self.kill_after(pid, DELETED, after, 200)
 
         self.check_restart(root)
@@ -86,6 +89,7 @@ class KilledTest(IndexTest):
                 after = self.log.mark()
 
                 self.append("alpha", {"event": REINDEX, "path": root})
+                self.await_taken("alpha")
                 self.kill_after(pid, ADDED, after, count)
 
                 self.check_restart(root)

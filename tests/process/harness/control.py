@@ -31,18 +31,17 @@ def connect():
 
 
 def read_reply(connection):
-    """The reply, or None when the connection was closed without one."""
+    """The reply, or None when there is none, once the daemon has closed the connection."""
     received = b""
-    while len(received) < 4:
+    part = None
+    while part != b"":
         try:
-            part = connection.recv(4 - len(received))
+            part = connection.recv(64)
         except ConnectionResetError:  # closed with bytes of ours unread
             part = b""
-        if not part:
-            assert not received, f"half a reply: {received!r}"
-            return None
         received += part
-    return struct.unpack("<i", received)[0]
+    assert len(received) in (0, 4), f"no reply: {received!r}"
+    return struct.unpack("<i", received)[0] if received else None
 
 
 def exchange(request_bytes, hang_up=False):

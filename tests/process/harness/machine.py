@@ -21,7 +21,7 @@ SERVICE_PID_FILE = "/run/talocontentsearchd.pid"
 QUEUE = "TALO@file_index_queue"
 LOG_ERR = 3
 SANITIZERS = ("ASAN_OPTIONS", "LSAN_OPTIONS", "TSAN_OPTIONS", "UBSAN_OPTIONS")
-NUDGE_SECONDS = 10.0  # after which a queue that nobody took is touched again
+NUDGE_SECONDS = 2.0  # after which a queue that nobody took is touched again
 
 
 @dataclasses.dataclass
@@ -188,6 +188,13 @@ class MachineTest(unittest.TestCase):
     def command(self, kind, **data):
         return control.exchange(control.request(kind, data))
 
+    def hold_in_pause(self, share, *lines):
+        """Pauses, queues the lines, and has a fresh Worker wait before it reads them."""
+        self.assertEqual(self.command("delete_share_worker", share_name=share), 0)
+        self.assertEqual(self.command("pause"), 0)
+        self.append(share, *lines)
+        self.assertEqual(self.command("revive_share_worker", share_name=share), 0)
+
     # Queues.
 
     def queue(self, share):
@@ -208,19 +215,27 @@ class MachineTest(unittest.TestCase):
                         file.write(data)
                         return  # closing is the unlock
 
+    def await_taken(self, share):
+        """Until a Worker has taken the queue."""
+        self._await_queue(share, [""])
+
     def await_drained(self, share):
-        """Until all that was queued is executed and committed.
+        """Until all that was queued is executed and committed."""
+        self._await_queue(share, ["", ".tmp"])
+
+    def _await_queue(self, share, endings):
+        """Until the queue file and its copy, or one of them, are gone.
 
         A line that comes between a Worker's last look and its end waits for the next one: the
         queue is touched when nobody takes it, as the notification service does.
         """
         queue = self.queue(share)
 
-        def drained():
-            return not os.path.lexists(queue) and not os.path.lexists(queue + ".tmp")
+        def gone():
+            return not any(os.path.lexists(queue + ending) for ending in endings)
 
         for _ in range(int(LIMIT / NUDGE_SECONDS)):
-            if await_in_folder(queue, drained, NUDGE_SECONDS):
+            if await_in_folder(queue, gone, NUDGE_SECONDS):
                 return
             if os.path.lexists(queue):
                 self.append_bytes(share, b"")

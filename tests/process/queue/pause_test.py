@@ -23,12 +23,10 @@ class PauseTest(IndexTest):
         self.start()
         self.await_drained("alpha")
         self.make_files(root, "a.txt")
-        self.assertEqual(self.command("pause"), 0)
         after = self.log.mark()
 
-        self.append("alpha", {"event": 0x40, "path": f"{root}/a.txt"})
+        self.hold_in_pause("alpha", {"event": 0x40, "path": f"{root}/a.txt"})
 
-        self.await_line("Worker[alpha] respawned", after)
         self.assertEqual(self.command("pause"), 0)
         self.assertTrue(os.path.exists(self.queue("alpha")))
         self.assert_not_logged("In cleaner", after)
@@ -67,9 +65,7 @@ class PauseTest(IndexTest):
         root = self.make_share()
         self.start()
         self.await_drained("alpha")
-        self.assertEqual(self.command("pause"), 0)
-        self.append("alpha", {"event": REINDEX, "path": root})
-        self.await_line("Worker[alpha] respawned")
+        self.hold_in_pause("alpha", {"event": REINDEX, "path": root})
         # Ends the wait before the stop does: a stopped Worker in a pause waits out 50 s.
         self.ctl("resume")
 
