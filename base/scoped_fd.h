@@ -2,6 +2,7 @@
 // Owner of one file descriptor, for early exits and for a thread that is cancelled.
 #pragma once
 
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <utility>
@@ -14,20 +15,19 @@ class ScopedFd {
   explicit ScopedFd(int owned = -1) : fd(owned) {}
   ScopedFd(const ScopedFd&) = delete;
   ScopedFd& operator=(const ScopedFd&) = delete;
-  // close() is a cancellation point: a thread cancelled in it unwinds through here, and an
-  // implicit noexcept would end the process.
-  ~ScopedFd() noexcept(false) { Close(); }
+  ~ScopedFd() { Close(); }
 
   void Swap(ScopedFd& other) { std::swap(fd, other.fd); }
 
   // Gives the descriptor up to the caller.
   [[nodiscard]] int Release() { return std::exchange(fd, -1); }
 
-  // Closes now. The number is forgotten first, so that an unwind out of close() does not meet it.
+  // Closes now. By system call: close() is a cancellation point, and a thread that is cancelled
+  // there leaves the file open, or would have to guess whether it is.
   void Close() {
     const int closing = Release();
     if (closing >= 0) {
-      close(closing);
+      syscall(SYS_close, closing);
     }
   }
 

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Owners of a stdio stream and of a directory stream, for early exits and for a thread that is
-// cancelled. Both close functions are cancellation points, hence noexcept(false).
+// cancelled. Both close functions may be cancellation points, hence noexcept(false).
 #pragma once
 
 #include <dirent.h>

@@ -323,7 +323,11 @@ IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
   if (look.verdict == Verdict::UNKNOWN) {
     return IndexError::IO;
   }
-  IndexError error = IndexError::NONE;
+  // What is there on a foreign disk tells nothing about what is known.
+  IndexError error = look.verdict == Verdict::BELONGS ? CheckMount(look) : IndexError::NONE;
+  if (error != IndexError::NONE) {
+    return error;
+  }
   if (mode == DeleteMode::ENTRY || look.verdict != Verdict::BELONGS) {
     error = RemoveAt(path, look.verdict == Verdict::GONE);
   }

@@ -10,8 +10,9 @@ namespace fileindexd {
 
 namespace {
 
-// Pages given back in one commit: small enough not to be felt, enough to keep up with deletions.
-constexpr int64_t FREE_PAGES_KEPT = 256;
+// So many free pages are left for the next entries; beyond them each commit gives 64 back: small
+// enough not to be felt, enough to keep up with deletions.
+constexpr int64_t FREE_PAGES_KEPT = 64;
 
 void BindAttributes(Statement& statement, int column, const Entry& entry) {
   for (const int64_t value :

@@ -18,9 +18,11 @@ using EndingMap = std::unordered_map<std::string_view, Kind>;
 
 EndingMap MakeEndingMap() {
   EndingMap map;
-  const auto add = [&map](std::span<const std::string_view> endings, Kind kind) {
-    for (const std::string_view ending : endings) {
-      map.emplace(ending, kind);
+  const auto add = [&map](std::string_view endings, Kind kind) {
+    while (!endings.empty()) {
+      const size_t blank = endings.find(' ');
+      map.emplace(endings.substr(0, blank), kind);
+      endings.remove_prefix(blank == std::string_view::npos ? endings.size() : blank + 1);
     }
   };
   add(DocumentEndings(), Kind::DOCUMENT);

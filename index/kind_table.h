@@ -2,15 +2,14 @@
 // Which endings of names tell a kind.
 #pragma once
 
-#include <span>
 #include <string_view>
 
 namespace fileindexd {
 
-// Endings without the dot, lower case, no ending in two lists.
-std::span<const std::string_view> DocumentEndings();
-std::span<const std::string_view> AudioEndings();
-std::span<const std::string_view> VideoEndings();
-std::span<const std::string_view> PhotoEndings();
+// Endings without the dot, lower case, a blank between two; no ending in two lists.
+std::string_view DocumentEndings();
+std::string_view AudioEndings();
+std::string_view VideoEndings();
+std::string_view PhotoEndings();
 
 }  // namespace fileindexd

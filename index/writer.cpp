@@ -41,7 +41,7 @@ bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
   EntryOperation operation;
   operation.wanted = wanted;
   operation.decide = decide;
-  last_error = impl->Do(path, std::move(operation));
+  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation)); });
   return last_error == IndexError::NONE;
 }
 
@@ -53,13 +53,25 @@ bool EntryWriter::Delete(const std::string& path, DeleteMode mode) {
   EntryOperation operation;
   operation.removal = true;
   operation.mode = mode;
-  last_error = impl->Do(path, std::move(operation));
+  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation)); });
   return last_error == IndexError::NONE;
 }
 
 bool EntryWriter::Commit() {
-  last_error = impl->Commit();
+  last_error = impl->Guarded([this] { return impl->Commit(); });
   return last_error == IndexError::NONE;
+}
+
+// By type: a cancellation that comes out of `between_slices` passes.
+IndexError EntryWriter::Impl::Guarded(const std::function<IndexError()>& step) {
+  try {
+    return step();
+  } catch (const std::exception&) {
+    // Memory ran out, and the operation may be half done and on no list.
+    CloseAll();
+    WantReindex(false);
+    return IndexError::NO_MEMORY;
+  }
 }
 
 IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& operation) {
@@ -194,6 +206,7 @@ IndexError EntryWriter::Impl::ReplayOnce(bool& again) {
       return Fail(error);
     }
     operation.passed_over = true;
+    passed_error = error;
     if (table->changes != before) {
       (void)Fail(error);
       again = true;
@@ -239,7 +252,7 @@ IndexError EntryWriter::Impl::Commit() {
 
   std::erase_if(list, [](const EntryOperation& operation) { return operation.applied; });
   if (!list.empty()) {
-    return IndexError::IO;
+    return passed_error;
   }
   return PayReindex() ? IndexError::NONE : IndexError::IO;
 }

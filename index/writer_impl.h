@@ -48,6 +48,7 @@ struct EntryWriter::Impl {
   bool PayReindex();
 
   // writer.cpp
+  IndexError Guarded(const std::function<IndexError()>& step);
   IndexError Do(const std::string& path, EntryOperation&& operation);
   IndexError Commit();
   IndexError EnsureApplied(bool at_once);
@@ -73,8 +74,9 @@ struct EntryWriter::Impl {
   int64_t next_replay = 0;     // the same
   IndexError open_error = IndexError::NONE;
   IndexError replay_error = IndexError::NONE;
-  bool reindex_owed = false;  // the share's flag could not be set yet
-  bool reindex_lost = false;  // and what for: see WantReindex
+  IndexError passed_error = IndexError::IO;  // of the operation that was last passed over
+  bool reindex_owed = false;                 // the share's flag could not be set yet
+  bool reindex_lost = false;                 // and what for: see WantReindex
 
  private:
   IndexError TryOpen(bool create);

@@ -60,6 +60,7 @@ bool QueueLock::Take(const std::string& queue_path) {
     if (errno != EAGAIN && errno != EINTR) {
       FI_DEBUG("flock fail, path=%s, reason=%m", queue_path.c_str());
       flock(opened.fd, LOCK_UN);
+      opened.Close();
       return false;
     }
 
@@ -133,11 +134,15 @@ void InsertLines(OpTree& tree, FILE* stream) {
 }
 
 OpTree* ReadDrained(const std::string& share_path, const std::string& drained_path) {
-  ScopedFile stream(fopen(drained_path.c_str(), "re"));
+  // Not fopen: a thread cancelled in the open would leave the stream behind.
+  ScopedFd opened(open(drained_path.c_str(), O_RDONLY | O_CLOEXEC));
+  ScopedFile stream(opened.fd < 0 ? nullptr : fdopen(opened.fd, "r"));
   if (stream.file == nullptr) {
     FI_LOG("Failed to open queue, path=%s, reason=%m", drained_path.c_str());
     return nullptr;
   }
+
+  (void)opened.Release();  // the stream's now
 
   auto tree = std::make_unique<OpTree>(share_path);
   InsertLines(*tree, stream.file);

@@ -4,6 +4,7 @@
 #include <json/reader.h>
 #include <json/writer.h>
 
+#include <cstring>
 #include <exception>
 #include <memory>
 #include <sstream>
@@ -19,6 +20,7 @@ namespace {
   builder["allowTrailingCommas"] = false;
   builder["allowSpecialFloats"] = false;
   builder["strictRoot"] = false;
+  builder["skipBom"] = false;
   return builder.newCharReader();
 }
 
@@ -27,6 +29,29 @@ namespace {
   builder["indentation"] = "";
   builder["emitUTF8"] = true;
   return builder.newStreamWriter();
+}
+
+// The reader lets two things through that it is told to refuse: comments inside an object or an
+// array, and a comma behind an empty key's value. Outside of strings neither a slash nor a comma
+// before a closing bracket has any place in JSON.
+bool HasCommentOrTrailingComma(const std::string& text) {
+  bool in_string = false;
+  bool after_comma = false;
+  for (size_t i = 0; i < text.size(); ++i) {
+    const char byte = text[i];
+    if (in_string) {
+      i += byte == '\\' ? 1 : 0;
+      in_string = byte != '"';
+    } else if (byte == '/' || (after_comma && (byte == '}' || byte == ']'))) {
+      return true;
+    } else if (byte == '"') {
+      in_string = true;
+      after_comma = false;
+    } else if (strchr(" \t\r\n", byte) == nullptr) {
+      after_comma = byte == ',';
+    }
+  }
+  return false;
 }
 
 bool IsBlank(const std::string& text, size_t from) {
@@ -41,7 +66,8 @@ bool Value::fromString(const std::string& text) {
 
   try {
     ::Json::Value parsed;
-    if (!reader->parse(text.data(), text.data() + text.size(), &parsed, nullptr)) {
+    if (HasCommentOrTrailingComma(text) ||
+        !reader->parse(text.data(), text.data() + text.size(), &parsed, nullptr)) {
       return false;
     }
 

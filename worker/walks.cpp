@@ -25,6 +25,9 @@ namespace {
 enum class Open { DONE, NOT_A_DIRECTORY, FAILED };
 
 Open OpenDirectory(const std::string& path, ScopedDir& stream) {
+  if (path.find('\0') != std::string::npos) {
+    return Open::FAILED;  // up to the NUL it would be another directory
+  }
   stream.dir = opendir(path.c_str());
   if (stream.dir != nullptr) {
     return Open::DONE;
@@ -32,16 +35,13 @@ Open OpenDirectory(const std::string& path, ScopedDir& stream) {
   return errno == ENOTDIR ? Open::NOT_A_DIRECTORY : Open::FAILED;
 }
 
-// Null at the end of the directory and on a read error, which ends a walk as the end does. The
-// entry is read into the caller's own buffer, one for each level; hence the call that glibc calls
-// deprecated.
-dirent64* ReadEntry(DIR* dir, dirent64* buffer) {
-  dirent64* entry = nullptr;
+// As readdir64_r. The entry is read into the caller's own buffer, one for each level; hence the
+// call that glibc calls deprecated.
+int ReadEntry(DIR* dir, dirent64* buffer, dirent64** entry) {
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wdeprecated-declarations"
-  const int error = readdir64_r(dir, buffer, &entry);
+  return readdir64_r(dir, buffer, entry);
 #pragma GCC diagnostic pop
-  return error == 0 ? entry : nullptr;
 }
 
 bool IsPassedOver(const char* name) {
@@ -62,7 +62,10 @@ template <typename MustStop, typename Visit>
 bool ForEachChild(const std::string& path, ScopedDir& stream, MustStop must_stop, Visit visit) {
   dirent64 buffer;
   for (;;) {
-    const dirent64* entry = ReadEntry(stream.dir, &buffer);
+    dirent64* entry = nullptr;
+    if (ReadEntry(stream.dir, &buffer, &entry) != 0) {
+      return true;  // ends this directory as its end does
+    }
     if (must_stop()) {
       stream.Close();
       return false;

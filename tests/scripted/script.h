@@ -101,7 +101,9 @@ class Script {
   std::optional<int> EnterUnrecorded(const std::string& operation, const std::string& subject);
   void Record(LogLine line);
 
-  pthread_mutex_t mutex = PTHREAD_MUTEX_INITIALIZER;
+  // Recursive: the thread sanitizer runs a signal's handler, which logs, at the end of whatever
+  // call of the library comes next, and that may be the one that took this lock.
+  pthread_mutex_t mutex = PTHREAD_RECURSIVE_MUTEX_INITIALIZER_NP;
   pthread_cond_t changed = PTHREAD_COND_INITIALIZER;
 
   std::vector<Share> shares;

@@ -2,11 +2,15 @@
 """Full disks: nothing is lost for good, and the index is whole once there is space again."""
 
 import os
+import re
 
 from harness import main, namespace
 from harness.filesystems import CREATE, REINDEX, FilesystemTest
 
 FILES = 3000
+ENDED = re.compile(
+    r"Worker\[alpha\] (finished all task, stopping|stopped while processing command queue)"
+)
 
 
 class FullStateDiskTest(FilesystemTest):
@@ -24,10 +28,12 @@ class FullStateDiskTest(FilesystemTest):
 
     def test_full_while_indexing(self):
         self.make_files(self.root, *(f"d{n % 40}/name of file {n}.txt" for n in range(FILES)))
+        pid = self.start()
+        self.assertEqual(self.command("pause"), 0)
         self.add_share()
         self.fill(namespace.DISK)
-        pid = self.start()
-        self.await_line("Worker[alpha] finished all task, stopping")
+        self.assertEqual(self.command("resume"), 0)
+        self.await_line(ENDED)
         os.unlink(f"{namespace.DISK}/filler")
 
         self.make_files(self.root, "late.txt")
@@ -87,6 +93,8 @@ class FullShareTest(FilesystemTest):
         self.make_files(self.root, "c.txt")
         self.event(CREATE, "c.txt")
         self.check()
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertIs(share["no_space"], False)
 
 
 if __name__ == "__main__":

@@ -58,7 +58,18 @@ class Names(FilesystemTest):
         self.check()
 
     def test_names_that_look_like_something_else(self):
-        for name in (b"...", b"..a", b"-0", b"--json", b"%s%n", b"*", b"\\", b"'", b'"', b"\xc0\x80"):
+        for name in (
+            b"...",
+            b"..a",
+            b"-0",
+            b"--json",
+            b"%s%n",
+            b"*",
+            b"\\",
+            b"'",
+            b'"',
+            b"\xc0\x80",
+        ):
             self.make(name)
         self.make_files(self.root, "TALO@file_index_queue", "state.db", "index/x", "contents/y")
 
@@ -87,7 +98,7 @@ class Names(FilesystemTest):
         path = self.root
         while len(path) < LONGEST:
             path += "/d"
-        os.makedirs(path)
+            os.mkdir(path)
 
         self.begin()
 

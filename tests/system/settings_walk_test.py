@@ -34,9 +34,7 @@ class SettingsWalk(FilesystemTest):
         self.check()
 
     def with_ending(self, *endings, below=""):
-        return sorted(
-            name for name in FILES if name.endswith(endings) and name.startswith(below)
-        )
+        return sorted(name for name in FILES if name.endswith(endings) and name.startswith(below))
 
     def test_one_folder_switched_on_and_off(self):
         self.begin()
@@ -46,9 +44,7 @@ class SettingsWalk(FilesystemTest):
             with self.subTest(kind=kind):
                 self.set("", f"--{kind}=on")
                 self.assertLessEqual(set(self.with_ending(ending)), set(self.wanted()))
-                self.assertLessEqual(
-                    set(self.wanted()), set(self.with_ending(ending, "unknown"))
-                )
+                self.assertLessEqual(set(self.wanted()), set(self.with_ending(ending, "unknown")))
 
                 self.set("", f"--{kind}=off")
                 self.assertEqual(self.wanted(), [])

@@ -24,9 +24,7 @@ class CommandsTest(MachineTest):
     def test_resume_as_its_bytes(self):
         self.start()
 
-        self.assertEqual(
-            control.exchange(b"\x1c\0\0\0" + b'{"type":"resume","data":{}}\0'), 0
-        )
+        self.assertEqual(control.exchange(b"\x1c\0\0\0" + b'{"type":"resume","data":{}}\0'), 0)
 
         self.await_line("SetPaused: false")
 

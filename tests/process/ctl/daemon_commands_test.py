@@ -130,7 +130,11 @@ class DaemonCommandsTest(IndexTest):
     def test_without_the_daemon(self):
         self.make_share()
 
-        for arguments in (("log-level", "debug"), ("worker", "drop", "alpha"), ("worker", "revive", "alpha")):
+        for arguments in (
+            ("log-level", "debug"),
+            ("worker", "drop", "alpha"),
+            ("worker", "revive", "alpha"),
+        ):
             self.ctl(*arguments, code=3)
         self.kill(self.start())
         self.assertTrue(os.path.lexists(control.SOCKET))

@@ -53,14 +53,19 @@ class DumpTest(IndexTest):
 class VerifyTest(IndexTest):
     def setUp(self):
         super().setUp()
-        self.root = self.make_share(files=("stays.txt", "changes.txt", "goes/a.txt"), flags=("--document",))
+        self.root = self.make_share(
+            files=("stays.txt", "changes.txt", "goes/a.txt"), flags=("--document",)
+        )
         self.pid = self.start()
         self.await_drained("alpha")
         self.assert_index(self.root)
 
     def differences(self):
         found = self.ctl("verify", "alpha", "--json", code=1).objects()
-        return {os.path.relpath(full_path(item).decode(), self.root): item["difference"] for item in found}
+        return {
+            os.path.relpath(full_path(item).decode(), self.root): item["difference"]
+            for item in found
+        }
 
     def test_every_difference(self):
         self.make_files(self.root, "new/b.txt")

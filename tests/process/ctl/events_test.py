@@ -110,10 +110,20 @@ class EventsTest(IndexTest):
         self.start()
         names = [f"f{number}-{line}" for number in range(WRITERS) for line in range(LINES)]
         self.make_files(self.root, *names)
-        script = 'i=0; while [ $i -lt $3 ]; do "$0" event alpha 64 "$1$2-$i" || exit 1; i=$((i+1)); done'
+        script = (
+            'i=0; while [ $i -lt $3 ]; do "$0" event alpha 64 "$1$2-$i" || exit 1; i=$((i+1)); done'
+        )
         writers = [
             subprocess.Popen(
-                ["sh", "-c", script, program("fileindexctl"), f"{self.root}/f", str(number), str(LINES)],
+                [
+                    "sh",
+                    "-c",
+                    script,
+                    program("fileindexctl"),
+                    f"{self.root}/f",
+                    str(number),
+                    str(LINES),
+                ],
                 env=environment(),
             )
             for number in range(WRITERS)

@@ -12,7 +12,9 @@ KINDS = ("document", "audio", "video", "photo")
 class FoldersTest(IndexTest):
     def setUp(self):
         super().setUp()
-        self.root = self.make_share(files=("a.txt", "in/b.txt", "in/c.mp3", "out/d.txt"), folders=())
+        self.root = self.make_share(
+            files=("a.txt", "in/b.txt", "in/c.mp3", "out/d.txt"), folders=()
+        )
 
     def listed(self):
         return {

@@ -60,7 +60,9 @@ class SearchTest(IndexTest):
         everything = self.ctl("search", "beach").out.splitlines()
         self.assertEqual(len(everything), 5)
 
-        self.assertEqual(self.ctl("search", "--limit", "2", "beach").out.splitlines(), everything[:2])
+        self.assertEqual(
+            self.ctl("search", "--limit", "2", "beach").out.splitlines(), everything[:2]
+        )
         rest = self.ctl("search", "--offset", "2", "beach").out.splitlines()
         self.assertEqual(rest, everything[2:])
         self.assertEqual(self.ctl("search", "--limit", "0", "beach").out, b"")
@@ -71,8 +73,12 @@ class SearchTest(IndexTest):
         self.ctl("reindex", self.root)
         self.await_drained("alpha")
 
-        self.assertEqual(len(self.ctl("search", "--under", f"{self.root}/many", "txt").out.splitlines()), 20)
-        self.assertEqual(self.ctl("search", "--count", "--under", f"{self.root}/many", "txt").out, b"30\n")
+        self.assertEqual(
+            len(self.ctl("search", "--under", f"{self.root}/many", "txt").out.splitlines()), 20
+        )
+        self.assertEqual(
+            self.ctl("search", "--count", "--under", f"{self.root}/many", "txt").out, b"30\n"
+        )
 
     def test_json(self):
         hits = self.ctl("search", "--json", "budget").objects()
@@ -96,10 +102,14 @@ class SearchTest(IndexTest):
         self.assertEqual(len(self.hits("beach")), 5)
 
     def test_minus_in_front_belongs_to_the_query(self):
-        found = self.hits("beach", "-boys")
+        self.make_files(self.root, "minus -x.txt", "two --json.txt")
+        self.ctl("reindex", self.root)
+        self.await_drained("alpha")
 
-        self.assertNotIn("alpha/music/beach boys.mp3", found)
-        self.assertEqual(len(found), 4)
+        for words in (("minus", "-x"), ("-x", "minus"), ("--", "minus", "-x"), ("minus -x",)):
+            with self.subTest(words=words):
+                self.assertEqual(self.hits(*words), ["alpha/minus -x.txt"])
+        self.assertEqual(self.hits("--", "two", "--json"), ["alpha/two --json.txt"])
 
     def test_what_is_refused(self):
         for arguments in (

@@ -66,29 +66,19 @@ def expected_entries(root, folders=None, left_out=()):
     mounts = _mount_points()
     found = {}
 
-    # Below a path longer than the system takes at once one has to go step by step.
-    def walk(path, folder_fd):
-        for name in os.listdir(folder_fd):
-            name = os.fsencode(name)
-            child = path + b"/" + name
-            if _is_left_out(name) or child in left_out:
+    pending = [root]
+    while pending:
+        path = pending.pop()
+        with contextlib.suppress(FileNotFoundError):
+            info = os.lstat(path)
+            mode = info.st_mode
+            if not (stat.S_ISDIR(mode) or stat.S_ISREG(mode) or stat.S_ISLNK(mode)):
                 continue
-            with contextlib.suppress(FileNotFoundError):
-                look(child, name, folder_fd)
-
-    def look(path, name, folder_fd):
-        info = os.stat(name, dir_fd=folder_fd, follow_symlinks=False)
-        mode = info.st_mode
-        if not (stat.S_ISDIR(mode) or stat.S_ISREG(mode) or stat.S_ISLNK(mode)):
-            return
-        if any(path == folder or path.startswith(folder + b"/") for folder in covering):
-            found[path] = _describe(path, info)
-        if stat.S_ISDIR(mode) and (path == root or path not in mounts):
-            child_fd = os.open(name, os.O_RDONLY | os.O_DIRECTORY | os.O_NOFOLLOW, dir_fd=folder_fd)
-            try:
-                walk(path, child_fd)
-            finally:
-                os.close(child_fd)
-
-    look(root, root, None)
+            if any(path == folder or path.startswith(folder + b"/") for folder in covering):
+                found[path] = _describe(path, info)
+            if stat.S_ISDIR(mode) and (path == root or path not in mounts):
+                children = {
+                    path + b"/" + name for name in os.listdir(path) if not _is_left_out(name)
+                }
+                pending += children - left_out
     return found

@@ -81,7 +81,8 @@ class StartStopTest(MachineTest):
         self.stop(pid)
 
         self.assertEqual(
-            self.log.texts(), [f"In kill handler({int(signal.SIGTERM)})", "Daemon Leaving main loop"]
+            self.log.texts(),
+            [f"In kill handler({int(signal.SIGTERM)})", "Daemon Leaving main loop"],
         )
 
     def test_starts_again_after_a_stop(self):

@@ -76,9 +76,7 @@ class WorkersTest(IndexTest):
         after = self.log.mark()
         self.start()
 
-        self.await_line(
-            "Failed to initiate indexer due to path not found, try re-create db", after
-        )
+        self.await_line("Failed to initiate indexer due to path not found, try re-create db", after)
         self.await_drained("alpha")
         self.assert_index(root)
 

@@ -67,9 +67,7 @@ class ControlTest : public DaemonFixture {
 
   int Exchange(const std::string& bytes) {
     const ScopedFd client(Connect(bytes));
-    const int before = scripted::OpenDescriptors();
     daemon.HandleCommand();
-    EXPECT_EQ(scripted::OpenDescriptors(), before);
     return Reply(client.fd);
   }
 
@@ -107,10 +105,12 @@ TEST_F(ControlTest, MalformedCommandsAreToldAndRefused) {
       R"({"type":"resume","data":{})",
       R"({"Type":"resume","data":{}})",
   };
+  const int before = scripted::OpenDescriptors();
   for (const char* body : BODIES) {
     EXPECT_EQ(Command(body), -1) << body;
     EXPECT_THAT(Log(), ElementsAre(std::string("Malformed command: ") + body));
   }
+  EXPECT_EQ(scripted::OpenDescriptors(), before);
 }
 
 TEST_F(ControlTest, UnknownTypesAreToldAndRefused) {

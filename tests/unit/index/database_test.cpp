@@ -1,0 +1,226 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What stands in the database's place, and what becomes of it.
+#include "index/database.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <utime.h>
+
+#include <filesystem>
+
+#include "state/layout.h"
+#include "tests/unit/index/fixture.h"
+
+namespace fileindexd {
+
+class DatabaseTest : public IndexTest {
+ protected:
+  void SetUp() override {
+    IndexTest::SetUp();
+    if (IsSkipped()) {
+      return;
+    }
+    WriteFile(At("a"), "");
+    AddAll();
+    writer.reset();
+    index = IndexPath("s");
+    file = index + "/entries.db";
+  }
+
+  ShareStatus Status() {
+    ShareStatus status;
+    EXPECT_TRUE(store->GetStatus("s", status));
+    return status;
+  }
+  // What opening says first, and after a rebuild was asked for.
+  void ExpectMissedThenRebuilt() {
+    OpenWriter();
+    EXPECT_FALSE(writer->IsOpen());
+    EXPECT_EQ(writer->last_error, IndexError::PATH_NOT_FOUND);
+    EXPECT_TRUE(Status().missing);
+    WantRebuild();
+    OpenWriter();
+    ASSERT_TRUE(writer->IsOpen()) << IndexErrorText(writer->last_error);
+    EXPECT_FALSE(Status().missing);
+    EXPECT_FALSE(Status().rebuild_wanted);
+    AddAll();
+    EXPECT_EQ(Differences(), Names());
+  }
+
+  std::string index;
+  std::string file;
+};
+
+TEST_F(DatabaseTest, FilesAreForTheirOwnerAlone) {
+  EXPECT_EQ(ModeOf(index), 0700U);
+  for (const auto& entry : std::filesystem::directory_iterator(index)) {
+    EXPECT_EQ(ModeOf(entry.path()), 0600U) << entry.path();
+  }
+}
+
+TEST_F(DatabaseTest, ModesDoNotDependOnTheMask) {
+  RemoveTree(index);
+  for (const mode_t mask : {0U, 0177U}) {
+    RemoveTree(index);
+    WantRebuild();
+    const mode_t before = umask(mask);
+    OpenWriter();
+    umask(before);
+    ASSERT_TRUE(writer->IsOpen());
+    EXPECT_EQ(ModeOf(index), 0700U);
+    EXPECT_EQ(ModeOf(file), 0600U);
+    writer.reset();
+  }
+}
+
+TEST_F(DatabaseTest, OpensAgainWithWhatWasCommitted) {
+  OpenWriter();
+  ASSERT_TRUE(writer->IsOpen());
+  EXPECT_EQ(Held(), Names({"", "a"}));
+}
+
+TEST_F(DatabaseTest, RemovedFolderIsMissedThenRebuilt) {
+  RemoveTree(index);
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, RemovedShareFolderIsMissedThenRebuilt) {
+  RemoveTree(ShareFolder("s"));
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, RemovedFileIsMissedThenRebuilt) {
+  RemoveTree(file);
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, EmptyFileIsMissedThenRebuilt) {
+  for (const char* name : {"", "-wal", "-shm"}) {
+    WriteFile(file + name, "");
+  }
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, PlainFileInPlaceOfTheFolderIsMissedThenRebuilt) {
+  RemoveTree(index);
+  WriteFile(index, "x");
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, DirectoryInPlaceOfTheFileIsMissedThenRebuilt) {
+  RemoveTree(file);
+  MakeFolder(file + "/x");
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, PipeInPlaceOfTheFileIsMissedThenRebuilt) {
+  RemoveTree(file);
+  ASSERT_EQ(mkfifo(file.c_str(), 0600), 0);
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, PipeInPlaceOfTheFolderIsMissedThenRebuilt) {
+  RemoveTree(index);
+  ASSERT_EQ(mkfifo(index.c_str(), 0600), 0);
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, OtherSchemaIsMissedThenRebuilt) {
+  Run("sqlite3 " + file + " 'PRAGMA user_version = 99'");
+  ExpectMissedThenRebuilt();
+  EXPECT_FALSE(Exists(DamagedIndexPath("s")));
+}
+
+TEST_F(DatabaseTest, ForeignDatabaseIsMissedThenRebuilt) {
+  RemoveTree(index);
+  MakeFolder(index);
+  Run("sqlite3 " + file + " 'CREATE TABLE t(a)'");
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, GarbageIsSetAsideThenRebuilt) {
+  RemoveTree(file + "-wal");
+  WriteFile(file, std::string(9000, 'x'));
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(ReadFile(DamagedIndexPath("s") + "/entries.db"), std::string(9000, 'x'));
+}
+
+TEST_F(DatabaseTest, TruncatedDatabaseIsSetAsideThenRebuilt) {
+  Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
+  ASSERT_EQ(truncate(file.c_str(), 8192), 0);
+  ExpectMissedThenRebuilt();
+  EXPECT_TRUE(Exists(DamagedIndexPath("s")));
+}
+
+TEST_F(DatabaseTest, DatabaseWithoutItsTablesIsSetAsideThenRebuilt) {
+  Run("sqlite3 " + file + " 'DROP TABLE entries'");
+  ExpectMissedThenRebuilt();
+  EXPECT_TRUE(Exists(DamagedIndexPath("s")));
+}
+
+TEST_F(DatabaseTest, SecondDamageWithinTheHourKeepsTheFirstCopy) {
+  WriteFile(file, std::string(9000, 'x'));
+  RemoveTree(file + "-wal");
+  ExpectMissedThenRebuilt();
+  writer.reset();
+  RemoveTree(file + "-wal");
+  WriteFile(file, std::string(9000, 'y'));
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(ReadFile(DamagedIndexPath("s") + "/entries.db")[0], 'x');
+
+  writer.reset();
+  RemoveTree(file + "-wal");
+  WriteFile(file, std::string(9000, 'z'));
+  const utimbuf old = {1000, 1000};
+  ASSERT_EQ(utime(DamagedIndexPath("s").c_str(), &old), 0);
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(ReadFile(DamagedIndexPath("s") + "/entries.db")[0], 'z');
+}
+
+TEST_F(DatabaseTest, DamageFoundAtWorkIsSeenByTheNextOpening) {
+  Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
+  std::string bytes = ReadFile(file);
+  ASSERT_GT(bytes.size(), 5U * 4096);
+  std::fill(bytes.begin() + 4096, bytes.end(), '\xee');
+  // The first page alone is whole: opening does not look further than the tables' text.
+  WriteFile(file, bytes);
+  OpenWriter();
+  if (writer->IsOpen()) {
+    EXPECT_FALSE(writer->Add(At("a"), {}));
+    EXPECT_EQ(writer->last_error, IndexError::DAMAGED);
+    EXPECT_FALSE(writer->IsOpen());
+  }
+  ExpectMissedThenRebuilt();
+}
+
+TEST_F(DatabaseTest, ReadingRepairsAndMovesNothing) {
+  RemoveTree(file + "-wal");
+  WriteFile(file, std::string(9000, 'x'));
+  EntryReader reader;
+
+  EXPECT_EQ(reader.Open("s"), IndexError::DAMAGED);
+  EXPECT_EQ(ReadFile(file), std::string(9000, 'x'));
+  EXPECT_FALSE(Exists(DamagedIndexPath("s")));
+}
+
+TEST_F(DatabaseTest, FreedPagesGoBack) {
+  MakeFolder(At("d"));
+  for (int i = 0; i < 3000; ++i) {
+    WriteFile(At("d/some longer name of a file " + std::to_string(i)), "");
+  }
+  OpenWriter();
+  AddAll();
+  Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
+  const auto before = std::filesystem::file_size(file);
+  Delete("d", DeleteMode::ALL);
+  Commit();
+  for (int i = 0; i < 10; ++i) {
+    WriteFile(At("a"), std::string(static_cast<size_t>(i) + 1, 'x'));
+    Refresh("a");
+    Commit();
+  }
+  Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
+  EXPECT_LT(std::filesystem::file_size(file), before - 200000);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,107 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/index/fixture.h"
+
+namespace fileindexd {
+
+class ReaderTest : public IndexTest {};
+
+TEST_F(ReaderTest, EntryTellsWhatTheDiskShows) {
+  WriteFile(At("a.txt"), "12345");
+  Add("a.txt");
+  Commit();
+
+  const Entry entry = Find("a.txt");
+  EXPECT_EQ(entry.thing, Thing::FILE);
+  EXPECT_EQ(entry.kind, Kind::DOCUMENT);
+  EXPECT_EQ(entry.size, 5);
+  EXPECT_GT(entry.mtime, 0);
+  EXPECT_GE(entry.first_seen, entry.mtime);
+  EXPECT_EQ(entry.mode & 0777U, ModeOf(At("a.txt")));
+}
+
+TEST_F(ReaderTest, DirectoryHasNoSizeAndNoTime) {
+  MakeFolder(At("d"));
+  Add("d");
+  Commit();
+
+  EXPECT_EQ(Find("d").kind, Kind::FOLDER);
+  EXPECT_EQ(Find("d").size, 0);
+  EXPECT_EQ(Find("d").mtime, 0);
+}
+
+TEST_F(ReaderTest, UnderTakesTheEntryAndWhatLiesBelowItAlone) {
+  for (const char* name : {"a", "a!b", "a.b", "a0"}) {
+    MakeFolder(At(name));
+    WriteFile(At(std::string(name) + "/f"), "");
+  }
+  AddAll();
+
+  Names names;
+  ASSERT_TRUE(Read()->ForEach(At("a"), [&](const Entry& entry) {
+    names.push_back(entry.path);
+    return true;
+  }));
+  EXPECT_EQ(names, Names({At("a"), At("a/f")}));
+}
+
+TEST_F(ReaderTest, VisitorEndsTheReading) {
+  for (const char* name : {"a", "b", "c"}) {
+    WriteFile(At(name), "");
+  }
+  AddAll();
+
+  int visited = 0;
+  EXPECT_TRUE(Read()->ForEach(root, [&](const Entry&) { return ++visited < 2; }));
+  EXPECT_EQ(visited, 2);
+}
+
+TEST_F(ReaderTest, WritesThatAreNotCommittedAreNotSeen) {
+  AddAll();
+  WriteFile(At("a"), "");
+  Add("a");
+
+  EXPECT_EQ(Held(), Names({""}));
+  Commit();
+  EXPECT_EQ(Held(), Names({"", "a"}));
+}
+
+TEST_F(ReaderTest, WorksWhereTheLogMustBeMade) {
+  WriteFile(At("a"), "");
+  AddAll();
+  writer.reset();
+  const std::string file = state_root + "/shares/s/index/entries.db";
+  Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
+  RemoveTree(file + "-wal");
+  RemoveTree(file + "-shm");
+
+  EXPECT_EQ(Held(), Names({"", "a"}));
+}
+
+TEST_F(ReaderTest, NothingIsMadeWhereThereIsNoIndex) {
+  writer.reset();
+  RemoveTree(state_root + "/shares/s/index");
+
+  EntryReader reader;
+  EXPECT_EQ(reader.Open("s"), IndexError::PATH_NOT_FOUND);
+  EXPECT_FALSE(Exists(state_root + "/shares/s/index"));
+}
+
+TEST_F(ReaderTest, FindOfWhatIsNotHeldIsFalse) {
+  Entry entry;
+  entry.id = 7;
+  EXPECT_FALSE(Read()->Find(At("none"), entry));
+  EXPECT_EQ(entry.id, 7);
+}
+
+TEST_F(ReaderTest, TimeOfTheLastCommitIsKept) {
+  EntryReader::Summary summary;
+  ASSERT_TRUE(Read()->Summarise(summary));
+  EXPECT_EQ(summary.last_commit, 0);
+  AddAll();
+
+  ASSERT_TRUE(Read()->Summarise(summary));
+  EXPECT_GT(summary.last_commit, 0);
+  EXPECT_EQ(summary.entries, 1U);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,112 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A share whose disk is not there, or is another one.
+#include "tests/unit/index/fixture.h"
+
+namespace fileindexd {
+
+class RootTest : public IndexTest {
+ protected:
+  void MountRoot() override {
+    MountImage("ext4", root);
+    MakeFolder(At("d"));
+    WriteFile(At("d/f"), "");
+    WriteFile(At("a"), "");
+  }
+
+  void ExpectRefused(bool done) {
+    EXPECT_FALSE(done);
+    EXPECT_EQ(writer->last_error, IndexError::ROOT);
+  }
+  void ExpectAllRefused() {
+    ExpectRefused(writer->Refresh(At("a"), {}, {}));
+    ExpectRefused(writer->Refresh(At("d"), {}, {}));
+    ExpectRefused(writer->Refresh(root, {}, {}));
+    for (const DeleteMode mode : {DeleteMode::ENTRY, DeleteMode::STALE, DeleteMode::ALL}) {
+      ExpectRefused(writer->Delete(At("d"), mode));
+      ExpectRefused(writer->Delete(At("a"), mode));
+    }
+    Commit();
+  }
+};
+
+TEST_F(RootTest, UnmountedDiskEmptiesNothing) {
+  AddAll();
+  const Names before = Held();
+  Unmount(root);
+
+  ExpectAllRefused();
+  EXPECT_EQ(Held(), before);
+}
+
+TEST_F(RootTest, UnmountedDiskEmptiesNothingWithAWriterThatWasOpenedLater) {
+  AddAll();
+  const Names before = Held();
+  Unmount(root);
+  OpenWriter();
+
+  ExpectAllRefused();
+  EXPECT_EQ(Held(), before);
+}
+
+TEST_F(RootTest, WhatLiesUnderTheMountPointIsNotAdded) {
+  AddAll();
+  const Names before = Held();
+  Unmount(root);
+  WriteFile(At("under"), "");
+
+  ExpectRefused(writer->Add(At("under"), {}));
+  Commit();
+  EXPECT_EQ(Held(), before);
+}
+
+TEST_F(RootTest, OtherDiskInItsPlaceChangesNothing) {
+  AddAll();
+  const Names before = Held();
+  MountImage("ext4", root);
+  WriteFile(At("a"), "other");
+
+  ExpectAllRefused();
+  ExpectRefused(writer->Add(At("a"), {}));
+  EXPECT_EQ(Held(), before);
+}
+
+TEST_F(RootTest, ComparisonOfAnUnmountedShareIsRefused) {
+  AddAll();
+  Unmount(root);
+  Comparison result;
+  std::string error;
+
+  EXPECT_FALSE(CompareShare(
+      *store, "s", [](Difference, const std::string&) { return true; }, result, error));
+  EXPECT_NE(error.find(root), std::string::npos);
+}
+
+TEST_F(RootTest, ChangesBeforeTheUnmountingAreCommitted) {
+  AddAll();
+  WriteFile(At("b"), "");
+  Add("b");
+  const std::string image = last_image;
+  Unmount(root);
+  ExpectRefused(writer->Delete(At("b"), DeleteMode::ENTRY));
+  Commit();
+  Run("mount -o loop " + image + " " + root);
+  mounted.push_back(root);
+
+  EXPECT_EQ(Differences(), Names());
+}
+
+TEST_F(RootTest, DiskThatIsBackIsIndexedOn) {
+  AddAll();
+  const std::string image = last_image;
+  Unmount(root);
+  ExpectAllRefused();
+  Run("mount -o loop " + image + " " + root);
+  mounted.push_back(root);
+  RemoveTree(At("d"));
+
+  Refresh("d");
+  Commit();
+  EXPECT_EQ(Differences(), Names());
+}
+
+}  // namespace fileindexd
