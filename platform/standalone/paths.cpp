@@ -21,8 +21,23 @@ struct Glance {
   std::string path;
   int64_t time = 0;  // monotonic
   std::shared_ptr<const Settings> settings;
+  Verdict verdict = Verdict::UNKNOWN;
   Thing thing = Thing::NONE;
 };
+
+// What exists does not depend on whether it belongs. A verdict on the name alone has not looked.
+bool IsNameVerdict(Verdict verdict) {
+  switch (verdict) {
+    case Verdict::BAD_PATH:
+    case Verdict::NO_SHARE:
+    case Verdict::NOT_COVERED:
+    case Verdict::SKIPPED_NAME:
+    case Verdict::OWN_STATE:
+      return true;
+    default:
+      return false;
+  }
+}
 
 int64_t Now() {
   timespec now = {};
@@ -35,7 +50,9 @@ const Glance& GlanceAt(const std::string& path) {
   const int64_t now = Now();
   if (kept.settings == nullptr || kept.path != path || now - kept.time >= GLANCE_NS) {
     kept.settings = CurrentSettings();
-    kept.thing = ThingAt(*kept.settings, path);
+    const Look look = LookAt(*kept.settings, path);
+    kept.verdict = look.verdict;
+    kept.thing = IsNameVerdict(look.verdict) ? ThingAt(*kept.settings, path) : look.thing;
     kept.path = path;
     // Between two passes a queue file is asked for. That look is not kept, and so nothing that was
     // seen before the drain is believed after it.
@@ -87,7 +104,7 @@ bool IsSystemPreservedFileName(const std::string& name) {
 // what is gone, and tells what failed.
 bool IsSkipIndex(const std::string& path) {
   const CancelOff off;
-  const Verdict verdict = LookAt(*GlanceAt(path).settings, path).verdict;
+  const Verdict verdict = GlanceAt(path).verdict;
   return verdict != Verdict::BELONGS && verdict != Verdict::GONE && verdict != Verdict::UNKNOWN;
 }
 
