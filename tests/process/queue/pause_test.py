@@ -40,7 +40,7 @@ class PauseTest(IndexTest):
         self.await_line(ADDED, count=100)
 
         self.assertEqual(self.command("pause"), 0)
-        after = self.await_line("SetPaused: true")
+        after = self.log.mark()
         # The operation that was under way ends; the next one waits.
         self.assertIsNone(self.log.find(ADDED, after, count=2, limit=1.0))
 
