@@ -92,6 +92,13 @@ bool CanBeIndexed(const Settings& settings, const IndexedFolder& added) {
       [](const IndexedFolder& left, const IndexedFolder& right) { return left.path < right.path; });
   changed.folders.insert(place, added);
 
+  const Share* share = settings.ShareByName(added.share);
+  if (share != nullptr && LookAtRoot(*share) != RootState::SOUND) {
+    (void)Fail(EXIT_FAILED, "%s: the share's folder is missing or lies on another file system",
+               share->path.c_str());
+    return false;
+  }
+
   const Look look = LookAt(changed, added.path);
   if (look.verdict != Verdict::BELONGS) {
     (void)Fail(EXIT_FAILED, "%s: cannot be indexed: %s", added.path.c_str(),

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/compare.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <vector>
@@ -210,6 +211,13 @@ bool CompareShare(StateStore& store, const std::string& share_name,
 
   EntryReader reader;
   const IndexError opened = reader.Open(share_name);
+  const bool wants_none =
+      std::none_of(settings->folders.begin(), settings->folders.end(),
+                   [&](const IndexedFolder& folder) { return folder.share == share_name; });
+  if (opened == IndexError::PATH_NOT_FOUND && wants_none) {
+    result = {};
+    return true;  // nothing belongs in an index, and there is none
+  }
   if (opened != IndexError::NONE) {
     error = "share " + share_name + ": " + IndexErrorText(opened);
     return false;

@@ -35,6 +35,7 @@ bool ReadNames(const std::string& directory, std::vector<std::string>& names) {
 
   for (;;) {
     errno = 0;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): the stream is this thread's own
     const dirent* found = readdir(stream.dir);
     if (found == nullptr) {
       return errno == 0 || IsGone(errno);
@@ -78,7 +79,8 @@ void DiskWalk::StartAtFolders(const Share& share) {
   }
   std::sort(level.items.begin(), level.items.end(),
             [](const Item& a, const Item& b) { return a.key < b.key; });
-  levels.assign(1, std::move(level));
+  levels.clear();
+  levels.push_back(std::move(level));
 }
 
 void DiskWalk::StartBelow(const std::string& directory) {

@@ -35,7 +35,7 @@ EndingMap MakeEndingMap() {
 }  // namespace
 
 Kind KindOfName(std::string_view name) {
-  static const EndingMap ENDINGS = MakeEndingMap();
+  static const EndingMap endings = MakeEndingMap();
   constexpr size_t LONGEST = 16;
 
   const size_t dot = name.rfind('.');
@@ -51,8 +51,8 @@ Kind KindOfName(std::string_view name) {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
   });
 
-  const auto found = ENDINGS.find(std::string_view(lower.data(), ending.size()));
-  return found == ENDINGS.end() ? Kind::OTHER : found->second;
+  const auto found = endings.find(std::string_view(lower.data(), ending.size()));
+  return found == endings.end() ? Kind::OTHER : found->second;
 }
 
 const char* KindText(Kind kind) {

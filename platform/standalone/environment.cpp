@@ -3,6 +3,7 @@
 
 #include <map>
 #include <mutex>
+#include <set>
 
 #include "platform/log.h"
 #include "state/queue_writer.h"
@@ -17,6 +18,7 @@ struct Environment {
   bool open_failure_told = false;
   std::shared_ptr<const Settings> settings = std::make_shared<Settings>();
   std::map<std::string, bool> commits;  // by share: whether the last one was good
+  std::set<std::string> reopening;      // shares with a good commit and no opening since
   rlimit descriptors = {RLIM_INFINITY, RLIM_INFINITY};
 };
 
@@ -125,6 +127,15 @@ void NoteCommit(const std::string& share, bool good) {
   Environment& process = Process();
   const std::lock_guard guard(process.mutex);
   process.commits[share] = good;
+  if (good) {
+    process.reopening.insert(share);
+  }
+}
+
+bool TakeReopening(const std::string& share) {
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  return process.reopening.erase(share) != 0;
 }
 
 bool WasLastCommitGood(const std::string& share) {

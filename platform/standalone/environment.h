@@ -29,6 +29,8 @@ bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus
 bool RequestReindex(const std::string& share);
 
 void NoteCommit(const std::string& share, bool good);
+// True once after each good commit: what is opened then is a database that was there.
+bool TakeReopening(const std::string& share);
 // False while the last commit of the share's index failed.
 bool WasLastCommitGood(const std::string& share);
 

@@ -74,6 +74,11 @@ Indexer::Indexer(const std::string& db_path, _tag_backend_ir /*backend*/) {
     }
     handle = std::make_unique<Handle>(ShareOfDatabase(db_path), *store);
     last_error = static_cast<int>(handle->writer.last_error);
+    // The database was there at the commit, and nobody may touch the share for long: what it held
+    // comes back without waiting for the next event.
+    if (TakeReopening(handle->share_name) && last_error == ERROR_PATH_NOT_FOUND) {
+      RequestReindex(handle->share_name);
+    }
     return true;
   });
 }

@@ -92,7 +92,7 @@ bool CanFullPathBeIndexed(const std::string& path) {
     }
 
     const Share* share = settings->ShareOfPath(*normal);
-    return share != nullptr && (share->path == *normal || IsMountPoint(*normal) != 1);
+    return share != nullptr && (share->path == *normal || IsMountPoint(*normal) == 0);
   });
 }
 
