@@ -43,7 +43,8 @@ bool HasFreshCopy(const std::string& damaged_path) {
 bool SetAside(const std::string& index_path, const char* reason) {
   const std::string damaged_path = index_path + ".damaged";
   if (HasFreshCopy(damaged_path)) {
-    syslog(LOG_ERR, "index damaged and removed, path=%s, reason=%s", index_path.c_str(), reason);
+    syslog(LOG_ERR, "%s:%d index damaged and removed, path=%s, reason=%s", __FILE__, __LINE__,
+           index_path.c_str(), reason);
     return RemoveAll(index_path);
   }
 
@@ -57,8 +58,8 @@ bool SetAside(const std::string& index_path, const char* reason) {
 
   // The copy's age counts from now, not from the last file that was made in it.
   (void)utimes(damaged_path.c_str(), nullptr);
-  syslog(LOG_ERR, "index damaged and set aside, path=%s, copy=%s, reason=%s", index_path.c_str(),
-         damaged_path.c_str(), reason);
+  syslog(LOG_ERR, "%s:%d index damaged and set aside, path=%s, copy=%s, reason=%s", __FILE__,
+         __LINE__, index_path.c_str(), damaged_path.c_str(), reason);
   return true;
 }
 

@@ -72,7 +72,11 @@ IndexError EntryWriter::Impl::TryOpen(bool create) {
 IndexError EntryWriter::Impl::OpenFirst() {
   ShareStatus status;
   const bool create = store.GetStatus(share_name, status) && status.rebuild_wanted;
-  return TryOpen(create);
+  const IndexError error = TryOpen(create);
+  if (error == IndexError::PATH_NOT_FOUND) {
+    next_open = 0;  // told once: the first operation may make it anew
+  }
+  return error;
 }
 
 IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {

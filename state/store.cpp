@@ -62,7 +62,8 @@ bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
 
   std::string reason;
   if (!LeaveStateCopy(*connection, reason)) {
-    syslog(LOG_ERR, "%s", reason.c_str());  // the change itself is safe
+    // The change itself is safe.
+    syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, reason.c_str());
   }
   return true;
 }

@@ -323,11 +323,11 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     connection.reset();  // or its closing would write to what is put in place
     const std::string found = error;
     if (!PutCopyInPlace(path, lock, error)) {
-      syslog(LOG_ERR, "%s", error.c_str());
+      syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, error.c_str());
       return nullptr;
     }
-    syslog(LOG_ERR, "%s; its last copy is used instead, and it is kept as %s.damaged",
-           found.c_str(), path.c_str());
+    syslog(LOG_ERR, "%s:%d %s; its last copy is used instead, and it is kept as %s.damaged",
+           __FILE__, __LINE__, found.c_str(), path.c_str());
     recovered = true;
   }
 }

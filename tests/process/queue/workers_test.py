@@ -100,6 +100,24 @@ class WorkersTest(IndexTest):
         (share,) = self.ctl("status", "--json").json()["shares"]
         self.assertFalse(share["needs_reindex"])
 
+    def test_index_damaged_while_running_is_made_anew_without_another_event(self):
+        root = self.make_share(files=[f"d/{i}.txt" for i in range(300)])
+        self.start()
+        self.await_drained("alpha")
+        folder = f"{namespace.STATE}/shares/alpha/index"
+        for name in ("entries.db", "entries.db-wal"):
+            with open(f"{folder}/{name}", "r+b") as file:
+                file.write(b"no database" * 300)
+        self.make_files(root, "c.txt")
+        after = self.log.mark()
+
+        self.append("alpha", {"event": CREATE, "path": f"{root}/c.txt"})
+
+        self.await_line(f"IndexDirAdd: {root}", after)
+        self.await_line("Worker[alpha] finished all task, stopping", after)
+        self.await_drained("alpha")
+        self.assert_index(root)
+
 
 class ManyPairsTest(IndexTest):
     def counts(self, pid):

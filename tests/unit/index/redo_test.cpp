@@ -71,15 +71,14 @@ TEST_F(RedoTest, OtherFileMovedOntoTheDatabaseIsNoticed) {
   EXPECT_TRUE(Status().needs_reindex);
 }
 
-TEST_F(RedoTest, WriterThatDidNotOpenKeepsItsOperationsAndRebuildsAtTheCommit) {
+TEST_F(RedoTest, WriterThatFoundNoDatabaseMakesItAtItsFirstOperation) {
   writer.reset();
   RemoveTree(IndexPath("s"));
   OpenWriter();
   ASSERT_EQ(writer->last_error, IndexError::PATH_NOT_FOUND);
-  WriteFile(At("a"), "");
-  EXPECT_FALSE(writer->Add(At("a"), {}));
-  EXPECT_EQ(writer->last_error, IndexError::PATH_NOT_FOUND);
   EXPECT_FALSE(Exists(IndexPath("s")));
+  WriteFile(At("a"), "");
+  EXPECT_TRUE(writer->Add(At("a"), {}));
 
   Commit();
   EXPECT_EQ(Held(), Names({"a"}));
