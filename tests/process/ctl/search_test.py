@@ -11,8 +11,8 @@ FILES = [
     "holiday/beach.mp4",
     "holiday/plan.txt",
     "music/beach boys.mp3",
-    "work/report beach.pdf",
-    "work/budget.xyz",
+    "office/report beach.pdf",
+    "office/budget.xyz",
 ]
 
 
@@ -38,7 +38,7 @@ class SearchTest(IndexTest):
                 "alpha/holiday/beach.jpg",
                 "alpha/holiday/beach.mp4",
                 "alpha/music/beach boys.mp3",
-                "alpha/work/report beach.pdf",
+                "alpha/office/report beach.pdf",
                 "beta/beach.txt",
             ],
         )
@@ -53,7 +53,7 @@ class SearchTest(IndexTest):
         self.assertEqual(self.hits("beach", "--kind=video"), ["alpha/holiday/beach.mp4"])
         self.assertEqual(self.hits("--kind", "folder", "holiday"), ["alpha/holiday"])
         self.assertEqual(
-            self.hits("--under", f"{self.root}/work", "beach"), ["alpha/work/report beach.pdf"]
+            self.hits("--under", f"{self.root}/office", "beach"), ["alpha/office/report beach.pdf"]
         )
 
     def test_limit_offset_and_count(self):
@@ -84,7 +84,7 @@ class SearchTest(IndexTest):
         hits = self.ctl("search", "--json", "budget").objects()
 
         (hit,) = hits
-        path = f"{self.root}/work/budget.xyz"
+        path = f"{self.root}/office/budget.xyz"
         self.assertEqual(full_path(hit), path.encode())
         self.assertEqual((hit["share"], hit["kind"]), ("alpha", "other"))
         info = os.stat(path)
