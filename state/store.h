@@ -24,6 +24,7 @@ struct ShareStatus {
   bool no_space = false;        // cleared by whoever sees that there is space again
   bool missing = false;         // the last opening of the index found no database
   bool rebuild_wanted = false;  // the next opening may create the database
+  bool accept_empty = false;    // an empty root is what the user wants; set by tools
 };
 
 class StateStore {

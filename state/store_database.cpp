@@ -19,7 +19,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int SCHEMA_VERSION = 1;
+constexpr int SCHEMA_VERSION = 2;
 constexpr int BUSY_WAIT_MS = 5000;
 constexpr std::chrono::milliseconds LOCK_WAIT(BUSY_WAIT_MS);
 constexpr std::chrono::milliseconds LOCK_NAP(5);
@@ -35,6 +35,9 @@ constexpr const char* UPGRADES[SCHEMA_VERSION] = {
     " rebuild_wanted INT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE number(name TEXT PRIMARY KEY, value INT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE marker(name BLOB PRIMARY KEY) WITHOUT ROWID;",
+    "CREATE TABLE exclude(folder BLOB NOT NULL, place INT NOT NULL, pattern BLOB NOT NULL,"
+    " PRIMARY KEY(folder, place)) WITHOUT ROWID;"
+    "ALTER TABLE status ADD COLUMN accept_empty INT NOT NULL DEFAULT 0;",
 };
 
 enum class Opened { GOOD, DAMAGED, FAILED };

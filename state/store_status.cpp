@@ -15,12 +15,14 @@ ShareStatus ReadStatus(const Statement& row) {
   status.no_space = row.Int(2) != 0;
   status.missing = row.Int(3) != 0;
   status.rebuild_wanted = row.Int(4) != 0;
+  status.accept_empty = row.Int(5) != 0;
   return status;
 }
 
 bool IsSame(const ShareStatus& a, const ShareStatus& b) {
   return a.needs_reindex == b.needs_reindex && a.reindex_begun == b.reindex_begun &&
-         a.no_space == b.no_space && a.missing == b.missing && a.rebuild_wanted == b.rebuild_wanted;
+         a.no_space == b.no_space && a.missing == b.missing &&
+         a.rebuild_wanted == b.rebuild_wanted && a.accept_empty == b.accept_empty;
 }
 
 }  // namespace
@@ -36,8 +38,8 @@ bool StateStore::Impl::LoadStatus(const std::string& share, ShareStatus& status)
   }
   Statement ask;
   if (!Prepare(ask,
-               "SELECT needs_reindex, reindex_begun, no_space, missing, rebuild_wanted"
-               " FROM status WHERE share = ?")) {
+               "SELECT needs_reindex, reindex_begun, no_space, missing, rebuild_wanted,"
+               " accept_empty FROM status WHERE share = ?")) {
     return false;
   }
   ask.BindBlob(1, share);
@@ -68,7 +70,10 @@ bool StateStore::UpdateStatus(const std::string& share,
       return Impl::Outcome::UNCHANGED;
     }
     Statement write;
-    if (!impl->Prepare(write, "INSERT OR REPLACE INTO status VALUES(?, ?, ?, ?, ?, ?)")) {
+    if (!impl->Prepare(write,
+                       "INSERT OR REPLACE INTO status(share, needs_reindex, reindex_begun,"
+                       " no_space, missing, rebuild_wanted, accept_empty)"
+                       " VALUES(?, ?, ?, ?, ?, ?, ?)")) {
       return Impl::Outcome::FAILED;
     }
     write.BindBlob(1, share);
@@ -77,6 +82,7 @@ bool StateStore::UpdateStatus(const std::string& share,
     write.BindInt(4, after.no_space ? 1 : 0);
     write.BindInt(5, after.missing ? 1 : 0);
     write.BindInt(6, after.rebuild_wanted ? 1 : 0);
+    write.BindInt(7, after.accept_empty ? 1 : 0);
     return impl->Done(impl->Run(write));
   });
 }

@@ -1,0 +1,87 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Databases of older versions are upgraded in place, and keep what they hold.
+#include <sqlite3.h>
+
+#include <filesystem>
+
+#include "state/store.h"
+#include "tests/unit/state/fixture.h"
+
+namespace fileindexd {
+namespace {
+
+// As the first version made it.
+constexpr const char* VERSION_1 =
+    "CREATE TABLE share(name BLOB PRIMARY KEY, path BLOB NOT NULL UNIQUE,"
+    " filesystem TEXT NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE folder(path BLOB PRIMARY KEY, share BLOB NOT NULL, document INT NOT NULL,"
+    " audio INT NOT NULL, video INT NOT NULL, photo INT NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE status(share BLOB PRIMARY KEY, needs_reindex INT NOT NULL,"
+    " reindex_begun INT NOT NULL, no_space INT NOT NULL, missing INT NOT NULL,"
+    " rebuild_wanted INT NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE number(name TEXT PRIMARY KEY, value INT NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE marker(name BLOB PRIMARY KEY) WITHOUT ROWID;"
+    "INSERT INTO share VALUES(CAST('a' AS BLOB), CAST('/v/a' AS BLOB), 'fs');"
+    "INSERT INTO folder VALUES(CAST('/v/a/f' AS BLOB), CAST('a' AS BLOB), 1, 0, 0, 1);"
+    "INSERT INTO status VALUES(CAST('a' AS BLOB), 1, 0, 0, 1, 0);"
+    "INSERT INTO number VALUES('pause', 77);"
+    "INSERT INTO marker VALUES(CAST('m' AS BLOB));"
+    "PRAGMA user_version=1";
+
+class StoreUpgradeTest : public StateTest {
+ protected:
+  StoreUpgradeTest() : database(state_root + "/state.db") {
+    std::filesystem::create_directories(state_root);
+    sqlite3* db = nullptr;
+    EXPECT_EQ(sqlite3_open(database.c_str(), &db), SQLITE_OK);
+    EXPECT_EQ(sqlite3_exec(db, VERSION_1, nullptr, nullptr, nullptr), SQLITE_OK)
+        << sqlite3_errmsg(db);
+    sqlite3_close(db);
+  }
+
+  void ExpectAllThere(StateStore& store) {
+    std::shared_ptr<const Settings> settings;
+    ASSERT_TRUE(store.GetSettings(settings)) << store.Error();
+    ASSERT_EQ(settings->shares.size(), 1U);
+    EXPECT_EQ(settings->shares[0].filesystem, "fs");
+    ASSERT_EQ(settings->folders.size(), 1U);
+    EXPECT_EQ(settings->folders[0].path, "/v/a/f");
+    EXPECT_EQ(settings->folders[0].wanted, (ContentFlags{true, false, false, true}));
+    ShareStatus status;
+    ASSERT_TRUE(store.GetStatus("a", status)) << store.Error();
+    EXPECT_TRUE(status.needs_reindex && status.missing);
+    EXPECT_FALSE(status.reindex_begun || status.accept_empty);
+    int64_t resume_time = 0;
+    EXPECT_TRUE(store.GetPause(resume_time));
+    EXPECT_EQ(resume_time, 77);
+    bool has = false;
+    EXPECT_TRUE(store.HasMarker("m", has) && has);
+  }
+
+  std::string database;
+};
+
+TEST_F(StoreUpgradeTest, TheFirstVersionKeepsAllThatItHolds) {
+  ExpectAllThere(*OpenStore());
+  ExpectAllThere(*OpenStore());  // upgraded once, opened again as it is
+}
+
+TEST_F(StoreUpgradeTest, WhatIsNewCanBeSetAfterAnUpgrade) {
+  const auto store = OpenStore();
+  ASSERT_TRUE(store->UpdateStatus("a", [](ShareStatus& status) { status.accept_empty = true; }))
+      << store->Error();
+
+  ShareStatus status;
+  ASSERT_TRUE(OpenStore()->GetStatus("a", status));
+  EXPECT_TRUE(status.accept_empty && status.needs_reindex);
+}
+
+TEST_F(StoreUpgradeTest, ACopyOfAnOlderVersionTakesTheDatabasesPlaceAndIsUpgraded) {
+  std::filesystem::rename(database, database + ".copy");
+  WriteFile(database, std::string(8192, 'x'));
+
+  ExpectAllThere(*OpenStore());
+}
+
+}  // namespace
+}  // namespace fileindexd
