@@ -123,6 +123,16 @@ DiskWalk::Step DiskWalk::Next(std::string& path, Look& look) {
       }
       return Step::FOUND;
     }
+    // A folder below it is indexed all the same; this one and what else it holds is not.
+    if (look.verdict == Verdict::EXCLUDED && settings.HasFolderBelow(path)) {
+      look = LookPastExcludes(settings, path);
+      if (look.verdict == Verdict::UNKNOWN) {
+        return Step::FAILED;
+      }
+      if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY) {
+        AllowDescent(level, look, path);
+      }
+    }
   }
   return Step::END;
 }

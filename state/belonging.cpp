@@ -8,6 +8,14 @@ namespace fileindexd {
 
 namespace {
 
+// The part of `path` below `parent`, which covers it; empty for `parent` itself.
+std::string_view Below(std::string_view parent, std::string_view path) {
+  path.remove_prefix(path.size() == parent.size() ? parent.size()
+                     : parent == "/"              ? 1
+                                                  : parent.size() + 1);
+  return path;
+}
+
 bool HasSkippedName(std::string_view below) {
   while (!below.empty()) {
     const size_t slash = below.find('/');
@@ -44,12 +52,30 @@ Verdict JudgeName(const Settings& settings, const std::string& path) {
   if (!settings.state_root.empty() && Covers(settings.state_root, *normal)) {
     return Verdict::OWN_STATE;
   }
-  if (settings.FolderOfPath(*normal) == nullptr) {
+  const IndexedFolder* folder = settings.FolderOfPath(*normal);
+  if (folder == nullptr) {
     return Verdict::NOT_COVERED;
   }
   std::string_view below = *normal;
   below.remove_prefix(share->path.size());
-  return HasSkippedName(below) ? Verdict::SKIPPED_NAME : Verdict::BELONGS;
+  if (HasSkippedName(below)) {
+    return Verdict::SKIPPED_NAME;
+  }
+  const Excludes::Match match = folder->excludes.KeepOut(Below(folder->path, *normal), Leaf::OTHER);
+  return match.pattern != nullptr ? Verdict::EXCLUDED : Verdict::BELONGS;
+}
+
+Exclusion FindExclusion(const Settings& settings, const std::string& path, Leaf leaf) {
+  const IndexedFolder* folder = settings.FolderOfPath(path);
+  if (folder == nullptr) {
+    return {};
+  }
+  const std::string_view below = Below(folder->path, path);
+  const Excludes::Match match = folder->excludes.KeepOut(below, leaf);
+  if (match.pattern == nullptr) {
+    return {};
+  }
+  return {folder, match.pattern, path.substr(0, path.size() - below.size() + match.length)};
 }
 
 const char* VerdictText(Verdict verdict) {
@@ -66,6 +92,8 @@ const char* VerdictText(Verdict verdict) {
       return "has a name that is passed over";
     case Verdict::OWN_STATE:
       return "in the indexer's own folder";
+    case Verdict::EXCLUDED:
+      return "kept out by an exclude pattern";
     case Verdict::GONE:
       return "does not exist";
     case Verdict::BEHIND_LINK:

@@ -3,7 +3,8 @@
 //
 // A path belongs when an indexed folder covers it, no component below the share's root has a
 // preserved or passing name, and it lies neither below a nested mount point, nor behind a symbolic
-// link, nor in a snapshot, nor in our own state folder; and when it is a directory, a regular file
+// link, nor in a snapshot, nor in our own state folder, and no pattern of the deepest folder that
+// covers it keeps it out; and when it is a directory, a regular file
 // or a symbolic link. The path of a nested mount point itself belongs, as one entry.
 //
 // Everything here may be called from any thread at any time.
@@ -26,6 +27,7 @@ enum class Verdict {
   NOT_COVERED,   // by no indexed folder
   SKIPPED_NAME,  // a component below the share's root has a preserved or passing name
   OWN_STATE,     // in our own state folder
+  EXCLUDED,      // by a pattern of the indexed folder, see excludes.h
   GONE,          // does not exist
   BEHIND_LINK,   // a directory on the way is a symbolic link
   BELOW_MOUNT,   // below a nested mount point
@@ -56,8 +58,21 @@ struct Look {
 // Looks at a path and judges it. Three system calls for an ordinary file.
 Look LookAt(const Settings& settings, const std::string& path);
 
-// The same judged by the path alone: BELONGS when nothing in its letters speaks against it.
+// The same judged by the path alone: BELONGS when nothing in its letters speaks against it. A
+// pattern for directories alone speaks only against what lies below one.
 Verdict JudgeName(const Settings& settings, const std::string& path);
+
+// As LookAt, but excludes do not count: for the way to an indexed folder that lies below what
+// another folder's pattern keeps out.
+Look LookPastExcludes(const Settings& settings, const std::string& path);
+
+// The pattern that keeps normal path `path` out, and whose it is. Both live as long as `settings`.
+struct Exclusion {
+  const IndexedFolder* folder = nullptr;  // null: no pattern does
+  const std::string* pattern = nullptr;
+  std::string path;  // what the pattern matches: `path`, or a directory above it
+};
+Exclusion FindExclusion(const Settings& settings, const std::string& path, Leaf leaf);
 
 // What exists at `path`: the last component not followed, and nothing below a share's root behind a
 // symbolic link. NONE for special files, and when it cannot be told.

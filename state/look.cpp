@@ -196,16 +196,9 @@ Look LookWithCare(const std::string& root_path, const std::string& path) {
   return Look{};
 }
 
-}  // namespace
-
-Look LookAt(const Settings& settings, const std::string& path) {
+// What the disk says of a path that lies in a share.
+Look LookOnDisk(const Settings& settings, const std::string& normal) {
   Look look;
-  look.verdict = JudgeName(settings, path);
-  if (look.verdict != Verdict::BELONGS) {
-    return look;
-  }
-
-  const std::string normal = NormalPath(path).value_or(path);
   const std::string& root_path = settings.ShareOfPath(normal)->path;
   struct statx st {};
   look.verdict = See(root_path, normal, st);
@@ -219,6 +212,33 @@ Look LookAt(const Settings& settings, const std::string& path) {
     return LookWithCare(root_path, normal);
   }
   look.verdict = JudgeInMount(*root, normal, look.device, look.thing);
+  return look;
+}
+
+}  // namespace
+
+Look LookAt(const Settings& settings, const std::string& path) {
+  Look look;
+  look.verdict = JudgeName(settings, path);
+  if (look.verdict != Verdict::BELONGS) {
+    return look;
+  }
+  const std::string normal = NormalPath(path).value_or(path);
+  look = LookOnDisk(settings, normal);
+  // Only now it is known whether the patterns for directories count.
+  if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY &&
+      FindExclusion(settings, normal, Leaf::DIRECTORY).pattern != nullptr) {
+    look.verdict = Verdict::EXCLUDED;
+  }
+  return look;
+}
+
+Look LookPastExcludes(const Settings& settings, const std::string& path) {
+  Look look;
+  look.verdict = JudgeName(settings, path);
+  if (look.verdict == Verdict::BELONGS || look.verdict == Verdict::EXCLUDED) {
+    look = LookOnDisk(settings, NormalPath(path).value_or(path));
+  }
   return look;
 }
 

@@ -42,4 +42,12 @@ const IndexedFolder* Settings::FolderAt(std::string_view path) const {
   return found != folders.end() && found->path == path ? &*found : nullptr;
 }
 
+bool Settings::HasFolderBelow(std::string_view path) const {
+  const std::string first = path == "/" ? "/" : std::string(path) + "/";
+  const auto found = std::upper_bound(
+      folders.begin(), folders.end(), first,
+      [](const std::string& wanted, const IndexedFolder& folder) { return wanted < folder.path; });
+  return found != folders.end() && found->path.starts_with(first);
+}
+
 }  // namespace fileindexd

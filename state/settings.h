@@ -6,6 +6,8 @@
 #include <string_view>
 #include <vector>
 
+#include "state/excludes.h"
+
 namespace fileindexd {
 
 // Kinds of content that are wanted.
@@ -29,6 +31,7 @@ struct IndexedFolder {
   std::string share;  // name
   std::string path;   // normal; the share's path or below it
   ContentFlags wanted;
+  Excludes excludes = {};  // relative to the folder; those of a folder inside it do not add to them
 };
 
 struct Settings {
@@ -43,6 +46,8 @@ struct Settings {
   const IndexedFolder* FolderOfPath(std::string_view path) const;
   // The folder at exactly that path.
   const IndexedFolder* FolderAt(std::string_view path) const;
+  // Whether an indexed folder lies below the path; one at it does not count.
+  bool HasFolderBelow(std::string_view path) const;
 };
 
 }  // namespace fileindexd

@@ -19,13 +19,6 @@ std::string ResolvedStateRoot() {
   return realpath(root.c_str(), resolved) != nullptr ? resolved : root;
 }
 
-void BindFlags(Statement& statement, int first, const ContentFlags& wanted) {
-  statement.BindInt(first, wanted.document ? 1 : 0);
-  statement.BindInt(first + 1, wanted.audio ? 1 : 0);
-  statement.BindInt(first + 2, wanted.video ? 1 : 0);
-  statement.BindInt(first + 3, wanted.photo ? 1 : 0);
-}
-
 }  // namespace
 
 bool StateStore::Impl::Open() {
@@ -112,10 +105,10 @@ bool StateStore::Impl::LoadTables(Settings& settings) {
                                  folders.Int(5) != 0};
     settings.folders.push_back({folders.Bytes(0), folders.Bytes(1), wanted});
   }
-  return result == SQLITE_DONE || FailSql();
+  return result == SQLITE_DONE ? LoadExcludes(settings) : FailSql();
 }
 
-// Both tables as they were at one moment.
+// All tables as they were at one moment.
 bool StateStore::Impl::Load(Settings& settings) {
   const bool own = sqlite3_get_autocommit(connection->db) != 0;
   if (own && !Exec("BEGIN")) {
@@ -217,7 +210,8 @@ bool StateStore::AddShare(const Share& share) {
 
 StateStore::Impl::Outcome StateStore::Impl::Remove(const std::string& share_name) {
   for (const char* sql :
-       {"DELETE FROM folder WHERE share = ?", "DELETE FROM status WHERE share = ?",
+       {"DELETE FROM exclude WHERE folder IN (SELECT path FROM folder WHERE share = ?)",
+        "DELETE FROM folder WHERE share = ?", "DELETE FROM status WHERE share = ?",
         "DELETE FROM share WHERE name = ?"}) {
     Statement remove;
     if (!Prepare(remove, sql)) {
@@ -247,63 +241,6 @@ bool StateStore::SetShareFilesystem(const std::string& name, const std::string& 
     update.BindBlob(2, name);
     return impl->Done(impl->Run(update) && (sqlite3_changes(impl->connection->db) == 1 ||
                                             impl->Fail("there is no share " + name)));
-  });
-}
-
-bool StateStore::AddFolder(const std::string& path, const ContentFlags& wanted) {
-  const std::lock_guard guard(impl->mutex);
-  if (NormalPath(path) != path) {
-    return impl->Fail("not a plain absolute path: " + path);
-  }
-  return impl->ChangeSettings([&] {
-    Settings settings;
-    if (!impl->Load(settings)) {
-      return Impl::Outcome::FAILED;
-    }
-    const Share* share = settings.ShareOfPath(path);
-    if (share == nullptr) {
-      return impl->Done(impl->Fail(path + " lies in no share"));
-    }
-    if (settings.FolderAt(path) != nullptr) {
-      return impl->Done(impl->Fail(path + " is an indexed folder already"));
-    }
-    Statement insert;
-    if (!impl->Prepare(insert, "INSERT INTO folder VALUES(?, ?, ?, ?, ?, ?)")) {
-      return Impl::Outcome::FAILED;
-    }
-    insert.BindBlob(1, path);
-    insert.BindBlob(2, share->name);
-    BindFlags(insert, 3, wanted);
-    return impl->Done(impl->Run(insert));
-  });
-}
-
-bool StateStore::SetFolder(const std::string& path, const ContentFlags& wanted) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->ChangeSettings([&] {
-    Statement update;
-    if (!impl->Prepare(update,
-                       "UPDATE folder SET document = ?, audio = ?, video = ?, photo = ?"
-                       " WHERE path = ?")) {
-      return Impl::Outcome::FAILED;
-    }
-    BindFlags(update, 1, wanted);
-    update.BindBlob(5, path);
-    return impl->Done(impl->Run(update) && (sqlite3_changes(impl->connection->db) == 1 ||
-                                            impl->Fail(path + " is no indexed folder")));
-  });
-}
-
-bool StateStore::RemoveFolder(const std::string& path) {
-  const std::lock_guard guard(impl->mutex);
-  return impl->ChangeSettings([&] {
-    Statement remove;
-    if (!impl->Prepare(remove, "DELETE FROM folder WHERE path = ?")) {
-      return Impl::Outcome::FAILED;
-    }
-    remove.BindBlob(1, path);
-    return impl->Done(impl->Run(remove) && (sqlite3_changes(impl->connection->db) == 1 ||
-                                            impl->Fail(path + " is no indexed folder")));
   });
 }
 

@@ -12,6 +12,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "state/settings.h"
 
@@ -50,9 +51,12 @@ class StateStore {
   bool SetShareFilesystem(const std::string& name, const std::string& filesystem);
 
   // The share is that of the path. Adding a folder that is there fails, changing or removing one
-  // that is not fails.
-  bool AddFolder(const std::string& path, const ContentFlags& wanted);
-  bool SetFolder(const std::string& path, const ContentFlags& wanted);
+  // that is not fails, and so does a pattern that is none (see excludes.h).
+  bool AddFolder(const std::string& path, const ContentFlags& wanted,
+                 const std::vector<std::string>& excludes = {});
+  bool SetFolder(const std::string& path, const ContentFlags& wanted);  // excludes stay
+  bool SetFolder(const std::string& path, const ContentFlags& wanted,
+                 const std::vector<std::string>& excludes);
   bool RemoveFolder(const std::string& path);
 
   // Both fail for a share that is not registered.

@@ -8,6 +8,7 @@
 #include <mutex>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "state/settings.h"
 #include "state/sqlite.h"
@@ -46,6 +47,11 @@ struct StateStore::Impl {
   bool HasRow(const char* sql, const std::string& key, bool& found);
   bool Load(Settings& settings);
   bool LoadTables(Settings& settings);
+  bool LoadExcludes(Settings& settings);
+  bool CheckExcludes(const std::vector<std::string>& patterns);
+  // In the place of those that the folder has.
+  bool WriteExcludes(const std::string& folder, const std::vector<std::string>& patterns);
+  bool WriteFlags(const std::string& folder, const ContentFlags& wanted);
   Outcome Remove(const std::string& share_name);
   bool LoadStatus(const std::string& share, ShareStatus& status);
 

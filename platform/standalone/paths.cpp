@@ -33,6 +33,7 @@ bool IsNameVerdict(Verdict verdict) {
     case Verdict::NOT_COVERED:
     case Verdict::SKIPPED_NAME:
     case Verdict::OWN_STATE:
+    case Verdict::EXCLUDED:
       return true;
     default:
       return false;
@@ -61,12 +62,22 @@ const Glance& GlanceAt(const std::string& path) {
   return kept;
 }
 
+// Walks descend into what is a directory. One that is kept out by a pattern (a build tree may be
+// larger than all that is indexed) is none to them, unless an indexed folder lies in it.
+bool MayHoldEntries(const Glance& glance) {
+  return glance.verdict != Verdict::EXCLUDED ||
+         glance.settings->HasFolderBelow(NormalPath(glance.path).value_or(glance.path));
+}
+
 }  // namespace
 
 namespace TALO::FILEINDEX {
 
 bool IsDirExist(const std::string& path) {
-  return Uncancelled([&path] { return GlanceAt(path).thing == Thing::DIRECTORY; });
+  return Uncancelled([&path] {
+    const Glance& glance = GlanceAt(path);
+    return glance.thing == Thing::DIRECTORY && MayHoldEntries(glance);
+  });
 }
 
 bool IsFileExist(const std::string& path) {
