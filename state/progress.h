@@ -2,10 +2,12 @@
 // How far long work is, for people: one small file for each share and writer. What goes wrong with
 // it is ignored, and nothing may depend on it.
 //
-//   file   {"what":TEXT,"done":N,"total":N|null,"began":MS,"updated":MS,"pid":N,"start":N} blanks \n
+//   file   {"what":TEXT,"done":N,"total":N|null,"began":MS,"updated":MS,"pid":N,"start":N} blanks
+//   \n
 //
-// always LINE_SIZE bytes, written in place by one call. MS are milliseconds since the epoch; `start`
-// is the kernel's start time of process `pid`, so that a file that outlived its writer is no work.
+// always LINE_SIZE bytes, written in place by one call. MS are milliseconds since the epoch;
+// `start` is the kernel's start time of process `pid`, so that a file that outlived its writer is
+// no work.
 #pragma once
 
 #include <cstdint>
