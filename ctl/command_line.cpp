@@ -80,6 +80,11 @@ void AddShares(Declarer& declare) {
                                  "Remove a share with its settings and its index; files stay");
   AddText(remove, "NAME", into.share, "The share");
 
+  CLI::App* accept = declare.Add(group, "accept", ShareAccept,
+                                 "Go on with what is at a share's path now: another file system, "
+                                 "or nothing where something was");
+  AddText(accept, "NAME", into.share, "The share");
+
   CLI::App* list = declare.Add(group, "list", ShareList, "List the shares");
   AddJson(list, into, "One JSON document");
 }
@@ -155,7 +160,8 @@ void AddControl(Declarer& declare) {
 void AddQuestions(Declarer& declare) {
   Arguments& into = declare.arguments;
   CLI::App* status = declare.Add(&declare.app, "status", Status, "Show what is going on");
-  AddJson(status, into, "One JSON document");
+  status->add_flag("--follow", into.follow, "Show it again whenever it has changed");
+  AddJson(status, into, "One JSON document; with --follow one a line");
 
   CLI::App* search = declare.Add(&declare.app, "search", Search, "Search the index, best first");
   // For the help alone: the words are taken out before, see SplitSearchArguments.

@@ -34,6 +34,7 @@ struct Arguments {
   bool json = false;
   bool count = false;
   bool nul_ended = false;
+  bool follow = false;
 };
 
 using Command = int (*)(const Arguments& arguments);
@@ -41,6 +42,7 @@ using Command = int (*)(const Arguments& arguments);
 int ShareAdd(const Arguments& arguments);
 int ShareRemove(const Arguments& arguments);
 int ShareList(const Arguments& arguments);
+int ShareAccept(const Arguments& arguments);
 
 int FolderAdd(const Arguments& arguments);
 int FolderSet(const Arguments& arguments);

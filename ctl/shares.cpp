@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// share add, remove, list.
+// share add, remove, accept, list.
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
@@ -8,8 +9,11 @@
 #include "ctl/commands.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
+#include "index/reader.h"
+#include "state/belonging.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
+#include "state/queue_writer.h"
 
 namespace fileindexd {
 
@@ -43,6 +47,78 @@ bool RemoveShareFolder(const std::string& name) {
     return false;
   }
 
+  return true;
+}
+
+// The first indexed folder of the share; null when it has none.
+const IndexedFolder* FirstFolder(const Settings& settings, const Share& share) {
+  const auto found =
+      std::find_if(settings.folders.begin(), settings.folders.end(),
+                   [&share](const IndexedFolder& folder) { return folder.share == share.name; });
+  return found == settings.folders.end() ? nullptr : &*found;
+}
+
+// Whether there is anything in the index but the share's root. False, with its line written, when
+// that cannot be told.
+bool HoldsSomething(const Settings& settings, const Share& share, bool& holds) {
+  EntryReader reader;
+  const IndexError opened = reader.Open(share.name);
+  uint64_t entries = 0;
+  if (opened != IndexError::PATH_NOT_FOUND &&
+      (opened != IndexError::NONE || !reader.Count(entries))) {
+    (void)Fail(EXIT_FAILED, "%s: index: %s", share.name.c_str(),
+               opened != IndexError::NONE ? IndexErrorText(opened) : "cannot be read");
+    return false;
+  }
+  holds = entries > (settings.FolderAt(share.path) != nullptr ? 1 : 0);
+  return true;
+}
+
+enum class Acceptance { NOTHING, FILESYSTEM, EMPTY_ROOT };
+
+// What is to be accepted at the share's path. False, with its line written, when nothing can be.
+bool FindAcceptance(const Settings& settings, const Share& share, Acceptance& found) {
+  switch (LookAtRoot(share)) {
+    case RootState::MISSING:
+      (void)Fail(EXIT_FAILED, "%s: %s is missing, or no directory: there is nothing to go on with",
+                 share.name.c_str(), share.path.c_str());
+      return false;
+    case RootState::UNKNOWN:
+      (void)Fail(EXIT_FAILED, "%s: %s cannot be looked at: %s", share.name.c_str(),
+                 share.path.c_str(), strerror(errno));
+      return false;
+    case RootState::FOREIGN:
+      found = Acceptance::FILESYSTEM;
+      return true;
+    case RootState::SOUND:
+      break;
+  }
+
+  bool holds = false;
+  if (IsRootEmpty(share) && !HoldsSomething(settings, share, holds)) {
+    return false;
+  }
+  found = holds ? Acceptance::EMPTY_ROOT : Acceptance::NOTHING;
+  return true;
+}
+
+// Puts on record that the share goes on with what is there. The reindex first: whatever comes
+// between, no single change is taken up before everything is looked at.
+bool RecordAcceptance(StateStore& store, const Share& share, bool reindex) {
+  const bool recorded = store.UpdateStatus(share.name, [reindex](ShareStatus& status) {
+    status.accept_empty = true;
+    status.needs_reindex = status.needs_reindex || reindex;
+  });
+  const std::string filesystem = recorded ? FilesystemIdentity(share.path) : std::string();
+  if (recorded && filesystem.empty()) {
+    (void)Fail(EXIT_FAILED, "%s: its file system cannot be told: %s", share.path.c_str(),
+               strerror(errno));
+    return false;
+  }
+  if (!recorded || !store.SetShareFilesystem(share.name, filesystem)) {
+    (void)Fail(EXIT_FAILED, "%s", store.Error().c_str());
+    return false;
+  }
   return true;
 }
 
@@ -109,6 +185,43 @@ int ShareRemove(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
   return RemoveShareFolder(share->name) ? EXIT_DONE : EXIT_FAILED;
+}
+
+int ShareAccept(const Arguments& arguments) {
+  Session session;
+  if (!session.Open()) {
+    return EXIT_FAILED;
+  }
+  const Share* share = session.FindShare(arguments.share);
+  Acceptance found = Acceptance::NOTHING;
+  if (share == nullptr || !FindAcceptance(*session.settings, *share, found)) {
+    return EXIT_FAILED;
+  }
+  if (found == Acceptance::NOTHING) {
+    (void)PutLine("nothing to accept");
+    return EXIT_DONE;
+  }
+  if (!CanBeShare(share->path)) {
+    return EXIT_FAILED;
+  }
+
+  const IndexedFolder* folder = FirstFolder(*session.settings, *share);
+  if (!RecordAcceptance(*session.store, *share, folder != nullptr)) {
+    return EXIT_FAILED;
+  }
+  if (folder == nullptr) {
+    return EXIT_DONE;
+  }
+
+  // The reindex is on record; this is for a Worker that runs.
+  std::string error;
+  if (!AppendToQueue(share->name, {}, error)) {
+    return Fail(EXIT_FAILED, "%s", error.c_str());
+  }
+  // A daemon that was started while the path could not be indexed has no Worker for it yet.
+  Json::Value data(Json::objectValue);
+  data["folder_path"] = folder->path;
+  return CodeOfReply(AskDaemon("upsert_folder_setting", data), share->name);
 }
 
 int ShareList(const Arguments& arguments) {

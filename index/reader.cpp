@@ -61,6 +61,34 @@ bool EntryReader::Summarise(Summary& summary) {
   return true;
 }
 
+bool EntryReader::Count(uint64_t& entries) {
+  Statement statement;
+  if (statement.Prepare(database.db, "SELECT entries FROM meta WHERE id = 1") != SQLITE_OK ||
+      statement.Step() != SQLITE_ROW) {
+    return false;
+  }
+  entries = static_cast<uint64_t>(statement.Int(0));
+  return true;
+}
+
+bool EntryReader::CountBelow(const std::string& under, uint64_t& entries) {
+  Statement statement;
+  if (statement.Prepare(database.db,
+                        "SELECT count(*) FROM entries WHERE path = ?1 OR"
+                        " (path > ?2 AND path < ?3)") != SQLITE_OK) {
+    return false;
+  }
+  const PathRange range(under);
+  statement.BindBlob(1, under);
+  statement.BindBlob(2, range.first);
+  statement.BindBlob(3, range.end);
+  if (statement.Step() != SQLITE_ROW) {
+    return false;
+  }
+  entries = static_cast<uint64_t>(statement.Int(0));
+  return true;
+}
+
 bool EntryReader::ForEach(const std::string& under,
                           const std::function<bool(const Entry&)>& visit) {
   Statement at;

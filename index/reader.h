@@ -24,6 +24,11 @@ class EntryReader {
   };
   bool Summarise(Summary& summary);
 
+  // Entries of the share; those at or below normal path `under`, which reads their part of an
+  // index. False when reading failed.
+  bool Count(uint64_t& entries);
+  bool CountBelow(const std::string& under, uint64_t& entries);
+
   // Calls `visit` with each entry at or below normal path `under` in byte order of the paths, until
   // it returns false. False when reading failed.
   bool ForEach(const std::string& under, const std::function<bool(const Entry&)>& visit);

@@ -86,6 +86,9 @@ bool IsPassingName(std::string_view name);
 // Whether a share's root is what is on record.
 enum class RootState { SOUND, MISSING, FOREIGN, UNKNOWN };
 RootState LookAtRoot(const Share& share);
+// True when nothing is in the share's root, or only names that are passed over. False when that
+// cannot be told.
+bool IsRootEmpty(const Share& share);
 
 // The verdict in a few words, for people.
 const char* VerdictText(Verdict verdict);

@@ -6,6 +6,7 @@
 // numbers that are never given twice, the root's are kept for a second in each thread: a thing with
 // the same mount number lies in the share's mount, and any difference is looked into with care,
 // the root asked before and after. Where mount numbers are reused, the root is asked every time.
+#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
@@ -14,6 +15,7 @@
 #include <ctime>
 
 #include "base/scoped_fd.h"
+#include "base/scoped_stream.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
@@ -278,6 +280,23 @@ RootState LookAtRoot(const Share& share) {
     return errno == ENOENT ? RootState::MISSING : RootState::UNKNOWN;
   }
   return identity == share.filesystem ? RootState::SOUND : RootState::FOREIGN;
+}
+
+bool IsRootEmpty(const Share& share) {
+  ScopedDir root;
+  root.dir = opendir(share.path.c_str());
+  if (root.dir == nullptr) {
+    return false;
+  }
+  errno = 0;
+  const dirent* entry = nullptr;
+  while ((entry = readdir(root.dir)) != nullptr) {  // NOLINT: of a stream of our own
+    const std::string_view name = entry->d_name;
+    if (name != "." && name != ".." && !IsPreservedName(name) && !IsPassingName(name)) {
+      return false;
+    }
+  }
+  return errno == 0;
 }
 
 }  // namespace fileindexd

@@ -6,6 +6,7 @@
 #include <set>
 
 #include "platform/log.h"
+#include "state/belonging.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {
@@ -121,6 +122,16 @@ bool RequestReindex(const std::string& share) {
     FI_LOG("Failed to wake share[%s]: %s", share.c_str(), error.c_str());
   }
   return true;
+}
+
+bool RecordReindex(const std::string& share) {
+  return ChangeStatus(share, [](ShareStatus& status) { status.needs_reindex = true; });
+}
+
+bool IsRootAway(const std::string& share) {
+  const std::shared_ptr<const Settings> settings = CurrentSettings();
+  const Share* found = settings->ShareByName(share);
+  return found != nullptr && LookAtRoot(*found) != RootState::SOUND;
 }
 
 void NoteCommit(const std::string& share, bool good) {

@@ -28,6 +28,12 @@ bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus
 // could not be recorded.
 bool RequestReindex(const std::string& share);
 
+// The same without seeing to it: some later pass will be the reindex.
+bool RecordReindex(const std::string& share);
+
+// Whether the share's root is anything but sound.
+bool IsRootAway(const std::string& share);
+
 void NoteCommit(const std::string& share, bool good);
 // True once after each good commit: what is opened then is a database that was there.
 bool TakeReopening(const std::string& share);

@@ -6,6 +6,7 @@
 #include "index/writer.h"
 #include "platform/paths.h"
 #include "platform/standalone/environment.h"
+#include "platform/standalone/pass_progress.h"
 #include "platform/standalone/uncancelled.h"
 
 namespace fileindexd::TALO::IR {
@@ -45,22 +46,47 @@ ContentFlags FlagsOf(const Json::Value& object) {
 
 struct Indexer::Handle {
   Handle(const std::string& share, StateStore& store)
-      : share_name(share), writer(share, store, TestBetweenSlices) {}
+      : share_name(share), progress(ProgressOf(share)), writer(share, store, [this] {
+          progress.Look();
+          TestBetweenSlices();
+        }) {}
 
   // Runs one operation of the writer.
   template <typename Operation>
   bool Do(Operation operation) {
     return Uncancelled([&] {
       const std::lock_guard guard(inside);
+      just_committed = false;
       const bool done = operation(writer);
       if (!done) {
         last_error = static_cast<int>(writer.last_error);
+        NoteRoot(writer.last_error == IndexError::ROOT);
       }
       return done;
     });
   }
 
+  // One that counts as a change.
+  template <typename Operation>
+  bool Change(Operation operation) {
+    return Do([&](EntryWriter& entries) {
+      progress.Count();
+      return operation(entries);
+    });
+  }
+
+  // What happened while the share could not be looked at is not seen again: when it is back, it is
+  // looked at as a whole. Nobody is woken, as the next pass would fail like this one.
+  void NoteRoot(bool is_away) {
+    if (is_away && !away_noted) {
+      away_noted = RecordReindex(share_name);
+    }
+  }
+
   const std::string share_name;
+  PassProgress& progress;
+  bool just_committed = false;  // the last operation was a good commit
+  bool away_noted = false;
   std::mutex inside;
   EntryWriter writer;
 };
@@ -88,6 +114,9 @@ Indexer::~Indexer() {
   if (handle != nullptr) {
     handle->inside.lock();  // until no operation is inside
     handle->inside.unlock();
+    if (!handle->just_committed) {
+      handle->progress.End();  // the Worker ends, and not its transaction
+    }
   }
   handle.reset();
 }
@@ -98,18 +127,23 @@ bool Indexer::IsOpen() const {
 
 bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
   return handle != nullptr &&
-         handle->Do([&](EntryWriter& writer) { return writer.Add(path, FlagsOf(cfg)); });
+         handle->Change([&](EntryWriter& writer) { return writer.Add(path, FlagsOf(cfg)); });
 }
 
 bool Indexer::UpdateFSDocument(const std::string& path, const Json::Value& cfg,
                                const Json::Value& data) {
-  return handle != nullptr && handle->Do([&](EntryWriter& writer) {
+  return handle != nullptr && handle->Change([&](EntryWriter& writer) {
     return writer.Refresh(path, FlagsOf(cfg), FlagsOf(data));
   });
 }
 
 bool Indexer::DelFSDocument(const std::string& path, _tag_delete_mode mode) {
   return handle != nullptr && handle->Do([&](EntryWriter& writer) {
+    if (static_cast<DeleteMode>(mode) == DeleteMode::STALE) {
+      handle->progress.BeginReindex(path);  // it comes before a directory is walked again
+    } else {
+      handle->progress.Count();
+    }
     return writer.Delete(path, static_cast<DeleteMode>(mode));
   });
 }
@@ -118,6 +152,9 @@ bool Indexer::Commit() {
   return handle != nullptr && handle->Do([this](EntryWriter& writer) {
     const bool good = writer.Commit();
     NoteCommit(handle->share_name, good);
+    handle->just_committed = good;
+    // What is added of a disk that is away is gone for whoever asks, and never comes to us.
+    handle->NoteRoot(IsRootAway(handle->share_name));
     return good;
   });
 }

@@ -15,6 +15,7 @@
 #include "base/scoped_fd.h"
 #include "platform/log.h"
 #include "platform/standalone/environment.h"
+#include "platform/standalone/pass_progress.h"
 #include "platform/standalone/process.h"
 #include "platform/standalone/uncancelled.h"
 #include "platform/system.h"
@@ -206,7 +207,11 @@ void EndReindex(const std::string& share_name) {
   const std::shared_ptr<const Settings> settings = CurrentSettings();
   const Share* share = settings->ShareByName(share_name);
   if (share != nullptr && LookAtRoot(*share) == RootState::SOUND) {
-    ChangeStatus(share_name, [](ShareStatus& status) { status.reindex_begun = false; });
+    const bool is_empty = IsRootEmpty(*share);
+    ChangeStatus(share_name, [is_empty](ShareStatus& status) {
+      status.reindex_begun = false;
+      status.accept_empty = status.accept_empty && is_empty;
+    });
   }
 }
 
@@ -242,6 +247,9 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
               const char* arg4) {
   return Uncancelled([&] {
     const std::string share = arg2 != nullptr ? ShareOfDrainedCopy(arg2) : std::string();
+    if (!share.empty()) {
+      ProgressOf(share).End();
+    }
     if (!share.empty() && !MayRemoveDrainedCopy(share)) {
       FI_LOG("Kept, as its changes are not stored: %s", arg2);
       return -1;

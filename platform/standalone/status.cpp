@@ -3,6 +3,7 @@
 
 #include "platform/log.h"
 #include "platform/standalone/environment.h"
+#include "platform/standalone/pass_progress.h"
 #include "platform/standalone/uncancelled.h"
 #include "state/layout.h"
 
@@ -43,6 +44,7 @@ void StatusMgr::ShareSetNeedReindex(const std::string& share_name, bool need) {
       return RequestReindex(share_name);
     }
     // The flag goes before the walk has begun: until a pass has ended, the record stands for it.
+    ProgressOf(share_name).BeginShareReindex();
     return ChangeStatus(share_name, [](ShareStatus& status) {
       status.needs_reindex = false;
       status.reindex_begun = true;
@@ -52,6 +54,9 @@ void StatusMgr::ShareSetNeedReindex(const std::string& share_name, bool need) {
 
 bool StatusMgr::ShareSetNoSpace(const std::string& share_name, bool no_space) {
   return Uncancelled([&share_name, no_space] {
+    if (no_space) {
+      ProgressOf(share_name).End();  // the pass is given up
+    }
     return ChangeStatus(share_name,
                         [no_space](ShareStatus& status) { status.no_space = no_space; });
   });

@@ -1,0 +1,209 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// How a status is shown. What it is made of is in status.cpp.
+#include "ctl/status_report.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "ctl/output.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t SHORTEST_RATE_MS = 500;  // of less work nothing can be told
+
+const char* RootText(const ShareReport& report) {
+  switch (report.root) {
+    case RootState::SOUND:
+      return report.root_emptied ? "empty" : "sound";
+    case RootState::MISSING:
+      return "missing";
+    case RootState::FOREIGN:
+      return "foreign";
+    case RootState::UNKNOWN:
+      break;
+  }
+  return "unknown";
+}
+
+// A second, since the work began.
+std::optional<double> Rate(const ProgressRecord& work) {
+  const int64_t elapsed = work.updated - work.began;
+  if (elapsed < SHORTEST_RATE_MS || work.done == 0) {
+    return std::nullopt;
+  }
+  return static_cast<double>(work.done) * 1000.0 / static_cast<double>(elapsed);
+}
+
+std::optional<int64_t> SecondsLeft(const ProgressRecord& work) {
+  const std::optional<double> rate = Rate(work);
+  if (!rate || !work.total || *work.total < work.done) {
+    return std::nullopt;
+  }
+  return static_cast<int64_t>(std::ceil(static_cast<double>(*work.total - work.done) / *rate));
+}
+
+// None for a number that nobody knows.
+template <typename Number>
+Json::Value NumberOrNull(const std::optional<Number>& number) {
+  return number ? Json::Value(static_cast<Json::Int64>(*number)) : Json::Value();
+}
+
+Json::Value WorkObject(const std::optional<ProgressRecord>& work) {
+  if (!work) {
+    return {};
+  }
+  Json::Value object(Json::objectValue);
+  object["what"] = WorkText(work->what);
+  object["done"] = static_cast<Json::UInt64>(work->done);
+  object["total"] = NumberOrNull(work->total);
+  const std::optional<double> rate = Rate(*work);
+  object["rate"] =
+      rate ? Json::Value(static_cast<Json::Int64>(std::llround(*rate))) : Json::Value();
+  object["seconds_left"] = NumberOrNull(SecondsLeft(*work));
+  return object;
+}
+
+Json::Value ShareObject(const ShareReport& report) {
+  Json::Value object(Json::objectValue);
+  object["name"] = ToUtf8(report.share.name);
+  SetPath(object, report.share.path);
+  object["root"] = RootText(report);
+  object["waiting"] = static_cast<Json::UInt64>(report.waiting);
+  object["entries"] = static_cast<Json::UInt64>(report.index.entries);
+  object["last_commit"] = Json::nullValue;
+  if (report.index.last_commit != 0) {
+    object["last_commit"] = static_cast<Json::Int64>(report.index.last_commit);
+  }
+  object["needs_reindex"] = report.needs_reindex;
+  object["no_space"] = report.no_space;
+  object["contents_waiting"] = static_cast<Json::UInt64>(report.index.wanted);
+  object["contents_failed"] = 0;
+  object["watched_by"] = "none";
+  object["progress"] = WorkObject(report.work ? report.work : report.comparison);
+  if (!report.index_problem.empty()) {
+    object["index_problem"] = report.index_problem;
+  }
+
+  object["gone_folders"] = Json::arrayValue;
+  for (const std::string& path : report.gone_folders) {
+    Json::Value folder(Json::objectValue);
+    SetPath(folder, path);
+    object["gone_folders"].append(folder);
+  }
+  return object;
+}
+
+// Empty when there is nothing to say.
+std::string RootProblem(const ShareReport& report) {
+  const std::string accept = "fileindexctl share accept " + Printable(report.share.name);
+  switch (report.root) {
+    case RootState::SOUND:
+      return report.root_emptied ? "its path is empty where it was not; if that is meant: " + accept
+                                 : "";
+    case RootState::MISSING:
+      return "its path is missing; the index is left as it is";
+    case RootState::FOREIGN:
+      return "its path lies on another file system than before; the index is left as it is; to go "
+             "on with this one: " +
+             accept;
+    case RootState::UNKNOWN:
+      break;
+  }
+  return "its path cannot be looked at";
+}
+
+std::string DurationText(int64_t seconds) {
+  constexpr int64_t MINUTE = 60;
+  constexpr int64_t HOUR = 60 * MINUTE;
+  if (seconds < 2 * MINUTE) {
+    return std::to_string(seconds) + " s";
+  }
+  if (seconds < 2 * HOUR) {
+    return std::to_string(seconds / MINUTE) + " min";
+  }
+  return std::to_string(seconds / HOUR) + " h " + std::to_string(seconds % HOUR / MINUTE) + " min";
+}
+
+std::string WorkLine(const ProgressRecord& work) {
+  std::string text = std::string(WorkText(work.what)) + ", " + std::to_string(work.done);
+  if (work.what == Work::UPDATE) {
+    text += " changes";
+  } else {
+    // What is done is known, what is left is an estimate, and may have been too low.
+    text += work.total ? " of about " + std::to_string(std::max(*work.total, work.done)) : "";
+    text += " entries";
+  }
+  if (const std::optional<double> rate = Rate(work)) {
+    text += ", " + std::to_string(std::llround(*rate)) + " a second";
+  }
+  if (const std::optional<int64_t> left = SecondsLeft(work)) {
+    text += ", about " + DurationText(*left) + " left";
+  }
+  return text;
+}
+
+void AddLine(std::string& text, const std::string& label, const std::string& value) {
+  constexpr size_t WIDTH = 15;
+  text += "  " + label + std::string(WIDTH - label.size(), ' ') + value + "\n";
+}
+
+void AddShare(std::string& text, const ShareReport& report) {
+  const int64_t last_commit = report.index.last_commit;
+  text += "share " + Printable(report.share.name) + "\n";
+  AddLine(text, "path", Printable(report.share.path));
+  if (const std::string problem = RootProblem(report); !problem.empty()) {
+    AddLine(text, "problem", problem);
+  }
+  if (!report.index_problem.empty()) {
+    AddLine(text, "problem", "index: " + report.index_problem);
+  }
+  for (const std::string& path : report.gone_folders) {
+    AddLine(text, "folder gone", Printable(path));
+  }
+  AddLine(text, "waiting lines", std::to_string(report.waiting));
+  AddLine(text, "entries", std::to_string(report.index.entries));
+  AddLine(text, "last commit", last_commit == 0 ? "none" : LocalTime(last_commit));
+  AddLine(text, "needs reindex", report.needs_reindex ? "yes" : "no");
+  AddLine(text, "no space", report.no_space ? "yes" : "no");
+  for (const auto& work : {report.work, report.comparison}) {
+    if (work) {
+      AddLine(text, "in progress", WorkLine(*work));
+    }
+  }
+}
+
+}  // namespace
+
+Json::Value ReportObject(const StatusReport& report) {
+  Json::Value object(Json::objectValue);
+  object["daemon"] = report.daemon > 0;
+  object["pid"] =
+      report.daemon > 0 ? Json::Value(static_cast<Json::Int64>(report.daemon)) : Json::Value();
+  object["paused_until"] = NumberOrNull(report.paused_until);
+  object["shares"] = Json::arrayValue;
+  for (const ShareReport& share : report.shares) {
+    object["shares"].append(ShareObject(share));
+  }
+  return object;
+}
+
+std::string ReportText(const StatusReport& report) {
+  std::string text = report.daemon > 0 ? "daemon runs, pid " + std::to_string(report.daemon)
+                                       : "daemon does not run";
+  if (!report.paused_until) {
+    text += "\nnot paused\n";
+  } else if (*report.paused_until == 0) {
+    text += "\npaused without end\n";
+  } else {
+    text += "\npaused until " + LocalTime(*report.paused_until) + "\n";
+  }
+  for (const ShareReport& share : report.shares) {
+    AddShare(text, share);
+  }
+  return text;
+}
+
+}  // namespace fileindexd
