@@ -27,6 +27,7 @@ namespace {
 constexpr unsigned UNIQUE_MOUNT_ID = 0x4000;
 constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME | STATX_MNT_ID | UNIQUE_MOUNT_ID;
 constexpr int64_t ROOT_KEPT_NS = 1'000'000'000;
+constexpr int64_t FOLDER_KEPT_NS = 5'000'000;
 constexpr int CAREFUL_TRIES = 3;
 
 struct RootView {
@@ -104,6 +105,7 @@ void Fill(const struct statx& st, Look& look) {
   look.mode = st.stx_mode & 07777U;
   look.mount_id = st.stx_mnt_id;
   look.device = makedev(st.stx_dev_major, st.stx_dev_minor);
+  look.mount_root = (st.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0;
 }
 
 // GONE only where the call says for certain that nothing is there.
@@ -196,6 +198,26 @@ Look LookWithCare(const std::string& root_path, const std::string& path) {
   return Look{};
 }
 
+// True when `path` is a folder in the share's own mount and device, with no link on the way.
+bool SeeFolder(const std::string& root_path, const std::string& path, FolderView& folder) {
+  const int64_t begin = Now();
+  if (folder.path == path && folder.root == root_path &&
+      begin - folder.seen_time < FOLDER_KEPT_NS) {
+    return true;
+  }
+
+  folder.seen_time = 0;
+  struct statx st {};
+  const RootView* root = RecentRoot(root_path);
+  if (root == nullptr || !root->unique || See(root_path, path, st) != Verdict::BELONGS ||
+      !S_ISDIR(st.stx_mode) || st.stx_mnt_id != root->mount_id ||
+      makedev(st.stx_dev_major, st.stx_dev_minor) != root->device) {
+    return false;
+  }
+  folder = {root_path, path, root->mount_id, root->device, begin};
+  return true;
+}
+
 }  // namespace
 
 Look LookAt(const Settings& settings, const std::string& path) {
@@ -219,6 +241,28 @@ Look LookAt(const Settings& settings, const std::string& path) {
     return LookWithCare(root_path, normal);
   }
   look.verdict = JudgeInMount(*root, normal, look.device, look.thing);
+  return look;
+}
+
+Look LookNear(const Settings& settings, const std::string& path, FolderView& folder) {
+  Look look;
+  look.verdict = JudgeName(settings, path);
+  if (look.verdict != Verdict::BELONGS) {
+    return look;
+  }
+
+  const std::string normal = NormalPath(path).value_or(path);
+  const std::string& root_path = settings.ShareOfPath(normal)->path;
+  struct statx st {};
+  if (normal == root_path || !SeeFolder(root_path, ParentOf(normal), folder) ||
+      statx(AT_FDCWD, normal.c_str(), AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT, WANTED, &st) != 0) {
+    return LookAt(settings, path);
+  }
+  Fill(st, look);
+  if (look.mount_id != folder.mount_id || look.device != folder.device) {
+    return LookAt(settings, path);  // a mount point, or a subvolume
+  }
+  look.verdict = look.thing == Thing::NONE ? Verdict::SPECIAL_FILE : Verdict::BELONGS;
   return look;
 }
 
