@@ -97,11 +97,11 @@ IndexError Converger::CheckMount(const Look& look) {
 
 IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
                               const std::string& path, const ContentFlags& wanted,
-                              const ContentFlags& decide) {
+                              const ContentFlags& decide, const Look* seen) {
   settings = &in_force;
   share = &in_share;
   sql_failed = false;
-  const Look look = LookAt(*settings, path);
+  const Look look = seen != nullptr ? *seen : LookAt(*settings, path);
   switch (look.verdict) {
     case Verdict::BELONGS:
       return Settle(path, look, wanted, decide);

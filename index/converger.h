@@ -25,9 +25,9 @@ class Converger {
       : table(rows), between(between_slices) {}
 
   // `path` is normal and lies in `in_share`, one of `in_force`; both stay for the length of the
-  // call.
+  // call. `seen` as for EntryWriter::Refresh.
   IndexError Refresh(const Settings& in_force, const Share& in_share, const std::string& path,
-                     const ContentFlags& wanted, const ContentFlags& decide);
+                     const ContentFlags& wanted, const ContentFlags& decide, const Look* seen);
   IndexError Delete(const Settings& in_force, const Share& in_share, const std::string& path,
                     DeleteMode mode);
 

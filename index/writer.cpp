@@ -37,23 +37,23 @@ bool EntryWriter::IsOpen() const {
 }
 
 bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
-                          const ContentFlags& decide) {
+                          const ContentFlags& decide, const Look* seen) {
   EntryOperation operation;
   operation.wanted = wanted;
   operation.decide = decide;
-  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation)); });
+  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation), seen); });
   return last_error == IndexError::NONE;
 }
 
-bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted) {
-  return Refresh(path, wanted, EVERY_KIND);
+bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted, const Look* seen) {
+  return Refresh(path, wanted, EVERY_KIND, seen);
 }
 
 bool EntryWriter::Delete(const std::string& path, DeleteMode mode) {
   EntryOperation operation;
   operation.removal = true;
   operation.mode = mode;
-  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation)); });
+  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation), nullptr); });
   return last_error == IndexError::NONE;
 }
 
@@ -74,7 +74,8 @@ IndexError EntryWriter::Impl::Guarded(const std::function<IndexError()>& step) {
   }
 }
 
-IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& operation) {
+IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& operation,
+                                 const Look* seen) {
   auto normal = NormalPath(path);
   if (!normal.has_value()) {
     return IndexError::NONE;  // belongs nowhere, and is held nowhere
@@ -91,7 +92,7 @@ IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& opera
   }
 
   const uint64_t before = table->changes;
-  error = Apply(operation);
+  error = Apply(operation, seen);
   if (error == IndexError::NONE) {
     operation.applied = true;
     // What changed nothing has nothing to repeat.
@@ -123,7 +124,7 @@ void EntryWriter::Impl::Remember(EntryOperation&& operation) {
 }
 
 // Carries the operation out in the transaction that runs, beginning one where there is none.
-IndexError EntryWriter::Impl::Apply(const EntryOperation& operation) {
+IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Look* seen) {
   std::shared_ptr<const Settings> settings;
   converger->sql_failed = false;
   if (!store.GetSettings(settings)) {
@@ -144,7 +145,7 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation) {
   }
   return operation.removal ? converger->Delete(*settings, *share, operation.path, operation.mode)
                            : converger->Refresh(*settings, *share, operation.path, operation.wanted,
-                                                operation.decide);
+                                                operation.decide, seen);
 }
 
 // Gives the transaction up: whatever failed in it left it half done.
@@ -197,7 +198,7 @@ IndexError EntryWriter::Impl::ReplayOnce(bool& again) {
     }
 
     const uint64_t before = table->changes;
-    const IndexError error = Apply(operation);
+    const IndexError error = Apply(operation, nullptr);
     operation.applied = error == IndexError::NONE;
     if (operation.applied) {
       continue;

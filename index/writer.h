@@ -12,6 +12,7 @@
 #include <string>
 
 #include "index/database.h"
+#include "state/belonging.h"
 #include "state/settings.h"
 #include "state/store.h"
 
@@ -35,9 +36,12 @@ class EntryWriter {
   // belong. A path that is no longer the thing that was known has everything below it looked at.
   // `wanted`: the flags in force for it. `decide`: for which kinds it is decided anew whether
   // content is wanted; an entry that is new has it decided in any case.
-  bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide);
+  // `seen`: what the caller saw there a moment ago, or null to look here. It has to be younger than
+  // whatever the operation tells of.
+  bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide,
+               const Look* seen = nullptr);
   // Like Refresh with every kind decided.
-  bool Add(const std::string& path, const ContentFlags& wanted);
+  bool Add(const std::string& path, const ContentFlags& wanted, const Look* seen = nullptr);
   bool Delete(const std::string& path, DeleteMode mode);
   // True when everything since the last good commit is durable.
   bool Commit();

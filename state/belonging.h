@@ -53,10 +53,26 @@ struct Look {
   uint32_t mode = 0;      // permission bits
   uint64_t mount_id = 0;  // of the mount that shows the thing; to be compared with other looks only
   uint64_t device = 0;
+  bool mount_root = false;  // the thing is the root of that mount
+};
+
+// A folder of which nothing but the names in it is left to judge: see LookNear.
+struct FolderView {
+  std::string root;  // of the share
+  std::string path;
+  uint64_t mount_id = 0;
+  uint64_t device = 0;
+  int64_t seen_time = 0;  // nanoseconds, monotonic; 0: never
 };
 
 // Looks at a path and judges it. Three system calls for an ordinary file.
 Look LookAt(const Settings& settings, const std::string& path);
+
+// The same in one system call, for one path after the other in the same folder. What was seen of
+// the folder is kept in `folder` for some milliseconds: if it is replaced meanwhile, by a link or
+// by another folder, the answer may be wrong by that. For whoever hears of each change after it was
+// made, and looks again then.
+Look LookNear(const Settings& settings, const std::string& path, FolderView& folder);
 
 // The same judged by the path alone: BELONGS when nothing in its letters speaks against it. A
 // pattern for directories alone speaks only against what lies below one.

@@ -29,6 +29,7 @@ namespace {
 constexpr unsigned UNIQUE_MOUNT_ID = 0x4000;
 constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME | STATX_MNT_ID | UNIQUE_MOUNT_ID;
 constexpr int64_t ROOT_KEPT_NS = 1'000'000'000;
+constexpr int64_t FOLDER_KEPT_NS = 5'000'000;
 constexpr int CAREFUL_TRIES = 3;
 
 struct RootView {
@@ -106,6 +107,7 @@ void Fill(const struct statx& st, Look& look) {
   look.mode = st.stx_mode & 07777U;
   look.mount_id = st.stx_mnt_id;
   look.device = makedev(st.stx_dev_major, st.stx_dev_minor);
+  look.mount_root = (st.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0;
 }
 
 // GONE only where the call says for certain that nothing is there.
@@ -217,6 +219,52 @@ Look LookOnDisk(const Settings& settings, const std::string& normal) {
   return look;
 }
 
+// True when `path` is a folder in the share's own mount and device, with no link on the way.
+bool SeeFolder(const std::string& root_path, const std::string& path, FolderView& folder) {
+  const int64_t begin = Now();
+  if (folder.path == path && folder.root == root_path &&
+      begin - folder.seen_time < FOLDER_KEPT_NS) {
+    return true;
+  }
+
+  folder.seen_time = 0;
+  struct statx st {};
+  const RootView* root = RecentRoot(root_path);
+  if (root == nullptr || !root->unique || See(root_path, path, st) != Verdict::BELONGS ||
+      !S_ISDIR(st.stx_mode) || st.stx_mnt_id != root->mount_id ||
+      makedev(st.stx_dev_major, st.stx_dev_minor) != root->device) {
+    return false;
+  }
+  folder = {root_path, path, root->mount_id, root->device, begin};
+  return true;
+}
+
+// One call if the folder that holds it is known.
+Look LookInFolder(const Settings& settings, const std::string& normal, FolderView& folder) {
+  const std::string& root_path = settings.ShareOfPath(normal)->path;
+  struct statx st {};
+  if (normal == root_path || !SeeFolder(root_path, ParentOf(normal), folder) ||
+      statx(AT_FDCWD, normal.c_str(), AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT, WANTED, &st) != 0) {
+    return LookOnDisk(settings, normal);
+  }
+
+  Look look;
+  Fill(st, look);
+  if (look.mount_id != folder.mount_id || look.device != folder.device) {
+    return LookOnDisk(settings, normal);  // a mount point, or a subvolume
+  }
+  look.verdict = look.thing == Thing::NONE ? Verdict::SPECIAL_FILE : Verdict::BELONGS;
+  return look;
+}
+
+// Only when a thing was seen it is known whether the patterns for directories count.
+void JudgeByPatterns(const Settings& settings, const std::string& normal, Look& look) {
+  if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY &&
+      FindExclusion(settings, normal, Leaf::DIRECTORY).pattern != nullptr) {
+    look.verdict = Verdict::EXCLUDED;
+  }
+}
+
 }  // namespace
 
 Look LookAt(const Settings& settings, const std::string& path) {
@@ -225,13 +273,23 @@ Look LookAt(const Settings& settings, const std::string& path) {
   if (look.verdict != Verdict::BELONGS) {
     return look;
   }
+
   const std::string normal = NormalPath(path).value_or(path);
   look = LookOnDisk(settings, normal);
-  // Only now it is known whether the patterns for directories count.
-  if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY &&
-      FindExclusion(settings, normal, Leaf::DIRECTORY).pattern != nullptr) {
-    look.verdict = Verdict::EXCLUDED;
+  JudgeByPatterns(settings, normal, look);
+  return look;
+}
+
+Look LookNear(const Settings& settings, const std::string& path, FolderView& folder) {
+  Look look;
+  look.verdict = JudgeName(settings, path);
+  if (look.verdict != Verdict::BELONGS) {
+    return look;
   }
+
+  const std::string normal = NormalPath(path).value_or(path);
+  look = LookInFolder(settings, normal, folder);
+  JudgeByPatterns(settings, normal, look);
   return look;
 }
 

@@ -30,11 +30,29 @@ bool StateStore::Impl::Open() {
     return false;
   }
   data_version.emplace();
-  if (!Prepare(*data_version, "PRAGMA data_version")) {
+  int64_t version = 0;
+  if (!Prepare(*data_version, "PRAGMA data_version") || !ReadVersion(version)) {
+    data_version.reset();
     connection.reset();
     return false;
   }
   return true;
+}
+
+bool StateStore::Impl::ReadVersion(int64_t& version) {
+  if (data_version->Step() != SQLITE_ROW) {
+    data_version->Reset();
+    return FailSql();
+  }
+  version = data_version->Int(0);
+  data_version->Reset();
+  return true;
+}
+
+// Several times for each document: where nothing was committed at all, two rounds of file locks are
+// spared.
+bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
+  return cached != nullptr && head.has_value() && cached_head == head;
 }
 
 bool StateStore::Impl::Ready() {
@@ -156,13 +174,19 @@ bool StateStore::GetSettings(std::shared_ptr<const Settings>& settings) {
   if (!impl->Ready()) {
     return false;
   }
-  // The number first: what is loaded may then be newer than it, never older.
-  if (impl->data_version->Step() != SQLITE_ROW) {
-    impl->data_version->Reset();
-    return impl->FailSql();
+  // The head and the number first: what is loaded may then be newer than they are, never older.
+  LogHead head{};
+  const std::optional<LogHead> seen =
+      ReadLogHead(*impl->connection, head) ? std::make_optional(head) : std::nullopt;
+  if (impl->IsCacheGood(seen)) {
+    settings = impl->cached;
+    return true;
   }
-  const int64_t version = impl->data_version->Int(0);
-  impl->data_version->Reset();
+
+  int64_t version = 0;
+  if (!impl->ReadVersion(version)) {
+    return false;
+  }
   if (impl->cached == nullptr || version != impl->cached_version) {
     auto loaded = std::make_shared<Settings>();
     if (!impl->Load(*loaded)) {
@@ -171,6 +195,7 @@ bool StateStore::GetSettings(std::shared_ptr<const Settings>& settings) {
     impl->cached = loaded;
     impl->cached_version = version;
   }
+  impl->cached_head = seen;
   settings = impl->cached;
   return true;
 }

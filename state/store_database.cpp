@@ -7,6 +7,8 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <cstring>
@@ -289,6 +291,24 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
 
 std::string StateError(const StateConnection& connection, const char* what) {
   return std::string(what) + " " + connection.path + ": " + sqlite3_errmsg(connection.db);
+}
+
+bool ReadLogHead(const StateConnection& connection, LogHead& head) {
+  constexpr int REGION = 32 * 1024;  // SQLite's own size: the mapping is the one that it uses
+  sqlite3_file* file = nullptr;
+  if (sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_FILE_POINTER, &file) != SQLITE_OK ||
+      file->pMethods == nullptr || file->pMethods->iVersion < 2) {
+    return false;
+  }
+  volatile void* shared = nullptr;
+  if (file->pMethods->xShmMap(file, 0, REGION, 0, &shared) != SQLITE_OK || shared == nullptr) {
+    return false;
+  }
+  // What was committed before a queue was read is seen by whoever looks here after that.
+  std::atomic_thread_fence(std::memory_order_seq_cst);
+  const auto* bytes = static_cast<const volatile unsigned char*>(shared);
+  std::copy_n(bytes, head.size(), head.begin());
+  return true;
 }
 
 bool HasStateMoved(const StateConnection& connection) {

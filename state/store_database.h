@@ -11,6 +11,7 @@
 
 #include <sqlite3.h>
 
+#include <array>
 #include <memory>
 #include <string>
 
@@ -37,6 +38,13 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 // Leaves a copy of what is committed beside the database. It is checked before it replaces the one
 // that is there. False on failure, and that one stays.
 bool LeaveStateCopy(const StateConnection& connection, std::string& error);
+
+// What the head of the log's index says: it differs after each commit of whatever program.
+using LogHead = std::array<unsigned char, 96>;
+
+// Reads it from the memory that all users of the database share: no call of the system. The
+// connection must have read something before, so that the log is open. False where there is none.
+bool ReadLogHead(const StateConnection& connection, LogHead& head);
 
 // True when the open file is no longer the one at its path: it was set aside or removed.
 bool HasStateMoved(const StateConnection& connection);

@@ -43,6 +43,9 @@ struct StateStore::Impl {
   bool ChangeSettings(const std::function<Outcome()>& body);
   Outcome Done(bool good) { return good ? Outcome::CHANGED : Outcome::FAILED; }
 
+  bool ReadVersion(int64_t& version);
+  bool IsCacheGood(const std::optional<LogHead>& head);
+
   // True with `found` when the text that is bound to column 1 has a row.
   bool HasRow(const char* sql, const std::string& key, bool& found);
   bool Load(Settings& settings);
@@ -60,6 +63,7 @@ struct StateStore::Impl {
   std::unique_ptr<StateConnection> connection;
   std::optional<Statement> data_version;  // goes before the connection
   int64_t cached_version = 0;
+  std::optional<LogHead> cached_head;      // of the log, before `cached_version` was asked for
   std::shared_ptr<const Settings> cached;  // null: to be loaded
 };
 

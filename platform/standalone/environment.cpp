@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/standalone/environment.h"
 
+#include <malloc.h>
+
 #include <map>
 #include <mutex>
 #include <set>
@@ -27,6 +29,12 @@ struct Environment {
 Environment& Process() {
   static Environment& environment = *new Environment;
   return environment;
+}
+
+// With the heap of its own that a thread would get, each page of a page cache costs a call to the
+// system when the database is opened for the next commit, since those heaps grow by single pages.
+void ShareOneHeap() {
+  (void)mallopt(M_ARENA_MAX, 1);  // as good as it gets
 }
 
 // A walk needs a descriptor for each level of the tree, and skips in silence what it has none for.
@@ -65,6 +73,7 @@ StateStore* Store() {
   process.open_failure_told = false;
   process.store = std::move(opened);
   RaiseDescriptorLimit(process.descriptors);
+  ShareOneHeap();
   return process.store.get();
 }
 

@@ -6,6 +6,7 @@
 #include "index/writer.h"
 #include "platform/paths.h"
 #include "platform/standalone/environment.h"
+#include "platform/standalone/glance.h"
 #include "platform/standalone/pass_progress.h"
 #include "platform/standalone/uncancelled.h"
 
@@ -126,14 +127,19 @@ bool Indexer::IsOpen() const {
 }
 
 bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
-  return handle != nullptr &&
-         handle->Change([&](EntryWriter& writer) { return writer.Add(path, FlagsOf(cfg)); });
+  return handle != nullptr && handle->Change([&](EntryWriter& writer) {
+    Look look;
+    const Look* seen = TakeGlance(path, look) ? &look : nullptr;
+    return writer.Add(path, FlagsOf(cfg), seen);
+  });
 }
 
 bool Indexer::UpdateFSDocument(const std::string& path, const Json::Value& cfg,
                                const Json::Value& data) {
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
-    return writer.Refresh(path, FlagsOf(cfg), FlagsOf(data));
+    Look look;
+    const Look* seen = TakeGlance(path, look) ? &look : nullptr;
+    return writer.Refresh(path, FlagsOf(cfg), FlagsOf(data), seen);
   });
 }
 

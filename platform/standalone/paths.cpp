@@ -4,6 +4,7 @@
 #include <ctime>
 
 #include "platform/standalone/environment.h"
+#include "platform/standalone/glance.h"
 #include "platform/standalone/uncancelled.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
@@ -15,15 +16,27 @@ namespace {
 
 constexpr int64_t GLANCE_NS = 5'000'000;
 
-// One operation on a document asks several questions about its path in a row. The answers are taken
-// from one look, which is not kept for longer than such a row takes.
+// One operation on a document asks several questions about its path in a row, and then writes down
+// what is there. All that is taken from one look, which is not kept for longer than such a row
+// takes. It was made after the queue was drained, and so shows every change that led to the
+// operation; whatever changes later has its own event, in a later drain.
 struct Glance {
   std::string path;
-  int64_t time = 0;  // monotonic
-  std::shared_ptr<const Settings> settings;
-  Verdict verdict = Verdict::UNKNOWN;
+  int64_t time = 0;                          // monotonic
+  std::shared_ptr<const Settings> settings;  // null: none
+  Look look;
   Thing thing = Thing::NONE;
 };
+
+struct Glances {
+  Glance kept;
+  FolderView folder;
+};
+
+Glances& OfThisThread() {
+  thread_local Glances glances;
+  return glances;
+}
 
 // What exists does not depend on whether it belongs. A verdict on the name alone has not looked.
 bool IsNameVerdict(Verdict verdict) {
@@ -47,17 +60,20 @@ int64_t Now() {
 }
 
 const Glance& GlanceAt(const std::string& path) {
-  thread_local Glance kept;
+  auto& [kept, folder] = OfThisThread();
   const int64_t now = Now();
   if (kept.settings == nullptr || kept.path != path || now - kept.time >= GLANCE_NS) {
     kept.settings = CurrentSettings();
-    const Look look = LookAt(*kept.settings, path);
-    kept.verdict = look.verdict;
-    kept.thing = IsNameVerdict(look.verdict) ? ThingAt(*kept.settings, path) : look.thing;
+    kept.look = LookNear(*kept.settings, path, folder);
+    kept.thing = IsNameVerdict(kept.look.verdict) ? ThingAt(*kept.settings, path) : kept.look.thing;
     kept.path = path;
-    // Between two passes a queue file is asked for. That look is not kept, and so nothing that was
-    // seen before the drain is believed after it.
-    kept.time = Covers(kept.settings->state_root, path) ? 0 : now;
+    kept.time = now;
+    // Between two passes a queue file is asked for. That look is not kept, nor the folder before
+    // it, and so nothing that was seen before the drain is believed after it.
+    if (Covers(kept.settings->state_root, path)) {
+      kept.time = 0;
+      folder = {};
+    }
   }
   return kept;
 }
@@ -70,6 +86,17 @@ bool MayHoldEntries(const Glance& glance) {
 }
 
 }  // namespace
+
+bool TakeGlance(const std::string& path, Look& look) {
+  Glance& kept = OfThisThread().kept;
+  if (kept.settings == nullptr || kept.path != path || Now() - kept.time >= GLANCE_NS ||
+      kept.look.verdict != Verdict::BELONGS) {
+    return false;
+  }
+  look = kept.look;
+  kept.settings.reset();
+  return true;
+}
 
 namespace TALO::FILEINDEX {
 
@@ -91,19 +118,19 @@ bool IsFileExist(const std::string& path) {
 
 bool CanFullPathBeIndexed(const std::string& path) {
   return Uncancelled([&path] {
-    const std::shared_ptr<const Settings> settings = CurrentSettings();
-    const std::optional<std::string> normal = NormalPath(path);
-    if (!normal.has_value()) {
-      return false;
-    }
-
-    const Verdict verdict = LookAt(*settings, *normal).verdict;
+    const Glance& glance = GlanceAt(path);
+    const Verdict verdict = glance.look.verdict;
     if (verdict != Verdict::BELONGS && verdict != Verdict::NOT_COVERED) {
       return false;
     }
 
-    const Share* share = settings->ShareOfPath(*normal);
-    return share != nullptr && (share->path == *normal || IsMountPoint(*normal) == 0);
+    const std::string normal = NormalPath(path).value_or(path);
+    const Share* share = glance.settings->ShareOfPath(normal);
+    if (share == nullptr || share->path == normal) {
+      return share != nullptr;
+    }
+    // What is not covered was judged by its name alone.
+    return verdict == Verdict::BELONGS ? !glance.look.mount_root : IsMountPoint(normal) == 0;
   });
 }
 
@@ -115,7 +142,7 @@ bool IsSystemPreservedFileName(const std::string& name) {
 // what is gone, and tells what failed.
 bool IsSkipIndex(const std::string& path) {
   const CancelOff off;
-  const Verdict verdict = GlanceAt(path).verdict;
+  const Verdict verdict = GlanceAt(path).look.verdict;
   return verdict != Verdict::BELONGS && verdict != Verdict::GONE && verdict != Verdict::UNKNOWN;
 }
 
