@@ -1,65 +1,28 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/compare.h"
 
+#include <dirent.h>
+#include <sys/resource.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <vector>
+#include <string_view>
+#include <utility>
 
+#include "base/scoped_stream.h"
 #include "index/disk_walk.h"
+#include "index/entry_stream.h"
 #include "index/entry_table.h"
 #include "index/reader.h"
-#include "index/schema.h"
-#include "state/sqlite.h"
 
 namespace fileindexd {
 
 namespace {
 
-constexpr int SLICE = 500;  // rows
-
-// Entries in byte order of the paths, read in slices: a transaction that lasts as long as the walk
-// would keep the writer's log from being cut.
-class EntryStream {
- public:
-  explicit EntryStream(sqlite3* opened) : db(opened) {}
-
-  // False when reading failed. `entry` is null at the end.
-  bool Next(const Entry*& entry) {
-    if (next == rows.size() && !ended && !ReadSlice()) {
-      return false;
-    }
-    entry = next == rows.size() ? nullptr : &rows[next++];
-    return true;
-  }
-
- private:
-  bool ReadSlice() {
-    const std::string after = rows.empty() ? "" : rows.back().path;
-    Statement statement;
-    if (statement.Prepare(db,
-                          "SELECT " FILEINDEX_ENTRY_COLUMNS
-                          " FROM entries WHERE path > ?1 ORDER BY path LIMIT ?2") != SQLITE_OK) {
-      return false;
-    }
-
-    statement.BindBlob(1, after);
-    statement.BindInt(2, SLICE);
-    rows.clear();
-    next = 0;
-    int code = statement.Step();
-    for (; code == SQLITE_ROW; code = statement.Step()) {
-      ReadEntry(statement, rows.emplace_back());
-    }
-    ended = rows.size() < SLICE;
-    return code == SQLITE_DONE;
-  }
-
-  sqlite3* db;
-  std::vector<Entry> rows;
-  size_t next = 0;
-  bool ended = false;
-};
+constexpr uint64_t ROOT_INTERVAL = 500;  // entries found left over, between two looks at the root
 
 bool IsStale(const Entry& entry, const Look& look) {
   if (entry.thing != look.thing) {
@@ -73,109 +36,213 @@ bool IsStale(const Entry& entry, const Look& look) {
          entry.mtime != look.mtime || entry.birth_time != look.birth_time;
 }
 
-// What compares one share; each step goes on with the smaller path of the two sides.
-class ShareComparison {
- public:
-  ShareComparison(const Settings& in_force, const Share& compared, sqlite3* db,
-                  const std::function<bool(Difference, const std::string&)>& to_report,
-                  Comparison& counted)
-      : settings(in_force),
-        share(compared),
-        entries(db),
-        walk(in_force),
-        report(to_report),
-        result(counted) {}
-
-  bool Run(std::string& error) {
-    walk.StartAtFolders(share);
-    if (!NextEntry(error) || !NextThing(error)) {
+bool IsEmptyDirectory(const std::string& path) {
+  const ScopedDir stream(opendir(path.c_str()));
+  if (stream.dir == nullptr) {
+    return false;
+  }
+  // NOLINTNEXTLINE(concurrency-mt-unsafe): the stream is this thread's own
+  while (const dirent* found = readdir(stream.dir)) {
+    const std::string_view name = found->d_name;
+    if (name != "." && name != "..") {
       return false;
     }
-    while (going && (entry != nullptr || on_disk)) {
-      if (!Step(error)) {
-        return false;
-      }
-    }
-    return true;
   }
+  return true;
+}
 
- private:
-  bool Step(std::string& error) {
-    const int order = entry == nullptr ? 1 : !on_disk ? -1 : entry->path.compare(path);
-    if (order < 0) {
-      return Report(Difference::LEFT_OVER, entry->path, error) && NextEntry(error);
-    }
-    if (order > 0) {
-      return Report(Difference::MISSING, path, error) && NextThing(error);
-    }
-
-    if (IsStale(*entry, look) && !Report(Difference::STALE, path, error)) {
-      return false;
-    }
-    const bool wanted = look.thing == Thing::FILE &&
-                        IsContentWanted(entry->kind, settings.FolderOfPath(path)->wanted);
-    if (entry->content_wanted != wanted && !Report(Difference::CONTENT, path, error)) {
-      return false;
-    }
-    return NextEntry(error) && NextThing(error);
-  }
-
-  // An unmounted disk must not be told as a thousand files that are gone.
-  bool Report(Difference difference, const std::string& at, std::string& error) {
-    if (!going) {
-      return true;
-    }
-    if (difference == Difference::LEFT_OVER && left_over++ % SLICE == 0 &&
-        LookAtRoot(share) != RootState::SOUND) {
-      error = RootError(share);
-      return false;
-    }
-    ++result.differences;
-    going = report(difference, at);
-    return true;
-  }
-
-  bool NextEntry(std::string& error) {
-    if (!entries.Next(entry)) {
-      error = "the index cannot be read";
-      return false;
-    }
-    result.entries += entry != nullptr ? 1 : 0;
-    return true;
-  }
-
-  bool NextThing(std::string& error) {
-    const DiskWalk::Step step = walk.Next(path, look);
-    if (step == DiskWalk::Step::FAILED) {
-      error = "cannot look at " + path + ": " + strerror(errno);  // NOLINT: glibc's is safe
-      return false;
-    }
-    on_disk = step == DiskWalk::Step::FOUND;
-    result.seen += on_disk ? 1 : 0;
-    return true;
-  }
-
- public:
-  static std::string RootError(const Share& share) {
-    return share.path + ": " + IndexErrorText(IndexError::ROOT);
-  }
-
- private:
-  const Settings& settings;
-  const Share& share;
-  EntryStream entries;
-  DiskWalk walk;
-  const std::function<bool(Difference, const std::string&)>& report;
-  Comparison& result;
-  const Entry* entry = nullptr;
-  bool on_disk = false;
-  std::string path;
-  Look look;
-  bool going = true;
-  uint64_t left_over = 0;
-};
+// Whether it was said that the share is to be gone on with although its folder is empty.
+bool EmptyIsAccepted(StateStore& /*store*/, const std::string& /*share_name*/) {
+  return false;
+}
 
 }  // namespace
+
+struct Comparer::Side {
+  explicit Side(std::shared_ptr<const Settings> in_force)
+      : settings(std::move(in_force)), walk(*settings) {}
+
+  std::shared_ptr<const Settings> settings;
+  const Share* share = nullptr;
+  EntryReader reader;
+  EntryStream entries;
+  DiskWalk walk;
+  const Entry* entry = nullptr;  // the next one; null at the end
+  bool on_disk = false;          // whether `path` and `look` hold the next thing
+  std::string path;
+  Look look;
+};
+
+Comparer::Comparer(StateStore& state, std::string compared_share)
+    : store(state), share_name(std::move(compared_share)) {}
+Comparer::~Comparer() = default;
+
+bool Comparer::Refuse(const std::string& why) {
+  error = why;
+  return false;
+}
+
+bool Comparer::Start(const std::string& from) {
+  side.reset();
+  counts = {};
+  position = from;
+  left_over = 0;
+  has_index = false;
+  std::shared_ptr<const Settings> settings;
+  if (!store.GetSettings(settings)) {
+    return Refuse(store.Error());
+  }
+  auto opened = std::make_unique<Side>(settings);
+  opened->share = settings->ShareByName(share_name);
+  if (opened->share == nullptr) {
+    return Refuse("no such share: " + share_name);
+  }
+
+  side = std::move(opened);
+  if (!CheckRoot() || !OpenIndex() || !CheckRoot()) {
+    side.reset();
+    return false;
+  }
+  side->walk.StartAtFolders(*side->share, position);
+  side->entries.Start(side->reader.database.db, position);
+  if ((has_index && !NextEntry()) || !NextThing()) {
+    side.reset();
+    return false;
+  }
+  return true;
+}
+
+bool Comparer::OpenIndex() {
+  const IndexError opened = side->reader.Open(share_name);
+  has_index = opened == IndexError::NONE;
+  if (has_index) {
+    EntryReader::Summary summary;
+    if (!side->reader.Summarise(summary)) {
+      return Refuse("share " + share_name + ": the index cannot be read");
+    }
+    estimate = summary.entries;
+    return true;
+  }
+
+  const auto& folders = side->settings->folders;
+  const bool wants_none =
+      std::none_of(folders.begin(), folders.end(),
+                   [&](const IndexedFolder& folder) { return folder.share == share_name; });
+  if (opened == IndexError::PATH_NOT_FOUND && wants_none) {
+    return true;  // nothing belongs in an index, and there is none
+  }
+  return Refuse("share " + share_name + ": " + IndexErrorText(opened));
+}
+
+// An unmounted disk must not be told as a thousand files that are gone. Where its empty mount point
+// is what is on record, only that emptiness tells.
+bool Comparer::CheckRoot() {
+  const Share& share = *side->share;
+  if (LookAtRoot(share) != RootState::SOUND) {
+    return Refuse(share.path + ": " + IndexErrorText(IndexError::ROOT));
+  }
+  if (!has_index || !IsEmptyDirectory(share.path)) {
+    return true;
+  }
+
+  EntryStream entries;
+  entries.Start(side->reader.database.db, {});
+  const Entry* entry = nullptr;
+  do {
+    if (!entries.Next(entry)) {
+      return Refuse("share " + share_name + ": the index cannot be read");
+    }
+  } while (entry != nullptr && side->settings->FolderAt(entry->path) != nullptr);
+  if (entry == nullptr || EmptyIsAccepted(store, share_name)) {
+    return true;
+  }
+  return Refuse(share.path + ": the share's folder is empty, and the index is not");
+}
+
+Comparer::Result Comparer::Run(const Report& report, uint64_t most_paths) {
+  if (side == nullptr) {
+    return Result::FAILED;
+  }
+  going = true;
+  for (uint64_t done = 0; side->entry != nullptr || side->on_disk; ++done) {
+    if (!going || done == most_paths) {
+      return Result::STOPPED;
+    }
+    if (!Step(report)) {
+      side.reset();
+      return Result::FAILED;
+    }
+  }
+
+  // Unmounted meanwhile, everything may have looked gone, or missing.
+  if (!CheckRoot()) {
+    side.reset();
+    return Result::FAILED;
+  }
+  return Result::DONE;
+}
+
+// Goes on with the smaller path of the two sides.
+bool Comparer::Step(const Report& report) {
+  const Entry* entry = side->entry;
+  const int order = entry == nullptr ? 1 : !side->on_disk ? -1 : entry->path.compare(side->path);
+  const std::string& path = order < 0 ? entry->path : side->path;
+  if (order < 0 && !Tell(report, Difference::LEFT_OVER, path)) {
+    return false;
+  }
+  if (order > 0 && !Tell(report, Difference::MISSING, path)) {
+    return false;
+  }
+  if (order == 0) {
+    const Look& look = side->look;
+    if (IsStale(*entry, look) && !Tell(report, Difference::STALE, path)) {
+      return false;
+    }
+    const bool wanted =
+        look.thing == Thing::FILE && IsContentWanted(entry->kind, side->walk.folder->wanted);
+    if (entry->content_wanted != wanted && !Tell(report, Difference::CONTENT, path)) {
+      return false;
+    }
+  }
+
+  position = path;
+  ++counts.compared;
+  return (order > 0 || NextEntry()) && (order < 0 || NextThing());
+}
+
+bool Comparer::Tell(const Report& report, Difference difference, const std::string& path) {
+  if (difference == Difference::LEFT_OVER && left_over++ % ROOT_INTERVAL == 0 && !CheckRoot()) {
+    return false;
+  }
+  ++counts.differences;
+  const Thing known = difference == Difference::MISSING ? Thing::NONE : side->entry->thing;
+  const Thing seen = difference == Difference::LEFT_OVER ? Thing::NONE : side->look.thing;
+  going = report({difference, path, known, seen}) && going;
+  return true;
+}
+
+bool Comparer::NextEntry() {
+  if (!side->entries.Next(side->entry)) {
+    return Refuse("share " + share_name + ": the index cannot be read");
+  }
+  counts.entries += side->entry != nullptr ? 1 : 0;
+  return true;
+}
+
+bool Comparer::NextThing() {
+  const DiskWalk::Step step = side->walk.Next(side->path, side->look);
+  if (step == DiskWalk::Step::FAILED) {
+    return Refuse("cannot look at " + side->path + ": " +
+                  strerror(errno));  // NOLINT: glibc's is safe
+  }
+  side->on_disk = step == DiskWalk::Step::FOUND;
+  counts.seen += side->on_disk ? 1 : 0;
+  return true;
+}
+
+uint64_t Comparer::Estimate() const {
+  return std::max(estimate, counts.compared);
+}
 
 const char* DifferenceText(Difference difference) {
   switch (difference) {
@@ -194,47 +261,24 @@ const char* DifferenceText(Difference difference) {
 bool CompareShare(StateStore& store, const std::string& share_name,
                   const std::function<bool(Difference, const std::string& path)>& report,
                   Comparison& result, std::string& error) {
-  std::shared_ptr<const Settings> settings;
-  if (!store.GetSettings(settings)) {
-    error = store.Error();
+  Comparer comparer(store, share_name);
+  const auto tell = [&](const Found& found) { return report(found.difference, found.path); };
+  if (!comparer.Start() || comparer.Run(tell) == Comparer::Result::FAILED) {
+    error = comparer.Error();
     return false;
   }
-  const Share* share = settings->ShareByName(share_name);
-  if (share == nullptr) {
-    error = "no such share: " + share_name;
-    return false;
-  }
-  if (LookAtRoot(*share) != RootState::SOUND) {
-    error = ShareComparison::RootError(*share);
-    return false;
-  }
-
-  EntryReader reader;
-  const IndexError opened = reader.Open(share_name);
-  const bool wants_none =
-      std::none_of(settings->folders.begin(), settings->folders.end(),
-                   [&](const IndexedFolder& folder) { return folder.share == share_name; });
-  if (opened == IndexError::PATH_NOT_FOUND && wants_none) {
-    result = {};
-    return true;  // nothing belongs in an index, and there is none
-  }
-  if (opened != IndexError::NONE) {
-    error = "share " + share_name + ": " + IndexErrorText(opened);
-    return false;
-  }
-
-  Comparison counted;
-  ShareComparison comparison(*settings, *share, reader.database.db, report, counted);
-  if (!comparison.Run(error)) {
-    return false;
-  }
-  // Unmounted meanwhile, everything may have looked gone, or missing.
-  if (LookAtRoot(*share) != RootState::SOUND) {
-    error = ShareComparison::RootError(*share);
-    return false;
-  }
-  result = counted;
+  result = comparer.counts;
   return true;
+}
+
+void WorkAtIdle() {
+  constexpr int IOPRIO_WHO_PROCESS = 1;
+  constexpr int IOPRIO_IDLE = 3 << 13;
+  constexpr int LOWEST = 19;
+  // Numbers of threads, whose priorities are their own on Linux. What a container forbids is not
+  // missed: the work is then done at the priority that there is.
+  (void)setpriority(PRIO_PROCESS, static_cast<id_t>(gettid()), LOWEST);
+  (void)syscall(SYS_ioprio_set, IOPRIO_WHO_PROCESS, gettid(), IOPRIO_IDLE);
 }
 
 }  // namespace fileindexd

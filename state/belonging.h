@@ -16,6 +16,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/scoped_fd.h"
 #include "state/settings.h"
 
 namespace fileindexd {
@@ -73,6 +74,25 @@ Look LookAt(const Settings& settings, const std::string& path);
 // by another folder, the answer may be wrong by that. For whoever hears of each change after it was
 // made, and looks again then.
 Look LookNear(const Settings& settings, const std::string& path, FolderView& folder);
+
+// A directory that belongs, opened so that what lies directly in it is looked at by its name.
+struct JudgedDirectory {
+  std::string path;  // normal
+  uint64_t mount_id = 0;
+  uint64_t device = 0;
+  ScopedFd fd;
+};
+
+// Opens a directory that was found to belong, in the mount `mount_id`. BELONGS, or why it is not to
+// be entered any more: GONE, BEHIND_LINK, BELOW_MOUNT when something was mounted over it, UNKNOWN
+// with errno.
+Verdict OpenJudged(const Settings& settings, const std::string& path, uint64_t mount_id,
+                   JudgedDirectory& directory);
+
+// What LookAt tells of `path`, which is `name` in that directory: one system call for what lies in
+// the directory's own mount and subvolume. `name` ends with a NUL in memory.
+Look LookAtIn(const Settings& settings, const JudgedDirectory& directory, const std::string& path,
+              std::string_view name);
 
 // The same judged by the path alone: BELONGS when nothing in its letters speaks against it. A
 // pattern for directories alone speaks only against what lies below one.

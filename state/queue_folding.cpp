@@ -1,0 +1,214 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+//
+// DESIGN. Lines stand in one ordered map, a directory's own before all that lies below it, so that
+// what a reindex takes in is one range of it. A fold works from below: only a directory whose lines
+// all stand directly in it is folded, the fullest first. Its reindex is then a line in the
+// directory above, which may be folded in turn. Where no directory holds two lines, the deepest
+// lines are lifted into reindexes of their directories, until some meet.
+#include "state/queue_folding.h"
+
+#include <algorithm>
+#include <cstring>
+#include <queue>
+#include <tuple>
+#include <utility>
+
+#include "base/event_codes.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t CROWD = 1000;        // lines directly in one directory
+constexpr uint64_t CROWD_SHARE = 10;  // entries looked at for each line that is saved
+
+// Reindex and update of a subtree say more than any other event.
+bool IsReindex(uint32_t event) {
+  return (event & CUSTOM_EVENT_REINDEX) != 0 && (event & CUSTOM_EVENT_UPDATE) == 0;
+}
+bool IsUpdateOfAll(uint32_t event) {
+  return (event & CUSTOM_EVENT_UPDATE) != 0;
+}
+
+std::string_view ParentOf(std::string_view path) {
+  const size_t slash = path.rfind('/');
+  return slash == 0 ? path.substr(0, 1) : path.substr(0, slash);
+}
+
+}  // namespace
+
+bool ByComponents::operator()(std::string_view a, std::string_view b) const {
+  const size_t shared = std::min(a.size(), b.size());
+  const auto [at_a, at_b] = std::mismatch(a.begin(), a.begin() + shared, b.begin());
+  if (at_a == a.begin() + shared) {
+    return a.size() < b.size();
+  }
+  if (*at_a == '/' || *at_b == '/') {
+    return *at_a == '/';
+  }
+  return static_cast<unsigned char>(*at_a) < static_cast<unsigned char>(*at_b);
+}
+
+QueueFolding::QueueFolding(std::string fold_root, CountBelow count_below, size_t lines_kept)
+    : root(std::move(fold_root)), count(std::move(count_below)), kept(lines_kept) {}
+
+// The directory that may be reindexed in place of a line; none for the root's own.
+std::string QueueFolding::FolderOf(const std::string& path) const {
+  return path == root ? std::string() : std::string(ParentOf(path));
+}
+
+bool QueueFolding::IsTakenIn(const std::string& path) const {
+  // Nothing stands below a reindex, so the one that takes the path in would be its neighbour.
+  auto next = lines.upper_bound(path);
+  if (next == lines.begin()) {
+    return false;
+  }
+  --next;
+  return IsReindex(next->second.event) && Covers(next->first, path);
+}
+
+void QueueFolding::Add(uint32_t event, const std::string& path, const std::string& data) {
+  if (IsTakenIn(path)) {
+    return;
+  }
+  if (IsReindex(event)) {
+    FoldInto(path);
+  } else {
+    const auto [at, is_new] = lines.try_emplace(path, Line{event, data});
+    Line& line = at->second;
+    if (is_new) {
+      ++direct[FolderOf(path)];
+    } else if (!IsUpdateOfAll(line.event)) {
+      line = {event, data};
+    } else if (IsUpdateOfAll(event) && line.data != data) {
+      FoldInto(path);
+    }
+  }
+
+  if (lines.size() > 2 * kept) {
+    FoldCrowded();
+    FoldTo(kept);
+  }
+}
+
+void QueueFolding::Erase(LineMap::iterator line) {
+  const auto held = direct.find(FolderOf(line->first));
+  if (--held->second == 0) {
+    direct.erase(held);
+  }
+  lines.erase(line);
+}
+
+void QueueFolding::FoldInto(const std::string& directory) {
+  const std::string folded = directory;  // may be the key of a line that goes
+  auto line = lines.lower_bound(folded);
+  while (line != lines.end() && Covers(folded, line->first)) {
+    Erase(line++);
+  }
+  lines.emplace(folded, Line{CUSTOM_EVENT_REINDEX, {}});
+  ++direct[FolderOf(folded)];
+}
+
+void QueueFolding::FoldCrowded() {
+  std::vector<std::string> crowded;
+  for (const auto& [directory, held] : direct) {
+    if (held > CROWD && !directory.empty()) {
+      crowded.push_back(directory);
+    }
+  }
+  for (const std::string& directory : crowded) {
+    const auto held = direct.find(directory);  // one above may have been folded meanwhile
+    if (held == direct.end() || held->second <= CROWD) {
+      continue;
+    }
+    const uint64_t most = CROWD_SHARE * held->second;
+    if (count(directory, most + 1) <= most) {
+      FoldInto(directory);
+    }
+  }
+}
+
+void QueueFolding::FoldTo(size_t most) {
+  while (lines.size() > std::max<size_t>(most, 1)) {
+    if (!FoldFullest(most)) {
+      LiftDeepest();
+    }
+  }
+}
+
+bool QueueFolding::HoldsDirectOnly(const std::string& directory) const {
+  auto line = lines.upper_bound(directory);
+  for (; line != lines.end() && Covers(directory, line->first); ++line) {
+    if (ParentOf(line->first) != directory) {
+      return false;
+    }
+  }
+  return true;
+}
+
+// False when it ended with too many lines still.
+bool QueueFolding::FoldFullest(size_t most) {
+  std::priority_queue<std::pair<size_t, std::string>> fullest;
+  for (const auto& [directory, held] : direct) {
+    if (held > 1 && !directory.empty()) {
+      fullest.emplace(held, directory);
+    }
+  }
+
+  while (lines.size() > most && !fullest.empty()) {
+    const auto [held, directory] = fullest.top();
+    fullest.pop();
+    const auto now = direct.find(directory);
+    if (now == direct.end() || now->second != held || !HoldsDirectOnly(directory)) {
+      continue;  // told anew when it changed, or when what lies deeper in it was folded
+    }
+    FoldInto(directory);
+    const std::string above = FolderOf(directory);
+    if (!above.empty() && direct[above] > 1) {
+      fullest.emplace(direct[above], above);
+    }
+  }
+  return lines.size() <= most;
+}
+
+void QueueFolding::LiftDeepest() {
+  const auto depth = [](const std::string& path) {
+    return std::count(path.begin(), path.end(), '/');
+  };
+  std::ptrdiff_t deepest = 0;
+  for (const auto& [path, line] : lines) {
+    deepest = std::max(deepest, depth(path));
+  }
+
+  std::vector<std::string> folders;
+  for (const auto& [path, line] : lines) {
+    const std::string folder = FolderOf(path);
+    if (depth(path) == deepest && !folder.empty()) {
+      folders.push_back(folder);
+    }
+  }
+  for (const std::string& folder : folders) {
+    if (!IsTakenIn(folder)) {
+      FoldInto(folder);
+    }
+  }
+}
+
+std::vector<QueueLine> QueueFolding::Lines(size_t most) {
+  FoldCrowded();
+  FoldTo(most);
+
+  std::vector<QueueLine> sorted;
+  sorted.reserve(lines.size());
+  for (const auto& [path, line] : lines) {
+    sorted.push_back({line.event, path, line.data});
+  }
+  // Lines of one directory are in order already, and are only brought together.
+  std::stable_sort(sorted.begin(), sorted.end(), [](const QueueLine& a, const QueueLine& b) {
+    return ByComponents()(ParentOf(a.path), ParentOf(b.path));
+  });
+  return sorted;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,83 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Many queue lines made few, without losing what any of them asks for.
+//
+// Collects lines by path. Where there are too many, the fullest directories become one reindex
+// each, then the directories above them, in the end the root. A reindex takes in all that stands at
+// and below its path. Memory is bounded by the number of lines, never by the number of additions.
+// One thread.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+namespace fileindexd {
+
+// More lines are never in a queue file at once: a batch costs the square of their number.
+constexpr size_t QUEUE_LINE_LIMIT = 5000;
+
+struct QueueLine {
+  uint32_t event = 0;
+  std::string path;  // normal
+  std::string data;  // JSON text, or empty
+};
+
+// Byte order, except that '/' comes before every other byte: what lies below a path follows it at
+// once.
+struct ByComponents {
+  bool operator()(std::string_view a, std::string_view b) const;
+};
+
+class QueueFolding {
+ public:
+  // How many entries the index holds below a directory; beyond `limit` it need not count on.
+  using CountBelow = std::function<uint64_t(const std::string& directory, uint64_t limit)>;
+
+  // `fold_root`: normal; the last reindex that everything can become. At most `lines_kept` lines
+  // stay after a fold, and twice as many are held until the next.
+  QueueFolding(std::string fold_root, CountBelow count_below, size_t lines_kept = QUEUE_LINE_LIMIT);
+
+  // `path` is normal, at or below the root. Of two lines at one path the wider stays: a reindex,
+  // then an update of a subtree; else the later one. Two such updates with different data become
+  // a reindex.
+  void Add(uint32_t event, const std::string& path, const std::string& data = {});
+
+  // Whether a reindex stands at or above the path.
+  bool IsTakenIn(const std::string& path) const;
+
+  // At most `most` lines, or one, sorted: by directory, and a directory's own line before those of
+  // what it holds. Where more than 1,000 stand directly in one directory, and the index holds at
+  // most ten times as many entries below it, it becomes one reindex.
+  std::vector<QueueLine> Lines(size_t most);
+
+  size_t Size() const { return lines.size(); }
+
+ private:
+  struct Line {
+    uint32_t event = 0;
+    std::string data;
+  };
+  using LineMap = std::map<std::string, Line, ByComponents>;
+
+  void Erase(LineMap::iterator line);
+  void FoldInto(const std::string& directory);
+  void FoldCrowded();
+  void FoldTo(size_t most);
+  bool FoldFullest(size_t most);
+  void LiftDeepest();
+  bool HoldsDirectOnly(const std::string& directory) const;
+  std::string FolderOf(const std::string& path) const;
+
+  const std::string root;
+  const CountBelow count;
+  const size_t kept;
+  LineMap lines;
+  std::unordered_map<std::string, size_t> direct;  // lines directly in a directory
+};
+
+}  // namespace fileindexd
