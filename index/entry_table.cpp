@@ -61,8 +61,8 @@ int EntryTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&begin, "BEGIN IMMEDIATE"},
       {&commit, "COMMIT"},
-      {&read_meta, "SELECT entries FROM meta WHERE id = 1"},
-      {&write_meta, "UPDATE meta SET entries = ?1, last_commit = ?2 WHERE id = 1"},
+      {&read_meta, "SELECT entries, removed FROM meta WHERE id = 1"},
+      {&write_meta, "UPDATE meta SET entries = ?1, last_commit = ?2, removed = ?3 WHERE id = 1"},
       {&free_pages, "PRAGMA freelist_count"},
       {&give_back, "PRAGMA incremental_vacuum(64)"},
       {&find, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1"},
@@ -107,6 +107,7 @@ int EntryTable::Begin() {
 
   code = read_meta.Step();
   entries = code == SQLITE_ROW ? read_meta.Int(0) : 0;
+  removed = code == SQLITE_ROW ? read_meta.Int(1) : 0;
   read_meta.Reset();
   if (code == SQLITE_ROW) {
     return SQLITE_OK;
@@ -119,6 +120,7 @@ int EntryTable::Begin() {
 int EntryTable::Commit(int64_t now) {
   write_meta.BindInt(1, entries);
   write_meta.BindInt(2, now);
+  write_meta.BindInt(3, removed);
   int code = write_meta.Run();
   if (code == SQLITE_OK) {
     code = GiveBackPages();
@@ -242,6 +244,7 @@ int EntryTable::Remove(const Entry& entry) {
   }
 
   --entries;
+  ++removed;
   code = RunText(remove_name, entry.id, entry.path);
   return code == SQLITE_OK ? RunText(remove_part, entry.id, entry.path) : code;
 }

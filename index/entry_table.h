@@ -65,6 +65,7 @@ class EntryTable {
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
   int64_t entries = 0;  // rows, as this transaction sees them
+  int64_t removed = 0;  // rows since room was last given back, the same
 };
 
 }  // namespace fileindexd
