@@ -14,7 +14,7 @@ namespace {
 constexpr int64_t LEAST_REMOVED = 1000;
 // Removals for each entry that is left: a quarter of what there was.
 constexpr int64_t LEFT_FOR_EACH_REMOVED = 3;
-constexpr int64_t FREE_PAGES_KEPT = 64;  // for the next entries
+constexpr int64_t FREE_PAGES_KEPT = 16;  // for the next entries
 // A second of work at most on a slow disk, so that a Worker can be stopped or paused in between.
 constexpr int STEPS = 40;
 // A reader that stays longer is come back to, pass after pass.
