@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 # The one place for compiler flags: every target links `project_flags`.
 set(FILEINDEXD_SANITIZE "" CACHE STRING "Value of -fsanitize=, empty for none")
+option(FILEINDEXD_FUZZ "Instrument for clang's fuzzer" OFF)
 option(FILEINDEXD_COVERAGE "Instrument for gcov" OFF)
 option(FILEINDEXD_HARDEN "Fortified, position independent, read-only relocations" OFF)
 
@@ -22,6 +23,9 @@ if(FILEINDEXD_SANITIZE)
   target_compile_options(project_flags INTERFACE
     "-fsanitize=${FILEINDEXD_SANITIZE}" -fno-sanitize-recover=all -fno-omit-frame-pointer -g -O1)
   target_link_options(project_flags INTERFACE "-fsanitize=${FILEINDEXD_SANITIZE}")
+endif()
+if(FILEINDEXD_FUZZ)
+  target_compile_options(project_flags INTERFACE -fsanitize=fuzzer-no-link)
 endif()
 if(FILEINDEXD_COVERAGE)
   target_compile_options(project_flags INTERFACE --coverage)

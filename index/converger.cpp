@@ -101,10 +101,13 @@ IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
   settings = &in_force;
   share = &in_share;
   sql_failed = false;
+  other_paths.clear();
   const Look look = seen != nullptr ? *seen : LookAt(*settings, path);
+  IndexError error = IndexError::NONE;
   switch (look.verdict) {
     case Verdict::BELONGS:
-      return Settle(path, look, wanted, decide);
+      error = Settle(path, look, wanted, decide);
+      return error == IndexError::NONE ? SettleOtherPaths() : error;
     case Verdict::UNKNOWN:
       return IndexError::IO;
     case Verdict::BAD_PATH:
@@ -114,7 +117,7 @@ IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
       break;
   }
 
-  const IndexError error = RemoveAt(path, look.verdict == Verdict::GONE);
+  error = RemoveAt(path, look.verdict == Verdict::GONE);
   return error == IndexError::NONE ? RemoveBelow(path, false) : error;
 }
 
@@ -177,14 +180,16 @@ IndexError Converger::Put(const std::string& path, const Look& look, const Conte
     return error;
   }
   if (found) {
-    return Change(known, look, wanted, decide, outcome);
+    error = Change(known, look, wanted, decide, outcome);
+    return outcome == Outcome::REPLACED ? NoteOtherPaths(path, look) : error;
   }
 
   outcome = Outcome::NEW;
   Entry entry = EntryOf(path, look);
   entry.first_seen = Now();
   entry.content_wanted = entry.thing == Thing::FILE && IsContentWanted(entry.kind, wanted);
-  return Sql(table.Insert(entry));
+  error = Sql(table.Insert(entry));
+  return error == IndexError::NONE ? NoteOtherPaths(path, look) : error;
 }
 
 IndexError Converger::Change(const Entry& known, const Look& look, const ContentFlags& wanted,
@@ -202,8 +207,11 @@ IndexError Converger::Change(const Entry& known, const Look& look, const Content
   if (IsSame(known, seen)) {
     return IndexError::NONE;
   }
-  outcome = replaced ? Outcome::REPLACED : Outcome::CHANGED;
-  return Sql(table.Update(seen));
+  const IndexError error = Sql(table.Update(seen));
+  if (error == IndexError::NONE) {
+    outcome = replaced ? Outcome::REPLACED : Outcome::CHANGED;
+  }
+  return error;
 }
 
 IndexError Converger::RefreshTwins(const std::string& path, const Look& look, bool is_new) {
@@ -227,6 +235,52 @@ IndexError Converger::RefreshTwins(const std::string& path, const Look& look, bo
     }
     Outcome ignored = Outcome::SAME;
     error = Put(twin, twin_look, settings->FolderOfPath(twin)->wanted, {}, ignored);
+  }
+  return error;
+}
+
+// Where the same thing is known under other paths, it may have been renamed. A link that was added
+// or taken away changes the file's change time: paths that were seen with the present one are all
+// still there, and a first index asks nothing of them. (A file system without birth times counts
+// change times in whole seconds, which tell nothing.)
+IndexError Converger::NoteOtherPaths(const std::string& path, const Look& look) {
+  const bool has_links = look.thing != Thing::DIRECTORY && look.links > 1;
+  if (has_links && look.links > MANY_LINKS) {
+    return IndexError::NONE;
+  }
+  const bool changed = has_links && look.birth_time != 0;
+  return Sql(table.OtherPaths(EntryOf(path, look), changed, other_paths));
+}
+
+// In the transaction that added the new path: whatever order a rename's events come in, nothing is
+// found under both. The list grows while it is worked through (a row of files, each renamed to its
+// neighbour's name), which a recursion would answer with its depth.
+IndexError Converger::SettleOtherPaths() {
+  IndexError error = IndexError::NONE;
+  for (size_t i = 0; i < other_paths.size() && error == IndexError::NONE; ++i) {
+    const std::string path = other_paths[i];
+    Entry known;
+    bool found = false;
+    error = Sql(table.Find(path, known, found));
+    if (error != IndexError::NONE || !found) {
+      continue;
+    }
+
+    const Look look = LookAt(*settings, path);
+    Outcome ignored = Outcome::SAME;
+    if (look.verdict == Verdict::UNKNOWN) {
+      error = IndexError::IO;
+    } else if (look.verdict != Verdict::BELONGS) {
+      error = RemoveAt(path, true);
+      error = error == IndexError::NONE ? RemoveBelow(path, false) : error;
+    } else if (IsOtherThing(known, EntryOf(path, look))) {
+      error = Settle(path, look, settings->FolderOfPath(path)->wanted, {});
+    } else {
+      error = Put(path, look, settings->FolderOfPath(path)->wanted, {}, ignored);
+    }
+    if ((i + 1) % SLICE == 0) {
+      between();
+    }
   }
   return error;
 }

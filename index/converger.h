@@ -49,6 +49,9 @@ class Converger {
                     const ContentFlags& decide, Outcome& outcome);
   IndexError RefreshTwins(const std::string& path, const Look& look, bool is_new);
 
+  IndexError NoteOtherPaths(const std::string& path, const Look& look);
+  IndexError SettleOtherPaths();
+
   IndexError LookBelow(const std::string& path, std::vector<std::string>& replaced);
   IndexError SettleSlice(const std::vector<Entry>& rows, std::vector<std::string>& replaced);
   IndexError AddBelow(const std::string& directory);
@@ -66,7 +69,8 @@ class Converger {
   bool mount_known = false;
   uint64_t mount_id = 0;  // last mount and device that were seen below a sound root
   uint64_t device = 0;
-  std::set<std::string> looked_at;  // subtrees, where the file system has no birth times
+  std::vector<std::string> other_paths;  // where what the operation added was known before
+  std::set<std::string> looked_at;       // subtrees, where the file system has no birth times
 };
 
 }  // namespace fileindexd

@@ -61,8 +61,8 @@ int EntryTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&begin, "BEGIN IMMEDIATE"},
       {&commit, "COMMIT"},
-      {&read_meta, "SELECT entries FROM meta WHERE id = 1"},
-      {&write_meta, "UPDATE meta SET entries = ?1, last_commit = ?2 WHERE id = 1"},
+      {&read_meta, "SELECT entries, removed FROM meta WHERE id = 1"},
+      {&write_meta, "UPDATE meta SET entries = ?1, last_commit = ?2, removed = ?3 WHERE id = 1"},
       {&free_pages, "PRAGMA freelist_count"},
       {&give_back, "PRAGMA incremental_vacuum(64)"},
       {&find, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1"},
@@ -72,6 +72,9 @@ int EntryTable::Prepare(sqlite3* db) {
       {&twins,
        "SELECT path FROM entries WHERE inode = ?1 AND path <> ?2 AND (size <> ?3 OR mtime <> ?4 "
        "OR owner <> ?5 OR grp <> ?6 OR mode <> ?7)"},
+      {&other_paths,
+       "SELECT path FROM entries WHERE inode = ?1 AND path <> ?2 "
+       "AND (birth_time = ?3 OR birth_time = 0 OR ?3 = 0) AND (?4 = 0 OR ctime <> ?5)"},
       {&insert,
        "INSERT INTO entries(path, thing, kind, content_wanted, inode, size, mtime, ctime, "
        "birth_time, first_seen, owner, grp, mode) VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, "
@@ -104,6 +107,7 @@ int EntryTable::Begin() {
 
   code = read_meta.Step();
   entries = code == SQLITE_ROW ? read_meta.Int(0) : 0;
+  removed = code == SQLITE_ROW ? read_meta.Int(1) : 0;
   read_meta.Reset();
   if (code == SQLITE_ROW) {
     return SQLITE_OK;
@@ -116,6 +120,7 @@ int EntryTable::Begin() {
 int EntryTable::Commit(int64_t now) {
   write_meta.BindInt(1, entries);
   write_meta.BindInt(2, now);
+  write_meta.BindInt(3, removed);
   int code = write_meta.Run();
   if (code == SQLITE_OK) {
     code = GiveBackPages();
@@ -179,6 +184,24 @@ int EntryTable::Slice(const std::string& after, const std::string& end, int limi
   return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
+int EntryTable::CollectPaths(Statement& statement, std::vector<std::string>& paths) {
+  int code = statement.Step();
+  for (; code == SQLITE_ROW; code = statement.Step()) {
+    paths.push_back(statement.Bytes(0));
+  }
+  statement.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryTable::OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths) {
+  other_paths.BindInt(1, static_cast<int64_t>(entry.inode));
+  other_paths.BindBlob(2, entry.path);
+  other_paths.BindInt(3, entry.birth_time);
+  other_paths.BindInt(4, changed ? 1 : 0);
+  other_paths.BindInt(5, entry.ctime);
+  return CollectPaths(other_paths, paths);
+}
+
 int EntryTable::StaleTwins(const Entry& entry, std::vector<std::string>& paths) {
   twins.BindInt(1, static_cast<int64_t>(entry.inode));
   twins.BindBlob(2, entry.path);
@@ -187,12 +210,7 @@ int EntryTable::StaleTwins(const Entry& entry, std::vector<std::string>& paths) 
   twins.BindInt(5, entry.owner);
   twins.BindInt(6, entry.group);
   twins.BindInt(7, entry.mode);
-  int code = twins.Step();
-  for (; code == SQLITE_ROW; code = twins.Step()) {
-    paths.push_back(twins.Bytes(0));
-  }
-  twins.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return CollectPaths(twins, paths);
 }
 
 int EntryTable::Insert(const Entry& entry) {
@@ -226,6 +244,7 @@ int EntryTable::Remove(const Entry& entry) {
   }
 
   --entries;
+  ++removed;
   code = RunText(remove_name, entry.id, entry.path);
   return code == SQLITE_OK ? RunText(remove_part, entry.id, entry.path) : code;
 }

@@ -44,6 +44,9 @@ class EntryTable {
             std::vector<Entry>& entries);
   // Other paths of the same inode whose attributes differ from those of `entry`.
   int StaleTwins(const Entry& entry, std::vector<std::string>& paths);
+  // Other paths of the same inode and birth time. `changed`: only those that were seen with another
+  // change time.
+  int OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths);
 
   int Insert(const Entry& entry);  // `id` does not count
   int Update(const Entry& entry);  // by `id`; the path does not change
@@ -53,14 +56,16 @@ class EntryTable {
   sqlite3* handle = nullptr;
 
  private:
+  static int CollectPaths(Statement& statement, std::vector<std::string>& paths);
   int RunText(Statement& statement, int64_t id, const std::string& path);
   int GiveBackPages();
 
   Statement begin, commit, read_meta, write_meta, free_pages, give_back;
-  Statement find, below, slice, twins;
+  Statement find, below, slice, twins, other_paths;
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
   int64_t entries = 0;  // rows, as this transaction sees them
+  int64_t removed = 0;  // rows since room was last given back, the same
 };
 
 }  // namespace fileindexd

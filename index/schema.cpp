@@ -3,7 +3,7 @@
 
 namespace fileindexd {
 
-static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 1,
+static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 2,
               "numbers in the text below");
 
 const char* const ENTRIES_SCHEMA = R"sql(
@@ -31,10 +31,11 @@ CREATE VIRTUAL TABLE parts USING fts5(
 CREATE TABLE meta(
   id INTEGER PRIMARY KEY CHECK (id = 1),
   entries INTEGER NOT NULL,
-  last_commit INTEGER NOT NULL);
-INSERT INTO meta VALUES(1, 0, 0);
+  last_commit INTEGER NOT NULL,
+  removed INTEGER NOT NULL);
+INSERT INTO meta VALUES(1, 0, 0, 0);
 PRAGMA application_id = 1179209285;
-PRAGMA user_version = 1;
+PRAGMA user_version = 2;
 )sql";
 
 }  // namespace fileindexd

@@ -19,7 +19,8 @@
 //   names        words of the last path component, made valid UTF-8; no stored copy, so deleting
 //                needs the text that was inserted
 //   parts        the same text by trigrams, for substrings
-//   meta         one row: number of rows in `entries`, and when the last commit was made (seconds)
+//   meta         one row: number of rows in `entries`, when the last commit was made (seconds), and
+//                how many rows were removed since room was last given back
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizers or of the text that is given to them is a new version.
@@ -31,7 +32,7 @@ namespace fileindexd {
 
 constexpr const char* ENTRIES_FILE = "entries.db";
 constexpr int64_t ENTRIES_APPLICATION = 0x46494e45;
-constexpr int64_t ENTRIES_VERSION = 1;
+constexpr int64_t ENTRIES_VERSION = 2;
 
 // Makes the tables in an empty database, and sets both numbers.
 extern const char* const ENTRIES_SCHEMA;

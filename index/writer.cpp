@@ -6,8 +6,10 @@
 #include <exception>
 #include <utility>
 
+#include "index/shrink.h"
 #include "index/writer_impl.h"
 #include "state/layout.h"
+#include "state/queue_writer.h"
 
 namespace fileindexd {
 
@@ -59,7 +61,11 @@ bool EntryWriter::Delete(const std::string& path, DeleteMode mode) {
 
 bool EntryWriter::Commit() {
   last_error = impl->Guarded([this] { return impl->Commit(); });
-  return last_error == IndexError::NONE;
+  const bool good = last_error == IndexError::NONE;
+  if (good) {
+    (void)impl->Guarded([this] { return impl->GiveRoomBack(); });
+  }
+  return good;
 }
 
 // By type: a cancellation that comes out of `between_slices` passes.
@@ -256,6 +262,17 @@ IndexError EntryWriter::Impl::Commit() {
     return passed_error;
   }
   return PayReindex() ? IndexError::NONE : IndexError::IO;
+}
+
+// What is committed is durable: the result says nothing about it, and a failure waits for the next
+// commit. The share's queue file calls for a commit where there is more to do, as no event may
+// come: and between two passes a Worker can be stopped or paused.
+IndexError EntryWriter::Impl::GiveRoomBack() {
+  if (database.IsOpen() && ShrinkDatabase(database.db, between) == Shrinking::UNFINISHED) {
+    std::string ignored;
+    (void)AppendToQueue(share_name, {}, ignored);
+  }
+  return IndexError::NONE;
 }
 
 }  // namespace fileindexd

@@ -57,6 +57,7 @@ struct EntryWriter::Impl {
   IndexError Apply(const EntryOperation& operation, const Look* seen);
   IndexError Fail(IndexError error);
   IndexError CommitTransaction();
+  IndexError GiveRoomBack();
   void Remember(EntryOperation&& operation);
 
   std::string share_name;

@@ -144,8 +144,8 @@ int pthread_timedjoin_np(pthread_t thread, void** result, const timespec* until)
 // Told about, so that a test knows that a thread waits: once it has the thread's mutex itself.
 // Not instrumented: a cancelled thread unwinds through this frame, and the address sanitizer takes
 // what such a frame leaves on the stack for an overflow.
-[[gnu::no_sanitize("address")]] int pthread_cond_wait(pthread_cond_t* cond,
-                                                      pthread_mutex_t* mutex) {
+__attribute__((no_sanitize("address"))) int pthread_cond_wait(pthread_cond_t* cond,
+                                                              pthread_mutex_t* mutex) {
   return EnterCondWait(cond)(cond, mutex);
 }
 
