@@ -49,9 +49,12 @@ class SystemLog:
         self.thread = threading.Thread(target=self._drain, daemon=True)
         self.thread.start()
 
+    def receive(self):
+        return self.socket.recv(1 << 20)
+
     def _drain(self):
         while True:
-            datagram = self.socket.recv(1 << 20)
+            datagram = self.receive()
             if not datagram:
                 return  # the end that close() sends
             text = datagram.rstrip(b"\0\n").decode("utf-8", "surrogateescape")
