@@ -56,6 +56,7 @@ struct EntryWriter::Impl {
   IndexError ReplayOnce(bool& again);
   IndexError Apply(const EntryOperation& operation);
   IndexError Fail(IndexError error);
+  IndexError FailSql(IndexError error);
   IndexError CommitTransaction();
   void Remember(EntryOperation&& operation);
 
