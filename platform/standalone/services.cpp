@@ -9,8 +9,10 @@
 
 #include <array>
 #include <cerrno>
+#include <chrono>
 #include <csignal>
 #include <string>
+#include <thread>
 
 #include "base/scoped_fd.h"
 #include "platform/log.h"
@@ -28,6 +30,7 @@ namespace {
 
 constexpr int STOP_WAIT_MS = 10000;
 constexpr int KILL_WAIT_MS = 1000;
+constexpr std::chrono::seconds KEPT_COPY_PAUSE(1);
 
 struct SystemError {
   int code = 0;
@@ -244,6 +247,8 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
     const std::string share = arg2 != nullptr ? ShareOfDrainedCopy(arg2) : std::string();
     if (!share.empty() && !MayRemoveDrainedCopy(share)) {
       FI_LOG("Kept, as its changes are not stored: %s", arg2);
+      // With newer events waiting, the next pass comes at once, and reads this copy again.
+      std::this_thread::sleep_for(KEPT_COPY_PAUSE);
       return -1;
     }
 
