@@ -11,6 +11,7 @@
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
+#include <map>
 #include <mutex>
 #include <string>
 #include <string_view>
@@ -25,6 +26,23 @@ std::mutex log_mutex;
 std::string& LogText() {
   static std::string& text = *new std::string;
   return text;
+}
+
+std::mutex failed_mutex;
+std::map<sqlite3_stmt*, int>& FailedSteps() {
+  static std::map<sqlite3_stmt*, int>& steps = *new std::map<sqlite3_stmt*, int>;
+  return steps;
+}
+
+int TakeFailedStep(sqlite3_stmt* statement) {
+  const std::lock_guard guard(failed_mutex);
+  const auto found = FailedSteps().find(statement);
+  if (found == FailedSteps().end()) {
+    return 0;
+  }
+  const int code = found->second;
+  FailedSteps().erase(found);
+  return code;
 }
 
 template <typename Function>
@@ -62,6 +80,10 @@ void Log(const char* format, va_list arguments) {
   vsnprintf(line, sizeof line, format, arguments);
   const std::lock_guard guard(log_mutex);
   LogText().append(line).append("\n");
+  // Beside the state, for whoever finds this process hanging.
+  const int file = open("log", O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600);
+  dprintf(file, "%s\n", line);
+  close(file);
 }
 
 }  // namespace
@@ -81,7 +103,27 @@ int sqlite3_step(sqlite3_stmt* statement) {
   static auto* const hidden = fileindexd::fault::Hidden<int(sqlite3_stmt*)>("sqlite3_step");
   const int code = fileindexd::fault::Strike(
       Call::STATEMENT, fileindexd::fault::TargetOfStatement(sqlite3_db_handle(statement)));
-  return code != 0 ? code : hidden(statement);
+  if (code == 0) {
+    return hidden(statement);
+  }
+  const std::lock_guard guard(fileindexd::fault::failed_mutex);
+  fileindexd::fault::FailedSteps()[statement] = code;
+  return code;
+}
+
+// Gives the failure of the step once more: SQLite's own modules look only here.
+int sqlite3_reset(sqlite3_stmt* statement) {
+  static auto* const hidden = fileindexd::fault::Hidden<int(sqlite3_stmt*)>("sqlite3_reset");
+  const int code = hidden(statement);
+  const int failed = fileindexd::fault::TakeFailedStep(statement);
+  return failed != 0 ? failed : code;
+}
+
+int sqlite3_finalize(sqlite3_stmt* statement) {
+  static auto* const hidden = fileindexd::fault::Hidden<int(sqlite3_stmt*)>("sqlite3_finalize");
+  const int failed = fileindexd::fault::TakeFailedStep(statement);
+  const int code = hidden(statement);
+  return failed != 0 ? failed : code;
 }
 
 int sqlite3_prepare_v3(sqlite3* db, const char* sql, int size, unsigned flags,

@@ -36,6 +36,7 @@ class World {
   Daemon daemon;
 
  private:
+  static void Join(pthread_t thread);
   void ExpectNoDifference();
   void ExpectStatusClear();
   void ExpectIntegrity();
