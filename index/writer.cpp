@@ -108,8 +108,10 @@ IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& opera
     return error;
   }
 
-  if (converger->sql_failed || table->changes != before) {
-    error = Fail(error);
+  if (converger->sql_failed) {
+    (void)FailSql(error);
+  } else if (table->changes != before) {
+    (void)Fail(error);
   }
   // A root that is missing refuses the operation for good: when it is back, it is compared.
   if (error != IndexError::ROOT) {
@@ -163,6 +165,21 @@ IndexError EntryWriter::Impl::Fail(IndexError error) {
   replay_needed = !list.empty();
   if (error == IndexError::DAMAGED) {
     CloseDamaged();
+  } else if (sqlite3_get_autocommit(database.db) == 0) {
+    // The rollback failed too, for want of memory: closing undoes what was half done.
+    CloseAll();
+    next_open = 0;
+  }
+  return error;
+}
+
+// The same after a failure of the database itself. One whose files failed is opened anew: SQLite
+// opens a file that it may not write for reading only, and would stay with that for ever.
+IndexError EntryWriter::Impl::FailSql(IndexError error) {
+  (void)Fail(error);
+  if (error == IndexError::IO) {
+    CloseAll();
+    next_open = 0;
   }
   return error;
 }
@@ -210,14 +227,14 @@ IndexError EntryWriter::Impl::ReplayOnce(bool& again) {
       continue;
     }
     if (converger->sql_failed) {
-      return Fail(error);
+      return FailSql(error);
     }
     operation.passed_over = true;
     passed_error = error;
     if (table->changes != before) {
       (void)Fail(error);
-      again = true;
-      return IndexError::NONE;
+      again = database.IsOpen();
+      return again ? IndexError::NONE : error;
     }
   }
   return IndexError::NONE;
@@ -233,7 +250,7 @@ IndexError EntryWriter::Impl::CommitTransaction() {
   }
 
   const int code = table->Commit(static_cast<int64_t>(time(nullptr)));
-  return code == SQLITE_OK ? IndexError::NONE : Fail(FromSqlite(code));
+  return code == SQLITE_OK ? IndexError::NONE : FailSql(FromSqlite(code));
 }
 
 IndexError EntryWriter::Impl::Commit() {

@@ -56,6 +56,7 @@ struct EntryWriter::Impl {
   IndexError ReplayOnce(bool& again);
   IndexError Apply(const EntryOperation& operation, const Look* seen);
   IndexError Fail(IndexError error);
+  IndexError FailSql(IndexError error);
   IndexError CommitTransaction();
   IndexError GiveRoomBack();
   void Remember(EntryOperation&& operation);

@@ -25,6 +25,7 @@ bool StateStore::Impl::Open() {
   cached.reset();
   data_version.reset();
   connection.reset();
+  files_failed = false;
   connection = OpenStateDatabase(error);
   if (connection == nullptr) {
     return false;
@@ -56,7 +57,18 @@ bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
 }
 
 bool StateStore::Impl::Ready() {
-  return (connection != nullptr && !HasStateMoved(*connection)) || Open();
+  // A transaction that is still open here is one whose rollback failed.
+  const bool useful =
+      connection != nullptr && !files_failed && sqlite3_get_autocommit(connection->db) != 0;
+  return (useful && !HasStateMoved(*connection)) || Open();
+}
+
+// SQLite opens a file that it may not write for reading only, and would stay with that for ever.
+bool StateStore::Impl::FailSql() {
+  const int code = sqlite3_errcode(connection->db) & 0xff;
+  files_failed =
+      files_failed || code == SQLITE_IOERR || code == SQLITE_CANTOPEN || code == SQLITE_READONLY;
+  return Fail(StateError(*connection, "cannot use"));
 }
 
 bool StateStore::Impl::Change(const std::function<Outcome()>& body) {

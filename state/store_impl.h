@@ -23,10 +23,11 @@ struct StateStore::Impl {
     error = reason;
     return false;
   }
-  bool FailSql() { return Fail(StateError(*connection, "cannot use")); }
+  bool FailSql();
 
   bool Open();
-  // Opens anew where another program set the file aside: changes to it would be lost.
+  // Opens anew where another program set the file aside (changes to it would be lost), and where
+  // the connection is of no use any more.
   bool Ready();
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
@@ -61,6 +62,7 @@ struct StateStore::Impl {
   std::mutex mutex;
   std::string error;
   std::unique_ptr<StateConnection> connection;
+  bool files_failed = false;              // of this connection
   std::optional<Statement> data_version;  // goes before the connection
   int64_t cached_version = 0;
   std::optional<LogHead> cached_head;      // of the log, before `cached_version` was asked for

@@ -9,8 +9,10 @@
 
 #include <array>
 #include <cerrno>
+#include <chrono>
 #include <csignal>
 #include <string>
+#include <thread>
 
 #include "base/scoped_fd.h"
 #include "platform/log.h"
@@ -29,6 +31,7 @@ namespace {
 
 constexpr int STOP_WAIT_MS = 10000;
 constexpr int KILL_WAIT_MS = 1000;
+constexpr std::chrono::seconds KEPT_COPY_PAUSE(1);
 
 struct SystemError {
   int code = 0;
@@ -252,6 +255,8 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
     }
     if (!share.empty() && !MayRemoveDrainedCopy(share)) {
       FI_LOG("Kept, as its changes are not stored: %s", arg2);
+      // With newer events waiting, the next pass comes at once, and reads this copy again.
+      std::this_thread::sleep_for(KEPT_COPY_PAUSE);
       return -1;
     }
 

@@ -1,0 +1,18 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The same story once for each call that can fail in it.
+#pragma once
+
+#include <functional>
+#include <string>
+
+#include "unit/fault/plan.h"
+
+namespace fileindexd::fault {
+
+// Runs `story` in a process and a folder of its own for every call of the kind that it makes, with
+// that call failing; it arms and disarms by itself, with the number that it is given. A process
+// that dies, hangs, or has a failed expectation fails the test. Where all of them would be too many
+// for the usual scale, so many are taken at even distances.
+void ForEachCall(const Fault& fault, const std::function<void(int nth)>& story);
+
+}  // namespace fileindexd::fault
