@@ -81,7 +81,7 @@ const Glance& GlanceAt(const std::string& path) {
 // Walks descend into what is a directory. One that is kept out by a pattern (a build tree may be
 // larger than all that is indexed) is none to them, unless an indexed folder lies in it.
 bool MayHoldEntries(const Glance& glance) {
-  return glance.verdict != Verdict::EXCLUDED ||
+  return glance.look.verdict != Verdict::EXCLUDED ||
          glance.settings->HasFolderBelow(NormalPath(glance.path).value_or(glance.path));
 }
 
