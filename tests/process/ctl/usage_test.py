@@ -19,6 +19,8 @@ WRONG = [
     ("share", "add", "a", "/b", "c"),
     ("share", "remove"),
     ("share", "list", "x"),
+    ("share", "accept"),
+    ("status", "--follow", "x"),
     ("folder",),
     ("folder", "add"),
     ("folder", "add", "/a", "--text"),
