@@ -75,7 +75,7 @@ IndexError EntryWriter::Impl::Guarded(const std::function<IndexError()>& step) {
   } catch (const std::exception&) {
     // Memory ran out, and the operation may be half done and on no list.
     CloseAll();
-    WantReindex(false);
+    WantReindex();
     return IndexError::NO_MEMORY;
   }
 }
@@ -127,7 +127,7 @@ void EntryWriter::Impl::Remember(EntryOperation&& operation) {
     list.clear();
     list.shrink_to_fit();
     replay_needed = false;
-    WantReindex(false);
+    WantReindex();
   }
 }
 

@@ -44,7 +44,7 @@ struct EntryWriter::Impl {
   IndexError Reopen();
   void CloseAll();
   void CloseDamaged();
-  void WantReindex(bool lost);
+  void WantReindex();
   bool PayReindex();
 
   // writer.cpp
@@ -78,7 +78,6 @@ struct EntryWriter::Impl {
   IndexError replay_error = IndexError::NONE;
   IndexError passed_error = IndexError::IO;  // of the operation that was last passed over
   bool reindex_owed = false;                 // the share's flag could not be set yet
-  bool reindex_lost = false;                 // and what for: see WantReindex
 
  private:
   IndexError TryOpen(bool create);

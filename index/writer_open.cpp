@@ -92,12 +92,20 @@ IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
 }
 
 // In place of a database that is gone. What it held comes back by a reindex; what is on the list,
-// at once.
+// at once. The flag goes first: a process that ends in between would leave a database that is new,
+// empty and opens well. The wake-up goes last: while the disk stays full, it would wake for
+// nothing, again and again.
 IndexError EntryWriter::Impl::Reopen() {
   CloseAll();
+  if (!store.UpdateStatus(share_name, [](ShareStatus& status) { status.needs_reindex = true; })) {
+    next_open = MonotonicMs() + OPEN_INTERVAL_MS;
+    return IndexError::IO;
+  }
+
   const IndexError error = TryOpen(true);
   if (error == IndexError::NONE) {
-    WantReindex(true);
+    std::string ignored;  // the flag stands, and whoever touches stale queues helps
+    (void)AppendToQueue(share_name, {}, ignored);
   }
   return error;
 }
@@ -120,10 +128,9 @@ void EntryWriter::Impl::CloseDamaged() {
   next_open = MonotonicMs() + OPEN_INTERVAL_MS;
 }
 
-// `lost`: what was committed is gone, so a reindex that is under way does not suffice.
-void EntryWriter::Impl::WantReindex(bool lost) {
+// For operations that are on no list any more. A reindex that is under way suffices.
+void EntryWriter::Impl::WantReindex() {
   reindex_owed = true;
-  reindex_lost = reindex_lost || lost;
   (void)PayReindex();  // if it fails, the next commit tries again and fails until it is done
 }
 
@@ -134,7 +141,7 @@ bool EntryWriter::Impl::PayReindex() {
 
   bool set = false;
   const bool updated = store.UpdateStatus(share_name, [&](ShareStatus& status) {
-    set = !status.needs_reindex && (reindex_lost || !status.reindex_begun);
+    set = !status.needs_reindex && !status.reindex_begun;
     status.needs_reindex = status.needs_reindex || set;
   });
   if (!updated) {
@@ -147,7 +154,6 @@ bool EntryWriter::Impl::PayReindex() {
     (void)AppendToQueue(share_name, {}, ignored);
   }
   reindex_owed = false;
-  reindex_lost = false;
   return true;
 }
 

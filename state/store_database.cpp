@@ -12,6 +12,8 @@
 #include <cerrno>
 #include <chrono>
 #include <cstring>
+#include <filesystem>
+#include <system_error>
 #include <thread>
 
 #include "base/scoped_fd.h"
@@ -74,6 +76,19 @@ bool LockRoot(const std::string& root, ScopedFd& lock, std::string& error) {
 bool Exists(const std::string& path) {
   struct stat st {};
   return lstat(path.c_str(), &st) == 0;
+}
+
+// SQLite would wait for ever in a pipe.
+bool IsFileOrNothing(const std::string& path) {
+  struct stat st {};
+  return lstat(path.c_str(), &st) != 0 || S_ISREG(st.st_mode);
+}
+
+// In the place of what was set aside before; a rename alone cannot put a file in a folder's place.
+bool MoveAside(const std::string& path, const std::string& aside) {
+  std::error_code ignored;  // what is in the way still makes the renaming fail
+  std::filesystem::remove_all(aside, ignored);
+  return rename(path.c_str(), aside.c_str()) == 0 || errno == ENOENT;
 }
 
 // SQLite would make the file with the mode that the umask leaves. Its log and its shared memory
@@ -271,15 +286,16 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
     return false;
   }
   const std::string aside = path + ".damaged";
-  if (rename(path.c_str(), aside.c_str()) != 0 && errno != ENOENT) {
+  if (!MoveAside(path, aside)) {
     error = Reason("cannot set aside", path);
     return false;
   }
-  if (rename((path + "-wal").c_str(), (aside + "-wal").c_str()) != 0 && errno != ENOENT) {
+  if (!MoveAside(path + "-wal", aside + "-wal")) {
     error = Reason("cannot set aside the log of", path);
     return false;
   }
-  (void)unlink((path + "-shm").c_str());  // of no use without the log, and made anew
+  std::error_code ignored;
+  std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
   if (!WriteSafely(path, image, error)) {
     return false;
   }
@@ -331,6 +347,9 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     Opened outcome = Opened::DAMAGED;
     if (has_copy && !Exists(path)) {
       error = path + " is missing";
+    } else if (!IsFileOrNothing(path) || !IsFileOrNothing(path + "-wal") ||
+               !IsFileOrNothing(path + "-shm")) {
+      error = path + " or its log is no regular file";
     } else if (!MakeFile(path, error)) {
       return nullptr;
     } else {

@@ -34,13 +34,16 @@ const Share* FindShareOfPath(const Settings& settings, const std::string& path) 
   return normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
 }
 
-// An index that was found missing may be made anew once the share's reindex is queued.
+// An index that was found missing may be made anew now. Both are put on record together, and before
+// the line is queued: whoever ends in between, or loses the queue with the power, would leave an
+// index that is new, empty and opens well, and nothing would ever fill it.
 void NoteReindex(const Share& share, const std::string& path) {
   if (NormalPath(path) != share.path) {
     return;
   }
   ChangeStatus(share.name, [](ShareStatus& status) {
     status.rebuild_wanted = status.rebuild_wanted || status.missing;
+    status.needs_reindex = status.needs_reindex || status.missing;
   });
 }
 

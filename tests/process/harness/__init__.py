@@ -9,6 +9,7 @@ A test file is a program. By hand:
 
 from harness import control, namespace
 from harness.checks import IndexTest
+from harness.batch_load import LoadTest
 from harness.machine import MachineTest, main
 
-__all__ = ["IndexTest", "MachineTest", "control", "main", "namespace"]
+__all__ = ["IndexTest", "LoadTest", "MachineTest", "control", "main", "namespace"]

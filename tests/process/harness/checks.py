@@ -9,17 +9,21 @@ class IndexTest(MachineTest):
     def assert_index(self, root, share="alpha", folders=None, left_out=()):
         """The index holds what an independent walk finds, and `verify` has nothing to say."""
         expected = expected_entries(root, folders, left_out)
+        self.assertEqual(self.entries(share), expected)
+        self.assertEqual(self.dump(share), sorted(expected))
+
+        verified = self.ctl("verify", share)
+        self.assertEqual((verified.out, verified.err), (b"", b""))
+
+    def entries(self, share="alpha"):
+        """{path: description} of all that the index holds."""
         shown = self.ctl("dump", share, "--json").objects()
         entries = {
             full_path(entry): {key: entry[key] for key in ("dir", "kind", "size", "mtime")}
             for entry in shown
         }
-        self.assertEqual(entries, expected)
         self.assertEqual(len(shown), len(entries))
-        self.assertEqual(self.dump(share), sorted(expected))
-
-        verified = self.ctl("verify", share)
-        self.assertEqual((verified.out, verified.err), (b"", b""))
+        return entries
 
     def assert_paths(self, root, wanted, share="alpha"):
         """The index holds exactly these paths below `root`, and the root itself."""

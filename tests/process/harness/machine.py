@@ -258,16 +258,7 @@ class MachineTest(unittest.TestCase):
 
     def ctl(self, *arguments, code=0, **more):
         """Runs the command, which has to end with that code; None: with any but 0."""
-        command = [os.fsencode(program("fileindexctl")), *map(os.fsencode, arguments)]
-        done = subprocess.run(
-            command,
-            env=environment(**more),
-            stdin=subprocess.DEVNULL,
-            capture_output=True,
-            check=False,
-            timeout=LIMIT * 2,
-        )
-        result = Result(done.returncode, done.stdout, done.stderr)
+        result = self.try_ctl(*arguments, **more)
         if code is None:
             self.assertNotEqual(result.code, 0, f"{arguments}: {result}")
         else:
@@ -277,6 +268,19 @@ class MachineTest(unittest.TestCase):
         elif result.err or arguments[:1] != ("verify",):  # a difference is no error
             self.assertRegex(result.err, rb"\Afileindexctl: [^\n]+\n\Z", arguments)
         return result
+
+    def try_ctl(self, *arguments, **more):
+        """Runs the command, whatever comes of it."""
+        command = [os.fsencode(program("fileindexctl")), *map(os.fsencode, arguments)]
+        done = subprocess.run(
+            command,
+            env=environment(**more),
+            stdin=subprocess.DEVNULL,
+            capture_output=True,
+            check=False,
+            timeout=LIMIT * 2,
+        )
+        return Result(done.returncode, done.stdout, done.stderr)
 
     def make_share(self, name="alpha", files=(), folders=("",), flags=()):
         """A share with these files (ending in "/": folders), and these folders of it indexed."""
