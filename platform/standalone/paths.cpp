@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/paths.h"
 
+#include <cstring>
 #include <ctime>
 
 #include "platform/standalone/environment.h"
@@ -140,8 +141,9 @@ bool StringStartWith(const std::string& text, const std::string& prefix) {
 }
 
 void RetrieveBoolFromJsonObj(bool& value, const char* key, const Json::Value& object) {
-  if (object.isObject() && object.isMember(key) && object[key].isBool()) {
-    value = object[key].asBool();
+  const ::Json::Value* found = object.isObject() ? object.find(key, key + strlen(key)) : nullptr;
+  if (found != nullptr && found->isBool()) {
+    value = found->asBool();
   }
 }
 
