@@ -3,6 +3,7 @@
 
 #include <cstring>
 #include <ctime>
+#include <utility>
 
 #include "platform/standalone/environment.h"
 #include "platform/standalone/glance.h"
@@ -80,13 +81,13 @@ const Glance& GlanceAt(const std::string& path) {
 
 }  // namespace
 
-bool TakeGlance(const std::string& path, Look& look) {
+bool TakeGlance(const std::string& path, Seen& seen) {
   Glance& kept = OfThisThread().kept;
   if (kept.settings == nullptr || kept.path != path || Now() - kept.time >= GLANCE_NS ||
       kept.look.verdict != Verdict::BELONGS) {
     return false;
   }
-  look = kept.look;
+  seen = {std::move(kept.settings), kept.look};
   kept.settings.reset();
   return true;
 }
