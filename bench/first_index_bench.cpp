@@ -30,6 +30,7 @@ constexpr const char* ENDINGS[] = {"txt", "odt", "pdf", "jpg", "mp3"};
 struct Measured {
   std::vector<double> seconds;
   std::vector<double> memory;  // KiB
+  std::vector<double> size;    // KiB on the disk
 };
 
 void MakeFolder(const std::string& path) {
@@ -72,6 +73,17 @@ void Settle() {
   sync();
 }
 
+// What all files below `folder` take.
+double SizeOf(const std::string& folder) {
+  uint64_t bytes = 0;
+  for (const auto& found : std::filesystem::recursive_directory_iterator(folder)) {
+    if (found.is_regular_file()) {
+      bytes += found.file_size();
+    }
+  }
+  return static_cast<double>(bytes) / 1024;
+}
+
 void MeasureDaemon(const std::string& folder, const std::string& tree, uint64_t entries,
                    Measured& measured) {
   Settle();
@@ -83,6 +95,8 @@ void MeasureDaemon(const std::string& folder, const std::string& tree, uint64_t 
   }));
   measured.memory.push_back(static_cast<double>(daemon.PeakMemory()));
 
+  // With its log and the log's index.
+  measured.size.push_back(SizeOf(IndexPath("tree")));
   EntryReader reader;
   EntryReader::Summary summary;
   if (reader.Open("tree") != IndexError::NONE || !reader.Summarise(summary) ||
@@ -124,6 +138,7 @@ void MeasureOther(const std::string& folder, const std::string& tree, Measured& 
     Fail("recollindex failed, see " + folder + "/output");
   }
   measured.memory.push_back(static_cast<double>(ended.peak_memory));
+  measured.size.push_back(SizeOf(folder + "/xapiandb"));
 }
 
 std::string MemoryText(double kib) {
@@ -147,6 +162,8 @@ void Print(const Measured& ours, const Measured& bare, const Measured& other, ui
   PrintTimes(what + " / recollindex", Median(ours.seconds), Median(other.seconds), 1.0 / 8);
   PrintRow("resident memory / recollindex", MemoryText(memory), MemoryText(Median(other.memory)),
            memory / Median(other.memory), 1);
+  PrintRow("size of the index / recollindex", MemoryText(Median(ours.size)),
+           MemoryText(Median(other.size)), Median(ours.size) / Median(other.size), 0.5);
 }
 
 bool IsInstalled(const char* program) {

@@ -125,30 +125,22 @@ IndexError Converger::Settle(const std::string& path, const Look& look, const Co
                              const ContentFlags& decide) {
   Outcome outcome = Outcome::SAME;
   IndexError error = Put(path, look, wanted, decide, outcome);
+  const bool is_new = outcome == Outcome::NEW || outcome == Outcome::NEW_ABOVE;
   if (error == IndexError::NONE && look.links > 1 && look.thing == Thing::FILE &&
       outcome != Outcome::SAME) {
-    error = RefreshTwins(path, look, outcome == Outcome::NEW);
+    error = RefreshTwins(path, look, is_new);
   }
   if (error != IndexError::NONE) {
     return error;
   }
 
-  bool look_below = outcome == Outcome::REPLACED;
-  if (outcome == Outcome::NEW) {
-    // Entries below without one here: left by a deletion of this entry alone.
-    error = Sql(table.HasBelow(PathRange(path), look_below));
-    if (error != IndexError::NONE) {
-      return error;
-    }
-  }
-
+  const bool look_below = outcome == Outcome::REPLACED || outcome == Outcome::NEW_ABOVE;
   std::vector<std::string> walks;
   if (look_below && look.thing == Thing::DIRECTORY) {
     walks.push_back(path);
   }
   // Without birth times, another directory with the inode of the old one looks the same.
-  const bool doubtful =
-      look.thing == Thing::DIRECTORY && look.birth_time == 0 && outcome != Outcome::NEW;
+  const bool doubtful = look.thing == Thing::DIRECTORY && look.birth_time == 0 && !is_new;
   if (look_below || (doubtful && !IsLookedAt(path))) {
     error = LookBelow(path, walks);
   }
@@ -175,7 +167,8 @@ IndexError Converger::Put(const std::string& path, const Look& look, const Conte
 
   Entry known;
   bool found = false;
-  error = Sql(table.Find(path, known, found));
+  bool has_below = false;
+  error = Sql(table.FindOrBelow(path, known, found, has_below));
   if (error != IndexError::NONE) {
     return error;
   }
@@ -184,7 +177,7 @@ IndexError Converger::Put(const std::string& path, const Look& look, const Conte
     return outcome == Outcome::REPLACED ? NoteOtherPaths(path, look) : error;
   }
 
-  outcome = Outcome::NEW;
+  outcome = has_below ? Outcome::NEW_ABOVE : Outcome::NEW;
   Entry entry = EntryOf(path, look);
   entry.first_seen = Now();
   entry.content_wanted = entry.thing == Thing::FILE && IsContentWanted(entry.kind, wanted);

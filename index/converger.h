@@ -35,7 +35,8 @@ class Converger {
 
  private:
   static constexpr int SLICE = 500;  // rows, or things on disk, between two calls of `between`
-  enum class Outcome { SAME, CHANGED, NEW, REPLACED };
+  // NEW_ABOVE: new, with entries below that are left from a deletion of this entry alone.
+  enum class Outcome { SAME, CHANGED, NEW, NEW_ABOVE, REPLACED };
 
   IndexError Sql(int code);
   IndexError CheckRoot();

@@ -38,6 +38,9 @@ class EntryTable {
   void Rollback();
 
   int Find(const std::string& path, Entry& entry, bool& found);
+  // The same, and whether there are entries below. Below a path that is found, nothing is looked
+  // for: `below` is then false.
+  int FindOrBelow(const std::string& path, Entry& entry, bool& found, bool& has_below);
   int HasBelow(const PathRange& range, bool& has);
   // Up to `limit` entries of paths greater than `after` and less than `end`, in byte order.
   int Slice(const std::string& after, const std::string& end, int limit,
@@ -61,7 +64,7 @@ class EntryTable {
   int GiveBackPages();
 
   Statement begin, commit, read_meta, write_meta, free_pages, give_back;
-  Statement find, below, slice, twins, other_paths;
+  Statement find, next, row, below, slice, twins, other_paths;
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
   int64_t entries = 0;  // rows, as this transaction sees them

@@ -39,7 +39,7 @@ bool EntryWriter::IsOpen() const {
 }
 
 bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
-                          const ContentFlags& decide, const Look* seen) {
+                          const ContentFlags& decide, const Seen* seen) {
   EntryOperation operation;
   operation.wanted = wanted;
   operation.decide = decide;
@@ -47,7 +47,7 @@ bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
   return last_error == IndexError::NONE;
 }
 
-bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted, const Look* seen) {
+bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted, const Seen* seen) {
   return Refresh(path, wanted, EVERY_KIND, seen);
 }
 
@@ -81,7 +81,7 @@ IndexError EntryWriter::Impl::Guarded(const std::function<IndexError()>& step) {
 }
 
 IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& operation,
-                                 const Look* seen) {
+                                 const Seen* seen) {
   auto normal = NormalPath(path);
   if (!normal.has_value()) {
     return IndexError::NONE;  // belongs nowhere, and is held nowhere
@@ -132,10 +132,12 @@ void EntryWriter::Impl::Remember(EntryOperation&& operation) {
 }
 
 // Carries the operation out in the transaction that runs, beginning one where there is none.
-IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Look* seen) {
+IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen* seen) {
   std::shared_ptr<const Settings> settings;
   converger->sql_failed = false;
-  if (!store.GetSettings(settings)) {
+  if (seen != nullptr) {
+    settings = seen->settings;
+  } else if (!store.GetSettings(settings)) {
     return IndexError::IO;
   }
   const Share* share = settings->ShareOfPath(operation.path);
@@ -151,9 +153,10 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Look*
     }
     changes_begun = table->changes;
   }
-  return operation.removal ? converger->Delete(*settings, *share, operation.path, operation.mode)
-                           : converger->Refresh(*settings, *share, operation.path, operation.wanted,
-                                                operation.decide, seen);
+  return operation.removal
+             ? converger->Delete(*settings, *share, operation.path, operation.mode)
+             : converger->Refresh(*settings, *share, operation.path, operation.wanted,
+                                  operation.decide, seen != nullptr ? &seen->look : nullptr);
 }
 
 // Gives the transaction up: whatever failed in it left it half done.

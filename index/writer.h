@@ -39,9 +39,9 @@ class EntryWriter {
   // `seen`: what the caller saw there a moment ago, or null to look here. It has to be younger than
   // whatever the operation tells of.
   bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide,
-               const Look* seen = nullptr);
+               const Seen* seen = nullptr);
   // Like Refresh with every kind decided.
-  bool Add(const std::string& path, const ContentFlags& wanted, const Look* seen = nullptr);
+  bool Add(const std::string& path, const ContentFlags& wanted, const Seen* seen = nullptr);
   bool Delete(const std::string& path, DeleteMode mode);
   // True when everything since the last good commit is durable.
   bool Commit();

@@ -49,12 +49,12 @@ struct EntryWriter::Impl {
 
   // writer.cpp
   IndexError Guarded(const std::function<IndexError()>& step);
-  IndexError Do(const std::string& path, EntryOperation&& operation, const Look* seen);
+  IndexError Do(const std::string& path, EntryOperation&& operation, const Seen* seen);
   IndexError Commit();
   IndexError EnsureApplied(bool at_once);
   IndexError Replay();
   IndexError ReplayOnce(bool& again);
-  IndexError Apply(const EntryOperation& operation, const Look* seen);
+  IndexError Apply(const EntryOperation& operation, const Seen* seen);
   IndexError Fail(IndexError error);
   IndexError FailSql(IndexError error);
   IndexError CommitTransaction();

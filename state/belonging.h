@@ -13,6 +13,7 @@
 #include <sys/stat.h>
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
 
@@ -55,6 +56,12 @@ struct Look {
   uint64_t mount_id = 0;  // of the mount that shows the thing; to be compared with other looks only
   uint64_t device = 0;
   bool mount_root = false;  // the thing is the root of that mount
+};
+
+// A look with the settings that it was judged by.
+struct Seen {
+  std::shared_ptr<const Settings> settings;
+  Look look;
 };
 
 // A folder of which nothing but the names in it is left to judge: see LookNear.

@@ -10,7 +10,7 @@
 namespace fileindexd {
 
 // True when this thread has just asked about exactly that path, and the thing there belongs; then
-// stores what was seen, and forgets it. `look` is unchanged otherwise.
-bool TakeGlance(const std::string& path, Look& look);
+// stores what was seen, and forgets it. `seen` is unchanged otherwise.
+bool TakeGlance(const std::string& path, Seen& seen);
 
 }  // namespace fileindexd

@@ -128,8 +128,8 @@ bool Indexer::IsOpen() const {
 
 bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
-    Look look;
-    const Look* seen = TakeGlance(path, look) ? &look : nullptr;
+    Seen kept;
+    const Seen* seen = TakeGlance(path, kept) ? &kept : nullptr;
     return writer.Add(path, FlagsOf(cfg), seen);
   });
 }
@@ -137,8 +137,8 @@ bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
 bool Indexer::UpdateFSDocument(const std::string& path, const Json::Value& cfg,
                                const Json::Value& data) {
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
-    Look look;
-    const Look* seen = TakeGlance(path, look) ? &look : nullptr;
+    Seen kept;
+    const Seen* seen = TakeGlance(path, kept) ? &kept : nullptr;
     return writer.Refresh(path, FlagsOf(cfg), FlagsOf(data), seen);
   });
 }

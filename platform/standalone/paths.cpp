@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/paths.h"
 
+#include <cstring>
 #include <ctime>
+#include <utility>
 
 #include "platform/standalone/environment.h"
 #include "platform/standalone/glance.h"
@@ -87,13 +89,13 @@ bool MayHoldEntries(const Glance& glance) {
 
 }  // namespace
 
-bool TakeGlance(const std::string& path, Look& look) {
+bool TakeGlance(const std::string& path, Seen& seen) {
   Glance& kept = OfThisThread().kept;
   if (kept.settings == nullptr || kept.path != path || Now() - kept.time >= GLANCE_NS ||
       kept.look.verdict != Verdict::BELONGS) {
     return false;
   }
-  look = kept.look;
+  seen = {std::move(kept.settings), kept.look};
   kept.settings.reset();
   return true;
 }
@@ -151,8 +153,9 @@ bool StringStartWith(const std::string& text, const std::string& prefix) {
 }
 
 void RetrieveBoolFromJsonObj(bool& value, const char* key, const Json::Value& object) {
-  if (object.isObject() && object.isMember(key) && object[key].isBool()) {
-    value = object[key].asBool();
+  const ::Json::Value* found = object.isObject() ? object.find(key, key + strlen(key)) : nullptr;
+  if (found != nullptr && found->isBool()) {
+    value = found->asBool();
   }
 }
 

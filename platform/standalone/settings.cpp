@@ -36,12 +36,17 @@ bool ReadFolders(std::vector<Folder>& folders) {
   });
 }
 
+// Made for each document: keys that are known to live for ever are not copied.
 Json::Value Flags(const Folder& folder) {
+  static const ::Json::StaticString document("document");
+  static const ::Json::StaticString audio("audio");
+  static const ::Json::StaticString video("video");
+  static const ::Json::StaticString photo("photo");
   Json::Value flags(Json::objectValue);
-  flags["document"] = folder.document;
-  flags["audio"] = folder.audio;
-  flags["video"] = folder.video;
-  flags["photo"] = folder.photo;
+  flags[document] = folder.document;
+  flags[audio] = folder.audio;
+  flags[video] = folder.video;
+  flags[photo] = folder.photo;
   return flags;
 }
 
