@@ -283,7 +283,7 @@ class RepairTest(IndexTest):
 
         # What is changed everywhere is looked at directory by directory, not as one share.
         self.assertNotIn((REINDEX, b"."), lines)
-        self.assertEqual({event for event, _ in lines}, {REINDEX})
+        self.assertIn(REINDEX, {event for event, _ in lines})
 
     def test_many_files_in_one_directory(self):
         for i in range(MANY):
