@@ -198,7 +198,7 @@ Look LookWithCare(const std::string& root_path, const std::string& path) {
 }
 
 // JudgeName for a name in a directory that belongs: all that the letters of the way to it say has
-// been judged with the directory.
+// been judged with the directory. Whatever JudgeName asks of a single name is asked here as well.
 Verdict JudgeNameIn(const Settings& settings, const std::string& path, std::string_view name) {
   if (IsPreservedName(name) || IsPassingName(name)) {
     return Verdict::SKIPPED_NAME;
