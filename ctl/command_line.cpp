@@ -191,6 +191,7 @@ void AddQuestions(Declarer& declare) {
   CLI::App* verify =
       declare.Add(&declare.app, "verify", Verify, "Compare a share's index with its files");
   AddText(verify, "SHARE", into.share, "The share");
+  verify->add_flag("--repair", into.repair, "Queue the events that mend what differs");
   AddJson(verify, into, "One JSON object a line");
 }
 

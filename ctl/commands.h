@@ -33,6 +33,7 @@ struct Arguments {
   bool all = false;
   bool json = false;
   bool count = false;
+  bool repair = false;
   bool nul_ended = false;
   bool follow = false;
 };

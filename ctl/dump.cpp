@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// dump, verify: a whole index, entry by entry.
+// dump: a whole index, entry by entry.
 #include "ctl/commands.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
-#include "index/compare.h"
 #include "index/reader.h"
 
 namespace fileindexd {
@@ -22,17 +21,6 @@ bool PutEntry(const Entry& entry, const Arguments& arguments) {
   object["size"] = static_cast<Json::Int64>(entry.size);
   object["mtime"] = static_cast<Json::Int64>(WholeSeconds(entry.mtime));
   object["content"] = entry.content_wanted;
-  return PutJson(object);
-}
-
-bool PutDifference(Difference difference, const std::string& path, const Arguments& arguments) {
-  if (!arguments.json) {
-    return PutLine(std::string(DifferenceText(difference)) + "\t" + path);
-  }
-
-  Json::Value object(Json::objectValue);
-  SetPath(object, path);
-  object["difference"] = DifferenceText(difference);
   return PutJson(object);
 }
 
@@ -67,33 +55,6 @@ int Dump(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s: the index cannot be read", share->name.c_str());
   }
   return EXIT_DONE;
-}
-
-int Verify(const Arguments& arguments) {
-  Session session;
-  if (!session.Open()) {
-    return EXIT_FAILED;
-  }
-  const Share* share = session.FindShare(arguments.share);
-  if (share == nullptr) {
-    return EXIT_FAILED;
-  }
-
-  Comparison comparison;
-  std::string error;
-  bool written = true;
-  const Progress progress("comparing " + share->name + " with its files");
-  const bool compared = CompareShare(
-      *session.store, share->name,
-      [&](Difference difference, const std::string& path) {
-        written = PutDifference(difference, path, arguments);
-        return written;
-      },
-      comparison, error);
-  if (!compared && written) {
-    return Fail(EXIT_FAILED, "%s", error.c_str());
-  }
-  return comparison.differences == 0 ? EXIT_DONE : EXIT_FAILED;
 }
 
 }  // namespace fileindexd

@@ -129,4 +129,24 @@ bool EntryReader::Find(const std::string& path, Entry& entry) {
   return true;
 }
 
+bool EntryReader::CountBelow(const std::string& directory, uint64_t limit, uint64_t& below) {
+  Statement statement;
+  if (statement.Prepare(database.db,
+                        "SELECT count(*) FROM"
+                        " (SELECT 1 FROM entries WHERE path > ?1 AND path < ?2 LIMIT ?3)") !=
+      SQLITE_OK) {
+    return false;
+  }
+
+  const PathRange range(directory);
+  statement.BindBlob(1, range.first);
+  statement.BindBlob(2, range.end);
+  statement.BindInt(3, static_cast<int64_t>(limit));
+  if (statement.Step() != SQLITE_ROW) {
+    return false;
+  }
+  below = static_cast<uint64_t>(statement.Int(0));
+  return true;
+}
+
 }  // namespace fileindexd

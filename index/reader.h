@@ -36,6 +36,10 @@ class EntryReader {
   // The entry at exactly that path. False when there is none, or reading failed.
   bool Find(const std::string& path, Entry& entry);
 
+  // How many entries lie below normal path `directory`, counted up to `limit`. False when reading
+  // failed.
+  bool CountBelow(const std::string& directory, uint64_t limit, uint64_t& below);
+
   IndexDatabase database;
 };
 

@@ -1,0 +1,151 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// verify: an index against the disk, and the events that mend it.
+#include <json/reader.h>
+
+#include <algorithm>
+#include <exception>
+#include <fstream>
+#include <memory>
+#include <optional>
+#include <set>
+
+#include "base/event_codes.h"
+#include "ctl/commands.h"
+#include "ctl/output.h"
+#include "ctl/places.h"
+#include "index/compare.h"
+#include "index/repair.h"
+#include "state/layout.h"
+#include "state/queue_writer.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr uint64_t PROGRESS_INTERVAL = 20000;  // paths
+
+bool PutDifference(Difference difference, const std::string& path, const Arguments& arguments) {
+  if (!arguments.json) {
+    return PutLine(std::string(DifferenceText(difference)) + "\t" + path);
+  }
+
+  Json::Value object(Json::objectValue);
+  SetPath(object, path);
+  object["difference"] = DifferenceText(difference);
+  return PutJson(object);
+}
+
+// What waits in the queue file. Its drained copy is a batch of its own.
+struct Waiting {
+  size_t lines = 0;
+  std::set<std::string> updated;  // paths of updates of a subtree
+};
+
+Waiting ReadWaiting(const std::string& share_name) {
+  Json::CharReaderBuilder builder;
+  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
+  Waiting waiting;
+  std::ifstream queue(QueuePath(share_name), std::ios::binary);
+  for (std::string line; std::getline(queue, line);) {
+    ++waiting.lines;
+    try {
+      Json::Value value;
+      if (reader->parse(line.data(), line.data() + line.size(), &value, nullptr) &&
+          value.isObject() && (value["event"].asUInt() & CUSTOM_EVENT_UPDATE) != 0) {
+        waiting.updated.insert(value["path"].asString());
+      }
+    } catch (const std::exception&) {
+      continue;  // no event, and of no consequence here
+    }
+  }
+  return waiting;
+}
+
+// An update of a subtree that waits at the same path would swallow a reindex, and it does not drop
+// what is gone below. With a slash behind it the path names the same directory, and the reindex is
+// carried out after the update.
+std::string QueuedPath(const QueueLine& line, const Waiting& waiting) {
+  const bool swallowed = line.event == CUSTOM_EVENT_REINDEX && waiting.updated.contains(line.path);
+  return swallowed ? line.path + "/" : line.path;
+}
+
+int QueueRepair(const std::string& share_name, Repair& repair) {
+  const Waiting waiting = ReadWaiting(share_name);
+  const size_t room = QUEUE_LINE_LIMIT - std::min(waiting.lines, QUEUE_LINE_LIMIT);
+  std::vector<std::string> lines;
+  for (const QueueLine& line : repair.Lines(room)) {
+    lines.push_back(EventLine(line.event, QueuedPath(line, waiting), std::nullopt, line.data));
+  }
+
+  std::string error;
+  if (!lines.empty() && !AppendToQueue(share_name, lines, error)) {
+    return Fail(EXIT_FAILED, "%s", error.c_str());
+  }
+  return EXIT_DONE;
+}
+
+// Compares to the end, or until `report` wants no more, and says meanwhile how far it is.
+Comparer::Result CompareAll(Comparer& comparer, const std::string& share_name,
+                            const std::function<bool(const Found&)>& report) {
+  const std::string what = "comparing " + share_name + " with its files";
+  std::optional<Progress> progress(what);
+  bool going = true;
+  for (;;) {
+    const Comparer::Result result = comparer.Run(
+        [&](const Found& found) {
+          going = report(found);
+          return going;
+        },
+        PROGRESS_INTERVAL);
+    if (result != Comparer::Result::STOPPED || !going) {
+      return result;
+    }
+    progress.reset();
+    progress.emplace(what + ": " + std::to_string(comparer.counts.compared) + " of about " +
+                     std::to_string(comparer.Estimate()));
+  }
+}
+
+}  // namespace
+
+int Verify(const Arguments& arguments) {
+  Session session;
+  if (!session.Open()) {
+    return EXIT_FAILED;
+  }
+  const Share* share = session.FindShare(arguments.share);
+  if (share == nullptr) {
+    return EXIT_FAILED;
+  }
+
+  Comparer comparer(*session.store, share->name);
+  EntryReader reader;  // counts for the repair, beside the comparison's own
+  if (!comparer.Start()) {
+    return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
+  }
+  (void)reader.Open(share->name);  // an index that is not there has nothing to count
+  Repair repair(*session.settings, *share, reader);
+
+  bool mended = true;
+  bool written = true;
+  const Comparer::Result result = CompareAll(comparer, share->name, [&](const Found& found) {
+    written = PutDifference(found.difference, found.path, arguments);
+    mended = (!arguments.repair || repair.Add(found)) && mended;
+    return written || arguments.repair;  // a mending goes on though nobody listens
+  });
+  if (result == Comparer::Result::FAILED) {
+    return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
+  }
+  if (!arguments.repair) {
+    return comparer.counts.differences == 0 ? EXIT_DONE : EXIT_FAILED;
+  }
+
+  const int queued = QueueRepair(share->name, repair);
+  if (queued == EXIT_DONE && !mended) {
+    return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",
+                share->name.c_str());
+  }
+  return queued;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,49 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The queue lines that mend what a comparison found.
+//
+//   difference                                line                       mends also
+//   missing file or link                      close-write
+//   missing directory                         reindex                    all below it
+//   stale, a directory before or now          reindex                    all below it
+//   stale, left over                          modify
+//   left-over directory that is gone          reindex                    all below it
+//   left-over directory that does not belong  modify                     what is left over below it
+//   content                                   update of all four kinds   stale at the same path
+//
+// Not a delete for what is left over: it takes the entry away whatever the disk holds by then, so
+// that a file which came back, and whose own event waits already, would be missing. A modify looks.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "index/compare.h"
+#include "index/reader.h"
+#include "state/queue_folding.h"
+
+namespace fileindexd {
+
+class Repair {
+ public:
+  // All three outlive it; the reader is open. One thread. Memory is bounded by `lines_kept`.
+  Repair(const Settings& in_force, const Share& of_share, EntryReader& entries,
+         size_t lines_kept = QUEUE_LINE_LIMIT);
+
+  // Differences come in byte order of the paths. False for an entry that lies outside the share,
+  // where no event reaches it.
+  bool Add(const Found& found);
+
+  // At most `most` lines, or one; sorted, see QueueFolding::Lines.
+  std::vector<QueueLine> Lines(size_t most) { return folding.Lines(most); }
+
+ private:
+  void AddLeftOver(const Found& found);
+  void AddLeftOverDirectory(const std::string& path);
+
+  const Settings& settings;
+  const Share& share;
+  QueueFolding folding;
+  std::vector<std::string> emptied;  // left-over directories whose line takes along those below
+};
+
+}  // namespace fileindexd
