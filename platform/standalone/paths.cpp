@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/paths.h"
 
+#include <cerrno>
 #include <ctime>
 
 #include "platform/standalone/environment.h"
+#include "platform/standalone/shortage.h"
 #include "platform/standalone/uncancelled.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
@@ -45,12 +47,28 @@ int64_t Now() {
   return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
 }
 
+// `error`: of a look that failed.
+void NoteShortage(const Settings& settings, const std::string& path, const Look& look, int error) {
+  const std::optional<std::string> normal = NormalPath(path);
+  const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
+  if (share == nullptr) {
+    return;
+  }
+  if (look.verdict == Verdict::UNKNOWN) {
+    NoteFailedLook(share->name, path, error);
+  } else if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY) {
+    NoteDirectory(share->name, path);
+  }
+}
+
 const Glance& GlanceAt(const std::string& path) {
   thread_local Glance kept;
   const int64_t now = Now();
   if (kept.settings == nullptr || kept.path != path || now - kept.time >= GLANCE_NS) {
     kept.settings = CurrentSettings();
+    errno = 0;
     const Look look = LookAt(*kept.settings, path);
+    NoteShortage(*kept.settings, path, look, errno);
     kept.verdict = look.verdict;
     kept.thing = IsNameVerdict(look.verdict) ? ThingAt(*kept.settings, path) : look.thing;
     kept.path = path;

@@ -16,6 +16,7 @@
 #include "platform/log.h"
 #include "platform/standalone/environment.h"
 #include "platform/standalone/process.h"
+#include "platform/standalone/shortage.h"
 #include "platform/standalone/uncancelled.h"
 #include "platform/system.h"
 #include "state/belonging.h"
@@ -240,7 +241,8 @@ int QLIBCErrorGetLine() {
 
 int QLIBCExec(const char* program, const char* arg1, const char* arg2, const char* arg3,
               const char* arg4) {
-  return Uncancelled([&] {
+  useconds_t wait = 0;
+  const int result = Uncancelled([&] {
     const std::string share = arg2 != nullptr ? ShareOfDrainedCopy(arg2) : std::string();
     if (!share.empty() && !MayRemoveDrainedCopy(share)) {
       FI_LOG("Kept, as its changes are not stored: %s", arg2);
@@ -252,8 +254,16 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
     if (!share.empty() && status == 0) {
       EndReindex(share);
     }
+    if (!share.empty()) {
+      wait = EndPass(share);
+    }
     return status;
   });
+
+  if (wait > 0) {
+    usleep(wait);
+  }
+  return result;
 }
 
 }  // namespace fileindexd
