@@ -1,12 +1,14 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/paths.h"
 
+#include <cerrno>
 #include <cstring>
 #include <ctime>
 #include <utility>
 
 #include "platform/standalone/environment.h"
 #include "platform/standalone/glance.h"
+#include "platform/standalone/shortage.h"
 #include "platform/standalone/uncancelled.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
@@ -61,12 +63,28 @@ int64_t Now() {
   return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
 }
 
+// `error`: of a look that failed.
+void NoteShortage(const Settings& settings, const std::string& path, const Look& look, int error) {
+  const std::optional<std::string> normal = NormalPath(path);
+  const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
+  if (share == nullptr) {
+    return;
+  }
+  if (look.verdict == Verdict::UNKNOWN) {
+    NoteFailedLook(share->name, path, error);
+  } else if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY) {
+    NoteDirectory(share->name, path);
+  }
+}
+
 const Glance& GlanceAt(const std::string& path) {
   auto& [kept, folder] = OfThisThread();
   const int64_t now = Now();
   if (kept.settings == nullptr || kept.path != path || now - kept.time >= GLANCE_NS) {
     kept.settings = CurrentSettings();
+    errno = 0;
     kept.look = LookNear(*kept.settings, path, folder);
+    NoteShortage(*kept.settings, path, kept.look, errno);
     kept.thing = IsNameVerdict(kept.look.verdict) ? ThingAt(*kept.settings, path) : kept.look.thing;
     kept.path = path;
     kept.time = now;

@@ -19,6 +19,7 @@
 #include "platform/standalone/environment.h"
 #include "platform/standalone/pass_progress.h"
 #include "platform/standalone/process.h"
+#include "platform/standalone/shortage.h"
 #include "platform/standalone/uncancelled.h"
 #include "platform/system.h"
 #include "state/belonging.h"
@@ -248,7 +249,8 @@ int QLIBCErrorGetLine() {
 
 int QLIBCExec(const char* program, const char* arg1, const char* arg2, const char* arg3,
               const char* arg4) {
-  return Uncancelled([&] {
+  useconds_t wait = 0;
+  const int result = Uncancelled([&] {
     const std::string share = arg2 != nullptr ? ShareOfDrainedCopy(arg2) : std::string();
     if (!share.empty()) {
       ProgressOf(share).End();
@@ -265,8 +267,16 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
     if (!share.empty() && status == 0) {
       EndReindex(share);
     }
+    if (!share.empty()) {
+      wait = EndPass(share);
+    }
     return status;
   });
+
+  if (wait > 0) {
+    usleep(wait);
+  }
+  return result;
 }
 
 }  // namespace fileindexd

@@ -14,8 +14,8 @@ from harness.preload import Page
 
 DAY = 86400
 STEPS = (DAY, 0, -DAY, 0, DAY, -DAY)
-FILES = 1500
-REINDEX = 0x10000
+FILES = 4000
+ADDED_BETWEEN_STEPS = 150
 CREATE = 0x40
 ADDED = re.compile(r"\[alpha\] Document\[.*\] added")
 COMMITTED = "Worker[alpha] fileindex db committed"
@@ -41,6 +41,10 @@ class ClockTest(IndexTest):
         self.make_files(root, "held.txt")
         self.hold_in_pause("alpha", {"event": CREATE, "path": f"{root}/held.txt"})
 
+    def await_resumed(self, after):
+        """Queues are not touched meanwhile: the resume comes when it has been quiet for 10 s."""
+        self.assertIsNotNone(self.log.find(RESUMED, after), "still paused")
+
     def last_commit(self):
         (share,) = self.ctl("status", "--json").json()["shares"]
         return share["last_commit"]
@@ -63,19 +67,17 @@ class PauseClockTest(ClockTest):
 
         self.set_clock(DAY)
 
-        self.await_line(RESUMED, after)
+        self.await_resumed(after)
         self.await_drained("alpha")
         self.assert_index(root)
 
     def test_a_step_back_makes_a_pause_longer(self):
         root = self.make_share()
-        self.make_share("beta")
         self.start_at(0)
-        for share in ("alpha", "beta"):
-            self.await_drained(share)
+        self.await_drained("alpha")
         self.hold_a_line(root)
         after = self.log.mark()
-        # A thread that has ended, for the housekeeping to join. The pause does not let it begin.
+        # A thread that has ended, for the housekeeping to join: so that is seen to have been there.
         self.ctl("resume")
         self.await_line("Worker[alpha] finished all task, stopping", after)
         self.set_clock(-DAY)
@@ -85,7 +87,7 @@ class PauseClockTest(ClockTest):
         self.assertEqual(self.command("pause", resume_time=int(time.time()) - 3600), 0)
 
         self.await_line(PAUSED, after)
-        self.await_line("Worker[alpha] cancelled", after)  # the housekeeping was there
+        self.await_line("Worker[alpha] cancelled", after)
         self.make_files(root, "late.txt")
         self.append("alpha", {"event": CREATE, "path": f"{root}/late.txt"})
         self.await_line("Worker[alpha] respawned", after)
@@ -94,7 +96,7 @@ class PauseClockTest(ClockTest):
 
         self.set_clock(0)
 
-        self.await_line(RESUMED, after)
+        self.await_resumed(after)
         self.await_drained("alpha")
         self.assert_index(root)
 
@@ -102,15 +104,12 @@ class PauseClockTest(ClockTest):
 class WorkClockTest(ClockTest):
     def test_steps_while_walking_and_committing(self):
         root = self.make_share(files=[f"d{n % 30}/f{n}.txt" for n in range(FILES)])
-        self.start_at(0)
-        self.await_drained("alpha")
-        after = self.log.mark()
+        after = at = self.log.mark()
         began = time.time()
 
-        self.append("alpha", {"event": REINDEX, "path": root})
-        at = after
+        self.start_at(0)
         for offset in STEPS:
-            at = self.await_line(ADDED, at, FILES // 10)
+            at = self.await_line(ADDED, at, ADDED_BETWEEN_STEPS)
             self.set_clock(offset)
 
         self.await_drained("alpha")
@@ -173,7 +172,7 @@ class ProcessClockTest(ClockTest):
                 self.assert_index(root)
                 self.stop(pid)
                 self.assertFalse(os.path.exists(PID_FILE))
-                self.assertFalse(os.path.exists(f"/proc/{service}"))
+                self.assertEqual(self.await_exit(service), 0)
 
 
 class SetAsideClockTest(ClockTest):

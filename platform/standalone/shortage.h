@@ -1,0 +1,25 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Passes that ran out of descriptors.
+//
+// What a walk has no descriptor for it passes over without a word. So the shares that this happens
+// to are kept here, by name; at the end of such a pass the whole share is asked for again, a few
+// times, and each time after a longer wait: Workers that walk at the same time take the descriptors
+// from each other, and one has to be alone. Thread-safe.
+#pragma once
+
+#include <string>
+
+namespace fileindexd {
+
+// A look at `path` failed with `error`; only a shortage counts.
+void NoteFailedLook(const std::string& share, const std::string& path, int error);
+
+// A directory was found at `path`, and may be about to be opened: counts as well when hardly any
+// descriptor is left.
+void NoteDirectory(const std::string& share, const std::string& path);
+
+// At the end of a pass. Microseconds to wait before the next one, 0 when the pass was whole, or
+// when it is not tried again: then the share's needs-reindex flag stands until its next event.
+unsigned EndPass(const std::string& share);
+
+}  // namespace fileindexd
