@@ -81,7 +81,10 @@ IndexError EntryWriter::Impl::OpenFirst() {
 
 IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
   if (database.IsOpen()) {
-    return IndexError::NONE;
+    // Looked at before each transaction. A commit opens the folder that the database was opened in,
+    // and would wait for ever in a pipe that stands there now.
+    const bool between_transactions = sqlite3_get_autocommit(database.db) != 0;
+    return between_transactions && database.HasMoved() ? Reopen() : IndexError::NONE;
   }
   if (!at_once && MonotonicMs() < next_open) {
     return open_error;
