@@ -100,7 +100,11 @@ IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
 // nothing, again and again.
 IndexError EntryWriter::Impl::Reopen() {
   CloseAll();
-  if (!store.UpdateStatus(share_name, [](ShareStatus& status) { status.needs_reindex = true; })) {
+  bool stood = false;
+  if (!store.UpdateStatus(share_name, [&stood](ShareStatus& status) {
+        stood = status.needs_reindex;
+        status.needs_reindex = true;
+      })) {
     next_open = MonotonicMs() + OPEN_INTERVAL_MS;
     return IndexError::IO;
   }
@@ -109,6 +113,9 @@ IndexError EntryWriter::Impl::Reopen() {
   if (error == IndexError::NONE) {
     std::string ignored;  // the flag stands, and whoever touches stale queues helps
     (void)AppendToQueue(share_name, {}, ignored);
+  } else if (!stood) {
+    // None was made. If this fails, the share is looked at once more than it needs.
+    (void)store.UpdateStatus(share_name, [](ShareStatus& status) { status.needs_reindex = false; });
   }
   return error;
 }
