@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "index/log_check.h"
 #include "index/schema.h"
 #include "index/set_aside.h"
 #include "state/sqlite.h"
@@ -83,7 +84,13 @@ void KeepLog(sqlite3* db) {
   sqlite3_file_control(db, "main", SQLITE_FCNTL_PERSIST_WAL, &persist);
 }
 
-// NONE when a regular file stands where the database should be.
+// SQLite would wait for ever in a pipe, and fails without end at a folder.
+bool IsFileOrNothing(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
+}
+
+// NONE when a regular file stands where the database should be, and nothing but files beside it.
 IndexError FindFile(const std::string& index_path, const std::string& file) {
   struct stat status {};
   if (lstat(index_path.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
@@ -95,8 +102,11 @@ IndexError FindFile(const std::string& index_path, const std::string& file) {
   }
 
   // An empty file is a valid database to SQLite, without a schema.
-  return S_ISREG(status.st_mode) && status.st_size > 0 ? IndexError::NONE
-                                                       : IndexError::PATH_NOT_FOUND;
+  if (!S_ISREG(status.st_mode) || status.st_size == 0) {
+    return IndexError::PATH_NOT_FOUND;
+  }
+  return IsFileOrNothing(file + "-wal") && IsFileOrNothing(file + "-shm") ? IndexError::NONE
+                                                                          : IndexError::DAMAGED;
 }
 
 // Whether the open database is ours. Cheap: two numbers and the schema's text.
@@ -231,6 +241,10 @@ const char* IndexErrorText(IndexError error) {
 IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create) {
   Close();
   IndexError error = OpenExisting(index_path, PRAGMAS_FOR_WRITING, db);
+  if (error == IndexError::NONE && HasLostCommits(db)) {
+    Close();
+    error = IndexError::DAMAGED;
+  }
   if (error == IndexError::DAMAGED) {
     if (!SetAside(index_path, "found at opening")) {
       return FromErrno();

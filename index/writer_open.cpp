@@ -81,7 +81,10 @@ IndexError EntryWriter::Impl::OpenFirst() {
 
 IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
   if (database.IsOpen()) {
-    return IndexError::NONE;
+    // Looked at before each transaction. A commit opens the folder that the database was opened in,
+    // and would wait for ever in a pipe that stands there now.
+    const bool between_transactions = sqlite3_get_autocommit(database.db) != 0;
+    return between_transactions && database.HasMoved() ? Reopen() : IndexError::NONE;
   }
   if (!at_once && MonotonicMs() < next_open) {
     return open_error;
@@ -97,7 +100,11 @@ IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
 // nothing, again and again.
 IndexError EntryWriter::Impl::Reopen() {
   CloseAll();
-  if (!store.UpdateStatus(share_name, [](ShareStatus& status) { status.needs_reindex = true; })) {
+  bool stood = false;
+  if (!store.UpdateStatus(share_name, [&stood](ShareStatus& status) {
+        stood = status.needs_reindex;
+        status.needs_reindex = true;
+      })) {
     next_open = MonotonicMs() + OPEN_INTERVAL_MS;
     return IndexError::IO;
   }
@@ -106,6 +113,9 @@ IndexError EntryWriter::Impl::Reopen() {
   if (error == IndexError::NONE) {
     std::string ignored;  // the flag stands, and whoever touches stale queues helps
     (void)AppendToQueue(share_name, {}, ignored);
+  } else if (!stood) {
+    // None was made. If this fails, the share is looked at once more than it needs.
+    (void)store.UpdateStatus(share_name, [](ShareStatus& status) { status.needs_reindex = false; });
   }
   return error;
 }

@@ -33,6 +33,8 @@ namespace {
 constexpr int STOP_WAIT_MS = 10000;
 constexpr int KILL_WAIT_MS = 1000;
 constexpr std::chrono::seconds KEPT_COPY_PAUSE(1);
+constexpr int LOCK_WAIT_MS = 2000;
+constexpr int LOCK_NAP_MS = 5;
 
 struct SystemError {
   int code = 0;
@@ -78,7 +80,16 @@ int LockPidFile(const char* pid_file, ScopedFd& locked) {
 
 int CheckAlive(const char* pid_file) {
   ScopedFd locked;
-  const int taken = LockPidFile(pid_file, locked);
+  int taken = LockPidFile(pid_file, locked);
+  // A daemon that was killed can leave the lock, for a moment, to a helper that it was about to
+  // run; and one that starts has not written its pid yet. Until then the lock alone says nothing.
+  for (int waited_ms = 0; taken == 0 && waited_ms < LOCK_WAIT_MS; waited_ms += LOCK_NAP_MS) {
+    if (AliveByPidFile(pid_file, OwnProgram()) > 0) {
+      return 1;
+    }
+    (void)poll(nullptr, 0, LOCK_NAP_MS);
+    taken = LockPidFile(pid_file, locked);
+  }
   if (taken < 0) {
     return FI_FAIL();
   }

@@ -116,26 +116,25 @@ class PowerCut(LoadTest):
         self.start()
         self.settle()
 
-        for number in range(CUTS):
-            with self.subTest(number=number):
-                for _ in range(self.choice.randrange(2)):
-                    self.work_batch()
-                events = self.send_batch()
-                synced = self.choice.randrange(2) == 0
-                if synced:
-                    self.sync_queue()
-                self.await_moment(events)
-                self.change_state()
-                self.take_acknowledged()
-                self.cut()
+        for _ in range(CUTS):
+            for _ in range(self.choice.randrange(2)):
+                self.work_batch()
+            events = self.send_batch()
+            synced = self.choice.randrange(2) == 0
+            if synced:
+                self.sync_queue()
+            self.await_moment(events)
+            self.change_state()
+            self.take_acknowledged()
+            self.cut()
 
-                self.assert_opens()
-                self.sent = self.log.mark()
-                self.start()
-                self.settle()
-                if not synced:  # lines of the queue may be lost: their writer compares
-                    self.touch(REINDEX)
-                self.assert_index(self.root)
+            self.assert_opens()
+            self.sent = self.log.mark()
+            self.start()
+            self.settle()
+            if not synced:  # lines of the queue may be lost: their writer compares
+                self.touch(REINDEX)
+            self.assert_index(self.root)
 
     def test_at_the_first_index_of_all(self):
         for number in range(FIRST_CUTS):

@@ -87,6 +87,8 @@ class Tree:
             steps += [self.remove_folder] * 5
         events = []
         for step in steps:
+            if not self._folders():
+                step = self.add_folder
             for code, path, old in step():
                 event = {"event": code, "path": path}
                 events.append({**event, "path_old": old} if old else event)
