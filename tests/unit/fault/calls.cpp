@@ -28,6 +28,7 @@ std::string& LogText() {
   return text;
 }
 
+thread_local bool inside_exec = false;
 std::mutex failed_mutex;
 std::map<sqlite3_stmt*, int>& FailedSteps() {
   static std::map<sqlite3_stmt*, int>& steps = *new std::map<sqlite3_stmt*, int>;
@@ -101,13 +102,34 @@ extern "C" {
 
 int sqlite3_step(sqlite3_stmt* statement) {
   static auto* const hidden = fileindexd::fault::Hidden<int(sqlite3_stmt*)>("sqlite3_step");
-  const int code = fileindexd::fault::Strike(
-      Call::STATEMENT, fileindexd::fault::TargetOfStatement(sqlite3_db_handle(statement)));
+  const int code = fileindexd::fault::inside_exec
+                       ? 0
+                       : fileindexd::fault::Strike(
+                             Call::STATEMENT,
+                             fileindexd::fault::TargetOfStatement(sqlite3_db_handle(statement)));
   if (code == 0) {
     return hidden(statement);
   }
   const std::lock_guard guard(fileindexd::fault::failed_mutex);
   fileindexd::fault::FailedSteps()[statement] = code;
+  return code;
+}
+
+// Fails as a whole: it does not ask its statements for their failures in a way that is seen here.
+int sqlite3_exec(sqlite3* db, const char* sql, int (*row)(void*, int, char**, char**),
+                 void* argument, char** message) {
+  static auto* const hidden = fileindexd::fault::Hidden<int(
+      sqlite3*, const char*, int (*)(void*, int, char**, char**), void*, char**)>("sqlite3_exec");
+  const bool nested = fileindexd::fault::inside_exec;
+  const int failed =
+      nested ? 0
+             : fileindexd::fault::Strike(Call::STATEMENT, fileindexd::fault::TargetOfStatement(db));
+  if (failed != 0) {
+    return failed;
+  }
+  fileindexd::fault::inside_exec = true;
+  const int code = hidden(db, sql, row, argument, message);
+  fileindexd::fault::inside_exec = nested;
   return code;
 }
 
