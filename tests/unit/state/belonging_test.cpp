@@ -22,7 +22,19 @@ namespace {
 
 class BelongingTest : public MountTest {
  protected:
-  Verdict At(const std::string& below) { return LookAt(settings, root + below).verdict; }
+  // The look with its folder seen anew, and the one after it, have to say the same.
+  Verdict At(const std::string& below) {
+    const Look look = LookAt(settings, root + below);
+    FolderView view;
+    for (int again = 0; again < 2; ++again) {
+      const Look near = LookNear(settings, root + below, view);
+      EXPECT_EQ(near.verdict, look.verdict) << below;
+      EXPECT_EQ(near.thing, look.thing) << below;
+      EXPECT_EQ(near.inode, look.inode) << below;
+      EXPECT_EQ(near.mount_root, look.mount_root) << below;
+    }
+    return look.verdict;
+  }
 };
 
 TEST(NameRuleTest, PreservedAndPassingNames) {
