@@ -3,7 +3,7 @@
 
 namespace fileindexd {
 
-static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 1,
+static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 2,
               "numbers in the text below");
 
 const char* const ENTRIES_SCHEMA = R"sql(
@@ -21,7 +21,8 @@ CREATE TABLE entries(
   first_seen INTEGER NOT NULL,
   owner INTEGER NOT NULL,
   grp INTEGER NOT NULL,
-  mode INTEGER NOT NULL);
+  mode INTEGER NOT NULL,
+  written INTEGER NOT NULL);
 CREATE INDEX entries_by_inode ON entries(inode);
 CREATE INDEX entries_wanted ON entries(id) WHERE content_wanted <> 0;
 CREATE VIRTUAL TABLE names USING fts5(
@@ -34,7 +35,7 @@ CREATE TABLE meta(
   last_commit INTEGER NOT NULL);
 INSERT INTO meta VALUES(1, 0, 0);
 PRAGMA application_id = 1179209285;
-PRAGMA user_version = 1;
+PRAGMA user_version = 2;
 )sql";
 
 }  // namespace fileindexd
