@@ -197,6 +197,11 @@ void AddQuestions(Declarer& declare) {
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")
       ->excludes(search_json);
 
+  CLI::App* info = declare.Add(&declare.app, "info", Info,
+                               "Tell what the index holds of a path, and why or why not");
+  AddText(info, "PATH", into.path, "Any path");
+  AddJson(info, into, "One JSON document");
+
   CLI::App* dump = declare.Add(&declare.app, "dump", Dump, "List every entry of a share's index");
   AddText(dump, "SHARE", into.share, "The share");
   CLI::Option* dump_json = AddJson(dump, into, "One JSON object a line");

@@ -63,5 +63,6 @@ int Status(const Arguments& arguments);
 int Search(const Arguments& arguments);
 int Dump(const Arguments& arguments);
 int Verify(const Arguments& arguments);
+int Info(const Arguments& arguments);
 
 }  // namespace fileindexd

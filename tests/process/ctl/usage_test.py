@@ -40,6 +40,8 @@ WRONG = [
     ("worker", "revive", "a", "b"),
     ("status", "x"),
     ("status", "--nope"),
+    ("info",),
+    ("info", "a", "b"),
     ("dump", "a", "b"),
     ("verify", "a", "b"),
 ]
@@ -53,6 +55,7 @@ COMMANDS = [
     ("worker", "drop"),
     ("status",),
     ("search",),
+    ("info",),
     ("dump",),
     ("verify",),
 ]
