@@ -64,6 +64,23 @@ CLI::Option* AddOnOff(CLI::App* command, const char* name, std::optional<bool>& 
       ->type_name("on|off");
 }
 
+// Each occurrence takes one value, as it is: the library would otherwise split "[a,b]", and take
+// "{}" for nothing.
+CLI::Option* AddExclude(CLI::App* command, Arguments& arguments) {
+  return command
+      ->add_option(
+          "--exclude",
+          [&arguments](const CLI::results_t& given) {
+            arguments.excludes = given;
+            return true;
+          },
+          "Keep out what matches, as in gitignore; may be repeated")
+      ->type_size(1)
+      ->expected(1, CLI::detail::expected_max_vector_size)
+      ->allow_extra_args(false)
+      ->type_name("PATTERN");
+}
+
 CLI::Option* AddJson(CLI::App* command, Arguments& arguments, const char* help) {
   return command->add_flag("--json", arguments.json, help);
 }
@@ -105,13 +122,17 @@ void AddFolders(Declarer& declare) {
       ->excludes(audio)
       ->excludes(video)
       ->excludes(photo);
+  AddExclude(add, into);
 
-  CLI::App* set = declare.Add(group, "set", FolderSet, "Change which contents are indexed");
+  CLI::App* set = declare.Add(group, "set", FolderSet, "Change what of a folder is indexed");
   AddText(set, "PATH", into.path, "An indexed folder");
   AddOnOff(set, "--document", into.document, "Contents of documents");
   AddOnOff(set, "--audio", into.audio, "Contents of audio files");
   AddOnOff(set, "--video", into.video, "Contents of video files");
   AddOnOff(set, "--photo", into.photo, "Contents of pictures");
+  CLI::Option* exclude = AddExclude(set, into);
+  exclude->description("Keep out what matches, in place of all patterns so far; may be repeated");
+  set->add_flag("--no-excludes", into.no_excludes, "No patterns any more")->excludes(exclude);
 
   CLI::App* remove = declare.Add(group, "remove", FolderRemove, "Index a folder no longer");
   AddText(remove, "PATH", into.path, "An indexed folder");
@@ -181,6 +202,11 @@ void AddQuestions(Declarer& declare) {
   CLI::Option* search_json = AddJson(search, into, "One JSON object a line");
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")
       ->excludes(search_json);
+
+  CLI::App* info = declare.Add(&declare.app, "info", Info,
+                               "Tell what the index holds of a path, and why or why not");
+  AddText(info, "PATH", into.path, "Any path");
+  AddJson(info, into, "One JSON document");
 
   CLI::App* dump = declare.Add(&declare.app, "dump", Dump, "List every entry of a share's index");
   AddText(dump, "SHARE", into.share, "The share");

@@ -7,6 +7,7 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace fileindexd {
 
@@ -30,6 +31,8 @@ struct Arguments {
   std::optional<bool> audio;
   std::optional<bool> video;
   std::optional<bool> photo;
+  std::vector<std::string> excludes;
+  bool no_excludes = false;
   bool all = false;
   bool json = false;
   bool count = false;
@@ -63,5 +66,6 @@ int Status(const Arguments& arguments);
 int Search(const Arguments& arguments);
 int Dump(const Arguments& arguments);
 int Verify(const Arguments& arguments);
+int Info(const Arguments& arguments);
 
 }  // namespace fileindexd

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// folder add, set, remove, list.
+// folder add, set, remove.
 //
 // A setting is stored first, then the daemon is told, then the event is queued that brings the
 // index in line: the Worker that executes it has to know the new settings. Only a share's first
@@ -12,6 +12,7 @@
 
 #include "ctl/client.h"
 #include "ctl/commands.h"
+#include "ctl/content_kinds.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "state/belonging.h"
@@ -22,27 +23,6 @@
 namespace fileindexd {
 
 namespace {
-
-struct ContentKind {
-  const char* name;
-  bool ContentFlags::*flag;
-  std::optional<bool> Arguments::*argument;
-};
-
-constexpr ContentKind CONTENT_KINDS[] = {
-    {"document", &ContentFlags::document, &Arguments::document},
-    {"audio", &ContentFlags::audio, &Arguments::audio},
-    {"video", &ContentFlags::video, &Arguments::video},
-    {"photo", &ContentFlags::photo, &Arguments::photo},
-};
-
-Json::Value FlagsObject(const ContentFlags& flags) {
-  Json::Value object(Json::objectValue);
-  for (const ContentKind& kind : CONTENT_KINDS) {
-    object[kind.name] = flags.*kind.flag;
-  }
-  return object;
-}
 
 Reply TellDaemon(const char* type, const std::string& path) {
   Json::Value data(Json::objectValue);
@@ -109,6 +89,19 @@ bool CanBeIndexed(const Settings& settings, const IndexedFolder& added) {
   return true;
 }
 
+// False, with its line written, when one of them is no pattern.
+bool CheckExcludes(const std::vector<std::string>& patterns) {
+  Excludes checked;
+  std::string error;
+  for (const std::string& pattern : patterns) {
+    if (!checked.Add(pattern, error)) {
+      (void)Fail(EXIT_USAGE, "%s", error.c_str());
+      return false;
+    }
+  }
+  return true;
+}
+
 // The indexed folder that an argument names; null, with its line written, when there is none. It
 // may be gone from the disk.
 const IndexedFolder* FindFolder(const Settings& settings, const std::string& given) {
@@ -126,6 +119,15 @@ const IndexedFolder* FindFolder(const Settings& settings, const std::string& giv
     (void)Fail(EXIT_FAILED, "%s: not an indexed folder", path.c_str());
   }
   return folder;
+}
+
+// Whether the folder's own path leaves the index with it because another folder's pattern keeps it
+// out: an update passes over the path that it begins with.
+bool IsKeptOutWithout(const Settings& settings, const IndexedFolder& folder) {
+  Settings changed = settings;
+  std::erase_if(changed.folders,
+                [&folder](const IndexedFolder& other) { return other.path == folder.path; });
+  return FindExclusion(changed, folder.path, Leaf::DIRECTORY).pattern != nullptr;
 }
 
 // The daemon's hands are off the share: what was known of its files goes.
@@ -163,6 +165,9 @@ int RemoveLastFolder(Session& session, const IndexedFolder& folder) {
 }  // namespace
 
 int FolderAdd(const Arguments& arguments) {
+  if (!CheckExcludes(arguments.excludes)) {
+    return EXIT_USAGE;
+  }
   Session session;
   IndexedFolder folder;
   if (!session.Open() || !ResolveDirectory(arguments.path, folder.path)) {
@@ -188,7 +193,7 @@ int FolderAdd(const Arguments& arguments) {
   if (first && !SweepLeftIndex(session, folder.share)) {
     return EXIT_FAILED;
   }
-  if (!session.store->AddFolder(folder.path, folder.wanted)) {
+  if (!session.store->AddFolder(folder.path, folder.wanted, arguments.excludes)) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
 
@@ -202,13 +207,15 @@ int FolderAdd(const Arguments& arguments) {
 }
 
 int FolderSet(const Arguments& arguments) {
-  ContentFlags changed;
-  bool given = false;
+  bool given = arguments.no_excludes || !arguments.excludes.empty();
   for (const ContentKind& kind : CONTENT_KINDS) {
     given = given || (arguments.*kind.argument).has_value();
   }
   if (!given) {
     return Fail(EXIT_USAGE, "folder set: nothing to set at %s", arguments.path.c_str());
+  }
+  if (!CheckExcludes(arguments.excludes)) {
+    return EXIT_USAGE;
   }
 
   Session session;
@@ -220,21 +227,27 @@ int FolderSet(const Arguments& arguments) {
     return EXIT_FAILED;
   }
 
+  ContentFlags changed;
   ContentFlags wanted = folder->wanted;
   for (const ContentKind& kind : CONTENT_KINDS) {
     wanted.*kind.flag = (arguments.*kind.argument).value_or(wanted.*kind.flag);
     changed.*kind.flag = wanted.*kind.flag != folder->wanted.*kind.flag;
   }
-  if (!changed.Any()) {
+  const bool keeps = !arguments.no_excludes && arguments.excludes.empty();
+  const std::vector<std::string>& excludes = keeps ? folder->excludes.patterns : arguments.excludes;
+  const bool other_excludes = excludes != folder->excludes.patterns;
+  if (!changed.Any() && !other_excludes) {
     return EXIT_DONE;
   }
-  if (!session.store->SetFolder(folder->path, wanted)) {
+  if (!session.store->SetFolder(folder->path, wanted, excludes)) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
 
   const int told = CodeOfReply(TellDaemon("upsert_folder_setting", folder->path), folder->path);
-  const std::string line =
-      EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt, ToText(FlagsObject(changed)));
+  // A reindex sets everything anew, the flags too.
+  const std::string line = other_excludes ? EventLine(CUSTOM_EVENT_REINDEX, folder->path)
+                                          : EventLine(CUSTOM_EVENT_UPDATE, folder->path,
+                                                      std::nullopt, ToText(FlagsObject(changed)));
   const int queued = Queue(session, folder->share, line);
   return told != EXIT_DONE ? told : queued;
 }
@@ -258,42 +271,11 @@ int FolderRemove(const Arguments& arguments) {
   const int told = CodeOfReply(TellDaemon("delete_folder_setting", folder->path), folder->path);
   const ContentFlags every = {.document = true, .audio = true, .video = true, .photo = true};
   const std::string line =
-      EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt, ToText(FlagsObject(every)));
+      IsKeptOutWithout(*session.settings, *folder)
+          ? EventLine(CUSTOM_EVENT_REINDEX, folder->path)
+          : EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt, ToText(FlagsObject(every)));
   const int queued = Queue(session, folder->share, line);
   return told != EXIT_DONE ? told : queued;
-}
-
-int FolderList(const Arguments& arguments) {
-  Session session;
-  if (!session.Open()) {
-    return EXIT_FAILED;
-  }
-
-  Json::Value list(Json::arrayValue);
-  for (const IndexedFolder& folder : session.settings->folders) {
-    const bool gone = IsDirectoryGone(folder.path);
-    if (arguments.json) {
-      Json::Value item = FlagsObject(folder.wanted);
-      item["share"] = ToUtf8(folder.share);
-      item["gone"] = gone;
-      SetPath(item, folder.path);
-      list.append(item);
-      continue;
-    }
-
-    std::string wanted;
-    for (const ContentKind& kind : CONTENT_KINDS) {
-      if (folder.wanted.*kind.flag) {
-        wanted += (wanted.empty() ? "" : ",") + std::string(kind.name);
-      }
-    }
-    (void)PutLine(folder.share + "\t" + folder.path + "\t" + (wanted.empty() ? "names" : wanted) +
-                  (gone ? "\tgone" : ""));
-  }
-  if (arguments.json) {
-    (void)PutJson(list);
-  }
-  return EXIT_DONE;
 }
 
 }  // namespace fileindexd

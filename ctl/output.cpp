@@ -5,6 +5,7 @@
 #include <json/writer.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <cstdarg>
@@ -31,6 +32,18 @@ void EraseProgress() {
     (void)fprintf(stderr, "\r\033[K");  // to the line's start, and erase it
     progress_shown = false;
   }
+}
+
+std::string Hex(std::string_view bytes) {
+  constexpr char DIGITS[] = "0123456789abcdef";
+  std::string hex;
+  hex.reserve(bytes.size() * 2);
+  for (const char byte : bytes) {
+    const auto value = static_cast<unsigned char>(byte);
+    hex += DIGITS[value >> 4];
+    hex += DIGITS[value & 0xf];
+  }
+  return hex;
 }
 
 void Remember() {
@@ -110,19 +123,22 @@ int FinishOutput(int code) {
 
 void SetPath(Json::Value& object, const std::string& path, const std::string& key) {
   object[key] = ToUtf8(path);
-  if (IsUtf8(path)) {
-    return;
+  if (!IsUtf8(path)) {
+    object[key + "_hex"] = Hex(path);
   }
+}
 
-  constexpr char DIGITS[] = "0123456789abcdef";
-  std::string hex;
-  hex.reserve(path.size() * 2);
-  for (const char byte : path) {
-    const auto value = static_cast<unsigned char>(byte);
-    hex += DIGITS[value >> 4];
-    hex += DIGITS[value & 0xf];
+void SetTexts(Json::Value& object, const std::vector<std::string>& texts, const std::string& key) {
+  Json::Value shown(Json::arrayValue);
+  Json::Value hex(Json::arrayValue);
+  for (const std::string& text : texts) {
+    shown.append(ToUtf8(text));
+    hex.append(Hex(text));
   }
-  object[key + "_hex"] = hex;
+  object[key] = shown;
+  if (!std::all_of(texts.begin(), texts.end(), IsUtf8)) {
+    object[key + "_hex"] = hex;
+  }
 }
 
 std::string ToText(const Json::Value& value) {

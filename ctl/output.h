@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace fileindexd {
 
@@ -35,6 +36,9 @@ int FinishOutput(int code);
 // Sets `key` to the path; when it is not UTF-8, its bad bytes are replaced and `key`_hex holds all
 // bytes in lower-case hexadecimal digits.
 void SetPath(Json::Value& object, const std::string& path, const std::string& key = "path");
+
+// The same for a list: `key`_hex holds all texts in digits when any of them is not UTF-8.
+void SetTexts(Json::Value& object, const std::vector<std::string>& texts, const std::string& key);
 
 // Compact JSON text. Bytes that are not UTF-8 stay as they are.
 std::string ToText(const Json::Value& value);

@@ -26,6 +26,7 @@ struct Entry {
   uint32_t owner = 0;
   uint32_t group = 0;
   uint32_t mode = 0;
+  int64_t written = 0;  // when the row was last written; set by the table
 };
 
 }  // namespace fileindexd

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/entry_table.h"
 
+#include <ctime>
 #include <utility>
 
 #include "index/schema.h"
@@ -14,13 +15,19 @@ namespace {
 // enough not to be felt, enough to keep up with deletions.
 constexpr int64_t FREE_PAGES_KEPT = 64;
 
+int64_t Now() {
+  timespec now{};
+  clock_gettime(CLOCK_REALTIME, &now);
+  return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
+}
+
 void BindAttributes(Statement& statement, int column, const Entry& entry) {
   for (const int64_t value :
        {static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
         static_cast<int64_t>(entry.content_wanted), static_cast<int64_t>(entry.inode), entry.size,
         entry.mtime, entry.ctime, entry.birth_time, entry.first_seen,
         static_cast<int64_t>(entry.owner), static_cast<int64_t>(entry.group),
-        static_cast<int64_t>(entry.mode)}) {
+        static_cast<int64_t>(entry.mode), Now()}) {
     statement.BindInt(column++, value);
   }
 }
@@ -54,6 +61,7 @@ void ReadEntry(const Statement& statement, Entry& entry) {
   entry.owner = static_cast<uint32_t>(statement.Int(11));
   entry.group = static_cast<uint32_t>(statement.Int(12));
   entry.mode = static_cast<uint32_t>(statement.Int(13));
+  entry.written = statement.Int(14);
 }
 
 int EntryTable::Prepare(sqlite3* db) {
@@ -79,12 +87,12 @@ int EntryTable::Prepare(sqlite3* db) {
        "AND (birth_time = ?3 OR birth_time = 0 OR ?3 = 0) AND (?4 = 0 OR ctime <> ?5)"},
       {&insert,
        "INSERT INTO entries(path, thing, kind, content_wanted, inode, size, mtime, ctime, "
-       "birth_time, first_seen, owner, grp, mode) VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, "
-       "?11, ?12, ?13)"},
+       "birth_time, first_seen, owner, grp, mode, written) VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, "
+       "?9, ?10, ?11, ?12, ?13, ?14)"},
       {&update,
        "UPDATE entries SET thing = ?2, kind = ?3, content_wanted = ?4, inode = ?5, size = ?6, "
        "mtime = ?7, ctime = ?8, birth_time = ?9, first_seen = ?10, owner = ?11, grp = ?12, "
-       "mode = ?13 WHERE id = ?1"},
+       "mode = ?13, written = ?14 WHERE id = ?1"},
       {&remove, "DELETE FROM entries WHERE id = ?1"},
       {&insert_name, "INSERT INTO names(rowid, name) VALUES(?1, ?2)"},
       {&insert_part, "INSERT INTO parts(rowid, name) VALUES(?1, ?2)"},

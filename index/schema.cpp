@@ -21,7 +21,8 @@ CREATE TABLE entries(
   first_seen INTEGER NOT NULL,
   owner INTEGER NOT NULL,
   grp INTEGER NOT NULL,
-  mode INTEGER NOT NULL);
+  mode INTEGER NOT NULL,
+  written INTEGER NOT NULL);
 CREATE INDEX entries_by_inode ON entries(inode);
 CREATE INDEX entries_wanted ON entries(id) WHERE content_wanted <> 0;
 CREATE VIRTUAL TABLE names USING fts5(

@@ -16,6 +16,7 @@
 //     mtime ctime birth_time first_seen   nanoseconds since the epoch; mtime 0 for a directory,
 //                     birth_time 0 where the file system keeps none
 //     owner grp mode  as the system counts them
+//     written         nanoseconds since the epoch: when this row was last written
 //   names        words of the last path component, made valid UTF-8; no stored copy, so deleting
 //                needs the text that was inserted
 //   parts        the same text by trigrams, for substrings
@@ -41,6 +42,6 @@ extern const char* const ENTRIES_SCHEMA;
 #define FILEINDEX_ENTRY_COLUMNS                                                     \
   "entries.id, entries.path, entries.thing, entries.kind, entries.content_wanted, " \
   "entries.inode, entries.size, entries.mtime, entries.ctime, entries.birth_time, " \
-  "entries.first_seen, entries.owner, entries.grp, entries.mode"
+  "entries.first_seen, entries.owner, entries.grp, entries.mode, entries.written"
 
 }  // namespace fileindexd

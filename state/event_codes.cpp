@@ -48,4 +48,21 @@ std::optional<uint32_t> EventCode(std::string_view text) {
   return code;
 }
 
+std::string EventNames(uint32_t code) {
+  std::string names;
+  uint32_t rest = code;
+  for (const NamedCode& named : NAMED_CODES) {
+    if ((code & named.code) != 0) {
+      names += (names.empty() ? "" : "|") + std::string(named.name);
+      rest &= ~named.code;
+    }
+  }
+  if (rest != 0 || names.empty()) {
+    char digits[8];
+    const auto end = std::to_chars(digits, digits + sizeof digits, rest, 16);
+    names += (names.empty() ? "0x" : "|0x") + std::string(digits, end.ptr);
+  }
+  return names;
+}
+
 }  // namespace fileindexd

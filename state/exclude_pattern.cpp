@@ -66,6 +66,9 @@ class Reader {
       const bool escaped = text[at] == '\\' && at + 1 < text.size() && text[at + 1] == '/';
       if (text[at] == '/' || escaped) {
         End(std::move(part), text.substr(begin, at - begin), name_alone, parts);
+        if (escaped && parts.back().any_depth) {
+          parts.push_back(AnyName());  // as git has it: not none
+        }
         part = {};
         at += escaped ? 2 : 1;
         begin = at;

@@ -42,6 +42,8 @@ WRONG = [
     ("worker", "revive", "a", "b"),
     ("status", "x"),
     ("status", "--nope"),
+    ("info",),
+    ("info", "a", "b"),
     ("dump", "a", "b"),
     ("verify", "a", "b"),
 ]
@@ -55,6 +57,7 @@ COMMANDS = [
     ("worker", "drop"),
     ("status",),
     ("search",),
+    ("info",),
     ("dump",),
     ("verify",),
 ]

@@ -76,6 +76,49 @@ TEST(NameRuleTest, OtherNamesAreOrdinary) {
   }
 }
 
+TEST(JudgeNameTest, PatternsOfTheDeepestFolderKeepOut) {
+  Settings settings;
+  settings.shares = {{"s", "/v/s", ""}};
+  settings.folders = {{"s", "/v/s", {}}, {"s", "/v/s/build/inner", {}}};
+  std::string error;
+  ASSERT_TRUE(settings.folders[0].excludes.Add("build/", error));
+  ASSERT_TRUE(settings.folders[0].excludes.Add("*.o", error));
+  ASSERT_TRUE(settings.folders[1].excludes.Add("/x", error));
+  for (const auto& [path, verdict] : std::vector<std::pair<std::string, Verdict>>{
+           {"/v/s", Verdict::BELONGS},
+           {"/v/s/a", Verdict::BELONGS},
+           {"/v/s/a.o", Verdict::EXCLUDED},
+           {"/v/s//d/a.o/", Verdict::EXCLUDED},
+           {"/v/s/build", Verdict::BELONGS},  // may be a file
+           {"/v/s/build/a", Verdict::EXCLUDED},
+           {"/v/s/build/.nfs1", Verdict::SKIPPED_NAME},
+           {"/v/s/build/inner", Verdict::BELONGS},
+           {"/v/s/build/inner/a.o", Verdict::BELONGS},
+           {"/v/s/build/inner/x/y", Verdict::EXCLUDED},
+           {"/v/s/build/inner2", Verdict::EXCLUDED},
+       }) {
+    EXPECT_EQ(JudgeName(settings, path), verdict) << path;
+  }
+  EXPECT_TRUE(settings.HasFolderBelow("/v/s/build"));
+  EXPECT_TRUE(settings.HasFolderBelow("/"));
+  EXPECT_FALSE(settings.HasFolderBelow("/v/s/build/inner"));
+  EXPECT_FALSE(settings.HasFolderBelow("/v/s/buil"));
+}
+
+TEST_F(BelongingTest, APatternForDirectoriesAsksTheDisk) {
+  MakeFolder(root + "/build");
+  MakeFile(root + "/d/build");
+  std::string error;
+  ASSERT_TRUE(settings.folders[0].excludes.Add("build/", error));
+
+  EXPECT_EQ(At("/build"), Verdict::EXCLUDED);
+  EXPECT_EQ(At("/build/none"), Verdict::EXCLUDED);
+  EXPECT_EQ(At("/d/build"), Verdict::BELONGS);
+  EXPECT_EQ(LookPastExcludes(settings, root + "/build").verdict, Verdict::BELONGS);
+  EXPECT_EQ(LookPastExcludes(settings, root + "/build").thing, Thing::DIRECTORY);
+  EXPECT_EQ(LookPastExcludes(settings, root + "/none").verdict, Verdict::GONE);
+}
+
 TEST(JudgeNameTest, EveryVerdictThatLettersCanGive) {
   Settings settings;
   settings.shares = {{"lost+found", "/v/lost+found", ""}, {"s", "/v/s", ""}};

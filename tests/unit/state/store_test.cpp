@@ -91,6 +91,43 @@ TEST_F(StoreTest, FoldersAreAddedOnceAndOnlyInAShare) {
   EXPECT_TRUE(Get(*store)->folders.empty());
 }
 
+TEST_F(StoreTest, ExcludesAreKeptWithTheirFolderInOrder) {
+  const std::vector<std::string> patterns = {"*.o", "!keep.o", "\xff\t[a]"};
+  ASSERT_TRUE(store->AddShare({"a", "/v/a", ""}));
+  ASSERT_TRUE(store->AddFolder("/v/a", {}, {"one"}));
+  ASSERT_TRUE(store->AddFolder("/v/a/x", {}));
+  ASSERT_TRUE(store->SetFolder("/v/a", {}, patterns)) << store->Error();
+  ASSERT_TRUE(store->SetFolder("/v/a", {.audio = true}));
+
+  const auto settings = Get(*OpenStore());
+  EXPECT_EQ(settings->FolderAt("/v/a")->excludes.patterns, patterns);
+  EXPECT_TRUE(settings->FolderAt("/v/a")->wanted.audio);
+  EXPECT_TRUE(settings->FolderAt("/v/a/x")->excludes.patterns.empty());
+
+  ASSERT_TRUE(store->RemoveFolder("/v/a"));
+  ASSERT_TRUE(store->AddFolder("/v/a", {}));
+  EXPECT_TRUE(Get(*store)->FolderAt("/v/a")->excludes.patterns.empty());
+  ASSERT_TRUE(store->SetFolder("/v/a", {}, patterns));
+  ASSERT_TRUE(store->RemoveShare("a") && store->AddShare({"a", "/v/a", ""}));
+  ASSERT_TRUE(store->AddFolder("/v/a", {}));
+  EXPECT_TRUE(Get(*store)->FolderAt("/v/a")->excludes.patterns.empty());
+}
+
+TEST_F(StoreTest, WhatIsNoPatternIsRefusedAndChangesNothing) {
+  ASSERT_TRUE(store->AddShare({"a", "/v/a", ""}));
+  ASSERT_TRUE(store->AddFolder("/v/a", {}, {"good"}));
+
+  EXPECT_FALSE(store->SetFolder("/v/a", {.audio = true}, {"better", "a[b"}));
+  EXPECT_NE(store->Error().find("a[b"), std::string::npos) << store->Error();
+  EXPECT_FALSE(store->AddFolder("/v/a/x", {}, {""}));
+  EXPECT_FALSE(store->SetFolder("/v/a/x", {}, {"x"}));
+
+  const auto settings = Get(*store);
+  ASSERT_EQ(settings->folders.size(), 1U);
+  EXPECT_EQ(settings->folders[0].excludes.patterns, std::vector<std::string>{"good"});
+  EXPECT_FALSE(settings->folders[0].wanted.audio);
+}
+
 TEST_F(StoreTest, AShareGoesWithAllThatIsKnownOfIt) {
   ASSERT_TRUE(store->AddShare({"a", "/v/a", ""}));
   ASSERT_TRUE(store->AddFolder("/v/a", {}));

@@ -1,0 +1,133 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "ctl/pending.h"
+
+#include <fcntl.h>
+#include <json/reader.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <exception>
+#include <memory>
+#include <string_view>
+
+#include "base/scoped_fd.h"
+#include "state/event_codes.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t BUFFER = 65536;
+
+enum class Relation { NONE, HERE, ABOVE, BELOW };
+
+Relation RelationOf(const std::string& written, const std::string& path) {
+  const auto normal = NormalPath(written);
+  if (!normal.has_value()) {
+    return Relation::NONE;
+  }
+  if (*normal == path) {
+    return Relation::HERE;
+  }
+  if (Covers(*normal, path)) {
+    return Relation::ABOVE;
+  }
+  return Covers(path, *normal) ? Relation::BELOW : Relation::NONE;
+}
+
+class LineReader {
+ public:
+  LineReader(const std::string& of_path, Pending& found) : path(of_path), pending(found) {
+    Json::CharReaderBuilder builder;
+    builder["collectComments"] = false;
+    reader.reset(builder.newCharReader());
+  }
+
+  void Read(std::string_view line, bool begun) {
+    try {
+      Json::Value value;
+      if (!reader->parse(line.data(), line.data() + line.size(), &value, nullptr) ||
+          !value.isObject() || !value["event"].isUInt() || !value["path"].isString()) {
+        return;
+      }
+      const Json::Value old = value.get("path_old", "");
+      Add({.event = EventNames(value["event"].asUInt()),
+           .path = value["path"].asString(),
+           .path_old = old.isString() ? old.asString() : "",
+           .above = false,
+           .begun = begun});
+    } catch (const std::exception&) {  // nesting beyond the reader's limit: no event of ours
+    }
+  }
+
+ private:
+  void Add(PendingEvent&& event) {
+    const Relation now = RelationOf(event.path, path);
+    const Relation old = RelationOf(event.path_old, path);
+    if (now == Relation::HERE || old == Relation::HERE) {
+      pending.events.push_back(std::move(event));
+    } else if (now == Relation::ABOVE || old == Relation::ABOVE) {
+      event.above = true;
+      pending.events.push_back(std::move(event));
+    } else if (now == Relation::BELOW || old == Relation::BELOW) {
+      ++pending.below;
+    }
+  }
+
+  const std::string& path;
+  Pending& pending;
+  std::unique_ptr<Json::CharReader> reader;
+};
+
+void ReadLines(const ScopedFd& file, bool begun, LineReader& reader) {
+  std::string text;
+  std::string buffer(BUFFER, '\0');
+  for (;;) {
+    const ssize_t length = read(file.fd, buffer.data(), buffer.size());
+    if (length < 0 && errno == EINTR) {
+      continue;
+    }
+    if (length <= 0) {
+      return;  // what stands behind the last line end is being written
+    }
+    text.append(buffer, 0, static_cast<size_t>(length));
+    size_t begin = 0;
+    for (size_t end = text.find('\n'); end != std::string::npos; end = text.find('\n', begin)) {
+      reader.Read(std::string_view(text).substr(begin, end - begin), begun);
+      begin = end + 1;
+    }
+    text.erase(0, begin);
+  }
+}
+
+}  // namespace
+
+Pending ReadPending(const std::string& share_name, const std::string& path) {
+  constexpr int FLAGS = O_RDONLY | O_CLOEXEC | O_NONBLOCK;
+  // The queue is opened first: when it is moved aside between the two, it is met twice, and the
+  // inode tells.
+  const ScopedFd queue(open(QueuePath(share_name).c_str(), FLAGS));
+  const ScopedFd drained(open(DrainedPath(share_name).c_str(), FLAGS));
+  struct stat queue_stat {};
+  struct stat drained_stat {};
+  const bool has_queue =
+      queue.fd >= 0 && fstat(queue.fd, &queue_stat) == 0 && S_ISREG(queue_stat.st_mode);
+  const bool has_drained =
+      drained.fd >= 0 && fstat(drained.fd, &drained_stat) == 0 && S_ISREG(drained_stat.st_mode);
+  const bool same = has_queue && has_drained && queue_stat.st_dev == drained_stat.st_dev &&
+                    queue_stat.st_ino == drained_stat.st_ino;
+
+  Pending pending;
+  LineReader reader(path, pending);
+  if (has_drained) {
+    ReadLines(drained, true, reader);
+  }
+  if (has_queue && !same) {
+    ReadLines(queue, false, reader);
+  }
+  return pending;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,28 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What waits in a share's queue for a path.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace fileindexd {
+
+struct PendingEvent {
+  std::string event;  // names joined by "|", see EventNames
+  std::string path;   // as the line has it
+  std::string path_old;
+  bool above = false;  // the event is of a folder that holds the path
+  bool begun = false;  // in the drained copy: a Worker has taken it
+};
+
+struct Pending {
+  std::vector<PendingEvent> events;  // of the path itself and of folders above it, oldest first
+  uint64_t below = 0;                // events of what lies below the path, counted
+};
+
+// Reads the queue and its drained copy without a lock: a line that is being written is passed over,
+// and one that is taken meanwhile may be missed. `path` is normal.
+Pending ReadPending(const std::string& share_name, const std::string& path);
+
+}  // namespace fileindexd
