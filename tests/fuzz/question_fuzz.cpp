@@ -19,9 +19,9 @@ namespace {
 // A question as a whole opens the index anew: a hundred times the cost of its parts.
 constexpr unsigned EVERY = 64;
 
-Entry EntryAt(const std::string& name) {
+Entry EntryAt(const std::string& folder, const std::string& name) {
   Entry entry;
-  entry.path = "/s/" + name;
+  entry.path = folder + "/" + name;
   entry.thing = Thing::FILE;
   return entry;
 }
@@ -37,7 +37,7 @@ class Index {
     Require(table.Begin() == SQLITE_OK, "a transaction");
     for (const char* name :
          {"holiday beach.jpg", "C++ notes.txt", "a \"b\" AND (c) *.md", "--", "x"}) {
-      Require(table.Insert(EntryAt(name)) == SQLITE_OK, "an entry");
+      Require(table.Insert(EntryAt("/s", name)) == SQLITE_OK, "an entry");
     }
     Require(table.Commit(1) == SQLITE_OK, "a commit");
     Require(
@@ -55,7 +55,7 @@ class Index {
     }
 
     Require(table.Begin() == SQLITE_OK, "a transaction");
-    const Entry entry = EntryAt(name);
+    const Entry entry = EntryAt("/s/fuzz", name);
     Require(table.Insert(entry) == SQLITE_OK, "a name of any bytes");
     Match(names, words.NamesQuery());
     Match(parts, words.PartsQuery());

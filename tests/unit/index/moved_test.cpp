@@ -85,7 +85,7 @@ TEST_P(MovedTest, ExchangedFilesAreBothRefreshed) {
 }
 
 TEST_P(MovedTest, RowOfRenamesIsFollowedToItsEnd) {
-  constexpr int LENGTH = 3000;
+  constexpr int LENGTH = 600;
   const auto name = [](int n) { return "f" + std::to_string(n); };
   for (int i = 0; i < LENGTH; ++i) {
     WriteFile(At(name(i)), std::string(static_cast<size_t>(i % 100), 'x'));
