@@ -68,6 +68,18 @@ class ExcludesGitTest : public StateTest {
     return pattern;
   }
 
+  // git compares the bytes before the first wildcard on their own, and so takes the asterisks of
+  // "ab**/c" for ones that begin the pattern. Its manual says that they are ordinary there.
+  static bool IsTakenOtherwise(const std::string& pattern) {
+    for (size_t at = pattern.find("**"); at != std::string::npos; at = pattern.find("**", at + 1)) {
+      const bool begins = at == 0 || (at == 1 && pattern[0] == '!');
+      if (!begins && pattern[at - 1] != '/' && pattern.find('/') != std::string::npos) {
+        return true;
+      }
+    }
+    return false;
+  }
+
   std::set<std::string> ByGit(const std::vector<std::string>& patterns) {
     std::string text;
     for (const std::string& pattern : patterns) {
@@ -105,7 +117,10 @@ TEST_F(ExcludesGitTest, RandomListsKeepOutTheSamePaths) {
     Excludes excludes;
     for (size_t count = 1 + random() % 4; count > 0; --count) {
       std::string error;
-      (void)excludes.Add(RandomPattern(), error);  // what is no pattern is left out
+      const std::string pattern = RandomPattern();
+      if (!IsTakenOtherwise(pattern)) {
+        (void)excludes.Add(pattern, error);  // what is no pattern is left out
+      }
     }
 
     const std::set<std::string> expected = ByGit(excludes.patterns);
