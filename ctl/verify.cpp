@@ -16,13 +16,15 @@
 #include "index/compare.h"
 #include "index/repair.h"
 #include "state/layout.h"
+#include "state/progress.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {
 
 namespace {
 
-constexpr uint64_t PROGRESS_INTERVAL = 20000;  // paths
+constexpr uint64_t PIECE = 1000;       // paths
+constexpr uint64_t PIECES_SHOWN = 20;  // after which a terminal is told how far it is
 
 bool PutDifference(Difference difference, const std::string& path, const Arguments& arguments) {
   if (!arguments.json) {
@@ -88,21 +90,29 @@ int QueueRepair(const std::string& share_name, Repair& repair) {
 Comparer::Result CompareAll(Comparer& comparer, const std::string& share_name,
                             const std::function<bool(const Found&)>& report) {
   const std::string what = "comparing " + share_name + " with its files";
-  std::optional<Progress> progress(what);
+  std::optional<Progress> shown(what);
+  ProgressWriter progress(ComparisonProgressPath(share_name));
+  progress.Begin(Work::COMPARISON, comparer.Estimate());
   bool going = true;
-  for (;;) {
+  for (uint64_t piece = 1;; ++piece) {
+    const uint64_t before = comparer.counts.compared;
     const Comparer::Result result = comparer.Run(
         [&](const Found& found) {
           going = report(found);
           return going;
         },
-        PROGRESS_INTERVAL);
+        PIECE);
     if (result != Comparer::Result::STOPPED || !going) {
       return result;
     }
-    progress.reset();
-    progress.emplace(what + ": " + std::to_string(comparer.counts.compared) + " of about " +
-                     std::to_string(comparer.Estimate()));
+
+    progress.record.total = comparer.Estimate();
+    progress.Count(comparer.counts.compared - before);
+    if (piece % PIECES_SHOWN == 0) {
+      shown.reset();
+      shown.emplace(what + ": " + std::to_string(comparer.counts.compared) + " of about " +
+                    std::to_string(comparer.Estimate()));
+    }
   }
 }
 

@@ -52,8 +52,9 @@ bool IsEmptyDirectory(const std::string& path) {
 }
 
 // Whether it was said that the share is to be gone on with although its folder is empty.
-bool EmptyIsAccepted(StateStore& /*store*/, const std::string& /*share_name*/) {
-  return false;
+bool EmptyIsAccepted(StateStore& store, const std::string& share_name) {
+  ShareStatus status;
+  return store.GetStatus(share_name, status) && status.accept_empty;
 }
 
 }  // namespace

@@ -135,27 +135,28 @@ DiskWalk::Step DiskWalk::Next(std::string& path, Look& look) {
     if (step == Step::FAILED) {
       return step;
     }
-    if (step == Step::END || look.verdict != Verdict::BELONGS) {
+    if (step == Step::END) {
+      continue;
+    }
+    // A folder below it is indexed all the same; this one and what else it holds is not.
+    const bool only_passage = look.verdict == Verdict::EXCLUDED && settings.HasFolderBelow(path);
+    if (only_passage) {
+      look = LookPastExcludes(settings, path);
+      if (look.verdict == Verdict::UNKNOWN) {
+        return Step::FAILED;
+      }
+    }
+    if (look.verdict != Verdict::BELONGS) {
       continue;
     }
     if (look.thing == Thing::DIRECTORY) {
       AllowDescent(level, look, path);
     }
-    if (!passed) {
+    if (!passed && !only_passage) {
       passed_path.clear();
       folder = settings.FolderAt(path);
       folder = folder != nullptr ? folder : level.folder;
       return Step::FOUND;
-    }
-    // A folder below it is indexed all the same; this one and what else it holds is not.
-    if (look.verdict == Verdict::EXCLUDED && settings.HasFolderBelow(path)) {
-      look = LookPastExcludes(settings, path);
-      if (look.verdict == Verdict::UNKNOWN) {
-        return Step::FAILED;
-      }
-      if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY) {
-        AllowDescent(level, look, path);
-      }
     }
   }
   return Step::END;

@@ -11,6 +11,7 @@
 #include <ctime>
 #include <string_view>
 
+#include "base/scoped_fd.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -161,19 +162,13 @@ bool ProgressWriter::IsDue() {
   return IsRunning() && Milliseconds(CLOCK_MONOTONIC_COARSE) >= next_write;
 }
 
-// A file of its own each time: whoever still holds an older one writes into nowhere.
-void ProgressWriter::Open() {
-  open_tried = true;
-  ProgressRecord other;
-  if (ReadProgress(path, other)) {
-    return;
+// False when a living process has the file. What a dead one left goes.
+bool ProgressWriter::Claim() {
+  if (!claimed) {
+    ProgressRecord other;
+    claimed = !ReadProgress(path, other) && (unlink(path.c_str()) == 0 || errno == ENOENT);
   }
-  (void)unlink(path.c_str());
-  ScopedFd opened(
-      open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, S_IRUSR | S_IWUSR));
-  if (opened.fd >= 0 && fchmod(opened.fd, S_IRUSR | S_IWUSR) == 0) {
-    file.Swap(opened);
-  }
+  return claimed;
 }
 
 void ProgressWriter::Write() {
@@ -181,27 +176,26 @@ void ProgressWriter::Write() {
     return;
   }
   next_write = Milliseconds(CLOCK_MONOTONIC_COARSE) + WRITE_INTERVAL_MS;
-  if (!open_tried) {
-    Open();
-  }
-  if (file.fd < 0) {
+  if (!Claim()) {
     return;
   }
+  // Opened for each line: a Worker's thread may end with nothing to close.
+  const ScopedFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK,
+                           S_IRUSR | S_IWUSR));
   record.updated = Milliseconds(CLOCK_REALTIME);
   const std::string line = Line(record);
-  const ssize_t ignored = pwrite(file.fd, line.data(), line.size(), 0);
+  const ssize_t ignored = file.fd < 0 ? -1 : pwrite(file.fd, line.data(), line.size(), 0);
   (void)ignored;  // a reader finds the line torn, or an old one
 }
 
 void ProgressWriter::End() {
-  struct stat ours = {};
-  struct stat named = {};
-  if (file.fd >= 0 && fstat(file.fd, &ours) == 0 && stat(path.c_str(), &named) == 0 &&
-      ours.st_dev == named.st_dev && ours.st_ino == named.st_ino) {
+  ProgressRecord written;
+  int64_t pid = 0;
+  uint64_t start = 0;
+  if (claimed && Parse(ReadText(path, LINE_SIZE + 1), written, pid, start) && pid == getpid()) {
     (void)unlink(path.c_str());
   }
-  file.Close();
-  open_tried = false;
+  claimed = false;
   not_looked = 0;
   record = {};
 }

@@ -14,8 +14,6 @@
 #include <optional>
 #include <string>
 
-#include "base/scoped_fd.h"
-
 namespace fileindexd {
 
 enum class Work { FIRST_INDEX, REINDEX, UPDATE, COMPARISON };
@@ -67,11 +65,10 @@ class ProgressWriter {
  private:
   static constexpr uint64_t LOOK_INTERVAL = 256;
 
-  void Open();
+  bool Claim();
 
   const std::string path;
-  ScopedFd file;
-  bool open_tried = false;
+  bool claimed = false;  // the file is this writer's
   uint64_t not_looked = 0;
   int64_t next_write = 0;  // monotonic milliseconds
 };

@@ -190,8 +190,21 @@ std::string EventLine(uint32_t event, std::string_view path,
   return line;
 }
 
-bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
-                   std::string& error) {
+namespace {
+
+enum class Durability { NONE, SYNCED };
+
+bool SyncFolder(const std::string& folder, std::string& error) {
+  const ScopedFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (opened.fd < 0 || fsync(opened.fd) != 0) {
+    error = Reason("sync", folder);
+    return false;
+  }
+  return true;
+}
+
+bool Append(const std::string& share_name, const std::vector<std::string>& lines,
+            Durability durability, std::string& error) {
   std::string text;
   if (!JoinLines(lines, text, error) || !MakeShareFolder(share_name, error)) {
     return false;
@@ -212,13 +225,29 @@ bool AppendToQueue(const std::string& share_name, const std::vector<std::string>
   if (!WriteWhole(queue, path, text, size, error)) {
     return false;
   }
+  if (durability == Durability::SYNCED && fsync(queue.fd) != 0) {
+    error = Reason("sync", path);
+    return false;
+  }
 
   // The one unlock. Whoever waits for the lock must find the lines written.
   if (close(queue.Release()) != 0 && errno != EINTR) {
     error = Reason("close", path);
     return false;
   }
-  return true;
+  return durability == Durability::NONE || SyncFolder(ShareFolder(share_name), error);
+}
+
+}  // namespace
+
+bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
+                   std::string& error) {
+  return Append(share_name, lines, Durability::NONE, error);
+}
+
+bool AppendToQueueDurably(const std::string& share_name, const std::vector<std::string>& lines,
+                          std::string& error) {
+  return Append(share_name, lines, Durability::SYNCED, error);
 }
 
 uint64_t WaitingLines(const std::string& share_name) {

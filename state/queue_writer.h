@@ -24,6 +24,11 @@ std::string EventLine(uint32_t event, std::string_view path,
 bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
                    std::string& error);
 
+// The same, and true only once a power cut cannot take the lines away again. Costs two syncs. After
+// false the lines may be queued all the same.
+bool AppendToQueueDurably(const std::string& share_name, const std::vector<std::string>& lines,
+                          std::string& error);
+
 // Lines in the queue file and its drained copy together; 0 when there is neither.
 uint64_t WaitingLines(const std::string& share_name);
 

@@ -34,16 +34,11 @@ const Share* FindShareOfPath(const Settings& settings, const std::string& path) 
   return normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
 }
 
-// An index that was found missing may be made anew now. Both are put on record together, and before
-// the line is queued: whoever ends in between, or loses the queue with the power, would leave an
-// index that is new, empty and opens well, and nothing would ever fill it.
-void NoteReindex(const Share& share, const std::string& path) {
-  if (NormalPath(path) != share.path) {
-    return;
-  }
+// An index that was found missing may be made anew now that what fills it is on record, where no
+// power cut can reach it: else an index could be left that is new, empty and opens well.
+void AllowRebuild(const Share& share) {
   ChangeStatus(share.name, [](ShareStatus& status) {
     status.rebuild_wanted = status.rebuild_wanted || status.missing;
-    status.needs_reindex = status.needs_reindex || status.missing;
   });
 }
 
@@ -101,15 +96,20 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
     }
 
     const auto code = static_cast<uint32_t>(event);
-    if (code == CUSTOM_EVENT_REINDEX) {
-      NoteReindex(*share, path);
-    }
-
     const std::string text = data.isNull() ? std::string() : data.toString();
+    const std::vector<std::string> lines = {EventLine(code, path, std::nullopt, text)};
+    const bool refills = code == CUSTOM_EVENT_REINDEX && NormalPath(path) == share->path;
     std::string error;
-    if (!AppendToQueue(share->name, {EventLine(code, path, std::nullopt, text)}, error)) {
+    const bool queued = refills ? AppendToQueueDurably(share->name, lines, error)
+                                : AppendToQueue(share->name, lines, error);
+    if (!queued) {
       FI_LOG("Failed to queue event for share[%s]: %s", share->name.c_str(), error.c_str());
-      return RequestReindex(share->name);
+      if (!RequestReindex(share->name)) {
+        return false;
+      }
+    }
+    if (refills) {
+      AllowRebuild(*share);
     }
     return true;
   });

@@ -17,7 +17,7 @@ class Accept(FilesystemTest):
         self.pid = self.start()
         self.await_drained("alpha")
         self.check()
-        self.entries = self.dump()
+        self.before = self.dump()
 
     def share(self):
         (share,) = self.ctl("status", "--json").json()["shares"]
@@ -49,7 +49,7 @@ class Accept(FilesystemTest):
         self.assertEqual(self.share()["root"], "foreign")
         self.assertIn(b"share accept alpha", self.ctl("status").out)
         self.event(CREATE, "in/new.txt")
-        self.assertEqual(self.dump(), self.entries)
+        self.assertEqual(self.dump(), self.before)
 
         self.accept()
 
@@ -89,14 +89,14 @@ class Accept(FilesystemTest):
         self.make_files(self.disk, "share")
         self.ctl("share", "accept", "alpha", code=1)
         self.ctl("share", "accept", "nope", code=1)
-        self.assertEqual(self.dump(), self.entries)
+        self.assertEqual(self.dump(), self.before)
 
     def test_what_is_drained_while_the_disk_is_away_is_made_up_for(self):
         self.make_files(self.root, "new.txt")
         self.unmount_disk()
         self.event(CREATE, "new.txt")
         self.event(CREATE, "in/b.txt")
-        self.assertEqual(self.dump(), self.entries)
+        self.assertEqual(self.dump(), self.before)
         self.assertTrue(self.share()["needs_reindex"])
 
         self.mount_disk()
@@ -110,7 +110,7 @@ class Accept(FilesystemTest):
         for _ in range(3):
             self.event(CREATE, "in/b.txt")
             self.assertTrue(self.share()["needs_reindex"])
-            self.assertEqual(self.dump(), self.entries)
+            self.assertEqual(self.dump(), self.before)
 
 
 if __name__ == "__main__":

@@ -27,7 +27,7 @@ class UnmountedShare(FilesystemTest):
         self.pid = self.start()
         self.await_drained("alpha")
         self.check()
-        self.entries = self.dump()
+        self.before = self.dump()
 
     def send_everything(self):
         """Every operation on what cannot be seen, and on the root."""
@@ -42,7 +42,7 @@ class UnmountedShare(FilesystemTest):
                 self.await_drained("alpha")
 
     def check_unchanged(self):
-        self.assertEqual(self.dump(), self.entries)
+        self.assertEqual(self.dump(), self.before)
         result = self.ctl("verify", "alpha", code=1)
         self.assertEqual(result.out, b"")
         self.assertRegex(result.err, b"alpha|" + self.root.encode())
