@@ -47,6 +47,7 @@ class SecondInstanceTest(MachineTest):
             self.start_two()
 
             self.await_line("Search daemon launched ...", after)
+            self.await_line("Daemon alive. No need to start", after)
             texts = self.log.texts(after)
             self.assertEqual(texts.count("Daemonized ..."), 1)
             self.assertEqual(texts.count("Daemon alive. No need to start"), 1)
