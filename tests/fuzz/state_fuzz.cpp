@@ -86,8 +86,9 @@ class Tables {
     }
     const char* sql = kind == 's'   ? "INSERT OR IGNORE INTO share VALUES(?1, ?2, ?3)"
                       : kind == 'f' ? "INSERT OR IGNORE INTO folder VALUES(?1, ?2, ?3, ?4, ?5, ?6)"
-                      : kind == 't' ? "INSERT OR IGNORE INTO status VALUES(?1, ?2, ?3, ?4, ?5, ?6, 0)"
-                                    : nullptr;
+                      : kind == 't'
+                          ? "INSERT OR IGNORE INTO status VALUES(?1, ?2, ?3, ?4, ?5, ?6, 0)"
+                          : nullptr;
     if (sql == nullptr) {
       return;
     }
