@@ -277,7 +277,7 @@ Verdict JudgeNameIn(const Settings& settings, const std::string& path, std::stri
     return Verdict::OWN_STATE;
   }
   return FindExclusion(settings, path, Leaf::OTHER).pattern != nullptr ? Verdict::EXCLUDED
-                                                                         : Verdict::BELONGS;
+                                                                       : Verdict::BELONGS;
 }
 
 }  // namespace
