@@ -37,7 +37,7 @@ std::string FirstOnTheWay(const Share& share, const std::string& path,
                           const std::function<bool(const std::string&)>& test) {
   for (size_t at = share.path == "/" ? 0 : share.path.size(); at < path.size();) {
     const size_t end = std::min(path.find('/', at + 1), path.size());
-    const std::string part = path.substr(0, end);
+    std::string part = path.substr(0, end);
     if (test(part)) {
       return part;
     }

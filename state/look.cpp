@@ -6,29 +6,24 @@
 // numbers that are never given twice, the root's are kept for a second in each thread: a thing with
 // the same mount number lies in the share's mount, and any difference is looked into with care,
 // the root asked before and after. Where mount numbers are reused, the root is asked every time.
-#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
 
 #include <cerrno>
-#include <climits>
 #include <ctime>
 
 #include "base/scoped_fd.h"
-#include "base/scoped_stream.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
 #include "state/open_path.h"
+#include "state/statx_look.h"
 
 namespace fileindexd {
 
 namespace {
 
-// Since Linux 6.8; older headers lack it, older kernels ignore it.
-constexpr unsigned UNIQUE_MOUNT_ID = 0x4000;
-constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME | STATX_MNT_ID | UNIQUE_MOUNT_ID;
 constexpr int64_t ROOT_KEPT_NS = 1'000'000'000;
 constexpr int64_t FOLDER_KEPT_NS = 5'000'000;
 constexpr int CAREFUL_TRIES = 3;
@@ -51,18 +46,6 @@ int64_t Now() {
   return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
 }
 
-int64_t Nanoseconds(const statx_timestamp& time) {
-  return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
-}
-
-bool HasMountId(const struct statx& st) {
-  if ((st.stx_mask & (STATX_MNT_ID | UNIQUE_MOUNT_ID)) != 0) {
-    return true;
-  }
-  errno = ENOSYS;  // a kernel before 5.8
-  return false;
-}
-
 bool SeeRoot(const std::string& root, RootView& view) {
   struct statx st {};
   if (statx(AT_FDCWD, root.c_str(), 0, WANTED, &st) != 0 || !HasMountId(st)) {
@@ -83,46 +66,6 @@ const RootView* RecentRoot(const std::string& root) {
     return &kept;
   }
   return SeeRoot(root, kept) ? &kept : nullptr;
-}
-
-Thing ThingOfMode(unsigned mode) {
-  if (S_ISREG(mode)) {
-    return Thing::FILE;
-  }
-  if (S_ISDIR(mode)) {
-    return Thing::DIRECTORY;
-  }
-  return S_ISLNK(mode) ? Thing::LINK : Thing::NONE;
-}
-
-void Fill(const struct statx& st, Look& look) {
-  look.thing = ThingOfMode(st.stx_mode);
-  look.inode = st.stx_ino;
-  look.links = st.stx_nlink;
-  look.size = static_cast<int64_t>(st.stx_size);
-  look.mtime = Nanoseconds(st.stx_mtime);
-  look.ctime = Nanoseconds(st.stx_ctime);
-  look.birth_time = (st.stx_mask & STATX_BTIME) != 0 ? Nanoseconds(st.stx_btime) : 0;
-  look.owner = st.stx_uid;
-  look.group = st.stx_gid;
-  look.mode = st.stx_mode & 07777U;
-  look.mount_id = st.stx_mnt_id;
-  look.device = makedev(st.stx_dev_major, st.stx_dev_minor);
-  look.mount_root = (st.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0;
-}
-
-// GONE only where the call says for certain that nothing is there.
-Verdict VerdictOfError(int reason) {
-  switch (reason) {
-    case ENOENT:
-    case ENOTDIR:
-    case ENAMETOOLONG:
-      return Verdict::GONE;
-    case ELOOP:
-      return Verdict::BEHIND_LINK;
-    default:
-      return Verdict::UNKNOWN;
-  }
 }
 
 // BELONGS when there is something to judge further.
@@ -258,28 +201,6 @@ Look LookInFolder(const Settings& settings, const std::string& normal, FolderVie
   return look;
 }
 
-// Only when a thing was seen it is known whether the patterns for directories count.
-void JudgeByPatterns(const Settings& settings, const std::string& normal, Look& look) {
-  if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY &&
-      FindExclusion(settings, normal, Leaf::DIRECTORY).pattern != nullptr) {
-    look.verdict = Verdict::EXCLUDED;
-  }
-}
-
-// JudgeName for a name in a directory that belongs: all that the letters of the way to it say has
-// been judged with the directory.
-Verdict JudgeNameIn(const Settings& settings, const std::string& path, std::string_view name) {
-  if (IsPreservedName(name) || IsPassingName(name)) {
-    return Verdict::SKIPPED_NAME;
-  }
-  // The directory does not lie in our state folder, so nothing but that folder itself can.
-  if (path == settings.state_root) {
-    return Verdict::OWN_STATE;
-  }
-  return FindExclusion(settings, path, Leaf::OTHER).pattern != nullptr ? Verdict::EXCLUDED
-                                                                       : Verdict::BELONGS;
-}
-
 }  // namespace
 
 Look LookAt(const Settings& settings, const std::string& path) {
@@ -317,65 +238,6 @@ Look LookPastExcludes(const Settings& settings, const std::string& path) {
   return look;
 }
 
-Verdict OpenJudged(const Settings& settings, const std::string& path, uint64_t mount_id,
-                   JudgedDirectory& directory) {
-  const Share* share = settings.ShareOfPath(path);
-  if (share == nullptr) {
-    return Verdict::NO_SHARE;
-  }
-  const ScopedFd found(OpenInShare(share->path, path));
-  if (found.fd < 0) {
-    return VerdictOfError(errno);
-  }
-  ScopedFd opened(openat(found.fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NONBLOCK));
-  struct statx st {};
-  if (opened.fd < 0 || statx(opened.fd, "", AT_EMPTY_PATH, WANTED, &st) != 0) {
-    return VerdictOfError(errno);
-  }
-  if (!HasMountId(st)) {
-    return Verdict::UNKNOWN;
-  }
-  if (st.stx_mnt_id != mount_id) {
-    return Verdict::BELOW_MOUNT;
-  }
-  directory.path = path;
-  directory.mount_id = mount_id;
-  directory.device = makedev(st.stx_dev_major, st.stx_dev_minor);
-  directory.fd.Swap(opened);
-  return Verdict::BELONGS;
-}
-
-Look LookAtIn(const Settings& settings, const JudgedDirectory& directory, const std::string& path,
-              std::string_view name) {
-  Look look;
-  look.verdict = JudgeNameIn(settings, path, name);
-  if (look.verdict != Verdict::BELONGS) {
-    return look;
-  }
-  // A path that no other program could open by its letters is judged by them.
-  if (path.size() >= PATH_MAX) {
-    return LookAt(settings, path);
-  }
-
-  struct statx st {};
-  if (statx(directory.fd.fd, name.data(), AT_SYMLINK_NOFOLLOW, WANTED, &st) != 0) {
-    look.verdict = VerdictOfError(errno);
-    return look;
-  }
-  if (!HasMountId(st)) {
-    look.verdict = Verdict::UNKNOWN;
-    return look;
-  }
-  Fill(st, look);
-  // A mount point, or a subvolume that may be a snapshot: rare, and judged from the root.
-  if (look.mount_id != directory.mount_id || look.device != directory.device) {
-    return LookAt(settings, path);
-  }
-  look.verdict = look.thing == Thing::NONE ? Verdict::SPECIAL_FILE : Verdict::BELONGS;
-  JudgeByPatterns(settings, path, look);
-  return look;
-}
-
 Thing ThingAt(const Settings& settings, const std::string& path) {
   const auto normal = NormalPath(path);
   if (!normal.has_value()) {
@@ -391,44 +253,6 @@ Thing ThingAt(const Settings& settings, const std::string& path) {
     return Thing::NONE;
   }
   return ThingOfMode(st.st_mode);
-}
-
-RootState LookAtRoot(const Share& share) {
-  struct stat st {};
-  if (stat(share.path.c_str(), &st) != 0) {
-    const bool gone =
-        errno == ENOENT || errno == ENOTDIR || errno == ENAMETOOLONG || errno == ELOOP;
-    return gone ? RootState::MISSING : RootState::UNKNOWN;
-  }
-  if (!S_ISDIR(st.st_mode)) {
-    return RootState::MISSING;
-  }
-  if (share.filesystem.empty()) {
-    return RootState::SOUND;  // nothing on record to differ from
-  }
-
-  const std::string identity = FilesystemIdentity(share.path);
-  if (identity.empty()) {
-    return errno == ENOENT ? RootState::MISSING : RootState::UNKNOWN;
-  }
-  return identity == share.filesystem ? RootState::SOUND : RootState::FOREIGN;
-}
-
-bool IsRootEmpty(const Share& share) {
-  ScopedDir root;
-  root.dir = opendir(share.path.c_str());
-  if (root.dir == nullptr) {
-    return false;
-  }
-  errno = 0;
-  const dirent* entry = nullptr;
-  while ((entry = readdir(root.dir)) != nullptr) {  // NOLINT: of a stream of our own
-    const std::string_view name = entry->d_name;
-    if (name != "." && name != ".." && !IsPreservedName(name) && !IsPassingName(name)) {
-      return false;
-    }
-  }
-  return errno == 0;
 }
 
 }  // namespace fileindexd

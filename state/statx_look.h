@@ -1,0 +1,30 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// From the kernel's answer about one thing to a look: what all who look have in common.
+#pragma once
+
+#include <sys/stat.h>
+
+#include "state/belonging.h"
+
+namespace fileindexd {
+
+// Since Linux 6.8; older headers lack it, older kernels ignore it.
+constexpr unsigned UNIQUE_MOUNT_ID = 0x4000;
+constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME | STATX_MNT_ID | UNIQUE_MOUNT_ID;
+
+// False with errno ENOSYS on a kernel without mount ids.
+bool HasMountId(const struct statx& st);
+
+Thing ThingOfMode(unsigned mode);
+
+// All but the verdict.
+void Fill(const struct statx& st, Look& look);
+
+// GONE only where the call says for certain that nothing is there.
+Verdict VerdictOfError(int reason);
+
+// Changes the verdict on a directory that a pattern for directories keeps out: only when a thing
+// was seen it is known whether those count.
+void JudgeByPatterns(const Settings& settings, const std::string& normal, Look& look);
+
+}  // namespace fileindexd
