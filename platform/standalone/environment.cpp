@@ -34,7 +34,8 @@ Environment& Process() {
 // With the heap of its own that a thread would get, each page of a page cache costs a call to the
 // system when the database is opened for the next commit, since those heaps grow by single pages.
 void ShareOneHeap() {
-  (void)mallopt(M_ARENA_MAX, 1);  // as good as it gets
+  // Fails only for a bad number. NOLINTNEXTLINE(concurrency-mt-unsafe): before the first thread
+  (void)mallopt(M_ARENA_MAX, 1);
 }
 
 // A walk needs a descriptor for each level of the tree, and skips in silence what it has none for.
