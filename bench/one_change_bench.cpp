@@ -101,7 +101,7 @@ int main(int argc, char** argv) {
   const uint64_t divisor = DivisorFrom(argc, argv);
   const uint64_t few = Scaled(SMALL_INDEX, divisor, 10);
   const uint64_t many = Scaled(LARGE_INDEX, divisor, 100);
-  const uint64_t changes = Scaled(CHANGES, divisor, 5);
+  const uint64_t changes = Scaled(CHANGES, divisor, 20);
   const ScratchFolder scratch;
 
   DaemonUnderTest daemon(scratch.path + "/state");

@@ -2,6 +2,7 @@
 #include "index/converger.h"
 
 #include <ctime>
+#include <utility>
 
 #include "index/disk_walk.h"
 
@@ -299,14 +300,14 @@ IndexError Converger::LookBelow(const std::string& path, std::vector<std::string
 IndexError Converger::SettleSlice(const std::vector<Entry>& rows,
                                   std::vector<std::string>& replaced) {
   IndexError error = IndexError::NONE;
-  std::vector<Entry> gone;
+  std::vector<const Entry*> gone;
   for (const Entry& known : rows) {
     const Look look = LookAt(*settings, known.path);
     if (look.verdict == Verdict::UNKNOWN) {
       return IndexError::IO;
     }
     if (look.verdict != Verdict::BELONGS) {
-      gone.push_back(known);
+      gone.push_back(&known);
       continue;
     }
 
@@ -326,10 +327,7 @@ IndexError Converger::SettleSlice(const std::vector<Entry>& rows,
   if (!gone.empty()) {
     error = CheckRoot();
   }
-  for (size_t i = 0; i < gone.size() && error == IndexError::NONE; ++i) {
-    error = Sql(table.Remove(gone[i]));
-  }
-  return error;
+  return error == IndexError::NONE ? Sql(table.RemoveAll(std::move(gone))) : error;
 }
 
 // Adds what is missing. What is known below has just been looked at.

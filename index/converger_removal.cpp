@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What leaves the index. The root is looked at last: before anything is taken away, and after what
 // is to leave was found gone.
+#include <utility>
+
 #include "index/converger.h"
 
 namespace fileindexd {
@@ -74,10 +76,7 @@ IndexError Converger::RemoveFromSlice(const std::vector<Entry>& rows, bool even_
   }
 
   IndexError error = leaving.empty() ? IndexError::NONE : CheckRoot();
-  for (size_t i = 0; i < leaving.size() && error == IndexError::NONE; ++i) {
-    error = Sql(table.Remove(*leaving[i]));
-  }
-  return error;
+  return error == IndexError::NONE ? Sql(table.RemoveAll(std::move(leaving))) : error;
 }
 
 }  // namespace fileindexd

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/entry_table.h"
 
+#include <algorithm>
 #include <ctime>
 #include <utility>
 
@@ -284,6 +285,16 @@ int EntryTable::Remove(const Entry& entry) {
   ++removed;
   code = RunText(remove_name, entry.id, entry.path);
   return code == SQLITE_OK ? RunText(remove_part, entry.id, entry.path) : code;
+}
+
+int EntryTable::RemoveAll(std::vector<const Entry*> leaving) {
+  std::sort(leaving.begin(), leaving.end(),
+            [](const Entry* left, const Entry* right) { return left->id < right->id; });
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < leaving.size() && code == SQLITE_OK; ++i) {
+    code = Remove(*leaving[i]);
+  }
+  return code;
 }
 
 int EntryTable::RunText(Statement& statement, int64_t id, const std::string& path) {

@@ -54,6 +54,10 @@ class EntryTable {
   int Insert(const Entry& entry);  // `id` does not count
   int Update(const Entry& entry);  // by `id`; the path does not change
   int Remove(const Entry& entry);  // by `id`; needs the path
+  // In the order of their ids. The full-text tables collect changes in memory while ids ascend, and
+  // write a segment at each one that does not: in the order of paths, which is not the order in
+  // which a directory was read, nearly each removal would write one.
+  int RemoveAll(std::vector<const Entry*> leaving);
 
   uint64_t changes = 0;  // rows changed since Prepare
   sqlite3* handle = nullptr;

@@ -6,6 +6,10 @@ namespace fileindexd {
 static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 2,
               "numbers in the text below");
 
+// The full-text tables merge sixteen segments into one, a few pages at each commit: an entry is
+// then written anew only each time the index has grown sixteen times larger, and an entry more
+// costs about the same in an index of any size. Only well beyond that is a level merged at once,
+// which in a large index would hold one commit up for a second.
 const char* const ENTRIES_SCHEMA = R"sql(
 CREATE TABLE entries(
   id INTEGER PRIMARY KEY,
@@ -35,6 +39,10 @@ CREATE TABLE meta(
   last_commit INTEGER NOT NULL,
   removed INTEGER NOT NULL);
 INSERT INTO meta VALUES(1, 0, 0, 0);
+INSERT INTO names(names, rank) VALUES('automerge', 16);
+INSERT INTO names(names, rank) VALUES('crisismerge', 64);
+INSERT INTO parts(parts, rank) VALUES('automerge', 16);
+INSERT INTO parts(parts, rank) VALUES('crisismerge', 64);
 PRAGMA application_id = 1179209285;
 PRAGMA user_version = 2;
 )sql";
