@@ -22,7 +22,7 @@ KIB = 1 << 10
 MIB = 1 << 20
 PIECE = 4 * MIB
 SIZE = 16 * MIB
-STEP = (8 if LONG else 256) * KIB  # while commits fail
+STEP = (32 if LONG else 256) * KIB  # while commits fail
 WIDE_STEP = (128 if LONG else 512) * KIB  # while the daemon stops for too little space
 FIRST_STEPS = (0, 4 * KIB, 16 * KIB, 64 * KIB)
 ENTRIES = f"{namespace.STATE}/shares/alpha/index/entries.db"
@@ -119,9 +119,8 @@ class FullDiskSteps:
         failed = 0
         while True:
             number += 1
-            with self.subTest(free=free):
-                said = self.fill_and_free(number, free)
-            print(f"{free}: {sorted(said & {COMMIT_FAILED, NO_SPACE})}", flush=True)
+            said = self.fill_and_free(number, free)
+            print(f"{free} bytes: {sorted(said & {COMMIT_FAILED, NO_SPACE})}", flush=True)
             failed += COMMIT_FAILED in said
             if not said & {COMMIT_FAILED, NO_SPACE}:
                 break
