@@ -42,4 +42,28 @@ std::string Statement::Bytes(int column) const {
   return {static_cast<const char*>(bytes), static_cast<size_t>(size)};
 }
 
+int QuickCheck(sqlite3* db, bool& ok) {
+  Statement check;
+  int result = check.Prepare(db, "PRAGMA quick_check(1)");
+  if (result != SQLITE_OK) {
+    return result;
+  }
+  result = check.Step();
+  if (result != SQLITE_ROW) {
+    return result == SQLITE_DONE ? SQLITE_CORRUPT : result;
+  }
+  ok = check.Bytes(0) == "ok";
+  return SQLITE_OK;
+}
+
+int SchemaVersion(sqlite3* db, int64_t& version) {
+  Statement ask;
+  int result = ask.Prepare(db, "PRAGMA user_version");
+  if (result == SQLITE_OK) {
+    result = ask.Step();
+    version = result == SQLITE_ROW ? ask.Int(0) : 0;
+  }
+  return result == SQLITE_ROW ? SQLITE_OK : result;
+}
+
 }  // namespace fileindexd

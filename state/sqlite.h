@@ -35,4 +35,10 @@ class Statement {
   sqlite3_stmt* handle = nullptr;
 };
 
+// Whether the database is sound. SQLITE_OK and `ok`, or SQLite's reason.
+int QuickCheck(sqlite3* db, bool& ok);
+
+// The number that a program of ours left in the database; 0 where none did.
+int SchemaVersion(sqlite3* db, int64_t& version);
+
 }  // namespace fileindexd

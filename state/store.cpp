@@ -30,6 +30,12 @@ bool StateStore::Impl::Open() {
   if (connection == nullptr) {
     return false;
   }
+  const bool full = !connection->read_only.empty();
+  if (full && !full_told) {
+    syslog(LOG_ERR, "%s:%d %s: nothing is changed there until it has space", __FILE__, __LINE__,
+           connection->read_only.c_str());
+  }
+  full_told = full;
   data_version.emplace();
   int64_t version = 0;
   if (!Prepare(*data_version, "PRAGMA data_version") || !ReadVersion(version)) {
@@ -58,8 +64,8 @@ bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
 
 bool StateStore::Impl::Ready() {
   // A transaction that is still open here is one whose rollback failed.
-  const bool useful =
-      connection != nullptr && !files_failed && sqlite3_get_autocommit(connection->db) != 0;
+  const bool useful = connection != nullptr && connection->read_only.empty() && !files_failed &&
+                      sqlite3_get_autocommit(connection->db) != 0;
   return (useful && !HasStateMoved(*connection)) || Open();
 }
 
@@ -72,7 +78,13 @@ bool StateStore::Impl::FailSql() {
 }
 
 bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
-  if (!Ready() || !Exec("BEGIN IMMEDIATE")) {
+  if (!Ready()) {
+    return false;
+  }
+  if (!connection->read_only.empty()) {
+    return Fail(connection->read_only);
+  }
+  if (!Exec("BEGIN IMMEDIATE")) {
     return false;
   }
   const Outcome outcome = body();
@@ -172,7 +184,9 @@ std::string StateStore::Error() {
 
 bool StateStore::Touch() {
   const std::lock_guard guard(impl->mutex);
-  const bool written = impl->Change([&] {
+  // On a full disk the opening that follows the space's return makes all of it.
+  const bool full = impl->connection != nullptr && !impl->connection->read_only.empty();
+  const bool written = full || impl->Change([&] {
     return impl->Done(
         impl->Exec("INSERT INTO number VALUES('touched', 1)"
                    " ON CONFLICT DO UPDATE SET value = value + 1"));

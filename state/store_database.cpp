@@ -17,6 +17,7 @@
 #include <thread>
 
 #include "base/scoped_fd.h"
+#include "state/filesystem.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -113,31 +114,6 @@ int Exec(const StateConnection& connection, const char* sql) {
   return sqlite3_exec(connection.db, sql, nullptr, nullptr, nullptr);
 }
 
-// SQLITE_OK and `ok`, or SQLite's reason.
-int QuickCheck(sqlite3* db, bool& ok) {
-  Statement check;
-  int result = check.Prepare(db, "PRAGMA quick_check(1)");
-  if (result != SQLITE_OK) {
-    return result;
-  }
-  result = check.Step();
-  if (result != SQLITE_ROW) {
-    return result == SQLITE_DONE ? SQLITE_CORRUPT : result;
-  }
-  ok = check.Bytes(0) == "ok";
-  return SQLITE_OK;
-}
-
-int SchemaVersion(sqlite3* db, int64_t& version) {
-  Statement ask;
-  int result = ask.Prepare(db, "PRAGMA user_version");
-  if (result == SQLITE_OK) {
-    result = ask.Step();
-    version = result == SQLITE_ROW ? ask.Int(0) : 0;
-  }
-  return result == SQLITE_ROW ? SQLITE_OK : result;
-}
-
 Opened Failed(const StateConnection& connection, const char* what, int result, std::string& error) {
   error = StateError(connection, what);
   return IsDamage(result) ? Opened::DAMAGED : Opened::FAILED;
@@ -220,6 +196,42 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
   }
   TidyOnClose(connection, true);
   return Opened::GOOD;
+}
+
+// The form in which SQLite takes options with a path.
+std::string Uri(const std::string& path, const char* options) {
+  constexpr char DIGITS[] = "0123456789abcdef";
+  std::string uri = "file:";
+  for (const char c : path) {
+    if (c == '%' || c == '?' || c == '#') {
+      const auto byte = static_cast<unsigned char>(c);
+      uri += {'%', DIGITS[byte / 16], DIGITS[byte % 16]};
+    } else {
+      uri += c;
+    }
+  }
+  return uri + options;
+}
+
+// On a full disk there is no room for the log and the shared memory that even a reader needs. What
+// was closed properly can be read without them. `error` is what kept it from being opened.
+bool OpenForReading(StateConnection& connection, const std::string& error) {
+  struct stat log {};
+  const std::string log_path = connection.path + "-wal";
+  if (HasSpace(StateRoot(), false) || (lstat(log_path.c_str(), &log) == 0 && log.st_size > 0)) {
+    return false;
+  }
+  const std::string uri = Uri(connection.path, "?immutable=1");
+  constexpr int FLAGS = SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_URI;
+  int64_t version = 0;
+  bool ok = false;
+  if (sqlite3_open_v2(uri.c_str(), &connection.db, FLAGS, nullptr) != SQLITE_OK ||
+      SchemaVersion(connection.db, version) != SQLITE_OK || version != SCHEMA_VERSION ||
+      QuickCheck(connection.db, ok) != SQLITE_OK || !ok) {
+    return false;
+  }
+  connection.read_only = error + "; its disk is full";
+  return true;
 }
 
 bool ReadAll(const std::string& path, std::string& bytes) {
@@ -313,7 +325,8 @@ bool ReadLogHead(const StateConnection& connection, LogHead& head) {
   constexpr int REGION = 32 * 1024;  // SQLite's own size: the mapping is the one that it uses
   sqlite3_file* file = nullptr;
   if (sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_FILE_POINTER, &file) != SQLITE_OK ||
-      file->pMethods == nullptr || file->pMethods->iVersion < 2) {
+      file->pMethods == nullptr || file->pMethods->iVersion < 2 ||
+      file->pMethods->xShmMap == nullptr) {
     return false;
   }
   volatile void* shared = nullptr;
@@ -358,7 +371,12 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     if (outcome == Opened::GOOD) {
       return connection;
     }
-    if (outcome == Opened::FAILED || recovered) {
+    if (outcome == Opened::FAILED) {
+      connection = std::make_unique<StateConnection>();
+      connection->path = path;
+      return OpenForReading(*connection, error) ? std::move(connection) : nullptr;
+    }
+    if (recovered) {
       return nullptr;
     }
 

@@ -29,10 +29,13 @@ class StateConnection {
 
   sqlite3* db = nullptr;
   std::string path;
+  // Why it is for reading only, and sees no later change: the disk is full. Else empty.
+  std::string read_only;
 };
 
 // Opens the database: makes it where there is none, upgrades an older one, refuses a newer one, and
-// puts the copy in the place of a damaged one. Null on failure.
+// puts the copy in the place of a damaged one. On a full disk, which has no room for the log and
+// the shared memory, the connection may be one for reading only. Null on failure.
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 
 // Leaves a copy of what is committed beside the database. It is checked before it replaces the one

@@ -27,7 +27,7 @@ struct StateStore::Impl {
 
   bool Open();
   // Opens anew where another program set the file aside (changes to it would be lost), and where
-  // the connection is of no use any more.
+  // the connection is of no use any more, or was for reading only.
   bool Ready();
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
@@ -63,6 +63,7 @@ struct StateStore::Impl {
   std::string error;
   std::unique_ptr<StateConnection> connection;
   bool files_failed = false;              // of this connection
+  bool full_told = false;                 // that the disk is full, since it last was not
   std::optional<Statement> data_version;  // goes before the connection
   int64_t cached_version = 0;
   std::optional<LogHead> cached_head;      // of the log, before `cached_version` was asked for

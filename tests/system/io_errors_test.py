@@ -17,6 +17,11 @@ from harness.machine import PID_FILE
 FILES = 2000
 IMAGE_SIZE = 64 << 20
 BELOW = "/run/below"  # what the image lies on
+FULL_STATE = re.compile(
+    r"cannot .*state\.db: .*; its disk is full: nothing is changed there until it has space|"
+    r"Failed to open the state database: .*state\.db: database or disk is full"
+)
+FIRST_FAILS = re.compile(r"Failed to open the state database: cannot .*(is full|No space left on device)")
 
 
 def fill(path):
@@ -72,36 +77,93 @@ class FailingStateDiskTest(FilesystemTest):
         self.check()
 
 
-class FullAtTheStartTest(FilesystemTest):
-    state_size = "8m"
+class FullAtTheStart:
+    """The daemon serves without a Worker, and says why; the share comes back with the space."""
 
-    def test_daemon_says_so_and_indexes_once_there_is_space(self):
+    def assert_lives_and_heals(self):
+        filler = fill(self.state_disk)
+        after = self.log.mark()
+
+        self.start()
+
+        self.await_line("CreateWorker failed, share=alpha", after)
+        said = self.log.texts(after)
+        self.assertIn("Share[alpha] is running out space", said)
+        self.assertTrue([text for text in said if FULL_STATE.fullmatch(text)], said)
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertEqual(share["entries"], 2)
+        self.ctl("worker", "revive", "alpha", code=1)
+        os.unlink(filler)
+        self.ctl("worker", "revive", "alpha")
+        self.make_files(self.root, "late.txt")
+        self.event(CREATE, "late.txt")
+        self.check()
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertIs(share["no_space"], False)
+
+    def prepare(self):
         self.make_files(self.root, "a.txt")
         self.add_share()
-        self.stop(self.start())
-        filler = fill(namespace.DISK)
+        self.pid = self.start()
+        self.await_drained("alpha")
+
+    def tidy(self):
+        """The last program that closes the state database takes its log away."""
+        self.ctl("share", "list")
+        self.assertFalse(os.path.exists(f"{namespace.STATE}/state.db-wal"))
+
+    def test_without_a_log_of_the_state(self):
+        self.prepare()
+        self.stop(self.pid)
+        self.tidy()
+
+        self.assert_lives_and_heals()
+
+    def test_with_a_log_of_the_state(self):
+        self.prepare()
+        self.stop(self.pid)
+        self.assertTrue(os.path.exists(f"{namespace.STATE}/state.db-wal"))
+
+        self.assert_lives_and_heals()
+
+    def test_after_a_kill(self):
+        self.prepare()
+        self.kill(self.pid)
+        os.unlink(PID_FILE)
+
+        self.assert_lives_and_heals()
+
+    def test_first_start_of_all_ends_and_says_why(self):
+        os.makedirs(namespace.STATE, exist_ok=True)
+        filler = fill(self.state_disk)
         after = self.log.mark()
 
         self.launch()
 
-        # What its files are given up for may just suffice for the state database.
-        self.await_line(re.compile(r"DoUpdate failed|Search daemon launched \.\.\."), after)
-        told = [
-            text
-            for text in self.log.texts(after)
-            if "Failed to open the state database: " in text
-            or "Share[alpha] is running out space" in text
-        ]
-        self.assertNotEqual(told, [])
+        self.await_lines([FIRST_FAILS, "DoUpdate failed"], after)
+        self.await_gone(PID_FILE)
         os.unlink(filler)
-        if "DoUpdate failed" in "".join(self.log.texts(after)):
-            self.await_gone(PID_FILE)
-            self.start()
-        else:
-            self.ctl("worker", "revive", "alpha")
-        self.make_files(self.root, "late.txt")
-        self.event(CREATE, "late.txt")
-        self.check()
+        self.start()
+
+
+class FullTmpfsAtTheStartTest(FullAtTheStart, FilesystemTest):
+    state_size = "8m"
+    state_disk = namespace.DISK
+
+
+class FullExt4AtTheStartTest(FullAtTheStart, FilesystemTest):
+    state_disk = namespace.STATE
+
+    def setUp(self):
+        super().setUp()
+        if not can_use_loop_devices():
+            self.skipTest("no loop devices here")
+        image = f"{namespace.RUN}/state.image"
+        with open(image, "wb") as file:
+            file.truncate(16 << 20)
+        run("mkfs.ext4", "-q", "-F", "-m", "0", image)
+        os.mkdir(namespace.STATE, 0o700)
+        run("mount", "-o", "loop", image, namespace.STATE)
 
 
 if __name__ == "__main__":

@@ -212,8 +212,21 @@ class DamagedIndexTest(IndexTest):
         self.check(after, False)
 
     def test_removed_folder_of_the_share_while_stopped(self):
-        # A running daemon loses sight of the queue with it: inotify watches the folder itself.
         self.damaged_while_stopped(lambda: remove(os.path.dirname(FOLDER)), False)
+
+    def test_removed_folder_of_the_share_while_running_is_healed_by_a_new_worker(self):
+        self.make_index()
+        after = self.log.mark()
+        # The daemon loses sight of the queue with it: inotify watches the folder itself.
+        remove(os.path.dirname(FOLDER))
+        self.ask()
+        self.make_files(self.root, "missed.txt")
+        self.ctl("event", "alpha", str(CREATE), f"{self.root}/missed.txt")
+        self.ctl("worker", "drop", "alpha")
+        self.ctl("worker", "revive", "alpha")
+        self.touch()
+
+        self.check(after, False)
 
 
 def add_cases():
