@@ -258,10 +258,20 @@ Look LookInFolder(const Settings& settings, const std::string& normal, FolderVie
   return look;
 }
 
+// Whether a file's name may have been left open, because a directory of that name is taken in.
+bool IsFileOpen(const Settings& settings, const std::string& normal) {
+  const IndexedFolder* folder = settings.FolderOfPath(normal);
+  return folder != nullptr && folder->excludes.takes_in_directories;
+}
+
 // Only when a thing was seen it is known whether the patterns for directories count.
 void JudgeByPatterns(const Settings& settings, const std::string& normal, Look& look) {
-  if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY &&
-      FindExclusion(settings, normal, Leaf::DIRECTORY).pattern != nullptr) {
+  const bool is_directory = look.thing == Thing::DIRECTORY;
+  if (look.verdict != Verdict::BELONGS || (!is_directory && !IsFileOpen(settings, normal))) {
+    return;
+  }
+  const Leaf leaf = is_directory ? Leaf::DIRECTORY : Leaf::OTHER;
+  if (FindExclusion(settings, normal, leaf).pattern != nullptr) {
     look.verdict = Verdict::EXCLUDED;
   }
 }
@@ -276,7 +286,7 @@ Verdict JudgeNameIn(const Settings& settings, const std::string& path, std::stri
   if (path == settings.state_root) {
     return Verdict::OWN_STATE;
   }
-  return FindExclusion(settings, path, Leaf::OTHER).pattern != nullptr ? Verdict::EXCLUDED
+  return FindExclusion(settings, path, Leaf::UNKNOWN).pattern != nullptr ? Verdict::EXCLUDED
                                                                          : Verdict::BELONGS;
 }
 
