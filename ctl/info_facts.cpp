@@ -56,6 +56,18 @@ bool HasSkippedName(const std::string& path) {
   return IsPreservedName(name) || IsPassingName(name);
 }
 
+// What was seen there; a name alone may have sufficed.
+Leaf LeafOf(const Look& look) {
+  switch (look.thing) {
+    case Thing::NONE:
+      return Leaf::UNKNOWN;
+    case Thing::DIRECTORY:
+      return Leaf::DIRECTORY;
+    default:
+      return Leaf::OTHER;
+  }
+}
+
 void Explain(const Settings& settings, PathFacts& facts, int reason) {
   const auto first = [&facts](const std::function<bool(const std::string&)>& test) {
     return FirstOnTheWay(*facts.share, facts.path, test);
@@ -71,7 +83,7 @@ void Explain(const Settings& settings, PathFacts& facts, int reason) {
       facts.reason = "it lies in the indexer's own folder " + settings.state_root;
       break;
     case Verdict::EXCLUDED:
-      facts.exclusion = FindExclusion(settings, facts.path, Leaf::DIRECTORY);
+      facts.exclusion = FindExclusion(settings, facts.path, LeafOf(facts.look));
       facts.at = facts.exclusion.path;
       facts.reason = "the pattern " + *facts.exclusion.pattern + " of folder " +
                      facts.exclusion.folder->path + " keeps out " + facts.at;

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/compare.h"
 
-#include <dirent.h>
 #include <sys/resource.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -9,10 +8,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <string_view>
 #include <utility>
 
-#include "base/scoped_stream.h"
 #include "index/disk_walk.h"
 #include "index/entry_stream.h"
 #include "index/entry_table.h"
@@ -34,21 +31,6 @@ bool IsStale(const Entry& entry, const Look& look) {
   const Kind kind = look.thing == Thing::FILE ? KindOfName(LastComponent(entry.path)) : Kind::OTHER;
   return entry.kind != kind || entry.inode != look.inode || entry.size != look.size ||
          entry.mtime != look.mtime || entry.birth_time != look.birth_time;
-}
-
-bool IsEmptyDirectory(const std::string& path) {
-  const ScopedDir stream(opendir(path.c_str()));
-  if (stream.dir == nullptr) {
-    return false;
-  }
-  // NOLINTNEXTLINE(concurrency-mt-unsafe): the stream is this thread's own
-  while (const dirent* found = readdir(stream.dir)) {
-    const std::string_view name = found->d_name;
-    if (name != "." && name != "..") {
-      return false;
-    }
-  }
-  return true;
 }
 
 // Whether it was said that the share is to be gone on with although its folder is empty.
@@ -142,7 +124,7 @@ bool Comparer::CheckRoot() {
   if (LookAtRoot(share) != RootState::SOUND) {
     return Refuse(share.path + ": " + IndexErrorText(IndexError::ROOT));
   }
-  if (!has_index || !IsEmptyDirectory(share.path)) {
+  if (!has_index || !IsRootEmpty(share)) {
     return true;
   }
 

@@ -138,7 +138,8 @@ void EntryWriter::Impl::CloseDamaged() {
   next_open = MonotonicMs() + OPEN_INTERVAL_MS;
 }
 
-// For operations that are on no list any more. A reindex that is under way suffices.
+// For operations that are on no list any more. They may be those of a reindex that is under way: it
+// is put on record even then, but wakes nobody, as that reindex may go on failing.
 void EntryWriter::Impl::WantReindex() {
   reindex_owed = true;
   (void)PayReindex();  // if it fails, the next commit tries again and fails until it is done
@@ -149,10 +150,10 @@ bool EntryWriter::Impl::PayReindex() {
     return true;
   }
 
-  bool set = false;
-  const bool updated = store.UpdateStatus(share_name, [&](ShareStatus& status) {
-    set = !status.needs_reindex && !status.reindex_begun;
-    status.needs_reindex = status.needs_reindex || set;
+  bool wake = false;
+  const bool updated = store.UpdateStatus(share_name, [&wake](ShareStatus& status) {
+    wake = !status.needs_reindex && !status.reindex_begun;
+    status.needs_reindex = true;
   });
   if (!updated) {
     return false;
@@ -160,7 +161,7 @@ bool EntryWriter::Impl::PayReindex() {
 
   // The flag stands, and whoever touches stale queues helps where this touch fails.
   std::string ignored;
-  if (set) {
+  if (wake) {
     (void)AppendToQueue(share_name, {}, ignored);
   }
   reindex_owed = false;

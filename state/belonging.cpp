@@ -61,7 +61,8 @@ Verdict JudgeName(const Settings& settings, const std::string& path) {
   if (HasSkippedName(below)) {
     return Verdict::SKIPPED_NAME;
   }
-  const Excludes::Match match = folder->excludes.KeepOut(Below(folder->path, *normal), Leaf::OTHER);
+  const Excludes::Match match =
+      folder->excludes.KeepOut(Below(folder->path, *normal), Leaf::UNKNOWN);
   return match.pattern != nullptr ? Verdict::EXCLUDED : Verdict::BELONGS;
 }
 

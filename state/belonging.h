@@ -102,7 +102,7 @@ Look LookAtIn(const Settings& settings, const JudgedDirectory& directory, const 
               std::string_view name);
 
 // The same judged by the path alone: BELONGS when nothing in its letters speaks against it. A
-// pattern for directories alone speaks only against what lies below one.
+// pattern for directories alone speaks only against what lies below one, or for one.
 Verdict JudgeName(const Settings& settings, const std::string& path);
 
 // As LookAt, but excludes do not count: for the way to an indexed folder that lies below what

@@ -15,6 +15,7 @@ bool Excludes::Add(const std::string& pattern, std::string& error) {
   if (!ReadExcludePattern(pattern, read, error)) {
     return false;
   }
+  takes_in_directories = takes_in_directories || (read.negated && read.directory_only);
   compiled.push_back(std::move(read));
   patterns.push_back(pattern);
   return true;
@@ -23,6 +24,13 @@ bool Excludes::Add(const std::string& pattern, std::string& error) {
 Excludes::Match Excludes::KeepOut(std::string_view below, Leaf leaf) const {
   if (patterns.empty() || below.empty()) {
     return {};
+  }
+  if (leaf == Leaf::UNKNOWN) {
+    // A directory is kept out by more, or by less where one is taken in again.
+    const Match match = KeepOut(below, Leaf::OTHER);
+    const bool is_open = match.pattern != nullptr && takes_in_directories &&
+                         KeepOut(below, Leaf::DIRECTORY).pattern == nullptr;
+    return is_open ? Match() : match;
   }
   Components components;
   for (size_t begin = 0; begin <= below.size();) {

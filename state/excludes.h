@@ -25,8 +25,9 @@ namespace fileindexd {
 
 constexpr size_t MAX_EXCLUDES = 1000;  // patterns of a folder
 
-// What the last component of a path is. Those above it are directories.
-enum class Leaf { DIRECTORY, OTHER };
+// What the last component of a path is. Those above it are directories. UNKNOWN: only what keeps
+// out whatever it may be counts.
+enum class Leaf { DIRECTORY, OTHER, UNKNOWN };
 
 class Excludes {
  public:
@@ -45,6 +46,9 @@ class Excludes {
   bool operator==(const Excludes& other) const { return patterns == other.patterns; }
 
   std::vector<std::string> patterns;  // as written, in order; Add alone changes it
+  // Whether a pattern takes in directories alone ("!*/"): then a name that keeps out a file may not
+  // keep out a directory. Add alone changes it.
+  bool takes_in_directories = false;
 
  private:
   using Components = std::vector<std::string_view>;

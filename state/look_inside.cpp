@@ -26,8 +26,8 @@ Verdict JudgeNameIn(const Settings& settings, const std::string& path, std::stri
   if (path == settings.state_root) {
     return Verdict::OWN_STATE;
   }
-  return FindExclusion(settings, path, Leaf::OTHER).pattern != nullptr ? Verdict::EXCLUDED
-                                                                       : Verdict::BELONGS;
+  return FindExclusion(settings, path, Leaf::UNKNOWN).pattern != nullptr ? Verdict::EXCLUDED
+                                                                         : Verdict::BELONGS;
 }
 
 }  // namespace

@@ -101,7 +101,8 @@ void QueueFolding::Erase(LineMap::iterator line) {
 }
 
 void QueueFolding::FoldInto(const std::string& directory) {
-  const std::string folded = directory;  // may be the key of a line that goes
+  // NOLINTNEXTLINE(performance-unnecessary-copy-initialization): may be the key of a line that goes
+  const std::string folded = directory;
   auto line = lines.lower_bound(folded);
   while (line != lines.end() && Covers(folded, line->first)) {
     Erase(line++);

@@ -13,6 +13,12 @@ int64_t Nanoseconds(const statx_timestamp& time) {
   return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
 }
 
+// Whether a file's name may have been left open, because a directory of that name is taken in.
+bool IsFileOpen(const Settings& settings, const std::string& normal) {
+  const IndexedFolder* folder = settings.FolderOfPath(normal);
+  return folder != nullptr && folder->excludes.takes_in_directories;
+}
+
 }  // namespace
 
 bool HasMountId(const struct statx& st) {
@@ -63,8 +69,12 @@ Verdict VerdictOfError(int reason) {
 }
 
 void JudgeByPatterns(const Settings& settings, const std::string& normal, Look& look) {
-  if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY &&
-      FindExclusion(settings, normal, Leaf::DIRECTORY).pattern != nullptr) {
+  const bool is_directory = look.thing == Thing::DIRECTORY;
+  if (look.verdict != Verdict::BELONGS || (!is_directory && !IsFileOpen(settings, normal))) {
+    return;
+  }
+  const Leaf leaf = is_directory ? Leaf::DIRECTORY : Leaf::OTHER;
+  if (FindExclusion(settings, normal, leaf).pattern != nullptr) {
     look.verdict = Verdict::EXCLUDED;
   }
 }

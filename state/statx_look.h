@@ -23,8 +23,8 @@ void Fill(const struct statx& st, Look& look);
 // GONE only where the call says for certain that nothing is there.
 Verdict VerdictOfError(int reason);
 
-// Changes the verdict on a directory that a pattern for directories keeps out: only when a thing
-// was seen it is known whether those count.
+// Changes the verdict on what a pattern keeps out after all: only when a thing was seen it is known
+// whether the patterns for directories count.
 void JudgeByPatterns(const Settings& settings, const std::string& normal, Look& look);
 
 }  // namespace fileindexd

@@ -57,6 +57,11 @@ bool IsNameVerdict(Verdict verdict) {
   }
 }
 
+// Of every path of our own state, also where its root is named by way of a link: no share holds it.
+bool IsOutside(Verdict verdict) {
+  return verdict == Verdict::NO_SHARE || verdict == Verdict::OWN_STATE;
+}
+
 int64_t Now() {
   timespec now = {};
   clock_gettime(CLOCK_MONOTONIC_COARSE, &now);
@@ -90,7 +95,7 @@ const Glance& GlanceAt(const std::string& path) {
     kept.time = now;
     // Between two passes a queue file is asked for. That look is not kept, nor the folder before
     // it, and so nothing that was seen before the drain is believed after it.
-    if (Covers(kept.settings->state_root, path)) {
+    if (IsOutside(kept.look.verdict)) {
       kept.time = 0;
       folder = {};
     }
@@ -130,9 +135,9 @@ bool IsDirExist(const std::string& path) {
 bool IsFileExist(const std::string& path) {
   return Uncancelled([&path] {
     const Glance& glance = GlanceAt(path);
-    // What lies in our own state is a queue file: those are regular files or nothing.
+    // What lies in no share is a queue file: those are regular files or nothing.
     return glance.thing == Thing::FILE ||
-           (glance.thing == Thing::LINK && !Covers(glance.settings->state_root, path));
+           (glance.thing == Thing::LINK && !IsOutside(glance.look.verdict));
   });
 }
 

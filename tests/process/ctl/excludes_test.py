@@ -77,6 +77,17 @@ class KeptOutTest(ExcludesTest):
         self.check("a.o", "src/b.o", "src/keep.o", "new.o", "src/build", "only-here")
         self.assertIn(f"{self.root}/src/only-here".encode(), self.dump())
 
+    def test_directories_are_taken_in_again_and_of_files_only_some(self):
+        self.begin("*", "!*/", "!*.txt")
+
+        left_out = ("a.o", "build", "src/b.c", "src/b.o", "src/keep.o")
+        self.check(*left_out)
+        for name in left_out:
+            info = self.ctl("info", f"{self.root}/{name}", "--json").json()
+            self.assertEqual((info["verdict"], info["pattern"]), ("excluded", "*"))
+        info = self.ctl("info", f"{self.root}/src", "--json").json()
+        self.assertEqual((info["verdict"], info["state"]), ("belongs", "current"))
+
     def test_a_walk_does_not_enter_what_is_excluded(self):
         # What cannot be read would be told of; what is not entered is not.
         deep = f"{self.root}/src/build" + "/d" * 50

@@ -2,6 +2,7 @@
 // A comparison in pieces.
 #include <fcntl.h>
 #include <sys/resource.h>
+#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -188,6 +189,17 @@ TEST_F(ComparerTest, EmptyFolderOfAnIndexThatIsNotIsRefused) {
   Commit();
   ASSERT_EQ(unlink(At("other").c_str()), 0);
   EXPECT_TRUE(comparer.Start()) << comparer.Error();
+}
+
+// A new file system makes one of its own.
+TEST_F(ComparerTest, NamesThatArePassedOverFillNoFolder) {
+  WriteFile(At("f"), "");
+  AddAll();
+  ASSERT_EQ(unlink(At("f").c_str()), 0);
+  ASSERT_EQ(mkdir(At("lost+found").c_str(), 0700), 0);
+  Comparer comparer(*store, "s");
+  EXPECT_FALSE(comparer.Start());
+  EXPECT_NE(comparer.Error().find(root), std::string::npos);
 }
 
 TEST_F(ComparerTest, FolderThatIsEmptiedMeanwhileFailsTheComparison) {

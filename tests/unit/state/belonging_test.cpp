@@ -119,6 +119,25 @@ TEST_F(BelongingTest, APatternForDirectoriesAsksTheDisk) {
   EXPECT_EQ(LookPastExcludes(settings, root + "/none").verdict, Verdict::GONE);
 }
 
+TEST_F(BelongingTest, APatternThatTakesInDirectoriesAsksTheDisk) {
+  MakeFile(root + "/file");
+  MakeFile(root + "/d/file");
+  MakeFile(root + "/d/a.txt");
+  std::string error;
+  for (const char* pattern : {"*", "!*/", "!*.txt"}) {
+    ASSERT_TRUE(settings.folders[0].excludes.Add(pattern, error));
+  }
+
+  EXPECT_EQ(At("/d"), Verdict::BELONGS);
+  EXPECT_EQ(At("/d/a.txt"), Verdict::BELONGS);
+  EXPECT_EQ(At("/file"), Verdict::EXCLUDED);
+  EXPECT_EQ(At("/d/file"), Verdict::EXCLUDED);
+  EXPECT_EQ(At("/none"), Verdict::GONE);
+  FolderView folder;
+  EXPECT_EQ(LookNear(settings, root + "/d", folder).verdict, Verdict::BELONGS);
+  EXPECT_EQ(LookNear(settings, root + "/d/file", folder).verdict, Verdict::EXCLUDED);
+}
+
 TEST(JudgeNameTest, EveryVerdictThatLettersCanGive) {
   Settings settings;
   settings.shares = {{"lost+found", "/v/lost+found", ""}, {"s", "/v/s", ""}};

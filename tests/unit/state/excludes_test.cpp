@@ -202,6 +202,20 @@ TEST(ExcludesTest, LengthAndNumberHaveTheirLimits) {
   EXPECT_NE(excludes.KeepOut("x999", Leaf::OTHER).pattern, nullptr);
 }
 
+TEST(ExcludesTest, WhatIsNotKnownToBeAFileIsKeptOutOnlyIfADirectoryIsToo) {
+  const auto is_out = [](const std::vector<std::string>& patterns, const std::string& path) {
+    return Read(patterns).KeepOut(path, Leaf::UNKNOWN).pattern != nullptr;
+  };
+  EXPECT_TRUE(is_out({"x"}, "x"));
+  EXPECT_FALSE(is_out({"x/"}, "x"));
+  EXPECT_TRUE(is_out({"x/"}, "x/y"));
+  EXPECT_FALSE(is_out({"*", "!*/"}, "x"));
+  EXPECT_FALSE(is_out({"*", "!*/"}, "x/y"));
+  EXPECT_TRUE(is_out({"*", "!*/", "x"}, "x"));
+  EXPECT_TRUE(is_out({"*", "!y/"}, "x"));
+  EXPECT_TRUE(is_out({"*", "!y/"}, "x/y"));
+}
+
 // Each of these takes longer than the age of the world where every way to match is tried.
 TEST(ExcludesTest, HostilePatternsCostNoMoreThanTheirLength) {
   std::string stars;

@@ -1,0 +1,62 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Questions about paths on the platform that is shipped.
+#include "platform/paths.h"
+
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "platform/standalone/glance.h"
+#include "state/filesystem.h"
+#include "state/layout.h"
+#include "tests/unit/state/mounts.h"
+
+namespace fileindexd {
+namespace {
+
+namespace fs = std::filesystem;
+
+class PathsTest : public MountTest {
+ protected:
+  // The state's root is named by way of a link.
+  void SetUp() override {
+    MountTest::SetUp();
+    if (IsSkipped()) {
+      return;
+    }
+    MountTmpfs(folder);
+    MakeFile(root + "/d/f");
+    fs::create_directory(folder + "/real");
+    fs::create_directory_symlink(folder + "/real", state_root);
+    const auto store = OpenStore();
+    ASSERT_NE(store, nullptr);
+    ASSERT_TRUE(store->AddShare({"s", root, FilesystemIdentity(root)})) << store->Error();
+    ASSERT_TRUE(store->AddFolder(root, {})) << store->Error();
+    std::string error;
+    ASSERT_TRUE(MakeShareFolder("s", error)) << error;
+  }
+};
+
+TEST_F(PathsTest, AFolderSeenBeforeADrainIsNotBelievedAfterIt) {
+  for (int i = 0; i < 20; ++i) {  // each time within the time that a look is kept for
+    ASSERT_FALSE(TALO::FILEINDEX::IsSkipIndex(root + "/d/f"));
+    fs::rename(root + "/d", root + "/away");
+    fs::create_directory_symlink(root + "/away", root + "/d");
+    EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
+    EXPECT_TRUE(TALO::FILEINDEX::IsSkipIndex(root + "/d/f"));
+
+    fs::remove(root + "/d");
+    fs::rename(root + "/away", root + "/d");
+    EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
+  }
+}
+
+TEST_F(PathsTest, ALinkIsNoQueueFile) {
+  fs::create_symlink(root + "/d/f", QueuePath("s"));
+  EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
+  fs::create_symlink("f", root + "/d/l");
+  EXPECT_TRUE(TALO::FILEINDEX::IsFileExist(root + "/d/l"));
+}
+
+}  // namespace
+}  // namespace fileindexd
