@@ -33,12 +33,21 @@ struct Declarer {
   Command chosen = nullptr;
 };
 
-void AddText(CLI::App* command, const char* name, std::string& value, const char* help) {
-  command
+CLI::Validator NotEmpty() {
+  return CLI::Validator(
+      [](std::string& given) { return given.empty() ? std::string("must not be empty") : ""; }, "");
+}
+
+CLI::Option* AddAnyText(CLI::App* command, const char* name, std::string& value, const char* help) {
+  return command
       ->add_option_function<std::string>(
           name, [&value](const std::string& given) { value = given; }, help)
       ->required()
       ->type_name("");
+}
+
+void AddText(CLI::App* command, const char* name, std::string& value, const char* help) {
+  AddAnyText(command, name, value, help)->check(NotEmpty());
 }
 
 CLI::Option* AddOption(CLI::App* command, const char* name, std::optional<std::string>& value,
@@ -150,7 +159,7 @@ void AddEvents(Declarer& declare) {
       declare.Add(&declare.app, "event", Event, "Append one event line to a share's queue");
   AddText(event, "SHARE", into.share, "The share");
   AddText(event, "CODE", into.code, "A number, decimal or 0x..., or an event's name");
-  AddText(event, "PATH", into.path, "The path that changed, taken as given");
+  AddAnyText(event, "PATH", into.path, "The path that changed, taken as given");
   AddOption(event, "--path-old", into.path_old, "OLD", "The former path, taken as given");
   AddOption(event, "--data", into.data, "JSON", "The event's data");
 }

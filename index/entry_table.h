@@ -60,6 +60,7 @@ class EntryTable {
   int RemoveAll(std::vector<const Entry*> leaving);
 
   uint64_t changes = 0;  // rows changed since Prepare
+  int64_t entries = 0;  // rows, as this transaction sees them
   sqlite3* handle = nullptr;
 
  private:
@@ -71,7 +72,6 @@ class EntryTable {
   Statement find, next, row, below, slice, twins, other_paths;
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
-  int64_t entries = 0;  // rows, as this transaction sees them
   int64_t removed = 0;  // rows since room was last given back, the same
 };
 

@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 //
 //   log     header(32) frame…
-//   header  magic version page-size sequence salt salt checksum checksum    (each 4 bytes,
-//   big-endian) frame   page-number size-after-commit salt salt checksum checksum page  (0: no
-//   commit)
+//   header  magic version page-size sequence salt salt checksum checksum
+//   frame   page-number size-after-commit salt salt checksum checksum page
+//
+// of big-endian numbers of 4 bytes each; a size after a commit of 0: no commit.
 //
 // A frame belongs to the log while its salts are the header's; others are left from before. How far
 // SQLite believes the log stands in the shared memory beside it: a number in the host's own order.

@@ -8,6 +8,7 @@
 
 #include "index/shrink.h"
 #include "index/writer_impl.h"
+#include "state/belonging.h"
 #include "state/layout.h"
 #include "state/queue_writer.h"
 
@@ -153,10 +154,27 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
     }
     changes_begun = table->changes;
   }
+  if (operation.removal && operation.mode == DeleteMode::STALE && operation.path == share->path &&
+      IsEmptied(*settings, *share)) {
+    return IndexError::ROOT;
+  }
   return operation.removal
              ? converger->Delete(*settings, *share, operation.path, operation.mode)
              : converger->Refresh(*settings, *share, operation.path, operation.wanted,
                                   operation.decide, seen != nullptr ? &seen->look : nullptr);
+}
+
+// Whether the share's folder is empty where it was not, and nobody said that this is wanted: what
+// was mounted there may be gone. Single deletions are told of one by one, and believed.
+bool EntryWriter::Impl::IsEmptied(const Settings& settings, const Share& share) {
+  const auto folders =
+      std::count_if(settings.folders.begin(), settings.folders.end(),
+                    [&share](const IndexedFolder& folder) { return folder.share == share.name; });
+  if (table->entries <= folders || !IsRootEmpty(share)) {
+    return false;
+  }
+  ShareStatus status;
+  return !store.GetStatus(share.name, status) || !status.accept_empty;
 }
 
 // Gives the transaction up: whatever failed in it left it half done.

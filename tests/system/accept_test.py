@@ -75,6 +75,11 @@ class Accept(FilesystemTest):
         os.unlink(f"{self.root}/a.txt")
         self.assertEqual(self.share()["root"], "empty")
         self.assertIn(b"share accept alpha", self.ctl("status").out)
+        after = self.log.mark()
+        self.ctl("reindex", self.root)
+        self.await_line("Worker[alpha] finished all task, stopping", after)
+        self.assertEqual(self.dump(), self.before)
+        self.assertEqual(self.share()["root"], "empty")
 
         self.accept()
 

@@ -44,6 +44,9 @@ WRONG = [
     ("status", "--nope"),
     ("info",),
     ("info", "a", "b"),
+    ("info", ""),
+    ("reindex", ""),
+    ("dump", ""),
     ("dump", "a", "b"),
     ("verify", "a", "b"),
 ]

@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // A share whose disk is not there, or is another one.
+#include <filesystem>
+
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -68,6 +70,23 @@ TEST_F(RootTest, OtherDiskInItsPlaceChangesNothing) {
   ExpectAllRefused();
   ExpectRefused(writer->Add(At("a"), {}));
   EXPECT_EQ(Held(), before);
+}
+
+TEST_F(RootTest, ReindexOfAFolderThatIsEmptyWhereItWasNotRemovesNothing) {
+  AddAll();
+  const Names before = Held();
+  for (const auto& left : std::filesystem::directory_iterator(root)) {
+    std::filesystem::remove_all(left.path());
+  }
+
+  ExpectRefused(writer->Delete(root, DeleteMode::STALE));
+  Commit();
+  EXPECT_EQ(Held(), before);
+
+  ASSERT_TRUE(store->UpdateStatus("s", [](ShareStatus& status) { status.accept_empty = true; }));
+  EXPECT_TRUE(writer->Delete(root, DeleteMode::STALE));
+  Commit();
+  EXPECT_LT(Held().size(), before.size());
 }
 
 TEST_F(RootTest, ComparisonOfAnUnmountedShareIsRefused) {

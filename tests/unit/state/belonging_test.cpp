@@ -133,9 +133,9 @@ TEST_F(BelongingTest, APatternThatTakesInDirectoriesAsksTheDisk) {
   EXPECT_EQ(At("/file"), Verdict::EXCLUDED);
   EXPECT_EQ(At("/d/file"), Verdict::EXCLUDED);
   EXPECT_EQ(At("/none"), Verdict::GONE);
-  FolderView folder;
-  EXPECT_EQ(LookNear(settings, root + "/d", folder).verdict, Verdict::BELONGS);
-  EXPECT_EQ(LookNear(settings, root + "/d/file", folder).verdict, Verdict::EXCLUDED);
+  FolderView view;
+  EXPECT_EQ(LookNear(settings, root + "/d", view).verdict, Verdict::BELONGS);
+  EXPECT_EQ(LookNear(settings, root + "/d/file", view).verdict, Verdict::EXCLUDED);
 }
 
 TEST(JudgeNameTest, EveryVerdictThatLettersCanGive) {
