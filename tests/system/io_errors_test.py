@@ -126,13 +126,6 @@ class FullAtTheStart:
 
         self.assert_lives_and_heals()
 
-    def test_after_a_kill(self):
-        self.prepare()
-        self.kill(self.pid)
-        os.unlink(PID_FILE)
-
-        self.assert_lives_and_heals()
-
     def test_first_start_of_all_ends_and_says_why(self):
         os.makedirs(namespace.STATE, exist_ok=True)
         filler = fill(self.state_disk)

@@ -144,7 +144,7 @@ class EventsTest(IndexTest):
         self.assertEqual(self.last()["path"], f"{self.root}/gone/deep")
 
     def test_reindex_outside_every_share(self):
-        for path in (namespace.DATA, "/", "/nowhere", f"{self.root}2", ""):
+        for path in (namespace.DATA, "/", "/nowhere", f"{self.root}2"):
             self.ctl("reindex", path, code=1)
 
     def test_reindex_finds_what_no_event_told(self):

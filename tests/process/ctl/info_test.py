@@ -209,7 +209,7 @@ class UsageTest(InfoTest):
     def test_wrong_usage(self):
         self.ctl("info", code=2)
         self.ctl("info", "/a", "/b", code=2)
-        self.ctl("info", "", code=1)
+        self.ctl("info", "", code=2)
 
 
 if __name__ == "__main__":

@@ -74,7 +74,6 @@ class SharesTest(IndexTest):
             "/",
             "/proc",
             namespace.STATE,
-            "",
         ):
             with self.subTest(path=path):
                 self.ctl("share", "add", "beta", path, code=1)
