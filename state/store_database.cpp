@@ -8,7 +8,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <cstring>
@@ -334,7 +333,7 @@ bool ReadLogHead(const StateConnection& connection, LogHead& head) {
     return false;
   }
   // What was committed before a queue was read is seen by whoever looks here after that.
-  std::atomic_thread_fence(std::memory_order_seq_cst);
+  file->pMethods->xShmBarrier(file);
   const auto* bytes = static_cast<const volatile unsigned char*>(shared);
   std::copy_n(bytes, head.size(), head.begin());
   return true;

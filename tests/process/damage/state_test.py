@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """A state database that was damaged, removed or replaced: its copy is used, or all say what is wrong."""
 
+import contextlib
 import os
 import re
 import shutil
@@ -37,8 +38,12 @@ def truncate(part):
 
 
 def make_full_folder(path):
-    remove(path)
-    os.makedirs(f"{path}/in/its/place")
+    os.makedirs(f"{path}.folder/in/its/place")
+    while True:
+        remove(path)
+        with contextlib.suppress(NotADirectoryError):  # a program has made it anew meanwhile
+            os.rename(f"{path}.folder", path)
+            return
 
 
 def make_pipe(path):
