@@ -60,7 +60,7 @@ class EntryTable {
   int RemoveAll(std::vector<const Entry*> leaving);
 
   uint64_t changes = 0;  // rows changed since Prepare
-  int64_t entries = 0;  // rows, as this transaction sees them
+  int64_t entries = 0;   // rows, as this transaction sees them
   sqlite3* handle = nullptr;
 
  private:
