@@ -10,6 +10,7 @@
 #include <functional>
 
 #include "ctl/output.h"
+#include "index/compare.h"
 #include "index/entry_table.h"
 #include "index/reader.h"
 #include "state/filesystem.h"
@@ -132,16 +133,8 @@ void AskIndex(PathFacts& facts) {
 
 bool IsCurrent(const PathFacts& facts) {
   const Entry& entry = facts.entry;
-  const Look& look = facts.look;
-  if (entry.thing != look.thing || look.thing == Thing::DIRECTORY) {
-    return entry.thing == look.thing;
-  }
-  const bool is_file = look.thing == Thing::FILE;
-  const Kind kind = is_file ? KindOfName(LastComponent(entry.path)) : Kind::OTHER;
-  const bool wanted = is_file && IsContentWanted(entry.kind, facts.folder->wanted);
-  return entry.kind == kind && entry.inode == look.inode && entry.size == look.size &&
-         entry.mtime == look.mtime && entry.birth_time == look.birth_time &&
-         entry.content_wanted == wanted;
+  return !IsStale(entry, facts.look) &&
+         entry.content_wanted == IsContentDue(entry, facts.look, facts.folder->wanted);
 }
 
 Agreement Compare(const PathFacts& facts) {

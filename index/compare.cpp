@@ -21,6 +21,14 @@ namespace {
 
 constexpr uint64_t ROOT_INTERVAL = 500;  // entries found left over, between two looks at the root
 
+// Whether it was said that the share is to be gone on with although its folder is empty.
+bool EmptyIsAccepted(StateStore& store, const std::string& share_name) {
+  ShareStatus status;
+  return store.GetStatus(share_name, status) && status.accept_empty;
+}
+
+}  // namespace
+
 bool IsStale(const Entry& entry, const Look& look) {
   if (entry.thing != look.thing) {
     return true;
@@ -33,13 +41,9 @@ bool IsStale(const Entry& entry, const Look& look) {
          entry.mtime != look.mtime || entry.birth_time != look.birth_time;
 }
 
-// Whether it was said that the share is to be gone on with although its folder is empty.
-bool EmptyIsAccepted(StateStore& store, const std::string& share_name) {
-  ShareStatus status;
-  return store.GetStatus(share_name, status) && status.accept_empty;
+bool IsContentDue(const Entry& entry, const Look& look, const ContentFlags& wanted) {
+  return look.thing == Thing::FILE && IsContentWanted(entry.kind, wanted);
 }
-
-}  // namespace
 
 struct Comparer::Side {
   explicit Side(std::shared_ptr<const Settings> in_force)
@@ -181,9 +185,8 @@ bool Comparer::Step(const Report& report) {
     if (IsStale(*entry, look) && !Tell(report, Difference::STALE, path)) {
       return false;
     }
-    const bool wanted =
-        look.thing == Thing::FILE && IsContentWanted(entry->kind, side->walk.folder->wanted);
-    if (entry->content_wanted != wanted && !Tell(report, Difference::CONTENT, path)) {
+    const bool due = IsContentDue(*entry, look, side->walk.folder->wanted);
+    if (entry->content_wanted != due && !Tell(report, Difference::CONTENT, path)) {
       return false;
     }
   }

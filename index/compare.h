@@ -22,6 +22,11 @@ enum class Difference {
 // "missing", "left-over", "stale", "content".
 const char* DifferenceText(Difference difference);
 
+// Of an entry and what was seen at its path, which belongs: whether they are not the same thing in
+// the same state, and whether its content is wanted under the flags in force.
+bool IsStale(const Entry& entry, const Look& look);
+bool IsContentDue(const Entry& entry, const Look& look, const ContentFlags& wanted);
+
 // One difference, valid during the call that tells of it.
 struct Found {
   Difference difference = Difference::MISSING;
