@@ -166,4 +166,36 @@ TEST_F(CompareTest, WideDirectoryIsReadOverSeveralSlices) {
   EXPECT_EQ(Differences(), Names({"left-over w/500", "missing w/x"}));
 }
 
+TEST(IsStaleTest, EachAttributeOfAFileCountsAlone) {
+  Look look;
+  look.thing = Thing::FILE;
+  look.inode = 7;
+  look.size = 100;
+  look.mtime = 1000;
+  look.birth_time = 500;
+  Entry entry;
+  entry.path = "/s/a.txt";
+  entry.thing = Thing::FILE;
+  entry.kind = Kind::DOCUMENT;
+  entry.inode = 7;
+  entry.size = 100;
+  entry.mtime = 1000;
+  entry.birth_time = 500;
+  EXPECT_FALSE(IsStale(entry, look));
+
+  void (*const changes[])(Entry&) = {
+      [](Entry& changed) { changed.thing = Thing::LINK; },
+      [](Entry& changed) { changed.kind = Kind::PHOTO; },
+      [](Entry& changed) { ++changed.inode; },
+      [](Entry& changed) { ++changed.size; },
+      [](Entry& changed) { ++changed.mtime; },
+      [](Entry& changed) { ++changed.birth_time; },
+  };
+  for (const auto& change : changes) {
+    Entry changed = entry;
+    change(changed);
+    EXPECT_TRUE(IsStale(changed, look)) << &change - changes;
+  }
+}
+
 }  // namespace fileindexd
