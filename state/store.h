@@ -68,6 +68,8 @@ class StateStore {
   // Seconds since the epoch, 0 without end, -1 not paused (as on first use).
   bool GetPause(int64_t& resume_time);
   bool SetPause(int64_t resume_time);
+  // Not paused any more, unless the pause was changed since `resume_time` was read.
+  bool ClearPause(int64_t resume_time);
 
   bool HasMarker(const std::string& marker, bool& has);
   bool SetMarker(const std::string& marker);

@@ -7,6 +7,7 @@ namespace fileindexd {
 namespace {
 
 constexpr const char* PAUSE = "pause";
+constexpr int64_t NOT_PAUSED = -1;
 
 ShareStatus ReadStatus(const Statement& row) {
   ShareStatus status;
@@ -98,7 +99,7 @@ bool StateStore::GetPause(int64_t& resume_time) {
   if (result != SQLITE_ROW && result != SQLITE_DONE) {
     return impl->FailSql();
   }
-  resume_time = result == SQLITE_ROW ? ask.Int(0) : -1;
+  resume_time = result == SQLITE_ROW ? ask.Int(0) : NOT_PAUSED;
   return true;
 }
 
@@ -111,6 +112,30 @@ bool StateStore::SetPause(int64_t resume_time) {
     }
     write.BindText(1, PAUSE);
     write.BindInt(2, resume_time);
+    return impl->Done(impl->Run(write));
+  });
+}
+
+bool StateStore::ClearPause(int64_t resume_time) {
+  const std::lock_guard guard(impl->mutex);
+  return impl->Change([&] {
+    Statement ask;
+    if (!impl->Prepare(ask, "SELECT 1 FROM number WHERE name = ? AND value = ?")) {
+      return Impl::Outcome::FAILED;
+    }
+    ask.BindText(1, PAUSE);
+    ask.BindInt(2, resume_time);
+    const int result = ask.Step();
+    if (result != SQLITE_ROW) {
+      return result == SQLITE_DONE ? Impl::Outcome::UNCHANGED : impl->Done(impl->FailSql());
+    }
+
+    Statement write;
+    if (!impl->Prepare(write, "UPDATE number SET value = ? WHERE name = ?")) {
+      return Impl::Outcome::FAILED;
+    }
+    write.BindInt(1, NOT_PAUSED);
+    write.BindText(2, PAUSE);
     return impl->Done(impl->Run(write));
   });
 }

@@ -204,6 +204,22 @@ TEST_F(StoreTest, PauseAndMarkersOutliveTheStore) {
   EXPECT_TRUE(has);
 }
 
+TEST_F(StoreTest, PauseIsClearedUnlessItWasChangedMeanwhile) {
+  int64_t resume_time = 7;
+  ASSERT_TRUE(store->ClearPause(5));
+  ASSERT_TRUE(store->GetPause(resume_time));
+  EXPECT_EQ(resume_time, -1);
+
+  ASSERT_TRUE(store->SetPause(6));
+  ASSERT_TRUE(store->ClearPause(5));
+  ASSERT_TRUE(store->GetPause(resume_time));
+  EXPECT_EQ(resume_time, 6);
+
+  ASSERT_TRUE(store->ClearPause(6));
+  ASSERT_TRUE(OpenStore()->GetPause(resume_time));
+  EXPECT_EQ(resume_time, -1);
+}
+
 TEST_F(StoreTest, FilesArePrivateWhateverTheUmask) {
   store.reset();
   for (const mode_t mask : {mode_t{0}, mode_t{0777}}) {
