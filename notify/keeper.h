@@ -10,6 +10,7 @@
 // Talking to the daemon may take a minute, so all of it has a thread of its own.
 #pragma once
 
+#include <chrono>
 #include <memory>
 #include <string>
 
@@ -18,7 +19,7 @@ namespace fileindexd {
 // Used by one thread.
 class Keeper {
  public:
-  Keeper();
+  explicit Keeper(std::chrono::milliseconds interval = std::chrono::seconds(15));
   ~Keeper();  // as Stop
   Keeper(const Keeper&) = delete;
   Keeper& operator=(const Keeper&) = delete;

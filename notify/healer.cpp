@@ -1,0 +1,293 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// DESIGN
+//
+//   Request --> waiting --> the thread of its urgency: piece, turn, piece, turn ... --> ended -->
+//   Take
+//
+// Two threads, because a thread that has stepped back to idle priority has no way forward. One
+// comparison works at a time: the idle one stands still between two pieces while there is an urgent
+// one, and goes on where it was. An urgent request for the very share that is compared at idle
+// takes its place, since it looks at everything again.
+#include "notify/healer.h"
+
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <condition_variable>
+#include <ctime>
+#include <mutex>
+#include <utility>
+
+#include "base/scoped_fd.h"
+#include "notify/log.h"
+#include "notify/pressure.h"
+#include "notify/share_comparison.h"
+#include "notify/thread.h"
+
+namespace fileindexd {
+
+namespace {
+
+using std::chrono::milliseconds;
+using Clock = std::chrono::steady_clock;
+
+constexpr milliseconds PAUSE_LOOK(1000);  // between two looks at the stored pause
+constexpr milliseconds END_PATIENCE(900);
+
+// Percent. A comparison raises the pressure itself, above all on a disk that has to seek; one at
+// idle priority thereby keeps to about this share of it.
+constexpr double IDLE_PRESSURE = 40;
+constexpr double NOW_PRESSURE = 70;
+constexpr milliseconds IDLE_BACK_OFF(5000);  // after each piece, at most
+constexpr milliseconds NOW_BACK_OFF(100);    // the same
+constexpr milliseconds PRESSURE_LOOK(500);
+
+struct Asked {
+  std::string share;
+  Urgency urgency = Urgency::NOW;
+};
+
+// What runs on one of the two threads.
+struct Running {
+  std::string share;     // empty: nothing
+  bool dropped = false;  // its outcome is not wanted any more
+};
+
+bool IsPaused(StateStore& store) {
+  int64_t resume_time = -1;
+  return store.GetPause(resume_time) && (resume_time == 0 || resume_time > std::time(nullptr));
+}
+
+// All of it is guarded by the mutex but for the descriptor's number, which never changes. Shared
+// by the healer and its threads.
+struct Shared {
+  Running& Of(Urgency urgency) { return urgency == Urgency::NOW ? now : idle; }
+  bool IsOver(Urgency urgency) { return stopping || Of(urgency).dropped; }
+  bool IsUrgentAsked() const {
+    return !now.share.empty() ||
+           std::any_of(waiting.begin(), waiting.end(),
+                       [](const Asked& asked) { return asked.urgency == Urgency::NOW; });
+  }
+  // The first request that a thread may begin with now.
+  std::vector<Asked>::iterator Next(Urgency urgency);
+
+  void Loop(Urgency urgency);
+  Healing Compare(Urgency urgency, const std::string& share);
+  bool AwaitTurn(Urgency urgency, StateStore& store);
+  void BackOff(Urgency urgency, Clock::duration worked);
+
+  std::mutex mutex;
+  std::condition_variable changed;
+  bool stopping = false;
+  std::vector<Asked> waiting;  // each share at most once
+  Running now;
+  Running idle;
+  std::vector<Healing> ended;
+  ScopedFd ready;  // an event counter; not 0 while there is something in `ended`
+};
+
+std::vector<Asked>::iterator Shared::Next(Urgency urgency) {
+  if (urgency == Urgency::IDLE && IsUrgentAsked()) {
+    return waiting.end();
+  }
+  const Running& other = Of(urgency == Urgency::NOW ? Urgency::IDLE : Urgency::NOW);
+  return std::find_if(waiting.begin(), waiting.end(), [&](const Asked& asked) {
+    return asked.urgency == urgency && asked.share != other.share;
+  });
+}
+
+void Shared::Loop(Urgency urgency) {
+  if (urgency == Urgency::IDLE) {
+    WorkAtIdle();
+  }
+  std::unique_lock lock(mutex);
+  for (;;) {
+    changed.wait(lock, [&] { return stopping || Next(urgency) != waiting.end(); });
+    if (stopping) {
+      return;
+    }
+    const auto next = Next(urgency);
+    Running& running = Of(urgency);
+    running = {std::move(next->share), false};
+    waiting.erase(next);
+    const std::string share = running.share;
+
+    lock.unlock();
+    Healing healing = Compare(urgency, share);
+    lock.lock();
+    if (!IsOver(urgency)) {
+      ended.push_back(std::move(healing));
+      (void)eventfd_write(ready.fd, 1);  // fails only beyond 2^64 - 2
+    }
+    running = {};
+    changed.notify_all();
+  }
+}
+
+// What it returns means nothing once IsOver.
+Healing Shared::Compare(Urgency urgency, const std::string& share) {
+  std::string error;
+  const std::unique_ptr<StateStore> store = StateStore::Open(error);
+  if (store == nullptr) {
+    Healing failed;
+    failed.share = share;
+    failed.error = error;
+    failed.began = failed.ended = std::time(nullptr);
+    return failed;
+  }
+
+  ShareComparison comparison(*store, share);
+  while (AwaitTurn(urgency, *store)) {
+    const Clock::time_point began = Clock::now();
+    if (!comparison.GoOn()) {
+      break;
+    }
+    BackOff(urgency, Clock::now() - began);
+  }
+  return std::move(comparison.healing);
+}
+
+// Waits until the comparison may go on; false when it is to end.
+bool Shared::AwaitTurn(Urgency urgency, StateStore& store) {
+  std::unique_lock lock(mutex);
+  while (!IsOver(urgency)) {
+    if (urgency == Urgency::IDLE && IsUrgentAsked()) {
+      changed.wait(lock);
+      continue;
+    }
+
+    lock.unlock();
+    const bool paused = IsPaused(store);
+    lock.lock();
+    if (!paused) {
+      return !IsOver(urgency);
+    }
+    changed.wait_for(lock, PAUSE_LOOK, [&] { return IsOver(urgency); });
+  }
+  return false;
+}
+
+void Shared::BackOff(Urgency urgency, Clock::duration worked) {
+  const bool is_idle = urgency == Urgency::IDLE;
+  const Clock::duration most =
+      is_idle ? Clock::duration(IDLE_BACK_OFF) : std::min<Clock::duration>(worked, NOW_BACK_OFF);
+  const Clock::time_point deadline = Clock::now() + most;
+  while (Clock::now() < deadline && ReadPressure() > (is_idle ? IDLE_PRESSURE : NOW_PRESSURE)) {
+    std::unique_lock lock(mutex);
+    const auto until = std::min(deadline, Clock::now() + PRESSURE_LOOK);
+    // An idle one that has to give way has backed off enough.
+    if (changed.wait_until(lock, until,
+                           [&] { return IsOver(urgency) || (is_idle && IsUrgentAsked()); })) {
+      return;
+    }
+  }
+}
+
+}  // namespace
+
+struct Healer::Impl {
+  std::shared_ptr<Shared> shared = std::make_shared<Shared>();
+  LooseThread now;
+  LooseThread idle;
+};
+
+Healer::Healer() : impl(std::make_unique<Impl>()) {
+  impl->shared->ready.fd = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
+}
+
+Healer::~Healer() {
+  Stop();
+}
+
+bool Healer::Start() {
+  const std::shared_ptr<Shared> shared = impl->shared;
+  if (shared->ready.fd < 0) {
+    return false;
+  }
+  if (impl->now.Start([shared] { shared->Loop(Urgency::NOW); }) &&
+      impl->idle.Start([shared] { shared->Loop(Urgency::IDLE); })) {
+    return true;
+  }
+
+  const int reason = errno;
+  Stop();
+  errno = reason;
+  return false;
+}
+
+void Healer::Stop() {
+  const Clock::time_point deadline = Clock::now() + END_PATIENCE;
+  {
+    const std::lock_guard guard(impl->shared->mutex);
+    impl->shared->stopping = true;
+  }
+  impl->shared->changed.notify_all();
+  for (LooseThread* thread : {&impl->now, &impl->idle}) {
+    thread->End(std::chrono::duration_cast<milliseconds>(deadline - Clock::now()));
+  }
+}
+
+void Healer::Request(const std::string& share, Urgency urgency) {
+  Shared& shared = *impl->shared;
+  {
+    const std::lock_guard guard(shared.mutex);
+    const auto asked = std::find_if(shared.waiting.begin(), shared.waiting.end(),
+                                    [&](const Asked& known) { return known.share == share; });
+    if (asked == shared.waiting.end()) {
+      shared.waiting.push_back({share, urgency});
+    } else if (urgency == Urgency::NOW) {
+      asked->urgency = urgency;
+    }
+    if (urgency == Urgency::NOW && shared.idle.share == share) {
+      shared.idle.dropped = true;
+    }
+  }
+  shared.changed.notify_all();
+}
+
+void Healer::Forget(const std::string& share) {
+  Shared& shared = *impl->shared;
+  {
+    const std::lock_guard guard(shared.mutex);
+    std::erase_if(shared.waiting, [&](const Asked& asked) { return asked.share == share; });
+    std::erase_if(shared.ended, [&](const Healing& healing) { return healing.share == share; });
+    for (Running* running : {&shared.now, &shared.idle}) {
+      running->dropped = running->dropped || running->share == share;
+    }
+    if (shared.ended.empty()) {
+      eventfd_t count = 0;
+      (void)eventfd_read(shared.ready.fd, &count);  // it may be 0 already
+    }
+  }
+  shared.changed.notify_all();
+}
+
+bool Healer::IsPending(const std::string& share) const {
+  Shared& shared = *impl->shared;
+  const std::lock_guard guard(shared.mutex);
+  const auto runs = [&](const Running& running) {
+    return running.share == share && !running.dropped;
+  };
+  return runs(shared.now) || runs(shared.idle) ||
+         std::any_of(shared.waiting.begin(), shared.waiting.end(),
+                     [&](const Asked& asked) { return asked.share == share; }) ||
+         std::any_of(shared.ended.begin(), shared.ended.end(),
+                     [&](const Healing& healing) { return healing.share == share; });
+}
+
+std::vector<Healing> Healer::Take() {
+  Shared& shared = *impl->shared;
+  const std::lock_guard guard(shared.mutex);
+  eventfd_t count = 0;
+  (void)eventfd_read(shared.ready.fd, &count);  // 0: nothing has ended
+  return std::exchange(shared.ended, {});
+}
+
+int Healer::Descriptor() const {
+  return impl->shared->ready.fd;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,100 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "notify/share_comparison.h"
+
+#include <algorithm>
+#include <ctime>
+
+#include "notify/log.h"
+
+namespace fileindexd {
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+constexpr size_t LINES_KEPT = 20000;
+// How many paths a tenth of a second is good for depends on the disk, and on what is cached.
+constexpr std::chrono::milliseconds PIECE_TIME(100);
+constexpr uint64_t FIRST_PIECE = 500;
+constexpr uint64_t LONGEST_PIECE = 5000;
+constexpr uint64_t SHORTEST_PIECE = 20;
+
+}  // namespace
+
+ShareComparison::ShareComparison(StateStore& state, const std::string& share_name)
+    : store(state),
+      comparer(state, share_name),
+      progress(ComparisonProgressPath(share_name)),
+      piece(FIRST_PIECE) {
+  healing.share = share_name;
+  healing.began = std::time(nullptr);
+}
+
+bool ShareComparison::Fail(const std::string& why) {
+  healing.error = why;
+  Finish();
+  return false;
+}
+
+void ShareComparison::Finish() {
+  progress.End();
+  healing.counts = comparer.counts;
+  healing.ended = std::time(nullptr);
+}
+
+bool ShareComparison::Begin() {
+  if (!comparer.Start()) {
+    return Fail(comparer.Error());
+  }
+  if (!store.GetSettings(settings)) {
+    return Fail(store.Error());
+  }
+  const Share* share = settings->ShareByName(healing.share);
+  if (share == nullptr) {
+    return Fail("no such share: " + healing.share);
+  }
+
+  (void)reader.Open(healing.share);  // an index that is not there has nothing to count
+  repair = std::make_unique<Repair>(*settings, *share, reader, LINES_KEPT);
+  progress.Begin(Work::COMPARISON, comparer.Estimate());
+  return true;
+}
+
+bool ShareComparison::GoOn() {
+  if (repair == nullptr && !Begin()) {
+    return false;
+  }
+
+  const uint64_t before = comparer.counts.compared;
+  const Clock::time_point began = Clock::now();
+  const Comparer::Result result = comparer.Run(
+      [this](const Found& found) {
+        mended = repair->Add(found) && mended;
+        return true;
+      },
+      piece);
+  if (result == Comparer::Result::FAILED) {
+    return Fail(comparer.Error());
+  }
+  if (result == Comparer::Result::STOPPED) {
+    const Clock::duration took = Clock::now() - began;
+    if (took > PIECE_TIME * 2) {
+      piece = std::max(piece / 2, SHORTEST_PIECE);
+    } else if (took < PIECE_TIME / 2) {
+      piece = std::min(piece * 2, LONGEST_PIECE);
+    }
+    progress.record.total = comparer.Estimate();
+    progress.Count(comparer.counts.compared - before);
+    return true;
+  }
+
+  if (!mended) {
+    LogError("share %s: the index holds entries from outside the share", healing.share.c_str());
+  }
+  healing.lines = repair->Lines(LINES_KEPT);
+  healing.done = true;
+  Finish();
+  return false;
+}
+
+}  // namespace fileindexd
