@@ -7,7 +7,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "search/instance.h"
+#include "search/service.h"
 
 namespace fileindexd {
 

@@ -12,8 +12,9 @@
 #include <exception>
 
 #include "search/follower.h"
-#include "search/instance.h"
 #include "search/log.h"
+#include "search/service.h"
+#include "state/instance.h"
 
 namespace fileindexd {
 
@@ -93,7 +94,7 @@ int Serve() {
     return Complain(std::string("signals: ") + strerror(errno));
   }
 
-  Instance instance;
+  Instance instance(SERVICE_PROGRAM, SERVICE_PID_FILE, SERVICE_LOCK_FILE);
   Follower follower;
   std::string error;
   if (!instance.Claim(error) || !follower.Start(error) || !instance.Announce(error)) {

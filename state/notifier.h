@@ -27,6 +27,7 @@ namespace fileindexd {
 constexpr const char* NOTIFIER_PROGRAM = "fileindex-notifyd";
 constexpr const char* NOTIFIER_SOCKET = "/var/run/fileindex-notifyd.sock";
 constexpr const char* NOTIFIER_PID_FILE = "/var/run/fileindex-notifyd.pid";
+constexpr const char* NOTIFIER_LOCK_FILE = "/var/run/fileindex-notifyd.lock";
 
 enum class NotifierReply {
   ANSWERED,

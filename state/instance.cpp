@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include "search/instance.h"
+#include "state/instance.h"
 
 #include <fcntl.h>
 #include <sys/file.h>
@@ -7,32 +7,35 @@
 
 #include <cerrno>
 #include <cstring>
+#include <utility>
 
 #include "state/pid_file.h"
 
 namespace fileindexd {
 
+Instance::Instance(std::string name, std::string pids, std::string locks)
+    : program(std::move(name)), pid_file(std::move(pids)), lock_file(std::move(locks)) {}
+
 Instance::~Instance() {
   if (announced) {
-    (void)unlink(SERVICE_PID_FILE);  // whoever starts next replaces it anyway
+    (void)unlink(pid_file.c_str());  // whoever starts next replaces it anyway
   }
 }
 
 bool Instance::Claim(std::string& error) {
-  ScopedFd opened(open(SERVICE_LOCK_FILE, O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
+  ScopedFd opened(open(lock_file.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
   if (opened.fd < 0) {
-    error = std::string(SERVICE_LOCK_FILE) + ": " + strerror(errno);
+    error = lock_file + ": " + strerror(errno);
     return false;
   }
 
   if (flock(opened.fd, LOCK_EX | LOCK_NB) != 0) {
-    error = errno == EWOULDBLOCK ? "another instance runs"
-                                 : std::string(SERVICE_LOCK_FILE) + ": " + strerror(errno);
+    error = errno == EWOULDBLOCK ? "another instance runs" : lock_file + ": " + strerror(errno);
     return false;
   }
 
   // Somebody may have removed the lock file from under a running instance.
-  const pid_t alive = AliveByPidFile(SERVICE_PID_FILE, SERVICE_PROGRAM);
+  const pid_t alive = AliveByPidFile(pid_file, program);
   if (alive > 0 && alive != getpid()) {
     error = "another instance runs, pid " + std::to_string(alive);
     return false;
@@ -43,8 +46,8 @@ bool Instance::Claim(std::string& error) {
 }
 
 bool Instance::Announce(std::string& error) {
-  if (!WritePidFile(SERVICE_PID_FILE)) {
-    error = std::string(SERVICE_PID_FILE) + ": " + strerror(errno);
+  if (!WritePidFile(pid_file)) {
+    error = pid_file + ": " + strerror(errno);
     return false;
   }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// One content service at a time.
+// One process of a service at a time.
 //
 // The lock decides: it is held for the life of the process, so of two simultaneous starts one goes
 // on, and a pid file left by a kill stops nobody. The pid file tells others whom to ask to end. The
@@ -13,13 +13,10 @@
 
 namespace fileindexd {
 
-constexpr const char* SERVICE_PROGRAM = "talocontentsearchd";
-constexpr const char* SERVICE_PID_FILE = "/var/run/talocontentsearchd.pid";
-constexpr const char* SERVICE_LOCK_FILE = "/var/run/talocontentsearchd.lock";
-
 class Instance {
  public:
-  Instance() = default;
+  // `program` is the name of the service's executable.
+  Instance(std::string program, std::string pid_file, std::string lock_file);
   Instance(const Instance&) = delete;
   Instance& operator=(const Instance&) = delete;
   ~Instance();  // removes the pid file if this process wrote it, then lets go of the lock
@@ -29,6 +26,9 @@ class Instance {
   // Tells the world that the service runs. After Claim.
   bool Announce(std::string& error);
 
+  const std::string program;
+  const std::string pid_file;
+  const std::string lock_file;
   ScopedFd lock;
   bool announced = false;
 };
