@@ -162,10 +162,11 @@ bool Shared::AwaitTurn(Urgency urgency, StateStore& store) {
     lock.unlock();
     const bool paused = IsPaused(store);
     lock.lock();
-    if (!paused) {
+    if (paused) {
+      changed.wait_for(lock, PAUSE_LOOK, [&] { return IsOver(urgency); });
+    } else if (urgency == Urgency::NOW || !IsUrgentAsked()) {
       return !IsOver(urgency);
     }
-    changed.wait_for(lock, PAUSE_LOOK, [&] { return IsOver(urgency); });
   }
   return false;
 }

@@ -67,11 +67,6 @@ std::string Command(const std::string& type, const std::string& data) {
   return "{\"type\":" + JsonText(type) + ",\"data\":{" + data + "}}";
 }
 
-const char* ReplyTrouble(Reply reply) {
-  return reply == Reply::REFUSED ? "the daemon could not do it, its log tells why"
-                                 : "the daemon does not answer";
-}
-
 }  // namespace
 
 // The same trouble comes every 15 s.
@@ -80,6 +75,20 @@ void KeeperRound::Tell(std::string& told, const std::string& what) {
     LogError("%s", what.c_str());
   }
   told = what;
+}
+
+// Empty also for a reply that was not waited for.
+std::string KeeperRound::Trouble(Reply reply) const {
+  switch (reply) {
+    case Reply::DONE:
+    case Reply::NOT_RUNNING:
+      break;
+    case Reply::REFUSED:
+      return "the daemon could not do it, its log tells why";
+    case Reply::NO_ANSWER:
+      return daemon.wait(std::chrono::milliseconds(0)) ? "the daemon does not answer" : "";
+  }
+  return {};
 }
 
 void KeeperRound::Touch(const std::string& share, Kept& kept) {
@@ -99,9 +108,8 @@ void KeeperRound::AskForWorker(const Settings& settings, const Share& share, int
   kept.rounds = 0;
   const Reply reply =
       daemon.send(Command("upsert_folder_setting", "\"folder_path\":" + JsonText(folder->path)));
-  const bool failed = reply == Reply::REFUSED || reply == Reply::NO_ANSWER;
   Tell(kept.ask_trouble,
-       failed ? "share " + share.name + ": no worker: " + ReplyTrouble(reply) : "");
+       Trouble(reply).empty() ? "" : "share " + share.name + ": no worker: " + Trouble(reply));
   if (reply == Reply::DONE) {
     LogInfo("share %s: the daemon was asked for a worker", share.name.c_str());
   }
@@ -224,8 +232,8 @@ void KeeperRound::EndPause(int64_t now) {
     Reply reply = Reply::DONE;
     const bool sent = SendResume(resume_time, reply) && daemon.wait(BETWEEN_RESUMES) &&
                       SendResume(resume_time, reply);
-    if (reply == Reply::REFUSED || reply == Reply::NO_ANSWER) {
-      Tell(pause_trouble, std::string("resume: ") + ReplyTrouble(reply));
+    if (!Trouble(reply).empty()) {
+      Tell(pause_trouble, "resume: " + Trouble(reply));
     }
     if (!sent) {
       return;

@@ -58,6 +58,7 @@ class KeeperRound {
   void EndPause(int64_t now);
   bool SendResume(int64_t resume_time, Reply& reply);
   void RestorePause(int64_t resume_time);
+  std::string Trouble(Reply reply) const;
   void Tell(std::string& told, const std::string& trouble);
 
   StateStore& store;

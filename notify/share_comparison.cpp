@@ -57,6 +57,7 @@ bool ShareComparison::Begin() {
   (void)reader.Open(healing.share);  // an index that is not there has nothing to count
   repair = std::make_unique<Repair>(*settings, *share, reader, LINES_KEPT);
   progress.Begin(Work::COMPARISON, comparer.Estimate());
+  progress.Write();  // at once: it may stand still in a pause, or behind an urgent one
   return true;
 }
 
