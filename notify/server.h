@@ -8,13 +8,9 @@
 #include <string>
 #include <vector>
 
-namespace fileindexd {
+#include "notify/request.h"
 
-struct Request {
-  uint64_t client = 0;
-  enum class Type { STATUS, SYNC } type = Type::STATUS;
-  std::vector<std::string> shares;  // of SYNC; none: all
-};
+namespace fileindexd {
 
 // One thread.
 class Server {
@@ -30,8 +26,8 @@ class Server {
   // Readable when Serve has something to do; an epoll descriptor over all clients.
   int Descriptor() const;
   // Takes in what clients sent; complete requests that make sense are returned, others are answered
-  // with what is wrong. At most 64 clients; one that does not send its request within 5 s is
-  // dropped when another needs its place.
+  // with what is wrong. At most 64 clients; one that does not send its request within 5 s, or takes
+  // nothing of its answer for as long, is dropped when another needs its place.
   std::vector<Request> Serve();
 
   // Answers, with one JSON object on one line, and hangs up. One that has gone is passed over.
