@@ -96,7 +96,7 @@ Record Parsed(fanotify_event_metadata& metadata) {
 }  // namespace
 
 struct FanGroup::Impl {
-  ScopedFd mount;
+  PrivateMount whole;
   ScopedFd group;
   bool overflown = false;
   std::vector<uint64_t> buffer = std::vector<uint64_t>(BUFFER_SIZE / sizeof(uint64_t));
@@ -120,18 +120,18 @@ bool FanGroup::Impl::Open(const Mount& mount_of_it, std::string& error) {
     error = Reason("fanotify_init");
     return false;
   }
-  if (!MakePrivateMount(mount_of_it, mount, error) || !HandleNames::Work(mount.fd, error)) {
+  if (!MakePrivateMount(mount_of_it, whole, error) || !HandleNames::Work(whole.root.fd, error)) {
     return false;
   }
   constexpr unsigned MARK = FAN_MARK_ADD | FAN_MARK_FILESYSTEM;
-  if (fanotify_mark(opened.fd, MARK, ALWAYS | RENAME, mount.fd, ".") != 0 &&
+  if (fanotify_mark(opened.fd, MARK, ALWAYS | RENAME, whole.root.fd, ".") != 0 &&
       (errno != EINVAL ||
-       fanotify_mark(opened.fd, MARK, ALWAYS | RENAME_ENDS, mount.fd, ".") != 0)) {
+       fanotify_mark(opened.fd, MARK, ALWAYS | RENAME_ENDS, whole.root.fd, ".") != 0)) {
     error = Reason("fanotify_mark");
     return false;
   }
   group.Swap(opened);
-  names = HandleNames(mount.fd);
+  names = HandleNames(whole.root.fd);
   return true;
 }
 

@@ -137,16 +137,24 @@ bool MakeUnchecked(const Mount& mount, ScopedFd& made, std::string& error) {
 
 }  // namespace
 
-bool MakePrivateMount(const Mount& mount, ScopedFd& made, std::string& error) {
+bool MakePrivateMount(const Mount& mount, PrivateMount& made, std::string& error) {
   ScopedFd unchecked;
-  if (!MakeUnchecked(mount, unchecked, error)) {
+  std::string last;  // also of attempts before the one that worked
+  if (!MakeUnchecked(mount, unchecked, last)) {
+    error = last;
     return false;
   }
-  if (!ShowsFilesystemOf(unchecked.fd, mount)) {
+  ScopedFd root(openat(unchecked.fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (root.fd < 0) {
+    error = Reason("open the root of " + mount.source);
+    return false;
+  }
+  if (!ShowsFilesystemOf(root.fd, mount)) {
     error = "fstat: the mount of the whole shows another file system than " + mount.point;
     return false;
   }
-  made.Swap(unchecked);
+  made.mount.Swap(unchecked);
+  made.root.Swap(root);
   return true;
 }
 

@@ -13,10 +13,15 @@
 
 namespace fileindexd {
 
+// While it lives the file system stays in use.
+struct PrivateMount {
+  ScopedFd mount;  // with O_PATH
+  ScopedFd root;   // its root, open for reading: handles are not resolved through O_PATH
+};
+
 // Of the file system that `mount` shows: a copy of a mount of all of it, or, where there is none
-// and the file system lies on a block device, a new one. Nothing can be written through it. It is
-// gone when `made` is closed; until then the file system stays in use. False, and `error` then
-// names the call and the reason. Needs CAP_SYS_ADMIN.
-bool MakePrivateMount(const Mount& mount, ScopedFd& made, std::string& error);
+// and the file system lies on a block device, a new one. Nothing can be written through it. False,
+// and `error` then names the call and the reason. Needs CAP_SYS_ADMIN.
+bool MakePrivateMount(const Mount& mount, PrivateMount& made, std::string& error);
 
 }  // namespace fileindexd
