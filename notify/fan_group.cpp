@@ -1,0 +1,249 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+//
+// DESIGN. A record names a thing by the handle of its directory and its name there; a rename has
+// two such pairs. What the thing itself is (its handle) is not asked for: the path is looked at
+// anyway, and records are half the size without. Names of directories are those of the moment at
+// which their handle is first met in a buffer, and hold for that buffer.
+#include "notify/fan_group.h"
+
+#include <sys/fanotify.h>
+#include <sys/ioctl.h>
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <vector>
+
+#include "notify/handle_names.h"
+#include "notify/private_mount.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t BUFFER_SIZE = 256 * 1024;
+constexpr uint64_t ALWAYS =
+    FAN_CREATE | FAN_CLOSE_WRITE | FAN_MODIFY | FAN_ATTRIB | FAN_DELETE | FAN_ONDIR;
+// Since Linux 5.17; before, the two ends of a rename are told apart.
+constexpr uint64_t RENAME = FAN_RENAME;
+constexpr uint64_t RENAME_ENDS = FAN_MOVED_FROM | FAN_MOVED_TO;
+
+std::string Reason(const char* call) {
+  return std::string(call) + ": " + strerror(errno);  // NOLINT: glibc's is safe
+}
+
+// Some of these can be marked, and tell of what is done on this machine alone.
+bool IsChangedElsewhere(const std::string& type) {
+  constexpr std::array<std::string_view, 16> SHARED = {
+      "9p",   "afs",    "beegfs", "ceph", "cifs", "fuse",  "fuseblk", "gfs2",
+      "gpfs", "lustre", "ncpfs",  "nfs",  "nfs4", "ocfs2", "smb3",    "virtiofs"};
+  if (type.starts_with("fuse.")) {
+    return true;
+  }
+  for (const std::string_view shared : SHARED) {
+    if (type == shared) {
+      return true;
+    }
+  }
+  return false;
+}
+
+uint32_t HappeningsOf(uint64_t mask) {
+  constexpr std::pair<uint64_t, uint32_t> BITS[] = {
+      {FAN_CREATE, CREATED},      {FAN_MODIFY, MODIFIED}, {FAN_ATTRIB, ATTRIBUTES},
+      {FAN_CLOSE_WRITE, WRITTEN}, {FAN_DELETE, DELETED},  {FAN_MOVED_FROM, MOVED_FROM},
+      {FAN_MOVED_TO, MOVED_TO}};
+  uint32_t what = 0;
+  for (const auto& [bit, happening] : BITS) {
+    what |= (mask & bit) != 0 ? happening : 0;
+  }
+  return what;
+}
+
+// One record. The names lie in the buffer; null where the record has none.
+struct Record {
+  struct Place {
+    file_handle* directory = nullptr;
+    const char* name = nullptr;
+  };
+  uint64_t mask = 0;
+  Place place;
+  Place before;  // of a rename
+};
+
+Record Parsed(fanotify_event_metadata& metadata) {
+  Record record;
+  record.mask = metadata.mask;
+  char* at = reinterpret_cast<char*>(&metadata) + metadata.metadata_len;
+  char* const end = reinterpret_cast<char*>(&metadata) + metadata.event_len;
+  while (end - at >=
+         static_cast<ptrdiff_t>(sizeof(fanotify_event_info_fid) + sizeof(file_handle))) {
+    auto* info = reinterpret_cast<fanotify_event_info_fid*>(at);
+    auto* handle = reinterpret_cast<file_handle*>(info->handle);
+    const Record::Place place{
+        handle, reinterpret_cast<const char*>(handle->f_handle) + handle->handle_bytes};
+    if (info->hdr.info_type == FAN_EVENT_INFO_TYPE_OLD_DFID_NAME) {
+      record.before = place;
+    } else if (info->hdr.info_type == FAN_EVENT_INFO_TYPE_DFID_NAME ||
+               info->hdr.info_type == FAN_EVENT_INFO_TYPE_NEW_DFID_NAME) {
+      record.place = place;
+    }
+    at += info->hdr.len;
+  }
+  return record;
+}
+
+}  // namespace
+
+struct FanGroup::Impl {
+  PrivateMount whole;
+  ScopedFd group;
+  bool overflown = false;
+  std::vector<uint64_t> buffer = std::vector<uint64_t>(BUFFER_SIZE / sizeof(uint64_t));
+  HandleNames names{-1};
+  Change change;  // kept for its memory
+
+  bool Open(const Mount& mount_of_it, std::string& error);
+  void Tell(const Record& record, const TellChange& tell);
+  HandleNames::Result PathOf(const Record::Place& place, std::string& path);
+  void TellOf(uint32_t what, const TellChange& tell);
+};
+
+bool FanGroup::Impl::Open(const Mount& mount_of_it, std::string& error) {
+  if (IsChangedElsewhere(mount_of_it.type)) {
+    error = "fanotify_mark: " + mount_of_it.type + " does not tell of changes made elsewhere";
+    return false;
+  }
+  ScopedFd opened(fanotify_init(FAN_CLASS_NOTIF | FAN_REPORT_DFID_NAME | FAN_CLOEXEC | FAN_NONBLOCK,
+                                O_RDONLY | O_CLOEXEC));
+  if (opened.fd < 0) {
+    error = Reason("fanotify_init");
+    return false;
+  }
+  if (!MakePrivateMount(mount_of_it, whole, error) || !HandleNames::Work(whole.root.fd, error)) {
+    return false;
+  }
+  constexpr unsigned MARK = FAN_MARK_ADD | FAN_MARK_FILESYSTEM;
+  if (fanotify_mark(opened.fd, MARK, ALWAYS | RENAME, whole.root.fd, ".") != 0 &&
+      (errno != EINVAL ||
+       fanotify_mark(opened.fd, MARK, ALWAYS | RENAME_ENDS, whole.root.fd, ".") != 0)) {
+    error = Reason("fanotify_mark");
+    return false;
+  }
+  group.Swap(opened);
+  names = HandleNames(whole.root.fd);
+  return true;
+}
+
+// The path of a record's thing. TOO_LONG: `path` is that of a directory above it.
+HandleNames::Result FanGroup::Impl::PathOf(const Record::Place& place, std::string& path) {
+  path.clear();
+  if (place.directory == nullptr) {
+    return HandleNames::Result::GONE;
+  }
+  const HandleNames::Name& directory = names.Find(*place.directory);
+  if (directory.result == HandleNames::Result::FAILED) {
+    overflown = true;  // something has changed, and nobody can say where
+    return directory.result;
+  }
+  path = directory.path;
+  if (directory.result != HandleNames::Result::NAMED) {
+    return directory.result;
+  }
+  const std::string_view name(place.name);
+  if (name != ".") {  // which is the directory itself
+    if (path != "/") {
+      path += '/';
+    }
+    path += name;
+  }
+  return directory.result;
+}
+
+void FanGroup::Impl::TellOf(uint32_t what, const TellChange& tell) {
+  change.what = what;
+  tell(change);
+}
+
+void FanGroup::Impl::Tell(const Record& record, const TellChange& tell) {
+  using Result = HandleNames::Result;
+  if ((record.mask & FAN_Q_OVERFLOW) != 0) {
+    overflown = true;
+    return;
+  }
+
+  change.directory = (record.mask & FAN_ONDIR) != 0;
+  change.from.clear();
+  const bool renamed = (record.mask & RENAME) != 0;
+  const Result former = renamed ? PathOf(record.before, change.from) : Result::GONE;
+  const Result result = PathOf(record.place, change.path);
+  const uint32_t more = HappeningsOf(record.mask);
+  if (result == Result::NAMED && (!renamed || former == Result::NAMED || former == Result::GONE)) {
+    TellOf(more | (renamed ? MOVED_TO : 0U), tell);
+    return;
+  }
+
+  // One end cannot be named exactly. What is below a name that is too long has no name either: a
+  // directory above it is told as one that has just come, which has all in it looked at.
+  const std::string from = change.from;
+  const std::string to = change.path;
+  change.from.clear();
+  if (result == Result::NAMED) {
+    TellOf(more | MOVED_TO, tell);
+  } else if (former == Result::NAMED) {
+    change.path = from;
+    TellOf(MOVED_FROM, tell);
+  }
+  change.directory = true;
+  for (const auto& [end, path] : {std::pair(former, from), std::pair(result, to)}) {
+    if (end == Result::TOO_LONG) {
+      change.path = path;
+      TellOf(CREATED, tell);
+    }
+  }
+}
+
+std::unique_ptr<FanGroup> FanGroup::Open(const Mount& mount, std::string& error) {
+  auto opened = std::make_unique<Impl>();
+  if (!opened->Open(mount, error)) {
+    return nullptr;
+  }
+  return std::unique_ptr<FanGroup>(new FanGroup(std::move(opened)));
+}
+
+FanGroup::FanGroup(std::unique_ptr<Impl> opened) : impl(std::move(opened)) {}
+FanGroup::~FanGroup() = default;
+
+FanGroup::Result FanGroup::Read(const TellChange& tell) {
+  const ssize_t got = read(impl->group.fd, impl->buffer.data(), BUFFER_SIZE);
+  if (got < 0) {
+    return errno == EAGAIN ? Result::EMPTY : errno == EINTR ? Result::MORE : Result::FAILED;
+  }
+
+  impl->names.Forget();
+  auto left = static_cast<size_t>(got);
+  auto* metadata = reinterpret_cast<fanotify_event_metadata*>(impl->buffer.data());
+  for (; FAN_EVENT_OK(metadata, left); metadata = FAN_EVENT_NEXT(metadata, left)) {
+    if (metadata->vers != FANOTIFY_METADATA_VERSION) {
+      errno = EPROTO;
+      return Result::FAILED;
+    }
+    impl->Tell(Parsed(*metadata), tell);
+  }
+  return Result::MORE;
+}
+
+bool FanGroup::TakeOverflow() {
+  return std::exchange(impl->overflown, false);
+}
+
+size_t FanGroup::Waiting() const {
+  int bytes = 0;
+  return ioctl(impl->group.fd, FIONREAD, &bytes) == 0 ? static_cast<size_t>(bytes) : 0;
+}
+
+int FanGroup::Descriptor() const {
+  return impl->group.fd;
+}
+
+}  // namespace fileindexd
