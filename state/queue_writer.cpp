@@ -61,13 +61,28 @@ bool OpenQueue(const std::string& path, ScopedFd& queue, std::string& error) {
   }
 }
 
+enum class Lock { TAKEN, HELD, FAILED };
+
+Lock TakeLock(const ScopedFd& queue, const std::string& path, std::string& error) {
+  while (flock(queue.fd, LOCK_EX | LOCK_NB) != 0) {
+    if (errno == EWOULDBLOCK) {
+      return Lock::HELD;
+    }
+    if (errno != EINTR) {
+      error = Reason("lock", path);
+      return Lock::FAILED;
+    }
+  }
+  return Lock::TAKEN;
+}
+
 bool WaitForLock(const ScopedFd& queue, const std::string& path, Clock::time_point deadline,
                  std::string& error) {
   auto nap = FIRST_NAP;
-  while (flock(queue.fd, LOCK_EX | LOCK_NB) != 0) {
-    if (errno != EWOULDBLOCK && errno != EINTR) {
-      error = Reason("lock", path);
-      return false;
+  for (;;) {
+    const Lock lock = TakeLock(queue, path, error);
+    if (lock != Lock::HELD) {
+      return lock == Lock::TAKEN;
     }
     if (Clock::now() >= deadline) {
       error = "cannot lock " + path + ": another program holds it";
@@ -76,7 +91,6 @@ bool WaitForLock(const ScopedFd& queue, const std::string& path, Clock::time_poi
     std::this_thread::sleep_for(nap);
     nap = std::min(nap * 2, LONGEST_NAP);
   }
-  return true;
 }
 
 // Opens the queue file and takes its lock; `size` is then its length in bytes.
@@ -248,6 +262,13 @@ bool AppendToQueue(const std::string& share_name, const std::vector<std::string>
 bool AppendToQueueDurably(const std::string& share_name, const std::vector<std::string>& lines,
                           std::string& error) {
   return Append(share_name, lines, Durability::SYNCED, error);
+}
+
+bool TouchQueue(const std::string& share_name, std::string& error) {
+  const std::string path = QueuePath(share_name);
+  ScopedFd queue;
+  return MakeShareFolder(share_name, error) && OpenQueue(path, queue, error) &&
+         TakeLock(queue, path, error) != Lock::FAILED;
 }
 
 uint64_t WaitingLines(const std::string& share_name) {

@@ -29,6 +29,11 @@ bool AppendToQueue(const std::string& share_name, const std::vector<std::string>
 bool AppendToQueueDurably(const std::string& share_name, const std::vector<std::string>& lines,
                           std::string& error);
 
+// Opens the queue file as a writer does, creating it where it is missing, takes its lock without
+// waiting and closes it: the daemon looks at the queue again. True also while another program holds
+// the lock: it closes the file in turn. False on failure, and `error` then tells.
+bool TouchQueue(const std::string& share_name, std::string& error);
+
 // Lines in the queue file and its drained copy together; 0 when there is neither.
 uint64_t WaitingLines(const std::string& share_name);
 
