@@ -5,6 +5,8 @@
 // all stand directly in it is folded, the fullest first. Its reindex is then a line in the
 // directory above, which may be folded in turn. Where no directory holds two lines, the deepest
 // lines are lifted into reindexes of their directories, until some meet.
+// The order of the queue is another one, kept beside: taking the first lines of many, again and
+// again, sorts nothing.
 #include "state/queue_folding.h"
 
 #include <algorithm>
@@ -50,6 +52,15 @@ bool ByComponents::operator()(std::string_view a, std::string_view b) const {
   return static_cast<unsigned char>(*at_a) < static_cast<unsigned char>(*at_b);
 }
 
+// Lines of one directory stand in the order of their paths.
+bool QueueFolding::ByDirectory::operator()(LineMap::const_iterator a,
+                                           LineMap::const_iterator b) const {
+  const std::string_view folder_a = ParentOf(a->first);
+  const std::string_view folder_b = ParentOf(b->first);
+  return folder_a == folder_b ? ByComponents()(a->first, b->first)
+                              : ByComponents()(folder_a, folder_b);
+}
+
 QueueFolding::QueueFolding(std::string fold_root, CountBelow count_below, size_t lines_kept)
     : root(std::move(fold_root)), count(std::move(count_below)), kept(lines_kept) {}
 
@@ -72,24 +83,69 @@ void QueueFolding::Add(uint32_t event, const std::string& path, const std::strin
   if (IsTakenIn(path)) {
     return;
   }
+  const auto at = lines.find(path);
+  const uint32_t before = at == lines.end() ? 0 : at->second.event;
   if (IsReindex(event)) {
     FoldInto(path);
+  } else if (before == QLIB_NOTIFY_RENAME) {
+    AddAtRename(at, event, data);
+  } else if (!IsUpdateOfAll(before)) {
+    Place(path, {event, data, {}});
+  } else if (IsUpdateOfAll(event) && at->second.data != data) {
+    FoldInto(path);
+  }
+  FoldIfTooMany();
+}
+
+void QueueFolding::AddAtRename(LineMap::iterator rename, uint32_t event, const std::string& data) {
+  // The thing is gone again, and the daemon would look only at where it came from.
+  if (event == QLIB_NOTIFY_DELETE) {
+    const QueueLine was{0, rename->first, {}, rename->second.path_old};
+    Place(was.path, {event, data, {}});
+    FoldUnlessTakenIn(was.path_old);
+  } else if (IsUpdateOfAll(event)) {
+    FoldInto(std::string(rename->first));
+  }
+}
+
+void QueueFolding::AddRename(const std::string& path, const std::string& path_old) {
+  if (IsTakenIn(path)) {
+    FoldUnlessTakenIn(path_old);
+  } else if (IsTakenIn(path_old)) {
+    FoldInto(path);
   } else {
-    const auto [at, is_new] = lines.try_emplace(path, Line{event, data});
-    Line& line = at->second;
-    if (is_new) {
-      ++direct[FolderOf(path)];
-    } else if (!IsUpdateOfAll(line.event)) {
-      line = {event, data};
-    } else if (IsUpdateOfAll(event) && line.data != data) {
+    const auto at = lines.find(path);
+    const Line before = at == lines.end() ? Line{} : at->second;
+    if (IsUpdateOfAll(before.event)) {
       FoldInto(path);
+      FoldUnlessTakenIn(path_old);
+    } else {
+      Place(path, {QLIB_NOTIFY_RENAME, {}, path_old});
+      if (before.event == QLIB_NOTIFY_RENAME && before.path_old != path_old) {
+        FoldUnlessTakenIn(before.path_old);
+      }
     }
   }
+  FoldIfTooMany();
+}
 
+void QueueFolding::FoldIfTooMany() {
   if (lines.size() > 2 * kept) {
     FoldCrowded();
     FoldTo(kept);
   }
+}
+
+void QueueFolding::Place(const std::string& path, Line line) {
+  const auto [at, is_new] = lines.try_emplace(path);
+  if (is_new) {
+    ++direct[FolderOf(path)];
+    sorted.insert(at);
+    bytes += path.size();
+  }
+  bytes += line.data.size() + line.path_old.size();
+  bytes -= at->second.data.size() + at->second.path_old.size();
+  at->second = std::move(line);
 }
 
 void QueueFolding::Erase(LineMap::iterator line) {
@@ -97,18 +153,36 @@ void QueueFolding::Erase(LineMap::iterator line) {
   if (--held->second == 0) {
     direct.erase(held);
   }
+  bytes -= line->first.size() + line->second.data.size() + line->second.path_old.size();
+  sorted.erase(line);
   lines.erase(line);
 }
 
-void QueueFolding::FoldInto(const std::string& directory) {
-  // NOLINTNEXTLINE(performance-unnecessary-copy-initialization): may be the key of a line that goes
-  const std::string folded = directory;
-  auto line = lines.lower_bound(folded);
-  while (line != lines.end() && Covers(folded, line->first)) {
-    Erase(line++);
+void QueueFolding::FoldUnlessTakenIn(const std::string& directory) {
+  if (!IsTakenIn(directory)) {
+    FoldInto(directory);
   }
-  lines.emplace(folded, Line{CUSTOM_EVENT_REINDEX, {}});
-  ++direct[FolderOf(folded)];
+}
+
+void QueueFolding::FoldInto(const std::string& directory) {
+  // Renames that end here may have begun elsewhere, where others have ended: each is one line less,
+  // so this comes to its end.
+  std::vector<std::string> left{directory};
+  while (!left.empty()) {
+    const std::string folded = std::move(left.back());
+    left.pop_back();
+    if (IsTakenIn(folded)) {
+      continue;
+    }
+    auto line = lines.lower_bound(folded);
+    while (line != lines.end() && Covers(folded, line->first)) {
+      if (line->second.event == QLIB_NOTIFY_RENAME && !Covers(folded, line->second.path_old)) {
+        left.push_back(line->second.path_old);
+      }
+      Erase(line++);
+    }
+    Place(folded, {CUSTOM_EVENT_REINDEX, {}, {}});
+  }
 }
 
 void QueueFolding::FoldCrowded() {
@@ -200,16 +274,25 @@ std::vector<QueueLine> QueueFolding::Lines(size_t most) {
   FoldCrowded();
   FoldTo(most);
 
-  std::vector<QueueLine> sorted;
-  sorted.reserve(lines.size());
-  for (const auto& [path, line] : lines) {
-    sorted.push_back({line.event, path, line.data});
+  return Copy(lines.size());
+}
+
+std::vector<QueueLine> QueueFolding::Copy(size_t most) const {
+  std::vector<QueueLine> copied;
+  copied.reserve(std::min(most, sorted.size()));
+  for (auto line = sorted.begin(); line != sorted.end() && copied.size() < most; ++line) {
+    const auto& [path, asked] = **line;
+    copied.push_back({asked.event, path, asked.data, asked.path_old});
   }
-  // Lines of one directory are in order already, and are only brought together.
-  std::stable_sort(sorted.begin(), sorted.end(), [](const QueueLine& a, const QueueLine& b) {
-    return ByComponents()(ParentOf(a.path), ParentOf(b.path));
-  });
-  return sorted;
+  return copied;
+}
+
+std::vector<QueueLine> QueueFolding::Take(size_t most) {
+  std::vector<QueueLine> taken = Copy(most);
+  for (size_t i = 0; i < taken.size(); ++i) {
+    Erase(*sorted.begin());
+  }
+  return taken;
 }
 
 }  // namespace fileindexd

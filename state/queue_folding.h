@@ -11,6 +11,7 @@
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <set>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -23,8 +24,9 @@ constexpr size_t QUEUE_LINE_LIMIT = 5000;
 
 struct QueueLine {
   uint32_t event = 0;
-  std::string path;  // normal
-  std::string data;  // JSON text, or empty
+  std::string path;           // normal
+  std::string data;           // JSON text, or empty
+  std::string path_old = {};  // of a rename: the former path, normal
 };
 
 // Byte order, except that '/' comes before every other byte: what lies below a path follows it at
@@ -41,11 +43,20 @@ class QueueFolding {
   // `fold_root`: normal; the last reindex that everything can become. At most `lines_kept` lines
   // stay after a fold, and twice as many are held until the next.
   QueueFolding(std::string fold_root, CountBelow count_below, size_t lines_kept = QUEUE_LINE_LIMIT);
+  QueueFolding(const QueueFolding&) = delete;
+  QueueFolding& operator=(const QueueFolding&) = delete;
 
   // `path` is normal, at or below the root. Of two lines at one path the wider stays: a reindex,
   // then an update of a subtree; else the later one. Two such updates with different data become
   // a reindex.
   void Add(uint32_t event, const std::string& path, const std::string& data = {});
+
+  // A rename: one line at `path`, normal, with the former path, whatever stands below either. A
+  // reindex that takes one of both in leaves a reindex of the other; where it takes in only the
+  // former path of a line that stands already, the line may stay. Of a rename and another line at
+  // its path the rename stays, unless that is a delete, an update of a subtree, or a rename from
+  // elsewhere; then a reindex of the former path is left.
+  void AddRename(const std::string& path, const std::string& path_old);
 
   // Whether a reindex stands at or above the path.
   bool IsTakenIn(const std::string& path) const;
@@ -55,18 +66,33 @@ class QueueFolding {
   // most ten times as many entries below it, it becomes one reindex.
   std::vector<QueueLine> Lines(size_t most);
 
+  // Does the same for crowded directories alone. Costs a look at each directory that has lines.
+  void FoldCrowded();
+
+  // Takes out the first `most` lines in that order, and leaves the rest as it is.
+  std::vector<QueueLine> Take(size_t most);
+
   size_t Size() const { return lines.size(); }
+  size_t Bytes() const { return bytes; }  // of paths and data
 
  private:
   struct Line {
     uint32_t event = 0;
     std::string data;
+    std::string path_old;
   };
   using LineMap = std::map<std::string, Line, ByComponents>;
+  struct ByDirectory {
+    bool operator()(LineMap::const_iterator a, LineMap::const_iterator b) const;
+  };
 
+  void Place(const std::string& path, Line line);
   void Erase(LineMap::iterator line);
+  void AddAtRename(LineMap::iterator rename, uint32_t event, const std::string& data);
+  void FoldUnlessTakenIn(const std::string& directory);
+  void FoldIfTooMany();
+  std::vector<QueueLine> Copy(size_t most) const;
   void FoldInto(const std::string& directory);
-  void FoldCrowded();
   void FoldTo(size_t most);
   bool FoldFullest(size_t most);
   void LiftDeepest();
@@ -77,7 +103,9 @@ class QueueFolding {
   const CountBelow count;
   const size_t kept;
   LineMap lines;
-  std::unordered_map<std::string, size_t> direct;  // lines directly in a directory
+  std::set<LineMap::iterator, ByDirectory> sorted;  // all lines, in the order of the queue
+  std::unordered_map<std::string, size_t> direct;   // lines directly in a directory
+  size_t bytes = 0;
 };
 
 }  // namespace fileindexd

@@ -23,13 +23,16 @@ class QueueFoldingTest : public testing::Test {
   }
 
   // "MODIFY /s/a", in the order of the queue.
-  static Texts Shown(QueueFolding& folding, size_t most) {
+  static Texts Shown(QueueFolding& folding, size_t most) { return Shown(folding.Lines(most)); }
+  static Texts Shown(const std::vector<QueueLine>& lines) {
     Texts texts;
-    for (const QueueLine& line : folding.Lines(most)) {
+    for (const QueueLine& line : lines) {
       std::string name = std::to_string(line.event);
       name = line.event == CUSTOM_EVENT_REINDEX ? "reindex" : name;
       name = line.event == CUSTOM_EVENT_UPDATE ? "update" + line.data : name;
       name = line.event == QLIB_NOTIFY_MODIFY ? "modify" : name;
+      name = line.event == QLIB_NOTIFY_DELETE ? "delete" : name;
+      name = line.event == QLIB_NOTIFY_RENAME ? "rename " + line.path_old : name;
       texts.push_back(name + " " + line.path);
     }
     return texts;
@@ -146,6 +149,106 @@ TEST_F(QueueFoldingTest, NothingIsLostWhateverIsAdded) {
       EXPECT_EQ(std::count_if(lines.begin(), lines.end(), mends), 1) << path << " seed " << seed;
     }
   }
+}
+
+TEST_F(QueueFoldingTest, RenameIsOneLineWithBothPaths) {
+  QueueFolding folding = Folding(100);
+  folding.Add(QLIB_NOTIFY_MODIFY, "/s/b/x");
+  folding.Add(QLIB_NOTIFY_MODIFY, "/s/new");
+  folding.AddRename("/s/new", "/s/old");
+  folding.AddRename("/s/b", "/s/c");
+  folding.Add(QLIB_NOTIFY_MODIFY, "/s/new");
+
+  EXPECT_EQ(Shown(folding, 100),
+            Texts({"rename /s/c /s/b", "rename /s/old /s/new", "modify /s/b/x"}));
+}
+
+TEST_F(QueueFoldingTest, ReindexOfOneSideOfARenameLeavesTheOther) {
+  struct Case {
+    Texts reindexed;
+    Texts before;  // the reindexes come first
+    Texts after;   // the rename comes first
+  };
+  for (const Case& asked : std::vector<Case>{
+           {{"/s/a", "/s/b"}, {"reindex /s/a", "reindex /s/b"}, {"reindex /s/a", "reindex /s/b"}},
+           {{"/s"}, {"reindex /s"}, {"reindex /s"}},
+           {{"/s/b"}, {"reindex /s/b", "reindex /s/a/x"}, {"reindex /s/b", "reindex /s/a/x"}},
+           {{"/s/a"}, {"reindex /s/a", "reindex /s/b/x"}, {"reindex /s/a", "rename /s/a/x /s/b/x"}},
+       }) {
+    QueueFolding first = Folding(100);
+    QueueFolding last = Folding(100);
+    last.AddRename("/s/b/x", "/s/a/x");
+    for (const std::string& path : asked.reindexed) {
+      first.Add(CUSTOM_EVENT_REINDEX, path);
+      last.Add(CUSTOM_EVENT_REINDEX, path);
+    }
+    first.AddRename("/s/b/x", "/s/a/x");
+
+    EXPECT_EQ(Shown(first, 100), asked.before);
+    EXPECT_EQ(Shown(last, 100), asked.after);
+  }
+}
+
+TEST_F(QueueFoldingTest, WhatARenameCannotSayWithItsLineIsAReindexOfItsFormerPath) {
+  QueueFolding folding = Folding(100);
+  folding.AddRename("/s/gone", "/s/1");
+  folding.Add(QLIB_NOTIFY_DELETE, "/s/gone");
+  folding.AddRename("/s/twice", "/s/2");
+  folding.AddRename("/s/twice", "/s/3");
+  folding.AddRename("/s/update", "/s/4");
+  folding.Add(CUSTOM_EVENT_UPDATE, "/s/update", "{1}");
+  folding.Add(CUSTOM_EVENT_UPDATE, "/s/updated", "{1}");
+  folding.AddRename("/s/updated", "/s/5");
+
+  EXPECT_EQ(Shown(folding, 100),
+            Texts({"reindex /s/1", "reindex /s/2", "reindex /s/4", "reindex /s/5", "delete /s/gone",
+                   "rename /s/3 /s/twice", "reindex /s/update", "reindex /s/updated"}));
+}
+
+TEST_F(QueueFoldingTest, ALineFromALookNeverDisplacesAReindex) {
+  QueueFolding folding = Folding(100);
+  folding.Add(CUSTOM_EVENT_REINDEX, "/s/a");
+  folding.Add(QLIB_NOTIFY_ATTRIB, "/s/a");
+  folding.Add(QLIB_NOTIFY_DELETE, "/s/a");
+
+  EXPECT_EQ(Shown(folding, 100), Texts({"reindex /s/a"}));
+}
+
+TEST_F(QueueFoldingTest, FirstLinesAreTakenAndTheRestStaysAsItIs) {
+  QueueFolding folding = Folding(100);
+  for (const char* path : {"/s/a/x", "/s/b", "/s/a", "/s/a/x/y", "/s/a/z"}) {
+    folding.Add(QLIB_NOTIFY_MODIFY, path);
+  }
+  EXPECT_EQ(folding.Bytes(), 28U);
+
+  EXPECT_EQ(Shown(folding.Take(3)), Texts({"modify /s/a", "modify /s/b", "modify /s/a/x"}));
+  EXPECT_EQ(folding.Size(), 2U);
+  EXPECT_EQ(folding.Bytes(), 14U);
+  folding.Add(QLIB_NOTIFY_MODIFY, "/s/c");
+  EXPECT_EQ(Shown(folding.Take(9)), Texts({"modify /s/c", "modify /s/a/z", "modify /s/a/x/y"}));
+  EXPECT_EQ(folding.Bytes(), 0U);
+  EXPECT_TRUE(folding.Take(9).empty());
+}
+
+// Quadratic, it would take minutes.
+TEST_F(QueueFoldingTest, ManyLinesAreTakenInTheOrderOfOneSort) {
+  QueueFolding folding = Folding(100000);
+  QueueFolding whole = Folding(100000);
+  for (int i = 0; i < 100000; ++i) {
+    const std::string path = "/s/" + std::to_string(i % 997) + "/" + std::to_string(i);
+    folding.Add(QLIB_NOTIFY_MODIFY, path);
+    whole.Add(QLIB_NOTIFY_MODIFY, path);
+  }
+  entries = 1000000000;
+
+  Texts taken;
+  while (folding.Size() > 0) {
+    for (std::string& text : Shown(folding.Take(10))) {
+      taken.push_back(std::move(text));
+    }
+  }
+
+  EXPECT_EQ(taken, Shown(whole, 100000));
 }
 
 TEST_F(QueueFoldingTest, AMillionLinesStayFew) {

@@ -56,6 +56,25 @@ TEST_F(QueueWriterTest, NoLinesOnlyCreateAndCloseTheFile) {
   EXPECT_TRUE(Exists(queue));
 }
 
+TEST_F(QueueWriterTest, ATouchIsSeenAndWaitsForNobody) {
+  ASSERT_TRUE(MakeShareFolder("s", error)) << error;
+  const ScopedFd watch(inotify_init1(IN_CLOEXEC | IN_NONBLOCK));
+  ASSERT_GE(inotify_add_watch(watch.fd, ShareFolder("s").c_str(), IN_CLOSE_WRITE), 0);
+  char events[4096];
+
+  ASSERT_TRUE(TouchQueue("s", error)) << error;
+  EXPECT_GT(read(watch.fd, events, sizeof events), 0);
+  EXPECT_EQ(ModeOf(queue), 0600U);
+
+  const ScopedFd holder(open(queue.c_str(), O_RDONLY | O_CLOEXEC));
+  ASSERT_EQ(flock(holder.fd, LOCK_EX), 0);
+  EXPECT_TRUE(TouchQueue("s", error)) << error;
+  EXPECT_GT(read(watch.fd, events, sizeof events), 0);
+  EXPECT_EQ(ReadFile(queue), "");
+
+  EXPECT_FALSE(TouchQueue("..", error));
+}
+
 TEST_F(QueueWriterTest, ALineThatWouldBeTwoIsRefused) {
   EXPECT_FALSE(Append({"good", "bad\nline"}));
   EXPECT_FALSE(Append({std::string("nul\0", 4)}));
