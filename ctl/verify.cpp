@@ -116,6 +116,15 @@ Comparer::Result CompareAll(Comparer& comparer, const std::string& share_name,
   }
 }
 
+// Of what could not be read nobody can say that it is clean.
+int TellUnreadable(const Comparison& counts) {
+  std::string text = "cannot look at " + counts.first_unreadable + ": " + counts.unreadable_reason;
+  if (counts.unreadable > 1) {
+    text += "; nor at " + std::to_string(counts.unreadable - 1) + " more";
+  }
+  return Fail(EXIT_FAILED, "%s", text.c_str());
+}
+
 }  // namespace
 
 int Verify(const Arguments& arguments) {
@@ -146,8 +155,10 @@ int Verify(const Arguments& arguments) {
   if (result == Comparer::Result::FAILED) {
     return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
   }
+  const bool is_read = comparer.counts.unreadable == 0;
   if (!arguments.repair) {
-    return comparer.counts.differences == 0 ? EXIT_DONE : EXIT_FAILED;
+    const int code = comparer.counts.differences == 0 ? EXIT_DONE : EXIT_FAILED;
+    return is_read ? code : TellUnreadable(comparer.counts);
   }
 
   const int queued = QueueRepair(share->name, repair);
@@ -155,7 +166,7 @@ int Verify(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",
                 share->name.c_str());
   }
-  return queued;
+  return queued == EXIT_DONE && !is_read ? TellUnreadable(comparer.counts) : queued;
 }
 
 }  // namespace fileindexd

@@ -42,6 +42,12 @@ struct Comparison {
   uint64_t seen = 0;     // things on disk that belong
   uint64_t differences = 0;
   uint64_t compared = 0;  // paths that are done
+
+  // Things that could not be looked at, and directories that could not be read. Of what is there
+  // and below nothing is told, whatever the index holds.
+  uint64_t unreadable = 0;
+  std::string first_unreadable;   // the path of the first of them
+  std::string unreadable_reason;  // and why
 };
 
 // A comparison in pieces. One thread; between two calls it holds no descriptor of the share and no
@@ -56,8 +62,8 @@ class Comparer {
 
   // Begins under the settings of now; with `position` (of any comparer of this share) behind it.
   // False when the comparison cannot be made, and Error() then says why in one line: the root is
-  // missing, lies on another file system, or is empty where the index holds entries below it; the
-  // index cannot be read.
+  // missing, cannot be read, lies on another file system, or is empty where the index holds entries
+  // below it; the index cannot be read.
   bool Start(const std::string& position = {});
 
   enum class Result {
@@ -83,6 +89,8 @@ class Comparer {
   bool Tell(const Report& report, Difference difference, const std::string& path);
   bool NextEntry();
   bool NextThing();
+  bool PassOver(int reason);
+  bool IsPassedOver(const std::string& path);
   bool OpenIndex();
   bool CheckRoot();
   bool Refuse(const std::string& why);
