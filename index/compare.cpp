@@ -118,12 +118,14 @@ bool Comparer::OpenIndex() {
     return true;
   }
 
+  // Without a folder nothing belongs in an index.
   const auto& folders = side->settings->folders;
   const bool wants_none =
       std::none_of(folders.begin(), folders.end(),
                    [&](const IndexedFolder& folder) { return folder.share == share_name; });
-  if (opened == IndexError::PATH_NOT_FOUND && wants_none) {
-    return true;  // nothing belongs in an index, and there is none
+  if (opened == IndexError::PATH_NOT_FOUND && (wants_none || missing_is_empty)) {
+    estimate = 0;
+    return true;
   }
   return Refuse("share " + share_name + ": " + IndexErrorText(opened));
 }

@@ -60,6 +60,11 @@ class Comparer {
   Comparer(const Comparer&) = delete;
   Comparer& operator=(const Comparer&) = delete;
 
+  // To be set before Start: an index that is not there is taken for an empty one, so that all that
+  // belongs is told as missing. Otherwise it refuses the comparison, unless no folder wants one.
+  bool missing_is_empty = false;
+  bool has_index = false;  // since Start: whether there is one
+
   // Begins under the settings of now; with `position` (of any comparer of this share) behind it.
   // False when the comparison cannot be made, and Error() then says why in one line: the root is
   // missing, cannot be read, lies on another file system, or is empty where the index holds entries
@@ -100,7 +105,6 @@ class Comparer {
   std::string position;
   std::string error;
   bool going = true;
-  bool has_index = false;
   uint64_t left_over = 0;
   uint64_t estimate = 0;
   std::unique_ptr<Side> side;
