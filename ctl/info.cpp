@@ -7,6 +7,7 @@
 #include "ctl/content_kinds.h"
 #include "ctl/info_facts.h"
 #include "ctl/output.h"
+#include "ctl/root_problem.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -81,18 +82,10 @@ const char* AgreementSentence(const PathFacts& facts) {
                         : "not in the index; it cannot be compared with the disk";
 }
 
-std::string RootProblem(RootState root) {
-  switch (root) {
-    case RootState::SOUND:
-      return {};
-    case RootState::MISSING:
-      return "the share's path is missing; the index is left as it is";
-    case RootState::FOREIGN:
-      return "the share's path lies on another file system than before; the index is left as it is";
-    case RootState::UNKNOWN:
-      break;
-  }
-  return "the share's path cannot be looked at";
+std::string ProblemOfRoot(const PathFacts& facts) {
+  return facts.share == nullptr
+             ? ""
+             : RootProblem("the share's path", *facts.share, facts.root, facts.root_emptied);
 }
 
 bool NeedsReindex(const PathFacts& facts) {
@@ -160,7 +153,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   object["state"] = AgreementText(facts.agreement);
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
   object["needs_reindex"] = NeedsReindex(facts);
-  object["root_problem"] = RootProblem(facts.root);
+  object["root_problem"] = ProblemOfRoot(facts);
   object["index_problem"] = facts.index_problem;
   object["pending"] = PendingObject(facts.pending);
   return object;
@@ -205,7 +198,7 @@ void PutFacts(const PathFacts& facts) {
   }
   PutFact("rule", facts.reason);
   PutFact("index", AgreementSentence(facts));
-  for (const std::string& problem : {RootProblem(facts.root), facts.index_problem}) {
+  for (const std::string& problem : {ProblemOfRoot(facts), facts.index_problem}) {
     if (!problem.empty()) {
       PutFact("problem", problem);
     }

@@ -10,6 +10,7 @@
 #include <functional>
 
 #include "ctl/output.h"
+#include "ctl/root_problem.h"
 #include "index/compare.h"
 #include "index/entry_table.h"
 #include "index/reader.h"
@@ -108,7 +109,7 @@ void Explain(const Settings& settings, PathFacts& facts, int reason) {
   }
 }
 
-void AskIndex(PathFacts& facts) {
+void AskIndex(const Settings& settings, PathFacts& facts) {
   EntryReader reader;
   const IndexError opened = reader.Open(facts.share->name);
   if (opened == IndexError::PATH_NOT_FOUND) {
@@ -125,10 +126,13 @@ void AskIndex(PathFacts& facts) {
     facts.entry = entry;
     return false;
   });
-  if (!read) {
+  uint64_t entries = 0;
+  if (!read || !reader.Count(entries)) {
     facts.index_read = false;
     facts.index_problem = "the index cannot be read";
+    return;
   }
+  facts.root_emptied = IsRootEmptied(settings, *facts.share, facts.status, facts.root, entries);
 }
 
 bool IsCurrent(const PathFacts& facts) {
@@ -141,7 +145,7 @@ Agreement Compare(const PathFacts& facts) {
   if (facts.share == nullptr) {
     return Agreement::ABSENT;
   }
-  if (!facts.index_read || facts.root != RootState::SOUND ||
+  if (!facts.index_read || facts.root != RootState::SOUND || facts.root_emptied ||
       facts.look.verdict == Verdict::UNKNOWN) {
     return Agreement::UNKNOWN;
   }
@@ -190,7 +194,7 @@ bool FindFacts(Session& session, const std::string& given, PathFacts& facts) {
       return false;
     }
     facts.root = LookAtRoot(*facts.share);
-    AskIndex(facts);
+    AskIndex(settings, facts);
     facts.pending = ReadPending(facts.share->name, facts.path);
   }
   facts.agreement = Compare(facts);

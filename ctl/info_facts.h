@@ -28,6 +28,7 @@ struct PathFacts {
   const Share* share = nullptr;
   const IndexedFolder* folder = nullptr;  // the deepest that covers it
   RootState root = RootState::SOUND;      // of the share
+  bool root_emptied = false;              // sound, and empty where the index holds something
   ShareStatus status;
   Look look;
   std::string reason;  // why it belongs or not, a sentence

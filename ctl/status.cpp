@@ -7,6 +7,7 @@
 #include "ctl/commands.h"
 #include "ctl/follow.h"
 #include "ctl/output.h"
+#include "ctl/root_problem.h"
 #include "ctl/status_report.h"
 #include "state/pid_file.h"
 #include "state/queue_writer.h"
@@ -54,12 +55,6 @@ void LookAtFolders(const Settings& settings, ShareReport& report) {
   }
 }
 
-// The root itself is an entry where it is an indexed folder; an index of that alone is as empty.
-bool IsEmptied(const Settings& settings, const ShareReport& report) {
-  const uint64_t own = settings.FolderAt(report.share.path) != nullptr ? 1 : 0;
-  return report.root == RootState::SOUND && report.index.entries > own && IsRootEmpty(report.share);
-}
-
 // False when the share's status cannot be read.
 bool ReportShare(Session& session, const Share& share, ShareReport& report) {
   ShareStatus status;
@@ -76,7 +71,8 @@ bool ReportShare(Session& session, const Share& share, ShareReport& report) {
   report.comparison = WorkAt(ComparisonProgressPath(share.name));
   LookAtFolders(*session.settings, report);
   ReadIndex(report);
-  report.root_emptied = !status.accept_empty && IsEmptied(*session.settings, report);
+  report.root_emptied =
+      IsRootEmptied(*session.settings, share, status, report.root, report.index.entries);
   return true;
 }
 

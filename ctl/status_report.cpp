@@ -6,6 +6,7 @@
 #include <cmath>
 
 #include "ctl/output.h"
+#include "ctl/root_problem.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -96,25 +97,6 @@ Json::Value ShareObject(const ShareReport& report) {
   return object;
 }
 
-// Empty when there is nothing to say.
-std::string RootProblem(const ShareReport& report) {
-  const std::string accept = "fileindexctl share accept " + Printable(report.share.name);
-  switch (report.root) {
-    case RootState::SOUND:
-      return report.root_emptied ? "its path is empty where it was not; if that is meant: " + accept
-                                 : "";
-    case RootState::MISSING:
-      return "its path is missing; the index is left as it is";
-    case RootState::FOREIGN:
-      return "its path lies on another file system than before; the index is left as it is; to go "
-             "on with this one: " +
-             accept;
-    case RootState::UNKNOWN:
-      break;
-  }
-  return "its path cannot be looked at";
-}
-
 std::string DurationText(int64_t seconds) {
   constexpr int64_t MINUTE = 60;
   constexpr int64_t HOUR = 60 * MINUTE;
@@ -154,7 +136,9 @@ void AddShare(std::string& text, const ShareReport& report) {
   const int64_t last_commit = report.index.last_commit;
   text += "share " + Printable(report.share.name) + "\n";
   AddLine(text, "path", Printable(report.share.path));
-  if (const std::string problem = RootProblem(report); !problem.empty()) {
+  if (const std::string problem =
+          RootProblem("its path", report.share, report.root, report.root_emptied);
+      !problem.empty()) {
     AddLine(text, "problem", problem);
   }
   if (!report.index_problem.empty()) {

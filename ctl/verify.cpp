@@ -116,6 +116,33 @@ Comparer::Result CompareAll(Comparer& comparer, const std::string& share_name,
   }
 }
 
+// Of what could not be read nobody can say that it is clean.
+int TellUnreadable(const Comparison& counts) {
+  std::string text = "cannot look at " + counts.first_unreadable + ": " + counts.unreadable_reason;
+  if (counts.unreadable > 1) {
+    text += "; nor at " + std::to_string(counts.unreadable - 1) + " more";
+  }
+  return Fail(EXIT_FAILED, "%s", text.c_str());
+}
+
+bool HasFolders(const Settings& settings, const Share& share) {
+  return std::any_of(settings.folders.begin(), settings.folders.end(),
+                     [&](const IndexedFolder& folder) { return folder.share == share.name; });
+}
+
+// All that belongs is missing: each folder is reindexed, and nothing in it is looked at here.
+int MakeIndex(const Settings& settings, const Share& share, const Arguments& arguments) {
+  EntryReader none;
+  Repair repair(settings, share, none);
+  for (const IndexedFolder& folder : settings.folders) {
+    if (folder.share == share.name && !IsDirectoryGone(folder.path)) {
+      (void)PutDifference(Difference::MISSING, folder.path, arguments);
+      (void)repair.Add({Difference::MISSING, folder.path, Thing::NONE, Thing::DIRECTORY});
+    }
+  }
+  return QueueRepair(share.name, repair);
+}
+
 }  // namespace
 
 int Verify(const Arguments& arguments) {
@@ -130,8 +157,16 @@ int Verify(const Arguments& arguments) {
 
   Comparer comparer(*session.store, share->name);
   EntryReader reader;  // counts for the repair, beside the comparison's own
+  comparer.missing_is_empty = true;
   if (!comparer.Start()) {
     return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
+  }
+  if (!comparer.has_index && HasFolders(*session.settings, *share)) {
+    return arguments.repair ? MakeIndex(*session.settings, *share, arguments)
+                            : Fail(EXIT_FAILED,
+                                   "share %s: there is no index yet; to have it made: fileindexctl "
+                                   "verify %s --repair",
+                                   share->name.c_str(), share->name.c_str());
   }
   (void)reader.Open(share->name);  // an index that is not there has nothing to count
   Repair repair(*session.settings, *share, reader);
@@ -146,8 +181,10 @@ int Verify(const Arguments& arguments) {
   if (result == Comparer::Result::FAILED) {
     return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
   }
+  const bool is_read = comparer.counts.unreadable == 0;
   if (!arguments.repair) {
-    return comparer.counts.differences == 0 ? EXIT_DONE : EXIT_FAILED;
+    const int code = comparer.counts.differences == 0 ? EXIT_DONE : EXIT_FAILED;
+    return is_read ? code : TellUnreadable(comparer.counts);
   }
 
   const int queued = QueueRepair(share->name, repair);
@@ -155,7 +192,7 @@ int Verify(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",
                 share->name.c_str());
   }
-  return queued;
+  return queued == EXIT_DONE && !is_read ? TellUnreadable(comparer.counts) : queued;
 }
 
 }  // namespace fileindexd

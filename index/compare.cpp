@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <set>
 #include <utility>
 
 #include "index/disk_walk.h"
@@ -25,6 +26,11 @@ constexpr uint64_t ROOT_INTERVAL = 500;  // entries found left over, between two
 bool EmptyIsAccepted(StateStore& store, const std::string& share_name) {
   ShareStatus status;
   return store.GetStatus(share_name, status) && status.accept_empty;
+}
+
+// What this process lacks, and not the disk: it would be told of everything that follows.
+bool IsOwnWant(int reason) {
+  return reason == EMFILE || reason == ENFILE || reason == ENOMEM || reason == ENOSYS;
 }
 
 }  // namespace
@@ -58,6 +64,7 @@ struct Comparer::Side {
   bool on_disk = false;          // whether `path` and `look` hold the next thing
   std::string path;
   Look look;
+  std::set<std::string> unreadable;  // that entries to come may lie at or below
 };
 
 Comparer::Comparer(StateStore& state, std::string compared_share)
@@ -111,12 +118,14 @@ bool Comparer::OpenIndex() {
     return true;
   }
 
+  // Without a folder nothing belongs in an index.
   const auto& folders = side->settings->folders;
   const bool wants_none =
       std::none_of(folders.begin(), folders.end(),
                    [&](const IndexedFolder& folder) { return folder.share == share_name; });
-  if (opened == IndexError::PATH_NOT_FOUND && wants_none) {
-    return true;  // nothing belongs in an index, and there is none
+  if (opened == IndexError::PATH_NOT_FOUND && (wants_none || missing_is_empty)) {
+    estimate = 0;
+    return true;
   }
   return Refuse("share " + share_name + ": " + IndexErrorText(opened));
 }
@@ -174,7 +183,7 @@ bool Comparer::Step(const Report& report) {
   const Entry* entry = side->entry;
   const int order = entry == nullptr ? 1 : !side->on_disk ? -1 : entry->path.compare(side->path);
   const std::string& path = order < 0 ? entry->path : side->path;
-  if (order < 0 && !Tell(report, Difference::LEFT_OVER, path)) {
+  if (order < 0 && !IsPassedOver(path) && !Tell(report, Difference::LEFT_OVER, path)) {
     return false;
   }
   if (order > 0 && !Tell(report, Difference::MISSING, path)) {
@@ -216,14 +225,52 @@ bool Comparer::NextEntry() {
 }
 
 bool Comparer::NextThing() {
-  const DiskWalk::Step step = side->walk.Next(side->path, side->look);
-  if (step == DiskWalk::Step::FAILED) {
-    return Refuse("cannot look at " + side->path + ": " +
-                  strerror(errno));  // NOLINT: glibc's is safe
+  DiskWalk::Step step = side->walk.Next(side->path, side->look);
+  while (step == DiskWalk::Step::FAILED) {
+    if (!PassOver(errno)) {
+      return false;
+    }
+    step = side->walk.Next(side->path, side->look);
   }
   side->on_disk = step == DiskWalk::Step::FOUND;
   counts.seen += side->on_disk ? 1 : 0;
   return true;
+}
+
+// Notes what the walk could not look at. Without the root there is nothing to compare with.
+bool Comparer::PassOver(int reason) {
+  const std::string text = strerror(reason);  // NOLINT: glibc's is safe
+  if (side->path == side->share->path || IsOwnWant(reason)) {
+    return Refuse("cannot look at " + side->path + ": " + text);
+  }
+  if (counts.unreadable++ == 0) {
+    counts.first_unreadable = side->path;
+    counts.unreadable_reason = text;
+  }
+  // Of what lies before the next entry, no entry is asked for any more.
+  if (side->entry != nullptr && side->path + "0" > side->entry->path) {
+    side->unreadable.insert(side->path);
+  }
+  return true;
+}
+
+// Whether an entry that the walk did not meet stands at or below what could not be looked at. Asked
+// in order of the paths: what no later path lies below is forgotten.
+bool Comparer::IsPassedOver(const std::string& path) {
+  std::set<std::string>& unreadable = side->unreadable;
+  while (!unreadable.empty() && *unreadable.begin() + "0" <= path) {
+    unreadable.erase(unreadable.begin());
+  }
+  if (unreadable.empty()) {
+    return false;
+  }
+  for (size_t end = path.size(); end != 0 && end != std::string::npos;
+       end = path.rfind('/', end - 1)) {
+    if (unreadable.contains(path.substr(0, end))) {
+      return true;
+    }
+  }
+  return false;
 }
 
 uint64_t Comparer::Estimate() const {

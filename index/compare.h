@@ -42,6 +42,12 @@ struct Comparison {
   uint64_t seen = 0;     // things on disk that belong
   uint64_t differences = 0;
   uint64_t compared = 0;  // paths that are done
+
+  // Things that could not be looked at, and directories that could not be read. Of what is there
+  // and below nothing is told, whatever the index holds.
+  uint64_t unreadable = 0;
+  std::string first_unreadable;   // the path of the first of them
+  std::string unreadable_reason;  // and why
 };
 
 // A comparison in pieces. One thread; between two calls it holds no descriptor of the share and no
@@ -54,10 +60,15 @@ class Comparer {
   Comparer(const Comparer&) = delete;
   Comparer& operator=(const Comparer&) = delete;
 
+  // To be set before Start: an index that is not there is taken for an empty one, so that all that
+  // belongs is told as missing. Otherwise it refuses the comparison, unless no folder wants one.
+  bool missing_is_empty = false;
+  bool has_index = false;  // since Start: whether there is one
+
   // Begins under the settings of now; with `position` (of any comparer of this share) behind it.
   // False when the comparison cannot be made, and Error() then says why in one line: the root is
-  // missing, lies on another file system, or is empty where the index holds entries below it; the
-  // index cannot be read.
+  // missing, cannot be read, lies on another file system, or is empty where the index holds entries
+  // below it; the index cannot be read.
   bool Start(const std::string& position = {});
 
   enum class Result {
@@ -83,6 +94,8 @@ class Comparer {
   bool Tell(const Report& report, Difference difference, const std::string& path);
   bool NextEntry();
   bool NextThing();
+  bool PassOver(int reason);
+  bool IsPassedOver(const std::string& path);
   bool OpenIndex();
   bool CheckRoot();
   bool Refuse(const std::string& why);
@@ -92,7 +105,6 @@ class Comparer {
   std::string position;
   std::string error;
   bool going = true;
-  bool has_index = false;
   uint64_t left_over = 0;
   uint64_t estimate = 0;
   std::unique_ptr<Side> side;

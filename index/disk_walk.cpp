@@ -163,7 +163,7 @@ DiskWalk::Step DiskWalk::Next(std::string& path, Look& look) {
 }
 
 // END: its directory is gone, with all that was to come from it.
-DiskWalk::Step DiskWalk::TakeName(Level& level, const std::string& path, Look& look) {
+DiskWalk::Step DiskWalk::TakeName(Level& level, std::string& path, Look& look) {
   if (level.directory.empty() || !passed_path.empty()) {
     look = LookAt(settings, path);
     return look.verdict == Verdict::UNKNOWN ? Step::FAILED : Step::FOUND;
@@ -174,6 +174,7 @@ DiskWalk::Step DiskWalk::TakeName(Level& level, const std::string& path, Look& l
     const Reading reading = LookAheadAgain(level);
     if (reading != Reading::DONE) {
       level.next = level.items.size();
+      path = level.directory;
       return reading == Reading::FAILED ? Step::FAILED : Step::END;
     }
     ++level.next;

@@ -30,8 +30,10 @@ class DiskWalk {
   // Begins with what the directory holds. It is looked at first.
   void StartBelow(const std::string& directory);
 
-  // The next thing that belongs. After FAILED, `path` is what could not be looked at, and errno
-  // why. Things directly in one directory are looked at up to 64 at a time, ahead of their turn.
+  // The next thing that belongs. After FAILED, `path` is what could not be looked at, or the
+  // directory that could not be read, and errno why; the walk goes on with what is neither at that
+  // path nor below it. Things directly in one directory are looked at up to 64 at a time, ahead of
+  // their turn.
   Step Next(std::string& path, Look& look);
 
   // The deepest indexed folder that covers what was found last.
@@ -63,7 +65,7 @@ class DiskWalk {
 
   bool IsPassed(const std::string& path) const;
   bool MayHoldUnpassed(const std::string& path) const;
-  Step TakeName(Level& level, const std::string& path, Look& look);
+  Step TakeName(Level& level, std::string& path, Look& look);
   Reading LookAhead(Level& level, const JudgedDirectory& directory);
   Reading LookAheadAgain(Level& level);
   void AllowDescent(Level& level, const Look& look, const std::string& path);

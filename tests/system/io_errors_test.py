@@ -159,5 +159,43 @@ class FullExt4AtTheStartTest(FullAtTheStart, FilesystemTest):
         run("mount", "-o", "loop", image, namespace.STATE)
 
 
+class UnreadableDirectoryTest(FilesystemTest):
+    """A directory of the share is lost to a damage of its disk."""
+
+    kind = "ext4"
+
+    def setUp(self):
+        super().setUp()
+        self.make_files(self.root, "bad/inside/a.txt", "bad!.txt", "good/gone.txt", "good/b.txt")
+        self.add_share()
+        self.start()
+        self.await_drained("alpha")
+        self.unmount_disk()
+        # Its inode is wiped, and its name stays.
+        run("debugfs", "-w", "-R", "clri /share/bad", self.image)
+        self.mount_disk()
+
+    def test_it_is_named_and_the_rest_is_compared_and_mended(self):
+        os.unlink(f"{self.root}/good/gone.txt")
+        self.make_files(self.root, "new.txt")
+        unreadable = f"fileindexctl: cannot look at {self.root}/bad: ".encode()
+        differences = [
+            f"left-over\t{self.root}/good/gone.txt".encode(),
+            f"missing\t{self.root}/new.txt".encode(),
+        ]
+
+        told = self.ctl("verify", "alpha", code=1)
+        self.assertEqual(told.out.splitlines(), differences)
+        self.assertTrue(told.err.startswith(unreadable), told.err)
+        self.assertEqual(told.err.count(b"\n"), 1)
+
+        mended = self.ctl("verify", "alpha", "--repair", code=1)
+        self.assertEqual(mended.out.splitlines(), differences)
+        self.assertTrue(mended.err.startswith(unreadable), mended.err)
+        self.await_drained("alpha")
+        self.assertEqual(self.ctl("verify", "alpha", code=1).out, b"")
+        self.assertIn(f"{self.root}/bad/inside/a.txt".encode(), self.dump())
+
+
 if __name__ == "__main__":
     main()

@@ -50,6 +50,58 @@ class DumpTest(IndexTest):
         self.ctl("verify", code=2)
 
 
+class NeverIndexedTest(IndexTest):
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(
+            files=("in/a.txt", "in/b/c.txt", "also/d.txt", "out/e.txt"), folders=()
+        )
+
+    def make_folders(self, *names):
+        for name in names:
+            self.ctl("folder", "add", f"{self.root}/{name}")
+        os.unlink(self.queue("alpha"))  # as if its lines had been lost
+
+    def test_without_folders_there_is_nothing_to_say(self):
+        self.assertEqual(self.ctl("verify", "alpha").out, b"")
+        self.assertEqual(self.ctl("verify", "alpha", "--repair").out, b"")
+
+    def test_it_is_said_and_nothing_is_listed(self):
+        self.make_folders("in", "also")
+
+        result = self.ctl("verify", "alpha", code=1)
+
+        self.assertEqual(result.out, b"")
+        self.assertIn(b"share alpha: there is no index yet", result.err)
+
+    def test_repair_has_each_folder_indexed(self):
+        self.make_folders("in", "in/b", "also", "out")
+        shutil.rmtree(f"{self.root}/out")
+
+        result = self.ctl("verify", "alpha", "--repair")
+
+        self.assertEqual(
+            result.out.splitlines(),
+            [f"missing\t{self.root}/{name}".encode() for name in ("also", "in", "in/b")],
+        )
+        self.start()
+        self.await_drained("alpha")
+        self.assertEqual(
+            [os.path.relpath(path.decode(), self.root) for path in self.dump()],
+            ["also", "also/d.txt", "in", "in/a.txt", "in/b", "in/b/c.txt"],
+        )
+        self.ctl("verify", "alpha")
+
+    def test_root_that_is_missing_is_what_is_told(self):
+        self.make_folders("in")
+        os.rename(self.root, self.root + ".away")
+
+        for arguments in ((), ("--repair",)):
+            result = self.ctl("verify", "alpha", *arguments, code=1)
+            self.assertEqual(result.out, b"")
+            self.assertIn(b"missing", result.err)
+
+
 class VerifyTest(IndexTest):
     def setUp(self):
         super().setUp()

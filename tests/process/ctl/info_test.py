@@ -105,6 +105,19 @@ class EntryTest(InfoTest):
         self.assertIn("missing", answer["root_problem"])
         self.assertEqual(answer["entry"]["kind"], "document")
 
+    def test_an_emptied_root_says_so_until_it_is_accepted(self):
+        self.stop(self.begin())
+        for name in os.listdir(self.root):
+            shutil.rmtree(f"{self.root}/{name}")
+
+        answer = self.check("in/a.txt", "gone", "unknown")
+        self.assertIn("empty where it was not", answer["root_problem"])
+        self.assertIn("share accept alpha", answer["root_problem"])
+        self.assertIn(b"empty where it was not", self.ctl("info", f"{self.root}/in/a.txt").out)
+
+        self.ctl("share", "accept", "alpha")
+        self.check("in/a.txt", "gone", "left-over", root_problem="")
+
 
 class VerdictTest(InfoTest):
     def test_not_covered_and_in_no_share(self):

@@ -214,6 +214,24 @@ TEST_F(ComparerTest, FolderThatIsEmptiedMeanwhileFailsTheComparison) {
   EXPECT_EQ(comparer.Run(Collect(names)), Comparer::Result::FAILED);
 }
 
+TEST_F(ComparerTest, MissingIndexIsRefusedOrTakenForEmpty) {
+  MakeFolder(At("a"));
+  WriteFile(At("a/f"), "");
+  AddAll();
+  writer.reset();
+  RemoveTree(state_root + "/shares/s/index");
+  Comparer comparer(*store, "s");
+  EXPECT_FALSE(comparer.Start());
+  EXPECT_NE(comparer.Error().find("there is no index"), std::string::npos);
+
+  comparer.missing_is_empty = true;
+  ASSERT_TRUE(comparer.Start()) << comparer.Error();
+  EXPECT_FALSE(comparer.has_index);
+  Names names;
+  EXPECT_EQ(comparer.Run(Collect(names)), Comparer::Result::DONE) << comparer.Error();
+  EXPECT_EQ(names, Names({"missing ", "missing a", "missing a/f"}));
+}
+
 TEST(WorkAtIdleTest, OnlyTheCallingThreadStepsBack) {
   constexpr int WHO_PROCESS = 1;
   const int before = getpriority(PRIO_PROCESS, 0);
