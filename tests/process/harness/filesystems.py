@@ -9,8 +9,12 @@ from harness import namespace
 from harness.awaiting import LIMIT
 from harness.checks import IndexTest
 
-IMAGE_SIZE = {"ext4": 512 << 20, "btrfs": 512 << 20}
-MAKE = {"ext4": ["mkfs.ext4", "-q", "-F"], "btrfs": ["mkfs.btrfs", "-q", "-f"]}
+IMAGE_SIZE = {"ext4": 512 << 20, "btrfs": 512 << 20, "xfs": 512 << 20}
+MAKE = {
+    "ext4": ["mkfs.ext4", "-q", "-F"],
+    "btrfs": ["mkfs.btrfs", "-q", "-f"],
+    "xfs": ["mkfs.xfs", "-q", "-f"],
+}
 MODIFY = 0x2
 ATTRIB = 0x4
 CLOSE_WRITE = 0x8

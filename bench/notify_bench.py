@@ -1,0 +1,361 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Speed of the notification service, with the daemon behind it, on real files.
+
+    bench/in_namespace python3 bench/notify_bench.py DIVISOR BIN_DIR BARE_READER
+
+Sizes are divided by DIVISOR. Data lies below FILEINDEXD_BENCH_DIR.
+"""
+
+import ctypes
+import os
+import select
+import shutil
+import signal
+import socket
+import sqlite3
+import statistics
+import subprocess
+import sys
+import tempfile
+import time
+
+DIVISOR = int(sys.argv[1])
+BIN = sys.argv[2]
+BARE_READER = sys.argv[3]
+ROUNDS = max(200 // DIVISOR, 20)
+FILES = max(10_000 // DIVISOR, 500)
+BURST = max(54_000 // DIVISOR, 2_000)
+IN_A_FOLDER = 500
+LIMIT = 300.0
+
+libc = ctypes.CDLL(None, use_errno=True)
+
+
+def row(name, ours, reference, target, unit=1e3, text="ms"):
+    ratio = f"{ours / reference:.3f}" if reference else ""
+    shown = f"{reference * unit:.2f} {text}" if reference else ""
+    print(f"{name:<52} {ours * unit:>9.2f} {text} {shown:>12} {ratio:>8} {target:>8}", flush=True)
+
+
+class Log:
+    """Somebody has to read /dev/log, or syslog() waits."""
+
+    def __init__(self):
+        self.socket = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
+        self.socket.bind("/dev/log")
+        pid = os.fork()
+        if pid == 0:
+            while True:
+                self.socket.recv(65536)
+
+
+class Machine:
+    def __init__(self, folder):
+        self.state = f"{folder}/state"
+        self.root = f"{folder}/share"
+        self.spare = f"{folder}/spare"
+        for path in (self.root, self.spare):
+            os.makedirs(path)
+        self.env = {**os.environ, "FILEINDEXD_STATE_DIR": self.state}
+        self.notifier = None
+        self.queries = None
+        self.index = f"{self.state}/shares/bench/index"
+        self.queue = f"{self.state}/shares/bench/TALO@file_index_queue"
+        self.ctl("share", "add", "bench", self.root)
+        self.ctl("folder", "add", self.root)
+
+    def ctl(self, *arguments):
+        return subprocess.run(
+            [f"{BIN}/fileindexctl", *arguments], env=self.env, check=True, capture_output=True
+        ).stdout
+
+    def start_daemon(self):
+        subprocess.run([f"{BIN}/fileindexd"], env=self.env, check=True)
+        self.wait(lambda: os.path.exists("/run/fileindexd.pid"), "/run")
+
+    def daemon_pid(self):
+        with open("/run/fileindexd.pid", encoding="ascii") as file:
+            return int(file.read())
+
+    def stop_daemon(self):
+        pid = self.daemon_pid()
+        os.kill(pid, signal.SIGTERM)
+        self.wait(lambda: not os.path.exists("/run/fileindexd.pid"), "/run")
+
+    def start_notifier(self):
+        self.notifier = subprocess.Popen(
+            [f"{BIN}/fileindex-notifyd", "--syslog"], env=self.env
+        )
+        self.wait(lambda: os.path.exists("/run/fileindex-notifyd.pid"), "/run")
+
+    def stop_notifier(self):
+        self.notifier.send_signal(signal.SIGTERM)
+        self.notifier.wait()
+
+    def sync(self):
+        self.ctl("search", "--wait", "--timeout", "300", "--count", "x")
+
+    def wait(self, condition, folder):
+        """Until the condition holds; looked at after each change in the folder."""
+        deadline = time.monotonic() + LIMIT
+        fd = libc.inotify_init1(0o2000000)
+        libc.inotify_add_watch(fd, folder.encode(), 0xFFE)
+        try:
+            while not condition():
+                if not select.select([fd], [], [], deadline - time.monotonic())[0]:
+                    raise TimeoutError(folder)
+                os.read(fd, 65536)
+        finally:
+            os.close(fd)
+
+    def count(self, pattern):
+        """Entries whose path matches; a fresh look, as every search is."""
+        if self.queries is None:
+            self.queries = sqlite3.connect(f"file:{self.index}/entries.db?mode=ro", uri=True)
+        low = pattern.encode()
+        return self.queries.execute(
+            "SELECT count(*) FROM entries WHERE path > ? AND path < ?", (low, low + b"\xff")
+        ).fetchone()[0]
+
+    def found(self, path):
+        return self.count(path[:-1]) > 0
+
+    def await_count(self, pattern, count):
+        self.wait(lambda: self.count(pattern) == count, self.index)
+
+
+def make_files(folder, count, name="file"):
+    for number in range(count):
+        if number % IN_A_FOLDER == 0:
+            os.makedirs(f"{folder}/{number // IN_A_FOLDER}")
+        with open(f"{folder}/{number // IN_A_FOLDER}/{name}{number}.txt", "wb") as file:
+            file.write(b"x" * 100)
+    return count + -(-count // IN_A_FOLDER)
+
+
+def one_new_file(machine):
+    times = []
+    os.makedirs(f"{machine.root}/single")
+    machine.sync()
+    for number in range(ROUNDS):
+        path = f"{machine.root}/single/unique{number}.txt"
+        with open(path, "wb") as file:
+            file.write(b"x")
+        began = time.monotonic()
+        machine.wait(lambda path=path: machine.found(path), machine.index)
+        times.append(time.monotonic() - began)
+        # The daemon is to be idle again.
+        machine.wait(
+            lambda: not os.path.exists(machine.queue) and not os.path.exists(machine.queue + ".tmp"),
+            os.path.dirname(machine.queue),
+        )
+    times.sort()
+    row(f"a new file, until it is found: median of {ROUNDS}", statistics.median(times), 0, "")
+    row("the same, 95th percentile", times[int(len(times) * 0.95)], 0, "")
+
+
+def unpacked(machine):
+    entries = make_files(f"{machine.spare}/tree", FILES)
+    subprocess.run(["tar", "cf", f"{machine.spare}/t.tar", "-C", machine.spare, "tree"], check=True)
+    began = time.monotonic()
+    subprocess.run(["tar", "xf", f"{machine.spare}/t.tar", "-C", machine.root], check=True)
+    machine.await_count(f"{machine.root}/tree/", entries)
+    ours = time.monotonic() - began
+    machine.sync()
+
+    # The first index of the same files: their folder becomes a share's for the first time.
+    os.makedirs(f"{machine.spare}/other")
+    os.rename(f"{machine.spare}/tree", f"{machine.spare}/other/tree")
+    machine.ctl("share", "add", "first", f"{machine.spare}/other")
+    index = f"{machine.state}/shares/first"
+    began = time.monotonic()
+    machine.ctl("folder", "add", f"{machine.spare}/other")
+    queue = f"{index}/TALO@file_index_queue"
+    machine.wait(
+        lambda: not os.path.exists(queue) and not os.path.exists(queue + ".tmp"), index
+    )
+    reference = time.monotonic() - began
+    row(f"{FILES} files by tar, until found / first index", ours, reference, "2")
+    machine.ctl("share", "remove", "first")
+    shutil.rmtree(f"{machine.spare}/other")
+
+
+def renamed(machine):
+    """Both ways: by the service, and by the one line that the daemon is given alone."""
+    old, new = f"{machine.root}/tree", f"{machine.root}/moved"
+    entries = machine.count(f"{old}/")
+    ours, reference = [], []
+    for _ in range(3):
+        began = time.monotonic()
+        os.rename(old, new)
+        machine.wait(
+            lambda new=new, old=old: machine.count(f"{new}/") == entries
+            and machine.count(f"{old}/") == 0,
+            machine.index,
+        )
+        ours.append(time.monotonic() - began)
+        machine.sync()
+        old, new = new, old
+    machine.stop_notifier()
+    for _ in range(3):
+        began = time.monotonic()
+        os.rename(old, new)
+        machine.ctl("event", "bench", "256", new, "--path-old", old)
+        machine.wait(
+            lambda new=new, old=old: machine.count(f"{new}/") == entries
+            and machine.count(f"{old}/") == 0,
+            machine.index,
+        )
+        reference.append(time.monotonic() - began)
+        old, new = new, old
+    machine.start_notifier()
+    machine.sync()
+    row(
+        f"rename of {FILES} files / one line given",
+        statistics.median(ours),
+        statistics.median(reference),
+        "1.2",
+    )
+
+
+def recoll(machine):
+    """The same by recollindex in its monitoring mode, with an interval of one second."""
+    config = f"{machine.spare}/recoll"
+    top = f"{machine.spare}/top"
+    os.makedirs(config)
+    os.makedirs(top)
+    with open(f"{config}/recoll.conf", "w", encoding="ascii") as file:
+        file.write(f"topdirs = {top}\nindexallfilenames = 1\nmonauxinterval = 1\n"
+                   "monixinterval = 1\nnoContentSuffixes = .txt\n")
+    env = {**os.environ, "RECOLL_CONFDIR": config}
+
+    def count(part):
+        found = subprocess.run(
+            ["recollq", "-n", "1", f"dir:{part}"], env=env, capture_output=True, check=False
+        ).stdout.splitlines()
+        return int(found[1].split()[0]) if len(found) > 1 and found[1].split() else 0
+
+    subprocess.run(["recollindex"], env=env, check=True, capture_output=True)
+    monitor = subprocess.Popen(
+        ["recollindex", "-m", "-D", "-x", "-w", "0"],
+        env=env, stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL,
+    )
+    times = {}
+    try:
+        time.sleep(3)  # it tells nobody when it has begun to watch
+        for name, change in (
+            ("made", lambda: make_files(f"{top}/tree", FILES)),
+            ("moved", lambda: os.rename(f"{top}/tree", f"{top}/moved")),
+        ):
+            began = time.monotonic()
+            change()
+            part = f"{top}/tree" if name == "made" else f"{top}/moved"
+            while count(part) < FILES and time.monotonic() - began < 120:
+                time.sleep(0.05)
+            times[name] = time.monotonic() - began
+    finally:
+        monitor.kill()
+        monitor.wait()
+    return times
+
+
+def made_and_moved(machine):
+    shutil.rmtree(f"{machine.root}/tree", ignore_errors=True)
+    shutil.rmtree(f"{machine.root}/moved", ignore_errors=True)
+    machine.sync()
+    times = {}
+    began = time.monotonic()
+    entries = make_files(f"{machine.root}/new", FILES)
+    machine.await_count(f"{machine.root}/new/", entries)
+    times["made"] = time.monotonic() - began
+    machine.sync()
+    began = time.monotonic()
+    os.rename(f"{machine.root}/new", f"{machine.root}/new2")
+    machine.await_count(f"{machine.root}/new2/", entries)
+    times["moved"] = time.monotonic() - began
+    machine.sync()
+    peer = recoll(machine) if shutil.which("recollindex") else {"made": 0, "moved": 0}
+    row(f"{FILES} files made, until found / recollindex -m", times["made"], peer["made"], "0.2")
+    row("their folder renamed, until found / the same", times["moved"], peer["moved"], "0.2")
+
+
+def slowed(machine):
+    """tar and git, with the service at work and with somebody who reads the same events only."""
+    def work(number):
+        began = time.monotonic()
+        target = f"{machine.root}/slow{number}"
+        os.mkdir(target)
+        subprocess.run(["tar", "xf", f"{machine.spare}/t.tar", "-C", target], check=True)
+        ended = time.monotonic()
+        shutil.rmtree(target)
+        return ended - began
+
+    os.kill(machine.daemon_pid(), signal.SIGSTOP)
+    ours = statistics.median(work(number) for number in range(5))
+    machine.stop_notifier()
+    reader = subprocess.Popen([BARE_READER, machine.root], stdout=subprocess.PIPE)
+    reader.stdout.readline()
+    reference = statistics.median(work(number) for number in range(5))
+    reader.kill()
+    reader.wait()
+    os.kill(machine.daemon_pid(), signal.SIGCONT)
+    machine.start_notifier()
+    machine.sync()
+    row("tar x with the service / with a bare reader", ours, reference, "1.2")
+
+
+def burst(machine):
+    files = BURST // 3
+    began = time.monotonic()
+    os.makedirs(f"{machine.root}/burst")
+    for number in range(files):
+        path = f"{machine.root}/burst/{number}"
+        os.close(os.open(path, os.O_CREAT | os.O_WRONLY))
+        os.chmod(path, 0o600)
+        if number % 2:
+            os.rename(path, path + ".renamed")
+    made = time.monotonic()
+    machine.sync()
+    machine.ctl("verify", "bench")
+    row(f"{BURST} operations in {made - began:.1f} s, until all is found",
+        time.monotonic() - made, 60, "1", 1, "s")
+
+
+def at_rest(machine):
+    seconds = max(600 // DIVISOR, 10)
+    def used(pid):
+        with open(f"/proc/{pid}/stat", encoding="ascii", errors="replace") as file:
+            fields = file.read().rpartition(")")[2].split()
+        return (int(fields[11]) + int(fields[12])) / os.sysconf("SC_CLK_TCK")
+    def memory(pid):
+        with open(f"/proc/{pid}/status", encoding="ascii", errors="replace") as file:
+            return next(int(line.split()[1]) for line in file if line.startswith("VmRSS"))
+    pids = {"service": machine.notifier.pid, "daemon": machine.daemon_pid()}
+    began = {name: used(pid) for name, pid in pids.items()}
+    time.sleep(seconds)
+    for name, pid in pids.items():
+        row(f"{name} at rest for {seconds} s: processor", used(pid) - began[name], 0, "")
+        row(f"{name} at rest: resident / 20 MB", memory(pid) / 1000, 20, "1", 1, "MB")
+
+
+def main():
+    log = Log()
+    with tempfile.TemporaryDirectory(dir=os.environ["FILEINDEXD_BENCH_DIR"]) as folder:
+        machine = Machine(folder)
+        machine.start_daemon()
+        machine.start_notifier()
+        machine.sync()
+        one_new_file(machine)
+        unpacked(machine)
+        renamed(machine)
+        slowed(machine)
+        burst(machine)
+        made_and_moved(machine)
+        at_rest(machine)
+        machine.stop_notifier()
+        machine.stop_daemon()
+    del log
+
+
+if __name__ == "__main__":
+    main()

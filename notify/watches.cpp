@@ -1,0 +1,345 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "notify/watches.h"
+
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+#include <iterator>
+#include <optional>
+#include <set>
+#include <string_view>
+
+#include "notify/log.h"
+#include "state/belonging.h"
+#include "state/layout.h"
+#include "state/open_path.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Of one descriptor in one go: enough to keep up with the kernel, and the caller's other work is
+// not kept waiting for more than some milliseconds.
+constexpr int MOST_BUFFERS = 32;
+
+constexpr uint32_t NAMES = CREATED | DELETED | MOVED_FROM | MOVED_TO;
+
+// File systems that change without this kernel's doing.
+bool IsShared(std::string_view type) {
+  constexpr std::string_view TYPES[] = {"nfs",  "nfs4", "cifs",  "smb3",      "smbfs", "9p",
+                                        "ceph", "afs",  "ocfs2", "glusterfs", "gfs2",  "lustre"};
+  return std::find(std::begin(TYPES), std::end(TYPES), type) != std::end(TYPES) || type == "fuse" ||
+         type.starts_with("fuse.");
+}
+
+// Where a share's path leads, by way of links at or above its root.
+std::string RealPath(const std::string& path) {
+  char resolved[PATH_MAX];
+  return realpath(path.c_str(), resolved) != nullptr ? resolved : path;
+}
+
+uint64_t InodeOf(const std::string& path) {
+  struct stat st {};
+  return stat(path.c_str(), &st) == 0 ? st.st_ino : 0;
+}
+
+std::vector<IndexedFolder> FoldersOf(const Settings& settings, const std::string& share) {
+  std::vector<IndexedFolder> folders;
+  for (const IndexedFolder& folder : settings.folders) {
+    if (folder.share == share) {
+      folders.push_back(folder);
+    }
+  }
+  return folders;
+}
+
+bool AreSame(const std::vector<IndexedFolder>& a, const std::vector<IndexedFolder>& b) {
+  return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](const auto& one, const auto& other) {
+    return one.path == other.path && one.wanted == other.wanted && one.excludes == other.excludes;
+  });
+}
+
+const char* ProblemOfRoot(RootState state) {
+  switch (state) {
+    case RootState::MISSING:
+      return "its folder is missing";
+    case RootState::FOREIGN:
+      return "its folder lies on another file system than before";
+    case RootState::UNKNOWN:
+      return "its folder cannot be looked at";
+    case RootState::SOUND:
+      break;
+  }
+  return "";
+}
+
+std::string Join(const std::string& root, std::string_view below) {
+  if (below.empty()) {
+    return root;
+  }
+  return (root == "/" ? root : root + '/') + std::string(below);
+}
+
+// A path within the file system as a path of the share; none when it lies outside.
+std::optional<std::string> InShare(const ShareWatch& watch, const std::string& path) {
+  if (path.empty() || !Covers(watch.within, path)) {
+    return std::nullopt;
+  }
+  std::string_view below = std::string_view(path).substr(watch.within.size());
+  if (below.starts_with('/')) {
+    below.remove_prefix(1);
+  }
+  return Join(watch.root, below);
+}
+
+}  // namespace
+
+const char* WatchedByText(WatchedBy by) {
+  switch (by) {
+    case WatchedBy::FANOTIFY:
+      return "fanotify";
+    case WatchedBy::INOTIFY:
+      return "inotify";
+    case WatchedBy::COMPARISON:
+      return "comparison";
+    case WatchedBy::NOBODY:
+      break;
+  }
+  return nullptr;
+}
+
+bool Watches::BeginFanotify(const Mount& mount, ShareWatch& watch, std::string& refusal) {
+  if (best > WatchedBy::FANOTIFY) {
+    refusal = "fanotify is switched off";
+    return false;
+  }
+
+  std::unique_ptr<FanGroup>& group = groups[mount.device];
+  if (group == nullptr) {
+    group = FanGroup::Open(mount, refusal);
+  }
+  if (group == nullptr) {
+    groups.erase(mount.device);
+    return false;
+  }
+  watch.by = WatchedBy::FANOTIFY;
+  return true;
+}
+
+void Watches::Begin(const Share& share, const Mount& mount, ShareWatch& watch) {
+  std::string refusal;
+  if (IsShared(mount.type)) {
+    refusal = "others than this machine may change a file system of type " + mount.type;
+  } else if (BeginFanotify(mount, watch, refusal)) {
+    LogInfo("share %s is watched by fanotify", share.name.c_str());
+    return;
+  } else if (best <= WatchedBy::INOTIFY) {
+    std::string second;
+    watch.tree = TreeWatch::Open(settings, share, second);
+    if (watch.tree != nullptr) {
+      watch.by = WatchedBy::INOTIFY;
+      watch.problem = refusal;
+      LogInfo("share %s is watched by inotify, %zu directories: %s", share.name.c_str(),
+              watch.tree->Directories(), refusal.c_str());
+      return;
+    }
+    refusal += "; " + second;
+  }
+
+  watch.by = WatchedBy::COMPARISON;
+  watch.problem = refusal;
+  LogError("share %s is compared at an interval: %s", share.name.c_str(), refusal.c_str());
+}
+
+void Watches::FollowShare(const Share& share, News& news) {
+  std::vector<IndexedFolder> folders = FoldersOf(*settings, share.name);
+  ShareWatch& watch = shares[share.name];
+  const bool same_folders = AreSame(folders, watch.folders);
+  const bool had_folders = !watch.folders.empty();
+  watch.folders = std::move(folders);
+
+  const RootState state = LookAtRoot(share);
+  const std::string real = RealPath(share.path);
+  const Mount* mount = state == RootState::SOUND ? mounts.MountOf(real) : nullptr;
+  if (watch.folders.empty() || mount == nullptr) {
+    const std::string problem =
+        watch.folders.empty() ? "no folder of it is indexed" : ProblemOfRoot(state);
+    if (watch.by != WatchedBy::NOBODY || watch.problem != problem) {
+      LogInfo("share %s is not watched: %s", share.name.c_str(), problem.c_str());
+    }
+    watch.by = WatchedBy::NOBODY;
+    watch.problem = problem;
+    watch.tree.reset();
+    watch.points.clear();
+    return;
+  }
+
+  const uint64_t inode = InodeOf(share.path);
+  const std::string within = MountTable::PathWithin(*mount, real);
+  const bool same_place = watch.by != WatchedBy::NOBODY && watch.root == share.path &&
+                          watch.root_inode == inode && watch.mount == mount->id &&
+                          watch.device == mount->device && watch.within == within;
+  const bool broken = (watch.by == WatchedBy::FANOTIFY && !groups.contains(watch.device)) ||
+                      (watch.by == WatchedBy::INOTIFY && (!same_folders || watch.tree == nullptr));
+
+  std::vector<std::string> points = mounts.PointsBelow(real);
+  std::erase(points, real);
+  if (!same_place || broken) {
+    const uint64_t overflows = watch.overflows;
+    std::vector<IndexedFolder> kept = std::move(watch.folders);
+    watch = {};
+    watch.folders = std::move(kept);
+    watch.overflows = overflows;
+    watch.root = share.path;
+    watch.root_inode = inode;
+    watch.mount = mount->id;
+    watch.device = mount->device;
+    watch.within = within;
+    Begin(share, *mount, watch);
+    news.appeared.push_back(share.name);
+  } else {
+    if (!same_folders && had_folders) {
+      news.changed.push_back(share.name);
+    }
+    std::vector<std::string> differing;
+    std::set_symmetric_difference(points.begin(), points.end(), watch.points.begin(),
+                                  watch.points.end(), std::back_inserter(differing));
+    for (const std::string& point : differing) {
+      news.mounts.emplace_back(share.name, Join(share.path, BelowRoot(real, point)));
+    }
+  }
+  watch.points = std::move(points);
+}
+
+Watches::News Watches::Follow(const std::shared_ptr<const Settings>& in_force) {
+  News news;
+  settings = in_force;
+  if (!mounts.Read()) {
+    LogError("the mount table cannot be read: %m");
+  }
+
+  std::erase_if(
+      shares, [this](const auto& known) { return settings->ShareByName(known.first) == nullptr; });
+  for (const Share& share : settings->shares) {
+    FollowShare(share, news);
+  }
+  DropUnusedGroups();
+  return news;
+}
+
+// A group holds its device, which its users may want to take out.
+void Watches::DropUnusedGroups() {
+  std::set<std::string> used;
+  for (const auto& [name, watch] : shares) {
+    if (watch.by == WatchedBy::FANOTIFY) {
+      used.insert(watch.device);
+    }
+  }
+  std::erase_if(groups, [&used](const auto& group) { return !used.contains(group.first); });
+}
+
+void Watches::Tell(const std::string& device, const Change& change, const TellShare& tell,
+                   Reading& reading) {
+  for (const auto& [name, watch] : shares) {
+    if (watch.by != WatchedBy::FANOTIFY || watch.device != device) {
+      continue;
+    }
+    const bool above =
+        (change.what & NAMES) != 0 && (Covers(change.path, watch.within) ||
+                                       (!change.from.empty() && Covers(change.from, watch.within)));
+    reading.roots_moved = reading.roots_moved || above;
+
+    const std::optional<std::string> path = InShare(watch, change.path);
+    const std::optional<std::string> from = InShare(watch, change.from);
+    if (path.has_value()) {
+      tell(name, {change.what, change.directory, *path, from.value_or("")});
+    } else if (from.has_value()) {
+      tell(name, {MOVED_FROM, change.directory, *from, ""});
+    }
+  }
+}
+
+void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
+  for (auto group = groups.begin(); group != groups.end();) {
+    const std::string& device = group->first;
+    FanGroup& events = *group->second;
+    FanGroup::Result result = FanGroup::Result::MORE;
+    for (int n = 0; n < MOST_BUFFERS && result == FanGroup::Result::MORE; ++n) {
+      result = events.Read([&](const Change& change) { Tell(device, change, tell, reading); });
+    }
+
+    const bool overflown = events.TakeOverflow();
+    for (auto& [name, watch] : shares) {
+      if (overflown && watch.by == WatchedBy::FANOTIFY && watch.device == device) {
+        ++watch.overflows;
+        reading.overflown.push_back(name);
+      }
+    }
+    if (result == FanGroup::Result::FAILED) {
+      LogError("fanotify on device %s: reading failed: %m", device.c_str());
+      reading.roots_moved = true;
+      group = groups.erase(group);
+      continue;
+    }
+    reading.all_read = reading.all_read && result == FanGroup::Result::EMPTY;
+    ++group;
+  }
+}
+
+void Watches::ReadTrees(const TellShare& tell, Reading& reading) {
+  for (auto& [name, watch] : shares) {
+    if (watch.tree == nullptr) {
+      continue;
+    }
+    TreeWatch::Result result = TreeWatch::Result::MORE;
+    for (int n = 0; n < MOST_BUFFERS && result == TreeWatch::Result::MORE; ++n) {
+      result = watch.tree->Read([&](const Change& change) {
+        reading.roots_moved =
+            reading.roots_moved || ((change.what & NAMES) != 0 && Covers(change.path, watch.root));
+        tell(name, change);
+      });
+    }
+    if (watch.tree->TakeOverflow()) {
+      ++watch.overflows;
+      reading.overflown.push_back(name);
+    }
+    if (result == TreeWatch::Result::FAILED) {
+      LogError("share %s: %s", name.c_str(), watch.tree->Error().c_str());
+      watch.tree.reset();
+      reading.roots_moved = true;
+      continue;
+    }
+    reading.all_read = reading.all_read && result == TreeWatch::Result::EMPTY;
+  }
+}
+
+Watches::Reading Watches::Read(const TellShare& tell) {
+  Reading reading;
+  ReadGroups(tell, reading);
+  ReadTrees(tell, reading);
+  return reading;
+}
+
+std::vector<int> Watches::Descriptors() const {
+  std::vector<int> descriptors;
+  for (const auto& [device, group] : groups) {
+    descriptors.push_back(group->Descriptor());
+  }
+  for (const auto& [name, watch] : shares) {
+    if (watch.tree != nullptr) {
+      descriptors.push_back(watch.tree->Descriptor());
+    }
+  }
+  return descriptors;
+}
+
+bool Watches::IsAnyMissing() const {
+  return std::any_of(shares.begin(), shares.end(), [](const auto& share) {
+    return share.second.by == WatchedBy::NOBODY && !share.second.folders.empty();
+  });
+}
+
+}  // namespace fileindexd

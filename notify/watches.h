@@ -1,0 +1,94 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// How each share is watched: the best that its file system allows.
+//
+//   fanotify     one mark for each file system, whatever the number of its shares and directories
+//   inotify      one watch for each directory, where the file system cannot be marked
+//   comparison   none at all: on file systems that others change as well (network, FUSE), and where
+//                neither of the two can be had
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "notify/change.h"
+#include "notify/fan_group.h"
+#include "notify/mount_table.h"
+#include "notify/tree_watch.h"
+#include "state/settings.h"
+
+namespace fileindexd {
+
+enum class WatchedBy { FANOTIFY, INOTIFY, COMPARISON, NOBODY };  // from the best down
+// "fanotify", "inotify", "comparison"; null for NOBODY.
+const char* WatchedByText(WatchedBy by);
+
+struct ShareWatch {
+  WatchedBy by = WatchedBy::NOBODY;
+  std::string problem;  // why it is not watched, or not better; empty: none
+  std::string root;     // the share's path
+  uint64_t root_inode = 0;
+  uint64_t mount = 0;               // id of the mount that shows the root
+  std::string device;               // of that mount
+  std::string within;               // the root's path within the file system
+  std::vector<std::string> points;  // what is mounted inside the share
+  std::unique_ptr<TreeWatch> tree;  // by INOTIFY
+  std::vector<IndexedFolder> folders;
+  uint64_t overflows = 0;
+};
+
+// One thread.
+class Watches {
+ public:
+  // `best_way`: nothing better than that is tried.
+  explicit Watches(WatchedBy best_way) : best(best_way) {}
+
+  // What the caller has to do after a change of settings or mounts.
+  struct News {
+    std::vector<std::string> appeared;  // shares that are watched anew: what came before is unknown
+    std::vector<std::string> changed;   // shares whose folders are others than before
+    std::vector<std::pair<std::string, std::string>> mounts;  // share, and a path in it where
+                                                              // something was mounted or unmounted
+  };
+  // Brings the watches into line with the settings, the mounts and the shares' roots of now.
+  News Follow(const std::shared_ptr<const Settings>& in_force);
+
+  using TellShare = std::function<void(const std::string& share, const Change& change)>;
+  struct Reading {
+    bool all_read = true;                // nothing waits any more
+    bool roots_moved = false;            // something happened at or above a share's root, or a
+                                         // watch broke: Follow is due
+    std::vector<std::string> overflown;  // shares of which events were lost
+  };
+  // Reads what waits, a bounded number of buffers.
+  Reading Read(const TellShare& tell);
+
+  // All descriptors that can be read from.
+  std::vector<int> Descriptors() const;
+
+  // Whether a share that should be watched is not there: it may come without a sign.
+  bool IsAnyMissing() const;
+
+  std::map<std::string, ShareWatch> shares;  // by name
+
+ private:
+  void FollowShare(const Share& share, News& news);
+  void Begin(const Share& share, const Mount& mount, ShareWatch& watch);
+  bool BeginFanotify(const Mount& mount, ShareWatch& watch, std::string& refusal);
+  void Tell(const std::string& device, const Change& change, const TellShare& tell,
+            Reading& reading);
+  void ReadGroups(const TellShare& tell, Reading& reading);
+  void ReadTrees(const TellShare& tell, Reading& reading);
+  void DropUnusedGroups();
+
+  const WatchedBy best;
+  MountTable mounts;
+  std::shared_ptr<const Settings> settings;
+  std::map<std::string, std::unique_ptr<FanGroup>> groups;  // by device
+};
+
+}  // namespace fileindexd
