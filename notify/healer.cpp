@@ -61,8 +61,8 @@ bool IsPaused(StateStore& store) {
   return store.GetPause(resume_time) && (resume_time == 0 || resume_time > std::time(nullptr));
 }
 
-// All of it is guarded by the mutex but for the descriptor's number, which never changes. Shared
-// by the healer and its threads.
+// The healer's and its threads'. The descriptor and `pressure_folder` never change; the mutex
+// guards the rest.
 struct Shared {
   Running& Of(Urgency urgency) { return urgency == Urgency::NOW ? now : idle; }
   bool IsOver(Urgency urgency) { return stopping || Of(urgency).dropped; }
@@ -86,6 +86,7 @@ struct Shared {
   Running now;
   Running idle;
   std::vector<Healing> ended;
+  std::string pressure_folder;
   ScopedFd ready;  // an event counter; not 0 while there is something in `ended`
 };
 
@@ -176,7 +177,8 @@ void Shared::BackOff(Urgency urgency, Clock::duration worked) {
   const Clock::duration most =
       is_idle ? Clock::duration(IDLE_BACK_OFF) : std::min<Clock::duration>(worked, NOW_BACK_OFF);
   const Clock::time_point deadline = Clock::now() + most;
-  while (Clock::now() < deadline && ReadPressure() > (is_idle ? IDLE_PRESSURE : NOW_PRESSURE)) {
+  while (Clock::now() < deadline &&
+         ReadPressure(pressure_folder) > (is_idle ? IDLE_PRESSURE : NOW_PRESSURE)) {
     std::unique_lock lock(mutex);
     const auto until = std::min(deadline, Clock::now() + PRESSURE_LOOK);
     // An idle one that has to give way has backed off enough.
@@ -195,7 +197,8 @@ struct Healer::Impl {
   LooseThread idle;
 };
 
-Healer::Healer() : impl(std::make_unique<Impl>()) {
+Healer::Healer(std::string pressure_folder) : impl(std::make_unique<Impl>()) {
+  impl->shared->pressure_folder = std::move(pressure_folder);
   impl->shared->ready.fd = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
 }
 

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "index/compare.h"
+#include "notify/pressure.h"
 #include "state/queue_folding.h"
 
 namespace fileindexd {
@@ -35,7 +36,7 @@ class Healer {
   bool Start();
   // Ends what runs within a second. The destructor does the same.
   void Stop();
-  Healer();
+  explicit Healer(std::string pressure_folder = PRESSURE_FOLDER);
   ~Healer();
   Healer(const Healer&) = delete;
   Healer& operator=(const Healer&) = delete;

@@ -19,7 +19,7 @@ namespace {
 
 constexpr int GENEROUS = 60000;  // milliseconds
 // More than are compared in one piece.
-constexpr int MANY_FILES = 12000;
+constexpr int MANY_FILES = 2000;
 
 }  // namespace
 
@@ -67,6 +67,10 @@ class HealerTest : public IndexTest {
     }
   }
 
+  void SayPressure(const std::string& percent) {
+    WriteFile(folder + "/io", "some avg10=" + percent + " avg60=0.00\n");
+  }
+
   // A second share, without an index: comparing it fails at once.
   void AddShareWithoutIndex() {
     MakeFolder(folder + "/other");
@@ -79,7 +83,7 @@ class HealerTest : public IndexTest {
   void Pause() { ASSERT_TRUE(store->SetPause(0)); }
   void Resume() { ASSERT_TRUE(store->SetPause(-1)); }
 
-  Healer healer;  // goes first: its threads use the rest
+  Healer healer{folder};  // goes first: its threads use the rest
 };
 
 TEST_F(HealerTest, DifferencesComeAsLinesThatMendThem) {
@@ -129,6 +133,19 @@ TEST_F(HealerTest, ComparisonsOfEveryUrgencyReadTheWholeShare) {
     EXPECT_EQ(healing.counts.compared, MANY_FILES + 2U);
     EXPECT_EQ(Lines(healing), Names{std::to_string(QLIB_NOTIFY_CLOSE_WRITE) + " zzz"});
   }
+}
+
+TEST_F(HealerTest, PressureSlowsAComparisonAndDoesNotEndIt) {
+  MakeManyFiles();
+  SayPressure("100.00");
+  Start();
+  healer.Request("s", Urgency::NOW);
+  EXPECT_EQ(Await(1)[0].counts.compared, MANY_FILES + 1U);
+
+  healer.Request("s", Urgency::IDLE);
+  AwaitBegin("s");
+  healer.Request("s", Urgency::NOW);
+  EXPECT_EQ(Await(1)[0].counts.compared, MANY_FILES + 1U);
 }
 
 TEST_F(HealerTest, FailureIsToldWithItsReasonAndWithoutLines) {
