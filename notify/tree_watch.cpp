@@ -149,7 +149,7 @@ bool TreeWatch::Impl::HandleSelf(const Event& event, const TellChange& tell) {
   }
   if (is_root && (event.mask & IN_ATTRIB) != 0) {
     tell({ATTRIBUTES, true, watcher.share.path});
-  } else if ((event.mask & IN_IGNORED) != 0) {
+  } else if (folder->parent != nullptr && (event.mask & IN_IGNORED) != 0) {
     watcher.Drop(*folder->parent, std::string(folder->name));
   }
   return true;
