@@ -71,11 +71,9 @@ struct Record {
   Place before;  // of a rename
 };
 
-Record Parsed(fanotify_event_metadata& metadata) {
+Record Parsed(const fanotify_event_metadata& metadata, char* at, const char* end) {
   Record record;
   record.mask = metadata.mask;
-  char* at = reinterpret_cast<char*>(&metadata) + metadata.metadata_len;
-  char* const end = reinterpret_cast<char*>(&metadata) + metadata.event_len;
   while (end - at >=
          static_cast<ptrdiff_t>(sizeof(fanotify_event_info_fid) + sizeof(file_handle))) {
     auto* info = reinterpret_cast<fanotify_event_info_fid*>(at);
@@ -221,14 +219,17 @@ FanGroup::Result FanGroup::Read(const TellChange& tell) {
   }
 
   impl->names.Forget();
-  auto left = static_cast<size_t>(got);
-  auto* metadata = reinterpret_cast<fanotify_event_metadata*>(impl->buffer.data());
-  for (; FAN_EVENT_OK(metadata, left); metadata = FAN_EVENT_NEXT(metadata, left)) {
-    if (metadata->vers != FANOTIFY_METADATA_VERSION) {
+  char* at = reinterpret_cast<char*>(impl->buffer.data());
+  const char* const end = at + got;
+  // Records begin at multiples of four, and this head asks for eight: hence the copy.
+  fanotify_event_metadata head{};
+  for (; end - at >= static_cast<ptrdiff_t>(sizeof head); at += head.event_len) {
+    memcpy(&head, at, sizeof head);
+    if (head.vers != FANOTIFY_METADATA_VERSION) {
       errno = EPROTO;
       return Result::FAILED;
     }
-    impl->Tell(Parsed(*metadata), tell);
+    impl->Tell(Parsed(head, at + head.metadata_len, at + head.event_len), tell);
   }
   return Result::MORE;
 }

@@ -2,11 +2,17 @@
 #include "notify/fan_group.h"
 
 #include <fcntl.h>
+#include <linux/filter.h>
+#include <linux/seccomp.h>
+#include <sys/fanotify.h>
 #include <sys/mount.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstddef>
 #include <filesystem>
 
 #include "base/scoped_fd.h"
@@ -335,6 +341,39 @@ TEST_F(FanGroupTest, LostEventsAreToldOnce) {
   EXPECT_FALSE(group->TakeOverflow());
   Put("/after");
   EXPECT_EQ(Told(), Texts{"create+modify+write /after"});
+}
+
+// As a kernel before 5.17 answers, for this process from now on.
+bool RefuseRenameMarks() {
+  sock_filter steps[] = {
+      BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)),
+      BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, SYS_fanotify_mark, 0, 3),
+      BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, args[2])),
+      BPF_JUMP(BPF_JMP | BPF_JSET | BPF_K, FAN_RENAME, 0, 1),
+      BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | EINVAL),
+      BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW),
+  };
+  const sock_fprog program{static_cast<unsigned short>(std::size(steps)), steps};
+  return prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program) == 0;
+}
+
+TEST_F(FanGroupTest, OldKernelsTellTheEndsOfARename) {
+  MountTmpfs(root);
+  const int result = WaitFor(Fork([&] {
+    if (!RefuseRenameMarks()) {
+      return 1;
+    }
+    Open(root);
+    if (group == nullptr) {
+      return 2;
+    }
+    MakeFolder(root + "/d");
+    Rename("/d", "/e");
+    Put("/e/f");
+    return Sorted(Told()) == Sorted({"create+from /d/", "to /e/", "create+modify+write /e/f"}) ? 0
+                                                                                               : 3;
+  }));
+  EXPECT_EQ(result, 0);
 }
 
 // Folders of 200 bytes, one in the other: the innermost of `depth` is left as working directory.
