@@ -208,6 +208,10 @@ void AddQuestions(Declarer& declare) {
   AddOption(search, "--limit", into.limit, "N", "At most so many hits; 20 if not given");
   AddOption(search, "--offset", into.offset, "N", "Leave out so many of the best");
   search->add_flag("--count", into.count, "The number of hits alone");
+  CLI::Option* wait =
+      search->add_flag("--wait", into.wait, "Once all that has happened to files is in the index");
+  AddOption(search, "--timeout", into.timeout, "S", "Wait for S seconds at most; 60 if not given")
+      ->needs(wait);
   CLI::Option* search_json = AddJson(search, into, "One JSON object a line");
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")
       ->excludes(search_json);
@@ -265,8 +269,9 @@ Command ParseCommandLine(const std::vector<std::string>& given, Arguments& argum
   std::vector<std::string> line = given;
   const bool is_search = !given.empty() && given.front() == "search";
   if (is_search) {
-    const SearchArguments split = SplitSearchArguments(
-        {given.begin() + 1, given.end()}, {"--share", "--kind", "--under", "--limit", "--offset"});
+    const SearchArguments split =
+        SplitSearchArguments({given.begin() + 1, given.end()},
+                             {"--share", "--kind", "--under", "--limit", "--offset", "--timeout"});
     line = {"search"};
     line.insert(line.end(), split.options.begin(), split.options.end());
     for (const std::string& word : split.words) {

@@ -27,6 +27,7 @@ struct Arguments {
   std::optional<std::string> under;
   std::optional<std::string> limit;
   std::optional<std::string> offset;
+  std::optional<std::string> timeout;
   std::optional<bool> document;
   std::optional<bool> audio;
   std::optional<bool> video;
@@ -39,6 +40,7 @@ struct Arguments {
   bool repair = false;
   bool nul_ended = false;
   bool follow = false;
+  bool wait = false;
 };
 
 using Command = int (*)(const Arguments& arguments);

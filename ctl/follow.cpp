@@ -9,7 +9,8 @@
 //
 // and a second at most while something runs, until the end of a pause at most. What is watched is
 // watched before it is looked at, so nothing is missed. Between two looks lies a fifth of a second:
-// a busy daemon writes all the time.
+// a busy daemon writes all the time. The notification service is asked at a look, at most once a
+// second; that time has gone on, and up to when the index is complete, is nothing new.
 #include "ctl/follow.h"
 
 #include <fcntl.h>
@@ -224,8 +225,9 @@ std::string OnScreen(const std::string& text, bool first) {
 // Milliseconds until it may look different without anything happening; -1: it will not.
 int Timeout(const StatusReport& report) {
   const bool runs =
-      std::any_of(report.shares.begin(), report.shares.end(),
-                  [](const ShareReport& share) { return share.work || share.comparison; });
+      std::any_of(report.shares.begin(), report.shares.end(), [](const ShareReport& share) {
+        return share.work || share.comparison || share.watch.comparing || share.watch.backlog > 0;
+      });
   if (runs) {
     return TICK_MS;
   }
@@ -236,6 +238,37 @@ int Timeout(const StatusReport& report) {
   return static_cast<int>(
              std::clamp<int64_t>(*report.paused_until - std::time(nullptr), 1, LONGEST_S)) *
          1000;
+}
+
+// True when the service was asked now.
+bool AskIfDue(Watches& watches) {
+  const bool is_due = Watches::Clock::now() >= watches.NextAsk();
+  if (is_due) {
+    watches.Ask();
+  }
+  return is_due;
+}
+
+// The same, or what is left until the service may be asked again.
+int UntilNextAsk(const Watches& watches, int timeout_ms) {
+  const auto left =
+      std::chrono::ceil<std::chrono::milliseconds>(watches.NextAsk() - Watches::Clock::now());
+  const int left_ms = std::max(static_cast<int>(left.count()), 1);
+  return timeout_ms < 0 ? left_ms : std::min(timeout_ms, left_ms);
+}
+
+std::string Text(const StatusReport& report, bool json) {
+  return json ? ToText(ReportObject(report)) + "\n" : ReportText(report);
+}
+
+// What has to differ for another block.
+std::string Core(StatusReport report, bool json) {
+  for (ShareReport& share : report.shares) {
+    if (share.watch.complete_until) {
+      share.watch.complete_until = 0;
+    }
+  }
+  return Text(report, json);
 }
 
 }  // namespace
@@ -249,25 +282,29 @@ int FollowStatus(Session& session, bool json) {
   const bool in_place = follower.is_terminal && !json;
   std::string shown;
   int error = 0;
+  Watches watches;
   StatusReport report;
   for (Event event = Event::CHANGE; event != Event::STOP;) {
     const std::shared_ptr<const Settings> watched = session.settings;
     follower.Watch(*watched);
-    if (!MakeReport(session, report)) {
+    const bool is_asked = AskIfDue(watches);
+    if (!MakeReport(session, watches, report)) {
       return EXIT_FAILED;
     }
     if (!follower.WatchDaemon(report.daemon) || session.settings != watched) {
       continue;
     }
-    const std::string text = json ? ToText(ReportObject(report)) + "\n" : ReportText(report);
-    if (text != shown || event == Event::WINDOW) {
+    const std::string core = Core(report, json);
+    if (core != shown || event == Event::WINDOW) {
+      const std::string text = Text(report, json);
       const char* between = json || shown.empty() ? "" : "\n";
       if (!follower.Write(in_place ? OnScreen(text, shown.empty()) : between + text, error)) {
         break;
       }
-      shown = text;
+      shown = core;
     }
-    event = follower.Wait(Timeout(report));
+    const int timeout_ms = Timeout(report);
+    event = follower.Wait(is_asked ? timeout_ms : UntilNextAsk(watches, timeout_ms));
   }
   if (in_place) {
     int ignored = 0;

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdint>
 #include <cstdio>
 #include <optional>
@@ -13,6 +14,7 @@
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "ctl/values.h"
+#include "ctl/wait.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -39,7 +41,8 @@ bool IsAboveShare(const Settings& settings, const std::string& path) {
                      [&path](const Share& share) { return Covers(path, share.path); });
 }
 
-// False, with its line written, when there is nothing to ask.
+// The shares to be searched, those without an index included. False, with its line written, when
+// there is nothing to ask.
 bool ChooseShares(const Session& session, const Arguments& arguments, Question& question) {
   if (arguments.in_share && session.FindShare(*arguments.in_share) == nullptr) {
     return false;
@@ -63,11 +66,25 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
     const bool named = !arguments.in_share || share.name == *arguments.in_share;
     const bool reached = question.under.empty() || Covers(question.under, share.path) ||
                          Covers(share.path, question.under);
-    // A share without an index yet holds nothing to find: that is no failure.
-    if (named && reached && !IsDirectoryGone(IndexPath(share.name))) {
+    if (named && reached) {
       question.shares.push_back(share.name);
     }
   }
+  return true;
+}
+
+bool ReadSeconds(const Arguments& arguments, std::chrono::seconds& patience) {
+  constexpr uint64_t LONGEST = uint64_t{100000} * 24 * 60 * 60;  // safe to add to a time
+  auto seconds = static_cast<uint64_t>(patience.count());
+  if (!ReadCount("--timeout", arguments.timeout, seconds)) {
+    return false;
+  }
+  if (seconds == 0) {
+    (void)Fail(EXIT_USAGE, "search: --timeout: must be at least 1");
+    return false;
+  }
+
+  patience = std::chrono::seconds(std::min(seconds, LONGEST));
   return true;
 }
 
@@ -141,8 +158,10 @@ void PutHits(const std::vector<Hit>& hits, const Arguments& arguments) {
 int Search(const Arguments& arguments) {
   Question question;
   question.text = arguments.query;
+  std::chrono::seconds patience(60);
   if (!ReadCount("--limit", arguments.limit, question.limit) ||
-      !ReadCount("--offset", arguments.offset, question.offset)) {
+      !ReadCount("--offset", arguments.offset, question.offset) ||
+      !ReadSeconds(arguments, patience)) {
     return EXIT_USAGE;
   }
   if (arguments.kind) {
@@ -153,6 +172,15 @@ int Search(const Arguments& arguments) {
   if (!session.Open() || !ChooseShares(session, arguments, question)) {
     return EXIT_FAILED;
   }
+  if (arguments.wait) {
+    const int code = AwaitChanges(session, question.shares, patience);
+    if (code != EXIT_DONE) {
+      return code;
+    }
+  }
+  // A share without an index yet holds nothing to find: that is no failure.
+  std::erase_if(question.shares,
+                [](const std::string& share) { return IsDirectoryGone(IndexPath(share)); });
 
   Answer answer;
   std::string error;

@@ -92,7 +92,7 @@ bool IsRemoved(Session& session, const std::string& name) {
 
 }  // namespace
 
-bool MakeReport(Session& session, StatusReport& report) {
+bool MakeReport(Session& session, const Watches& watches, StatusReport& report) {
   int64_t resume_time = -1;
   std::shared_ptr<const Settings> settings;
   if (!session.store->GetSettings(settings) || !session.store->GetPause(resume_time)) {
@@ -107,6 +107,7 @@ bool MakeReport(Session& session, StatusReport& report) {
   for (const Share& share : settings->shares) {
     ShareReport found;
     if (ReportShare(session, share, found)) {
+      found.watch = watches.Of(share.name);
       report.shares.push_back(std::move(found));
       continue;
     }
@@ -128,8 +129,10 @@ int Status(const Arguments& arguments) {
     return FollowStatus(session, arguments.json);
   }
 
+  Watches watches;
+  watches.Ask();
   StatusReport report;
-  if (!MakeReport(session, report)) {
+  if (!MakeReport(session, watches, report)) {
     return EXIT_FAILED;
   }
   if (arguments.json) {

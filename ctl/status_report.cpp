@@ -82,7 +82,7 @@ Json::Value ShareObject(const ShareReport& report) {
   object["no_space"] = report.no_space;
   object["contents_waiting"] = static_cast<Json::UInt64>(report.index.wanted);
   object["contents_failed"] = 0;
-  object["watched_by"] = "none";
+  AddWatch(object, report.watch);
   object["progress"] = WorkObject(report.work ? report.work : report.comparison);
   if (!report.index_problem.empty()) {
     object["index_problem"] = report.index_problem;
@@ -152,6 +152,9 @@ void AddShare(std::string& text, const ShareReport& report) {
   AddLine(text, "last commit", last_commit == 0 ? "none" : LocalTime(last_commit));
   AddLine(text, "needs reindex", report.needs_reindex ? "yes" : "no");
   AddLine(text, "no space", report.no_space ? "yes" : "no");
+  for (const auto& [label, value] : WatchLines(report.watch)) {
+    AddLine(text, label, value);
+  }
   for (const auto& work : {report.work, report.comparison}) {
     if (work) {
       AddLine(text, "in progress", WorkLine(*work));

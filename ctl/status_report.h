@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "ctl/places.h"
+#include "ctl/watch_report.h"
 #include "index/reader.h"
 #include "state/belonging.h"
 #include "state/progress.h"
@@ -30,6 +31,7 @@ struct ShareReport {
   std::vector<std::string> gone_folders;
   std::optional<ProgressRecord> work;        // of the Worker
   std::optional<ProgressRecord> comparison;  // of whoever compares
+  WatchReport watch;
 };
 
 struct StatusReport {
@@ -38,9 +40,9 @@ struct StatusReport {
   std::vector<ShareReport> shares;
 };
 
-// Looks at everything, under the settings in force, which are the session's then. False, with its
-// line written, when the store cannot be read.
-bool MakeReport(Session& session, StatusReport& report);
+// Looks at everything, under the settings in force, which are the session's then; `watches` is what
+// the notification service told. False, with its line written, when the store cannot be read.
+bool MakeReport(Session& session, const Watches& watches, StatusReport& report);
 
 Json::Value ReportObject(const StatusReport& report);
 // Lines for people.

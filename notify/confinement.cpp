@@ -52,8 +52,11 @@ uint64_t WantedCapabilities() {
 bool DropCapabilities(std::string& error) {
   const uint64_t wanted = WantedCapabilities();
   // The bounding set first: changing it takes a capability that goes with the others.
-  for (int capability = 0; prctl(PR_CAPBSET_READ, capability, 0, 0, 0) >= 0; ++capability) {
-    if ((wanted & Bit(capability)) == 0 && prctl(PR_CAPBSET_DROP, capability, 0, 0, 0) != 0) {
+  int is_bound = 0;
+  for (int capability = 0; is_bound >= 0; ++capability) {
+    is_bound = prctl(PR_CAPBSET_READ, capability, 0, 0, 0);  // negative beyond the last
+    if (is_bound == 1 && (wanted & Bit(capability)) == 0 &&
+        prctl(PR_CAPBSET_DROP, capability, 0, 0, 0) != 0) {
       return Failed("bounding set of capabilities", error);
     }
   }

@@ -32,22 +32,6 @@ std::string Reason(const char* call) {
   return std::string(call) + ": " + strerror(errno);  // NOLINT: glibc's is safe
 }
 
-// Some of these can be marked, and tell of what is done on this machine alone.
-bool IsChangedElsewhere(const std::string& type) {
-  constexpr std::array<std::string_view, 16> SHARED = {
-      "9p",   "afs",    "beegfs", "ceph", "cifs", "fuse",  "fuseblk", "gfs2",
-      "gpfs", "lustre", "ncpfs",  "nfs",  "nfs4", "ocfs2", "smb3",    "virtiofs"};
-  if (type.starts_with("fuse.")) {
-    return true;
-  }
-  for (const std::string_view shared : SHARED) {
-    if (type == shared) {
-      return true;
-    }
-  }
-  return false;
-}
-
 uint32_t HappeningsOf(uint64_t mask) {
   constexpr std::pair<uint64_t, uint32_t> BITS[] = {
       {FAN_CREATE, CREATED},      {FAN_MODIFY, MODIFIED}, {FAN_ATTRIB, ATTRIBUTES},

@@ -13,6 +13,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <iterator>
 #include <optional>
 #include <unordered_set>
 
@@ -167,6 +168,14 @@ std::vector<std::string> MountTable::PointsBelow(std::string_view path) const {
   std::sort(points.begin(), points.end());
   points.erase(std::unique(points.begin(), points.end()), points.end());
   return points;
+}
+
+bool IsChangedElsewhere(std::string_view type) {
+  constexpr std::string_view SHARED[] = {"9p",   "afs",  "beegfs", "ceph",   "cifs",
+                                         "fuse", "gfs2", "gpfs",   "lustre", "ncpfs",
+                                         "nfs",  "nfs4", "ocfs2",  "smb3",   "virtiofs"};
+  return std::find(std::begin(SHARED), std::end(SHARED), type) != std::end(SHARED) ||
+         type.starts_with("fuse.");
 }
 
 }  // namespace fileindexd

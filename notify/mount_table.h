@@ -39,4 +39,8 @@ class MountTable {
   std::vector<Mount> mounts;  // in the order of the table: later ones hide earlier ones
 };
 
+// Whether others than this machine change file systems of that type: no event tells of it, though
+// some of them can be watched.
+bool IsChangedElsewhere(std::string_view type);
+
 }  // namespace fileindexd

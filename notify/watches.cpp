@@ -27,14 +27,6 @@ constexpr int MOST_BUFFERS = 32;
 
 constexpr uint32_t NAMES = CREATED | DELETED | MOVED_FROM | MOVED_TO;
 
-// File systems that change without this kernel's doing.
-bool IsShared(std::string_view type) {
-  constexpr std::string_view TYPES[] = {"nfs",  "nfs4", "cifs",  "smb3",      "smbfs", "9p",
-                                        "ceph", "afs",  "ocfs2", "glusterfs", "gfs2",  "lustre"};
-  return std::find(std::begin(TYPES), std::end(TYPES), type) != std::end(TYPES) || type == "fuse" ||
-         type.starts_with("fuse.");
-}
-
 // Where a share's path leads, by way of links at or above its root.
 std::string RealPath(const std::string& path) {
   char resolved[PATH_MAX];
@@ -131,7 +123,7 @@ bool Watches::BeginFanotify(const Mount& mount, ShareWatch& watch, std::string& 
 
 void Watches::Begin(const Share& share, const Mount& mount, ShareWatch& watch) {
   std::string refusal;
-  if (IsShared(mount.type)) {
+  if (IsChangedElsewhere(mount.type)) {
     refusal = "others than this machine may change a file system of type " + mount.type;
   } else if (BeginFanotify(mount, watch, refusal)) {
     LogInfo("share %s is watched by fanotify", share.name.c_str());
@@ -182,11 +174,13 @@ void Watches::FollowShare(const Share& share, News& news) {
   const bool same_place = watch.by != WatchedBy::NOBODY && watch.root == share.path &&
                           watch.root_inode == inode && watch.mount == mount->id &&
                           watch.device == mount->device && watch.within == within;
-  const bool broken = (watch.by == WatchedBy::FANOTIFY && !groups.contains(watch.device)) ||
-                      (watch.by == WatchedBy::INOTIFY && (!same_folders || watch.tree == nullptr));
-
   std::vector<std::string> points = mounts.PointsBelow(real);
   std::erase(points, real);
+  // A tree of watches is of its settings and mounts: what a mount hid was not watched.
+  const bool broken = (watch.by == WatchedBy::FANOTIFY && !groups.contains(watch.device)) ||
+                      (watch.by == WatchedBy::INOTIFY &&
+                       (!same_folders || watch.tree == nullptr || points != watch.points));
+
   if (!same_place || broken) {
     const uint64_t overflows = watch.overflows;
     std::vector<IndexedFolder> kept = std::move(watch.folders);
