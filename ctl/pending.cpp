@@ -1,9 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/pending.h"
 
-#include <fcntl.h>
 #include <json/reader.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -14,6 +12,7 @@
 #include "base/scoped_fd.h"
 #include "state/event_codes.h"
 #include "state/layout.h"
+#include "state/queue_files.h"
 
 namespace fileindexd {
 
@@ -105,27 +104,15 @@ void ReadLines(const ScopedFd& file, bool begun, LineReader& reader) {
 }  // namespace
 
 Pending ReadPending(const std::string& share_name, const std::string& path) {
-  constexpr int FLAGS = O_RDONLY | O_CLOEXEC | O_NONBLOCK;
-  // The queue is opened first: when it is moved aside between the two, it is met twice, and the
-  // inode tells.
-  const ScopedFd queue(open(QueuePath(share_name).c_str(), FLAGS));
-  const ScopedFd drained(open(DrainedPath(share_name).c_str(), FLAGS));
-  struct stat queue_stat {};
-  struct stat drained_stat {};
-  const bool has_queue =
-      queue.fd >= 0 && fstat(queue.fd, &queue_stat) == 0 && S_ISREG(queue_stat.st_mode);
-  const bool has_drained =
-      drained.fd >= 0 && fstat(drained.fd, &drained_stat) == 0 && S_ISREG(drained_stat.st_mode);
-  const bool same = has_queue && has_drained && queue_stat.st_dev == drained_stat.st_dev &&
-                    queue_stat.st_ino == drained_stat.st_ino;
-
+  QueueFiles files;
+  OpenQueueFiles(share_name, files);
   Pending pending;
   LineReader reader(path, pending);
-  if (has_drained) {
-    ReadLines(drained, true, reader);
+  if (files.drained.fd >= 0) {
+    ReadLines(files.drained, true, reader);
   }
-  if (has_queue && !same) {
-    ReadLines(queue, false, reader);
+  if (files.queue.fd >= 0) {
+    ReadLines(files.queue, false, reader);
   }
   return pending;
 }

@@ -9,6 +9,8 @@
 #include "ctl/output.h"
 #include "ctl/root_problem.h"
 #include "ctl/status_report.h"
+#include "ctl/watches.h"
+#include "state/layout.h"
 #include "state/pid_file.h"
 #include "state/queue_writer.h"
 
@@ -56,7 +58,7 @@ void LookAtFolders(const Settings& settings, ShareReport& report) {
 }
 
 // False when the share's status cannot be read.
-bool ReportShare(Session& session, const Share& share, ShareReport& report) {
+bool ReportShare(Session& session, const Share& share, pid_t daemon, ShareReport& report) {
   ShareStatus status;
   if (!session.store->GetStatus(share.name, status)) {
     return false;
@@ -71,6 +73,8 @@ bool ReportShare(Session& session, const Share& share, ShareReport& report) {
   report.comparison = WorkAt(ComparisonProgressPath(share.name));
   LookAtFolders(*session.settings, report);
   ReadIndex(report);
+  report.unwatched =
+      report.has_folders && daemon > 0 && IsUnwatched(daemon, ShareFolder(share.name));
   report.root_emptied =
       IsRootEmptied(*session.settings, share, status, report.root, report.index.entries);
   return true;
@@ -106,7 +110,7 @@ bool MakeReport(Session& session, const Watches& watches, StatusReport& report) 
   report.paused_until = PausedUntil(resume_time);
   for (const Share& share : settings->shares) {
     ShareReport found;
-    if (ReportShare(session, share, found)) {
+    if (ReportShare(session, share, report.daemon, found)) {
       found.watch = watches.Of(share.name);
       report.shares.push_back(std::move(found));
       continue;

@@ -88,6 +88,7 @@ Json::Value ShareObject(const ShareReport& report) {
     object["index_problem"] = report.index_problem;
   }
 
+  object["unwatched"] = report.unwatched;
   object["gone_folders"] = Json::arrayValue;
   for (const std::string& path : report.gone_folders) {
     Json::Value folder(Json::objectValue);
@@ -143,6 +144,12 @@ void AddShare(std::string& text, const ShareReport& report) {
   }
   if (!report.index_problem.empty()) {
     AddLine(text, "problem", "index: " + report.index_problem);
+  }
+  if (report.unwatched) {
+    const std::string name = Printable(report.share.name);
+    AddLine(text, "problem",
+            "the daemon does not watch its queue; to mend it: fileindexctl worker drop " + name +
+                ", then fileindexctl worker revive " + name);
   }
   for (const std::string& path : report.gone_folders) {
     AddLine(text, "folder gone", Printable(path));

@@ -27,6 +27,7 @@ struct ShareReport {
   bool needs_reindex = false;
   bool no_space = false;
   RootState root = RootState::UNKNOWN;
+  bool unwatched = false;     // the daemon is not told of lines in the queue
   bool root_emptied = false;  // sound, and nothing in it where the index holds something
   std::vector<std::string> gone_folders;
   std::optional<ProgressRecord> work;        // of the Worker

@@ -279,15 +279,15 @@ IndexError Converger::SettleOtherPaths() {
   return error;
 }
 
-// Appends to `replaced` the directories below that are not the ones that were known.
-IndexError Converger::LookBelow(const std::string& path, std::vector<std::string>& replaced) {
+// The entries below, in byte order; what the step adds behind those that it was given is met too.
+IndexError Converger::ForEachSliceBelow(const std::string& path, const SliceStep& step) {
   const PathRange range(path);
   std::string after = range.first;
   std::vector<Entry> rows;
   for (;;) {
     IndexError error = Sql(table.Slice(after, range.end, SLICE, rows));
     if (error == IndexError::NONE) {
-      error = SettleSlice(rows, replaced);
+      error = step(rows);
     }
     if (error != IndexError::NONE || rows.size() < SLICE) {
       return error;
@@ -295,6 +295,12 @@ IndexError Converger::LookBelow(const std::string& path, std::vector<std::string
     after = rows.back().path;
     between();
   }
+}
+
+// Appends to `replaced` the directories below that are not the ones that were known.
+IndexError Converger::LookBelow(const std::string& path, std::vector<std::string>& replaced) {
+  return ForEachSliceBelow(
+      path, [&](const std::vector<Entry>& rows) { return SettleSlice(rows, replaced); });
 }
 
 IndexError Converger::SettleSlice(const std::vector<Entry>& rows,

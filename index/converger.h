@@ -53,6 +53,8 @@ class Converger {
   IndexError NoteOtherPaths(const std::string& path, const Look& look);
   IndexError SettleOtherPaths();
 
+  using SliceStep = std::function<IndexError(const std::vector<Entry>& rows)>;
+  IndexError ForEachSliceBelow(const std::string& path, const SliceStep& step);
   IndexError LookBelow(const std::string& path, std::vector<std::string>& replaced);
   IndexError SettleSlice(const std::vector<Entry>& rows, std::vector<std::string>& replaced);
   IndexError AddBelow(const std::string& directory);

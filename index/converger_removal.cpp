@@ -44,20 +44,9 @@ IndexError Converger::RemoveAt(const std::string& path, bool root_counts) {
 }
 
 IndexError Converger::RemoveBelow(const std::string& path, bool even_what_belongs) {
-  const PathRange range(path);
-  std::string after = range.first;
-  std::vector<Entry> rows;
-  for (;;) {
-    IndexError error = Sql(table.Slice(after, range.end, SLICE, rows));
-    if (error == IndexError::NONE) {
-      error = RemoveFromSlice(rows, even_what_belongs);
-    }
-    if (error != IndexError::NONE || rows.size() < SLICE) {
-      return error;
-    }
-    after = rows.back().path;
-    between();
-  }
+  return ForEachSliceBelow(path, [&](const std::vector<Entry>& rows) {
+    return RemoveFromSlice(rows, even_what_belongs);
+  });
 }
 
 IndexError Converger::RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs) {

@@ -14,6 +14,7 @@
 #include "state/json_text.h"
 #include "state/layout.h"
 #include "state/queue_file.h"
+#include "state/queue_files.h"
 
 namespace fileindexd {
 
@@ -99,25 +100,11 @@ bool TouchQueue(const std::string& share_name, std::string& error) {
 }
 
 uint64_t WaitingLines(const std::string& share_name) {
-  constexpr int FLAGS = O_RDONLY | O_CLOEXEC | O_NONBLOCK;
-  // The queue first: when it is moved aside between the two, it is met twice and not never.
-  ScopedFd queue(open(QueuePath(share_name).c_str(), FLAGS));
-  ScopedFd drained(open(DrainedPath(share_name).c_str(), FLAGS));
-  struct stat queue_stat {};
-  struct stat drained_stat {};
-  const bool has_queue =
-      queue.fd >= 0 && fstat(queue.fd, &queue_stat) == 0 && S_ISREG(queue_stat.st_mode);
-  const bool has_drained =
-      drained.fd >= 0 && fstat(drained.fd, &drained_stat) == 0 && S_ISREG(drained_stat.st_mode);
-  const bool same = has_queue && has_drained && queue_stat.st_dev == drained_stat.st_dev &&
-                    queue_stat.st_ino == drained_stat.st_ino;
-
+  QueueFiles files;
+  OpenQueueFiles(share_name, files);
   bool open_end = false;
-  uint64_t lines = has_queue ? CountLines(queue, 0, open_end) : 0;
-  if (has_drained && !same) {
-    lines += CountLines(drained, 0, open_end);
-  }
-  return lines;
+  const uint64_t queued = files.queue.fd >= 0 ? CountLines(files.queue, 0, open_end) : 0;
+  return queued + (files.drained.fd >= 0 ? CountLines(files.drained, 0, open_end) : 0);
 }
 
 }  // namespace fileindexd

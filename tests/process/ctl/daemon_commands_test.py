@@ -3,6 +3,7 @@
 
 import calendar
 import os
+import shutil
 import time
 
 from harness import IndexTest, control, main, namespace
@@ -126,6 +127,24 @@ class DaemonCommandsTest(IndexTest):
         self.assert_index(root)
         self.ctl("worker", "drop", "nope", code=1)
         self.ctl("worker", "revive", "nope", code=1)
+
+    def test_folder_of_a_share_that_was_removed_is_told_of_until_it_is_watched_again(self):
+        root = self.make_share(files=("a.txt",))
+        self.start()
+        self.await_drained("alpha")
+        self.assertIs(self.ctl("status", "--json").json()["shares"][0]["unwatched"], False)
+        self.assertNotIn(b"does not watch", self.ctl("status").out)
+
+        shutil.rmtree(os.path.dirname(self.queue("alpha")))
+        self.ctl("event", "alpha", "8", f"{root}/a.txt")
+
+        self.assertIs(self.ctl("status", "--json").json()["shares"][0]["unwatched"], True)
+        self.assertIn(b"does not watch its queue", self.ctl("status").out)
+        self.ctl("worker", "drop", "alpha")
+        self.ctl("worker", "revive", "alpha")
+        self.await_drained("alpha")
+        self.assertIs(self.ctl("status", "--json").json()["shares"][0]["unwatched"], False)
+        self.assert_index(root)
 
     def test_without_the_daemon(self):
         self.make_share()

@@ -127,6 +127,14 @@ TEST_F(QueueWriterTest, BothFilesCountAndAnOpenEndToo) {
   EXPECT_EQ(WaitingLines("s"), 200003U);
 }
 
+// As it is between the two looks at a queue that the daemon is moving aside.
+TEST_F(QueueWriterTest, FileUnderBothNamesCountsOnce) {
+  ASSERT_TRUE(Append({"one", "two"})) << error;
+  ASSERT_EQ(link(queue.c_str(), DrainedPath("s").c_str()), 0);
+
+  EXPECT_EQ(WaitingLines("s"), 2U);
+}
+
 // The one test that waits: the limit itself is what it is about.
 TEST_F(QueueWriterTest, AHeldLockIsWaitedForFiveSeconds) {
   ASSERT_TRUE(Append({"one"})) << error;

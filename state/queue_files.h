@@ -1,0 +1,21 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A share's queue file and its drained copy, for whoever only reads them.
+#pragma once
+
+#include <string>
+
+#include "base/scoped_fd.h"
+
+namespace fileindexd {
+
+// Each is -1 where there is no such file, or no regular one.
+struct QueueFiles {
+  ScopedFd queue;
+  ScopedFd drained;
+};
+
+// Opens both, for reading, without a lock. A queue that is moved aside meanwhile is met as the
+// drained copy alone.
+void OpenQueueFiles(const std::string& share_name, QueueFiles& files);
+
+}  // namespace fileindexd
