@@ -1,0 +1,196 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "notify/share_feed.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "base/event_codes.h"
+#include "index/reader.h"
+#include "notify/gatherer.h"
+#include "state/queue_appender.h"
+#include "state/queue_writer.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr std::chrono::milliseconds LOCKED_DELAY(10);
+constexpr std::chrono::seconds RETRY_DELAY(1);
+constexpr size_t PATHS_KEPT = 100'000;   // gathered; and as many lines in the backlog
+constexpr size_t BYTES_KEPT = 32 << 20;  // of their paths
+constexpr size_t FOLDED_EVERY = 1000;    // lines that came: a crowd is no less
+
+bool IsTooMuch(size_t number, size_t bytes) {
+  return number > PATHS_KEPT || bytes > BYTES_KEPT;
+}
+
+}  // namespace
+
+struct ShareFeed::Impl {
+  explicit Impl(const std::string& name) : share(name), gatherer(name), appender(name) { Clear(); }
+
+  void Clear();
+  uint64_t CountBelow(const std::string& directory, uint64_t limit) const;
+  void Queue(const std::vector<QueueLine>& lines);
+  void FoldCrowds(const Settings& settings);
+  void Write(Clock::time_point now, bool at_once, FeedCounts& counts);
+  void CheckBounds();
+
+  const std::string share;
+  Gatherer gatherer;
+  std::unique_ptr<QueueFolding> backlog;
+  QueueAppender appender;
+  const Settings* in_force = nullptr;  // while FoldCrowds runs
+  size_t came = 0;                     // lines, since crowds were folded last
+  uint64_t folded = 0;                 // lines that met others in the backlog
+  bool full = false;                   // the queue was, at the last try
+  Clock::time_point retry;             // not before, unless it is full
+  bool lost = false;
+  std::string error;
+};
+
+void ShareFeed::Impl::Clear() {
+  gatherer.Clear();
+  // Nothing is coarsened into its root: what is too much is dropped.
+  backlog = std::make_unique<QueueFolding>(
+      "/",
+      [this](const std::string& directory, uint64_t limit) { return CountBelow(directory, limit); },
+      2 * PATHS_KEPT);
+  came = 0;
+  full = false;
+  retry = {};
+}
+
+// The limit, which keeps the lines as they are, where it cannot be told.
+uint64_t ShareFeed::Impl::CountBelow(const std::string& directory, uint64_t limit) const {
+  EntryReader reader;
+  uint64_t below = 0;
+  // A directory that only holds indexed folders is not to be reindexed itself.
+  const bool told = in_force != nullptr && in_force->FolderOfPath(directory) != nullptr &&
+                    reader.Open(share) == IndexError::NONE &&
+                    reader.CountBelow(directory, limit, below);
+  return told ? below : limit;
+}
+
+void ShareFeed::Impl::Queue(const std::vector<QueueLine>& lines) {
+  for (const QueueLine& line : lines) {
+    if (line.event == QLIB_NOTIFY_RENAME) {
+      backlog->AddRename(line.path, line.path_old);
+    } else {
+      backlog->Add(line.event, line.path, line.data);
+    }
+  }
+  came += lines.size();
+}
+
+void ShareFeed::Impl::FoldCrowds(const Settings& settings) {
+  if (backlog->Size() > FOLDED_EVERY && came >= FOLDED_EVERY) {
+    came = 0;
+    in_force = &settings;
+    backlog->FoldCrowded();
+    in_force = nullptr;
+  }
+}
+
+void ShareFeed::Impl::Write(Clock::time_point now, bool at_once, FeedCounts& counts) {
+  if (backlog->Size() == 0 || (!full && now < retry && !at_once)) {
+    return;
+  }
+
+  std::vector<QueueLine> taken;
+  const auto give = [this, &taken](size_t most) {
+    taken = backlog->Take(most);
+    std::vector<std::string> texts;
+    texts.reserve(taken.size());
+    for (const QueueLine& line : taken) {
+      const bool is_rename = line.event == QLIB_NOTIFY_RENAME;
+      texts.push_back(EventLine(line.event, line.path,
+                                is_rename ? std::optional(line.path_old) : std::nullopt,
+                                line.data));
+    }
+    return texts;
+  };
+  std::string reason;
+  const Appended result = appender.Append(give, reason);
+  if (result == Appended::DONE) {
+    counts.lines += taken.size();
+    error.clear();
+  } else if (result == Appended::FAILED) {
+    Queue(taken);
+    error = reason;
+  }
+  full = result == Appended::FULL || (result == Appended::DONE && backlog->Size() > 0);
+  retry = now;
+  if (result == Appended::LOCKED) {
+    retry += LOCKED_DELAY;
+  } else if (backlog->Size() > 0) {
+    retry += RETRY_DELAY;
+  }
+}
+
+void ShareFeed::Impl::CheckBounds() {
+  if (IsTooMuch(gatherer.Size(), gatherer.Bytes()) ||
+      IsTooMuch(backlog->Size(), backlog->Bytes())) {
+    Clear();
+    lost = true;
+  }
+}
+
+ShareFeed::ShareFeed(std::string name_of_share) : impl(std::make_unique<Impl>(name_of_share)) {}
+ShareFeed::~ShareFeed() = default;
+
+void ShareFeed::Add(const Settings& settings, const Change& change, Clock::time_point now) {
+  impl->gatherer.Add(settings, change, now);
+  counts.changes = impl->gatherer.changes;
+  counts.folded = impl->gatherer.folded + impl->folded;
+  impl->CheckBounds();
+}
+
+void ShareFeed::AddLines(const Settings& settings, const std::vector<QueueLine>& lines) {
+  impl->Queue(lines);
+  impl->FoldCrowds(settings);
+  impl->CheckBounds();
+}
+
+void ShareFeed::Work(const Settings& settings, Clock::time_point now, bool everything) {
+  std::vector<QueueLine> lines;
+  impl->gatherer.TakeDue(settings, now, everything, lines);
+  const size_t expected = impl->backlog->Size() + lines.size();
+  impl->Queue(lines);
+  impl->FoldCrowds(settings);
+  // A rename may leave two lines.
+  impl->folded += expected - std::min(expected, impl->backlog->Size());
+  counts.folded = impl->gatherer.folded + impl->folded;
+  impl->CheckBounds();
+  impl->Write(now, everything, counts);
+}
+
+std::optional<ShareFeed::Clock::time_point> ShareFeed::NextDue() const {
+  const auto gathered = impl->gatherer.NextDue();
+  if (impl->backlog->Size() == 0) {
+    return gathered;
+  }
+  return gathered.has_value() ? std::min(*gathered, impl->retry) : impl->retry;
+}
+
+size_t ShareFeed::Gathered() const {
+  return impl->gatherer.Size();
+}
+
+size_t ShareFeed::Backlog() const {
+  return impl->backlog->Size();
+}
+
+bool ShareFeed::TakeLoss() {
+  return std::exchange(impl->lost, false);
+}
+
+void ShareFeed::Clear() {
+  impl->Clear();
+}
+
+const std::string& ShareFeed::Error() const {
+  return impl->error;
+}
+
+}  // namespace fileindexd
