@@ -35,7 +35,7 @@ WatchReport ReadShare(const Json::Value& share) {
   report.folded = share["folded"].asUInt64();
   report.overflows = share["overflows"].asUInt64();
   if (const Json::Value& compared = share["compared"]; !compared.isNull()) {
-    WatchReport::Compared& last = report.compared.emplace();
+    ComparedReport& last = report.compared.emplace();
     last.ended = compared["ended"].asInt64();
     last.differences = compared["differences"].asUInt64();
     if (!compared["error"].isNull()) {
@@ -71,7 +71,7 @@ Json::Value NumberOrNull(bool is_known, Number number) {
   return is_known ? Json::Value(static_cast<Json::Int64>(number)) : Json::Value();
 }
 
-std::string ComparedText(const WatchReport::Compared& last) {
+std::string ComparedText(const ComparedReport& last) {
   const std::string text = LocalTime(last.ended);
   return last.error ? text + ", not to its end: " + Printable(*last.error)
                     : text + ", differences: " + std::to_string(last.differences);

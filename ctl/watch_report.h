@@ -14,14 +14,15 @@
 
 namespace fileindexd {
 
+// The last comparison.
+struct ComparedReport {
+  int64_t ended = 0;  // seconds since the epoch
+  uint64_t differences = 0;
+  std::optional<std::string> error;
+};
+
 // Of one share; see state/notifier.h for what each means.
 struct WatchReport {
-  struct Compared {
-    int64_t ended = 0;
-    uint64_t differences = 0;
-    std::optional<std::string> error;
-  };
-
   bool is_known = false;  // the service told; else all but `problem` is nothing
   std::optional<std::string> watched_by;
   std::string problem;
@@ -31,7 +32,7 @@ struct WatchReport {
   uint64_t lines = 0;
   uint64_t folded = 0;
   uint64_t overflows = 0;
-  std::optional<Compared> compared;
+  std::optional<ComparedReport> compared;
   bool comparing = false;
 };
 

@@ -12,7 +12,7 @@
 #include <array>
 #include <cerrno>
 #include <cstdint>
-#include <cstring>
+#include <system_error>
 
 #include "base/scoped_fd.h"
 #include "state/layout.h"
@@ -31,7 +31,7 @@ constexpr uint64_t WRITES = LANDLOCK_ACCESS_FS_WRITE_FILE | LANDLOCK_ACCESS_FS_R
                             LANDLOCK_ACCESS_FS_MAKE_BLOCK | LANDLOCK_ACCESS_FS_MAKE_SYM;
 
 bool Failed(const std::string& what, std::string& error) {
-  error = what + ": " + strerror(errno);
+  error = what + ": " + std::generic_category().message(errno);
   return false;
 }
 
@@ -47,6 +47,12 @@ uint64_t WantedCapabilities() {
     wanted |= Bit(CAP_DAC_OVERRIDE);
   }
   return wanted;
+}
+
+void Keep(uint32_t wanted, __user_cap_data_struct& half) {
+  half.permitted &= wanted;
+  half.effective = half.permitted;
+  half.inheritable = 0;
 }
 
 bool DropCapabilities(std::string& error) {
@@ -71,13 +77,9 @@ bool DropCapabilities(std::string& error) {
   if (syscall(SYS_capget, &header, sets.data()) != 0) {
     return Failed("capabilities", error);
   }
-  for (size_t half = 0; half < sets.size(); ++half) {
-    __user_cap_data_struct& set = sets.at(half);
-    // What a container has kept back cannot be had; whoever needs it says so.
-    set.permitted &= static_cast<uint32_t>(wanted >> (32 * half));
-    set.effective = set.permitted;
-    set.inheritable = 0;
-  }
+  // What a container has kept back cannot be had; whoever needs it says so.
+  Keep(static_cast<uint32_t>(wanted), sets[0]);
+  Keep(static_cast<uint32_t>(wanted >> 32), sets[1]);
   if (syscall(SYS_capset, &header, sets.data()) != 0) {
     return Failed("capabilities", error);
   }
@@ -104,7 +106,7 @@ bool LimitWriting(std::string& missing, std::string& error) {
   const long version =
       syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION);
   if (version < 1) {
-    missing = std::string("Landlock: ") + strerror(errno);
+    missing = "Landlock: " + std::generic_category().message(errno);
     return true;
   }
 

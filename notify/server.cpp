@@ -25,6 +25,7 @@
 #include <cstring>
 #include <map>
 #include <string_view>
+#include <system_error>
 
 #include "base/scoped_fd.h"
 #include "notify/log.h"
@@ -58,7 +59,7 @@ struct Client {
 };
 
 std::string Failure(const std::string& what) {
-  return what + ": " + strerror(errno);
+  return what + ": " + std::generic_category().message(errno);
 }
 
 std::string ErrorReply(const std::string& error) {

@@ -6,7 +6,7 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstring>
+#include <system_error>
 #include <utility>
 
 #include "state/pid_file.h"
@@ -25,12 +25,13 @@ Instance::~Instance() {
 bool Instance::Claim(std::string& error) {
   ScopedFd opened(open(lock_file.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
   if (opened.fd < 0) {
-    error = lock_file + ": " + strerror(errno);
+    error = lock_file + ": " + std::generic_category().message(errno);
     return false;
   }
 
   if (flock(opened.fd, LOCK_EX | LOCK_NB) != 0) {
-    error = errno == EWOULDBLOCK ? "another instance runs" : lock_file + ": " + strerror(errno);
+    error = errno == EWOULDBLOCK ? "another instance runs"
+                                 : lock_file + ": " + std::generic_category().message(errno);
     return false;
   }
 
@@ -47,7 +48,7 @@ bool Instance::Claim(std::string& error) {
 
 bool Instance::Announce(std::string& error) {
   if (!WritePidFile(pid_file)) {
-    error = pid_file + ": " + strerror(errno);
+    error = pid_file + ": " + std::generic_category().message(errno);
     return false;
   }
 
