@@ -23,8 +23,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr const char* LOCK_FILE = "/var/run/fileindex-notifyd.lock";
-
 struct CommandLine {
   ServiceOptions service;
   LogTarget log = LogTarget::STANDARD_ERROR;
@@ -96,7 +94,7 @@ int Serve(const CommandLine& chosen) {
   }
 
   std::string error;
-  Instance instance(NOTIFIER_PROGRAM, NOTIFIER_PID_FILE, LOCK_FILE);
+  Instance instance(NOTIFIER_PROGRAM, NOTIFIER_PID_FILE, NOTIFIER_LOCK_FILE);
   std::string missing;
   if (!instance.Claim(error) || !MakeStateRoot(error) || !Confine(missing, error)) {
     return Complain(error);

@@ -64,9 +64,9 @@ void Service::Serve(const Request& request) {
     return;
   }
 
-  // Who asked before the settings were read asks about shares that came with them.
+  // Shares and mounts that came before the question are part of it.
   (void)ReloadSettings();
-  if (follow_due) {
+  if (follow_due || watches.IsAnyMissing()) {
     FollowAll();
   }
   Syncing waiting{request.client, {}, 0};

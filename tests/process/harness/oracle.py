@@ -6,7 +6,7 @@ import os
 import stat
 
 KINDS = {
-    b"document": b"txt md c html svg pdf odt docx epub eml zip",
+    b"document": b"txt md c html svg pdf odt docx epub eml zip tar",
     b"audio": b"mp3 flac ogg",
     b"video": b"mp4 mkv ts",
     b"photo": b"jpg png heic",

@@ -86,7 +86,7 @@ class Programs:
         self.follow(
             "git init -q -b main repo; cd repo; git config user.email a@b; git config user.name n; "
             "for i in $(seq 50); do echo $i > $i.c; done; git add .; git commit -qm one; "
-            "git checkout -qb other; git rm -q 1.c 2.c; git mv 3.c 33.c; git commit -qm two"
+            "git checkout -qb other; git rm -q 1.c 2.c; git mv 3.c 333.c; git commit -qm two"
         )
         self.follow("cd repo; git checkout -q main; cd ..; git clone -q repo cloned")
         self.follow("rm -rf repo")
