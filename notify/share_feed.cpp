@@ -59,6 +59,7 @@ void ShareFeed::Impl::Clear() {
   came = 0;
   full = false;
   retry = {};
+  error.clear();
 }
 
 // The limit, which keeps the lines as they are, where it cannot be told.
