@@ -85,15 +85,12 @@ void Gatherer::AddRename(const Change& change, Time now) {
     ++folded;
   }
 
-  const uint32_t what = change.what | MOVED_TO;
-  if (origin == change.path) {
-    SetFrom(Gather(change.path, what, change.directory, now), {});
-    return;
-  }
-  Pending& rename = Gather(change.path, what, change.directory, now);
+  // One that goes back to where it was is none.
+  const std::string from = origin == change.path ? std::string() : origin;
+  Pending& rename = Gather(change.path, change.what | MOVED_TO, change.directory, now);
   const std::string before = rename.from;
-  SetFrom(rename, origin);
-  if (!before.empty() && before != origin) {
+  SetFrom(rename, from);
+  if (!before.empty() && before != from) {
     Gather(before, MOVED_FROM, change.directory, now);
   }
 }
@@ -115,17 +112,17 @@ Gatherer::Pending& Gatherer::Gather(const std::string& path, uint32_t what, bool
   if (is_new) {
     bytes += path.size();
     entry.first = now;
-    entry.due = DueOf(path, entry, now);
-    by_due.emplace(entry.due, &at->first);
-    return entry;
+    entry.due = Time::max();
+  } else {
+    ++folded;
   }
 
-  ++folded;
   const Time due = std::min(entry.due, DueOf(path, entry, now));
   if (due != entry.due) {
     by_due.erase({entry.due, &at->first});
     by_due.emplace(due, &at->first);
     entry.due = due;
+    CountIntoBatch(path.size(), due, now);
   }
   return entry;
 }
@@ -144,7 +141,7 @@ void Gatherer::Drop(PendingMap::iterator dropped) {
 
 Gatherer::Time Gatherer::DueOf(const std::string& path, const Pending& entry, Time now) {
   if ((entry.what & AT_ONCE) != 0 || entry.directory) {
-    return Soon(path.size(), now);
+    return Soon(now);
   }
   if ((entry.what & CREATED) != 0) {
     // On a grid, or many links would cost a round of work each.
@@ -153,14 +150,14 @@ Gatherer::Time Gatherer::DueOf(const std::string& path, const Pending& entry, Ti
     return Time(since - since % 10);
   }
   if ((entry.what & ATTRIBUTES) != 0) {
-    return Soon(path.size(), now);
+    return Soon(now);
   }
   const auto last = modified.find(path);
   const Time delayed = entry.first + MODIFY_DELAY;
   return last == modified.end() ? delayed : std::max(delayed, last->second + MODIFY_INTERVAL);
 }
 
-Gatherer::Time Gatherer::Soon(size_t length, Time now) {
+Gatherer::Time Gatherer::Soon(Time now) {
   if (!IsBusy(now)) {
     return now;
   }
@@ -168,11 +165,17 @@ Gatherer::Time Gatherer::Soon(size_t length, Time now) {
     batch_due = now + GATHER;
     batch_bytes = 0;
   }
+  return batch_due;
+}
+
+void Gatherer::CountIntoBatch(size_t length, Time due, Time now) {
+  if (due != batch_due) {
+    return;
+  }
   batch_bytes += length;
   if (batch_bytes >= BATCH_BYTES && !batch_full.has_value()) {
     batch_full = now;
   }
-  return batch_due;
 }
 
 bool Gatherer::IsBusy(Time now) const {

@@ -67,7 +67,8 @@ class Gatherer {
   void Drop(PendingMap::iterator dropped);
 
   Time DueOf(const std::string& path, const Pending& entry, Time now);
-  Time Soon(size_t length, Time now);
+  Time Soon(Time now);
+  void CountIntoBatch(size_t length, Time due, Time now);
   bool IsBusy(Time now) const;
   void NoteModify(const std::string& path, Time now);
   std::vector<PendingMap::node_type> TakeUntil(Time until);

@@ -27,7 +27,9 @@ bool IsTooMuch(size_t number, size_t bytes) {
 }  // namespace
 
 struct ShareFeed::Impl {
-  explicit Impl(const std::string& name) : share(name), gatherer(name), appender(name) { Clear(); }
+  explicit Impl(std::string name) : share(std::move(name)), gatherer(share), appender(share) {
+    Clear();
+  }
 
   void Clear();
   uint64_t CountBelow(const std::string& directory, uint64_t limit) const;
@@ -59,6 +61,7 @@ void ShareFeed::Impl::Clear() {
   came = 0;
   full = false;
   retry = {};
+  error.clear();
 }
 
 // The limit, which keeps the lines as they are, where it cannot be told.
@@ -136,7 +139,8 @@ void ShareFeed::Impl::CheckBounds() {
   }
 }
 
-ShareFeed::ShareFeed(std::string name_of_share) : impl(std::make_unique<Impl>(name_of_share)) {}
+ShareFeed::ShareFeed(std::string name_of_share)
+    : impl(std::make_unique<Impl>(std::move(name_of_share))) {}
 ShareFeed::~ShareFeed() = default;
 
 void ShareFeed::Add(const Settings& settings, const Change& change, Clock::time_point now) {

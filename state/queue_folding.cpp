@@ -85,14 +85,14 @@ void QueueFolding::Add(uint32_t event, const std::string& path, const std::strin
   }
   const auto at = lines.find(path);
   const uint32_t before = at == lines.end() ? 0 : at->second.event;
-  if (IsReindex(event)) {
+  const bool are_two_updates =
+      IsUpdateOfAll(before) && IsUpdateOfAll(event) && at->second.data != data;
+  if (IsReindex(event) || are_two_updates) {
     FoldInto(path);
   } else if (before == QLIB_NOTIFY_RENAME) {
     AddAtRename(at, event, data);
   } else if (!IsUpdateOfAll(before)) {
     Place(path, {event, data, {}});
-  } else if (IsUpdateOfAll(event) && at->second.data != data) {
-    FoldInto(path);
   }
   FoldIfTooMany();
 }
