@@ -60,7 +60,7 @@ class Convergence(WatchedDiskTest):
             os.makedirs(self.roots[name], exist_ok=True)
             self.ctl("share", "add", name, self.roots[name])
             self.ctl("folder", "add", self.roots[name], "--exclude", EXCLUDED)
-        self.daemon = self.start(debug=False)
+        self.daemon = self.start(debug=bool(os.environ.get("CONVERGENCE_DEBUG")))
         self.start_notifier()
         self.sync(*SHARES)
         self.pressure = f"{namespace.DISK}/filling"
@@ -79,7 +79,7 @@ class Convergence(WatchedDiskTest):
     def daemon_restarted(self):
         os.kill(self.daemon, signal.SIGTERM)
         self.await_exit(self.daemon)
-        self.daemon = self.start(debug=False)
+        self.daemon = self.start(debug=bool(os.environ.get("CONVERGENCE_DEBUG")))
 
     def service_killed(self):
         self.kill_notifier()
@@ -135,7 +135,7 @@ class Convergence(WatchedDiskTest):
         if self.notifier is not None:
             self.notifier.send_signal(signal.SIGCONT)
         if self.daemon is None:
-            self.daemon = self.start(debug=False)
+            self.daemon = self.start(debug=bool(os.environ.get("CONVERGENCE_DEBUG")))
         if self.notifier is None:
             self.start_notifier()
         if self.has_paused:
