@@ -18,8 +18,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t BUFFER = 65536;
-
 enum class Relation { NONE, HERE, ABOVE, BELOW };
 
 Relation RelationOf(const std::string& written, const std::string& path) {
@@ -80,27 +78,6 @@ class LineReader {
   std::unique_ptr<Json::CharReader> reader;
 };
 
-void ReadLines(const ScopedFd& file, bool begun, LineReader& reader) {
-  std::string text;
-  std::string buffer(BUFFER, '\0');
-  for (;;) {
-    const ssize_t length = read(file.fd, buffer.data(), buffer.size());
-    if (length < 0 && errno == EINTR) {
-      continue;
-    }
-    if (length <= 0) {
-      return;  // what stands behind the last line end is being written
-    }
-    text.append(buffer, 0, static_cast<size_t>(length));
-    size_t begin = 0;
-    for (size_t end = text.find('\n'); end != std::string::npos; end = text.find('\n', begin)) {
-      reader.Read(std::string_view(text).substr(begin, end - begin), begun);
-      begin = end + 1;
-    }
-    text.erase(0, begin);
-  }
-}
-
 }  // namespace
 
 Pending ReadPending(const std::string& share_name, const std::string& path) {
@@ -108,12 +85,8 @@ Pending ReadPending(const std::string& share_name, const std::string& path) {
   OpenQueueFiles(share_name, files);
   Pending pending;
   LineReader reader(path, pending);
-  if (files.drained.fd >= 0) {
-    ReadLines(files.drained, true, reader);
-  }
-  if (files.queue.fd >= 0) {
-    ReadLines(files.queue, false, reader);
-  }
+  ForEachQueueLine(files.drained, [&](std::string_view line) { reader.Read(line, true); });
+  ForEachQueueLine(files.queue, [&](std::string_view line) { reader.Read(line, false); });
   return pending;
 }
 

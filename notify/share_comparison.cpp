@@ -5,6 +5,8 @@
 #include <ctime>
 
 #include "notify/log.h"
+#include "notify/sent_deletes.h"
+#include "state/queue_writer.h"
 
 namespace fileindexd {
 
@@ -43,6 +45,10 @@ void ShareComparison::Finish() {
 }
 
 bool ShareComparison::Begin() {
+  // Deletes that wait may be executed behind the comparison's back, on what it finds in order.
+  deletes = QueuedDeletes(healing.share);
+  // Whose first lines wait has its index soon; where none wait nobody else would have it made.
+  comparer.missing_is_empty = WaitingLines(healing.share) == 0;
   if (!comparer.Start()) {
     return Fail(comparer.Error());
   }
@@ -93,6 +99,14 @@ bool ShareComparison::GoOn() {
     LogError("share %s: the index holds entries from outside the share", healing.share.c_str());
   }
   healing.lines = repair->Lines(LINES_KEPT);
+  for (QueueLine& line : LinesOfReturned(*settings, deletes)) {
+    healing.lines.push_back(std::move(line));
+  }
+  if (comparer.counts.unreadable > 0) {
+    LogError("share %s: %llu paths cannot be looked at, the first is %s: %s", healing.share.c_str(),
+             static_cast<unsigned long long>(comparer.counts.unreadable),
+             comparer.counts.first_unreadable.c_str(), comparer.counts.unreadable_reason.c_str());
+  }
   healing.done = true;
   Finish();
   return false;

@@ -5,6 +5,7 @@
 #include <chrono>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "index/compare.h"
 #include "index/reader.h"
@@ -38,6 +39,7 @@ class ShareComparison {
   EntryReader reader;                        // counts for the repair, beside the comparison's own
   std::unique_ptr<Repair> repair;
   ProgressWriter progress;
+  std::vector<std::string> deletes;  // that waited in the queue when it began
   bool mended = true;
   uint64_t piece;  // paths
 };

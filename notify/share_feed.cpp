@@ -2,11 +2,14 @@
 #include "notify/share_feed.h"
 
 #include <algorithm>
+#include <cstddef>
+#include <iterator>
 #include <utility>
 
 #include "base/event_codes.h"
 #include "index/reader.h"
 #include "notify/gatherer.h"
+#include "notify/sent_deletes.h"
 #include "state/queue_appender.h"
 #include "state/queue_writer.h"
 
@@ -24,6 +27,11 @@ bool IsTooMuch(size_t number, size_t bytes) {
   return number > PATHS_KEPT || bytes > BYTES_KEPT;
 }
 
+QueueLine LookedAtAgain(const Settings& settings, const QueueLine& line) {
+  const std::vector<QueueLine> returned = LinesOfReturned(settings, {line.path});
+  return returned.empty() ? line : returned.front();
+}
+
 }  // namespace
 
 struct ShareFeed::Impl {
@@ -35,13 +43,16 @@ struct ShareFeed::Impl {
   uint64_t CountBelow(const std::string& directory, uint64_t limit) const;
   void Queue(const std::vector<QueueLine>& lines);
   void FoldCrowds(const Settings& settings);
-  void Write(Clock::time_point now, bool at_once, FeedCounts& counts);
+  std::vector<QueueLine> TakeLines(const Settings& settings, size_t most);
+  void Write(const Settings& settings, Clock::time_point now, bool at_once, FeedCounts& counts);
   void CheckBounds();
 
   const std::string share;
   Gatherer gatherer;
   std::unique_ptr<QueueFolding> backlog;
   QueueAppender appender;
+  uint64_t file_number = 0;  // of the appender, that `deletes` is about
+  SentDeletes deletes;
   const Settings* in_force = nullptr;  // while FoldCrowds runs
   size_t came = 0;                     // lines, since crowds were folded last
   uint64_t folded = 0;                 // lines that met others in the backlog
@@ -95,14 +106,43 @@ void ShareFeed::Impl::FoldCrowds(const Settings& settings) {
   }
 }
 
-void ShareFeed::Impl::Write(Clock::time_point now, bool at_once, FeedCounts& counts) {
+// As many lines from the backlog as fit, each with those that have to stand behind it.
+std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size_t most) {
+  if (appender.FileNumber() != file_number) {
+    file_number = appender.FileNumber();
+    deletes.Forget();
+  }
+  std::vector<QueueLine> waiting = backlog->Take(most);
+  std::vector<QueueLine> behind;
+  size_t fitting = 0;
+  for (; fitting < waiting.size(); ++fitting) {
+    QueueLine& line = waiting[fitting];
+    if (line.event == QLIB_NOTIFY_DELETE) {
+      // It may have waited for long.
+      line = LookedAtAgain(settings, line);
+    }
+    std::vector<QueueLine> returned = deletes.LinesBehind(settings, line);
+    if (fitting + 1 + behind.size() + returned.size() > most) {
+      break;
+    }
+    std::move(returned.begin(), returned.end(), std::back_inserter(behind));
+  }
+
+  Queue({waiting.begin() + static_cast<std::ptrdiff_t>(fitting), waiting.end()});
+  waiting.resize(fitting);
+  std::move(behind.begin(), behind.end(), std::back_inserter(waiting));
+  return waiting;
+}
+
+void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, bool at_once,
+                            FeedCounts& counts) {
   if (backlog->Size() == 0 || (!full && now < retry && !at_once)) {
     return;
   }
 
   std::vector<QueueLine> taken;
-  const auto give = [this, &taken](size_t most) {
-    taken = backlog->Take(most);
+  const auto give = [&](size_t most) {
+    taken = TakeLines(settings, most);
     std::vector<std::string> texts;
     texts.reserve(taken.size());
     for (const QueueLine& line : taken) {
@@ -117,6 +157,9 @@ void ShareFeed::Impl::Write(Clock::time_point now, bool at_once, FeedCounts& cou
   const Appended result = appender.Append(give, reason);
   if (result == Appended::DONE) {
     counts.lines += taken.size();
+    for (const QueueLine& line : taken) {
+      deletes.Note(line);
+    }
     error.clear();
   } else if (result == Appended::FAILED) {
     Queue(taken);
@@ -166,7 +209,7 @@ void ShareFeed::Work(const Settings& settings, Clock::time_point now, bool every
   impl->folded += expected - std::min(expected, impl->backlog->Size());
   counts.folded = impl->gatherer.folded + impl->folded;
   impl->CheckBounds();
-  impl->Write(now, everything, counts);
+  impl->Write(settings, now, everything, counts);
 }
 
 std::optional<ShareFeed::Clock::time_point> ShareFeed::NextDue() const {

@@ -57,6 +57,7 @@ bool QueueAppender::Count(const ScopedFd& locked, std::string& error) {
   }
 
   const bool known = IsSameFile(file);
+  file_number += known ? 0 : 1;
   const off_t offset = known ? counted.size : 0;
   file.lines = known ? counted.lines : 0;
   file.open_end = known && counted.open_end;
@@ -94,6 +95,9 @@ Appended QueueAppender::Append(const Give& give, std::string& error) {
   }
 
   const std::vector<std::string> lines = give(QUEUE_LINE_LIMIT - counted.lines);
+  if (lines.empty()) {
+    return Appended::FULL;
+  }
   std::string text;
   if (!JoinLines(lines, text, error) ||
       !WriteLines(queue, path, std::move(text), held.st_size, error)) {

@@ -30,10 +30,13 @@ class QueueAppender {
   explicit QueueAppender(std::string name_of_share) : share_name(std::move(name_of_share)) {}
 
   // Asks `give`, with the file locked, for at most as many lines as it takes, at least one, and
-  // appends them. Unless the result is DONE nothing was written; only after FAILED may `give` have
-  // been asked, and `error` tells.
+  // appends them. Giving none means that those that there are do not fit: FULL. Unless the result
+  // is DONE nothing was written; only after FAILED may `give` have been asked, and `error` tells.
   using Give = std::function<std::vector<std::string>(size_t most)>;
   Appended Append(const Give& give, std::string& error);
+
+  // Of the file that lines were given to last: another number, another file.
+  uint64_t FileNumber() const { return file_number; }
 
  private:
   // The file whose lines are counted. An inode number may be given again to the next queue file;
@@ -54,6 +57,7 @@ class QueueAppender {
 
   const std::string share_name;
   Counted counted;
+  uint64_t file_number = 0;
   ScopedFd waiting;  // opened while another program held the lock
 };
 

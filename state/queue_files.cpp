@@ -3,6 +3,9 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
 
 #include "state/layout.h"
 
@@ -33,6 +36,28 @@ void OpenQueueFiles(const std::string& share_name, QueueFiles& files) {
       queue.st_ino == drained.st_ino) {
     ScopedFd none;
     files.queue.Swap(none);
+  }
+}
+
+void ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit) {
+  constexpr size_t BUFFER = 65536;
+  std::string text;
+  std::string buffer(BUFFER, '\0');
+  while (file.fd >= 0) {
+    const ssize_t length = read(file.fd, buffer.data(), buffer.size());
+    if (length < 0 && errno == EINTR) {
+      continue;
+    }
+    if (length <= 0) {
+      return;
+    }
+    text.append(buffer, 0, static_cast<size_t>(length));
+    size_t begin = 0;
+    for (size_t end = text.find('\n'); end != std::string::npos; end = text.find('\n', begin)) {
+      visit(std::string_view(text).substr(begin, end - begin));
+      begin = end + 1;
+    }
+    text.erase(0, begin);
   }
 }
 

@@ -2,7 +2,9 @@
 // A share's queue file and its drained copy, for whoever only reads them.
 #pragma once
 
+#include <functional>
 #include <string>
+#include <string_view>
 
 #include "base/scoped_fd.h"
 
@@ -17,5 +19,9 @@ struct QueueFiles {
 // Opens both, for reading, without a lock. A queue that is moved aside meanwhile is met as the
 // drained copy alone.
 void OpenQueueFiles(const std::string& share_name, QueueFiles& files);
+
+// Calls `visit` with each whole line, without its newline. What stands behind the last newline is
+// being written, and is passed over. Nothing is read of a file that is -1.
+void ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit);
 
 }  // namespace fileindexd
