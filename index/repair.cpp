@@ -8,9 +8,6 @@ namespace fileindexd {
 
 namespace {
 
-// Decides anew for every kind, by the flags that are in force when it is carried out.
-constexpr const char* EVERY_KIND = R"({"document":true,"audio":true,"video":true,"photo":true})";
-
 // Whether nothing at or below normal path `directory` sorts after `path` or at it.
 bool IsBehind(const std::string& directory, const std::string& path) {
   return !Covers(directory, path) && directory + "0" <= path;
@@ -39,7 +36,7 @@ bool Repair::Add(const Found& found) {
   const bool is_directory = found.seen == Thing::DIRECTORY;
   switch (found.difference) {
     case Difference::MISSING:
-      folding.Add(is_directory ? CUSTOM_EVENT_REINDEX : QLIB_NOTIFY_CLOSE_WRITE, found.path);
+      folding.Add(is_directory ? CUSTOM_EVENT_REINDEX : QLIB_NOTIFY_MODIFY, found.path);
       break;
     case Difference::LEFT_OVER:
       AddLeftOver(found);
@@ -53,7 +50,7 @@ bool Repair::Add(const Found& found) {
       if (is_directory) {
         folding.Add(QLIB_NOTIFY_MODIFY, found.path);
       } else {
-        folding.Add(CUSTOM_EVENT_UPDATE, found.path, EVERY_KIND);
+        folding.Add(CUSTOM_EVENT_REINDEX, found.path);
       }
       break;
   }

@@ -2,16 +2,18 @@
 // The queue lines that mend what a comparison found.
 //
 //   difference                                line                       mends also
-//   missing file or link                      close-write
+//   missing file or link                      modify
 //   missing directory                         reindex                    all below it
 //   stale, a directory before or now          reindex                    all below it
 //   stale, left over                          modify
 //   left-over directory that is gone          reindex                    all below it
 //   left-over directory that does not belong  modify                     what is left over below it
-//   content                                   update of all four kinds   stale at the same path
+//   content                                   reindex                    stale at the same path
 //
-// Not a delete for what is left over: it takes the entry away whatever the disk holds by then, so
-// that a file which came back, and whose own event waits already, would be missing. A modify looks.
+// The lines are about what was seen some time ago. Modify and reindex look at what is there when they
+// are executed, and go on to do so whatever they displace at the same path in the batch. The others
+// do not: a delete takes the entry away of a file that has come back, an add passes over what is gone
+// by then, as does the update of a subtree.
 #pragma once
 
 #include <string>

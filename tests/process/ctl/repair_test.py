@@ -98,8 +98,8 @@ class RepairTest(IndexTest):
 
         # A new directory is looked at as a whole.
         self.assertEqual(
-            lines, [(CLOSE_WRITE, b"link"), (REINDEX, b"n"), (CLOSE_WRITE, b"new.txt"),
-                    (CLOSE_WRITE, b"d/new")]
+            lines, [(MODIFY, b"link"), (REINDEX, b"n"), (MODIFY, b"new.txt"),
+                    (MODIFY, b"d/new")]
         )
 
     def test_what_is_left_over(self):

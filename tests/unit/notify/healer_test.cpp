@@ -103,7 +103,7 @@ TEST_F(HealerTest, DifferencesComeAsLinesThatMendThem) {
   EXPECT_TRUE(healing.done) << healing.error;
   EXPECT_EQ(healing.counts.differences, 3U);
   EXPECT_EQ(Lines(healing), (Names{std::to_string(QLIB_NOTIFY_MODIFY) + " gone",
-                                   std::to_string(QLIB_NOTIFY_CLOSE_WRITE) + " new",
+                                   std::to_string(QLIB_NOTIFY_MODIFY) + " new",
                                    std::to_string(QLIB_NOTIFY_MODIFY) + " stale"}));
   EXPECT_GT(healing.began, 0);
   EXPECT_GE(healing.ended, healing.began);
@@ -131,7 +131,7 @@ TEST_F(HealerTest, ComparisonsOfEveryUrgencyReadTheWholeShare) {
     const Healing healing = std::move(Await(1)[0]);
     EXPECT_TRUE(healing.done) << healing.error;
     EXPECT_EQ(healing.counts.compared, MANY_FILES + 2U);
-    EXPECT_EQ(Lines(healing), Names{std::to_string(QLIB_NOTIFY_CLOSE_WRITE) + " zzz"});
+    EXPECT_EQ(Lines(healing), Names{std::to_string(QLIB_NOTIFY_MODIFY) + " zzz"});
   }
 }
 
@@ -203,7 +203,7 @@ TEST_F(HealerTest, IdleComparisonThatGaveWayGoesOnWhereItWas) {
     if (healing.share == "s") {
       EXPECT_TRUE(healing.done) << healing.error;
       EXPECT_EQ(healing.counts.compared, MANY_FILES + 2U);
-      EXPECT_EQ(Lines(healing), Names{std::to_string(QLIB_NOTIFY_CLOSE_WRITE) + " zzz"});
+      EXPECT_EQ(Lines(healing), Names{std::to_string(QLIB_NOTIFY_MODIFY) + " zzz"});
     }
   }
 }
@@ -286,7 +286,7 @@ TEST_F(HealerTest, UrgentComparisonOfTheSameShareTakesTheIdleOnesPlace) {
   healer.Request("s", Urgency::NOW);
   Resume();
 
-  EXPECT_EQ(Lines(Await(1)[0]), Names{std::to_string(QLIB_NOTIFY_CLOSE_WRITE) + " a"});
+  EXPECT_EQ(Lines(Await(1)[0]), Names{std::to_string(QLIB_NOTIFY_MODIFY) + " a"});
   EXPECT_FALSE(healer.IsPending("s"));
   EXPECT_FALSE(IsReadable(0));
 }
