@@ -11,6 +11,7 @@
 #include "state/filesystem.h"
 #include "state/layout.h"
 #include "state/progress.h"
+#include "state/queue_writer.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -148,11 +149,25 @@ TEST_F(HealerTest, PressureSlowsAComparisonAndDoesNotEndIt) {
   EXPECT_EQ(Await(1)[0].counts.compared, MANY_FILES + 1U);
 }
 
+TEST_F(HealerTest, ShareWithoutIndexAndWithoutLinesGetsItsFirst) {
+  AddShareWithoutIndex();
+  Start();
+  healer.Request("other", Urgency::NOW);
+
+  const Healing healing = std::move(Await(1)[0]);
+  EXPECT_TRUE(healing.done) << healing.error;
+  ASSERT_EQ(healing.lines.size(), 1U);
+  EXPECT_EQ(healing.lines[0].event, CUSTOM_EVENT_REINDEX);
+  EXPECT_EQ(healing.lines[0].path, folder + "/other");
+}
+
 TEST_F(HealerTest, FailureIsToldWithItsReasonAndWithoutLines) {
   WriteFile(At("a"), "");
   AddAll();
   std::filesystem::rename(root, root + "_away");
   AddShareWithoutIndex();
+  std::string error;
+  ASSERT_TRUE(AppendToQueue("other", {EventLine(CUSTOM_EVENT_REINDEX, folder + "/other")}, error));
   Start();
   for (const char* share : {"s", "other", "unknown"}) {
     healer.Request(share, Urgency::NOW);
