@@ -13,8 +13,8 @@ int main(int argc, char** argv) {
     return 2;
   }
   const int group = fanotify_init(FAN_CLASS_NOTIF | FAN_REPORT_DFID_NAME_TARGET | FAN_CLOEXEC, 0);
-  constexpr uint64_t MASK = FAN_CREATE | FAN_CLOSE_WRITE | FAN_MODIFY | FAN_ATTRIB | FAN_DELETE |
-                            FAN_RENAME | FAN_ONDIR;
+  constexpr uint64_t MASK =
+      FAN_CREATE | FAN_CLOSE_WRITE | FAN_MODIFY | FAN_ATTRIB | FAN_DELETE | FAN_RENAME | FAN_ONDIR;
   if (group < 0 ||
       fanotify_mark(group, FAN_MARK_ADD | FAN_MARK_FILESYSTEM, MASK, AT_FDCWD, argv[1]) != 0) {
     perror("bare_reader: fanotify");

@@ -10,10 +10,10 @@
 //   left-over directory that does not belong  modify                     what is left over below it
 //   content                                   reindex                    stale at the same path
 //
-// The lines are about what was seen some time ago. Modify and reindex look at what is there when they
-// are executed, and go on to do so whatever they displace at the same path in the batch. The others
-// do not: a delete takes the entry away of a file that has come back, an add passes over what is gone
-// by then, as does the update of a subtree.
+// The lines are about what was seen some time ago. Modify and reindex look at what is there when
+// they are executed, and go on to do so whatever they displace at the same path in the batch. The
+// others do not: a delete takes the entry away of a file that has come back, an add passes over
+// what is gone by then, as does the update of a subtree.
 #pragma once
 
 #include <string>
