@@ -35,7 +35,7 @@ using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
 constexpr milliseconds PAUSE_LOOK(1000);  // between two looks at the stored pause
-constexpr milliseconds END_PATIENCE(900);
+constexpr milliseconds END_PATIENCE(500);
 
 // Percent. A comparison raises the pressure itself, above all on a disk that has to seek; one at
 // idle priority thereby keeps to about this share of it.

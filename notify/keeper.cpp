@@ -24,7 +24,7 @@ namespace {
 using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
-constexpr milliseconds END_PATIENCE(900);
+constexpr milliseconds END_PATIENCE(500);
 
 // The keeper's and its thread's. `stop_fd` and `interval` never change.
 struct Shared {

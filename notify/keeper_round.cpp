@@ -129,14 +129,14 @@ bool KeeperRound::SeesSpace(const Share& share, ShareStatus& status, Kept& kept)
   return true;
 }
 
-// Whether the queue file stands there although every reason to leave it is ruled out: a daemon that
-// is away or paused, a drained copy in work, a pass of the whole share, which has none.
+// Whether the queue file, or a drained copy, stands there although every reason to leave it is
+// ruled out: a daemon that is away or paused, a pass that runs. A short pass shows no progress, but
+// its copy does not stay either.
 bool KeeperRound::HasStayed(const Share& share, Kept& kept) {
   struct statx queue {};
-  struct statx drained {};
   ProgressRecord record;
-  if (!daemon_lives || paused || !LookAtFile(QueuePath(share.name), queue) ||
-      LookAtFile(DrainedPath(share.name), drained) ||
+  if (!daemon_lives || paused ||
+      (!LookAtFile(DrainedPath(share.name), queue) && !LookAtFile(QueuePath(share.name), queue)) ||
       ReadProgress(WorkerProgressPath(share.name), record)) {
     kept.rounds = 0;
     kept.queue = {};

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // fileindex-notifyd: the notification service. Stays in the foreground.
+#include <sys/resource.h>
 #include <sys/signalfd.h>
 
 #include <CLI/CLI.hpp>
@@ -87,7 +88,17 @@ int OpenSignals() {
   return signalfd(-1, &ending, SFD_CLOEXEC);
 }
 
+// A descriptor for each directory of a walk's depth, some for each file system.
+void RaiseDescriptorLimit() {
+  rlimit limit{};
+  if (getrlimit(RLIMIT_NOFILE, &limit) == 0 && limit.rlim_cur < limit.rlim_max) {
+    limit.rlim_cur = limit.rlim_max;
+    (void)setrlimit(RLIMIT_NOFILE, &limit);
+  }
+}
+
 int Serve(const CommandLine& chosen) {
+  RaiseDescriptorLimit();
   const ScopedFd signals(OpenSignals());
   if (signals.fd < 0) {
     return Complain(std::string("signals: ") + strerror(errno));

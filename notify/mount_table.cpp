@@ -171,9 +171,9 @@ std::vector<std::string> MountTable::PointsBelow(std::string_view path) const {
 }
 
 bool IsChangedElsewhere(std::string_view type) {
-  constexpr std::string_view SHARED[] = {"9p",   "afs",  "beegfs", "ceph",   "cifs",
-                                         "fuse", "gfs2", "gpfs",   "lustre", "ncpfs",
-                                         "nfs",  "nfs4", "ocfs2",  "smb3",   "virtiofs"};
+  constexpr std::string_view SHARED[] = {
+      "9p",     "afs",   "beegfs", "ceph", "cifs",  "coda",     "fuse", "gfs2",   "gpfs",
+      "lustre", "ncpfs", "nfs",    "nfs4", "ocfs2", "orangefs", "smb3", "vboxsf", "virtiofs"};
   return std::find(std::begin(SHARED), std::end(SHARED), type) != std::end(SHARED) ||
          type.starts_with("fuse.");
 }

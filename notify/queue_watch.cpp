@@ -14,7 +14,8 @@ namespace fileindexd {
 
 namespace {
 
-constexpr uint32_t ROOT_EVENTS = IN_MODIFY | IN_CREATE | IN_MOVED_TO | IN_CLOSE_WRITE | IN_ONLYDIR;
+constexpr uint32_t ROOT_EVENTS = IN_MODIFY | IN_CREATE | IN_MOVED_TO | IN_CLOSE_WRITE |
+                                 IN_MOVE_SELF | IN_DELETE_SELF | IN_ONLYDIR;
 constexpr uint32_t FOLDER_EVENTS = IN_MOVED_FROM | IN_DELETE | IN_ONLYDIR;
 constexpr size_t BUFFER_SIZE = 65536;
 
@@ -67,6 +68,8 @@ bool QueueWatch::Read(std::set<std::string>& taken) {
         for (const auto& [watch, share] : folders) {
           taken.insert(share);
         }
+      } else if (event->wd == root && (event->mask & (IN_MOVE_SELF | IN_DELETE_SELF)) != 0) {
+        root_is_gone = true;
       } else if (event->wd == root) {
         settings_touched = settings_touched || name.starts_with("state.db");
       } else if (const auto share = folders.find(event->wd);

@@ -20,11 +20,14 @@ class QueueWatch {
   // Reads what waits. True when settings may have changed; adds to `taken` the shares whose queue
   // file went.
   bool Read(std::set<std::string>& taken);
+  // Whether the state root was moved or removed: what is opened and allowed is the old one's.
+  bool IsRootGone() const { return root_is_gone; }
   int Descriptor() const { return inotify.fd; }
 
  private:
   ScopedFd inotify;
   int root = -1;
+  bool root_is_gone = false;
   std::map<int, std::string> folders;  // share names by watch descriptor
 };
 

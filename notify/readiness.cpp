@@ -25,6 +25,10 @@ void TellAlive() {
   (void)sd_notify(0, "WATCHDOG=1");
 }
 
+void TellBusy() {
+  (void)sd_notify(0, "WATCHDOG=1\nEXTEND_TIMEOUT_USEC=60000000");
+}
+
 void TellStopping() {
   (void)sd_notify(0, "STOPPING=1");
 }

@@ -13,6 +13,8 @@ void TellReady();
 // One line for `systemctl status`.
 void TellStatus(const std::string& line);
 void TellAlive();
+// The same from inside long work, also before it is ready: there is progress.
+void TellBusy();
 void TellStopping();
 
 // How often TellAlive has to be called: at half of the time after which the service manager would

@@ -24,8 +24,10 @@ namespace fileindexd {
 
 namespace {
 
-// A share that is not there may come without a sign, when one above its root is mounted elsewhere.
+// A share that is not there may come without a sign, and so may one go: something above its root,
+// on another file system, was renamed.
 constexpr std::chrono::seconds LOOK_INTERVAL(2);
+constexpr std::chrono::seconds SLOW_LOOK_INTERVAL(60);
 // Between two tries of a comparison that could not be made: a new share has its first index soon, a
 // broken one may take an administrator's time.
 constexpr std::chrono::milliseconds FIRST_RETRY(500);
@@ -33,7 +35,7 @@ constexpr std::chrono::milliseconds LONGEST_RETRY(30000);
 constexpr std::chrono::seconds REINDEX_INTERVAL(2);
 // For the last lines; what the daemon's lock keeps out is found by the comparison at the next
 // start.
-constexpr std::chrono::milliseconds LAST_LINES(1000);
+constexpr std::chrono::milliseconds LAST_LINES(700);
 
 int64_t Today() {
   return std::chrono::duration_cast<std::chrono::seconds>(
@@ -146,7 +148,8 @@ void Service::WantComparison(const std::string& name, const char* reason) {
   FedShare& share = *shares.at(name);
   share.differs = true;
   share.urgency = Urgency::NOW;
-  share.compare_at = Clock::now();
+  // Losses that go on must not have whole comparisons back to back.
+  share.compare_at = std::max(Clock::now(), share.rest_until);
   share.retry = FIRST_RETRY;
 }
 
@@ -173,6 +176,7 @@ void Service::TakeHealings() {
       continue;
     }
     FedShare& share = *known->second;
+    share.rest_until = Clock::now() + std::chrono::seconds(healing.ended - healing.began);
     const bool is_last = !healer.IsPending(healing.share) && !share.compare_at.has_value();
     const std::string& name = known->first;
     if (healing.done) {
@@ -190,7 +194,7 @@ void Service::TakeHealings() {
       }
       share.retry = FIRST_RETRY;
     } else if (is_last) {
-      share.compare_at = Clock::now() + share.retry;
+      share.compare_at = std::max(Clock::now() + share.retry, share.rest_until);
       share.retry = std::min(share.retry * 2, LONGEST_RETRY);
     }
     if (!healing.done && share.told_error != healing.error) {
@@ -229,10 +233,17 @@ void Service::WorkFeeds(Clock::time_point now) {
       share->feed.Clear();
       continue;
     }
-    const bool hurry = hurried.contains(name);
+    // Before a comparison has ended nobody is answered, and there is no hurry.
+    const bool hurry = hurried.contains(name) && !share->differs && !share->feed.IsWrittenOut();
     const std::optional<Clock::time_point> due = share->feed.NextDue();
     if (hurry || (due.has_value() && *due <= now)) {
       share->feed.Work(*settings, now, hurry);
+    }
+    if (share->told_queue_error != share->feed.Error()) {
+      share->told_queue_error = share->feed.Error();
+      if (!share->told_queue_error.empty()) {
+        LogError("share %s: %s", name.c_str(), share->told_queue_error.c_str());
+      }
     }
     if (share->feed.TakeLoss()) {
       LogInfo("share %s: more changes than are kept", name.c_str());
@@ -265,13 +276,14 @@ void Service::Round(Clock::time_point now) {
   if (queues.Read(taken)) {
     (void)ReloadSettings();  // the old ones hold until the new ones can be read
   }
-  const bool look_due = next_look.has_value() && *next_look <= now;
+  const bool look_due = next_look <= now;
+  if (look_due && !settings_error.empty()) {
+    (void)ReloadSettings();
+  }
   if (follow_due || look_due) {
     FollowAll();
-  }
-  next_look.reset();
-  if (watches.IsAnyMissing()) {
-    next_look = now + LOOK_INTERVAL;
+    const bool soon = watches.IsAnyMissing() || !settings_error.empty();
+    next_look = now + (soon ? LOOK_INTERVAL : SLOW_LOOK_INTERVAL);
   }
 
   for (const Request& request : server.Serve()) {
@@ -319,12 +331,16 @@ int Service::Run(int signals) {
   if (AliveInterval().has_value()) {
     next_beat = Clock::now();
   }
-  while (!ended) {
+  while (!ended && !queues.IsRootGone()) {
     Round(Clock::now());
     TellManager(Clock::now());
     Wait(signals);
   }
   TellStopping();
+  if (queues.IsRootGone()) {
+    LogError("%s was moved or removed: to be started anew", settings->state_root.c_str());
+    return 1;
+  }
   WriteOut();
   return 0;
 }
@@ -336,7 +352,7 @@ void Service::WriteOut() {
     ReadEvents();
   }
   for (auto& [name, share] : shares) {
-    if (watches.shares.at(name).by != WatchedBy::NOBODY) {
+    if (watches.shares.at(name).by != WatchedBy::NOBODY && Clock::now() < deadline) {
       share->feed.Work(*settings, Clock::now(), true);
     }
     // A lock that somebody holds cannot be awaited by an event; the feed says when to try again.

@@ -42,6 +42,8 @@ struct FedShare {
   std::chrono::milliseconds retry{0};  // until the next try, after one that failed
   bool differs = true;                 // the index may, until a comparison has ended
   Healing last;                        // without its lines; `ended` 0: none yet
+  Clock::time_point rest_until;        // no comparison before
+  std::string told_queue_error;        // the feed's, that was logged
   std::string told_error;              // the last one that was logged
   int64_t complete_until = 0;          // seconds since the epoch; 0: never yet
 };
@@ -100,7 +102,7 @@ class Service {
   bool all_read = false;
   bool ended = false;
   std::string settings_error;
-  std::optional<Clock::time_point> next_look;  // at shares that are not there
+  Clock::time_point next_look;                 // at the roots of the shares
   std::optional<Clock::time_point> next_beat;  // for the service manager
 };
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What the service tells those who ask.
 #include <json/json.h>
+#include <poll.h>
 
 #include <algorithm>
 
@@ -42,7 +43,7 @@ std::string Service::StatusReply() const {
     Json::Value told(Json::objectValue);
     told["name"] = name;
     told["watched_by"] = by != nullptr ? Json::Value(by) : Json::Value();
-    told["problem"] = ToUtf8(watch.problem);
+    told["problem"] = ToUtf8(watch.problem.empty() ? share->told_queue_error : watch.problem);
     told["changes"] = static_cast<Json::UInt64>(share->feed.counts.changes);
     told["lines"] = static_cast<Json::UInt64>(share->feed.counts.lines);
     told["folded"] = static_cast<Json::UInt64>(share->feed.counts.folded);
@@ -65,7 +66,15 @@ void Service::Serve(const Request& request) {
   }
 
   // Shares and mounts that came before the question are part of it.
-  (void)ReloadSettings();
+  if (!ReloadSettings()) {
+    Json::Value reply(Json::objectValue);
+    reply["ok"] = false;
+    reply["error"] = ToUtf8(settings_error);
+    server.Answer(request.client, OneLine(reply));
+    return;
+  }
+  pollfd table = {mount_table.fd, POLLPRI, 0};
+  follow_due = follow_due || poll(&table, 1, 0) > 0;
   if (follow_due || watches.IsAnyMissing()) {
     FollowAll();
   }

@@ -53,11 +53,12 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `deletes` is about
   SentDeletes deletes;
-  const Settings* in_force = nullptr;  // while FoldCrowds runs
-  size_t came = 0;                     // lines, since crowds were folded last
-  uint64_t folded = 0;                 // lines that met others in the backlog
-  bool full = false;                   // the queue was, at the last try
-  Clock::time_point retry;             // not before, unless it is full
+  const Settings* in_force = nullptr;   // while FoldCrowds runs
+  std::unique_ptr<EntryReader> reader;  // the same; null: the index cannot be read
+  size_t came = 0;                      // lines, since crowds were folded last
+  uint64_t folded = 0;                  // lines that met others in the backlog
+  bool full = false;                    // the queue was, at the last try
+  Clock::time_point retry;              // not before, unless it is full
   bool lost = false;
   std::string error;
 };
@@ -77,12 +78,10 @@ void ShareFeed::Impl::Clear() {
 
 // The limit, which keeps the lines as they are, where it cannot be told.
 uint64_t ShareFeed::Impl::CountBelow(const std::string& directory, uint64_t limit) const {
-  EntryReader reader;
   uint64_t below = 0;
   // A directory that only holds indexed folders is not to be reindexed itself.
-  const bool told = in_force != nullptr && in_force->FolderOfPath(directory) != nullptr &&
-                    reader.Open(share) == IndexError::NONE &&
-                    reader.CountBelow(directory, limit, below);
+  const bool told = reader != nullptr && in_force->FolderOfPath(directory) != nullptr &&
+                    reader->CountBelow(directory, limit, below);
   return told ? below : limit;
 }
 
@@ -101,7 +100,12 @@ void ShareFeed::Impl::FoldCrowds(const Settings& settings) {
   if (backlog->Size() > FOLDED_EVERY && came >= FOLDED_EVERY) {
     came = 0;
     in_force = &settings;
+    reader = std::make_unique<EntryReader>();
+    if (reader->Open(share) != IndexError::NONE) {
+      reader.reset();
+    }
     backlog->FoldCrowded();
+    reader.reset();
     in_force = nullptr;
   }
 }

@@ -20,7 +20,9 @@ bool LooseThread::Start(std::function<void()> body) {
 
   int failure = 0;
   try {
-    std::packaged_task<void()> task(std::move(body));
+    // What escapes ends the process, which a manager starts again: a thread that is gone in silence
+    // would leave its work undone for ever.
+    std::packaged_task<void()> task([run = std::move(body)]() noexcept { run(); });
     ended = task.get_future();
     thread = std::thread(std::move(task));
   } catch (const std::system_error& error) {

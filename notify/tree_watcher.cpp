@@ -11,6 +11,7 @@
 #include <fstream>
 
 #include "base/scoped_stream.h"
+#include "notify/readiness.h"
 #include "state/belonging.h"
 #include "state/open_path.h"
 #include "state/statx_look.h"
@@ -20,6 +21,8 @@ namespace fileindexd {
 namespace {
 
 constexpr uint32_t OF_ITSELF = IN_DELETE_SELF | IN_MOVE_SELF;
+constexpr size_t BETWEEN_SIGNS = 1000;  // of life, directories
+
 constexpr uint32_t OF_NAMES =
     IN_CREATE | IN_CLOSE_WRITE | IN_MODIFY | IN_ATTRIB | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO;
 
@@ -204,7 +207,10 @@ bool TreeWatcher::CoverOne(const Todo& todo, std::vector<Todo>& todos) {
 }
 
 bool TreeWatcher::CoverAll(std::vector<Todo> todos) {
-  while (!todos.empty()) {
+  for (size_t covered = 0; !todos.empty(); ++covered) {
+    if (covered % BETWEEN_SIGNS == 0) {
+      TellBusy();  // the disk may be slow, and the tree large
+    }
     const Todo todo = std::move(todos.back());
     todos.pop_back();
     if (!CoverOne(todo, todos)) {

@@ -25,6 +25,8 @@ namespace {
 // not kept waiting for more than some milliseconds.
 constexpr int MOST_BUFFERS = 32;
 
+constexpr std::chrono::minutes BETWEEN_TRIES(10);
+
 constexpr uint32_t NAMES = CREATED | DELETED | MOVED_FROM | MOVED_TO;
 
 // Where a share's path leads, by way of links at or above its root.
@@ -77,14 +79,14 @@ std::string Join(const std::string& root, std::string_view below) {
 
 // A path within the file system as a path of the share; none when it lies outside.
 std::optional<std::string> InShare(const ShareWatch& watch, const std::string& path) {
-  if (path.empty() || !Covers(watch.within, path)) {
+  if (path.empty() || !Covers(watch.place.within, path)) {
     return std::nullopt;
   }
-  std::string_view below = std::string_view(path).substr(watch.within.size());
+  std::string_view below = std::string_view(path).substr(watch.place.within.size());
   if (below.starts_with('/')) {
     below.remove_prefix(1);
   }
-  return Join(watch.root, below);
+  return Join(watch.place.root, below);
 }
 
 }  // namespace
@@ -146,6 +148,63 @@ void Watches::Begin(const Share& share, const Mount& mount, ShareWatch& watch) {
   LogError("share %s is compared at an interval: %s", share.name.c_str(), refusal.c_str());
 }
 
+// The mount that shows the share's root, and where the root lies in it. Null, with the problem,
+// where the share is not to be watched.
+const Mount* Watches::Place(const Share& share, SharePlace& place, std::string& problem) const {
+  place.root = share.path;
+  const Mount* mount = mounts.MountOf(share.path);
+  if (mount != nullptr && IsChangedElsewhere(mount->type)) {
+    // One that hangs must not hang the rest: the comparison looks at its root.
+    place.real = share.path;
+  } else {
+    const RootState state = LookAtRoot(share);
+    problem = ProblemOfRoot(state);
+    place.real = RealPath(share.path);
+    place.inode = InodeOf(share.path);
+    mount = state == RootState::SOUND ? mounts.MountOf(place.real) : nullptr;
+  }
+  if (mount != nullptr) {
+    place.mount = mount->id;
+    place.device = mount->device;
+    place.within = MountTable::PathWithin(*mount, place.real);
+  }
+  return mount;
+}
+
+// Whether what is in use is of no use any more.
+bool Watches::IsBroken(const ShareWatch& watch, bool same_folders,
+                       const std::vector<std::string>& points) const {
+  if (watch.moved) {
+    return true;
+  }
+  if (watch.by == WatchedBy::INOTIFY) {
+    // A tree of watches is of its settings and mounts: what a mount hid was not watched.
+    return !same_folders || watch.tree == nullptr || points != watch.points;
+  }
+  return watch.by == WatchedBy::FANOTIFY && !groups.contains(watch.place.device);
+}
+
+// What kept it from being watched better may be over: few descriptors, a mount in the way.
+void Watches::TryBetter(const Share& share, const Mount& mount, ShareWatch& watch, News& news) {
+  if (watch.by <= best || watch.by == WatchedBy::NOBODY || IsChangedElsewhere(mount.type) ||
+      Clock::now() < watch.next_try) {
+    return;
+  }
+  watch.next_try = Clock::now() + BETWEEN_TRIES;
+  std::string refusal;
+  if (BeginFanotify(mount, watch, refusal)) {
+    watch.tree.reset();
+    watch.problem.clear();
+    LogInfo("share %s is watched by fanotify now", share.name.c_str());
+    news.appeared.push_back(share.name);
+  } else if (watch.by == WatchedBy::COMPARISON) {
+    Begin(share, mount, watch);
+    if (watch.by == WatchedBy::INOTIFY) {
+      news.appeared.push_back(share.name);
+    }
+  }
+}
+
 void Watches::FollowShare(const Share& share, News& news) {
   std::vector<IndexedFolder> folders = FoldersOf(*settings, share.name);
   ShareWatch& watch = shares[share.name];
@@ -153,12 +212,13 @@ void Watches::FollowShare(const Share& share, News& news) {
   const bool had_folders = !watch.folders.empty();
   watch.folders = std::move(folders);
 
-  const RootState state = LookAtRoot(share);
-  const std::string real = RealPath(share.path);
-  const Mount* mount = state == RootState::SOUND ? mounts.MountOf(real) : nullptr;
-  if (watch.folders.empty() || mount == nullptr) {
-    const std::string problem =
-        watch.folders.empty() ? "no folder of it is indexed" : ProblemOfRoot(state);
+  SharePlace place;
+  std::string problem;
+  const Mount* mount = watch.folders.empty() ? nullptr : Place(share, place, problem);
+  if (mount == nullptr) {
+    if (watch.folders.empty()) {
+      problem = "no folder of it is indexed";
+    }
     if (watch.by != WatchedBy::NOBODY || watch.problem != problem) {
       LogInfo("share %s is not watched: %s", share.name.c_str(), problem.c_str());
     }
@@ -169,30 +229,20 @@ void Watches::FollowShare(const Share& share, News& news) {
     return;
   }
 
-  const uint64_t inode = InodeOf(share.path);
-  const std::string within = MountTable::PathWithin(*mount, real);
-  const bool same_place = watch.by != WatchedBy::NOBODY && watch.root == share.path &&
-                          watch.root_inode == inode && watch.mount == mount->id &&
-                          watch.device == mount->device && watch.within == within;
-  std::vector<std::string> points = mounts.PointsBelow(real);
-  std::erase(points, real);
-  // A tree of watches is of its settings and mounts: what a mount hid was not watched.
-  const bool broken = (watch.by == WatchedBy::FANOTIFY && !groups.contains(watch.device)) ||
-                      (watch.by == WatchedBy::INOTIFY &&
-                       (!same_folders || watch.tree == nullptr || points != watch.points));
-
-  if (!same_place || broken) {
-    const uint64_t overflows = watch.overflows;
-    std::vector<IndexedFolder> kept = std::move(watch.folders);
-    watch = {};
-    watch.folders = std::move(kept);
-    watch.overflows = overflows;
-    watch.root = share.path;
-    watch.root_inode = inode;
-    watch.mount = mount->id;
-    watch.device = mount->device;
-    watch.within = within;
-    Begin(share, *mount, watch);
+  std::vector<std::string> points = mounts.PointsBelow(place.real);
+  std::erase(points, place.real);
+  const bool same_place = watch.by != WatchedBy::NOBODY && watch.place == place;
+  if (!same_place || IsBroken(watch, same_folders, points)) {
+    const bool in_the_same_way =
+        same_place && watch.by == WatchedBy::FANOTIFY && groups.contains(place.device);
+    watch.place = place;
+    watch.moved = false;
+    watch.problem.clear();
+    watch.tree.reset();
+    if (!in_the_same_way) {
+      watch.next_try = Clock::now() + BETWEEN_TRIES;
+      Begin(share, *mount, watch);
+    }
     news.appeared.push_back(share.name);
   } else {
     if (!same_folders && had_folders) {
@@ -202,8 +252,9 @@ void Watches::FollowShare(const Share& share, News& news) {
     std::set_symmetric_difference(points.begin(), points.end(), watch.points.begin(),
                                   watch.points.end(), std::back_inserter(differing));
     for (const std::string& point : differing) {
-      news.mounts.emplace_back(share.name, Join(share.path, BelowRoot(real, point)));
+      news.mounts.emplace_back(share.name, Join(share.path, BelowRoot(place.real, point)));
     }
+    TryBetter(share, *mount, watch, news);
   }
   watch.points = std::move(points);
 }
@@ -214,6 +265,10 @@ Watches::News Watches::Follow(const std::shared_ptr<const Settings>& in_force) {
   if (!mounts.Read()) {
     LogError("the mount table cannot be read: %m");
   }
+  const std::string state_root = RealPath(settings->state_root);
+  const Mount* own_mount = mounts.MountOf(state_root);
+  own_device = own_mount != nullptr ? own_mount->device : "";
+  own_within = own_mount != nullptr ? MountTable::PathWithin(*own_mount, state_root) : "";
 
   std::erase_if(
       shares, [this](const auto& known) { return settings->ShareByName(known.first) == nullptr; });
@@ -229,7 +284,7 @@ void Watches::DropUnusedGroups() {
   std::set<std::string> used;
   for (const auto& [name, watch] : shares) {
     if (watch.by == WatchedBy::FANOTIFY) {
-      used.insert(watch.device);
+      used.insert(watch.place.device);
     }
   }
   std::erase_if(groups, [&used](const auto& group) { return !used.contains(group.first); });
@@ -237,14 +292,21 @@ void Watches::DropUnusedGroups() {
 
 void Watches::Tell(const std::string& device, const Change& change, const TellShare& tell,
                    Reading& reading) {
-  for (const auto& [name, watch] : shares) {
-    if (watch.by != WatchedBy::FANOTIFY || watch.device != device) {
+  // By whatever path a share shows it: a line about our own writing would be the next writing.
+  if (device == own_device && Covers(own_within, change.path)) {
+    return;
+  }
+  for (auto& [name, watch] : shares) {
+    if (watch.by != WatchedBy::FANOTIFY || watch.place.device != device) {
       continue;
     }
-    const bool above =
-        (change.what & NAMES) != 0 && (Covers(change.path, watch.within) ||
-                                       (!change.from.empty() && Covers(change.from, watch.within)));
-    reading.roots_moved = reading.roots_moved || above;
+    const std::string& within = watch.place.within;
+    if ((change.what & NAMES) != 0 &&
+        (Covers(change.path, within) || (!change.from.empty() && Covers(change.from, within)))) {
+      // Even if it is back by the time of the look, changes may have been told of another path.
+      watch.moved = true;
+      reading.roots_moved = true;
+    }
 
     const std::optional<std::string> path = InShare(watch, change.path);
     const std::optional<std::string> from = InShare(watch, change.from);
@@ -267,7 +329,7 @@ void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
 
     const bool overflown = events.TakeOverflow();
     for (auto& [name, watch] : shares) {
-      if (overflown && watch.by == WatchedBy::FANOTIFY && watch.device == device) {
+      if (overflown && watch.by == WatchedBy::FANOTIFY && watch.place.device == device) {
         ++watch.overflows;
         reading.overflown.push_back(name);
       }
@@ -291,8 +353,8 @@ void Watches::ReadTrees(const TellShare& tell, Reading& reading) {
     TreeWatch::Result result = TreeWatch::Result::MORE;
     for (int n = 0; n < MOST_BUFFERS && result == TreeWatch::Result::MORE; ++n) {
       result = watch.tree->Read([&](const Change& change) {
-        reading.roots_moved =
-            reading.roots_moved || ((change.what & NAMES) != 0 && Covers(change.path, watch.root));
+        reading.roots_moved = reading.roots_moved ||
+                              ((change.what & NAMES) != 0 && Covers(change.path, watch.place.root));
         tell(name, change);
       });
     }

@@ -7,6 +7,7 @@
 //                neither of the two can be had
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <map>
@@ -27,16 +28,25 @@ enum class WatchedBy { FANOTIFY, INOTIFY, COMPARISON, NOBODY };  // from the bes
 // "fanotify", "inotify", "comparison"; null for NOBODY.
 const char* WatchedByText(WatchedBy by);
 
+// Where a share's root lies.
+struct SharePlace {
+  std::string root;    // the share's path
+  std::string real;    // where that leads
+  uint64_t inode = 0;  // of the root
+  uint64_t mount = 0;  // id of the mount that shows it
+  std::string device;  // of that mount
+  std::string within;  // the root's path within the file system
+  bool operator==(const SharePlace&) const = default;
+};
+
 struct ShareWatch {
   WatchedBy by = WatchedBy::NOBODY;
   std::string problem;  // why it is not watched, or not better; empty: none
-  std::string root;     // the share's path
-  uint64_t root_inode = 0;
-  uint64_t mount = 0;               // id of the mount that shows the root
-  std::string device;               // of that mount
-  std::string within;               // the root's path within the file system
-  std::vector<std::string> points;  // what is mounted inside the share
-  std::unique_ptr<TreeWatch> tree;  // by INOTIFY
+  SharePlace place;
+  bool moved = false;                              // something happened at or above the root
+  std::chrono::steady_clock::time_point next_try;  // to watch it better
+  std::vector<std::string> points;                 // what is mounted inside the share
+  std::unique_ptr<TreeWatch> tree;                 // by INOTIFY
   std::vector<IndexedFolder> folders;
   uint64_t overflows = 0;
 };
@@ -76,7 +86,13 @@ class Watches {
   std::map<std::string, ShareWatch> shares;  // by name
 
  private:
+  using Clock = std::chrono::steady_clock;
+
+  const Mount* Place(const Share& share, SharePlace& place, std::string& problem) const;
+  bool IsBroken(const ShareWatch& watch, bool same_folders,
+                const std::vector<std::string>& points) const;
   void FollowShare(const Share& share, News& news);
+  void TryBetter(const Share& share, const Mount& mount, ShareWatch& watch, News& news);
   void Begin(const Share& share, const Mount& mount, ShareWatch& watch);
   bool BeginFanotify(const Mount& mount, ShareWatch& watch, std::string& refusal);
   void Tell(const std::string& device, const Change& change, const TellShare& tell,
@@ -89,6 +105,8 @@ class Watches {
   MountTable mounts;
   std::shared_ptr<const Settings> settings;
   std::map<std::string, std::unique_ptr<FanGroup>> groups;  // by device
+  std::string own_device;                                   // of the state folder
+  std::string own_within;                                   // and its path within it
 };
 
 }  // namespace fileindexd

@@ -86,7 +86,7 @@ std::string QueueReason(const char* what, const std::string& path) {
 // O_NONBLOCK: a pipe in its place must not hold the caller up; the look at its type refuses it.
 // Read access is for the look at the last byte.
 bool OpenQueue(const std::string& path, ScopedFd& queue, std::string& error) {
-  constexpr int FLAGS = O_RDWR | O_APPEND | O_CLOEXEC | O_NONBLOCK;
+  constexpr int FLAGS = O_RDWR | O_APPEND | O_CLOEXEC | O_NONBLOCK | O_NOFOLLOW;
   for (;;) {
     ScopedFd opened(open(path.c_str(), FLAGS));
     if (opened.fd < 0 && errno == ENOENT) {

@@ -74,6 +74,47 @@ class Mounts(WatchedDiskTest):
         os.rename(f"{self.disk}/away", self.root)
         self.assert_converged(self.root)
 
+    def test_root_moved_away_and_back_before_anybody_looked(self):
+        self.begin()
+        self.notifier.send_signal(signal.SIGSTOP)
+        os.rename(self.root, f"{self.disk}/away")
+        self.make_files(f"{self.disk}/away", "d/meanwhile.txt")
+        os.rename(f"{self.disk}/away", self.root)
+        self.notifier.send_signal(signal.SIGCONT)
+        self.assert_converged(self.root)
+
+    def test_state_folder_shown_by_another_path_is_no_endless_story(self):
+        self.begin()
+        shown = f"{namespace.DATA}/shown"
+        os.mkdir(shown)
+        namespace.mount(namespace.DISK, shown, flags=namespace.MS_BIND)
+        self.ctl("share", "add", "shown", shown)
+        self.ctl("folder", "add", shown)
+        self.sync("shown")
+        before = self.watched("shown")["lines"]
+        for _ in range(3):
+            self.make_files(self.root, "a.txt")
+            self.sync("alpha", "shown")
+        self.assertEqual(self.watched("shown")["lines"], before)
+
+    def test_queue_that_is_a_link_is_not_followed(self):
+        self.begin()
+        for target in ("nowhere", f"{self.disk}/victim"):
+            self.make_files(self.disk, "victim")
+            os.symlink(target, self.queue("alpha"))
+            self.make_files(self.root, "new.txt")
+            self.await_problem("cannot open")
+            with open(f"{self.disk}/victim", encoding="ascii") as file:
+                self.assertEqual(file.read(), "victim")
+            os.unlink(self.queue("alpha"))
+            self.assert_converged(self.root)
+            os.unlink(f"{self.root}/new.txt")
+            self.assert_converged(self.root)
+
+    def await_problem(self, text):
+        while text not in self.watched()["problem"]:
+            self.assertIsNone(self.notifier.poll())
+
     def test_moves_between_shares_and_file_systems(self):
         self.begin()
         other = self.make_share("beta", files=("x/",))  # on another file system
