@@ -201,6 +201,14 @@ TEST_F(KeeperRoundTest, QueueThatIsTakenAndWrittenAnewNeedsNoWorker) {
   EXPECT_THAT(sent, IsEmpty());
 }
 
+TEST_F(KeeperRoundTest, DrainedCopyThatNobodyWorksOnGetsAWorker) {
+  MakeOld(DrainedPath("s"), 100);
+  for (int i = 0; i < 3; ++i) {
+    round->Run(NOW + i * ROUND);
+  }
+  EXPECT_THAT(sent, ElementsAre(Upsert()));
+}
+
 TEST_F(KeeperRoundTest, QueueThatWaitsForAReasonNeedsNoWorker) {
   const auto run = [this] {
     for (int i = 0; i < 6; ++i) {
@@ -216,9 +224,11 @@ TEST_F(KeeperRoundTest, QueueThatWaitsForAReasonNeedsNoWorker) {
   ASSERT_TRUE(store->SetPause(NOW + 1000));
   run();
   ASSERT_TRUE(store->SetPause(-1));
-  MakeOld(DrainedPath("s"), 1);
-  run();
-  ASSERT_EQ(unlink(DrainedPath("s").c_str()), 0);
+  for (int i = 0; i < 6; ++i) {
+    MakeOld(DrainedPath("s"), 1);
+    round->Run(NOW + i * ROUND);
+    ASSERT_EQ(unlink(DrainedPath("s").c_str()), 0);
+  }
   ProgressWriter pass(WorkerProgressPath("s"));
   pass.Begin(Work::REINDEX, std::nullopt);
   pass.Write();
