@@ -66,7 +66,7 @@ void Service::SearchTwins(Clock::time_point now) {
       return store->GetStatus(name, status) && (status.needs_reindex || status.reindex_begun);
     };
     std::vector<QueueLine> lines;
-    share->twins.Pump(*settings, now, is_indexed_anew, lines);
+    share->twins.Pump(*settings, now, !syncing.empty(), is_indexed_anew, lines);
     if (!lines.empty()) {
       share->feed.AddLines(*settings, lines);
       share->feed.Work(*settings, now);

@@ -11,7 +11,8 @@ namespace {
 
 constexpr size_t MOST_KEPT = 50'000;
 constexpr size_t MOST_ASKED = 500;  // in one go: some milliseconds
-// A walk ends without a sign.
+constexpr std::chrono::seconds PACE(1);
+// What tells that a walk has ended may come before that can be read.
 constexpr std::chrono::seconds WALK_INTERVAL(2);
 
 // What makes the daemon write the entry anew. A path that shows another thing, or none, has changes
@@ -93,8 +94,8 @@ void Twins::AskFresh(const Settings& settings, size_t& allowed, std::vector<Queu
   for (; !fresh.empty() && allowed > 0; --allowed) {
     const auto [inode, asking] = *fresh.begin();
     fresh.erase(fresh.begin());
-    next.insert(inode);
-    if (asking == Asking::TWICE) {
+    // One that is to be asked again anyway was asked within the last second.
+    if (next.insert(inode).second && asking == Asking::TWICE) {
       Ask(settings, inode, lines);
     }
   }
@@ -115,14 +116,15 @@ void Twins::AskBatch(const Settings& settings, size_t& allowed, std::vector<Queu
 }
 
 // The files held open keep their inode numbers from being given to the next ones.
-void Twins::BeginBatch() {
+void Twins::BeginBatch(Clock::time_point now) {
   batch.assign(next.begin(), next.end());
   next.clear();
+  next_batch = now + PACE;
   OpenQueueFiles(share, files);
   reader.reset();  // an index that was replaced is not read for ever
 }
 
-void Twins::Pump(const Settings& settings, Clock::time_point now,
+void Twins::Pump(const Settings& settings, Clock::time_point now, bool hurry,
                  const std::function<bool()>& is_indexed_anew, std::vector<QueueLine>& lines) {
   if (IsIdle()) {
     return;
@@ -130,22 +132,24 @@ void Twins::Pump(const Settings& settings, Clock::time_point now,
   due.reset();
   size_t allowed = MOST_ASKED;
   AskFresh(settings, allowed, lines);
-  if (batch.empty() && !next.empty()) {
-    BeginBatch();
+  if (batch.empty() && !next.empty() && (hurry || now >= next_batch)) {
+    BeginBatch(now);
   }
-  if (!batch.empty() && AreFilesGone()) {
-    if (is_indexed_anew()) {
-      due = now + WALK_INTERVAL;
-    } else {
-      AskBatch(settings, allowed, lines);
-    }
+  const bool can_ask = !batch.empty() && AreFilesGone();
+  const bool is_walked = can_ask && is_indexed_anew();
+  if (can_ask && !is_walked) {
+    AskBatch(settings, allowed, lines);
   }
 
   if (IsIdle()) {
     reader.reset();
     folder = {};
-  } else if (allowed == 0 || batch.empty()) {
+  } else if (allowed == 0) {
     due = now;
+  } else if (is_walked) {
+    due = now + WALK_INTERVAL;
+  } else if (batch.empty()) {
+    due = hurry ? now : next_batch;
   }
 }
 

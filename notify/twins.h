@@ -7,7 +7,8 @@
 // Asking looks the inode up in the share's index, and has those of its entries looked at that
 // differ from the disk. Once is not enough: the daemon may be working on such an entry, and have
 // looked at the disk before the change. What it works on is in the index when the drained copy is
-// gone.
+// gone. A batch begins once a second, so that a file that is written to all the time costs no more
+// than that.
 #pragma once
 
 #include <chrono>
@@ -46,9 +47,10 @@ class Twins {
   void Add(uint64_t inode, Asking asking);
 
   // Asks what can be asked now, a bounded part of it, and adds the lines. To be called each round,
-  // at least when a queue file or a drained copy has gone. `is_indexed_anew`: whether a walk that
-  // no queue file tells of is going on; called only when that matters.
-  void Pump(const Settings& settings, Clock::time_point now,
+  // at least when a queue file or a drained copy has gone. `hurry`: somebody waits for it, and the
+  // next batch does not. `is_indexed_anew`: whether a walk that no queue file tells of is going on;
+  // called only when that matters.
+  void Pump(const Settings& settings, Clock::time_point now, bool hurry,
             const std::function<bool()>& is_indexed_anew, std::vector<QueueLine>& lines);
 
   // When Pump has something to do although no file went; none: not before.
@@ -64,7 +66,7 @@ class Twins {
   size_t Size() const { return fresh.size() + next.size() + batch.size(); }
   void AskFresh(const Settings& settings, size_t& allowed, std::vector<QueueLine>& lines);
   void AskBatch(const Settings& settings, size_t& allowed, std::vector<QueueLine>& lines);
-  void BeginBatch();
+  void BeginBatch(Clock::time_point now);
   bool AreFilesGone();
   void Ask(const Settings& settings, uint64_t inode, std::vector<QueueLine>& lines);
   bool IsReaderOpen();
@@ -77,6 +79,7 @@ class Twins {
   QueueFiles files;                            // as they stood when the batch began; -1: gone
   std::unique_ptr<EntryReader> reader;         // null: not open, or there is no index
   FolderView folder;
+  Clock::time_point next_batch;  // not before
   std::optional<Clock::time_point> due;
   bool lost = false;
 };
