@@ -16,86 +16,10 @@
 #include <filesystem>
 
 #include "base/scoped_fd.h"
-#include "tests/unit/notify/watching.h"
-#include "tests/unit/state/mounts.h"
+#include "tests/unit/notify/fan_fixture.h"
 
 namespace fileindexd {
 namespace {
-
-class FanGroupTest : public MountTest {
- protected:
-  // A watch on what shows `path`.
-  void Open(const std::string& path) {
-    MountTable table;
-    ASSERT_TRUE(table.Read());
-    const Mount* mount = table.MountOf(path);
-    ASSERT_NE(mount, nullptr);
-    error.clear();
-    group = FanGroup::Open(*mount, error);
-  }
-  void OpenSound(const std::string& path) {
-    Open(path);
-    ASSERT_NE(group, nullptr) << error;
-    EXPECT_EQ(error, "");
-  }
-
-  Texts Told() {
-    if (group == nullptr || !WaitFor(*group)) {
-      return {"nothing"};
-    }
-    bool failed = false;
-    Texts told = ReadAll(*group, failed);
-    EXPECT_FALSE(failed);
-    EXPECT_FALSE(group->TakeOverflow());
-    EXPECT_EQ(group->Waiting(), 0U);
-    return told;
-  }
-
-  // The target of what is told at `path`.
-  std::string ToldTarget(const std::string& path) {
-    std::string target;
-    EXPECT_TRUE(WaitFor(*group));
-    while (group->Read([&](const Change& change) {
-      if (change.path == path && !change.target.empty()) {
-        target = change.target;
-      }
-    }) == FanGroup::Result::MORE) {
-    }
-    return target;
-  }
-
-  void Put(const std::string& path) const {
-    const ScopedFd file(open((root + path).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
-    ASSERT_GE(file.fd, 0) << path;
-    ASSERT_EQ(write(file.fd, "x", 1), 1);
-  }
-  void Rename(const std::string& from, const std::string& to) const {
-    ASSERT_EQ(rename((root + from).c_str(), (root + to).c_str()), 0) << from;
-  }
-
-  std::string error;
-  std::unique_ptr<FanGroup> group;
-};
-
-class OnEach : public FanGroupTest, public testing::WithParamInterface<const char*> {
- protected:
-  void SetUp() override {
-    MountTest::SetUp();
-    if (IsSkipped() || HasFatalFailure()) {
-      return;
-    }
-    if (GetParam() == std::string("tmpfs")) {
-      MountTmpfs(root);
-    } else {
-      MountImage(GetParam(), root);
-    }
-    for (const char* name : {"/d", "/e"}) {
-      MakeFolder(root + name);
-    }
-    Put("/d/old");
-    OpenSound(root);
-  }
-};
 
 TEST_P(OnEach, ANewFileAndItsClose) {
   Put("/d/new");
@@ -182,61 +106,6 @@ TEST_P(OnEach, WhatHappenedInADirectoryThatIsGoneIsNotTold) {
   const ScopedFd held(open((root + "/d/sub").c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   std::filesystem::remove_all(root + "/d/sub");
   EXPECT_EQ(Told(), Texts{"delete /d/sub/"});
-}
-
-TEST_P(OnEach, ATargetIsWhatWasChangedWhateverBecameOfItsNames) {
-  ASSERT_EQ(link((root + "/d/old").c_str(), (root + "/e/other").c_str()), 0);
-  struct stat st {};
-  ASSERT_EQ(stat((root + "/d/old").c_str(), &st), 0);
-  (void)Told();
-  Put("/d/old");
-  const std::string target = ToldTarget("/d/old");
-
-  FanGroup::Target thing;
-  ASSERT_TRUE(group->LookAtTarget(target, thing));
-  EXPECT_EQ(thing.inode, st.st_ino);
-  EXPECT_EQ(thing.links, 2U);
-  EXPECT_TRUE(group->IsAt("/d/old", thing));
-  EXPECT_TRUE(group->IsAt("/e/other", thing));
-  EXPECT_FALSE(group->IsAt("/d", thing));
-  EXPECT_FALSE(group->IsAt("", thing));
-
-  Rename("/d/old", "/d/new");
-  EXPECT_FALSE(group->IsAt("/d/old", thing));
-  ASSERT_EQ(unlink((root + "/d/new").c_str()), 0);
-  ASSERT_TRUE(group->LookAtTarget(target, thing));
-  EXPECT_EQ(thing.inode, st.st_ino);
-  EXPECT_EQ(thing.links, 1U);
-
-  ASSERT_EQ(unlink((root + "/e/other").c_str()), 0);
-  ASSERT_TRUE(group->LookAtTarget(target, thing));
-  EXPECT_EQ(thing.links, 0U);
-}
-
-TEST_P(OnEach, WhatHasOtherNamesIsToldWithoutAPathWhenItsFolderIsGone) {
-  MakeFolder(root + "/d/sub");
-  ASSERT_EQ(link((root + "/d/old").c_str(), (root + "/d/sub/f").c_str()), 0);
-  (void)Told();
-  const ScopedFd held(open((root + "/d/sub").c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  Put("/d/sub/f");
-  std::filesystem::remove_all(root + "/d/sub");
-
-  EXPECT_NE(ToldTarget(""), "");
-}
-
-TEST_P(OnEach, OnlyChangesOfThingsThemselvesHaveATarget) {
-  ASSERT_EQ(symlink("old", (root + "/d/soft").c_str()), 0);
-  MakeFolder(root + "/d/sub");
-  Rename("/d/old", "/e/new");
-  ASSERT_EQ(chmod((root + "/d").c_str(), 0750), 0);
-  ASSERT_EQ(unlink((root + "/e/new").c_str()), 0);
-
-  int targets = 0;
-  const auto count = [&](const Change& change) { targets += change.target.empty() ? 0 : 1; };
-  ASSERT_TRUE(WaitFor(*group));
-  while (group->Read(count) == FanGroup::Result::MORE) {
-  }
-  EXPECT_EQ(targets, 0);
 }
 
 TEST_P(OnEach, UnmountingIsNotHindered) {
@@ -387,21 +256,6 @@ TEST_F(FanGroupTest, WhatCannotBeWatchedIsRefusedWithTheCall) {
   group = FanGroup::Open(remote, error);
   EXPECT_EQ(group, nullptr);
   EXPECT_EQ(error, "fanotify_mark: nfs4 does not tell of changes made elsewhere");
-}
-
-TEST_F(FanGroupTest, TargetsOfAnyBytesAreRefused) {
-  MountTmpfs(root);
-  OpenSound(root);
-  Put("/f");
-  const std::string target = ToldTarget("/f");
-  ASSERT_GT(target.size(), sizeof(file_handle));
-
-  FanGroup::Target thing;
-  for (const std::string& bytes :
-       {std::string(), target.substr(0, 4), target.substr(0, target.size() - 1), target + 'x',
-        std::string(sizeof(file_handle) + MAX_HANDLE_SZ + 1, '\xff'), std::string(4000, '\0')}) {
-    EXPECT_FALSE(group->LookAtTarget(bytes, thing)) << bytes.size();
-  }
 }
 
 TEST_F(FanGroupTest, LostEventsAreToldOnce) {
