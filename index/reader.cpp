@@ -114,6 +114,17 @@ bool EntryReader::ForEach(const std::string& under,
   return read;
 }
 
+bool EntryReader::ForEachOfInode(uint64_t inode, const std::function<bool(const Entry&)>& visit) {
+  Statement statement;
+  if (statement.Prepare(database.db, "SELECT " FILEINDEX_ENTRY_COLUMNS
+                                     " FROM entries WHERE inode = ?1") != SQLITE_OK) {
+    return false;
+  }
+  statement.BindInt(1, static_cast<int64_t>(inode));
+  bool going = true;
+  return VisitAll(statement, visit, going);
+}
+
 bool EntryReader::Find(const std::string& path, Entry& entry) {
   Statement statement;
   if (statement.Prepare(database.db, "SELECT " FILEINDEX_ENTRY_COLUMNS

@@ -36,6 +36,10 @@ class EntryReader {
   // The entry at exactly that path. False when there is none, or reading failed.
   bool Find(const std::string& path, Entry& entry);
 
+  // Calls `visit` with each entry of that inode, in no order, until it returns false. False when
+  // reading failed.
+  bool ForEachOfInode(uint64_t inode, const std::function<bool(const Entry&)>& visit);
+
   // How many entries lie below normal path `directory`, counted up to `limit`. False when reading
   // failed.
   bool CountBelow(const std::string& directory, uint64_t limit, uint64_t& below);

@@ -19,11 +19,18 @@ enum Happening : uint32_t {
   MOVED_TO = 0x40,    // renamed to this name; `from` tells the former one where it is known
 };
 
+// What other names of the same thing show as well.
+constexpr uint32_t CHANGES_THING = MODIFIED | ATTRIBUTES | WRITTEN;
+
 struct Change {
   uint32_t what = 0;       // of Happening
   bool directory = false;  // what the kernel says of the thing
-  std::string path;        // normal
+  std::string path;        // normal; empty where the thing has no name that can be told: only with
+                           // `target`
   std::string from = {};   // with MOVED_TO: the former path, or empty
+  // What was changed, whatever its name is by now: bytes of the handle of a thing that is no
+  // directory, with one of CHANGES_THING. Empty where the watch cannot tell.
+  std::string target = {};
 };
 
 // Takes changes in the order in which they were read.

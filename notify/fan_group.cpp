@@ -1,13 +1,16 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 //
 // DESIGN. A record names a thing by the handle of its directory and its name there; a rename has
-// two such pairs. What the thing itself is (its handle) is not asked for: the path is looked at
-// anyway, and records are half the size without. Names of directories are those of the moment at
-// which their handle is first met in a buffer, and hold for that buffer.
+// two such pairs. Names of directories are those of the moment at which their handle is first met
+// in a buffer, and hold for that buffer. The handle of the thing itself counts where it was
+// changed: by then it may have lost that name, and have others. Records of a thing alone, without a
+// directory, come for each link that is made or removed, as a change of attributes that no entry
+// shows; and where a file server changes a file that it found by its handle.
 #include "notify/fan_group.h"
 
 #include <sys/fanotify.h>
 #include <sys/ioctl.h>
+#include <sys/stat.h>
 
 #include <array>
 #include <cerrno>
@@ -22,9 +25,10 @@ namespace fileindexd {
 namespace {
 
 constexpr size_t BUFFER_SIZE = 256 * 1024;
+constexpr unsigned GROUP = FAN_CLASS_NOTIF | FAN_CLOEXEC | FAN_NONBLOCK;
 constexpr uint64_t ALWAYS =
     FAN_CREATE | FAN_CLOSE_WRITE | FAN_MODIFY | FAN_ATTRIB | FAN_DELETE | FAN_ONDIR;
-// Since Linux 5.17; before, the two ends of a rename are told apart.
+// Since Linux 5.17, as the handles of targets; before, the two ends of a rename are told apart.
 constexpr uint64_t RENAME = FAN_RENAME;
 constexpr uint64_t RENAME_ENDS = FAN_MOVED_FROM | FAN_MOVED_TO;
 
@@ -53,6 +57,7 @@ struct Record {
   uint64_t mask = 0;
   Place place;
   Place before;  // of a rename
+  file_handle* target = nullptr;
 };
 
 Record Parsed(const fanotify_event_metadata& metadata, char* at, const char* end) {
@@ -69,6 +74,8 @@ Record Parsed(const fanotify_event_metadata& metadata, char* at, const char* end
     } else if (info->hdr.info_type == FAN_EVENT_INFO_TYPE_DFID_NAME ||
                info->hdr.info_type == FAN_EVENT_INFO_TYPE_NEW_DFID_NAME) {
       record.place = place;
+    } else if (info->hdr.info_type == FAN_EVENT_INFO_TYPE_FID) {
+      record.target = handle;
     }
     at += info->hdr.len;
   }
@@ -89,6 +96,8 @@ struct FanGroup::Impl {
   void Tell(const Record& record, const TellChange& tell);
   HandleNames::Result PathOf(const Record::Place& place, std::string& path);
   void TellOf(uint32_t what, const TellChange& tell);
+  void TellNameless(const Record& record, uint32_t what, const TellChange& tell);
+  bool LookAtTarget(const std::string& target, Target& thing) const;
 };
 
 bool FanGroup::Impl::Open(const Mount& mount_of_it, std::string& error) {
@@ -96,8 +105,11 @@ bool FanGroup::Impl::Open(const Mount& mount_of_it, std::string& error) {
     error = "fanotify_mark: " + mount_of_it.type + " does not tell of changes made elsewhere";
     return false;
   }
-  ScopedFd opened(fanotify_init(FAN_CLASS_NOTIF | FAN_REPORT_DFID_NAME | FAN_CLOEXEC | FAN_NONBLOCK,
-                                O_RDONLY | O_CLOEXEC));
+  ScopedFd opened(fanotify_init(GROUP | FAN_REPORT_DFID_NAME_TARGET, O_RDONLY | O_CLOEXEC));
+  if (opened.fd < 0 && errno == EINVAL) {
+    ScopedFd without(fanotify_init(GROUP | FAN_REPORT_DFID_NAME, O_RDONLY | O_CLOEXEC));
+    opened.Swap(without);
+  }
   if (opened.fd < 0) {
     error = Reason("fanotify_init");
     return false;
@@ -147,6 +159,44 @@ void FanGroup::Impl::TellOf(uint32_t what, const TellChange& tell) {
   tell(change);
 }
 
+void FanGroup::Impl::TellNameless(const Record& record, uint32_t what, const TellChange& tell) {
+  const uint32_t changed = what & CHANGES_THING;
+  const bool is_link_count = record.place.directory == nullptr && changed == ATTRIBUTES;
+  Target thing;
+  if (!change.target.empty() && !is_link_count && LookAtTarget(change.target, thing) &&
+      thing.links > 0) {
+    std::string path;
+    change.path.swap(path);
+    TellOf(changed, tell);
+    change.path.swap(path);
+  }
+  change.target.clear();
+}
+
+bool FanGroup::Impl::LookAtTarget(const std::string& target, Target& thing) const {
+  alignas(file_handle) char space[sizeof(file_handle) + MAX_HANDLE_SZ];
+  if (target.size() < sizeof(file_handle) || target.size() > sizeof space) {
+    return false;
+  }
+  memcpy(space, target.data(), target.size());
+  auto* handle = reinterpret_cast<file_handle*>(space);
+  if (handle->handle_bytes != target.size() - sizeof(file_handle)) {
+    return false;
+  }
+
+  thing = {};
+  const ScopedFd opened(open_by_handle_at(whole.root.fd, handle, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+  if (opened.fd < 0) {
+    return errno == ESTALE || errno == ENOENT;
+  }
+  struct stat found {};
+  if (fstat(opened.fd, &found) != 0) {
+    return false;
+  }
+  thing = {found.st_ino, found.st_nlink, found.st_dev};
+  return true;
+}
+
 void FanGroup::Impl::Tell(const Record& record, const TellChange& tell) {
   using Result = HandleNames::Result;
   if ((record.mask & FAN_Q_OVERFLOW) != 0) {
@@ -156,14 +206,20 @@ void FanGroup::Impl::Tell(const Record& record, const TellChange& tell) {
 
   change.directory = (record.mask & FAN_ONDIR) != 0;
   change.from.clear();
+  const uint32_t more = HappeningsOf(record.mask);
+  change.target.clear();
+  if (record.target != nullptr && !change.directory && (more & CHANGES_THING) != 0) {
+    change.target.assign(reinterpret_cast<const char*>(record.target),
+                         sizeof(file_handle) + record.target->handle_bytes);
+  }
   const bool renamed = (record.mask & RENAME) != 0;
   const Result former = renamed ? PathOf(record.before, change.from) : Result::GONE;
   const Result result = PathOf(record.place, change.path);
-  const uint32_t more = HappeningsOf(record.mask);
   if (result == Result::NAMED && (!renamed || former == Result::NAMED || former == Result::GONE)) {
     TellOf(more | (renamed ? MOVED_TO : 0U), tell);
     return;
   }
+  TellNameless(record, more, tell);
 
   // One end cannot be named exactly. What is below a name that is too long has no name either: a
   // directory above it is told as one that has just come, which has all in it looked at.
@@ -216,6 +272,17 @@ FanGroup::Result FanGroup::Read(const TellChange& tell) {
     impl->Tell(Parsed(head, at + head.metadata_len, at + head.event_len), tell);
   }
   return Result::MORE;
+}
+
+bool FanGroup::LookAtTarget(const std::string& target, Target& thing) const {
+  return impl->LookAtTarget(target, thing);
+}
+
+bool FanGroup::IsAt(const std::string& path, const Target& thing) const {
+  struct stat found {};
+  return path.size() > 1 &&
+         fstatat(impl->whole.root.fd, path.c_str() + 1, &found, AT_SYMLINK_NOFOLLOW) == 0 &&
+         found.st_ino == thing.inode && found.st_dev == thing.device;
 }
 
 bool FanGroup::TakeOverflow() {

@@ -28,8 +28,20 @@ class FanGroup {
     FAILED,  // errno tells; the group is of no use any more
   };
   // Reads one buffer of events and tells of each change, with paths within the file system as they
-  // are now. A change in a directory that is gone is not told: that the directory went is.
+  // are now. A change in a directory that is gone is not told: that the directory went is; but a
+  // change of a thing that has other names is, without a path.
   Result Read(const TellChange& tell);
+
+  // The thing that a change's target is, as it is now.
+  struct Target {
+    uint64_t inode = 0;
+    uint64_t links = 0;  // names that it has; 0: it is gone
+    uint64_t device = 0;
+  };
+  // False when it cannot be told.
+  bool LookAtTarget(const std::string& target, Target& thing) const;
+  // Whether `path`, within the file system, shows that thing now.
+  bool IsAt(const std::string& path, const Target& thing) const;
 
   // True once after events were lost.
   bool TakeOverflow();

@@ -24,6 +24,8 @@ constexpr seconds MODIFY_DELAY(1);
 constexpr seconds MODIFY_INTERVAL(60);
 constexpr size_t MODIFIED_BYTES = 4 << 20;  // paths of files held open that are remembered
 
+constexpr size_t MOST_TARGETS = 4;  // of one path
+
 constexpr uint32_t COMES_OR_GOES = CREATED | DELETED | MOVED_FROM | MOVED_TO;
 constexpr uint32_t AT_ONCE = WRITTEN | DELETED | MOVED_FROM | MOVED_TO;
 
@@ -52,7 +54,10 @@ void Gatherer::Add(const Settings& settings, const Change& change, Time now) {
   if (here && was_here) {
     AddRename(change, now);
   } else if (here) {
-    Gather(change.path, change.what, change.directory, now);
+    Pending& entry = Gather(change.path, change.what, change.directory, now);
+    if (!change.target.empty()) {
+      AddTarget(entry, change.target);
+    }
   } else if (was_here) {
     Gather(change.from, DELETED, change.directory, now);
   }
@@ -75,12 +80,16 @@ bool Gatherer::AddFoldersBelow(const Settings& settings, const std::string& path
 
 void Gatherer::AddRename(const Change& change, Time now) {
   std::string origin = change.from;
+  bool was_changed = false;
+  std::vector<std::string> targets;
   const auto source = pending.find(change.from);
   if (source != pending.end() && !source->second.from.empty()) {
     origin = source->second.from;
     SetFrom(source->second, {});
     source->second.what |= MOVED_FROM;
   } else if (source != pending.end() && change.from != change.path) {
+    was_changed = source->second.changed;
+    targets = source->second.targets;
     Drop(source);  // the rename's line covers both paths
     ++folded;
   }
@@ -93,6 +102,32 @@ void Gatherer::AddRename(const Change& change, Time now) {
   if (!before.empty() && before != from) {
     Gather(before, MOVED_FROM, change.directory, now);
   }
+  rename.changed |= was_changed;
+  for (const std::string& target : targets) {
+    AddTarget(rename, target);
+  }
+}
+
+void Gatherer::AddTarget(Pending& entry, const std::string& target) {
+  if (std::find(entry.targets.begin(), entry.targets.end(), target) != entry.targets.end()) {
+    return;
+  }
+  if (entry.targets.size() == MOST_TARGETS) {
+    // One thing after the other is put there: the first is long gone from this path.
+    bytes -= entry.targets.front().size();
+    changed.push_back({{std::move(entry.targets.front())}, 0, 0});
+    entry.targets.erase(entry.targets.begin());
+  }
+  entry.targets.push_back(target);
+  bytes += target.size();
+}
+
+size_t Gatherer::BytesOf(const std::string& path, const Pending& entry) {
+  size_t sum = path.size() + entry.from.size();
+  for (const std::string& target : entry.targets) {
+    sum += target.size();
+  }
+  return sum;
 }
 
 Gatherer::Pending& Gatherer::Gather(const std::string& path, uint32_t what, bool directory,
@@ -109,6 +144,7 @@ Gatherer::Pending& Gatherer::Gather(const std::string& path, uint32_t what, bool
   Pending& entry = at->second;
   entry.what |= what;
   entry.directory |= directory;
+  entry.changed |= !directory && (what & CHANGES_THING) != 0;
   if (is_new) {
     bytes += path.size();
     entry.first = now;
@@ -134,7 +170,7 @@ void Gatherer::SetFrom(Pending& rename, const std::string& from) {
 }
 
 void Gatherer::Drop(PendingMap::iterator dropped) {
-  bytes -= dropped->first.size() + dropped->second.from.size();
+  bytes -= BytesOf(dropped->first, dropped->second);
   by_due.erase({dropped->second.due, &dropped->first});
   pending.erase(dropped);
 }
@@ -206,7 +242,7 @@ std::vector<Gatherer::PendingMap::node_type> Gatherer::TakeUntil(Time until) {
   while (!by_due.empty() && by_due.begin()->first <= until) {
     taken.push_back(pending.extract(*by_due.begin()->second));
     by_due.erase(by_due.begin());
-    bytes -= taken.back().key().size() + taken.back().mapped().from.size();
+    bytes -= BytesOf(taken.back().key(), taken.back().mapped());
   }
   std::sort(taken.begin(), taken.end(), [](const auto& a, const auto& b) {
     const std::string_view folder_a = FolderOf(a.key());
@@ -226,10 +262,12 @@ void Gatherer::TakeDue(const Settings& settings, Time now, bool everything,
   }
 
   FolderView folder;
-  for (const auto& taken : TakeUntil(until)) {
+  for (auto& taken : TakeUntil(until)) {
     const std::string& path = taken.key();
     const size_t before = lines.size();
-    LinesOfLook(settings, path, taken.mapped().what, taken.mapped().from, folder, lines);
+    const Look look =
+        LinesOfLook(settings, path, taken.mapped().what, taken.mapped().from, folder, lines);
+    NoteChanged(taken.mapped(), look);
     folded += lines.size() == before ? 1 : 0;
     for (size_t i = before; i < lines.size(); ++i) {
       recent.push_back(now);
@@ -240,6 +278,16 @@ void Gatherer::TakeDue(const Settings& settings, Time now, bool everything,
     while (recent.size() > LOAD) {
       recent.pop_front();
     }
+  }
+}
+
+// Without a handle, what is no longer at the path cannot be found; and the handle of what is there
+// tells no more than the look, but nobody knows yet that it is that.
+void Gatherer::NoteChanged(Pending& looked_at, const Look& look) {
+  const bool is_there = look.verdict == Verdict::BELONGS && look.thing != Thing::DIRECTORY;
+  if (!looked_at.targets.empty() || (looked_at.changed && is_there && look.links > 1)) {
+    changed.push_back(
+        {std::move(looked_at.targets), is_there ? look.inode : 0, is_there ? look.links : 0});
   }
 }
 
@@ -254,6 +302,7 @@ std::optional<Gatherer::Time> Gatherer::NextDue() const {
 void Gatherer::Clear() {
   by_due.clear();
   pending.clear();
+  changed.clear();
   bytes = 0;
   batch_due = {};
   batch_full.reset();

@@ -13,10 +13,20 @@
 #include <vector>
 
 #include "notify/change.h"
+#include "state/belonging.h"
 #include "state/queue_folding.h"
 #include "state/settings.h"
 
 namespace fileindexd {
+
+// A file that was changed at a path of the share and may have other names, as it was found when the
+// path was looked at.
+struct ChangedFile {
+  std::vector<std::string> targets;  // handles of what was changed there; none where the watch
+                                     // cannot tell
+  uint64_t inode = 0;                // of what is there now and belongs; 0: nothing
+  uint64_t links = 0;                // names that it has
+};
 
 // One thread. Takes the time from its callers.
 class Gatherer {
@@ -39,11 +49,15 @@ class Gatherer {
   // Looks at what is due, or at everything, and adds its lines to `lines`.
   void TakeDue(const Settings& settings, Time now, bool everything, std::vector<QueueLine>& lines);
 
+  // What TakeDue has found, and the changes that were too many to be kept for it. Whoever has them
+  // empties it.
+  std::vector<ChangedFile> changed;
+
   // None when nothing is gathered.
   std::optional<Time> NextDue() const;
 
   size_t Size() const { return pending.size(); }
-  size_t Bytes() const { return bytes; }  // of paths
+  size_t Bytes() const { return bytes; }  // of paths and handles
   void Clear();
 
   uint64_t changes = 0;  // taken in
@@ -53,7 +67,9 @@ class Gatherer {
   struct Pending {
     uint32_t what = 0;  // of Happening
     bool directory = false;
-    std::string from;  // of a rename
+    std::string from;                  // of a rename
+    bool changed = false;              // itself, and not its name alone
+    std::vector<std::string> targets;  // handles of what was changed; a few, each once
     Time first;
     Time due;
   };
@@ -63,6 +79,9 @@ class Gatherer {
   bool AddFoldersBelow(const Settings& settings, const std::string& path, Time now);
   void AddRename(const Change& change, Time now);
   Pending& Gather(const std::string& path, uint32_t what, bool directory, Time now);
+  void AddTarget(Pending& entry, const std::string& target);
+  void NoteChanged(Pending& looked_at, const Look& look);
+  static size_t BytesOf(const std::string& path, const Pending& entry);
   void SetFrom(Pending& rename, const std::string& from);
   void Drop(PendingMap::iterator dropped);
 

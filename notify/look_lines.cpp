@@ -42,13 +42,13 @@ uint32_t EventOf(const Look& look, uint32_t what) {
 
 }  // namespace
 
-void LinesOfLook(const Settings& settings, const std::string& path, uint32_t what,
+Look LinesOfLook(const Settings& settings, const std::string& path, uint32_t what,
                  const std::string& from, FolderView& folder, std::vector<QueueLine>& lines) {
   const Look look = LookNear(settings, path, folder);
   const bool may_be_there = look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN;
   if (!from.empty() && may_be_there) {
     lines.push_back({QLIB_NOTIFY_RENAME, path, {}, from});
-    return;
+    return look;
   }
 
   const uint32_t event = EventOf(look, what);
@@ -56,8 +56,9 @@ void LinesOfLook(const Settings& settings, const std::string& path, uint32_t wha
     lines.push_back({event, path, {}, {}});
   }
   if (!from.empty()) {
-    LinesOfLook(settings, from, MOVED_FROM, {}, folder, lines);
+    (void)LinesOfLook(settings, from, MOVED_FROM, {}, folder, lines);
   }
+  return look;
 }
 
 }  // namespace fileindexd

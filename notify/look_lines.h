@@ -17,8 +17,8 @@ namespace fileindexd {
 
 // Adds the lines to `lines`, none where nothing need be said. `what` is of Happening; with a former
 // path `from`, both of which belong by their letters, the thing was renamed. `folder` is kept from
-// one path to the next: those of one folder come together.
-void LinesOfLook(const Settings& settings, const std::string& path, uint32_t what,
+// one path to the next: those of one folder come together. Returns what was seen at `path`.
+Look LinesOfLook(const Settings& settings, const std::string& path, uint32_t what,
                  const std::string& from, FolderView& folder, std::vector<QueueLine>& lines);
 
 }  // namespace fileindexd

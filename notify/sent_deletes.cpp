@@ -84,7 +84,7 @@ std::vector<QueueLine> LinesOfReturned(const Settings& settings,
   FolderView folder;
   for (const std::string& path : paths) {
     const size_t before = lines.size();
-    LinesOfLook(settings, path, DELETED, {}, folder, lines);
+    (void)LinesOfLook(settings, path, DELETED, {}, folder, lines);
     if (lines.size() > before && lines.back().event == QLIB_NOTIFY_DELETE) {
       lines.pop_back();
     }

@@ -210,8 +210,11 @@ void Service::ReadEvents() {
   const Clock::time_point now = Clock::now();
   const Watches::Reading reading =
       watches.Read([this, now](const std::string& name, const Change& change) {
-        shares.at(name)->feed.Add(*settings, change, now);
+        return shares.at(name)->feed.Add(*settings, change, now);
       });
+  for (const Watches::ChangedThing& thing : reading.unseen) {
+    AddToDevice(thing.device, thing.inode);
+  }
   all_read = reading.all_read;
   follow_due = follow_due || reading.roots_moved;
   for (const std::string& name : reading.overflown) {
@@ -267,6 +270,7 @@ std::optional<Service::Clock::time_point> Service::NextDue() const {
   for (const auto& [name, share] : shares) {
     take(share->compare_at);
     take(share->feed.NextDue());
+    take(share->twins.NextDue());
   }
   return next;
 }
@@ -298,6 +302,7 @@ void Service::Round(Clock::time_point now) {
     }
   }
   WorkFeeds(now);
+  SearchTwins(now);
   AnswerClients();
 }
 

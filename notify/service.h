@@ -18,6 +18,7 @@
 #include "notify/queue_watch.h"
 #include "notify/server.h"
 #include "notify/share_feed.h"
+#include "notify/twins.h"
 #include "notify/watches.h"
 #include "state/store.h"
 
@@ -33,9 +34,10 @@ struct ServiceOptions {
 struct FedShare {
   using Clock = ShareFeed::Clock;
 
-  explicit FedShare(const std::string& name) : feed(name) {}
+  explicit FedShare(const std::string& name) : feed(name), twins(name) {}
 
   ShareFeed feed;
+  Twins twins;
   // When the next comparison is to be asked for, and how urgent it is. None: at the next sign.
   std::optional<Clock::time_point> compare_at;
   Urgency urgency = Urgency::NOW;
@@ -71,6 +73,9 @@ class Service {
   void TakeHealings();
   void ReadEvents();
   void WorkFeeds(Clock::time_point now);
+  void AddToDevice(const std::string& device, uint64_t inode);
+  void NoteChangedFile(const std::string& name, const ChangedFile& file);
+  void SearchTwins(Clock::time_point now);
   void AnswerClients();
   bool IsSynced(const std::string& name) const;
   void Serve(const Request& request);

@@ -100,7 +100,8 @@ bool Service::IsSynced(const std::string& name) const {
   if (share == shares.end() || watches.shares.at(name).by == WatchedBy::NOBODY) {
     return true;  // nothing more will come of it
   }
-  return !share->second->differs && share->second->feed.IsWrittenOut();
+  return !share->second->differs && share->second->twins.IsIdle() &&
+         share->second->feed.IsWrittenOut();
 }
 
 void Service::AnswerClients() {

@@ -8,7 +8,6 @@
 
 #include "base/event_codes.h"
 #include "index/reader.h"
-#include "notify/gatherer.h"
 #include "notify/sent_deletes.h"
 #include "state/queue_appender.h"
 #include "state/queue_writer.h"
@@ -190,11 +189,17 @@ ShareFeed::ShareFeed(std::string name_of_share)
     : impl(std::make_unique<Impl>(std::move(name_of_share))) {}
 ShareFeed::~ShareFeed() = default;
 
-void ShareFeed::Add(const Settings& settings, const Change& change, Clock::time_point now) {
+bool ShareFeed::Add(const Settings& settings, const Change& change, Clock::time_point now) {
+  const uint64_t before = counts.changes;
   impl->gatherer.Add(settings, change, now);
   counts.changes = impl->gatherer.changes;
   counts.folded = impl->gatherer.folded + impl->folded;
   impl->CheckBounds();
+  return counts.changes > before;
+}
+
+std::vector<ChangedFile> ShareFeed::TakeChanged() {
+  return std::exchange(impl->gatherer.changed, {});
 }
 
 void ShareFeed::AddLines(const Settings& settings, const std::vector<QueueLine>& lines) {

@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "notify/change.h"
+#include "notify/gatherer.h"
 #include "state/queue_folding.h"
 #include "state/settings.h"
 
@@ -39,8 +40,8 @@ class ShareFeed {
   ShareFeed& operator=(const ShareFeed&) = delete;
 
   // Takes in a change. `path` or `from`, or both, lie in the share or are a directory above it;
-  // what does not belong by its letters alone leaves no trace.
-  void Add(const Settings& settings, const Change& change, Clock::time_point now);
+  // what does not belong by its letters alone leaves no trace: false.
+  bool Add(const Settings& settings, const Change& change, Clock::time_point now);
 
   // Lines that need no look: what a comparison found, a reindex of a path that was mounted.
   void AddLines(const Settings& settings, const std::vector<QueueLine>& lines);
@@ -48,6 +49,9 @@ class ShareFeed {
   // Looks at what is due, and writes as many lines as the queue takes. With `everything`, all that
   // is gathered is due.
   void Work(const Settings& settings, Clock::time_point now, bool everything = false);
+
+  // Files that were changed, and may have other names, since this was asked last.
+  std::vector<ChangedFile> TakeChanged();
 
   // When Work has something to do; none: not before something is added. What waits for the daemon
   // to take the queue is due when that happens: call Work then.

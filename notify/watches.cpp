@@ -291,17 +291,18 @@ void Watches::DropUnusedGroups() {
 }
 
 void Watches::Tell(const std::string& device, const Change& change, const TellShare& tell,
-                   Reading& reading) {
+                   Strays& strays, Reading& reading) {
   // By whatever path a share shows it: a line about our own writing would be the next writing.
-  if (device == own_device && Covers(own_within, change.path)) {
+  if (device == own_device && !change.path.empty() && Covers(own_within, change.path)) {
     return;
   }
+  bool taken = false;
   for (auto& [name, watch] : shares) {
     if (watch.by != WatchedBy::FANOTIFY || watch.place.device != device) {
       continue;
     }
     const std::string& within = watch.place.within;
-    if ((change.what & NAMES) != 0 &&
+    if ((change.what & NAMES) != 0 && !change.path.empty() &&
         (Covers(change.path, within) || (!change.from.empty() && Covers(change.from, within)))) {
       // Even if it is back by the time of the look, changes may have been told of another path.
       watch.moved = true;
@@ -311,11 +312,39 @@ void Watches::Tell(const std::string& device, const Change& change, const TellSh
     const std::optional<std::string> path = InShare(watch, change.path);
     const std::optional<std::string> from = InShare(watch, change.from);
     if (path.has_value()) {
-      tell(name, {change.what, change.directory, *path, from.value_or("")});
+      taken |= tell(name, {change.what, change.directory, *path, from.value_or(""), change.target});
     } else if (from.has_value()) {
-      tell(name, {MOVED_FROM, change.directory, *from, ""});
+      taken |= tell(name, {MOVED_FROM, change.directory, *from, ""});
     }
   }
+  if (!taken && !change.target.empty()) {
+    strays.insert_or_assign(change.target, change.path);
+  }
+}
+
+// Nearly all of what happens outside the shares is done to files of one name.
+void Watches::FindOtherNames(const FanGroup& group, const std::string& device, const Strays& strays,
+                             Reading& reading) {
+  for (const auto& [target, path] : strays) {
+    FanGroup::Target thing;
+    if (!group.LookAtTarget(target, thing)) {
+      LogDebug("device %s: a changed file cannot be looked at: %m", device.c_str());
+      continue;
+    }
+    if (thing.links > 1 || (thing.links == 1 && !group.IsAt(path, thing))) {
+      reading.unseen.push_back({device, thing.inode});
+    }
+  }
+}
+
+bool Watches::LookAtTarget(const std::string& share, const std::string& target,
+                           FanGroup::Target& thing) const {
+  const auto watch = shares.find(share);
+  if (watch == shares.end() || watch->second.by != WatchedBy::FANOTIFY) {
+    return false;
+  }
+  const auto group = groups.find(watch->second.place.device);
+  return group != groups.end() && group->second->LookAtTarget(target, thing);
 }
 
 void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
@@ -323,9 +352,12 @@ void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
     const std::string& device = group->first;
     FanGroup& events = *group->second;
     FanGroup::Result result = FanGroup::Result::MORE;
+    Strays strays;
     for (int n = 0; n < MOST_BUFFERS && result == FanGroup::Result::MORE; ++n) {
-      result = events.Read([&](const Change& change) { Tell(device, change, tell, reading); });
+      result =
+          events.Read([&](const Change& change) { Tell(device, change, tell, strays, reading); });
     }
+    FindOtherNames(events, device, strays, reading);
 
     const bool overflown = events.TakeOverflow();
     for (auto& [name, watch] : shares) {

@@ -13,6 +13,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -67,15 +68,26 @@ class Watches {
   // Brings the watches into line with the settings, the mounts and the shares' roots of now.
   News Follow(const std::shared_ptr<const Settings>& in_force);
 
-  using TellShare = std::function<void(const std::string& share, const Change& change)>;
+  // Returns whether the share took the change in.
+  using TellShare = std::function<bool(const std::string& share, const Change& change)>;
+  struct ChangedThing {
+    std::string device;
+    uint64_t inode = 0;
+  };
   struct Reading {
     bool all_read = true;                // nothing waits any more
     bool roots_moved = false;            // something happened at or above a share's root, or a
                                          // watch broke: Follow is due
     std::vector<std::string> overflown;  // shares of which events were lost
+    std::vector<ChangedThing> unseen;  // things that were changed by names which no share took, and
+                                       // may have others
   };
   // Reads what waits, a bounded number of buffers.
   Reading Read(const TellShare& tell);
+
+  // The thing that the target of one of the share's changes is. False when it cannot be told.
+  bool LookAtTarget(const std::string& share, const std::string& target,
+                    FanGroup::Target& thing) const;
 
   // All descriptors that can be read from.
   std::vector<int> Descriptors() const;
@@ -95,8 +107,12 @@ class Watches {
   void TryBetter(const Share& share, const Mount& mount, ShareWatch& watch, News& news);
   void Begin(const Share& share, const Mount& mount, ShareWatch& watch);
   bool BeginFanotify(const Mount& mount, ShareWatch& watch, std::string& refusal);
-  void Tell(const std::string& device, const Change& change, const TellShare& tell,
+  // By the handle of what was changed: a path within the file system.
+  using Strays = std::unordered_map<std::string, std::string>;
+  void Tell(const std::string& device, const Change& change, const TellShare& tell, Strays& strays,
             Reading& reading);
+  static void FindOtherNames(const FanGroup& group, const std::string& device, const Strays& strays,
+                             Reading& reading);
   void ReadGroups(const TellShare& tell, Reading& reading);
   void ReadTrees(const TellShare& tell, Reading& reading);
   void DropUnusedGroups();

@@ -1,4 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <unistd.h>
+
+#include <algorithm>
+
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -91,6 +95,26 @@ TEST_F(ReaderTest, FindOfWhatIsNotHeldIsFalse) {
   entry.id = 7;
   EXPECT_FALSE(Read()->Find(At("none"), entry));
   EXPECT_EQ(entry.id, 7);
+}
+
+TEST_F(ReaderTest, EntriesOfAnInodeAreAllItsNamesAndNoOthers) {
+  WriteFile(At("a"), "");
+  WriteFile(At("other"), "");
+  ASSERT_EQ(link(At("a").c_str(), At("b").c_str()), 0);
+  AddAll();
+  const uint64_t inode = Find("a").inode;
+
+  Names names;
+  const auto visit = [&](const Entry& entry) {
+    names.push_back(entry.path);
+    EXPECT_EQ(entry.inode, inode);
+    return true;
+  };
+  ASSERT_TRUE(Read()->ForEachOfInode(inode, visit));
+  std::sort(names.begin(), names.end());
+  EXPECT_EQ(names, Names({At("a"), At("b")}));
+  ASSERT_TRUE(Read()->ForEachOfInode(1'000'000'007, visit));
+  EXPECT_EQ(names.size(), 2U);
 }
 
 TEST_F(ReaderTest, TimeOfTheLastCommitIsKept) {
