@@ -12,6 +12,7 @@
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstring>
@@ -178,7 +179,7 @@ bool FanGroup::Impl::LookAtTarget(const std::string& target, Target& thing) cons
   if (target.size() < sizeof(file_handle) || target.size() > sizeof space) {
     return false;
   }
-  memcpy(space, target.data(), target.size());
+  std::copy(target.begin(), target.end(), space);
   auto* handle = reinterpret_cast<file_handle*>(space);
   if (handle->handle_bytes != target.size() - sizeof(file_handle)) {
     return false;

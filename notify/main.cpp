@@ -82,7 +82,7 @@ int OpenSignals() {
     sigaddset(&ending, number);
   }
   (void)signal(SIGPIPE, SIG_IGN);
-  if (sigprocmask(SIG_BLOCK, &ending, nullptr) != 0) {
+  if (pthread_sigmask(SIG_BLOCK, &ending, nullptr) != 0) {
     return -1;
   }
   return signalfd(-1, &ending, SFD_CLOEXEC);
@@ -101,7 +101,7 @@ int Serve(const CommandLine& chosen) {
   RaiseDescriptorLimit();
   const ScopedFd signals(OpenSignals());
   if (signals.fd < 0) {
-    return Complain(std::string("signals: ") + strerror(errno));
+    return Complain(std::string("signals: ") + strerror(errno));  // NOLINT: one thread yet
   }
 
   std::string error;
@@ -129,14 +129,13 @@ int Serve(const CommandLine& chosen) {
 }  // namespace fileindexd
 
 int main(int argc, char** argv) {
-  fileindexd::CommandLine chosen;
-  int code = 0;
-  if (!fileindexd::ParseCommandLine(argc, argv, chosen, code)) {
-    return code;
-  }
-
-  fileindexd::OpenLog(chosen.log);
   try {
+    fileindexd::CommandLine chosen;
+    int code = 0;
+    if (!fileindexd::ParseCommandLine(argc, argv, chosen, code)) {
+      return code;
+    }
+    fileindexd::OpenLog(chosen.log);
     return fileindexd::Serve(chosen);
   } catch (const std::exception& error) {
     fileindexd::LogError("%s", error.what());

@@ -378,15 +378,19 @@ void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
 }
 
 void Watches::ReadTrees(const TellShare& tell, Reading& reading) {
-  for (auto& [name, watch] : shares) {
+  for (auto& entry : shares) {
+    const std::string& name = entry.first;
+    ShareWatch& watch = entry.second;
     if (watch.tree == nullptr) {
       continue;
     }
     TreeWatch::Result result = TreeWatch::Result::MORE;
     for (int n = 0; n < MOST_BUFFERS && result == TreeWatch::Result::MORE; ++n) {
       result = watch.tree->Read([&](const Change& change) {
-        reading.roots_moved = reading.roots_moved ||
-                              ((change.what & NAMES) != 0 && Covers(change.path, watch.place.root));
+        if ((change.what & NAMES) != 0 && Covers(change.path, watch.place.root)) {
+          watch.moved = true;
+          reading.roots_moved = true;
+        }
         tell(name, change);
       });
     }
