@@ -178,4 +178,11 @@ bool IsChangedElsewhere(std::string_view type) {
          type.starts_with("fuse.");
 }
 
+std::string PathBelow(const std::string& root, std::string_view below) {
+  if (below.empty()) {
+    return root;
+  }
+  return (root == "/" ? root : root + '/') + std::string(below);
+}
+
 }  // namespace fileindexd

@@ -43,4 +43,7 @@ class MountTable {
 // some of them can be watched.
 bool IsChangedElsewhere(std::string_view type);
 
+// The path of what lies at `below`, without a slash in front, under normal path `root`.
+std::string PathBelow(const std::string& root, std::string_view below);
+
 }  // namespace fileindexd
