@@ -2,6 +2,7 @@
 // Compares shares with their indexes, one after the other, on threads of its own.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <string>
@@ -24,9 +25,10 @@ struct Healing {
   bool done = false;  // false: `error` says why it could not be made
   std::string error;
   Comparison counts;
-  std::vector<QueueLine> lines;  // that mend what was found, sorted
-  int64_t began = 0;             // seconds since the epoch
-  int64_t ended = 0;             // the same
+  std::vector<QueueLine> lines;         // that mend what was found, sorted
+  int64_t began = 0;                    // seconds since the epoch
+  int64_t ended = 0;                    // the same
+  std::chrono::milliseconds worked{0};  // without all waiting
 };
 
 // Used by one thread; what it starts is its own.

@@ -32,6 +32,7 @@ constexpr std::chrono::seconds SLOW_LOOK_INTERVAL(60);
 // broken one may take an administrator's time.
 constexpr std::chrono::milliseconds FIRST_RETRY(500);
 constexpr std::chrono::milliseconds LONGEST_RETRY(30000);
+constexpr std::chrono::milliseconds LONGEST_REST(30000);  // between two comparisons of a share
 constexpr std::chrono::seconds REINDEX_INTERVAL(2);
 // For the last lines; what the daemon's lock keeps out is found by the comparison at the next
 // start.
@@ -102,7 +103,8 @@ bool Service::ReloadSettings() {
 }
 
 void Service::FollowAll() {
-  const bool first = shares.empty();
+  const bool first = !has_followed;
+  has_followed = true;
   follow_due = false;
   const Watches::News news = watches.Follow(settings);
 
@@ -176,7 +178,7 @@ void Service::TakeHealings() {
       continue;
     }
     FedShare& share = *known->second;
-    share.rest_until = Clock::now() + std::chrono::seconds(healing.ended - healing.began);
+    share.rest_until = Clock::now() + std::min(healing.worked, LONGEST_REST);
     const bool is_last = !healer.IsPending(healing.share) && !share.compare_at.has_value();
     const std::string& name = known->first;
     if (healing.done) {
@@ -223,6 +225,11 @@ void Service::ReadEvents() {
   }
 }
 
+bool Service::IsThere(const std::string& name) const {
+  const ShareWatch& watch = watches.shares.at(name);
+  return watch.by != WatchedBy::NOBODY && !watch.moved;
+}
+
 void Service::WorkFeeds(Clock::time_point now) {
   std::set<std::string> hurried;
   for (const Syncing& waiting : syncing) {
@@ -235,6 +242,9 @@ void Service::WorkFeeds(Clock::time_point now) {
       // Lines about a share that is not there could only do harm, and it is compared when it comes.
       share->feed.Clear();
       continue;
+    }
+    if (watch.moved) {
+      continue;  // a look would find nothing there; what became of the root comes first
     }
     // Before a comparison has ended nobody is answered, and there is no hurry.
     const bool hurry = hurried.contains(name) && !share->differs && !share->feed.IsWrittenOut();
@@ -250,7 +260,14 @@ void Service::WorkFeeds(Clock::time_point now) {
     }
     if (share->feed.TakeLoss()) {
       LogInfo("share %s: more changes than are kept", name.c_str());
-      WantComparison(name, "more changes than are kept");
+      // Other names of the files that were changed may lie in its neighbours.
+      for (const auto& [other, neighbour] : watches.shares) {
+        if (other == name ||
+            (watch.by == WatchedBy::FANOTIFY && neighbour.by == WatchedBy::FANOTIFY &&
+             neighbour.place.device == watch.place.device)) {
+          WantComparison(other, "more changes than are kept");
+        }
+      }
     }
     if (watch.by != WatchedBy::COMPARISON && all_read && !share->differs &&
         share->feed.IsWrittenOut()) {
@@ -297,7 +314,8 @@ void Service::Round(Clock::time_point now) {
   TakeHealings();
   StartDueComparisons(now);
   for (const std::string& name : taken) {
-    if (const auto share = shares.find(name); share != shares.end()) {
+    const auto share = shares.find(name);
+    if (share != shares.end() && IsThere(name)) {
       share->second->feed.Work(*settings, now);
     }
   }
@@ -357,7 +375,7 @@ void Service::WriteOut() {
     ReadEvents();
   }
   for (auto& [name, share] : shares) {
-    if (watches.shares.at(name).by != WatchedBy::NOBODY && Clock::now() < deadline) {
+    if (IsThere(name) && Clock::now() < deadline) {
       share->feed.Work(*settings, Clock::now(), true);
     }
     // A lock that somebody holds cannot be awaited by an event; the feed says when to try again.

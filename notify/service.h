@@ -72,12 +72,12 @@ class Service {
   void StartDueComparisons(Clock::time_point now);
   void TakeHealings();
   void ReadEvents();
+  bool IsThere(const std::string& name) const;
   void WorkFeeds(Clock::time_point now);
   void AddToDevice(const std::string& device, uint64_t inode);
   void NoteChangedFile(const std::string& name, const ChangedFile& file);
   void SearchTwins(Clock::time_point now);
   void AnswerClients();
-  bool IsSynced(const std::string& name) const;
   void Serve(const Request& request);
   std::string StatusReply() const;
   void Round(Clock::time_point now);
@@ -88,9 +88,13 @@ class Service {
 
   struct Syncing {
     uint64_t client = 0;
-    std::set<std::string> shares;  // that are not done yet
-    int rounds = 0;                // since it asked
+    std::set<std::string> shares;             // that are not done yet
+    std::map<std::string, uint64_t> tickets;  // of their twins; none before all is written out
+    int rounds = 0;                           // since it asked
   };
+
+  bool IsWrittenOut(const std::string& name) const;
+  bool IsSynced(const std::string& name, const Syncing& waiting) const;
 
   const ServiceOptions options;
   std::unique_ptr<StateStore> store;
@@ -104,6 +108,7 @@ class Service {
   std::map<std::string, std::unique_ptr<FedShare>> shares;  // by name
   std::vector<Syncing> syncing;
   bool follow_due = true;
+  bool has_followed = false;
   bool all_read = false;
   bool ended = false;
   std::string settings_error;

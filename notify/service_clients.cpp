@@ -78,7 +78,7 @@ void Service::Serve(const Request& request) {
   if (follow_due || watches.IsAnyMissing()) {
     FollowAll();
   }
-  Syncing waiting{request.client, {}, 0};
+  Syncing waiting{request.client, {}, {}, 0};
   for (const auto& [name, share] : shares) {
     const bool is_meant =
         request.shares.empty() ||
@@ -95,22 +95,41 @@ void Service::Serve(const Request& request) {
   syncing.push_back(std::move(waiting));
 }
 
-bool Service::IsSynced(const std::string& name) const {
+// A share whose lines are all in its queue file; or of which nothing more will come.
+bool Service::IsWrittenOut(const std::string& name) const {
   const auto share = shares.find(name);
-  if (share == shares.end() || watches.shares.at(name).by == WatchedBy::NOBODY) {
-    return true;  // nothing more will come of it
-  }
-  return !share->second->differs && share->second->twins.IsIdle() &&
-         share->second->feed.IsWrittenOut();
+  return share == shares.end() || watches.shares.at(name).by == WatchedBy::NOBODY ||
+         (!share->second->differs && share->second->feed.IsWrittenOut());
+}
+
+bool Service::IsSynced(const std::string& name, const Syncing& waiting) const {
+  const auto ticket = waiting.tickets.find(name);
+  const auto share = shares.find(name);
+  return IsWrittenOut(name) && (share == shares.end() || ticket == waiting.tickets.end() ||
+                                share->second->twins.IsDone(ticket->second));
 }
 
 void Service::AnswerClients() {
+  if (follow_due) {
+    return;  // what was read tells that a share is not what it was
+  }
   std::erase_if(syncing, [this](Syncing& waiting) {
     ++waiting.rounds;
     if (!all_read && waiting.rounds < ROUNDS_TO_READ_ALL) {
       return false;
     }
-    std::erase_if(waiting.shares, [this](const std::string& name) { return IsSynced(name); });
+    // All is looked at once all is written out, and what that found is in the search.
+    if (waiting.tickets.empty() &&
+        std::all_of(waiting.shares.begin(), waiting.shares.end(),
+                    [this](const std::string& name) { return IsWrittenOut(name); })) {
+      for (const auto& [name, share] : shares) {
+        waiting.tickets.emplace(name, share->twins.DrawTicket());
+      }
+    }
+    if (!waiting.tickets.empty()) {
+      std::erase_if(waiting.shares,
+                    [&](const std::string& name) { return IsSynced(name, waiting); });
+    }
     if (!waiting.shares.empty()) {
       return !server.IsWaiting(waiting.client);
     }

@@ -80,6 +80,7 @@ bool ShareComparison::GoOn() {
         return true;
       },
       piece);
+  healing.worked += std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - began);
   if (result == Comparer::Result::FAILED) {
     return Fail(comparer.Error());
   }

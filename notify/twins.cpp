@@ -36,6 +36,7 @@ void CloseIfGone(ScopedFd& file) {
 }  // namespace
 
 void Twins::Add(uint64_t inode, Asking asking) {
+  ++added;
   const auto [known, is_new] = fresh.emplace(inode, asking);
   if (!is_new && asking == Asking::TWICE) {
     known->second = asking;
@@ -117,6 +118,7 @@ void Twins::AskBatch(const Settings& settings, size_t& allowed, std::vector<Queu
 
 // The files held open keep their inode numbers from being given to the next ones.
 void Twins::BeginBatch(Clock::time_point now) {
+  batch_ticket = fresh.empty() ? added : done_ticket;
   batch.assign(next.begin(), next.end());
   next.clear();
   next_batch = now + PACE;
@@ -139,6 +141,7 @@ void Twins::Pump(const Settings& settings, Clock::time_point now, bool hurry,
   const bool is_walked = can_ask && is_indexed_anew();
   if (can_ask && !is_walked) {
     AskBatch(settings, allowed, lines);
+    done_ticket = batch.empty() ? batch_ticket : done_ticket;
   }
 
   if (IsIdle()) {
@@ -148,8 +151,9 @@ void Twins::Pump(const Settings& settings, Clock::time_point now, bool hurry,
     due = now;
   } else if (is_walked) {
     due = now + WALK_INTERVAL;
-  } else if (batch.empty()) {
-    due = hurry ? now : next_batch;
+  } else {
+    // The files of the batch may lie in a folder that nobody watches yet.
+    due = batch.empty() ? (hurry ? now : next_batch) : now + PACE;
   }
 }
 

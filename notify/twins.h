@@ -57,6 +57,11 @@ class Twins {
   std::optional<Clock::time_point> NextDue() const { return due; }
   bool IsIdle() const { return Size() == 0; }
 
+  // What is added all the time must not keep those waiting who asked before: all that was added
+  // until a ticket was drawn is done once IsDone says so of it.
+  uint64_t DrawTicket() const { return added; }
+  bool IsDone(uint64_t ticket) const { return IsIdle() || done_ticket >= ticket; }
+
   // True once after more came than is kept, or the index could not be asked, and all was dropped:
   // the share is to be compared.
   bool TakeLoss() { return std::exchange(lost, false); }
@@ -72,6 +77,9 @@ class Twins {
   bool IsReaderOpen();
   void Lose();
 
+  uint64_t added = 0;  // calls of Add
+  uint64_t batch_ticket = 0;
+  uint64_t done_ticket = 0;
   const std::string share;
   std::unordered_map<uint64_t, Asking> fresh;  // not asked yet
   std::unordered_set<uint64_t> next;           // to be asked again, with the next batch

@@ -171,7 +171,7 @@ void Watches::TryBetter(const Share& share, const Mount& mount, ShareWatch& watc
     news.appeared.push_back(share.name);
   } else if (watch.by == WatchedBy::COMPARISON) {
     Begin(share, mount, watch);
-    if (watch.by == WatchedBy::INOTIFY) {
+    if (watch.by != WatchedBy::COMPARISON) {
       news.appeared.push_back(share.name);
     }
   }

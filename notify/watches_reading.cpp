@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What the watches tell, by share.
+#include <cerrno>
 #include <optional>
 #include <string_view>
 
@@ -98,6 +99,7 @@ void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
       result =
           events.Read([&](const Change& change) { Tell(device, change, tell, strays, reading); });
     }
+    const int reason = errno;
     FindOtherNames(events, device, strays, reading);
 
     const bool overflown = events.TakeOverflow();
@@ -108,6 +110,7 @@ void Watches::ReadGroups(const TellShare& tell, Reading& reading) {
       }
     }
     if (result == FanGroup::Result::FAILED) {
+      errno = reason;
       LogError("fanotify on device %s: reading failed: %m", device.c_str());
       reading.roots_moved = true;
       group = groups.erase(group);
