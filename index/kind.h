@@ -5,12 +5,10 @@
 #include <optional>
 #include <string_view>
 
+#include "base/kind.h"
 #include "state/settings.h"
 
 namespace fileindexd {
-
-// Numbers are stored in the index: they never change.
-enum class Kind { OTHER = 0, DOCUMENT = 1, AUDIO = 2, VIDEO = 3, PHOTO = 4, FOLDER = 5 };
 
 // Kind of a regular file, by the ending of its name, letter case ignored. OTHER where the ending
 // tells nothing.

@@ -1,0 +1,74 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What reads one family of file formats, inside the closed helper.
+//
+// A reader gets a hostile file. It may throw std::exception, be killed for time or memory, and
+// crash: all of that costs this one file. It keeps nothing between two files, reads only the
+// descriptor it is given, and opens nothing but what its library needs of the system (see doors.h).
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "base/content.h"
+
+namespace fileindexd {
+
+struct Document {
+  int file = -1;     // open for reading, at its beginning, seekable; not the reader's to close
+  std::string name;  // last component of its path, any bytes; a member's name in an archive
+  int64_t size = 0;  // bytes
+  int depth = 0;     // of archives and messages around it
+};
+
+// Takes what readers find, up to the bounds of an answer.
+class ContentSink {
+ public:
+  explicit ContentSink(size_t text_cap_bytes) : text_cap(text_cap_bytes) {}
+
+  // Appends running text. Bytes that are no UTF-8 and control characters are replaced by blanks,
+  // runs of white space become one. Ends no word by itself: give white space where words end.
+  void AddText(std::string_view bytes);
+  // False values and empty texts are left out; the first value of a field stays, but that KEYWORDS,
+  // MEMBERS, ATTACHMENTS, TO and CODECS gather what comes. Cut at MAX_FIELD bytes.
+  void Set(ContentField field, std::string_view text);
+  void Set(ContentField field, int64_t number);
+  void SetKind(Kind kind) { content.kind = kind; }
+  // Nothing more is taken as text: a reader stops.
+  bool IsFull() const { return content.is_cut; }
+
+  static constexpr size_t MAX_FIELD = 64 * 1024;
+
+  Content content;
+  // Not empty: the text of this file is best read by that program (see converters.h).
+  std::string converter;
+
+ private:
+  size_t text_cap;
+};
+
+// False when the file cannot be read as that format, and `why` then says so in a few words for an
+// administrator ("damaged", "encrypted", "not a PDF file"). What was put into the sink before is
+// kept: half a document is better than none.
+using FormatReader = bool (*)(const Document& document, ContentSink& sink, std::string& why);
+
+bool ReadText(const Document& document, ContentSink& sink, std::string& why);  // any charset
+bool ReadHtml(const Document& document, ContentSink& sink, std::string& why);
+bool ReadXml(const Document& document, ContentSink& sink, std::string& why);  // SVG too
+bool ReadPdf(const Document& document, ContentSink& sink, std::string& why);
+bool ReadOfficeZip(const Document& document, ContentSink& sink, std::string& why);  // docx … odp
+bool ReadEpub(const Document& document, ContentSink& sink, std::string& why);
+bool ReadOldOffice(const Document& document, ContentSink& sink, std::string& why);  // doc, xls, ppt
+bool ReadRtf(const Document& document, ContentSink& sink, std::string& why);
+bool ReadMessage(const Document& document, ContentSink& sink, std::string& why);  // eml
+bool ReadMailbox(const Document& document, ContentSink& sink, std::string& why);  // mbox
+bool ReadArchive(const Document& document, ContentSink& sink, std::string& why);
+bool ReadAudio(const Document& document, ContentSink& sink, std::string& why);
+bool ReadVideo(const Document& document, ContentSink& sink, std::string& why);
+bool ReadPhoto(const Document& document, ContentSink& sink, std::string& why);
+
+// Chooses by the name's ending, where that tells nothing by the content, and reads. True with kind
+// OTHER and nothing else for what no reader is for.
+bool ReadDocument(const Document& document, ContentSink& sink, std::string& why);
+
+}  // namespace fileindexd

@@ -1,0 +1,86 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Writing one share's contents. The content service alone does it; one thread.
+//
+// Contents stand under a file's identity, not its path: a rename, a move, another hard link, a
+// reindex or a rebuilt entries database costs no reading. Changes gather in one transaction until
+// Commit; a failure undoes all since the last one, and the caller closes and opens anew.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "base/content.h"
+#include "index/database.h"
+#include "state/settings.h"
+
+namespace fileindexd {
+
+struct FileIdentity {
+  uint64_t inode = 0;
+  int64_t birth_time = 0;  // nanoseconds since the epoch; 0: not known
+  int64_t size = 0;
+  int64_t mtime = 0;  // nanoseconds since the epoch
+  bool operator==(const FileIdentity&) const = default;
+};
+
+// A file that is to be read.
+struct ContentJob {
+  int64_t file = 0;  // row in the contents
+  FileIdentity identity;
+  Kind kind = Kind::OTHER;         // by its name
+  int64_t tries = 0;               // that killed a helper, or were never ended
+  std::vector<std::string> paths;  // of entries with that identity, at least one
+};
+
+class ContentsWriter {
+ public:
+  ContentsWriter();
+  ~ContentsWriter();
+
+  // Opens the share's contents beside its entries, and makes them where they are missing, of
+  // another schema or another file system, or damaged (then a copy is set aside). Entries that are
+  // missing are PATH_NOT_FOUND.
+  IndexError Open(const Share& share, int64_t extractor_version);
+  void Close();
+  bool IsOpen() const;
+
+  // Takes in entries that changed since the last call, at most `limit` rows: files wanted and not
+  // known begin to wait; a file whose ctime is another while all else is the same waits again when
+  // the entry was added anew, and only has the ctime stored when it was updated. `more`: call
+  // again.
+  bool TakeIn(size_t limit, bool& more);
+  // Has TakeIn look at every entry again: at the start, after a rebuild, when settings changed,
+  // once a day. Along with it goes what entries no longer want (see Sweep).
+  void LookAtAll();
+
+  // Files that wait, newest and smallest first, without those handed out and not ended.
+  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs);
+  // On disk when it returns: what is about to be tried.
+  bool BeginTries(const std::vector<int64_t>& files);
+  bool Finish(int64_t file, const Content& content);
+  // It cannot be read; what was found before the failure is kept. `killed`: the helper died; after
+  // the second time the file is not handed out again until it or the extractor changes.
+  bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
+  // Not tried after all, or its file changed meanwhile: it waits again.
+  bool Release(int64_t file);
+  // All that failed waits again.
+  bool RetryFailed();
+
+  // Removes, at most `limit` rows, contents whose kind is no longer wanted, and those that no entry
+  // referred to for a day. `now`: seconds since the epoch.
+  bool Sweep(int64_t now, size_t limit, bool& more);
+
+  bool HasChanges() const;
+  size_t PendingBytes() const;  // text since the last commit
+  bool Commit();
+
+  IndexError Error() const;  // of the last operation that returned false
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl;
+};
+
+}  // namespace fileindexd
