@@ -149,7 +149,7 @@ void Service::WantComparison(const std::string& name, const char* reason) {
   LogDebug("share %s is to be compared: %s", name.c_str(), reason);
   FedShare& share = *shares.at(name);
   share.differs = true;
-  share.urgency = Urgency::NOW;
+  share.urgency = watches.shares.at(name).can_hang ? Urgency::APART : Urgency::NOW;
   // Losses that go on must not have whole comparisons back to back.
   share.compare_at = std::max(Clock::now(), share.rest_until);
   share.retry = FIRST_RETRY;
@@ -188,7 +188,9 @@ void Service::TakeHealings() {
       const bool is_watched = watches.shares.at(name).by != WatchedBy::COMPARISON;
       if (is_last) {
         share.differs = false;
-        share.urgency = is_watched ? Urgency::IDLE : Urgency::NOW;
+        if (is_watched) {
+          share.urgency = Urgency::IDLE;
+        }
         share.compare_at = Clock::now() + (is_watched ? options.daily : options.interval);
       }
       if (!is_watched) {
