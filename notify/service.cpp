@@ -378,7 +378,7 @@ void Service::WriteOut() {
   }
   for (auto& [name, share] : shares) {
     if (IsThere(name) && Clock::now() < deadline) {
-      share->feed.Work(*settings, Clock::now(), true);
+      share->feed.Work(*settings, Clock::now(), true, deadline);
     }
     // A lock that somebody holds cannot be awaited by an event; the feed says when to try again.
     while (!share->feed.IsWrittenOut() && share->feed.NextDue().has_value() &&
@@ -386,7 +386,7 @@ void Service::WriteOut() {
       const auto nap =
           std::chrono::ceil<std::chrono::milliseconds>(*share->feed.NextDue() - Clock::now());
       (void)poll(nullptr, 0, static_cast<int>(std::max<int64_t>(nap.count(), 1)));
-      share->feed.Work(*settings, Clock::now(), true);
+      share->feed.Work(*settings, Clock::now(), true, deadline);
     }
     if (!share->feed.IsWrittenOut()) {
       LogInfo("share %s: %zu changes are left to the comparison at the next start", name.c_str(),
