@@ -381,8 +381,8 @@ void Service::WriteOut() {
       share->feed.Work(*settings, Clock::now(), true, deadline);
     }
     // A lock that somebody holds cannot be awaited by an event; the feed says when to try again.
-    while (!share->feed.IsWrittenOut() && share->feed.NextDue().has_value() &&
-           *share->feed.NextDue() < deadline) {
+    while (Clock::now() < deadline && !share->feed.IsWrittenOut() &&
+           share->feed.NextDue().has_value() && *share->feed.NextDue() < deadline) {
       const auto nap =
           std::chrono::ceil<std::chrono::milliseconds>(*share->feed.NextDue() - Clock::now());
       (void)poll(nullptr, 0, static_cast<int>(std::max<int64_t>(nap.count(), 1)));
