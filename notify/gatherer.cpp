@@ -252,8 +252,14 @@ std::vector<Gatherer::PendingMap::node_type> Gatherer::TakeUntil(Time until) {
   return taken;
 }
 
+void Gatherer::PutBack(PendingMap::node_type&& entry) {
+  bytes += BytesOf(entry.key(), entry.mapped());
+  const auto back = pending.insert(std::move(entry)).position;
+  by_due.emplace(back->second.due, &back->first);
+}
+
 void Gatherer::TakeDue(const Settings& settings, Time now, bool everything,
-                       std::vector<QueueLine>& lines) {
+                       std::vector<QueueLine>& lines, Time deadline) {
   Time until = batch_full.has_value() ? std::max(now, batch_due) : now;
   until = everything ? Time::max() : until;
   if (until >= batch_due) {
@@ -263,6 +269,10 @@ void Gatherer::TakeDue(const Settings& settings, Time now, bool everything,
 
   FolderView folder;
   for (auto& taken : TakeUntil(until)) {
+    if (deadline != Time::max() && std::chrono::steady_clock::now() >= deadline) {
+      PutBack(std::move(taken));
+      continue;
+    }
     const std::string& path = taken.key();
     const size_t before = lines.size();
     const Look look =

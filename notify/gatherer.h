@@ -46,8 +46,10 @@ class Gatherer {
   // becomes a delete, and the rename's line has the daemon walk the new place anyway.
   void Add(const Settings& settings, const Change& change, Time now);
 
-  // Looks at what is due, or at everything, and adds its lines to `lines`.
-  void TakeDue(const Settings& settings, Time now, bool everything, std::vector<QueueLine>& lines);
+  // Looks at what is due, or at everything, and adds its lines to `lines`. What is not looked at by
+  // the deadline stays.
+  void TakeDue(const Settings& settings, Time now, bool everything, std::vector<QueueLine>& lines,
+               Time deadline = Time::max());
 
   // What TakeDue has found, and the changes that were too many to be kept for it. Whoever has them
   // empties it.
@@ -91,6 +93,7 @@ class Gatherer {
   bool IsBusy(Time now) const;
   void NoteModify(const std::string& path, Time now);
   std::vector<PendingMap::node_type> TakeUntil(Time until);
+  void PutBack(PendingMap::node_type&& entry);
 
   const std::string share;
   PendingMap pending;

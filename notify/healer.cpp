@@ -4,16 +4,18 @@
 //   Request --> waiting --> the thread of its urgency: piece, turn, piece, turn ... --> ended -->
 //   Take
 //
-// Two threads, because a thread that has stepped back to idle priority has no way forward. One
-// comparison works at a time: the idle one stands still between two pieces while there is an urgent
-// one, and goes on where it was. An urgent request for the very share that is compared at idle
-// takes its place, since it looks at everything again.
+// A thread for each urgency, because one that has stepped back to idle priority has no way forward,
+// and one that waits for a server that is gone does not come back at all. The idle comparison
+// stands still between two pieces while there is an urgent one, and goes on where it was. An urgent
+// request for the very share that is compared at idle takes its place, since it looks at everything
+// again.
 #include "notify/healer.h"
 
 #include <sys/eventfd.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <chrono>
 #include <condition_variable>
@@ -45,12 +47,14 @@ constexpr milliseconds IDLE_BACK_OFF(5000);  // after each piece, at most
 constexpr milliseconds NOW_BACK_OFF(100);    // the same
 constexpr milliseconds PRESSURE_LOOK(500);
 
+constexpr size_t URGENCIES = 3;
+
 struct Asked {
   std::string share;
   Urgency urgency = Urgency::NOW;
 };
 
-// What runs on one of the two threads.
+// What runs on one of the threads.
 struct Running {
   std::string share;     // empty: nothing
   bool dropped = false;  // its outcome is not wanted any more
@@ -64,10 +68,14 @@ bool IsPaused(StateStore& store) {
 // The healer's and its threads'. The descriptor and `pressure_folder` never change; the mutex
 // guards the rest.
 struct Shared {
-  Running& Of(Urgency urgency) { return urgency == Urgency::NOW ? now : idle; }
+  Running& Of(Urgency urgency) { return running[static_cast<size_t>(urgency)]; }
+  bool IsRunning(const std::string& share) const {
+    return std::any_of(running.begin(), running.end(),
+                       [&](const Running& one) { return one.share == share; });
+  }
   bool IsOver(Urgency urgency) { return stopping || Of(urgency).dropped; }
-  bool IsUrgentAsked() const {
-    return !now.share.empty() ||
+  bool IsUrgentAsked() {
+    return !Of(Urgency::NOW).share.empty() ||
            std::any_of(waiting.begin(), waiting.end(),
                        [](const Asked& asked) { return asked.urgency == Urgency::NOW; });
   }
@@ -82,9 +90,8 @@ struct Shared {
   std::mutex mutex;
   std::condition_variable changed;
   bool stopping = false;
-  std::vector<Asked> waiting;  // each share at most once
-  Running now;
-  Running idle;
+  std::vector<Asked> waiting;              // each share at most once
+  std::array<Running, URGENCIES> running;  // by Urgency
   std::vector<Healing> ended;
   std::string pressure_folder;
   ScopedFd ready;  // an event counter; not 0 while there is something in `ended`
@@ -94,9 +101,8 @@ std::vector<Asked>::iterator Shared::Next(Urgency urgency) {
   if (urgency == Urgency::IDLE && IsUrgentAsked()) {
     return waiting.end();
   }
-  const Running& other = Of(urgency == Urgency::NOW ? Urgency::IDLE : Urgency::NOW);
   return std::find_if(waiting.begin(), waiting.end(), [&](const Asked& asked) {
-    return asked.urgency == urgency && asked.share != other.share;
+    return asked.urgency == urgency && !IsRunning(asked.share);
   });
 }
 
@@ -111,10 +117,9 @@ void Shared::Loop(Urgency urgency) {
       return;
     }
     const auto next = Next(urgency);
-    Running& running = Of(urgency);
-    running = {std::move(next->share), false};
+    const std::string share = next->share;
+    Of(urgency) = {share, false};
     waiting.erase(next);
-    const std::string share = running.share;
 
     lock.unlock();
     Healing healing = Compare(urgency, share);
@@ -123,7 +128,7 @@ void Shared::Loop(Urgency urgency) {
       ended.push_back(std::move(healing));
       (void)eventfd_write(ready.fd, 1);  // fails only beyond 2^64 - 2
     }
-    running = {};
+    Of(urgency) = {};
     changed.notify_all();
   }
 }
@@ -165,7 +170,7 @@ bool Shared::AwaitTurn(Urgency urgency, StateStore& store) {
     lock.lock();
     if (paused) {
       changed.wait_for(lock, PAUSE_LOOK, [&] { return IsOver(urgency); });
-    } else if (urgency == Urgency::NOW || !IsUrgentAsked()) {
+    } else if (urgency != Urgency::IDLE || !IsUrgentAsked()) {
       return !IsOver(urgency);
     }
   }
@@ -193,8 +198,7 @@ void Shared::BackOff(Urgency urgency, Clock::duration worked) {
 
 struct Healer::Impl {
   std::shared_ptr<Shared> shared = std::make_shared<Shared>();
-  LooseThread now;
-  LooseThread idle;
+  std::array<LooseThread, URGENCIES> threads;  // by Urgency
 };
 
 Healer::Healer(std::string pressure_folder) : impl(std::make_unique<Impl>()) {
@@ -211,8 +215,12 @@ bool Healer::Start() {
   if (shared->ready.fd < 0) {
     return false;
   }
-  if (impl->now.Start([shared] { shared->Loop(Urgency::NOW); }) &&
-      impl->idle.Start([shared] { shared->Loop(Urgency::IDLE); })) {
+  bool started = true;
+  for (const Urgency urgency : {Urgency::NOW, Urgency::IDLE, Urgency::APART}) {
+    started = started && impl->threads[static_cast<size_t>(urgency)].Start(
+                             [shared, urgency] { shared->Loop(urgency); });
+  }
+  if (started) {
     return true;
   }
 
@@ -229,8 +237,8 @@ void Healer::Stop() {
     impl->shared->stopping = true;
   }
   impl->shared->changed.notify_all();
-  for (LooseThread* thread : {&impl->now, &impl->idle}) {
-    thread->End(std::chrono::duration_cast<milliseconds>(deadline - Clock::now()));
+  for (LooseThread& thread : impl->threads) {
+    thread.End(std::chrono::duration_cast<milliseconds>(deadline - Clock::now()));
   }
 }
 
@@ -242,12 +250,11 @@ void Healer::Request(const std::string& share, Urgency urgency) {
                                     [&](const Asked& known) { return known.share == share; });
     if (asked == shared.waiting.end()) {
       shared.waiting.push_back({share, urgency});
-    } else if (urgency == Urgency::NOW) {
+    } else if (urgency != Urgency::IDLE) {
       asked->urgency = urgency;
     }
-    if (urgency == Urgency::NOW && shared.idle.share == share) {
-      shared.idle.dropped = true;
-    }
+    Running& idle = shared.Of(Urgency::IDLE);
+    idle.dropped = idle.dropped || (urgency != Urgency::IDLE && idle.share == share);
   }
   shared.changed.notify_all();
 }
@@ -258,8 +265,8 @@ void Healer::Forget(const std::string& share) {
     const std::lock_guard guard(shared.mutex);
     std::erase_if(shared.waiting, [&](const Asked& asked) { return asked.share == share; });
     std::erase_if(shared.ended, [&](const Healing& healing) { return healing.share == share; });
-    for (Running* running : {&shared.now, &shared.idle}) {
-      running->dropped = running->dropped || running->share == share;
+    for (Running& running : shared.running) {
+      running.dropped = running.dropped || running.share == share;
     }
     if (shared.ended.empty()) {
       eventfd_t count = 0;
@@ -272,10 +279,9 @@ void Healer::Forget(const std::string& share) {
 bool Healer::IsPending(const std::string& share) const {
   Shared& shared = *impl->shared;
   const std::lock_guard guard(shared.mutex);
-  const auto runs = [&](const Running& running) {
-    return running.share == share && !running.dropped;
-  };
-  return runs(shared.now) || runs(shared.idle) ||
+  return std::any_of(
+             shared.running.begin(), shared.running.end(),
+             [&](const Running& running) { return running.share == share && !running.dropped; }) ||
          std::any_of(shared.waiting.begin(), shared.waiting.end(),
                      [&](const Asked& asked) { return asked.share == share; }) ||
          std::any_of(shared.ended.begin(), shared.ended.end(),

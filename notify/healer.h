@@ -15,8 +15,9 @@
 namespace fileindexd {
 
 enum class Urgency {
-  NOW,   // the index may differ
-  IDLE,  // it should not: at idle priority, and only while nothing urgent waits
+  NOW,    // the index may differ
+  IDLE,   // it should not: at idle priority, and only while nothing urgent waits
+  APART,  // as NOW, of a file system that may hang: it keeps none of the others waiting
 };
 
 // What came of one comparison.

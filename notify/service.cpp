@@ -149,7 +149,7 @@ void Service::WantComparison(const std::string& name, const char* reason) {
   LogDebug("share %s is to be compared: %s", name.c_str(), reason);
   FedShare& share = *shares.at(name);
   share.differs = true;
-  share.urgency = Urgency::NOW;
+  share.urgency = watches.shares.at(name).can_hang ? Urgency::APART : Urgency::NOW;
   // Losses that go on must not have whole comparisons back to back.
   share.compare_at = std::max(Clock::now(), share.rest_until);
   share.retry = FIRST_RETRY;
@@ -188,7 +188,9 @@ void Service::TakeHealings() {
       const bool is_watched = watches.shares.at(name).by != WatchedBy::COMPARISON;
       if (is_last) {
         share.differs = false;
-        share.urgency = is_watched ? Urgency::IDLE : Urgency::NOW;
+        if (is_watched) {
+          share.urgency = Urgency::IDLE;
+        }
         share.compare_at = Clock::now() + (is_watched ? options.daily : options.interval);
       }
       if (!is_watched) {
@@ -376,15 +378,15 @@ void Service::WriteOut() {
   }
   for (auto& [name, share] : shares) {
     if (IsThere(name) && Clock::now() < deadline) {
-      share->feed.Work(*settings, Clock::now(), true);
+      share->feed.Work(*settings, Clock::now(), true, deadline);
     }
     // A lock that somebody holds cannot be awaited by an event; the feed says when to try again.
-    while (!share->feed.IsWrittenOut() && share->feed.NextDue().has_value() &&
-           *share->feed.NextDue() < deadline) {
+    while (Clock::now() < deadline && !share->feed.IsWrittenOut() &&
+           share->feed.NextDue().has_value() && *share->feed.NextDue() < deadline) {
       const auto nap =
           std::chrono::ceil<std::chrono::milliseconds>(*share->feed.NextDue() - Clock::now());
       (void)poll(nullptr, 0, static_cast<int>(std::max<int64_t>(nap.count(), 1)));
-      share->feed.Work(*settings, Clock::now(), true);
+      share->feed.Work(*settings, Clock::now(), true, deadline);
     }
     if (!share->feed.IsWrittenOut()) {
       LogInfo("share %s: %zu changes are left to the comparison at the next start", name.c_str(),

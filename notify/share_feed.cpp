@@ -208,9 +208,10 @@ void ShareFeed::AddLines(const Settings& settings, const std::vector<QueueLine>&
   impl->CheckBounds();
 }
 
-void ShareFeed::Work(const Settings& settings, Clock::time_point now, bool everything) {
+void ShareFeed::Work(const Settings& settings, Clock::time_point now, bool everything,
+                     Clock::time_point deadline) {
   std::vector<QueueLine> lines;
-  impl->gatherer.TakeDue(settings, now, everything, lines);
+  impl->gatherer.TakeDue(settings, now, everything, lines, deadline);
   const size_t expected = impl->backlog->Size() + lines.size();
   impl->Queue(lines);
   impl->FoldCrowds(settings);

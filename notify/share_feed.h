@@ -47,8 +47,9 @@ class ShareFeed {
   void AddLines(const Settings& settings, const std::vector<QueueLine>& lines);
 
   // Looks at what is due, and writes as many lines as the queue takes. With `everything`, all that
-  // is gathered is due.
-  void Work(const Settings& settings, Clock::time_point now, bool everything = false);
+  // is gathered is due; what is not looked at by the deadline stays.
+  void Work(const Settings& settings, Clock::time_point now, bool everything = false,
+            Clock::time_point deadline = Clock::time_point::max());
 
   // Files that were changed, and may have other names, since this was asked last.
   std::vector<ChangedFile> TakeChanged();

@@ -201,6 +201,7 @@ void Watches::FollowShare(const Share& share, News& news) {
     return;
   }
 
+  watch.can_hang = IsChangedElsewhere(mount->type);
   std::vector<std::string> points = mounts.PointsBelow(place.real);
   std::erase(points, place.real);
   const bool same_place = watch.by != WatchedBy::NOBODY && watch.place == place;

@@ -44,6 +44,7 @@ struct ShareWatch {
   WatchedBy by = WatchedBy::NOBODY;
   std::string problem;  // why it is not watched, or not better; empty: none
   SharePlace place;
+  bool can_hang = false;                           // with another machine, or a program
   bool moved = false;                              // something happened at or above the root
   std::chrono::steady_clock::time_point next_try;  // to watch it better
   std::vector<std::string> points;                 // what is mounted inside the share

@@ -340,6 +340,22 @@ TEST_F(GathererTest, AnyBytesAndLongPathsAreTaken) {
   EXPECT_EQ(lines[1].event, CUSTOM_EVENT_REINDEX);
 }
 
+TEST_F(GathererTest, WhatIsNotLookedAtByTheDeadlineStays) {
+  Make("a");
+  Make("b");
+  Add(File(WRITTEN, "a"));
+  Add(File(WRITTEN, "b"));
+  const size_t bytes = gatherer.Bytes();
+
+  std::vector<QueueLine> lines;
+  gatherer.TakeDue(settings, now, true, lines, std::chrono::steady_clock::now());
+  EXPECT_TRUE(lines.empty());
+  EXPECT_EQ(gatherer.Size(), 2U);
+  EXPECT_EQ(gatherer.Bytes(), bytes);
+  EXPECT_EQ(All(), (Texts{"WRITE a", "WRITE b"}));
+  EXPECT_EQ(gatherer.Bytes(), 0U);
+}
+
 TEST_F(GathererTest, BytesCountWhatIsHeld) {
   Add(Rename("a", "b"));
   Add(Rename("b", "c"));

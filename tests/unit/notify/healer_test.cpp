@@ -1,12 +1,17 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "notify/healer.h"
 
+#include <fcntl.h>
 #include <poll.h>
+#include <sys/mount.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <cstring>
 #include <filesystem>
 
 #include "base/event_codes.h"
+#include "base/scoped_fd.h"
 #include "notify/share_comparison.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
@@ -127,7 +132,7 @@ TEST_F(HealerTest, ComparisonsOfEveryUrgencyReadTheWholeShare) {
   MakeManyFiles();
   WriteFile(At("zzz"), "");
   Start();
-  for (const Urgency urgency : {Urgency::NOW, Urgency::IDLE}) {
+  for (const Urgency urgency : {Urgency::NOW, Urgency::IDLE, Urgency::APART}) {
     healer.Request("s", urgency);
     const Healing healing = std::move(Await(1)[0]);
     EXPECT_TRUE(healing.done) << healing.error;
@@ -316,6 +321,34 @@ TEST_F(HealerTest, StopEndsWhatWaitsAndWhatRuns) {
 
   EXPECT_FALSE(IsReadable(0));
   EXPECT_TRUE(healer.Take().empty());
+}
+
+// A FUSE file system of which nobody answers.
+TEST_F(HealerTest, OneThatHangsKeepsNobodyElseWaiting) {
+  WriteFile(At("a"), "");
+  AddAll();
+  AddShareWithoutIndex();
+  ScopedFd nobody(open("/dev/fuse", O_RDWR | O_CLOEXEC));
+  ASSERT_GE(nobody.fd, 0) << strerror(errno);
+  const std::string options =
+      "fd=" + std::to_string(nobody.fd) + ",rootmode=40000,user_id=0,group_id=0";
+  ASSERT_EQ(mount("nobody", root.c_str(), "fuse", 0, options.c_str()), 0) << strerror(errno);
+  Start();
+
+  healer.Request("s", Urgency::APART);
+  healer.Request("other", Urgency::NOW);
+  EXPECT_EQ(Await(1)[0].share, "other");
+  healer.Request("other", Urgency::IDLE);
+  EXPECT_EQ(Await(1)[0].share, "other");
+  EXPECT_TRUE(healer.IsPending("s"));
+
+  ScopedFd none;
+  nobody.Swap(none);
+  none.Close();  // what hangs fails
+  const Healing healing = std::move(Await(1)[0]);
+  EXPECT_EQ(healing.share, "s");
+  EXPECT_FALSE(healing.done);
+  EXPECT_EQ(umount2(root.c_str(), MNT_DETACH), 0);
 }
 
 }  // namespace fileindexd
