@@ -5,10 +5,17 @@ pkg_check_modules(EXTRACT_DOCUMENTS REQUIRED IMPORTED_TARGET
 
 add_library(extract_documents STATIC
   archive.cpp
+  iso_date.cpp
   memory_file.cpp
   nested.cpp
+  odf_words.cpp
+  office_words.cpp
+  office_zip.cpp
   pdf.cpp
   unpacker.cpp
-  utf16.cpp)
-target_link_libraries(extract_documents PUBLIC extract_sink PRIVATE project_flags PkgConfig::EXTRACT_DOCUMENTS)
-check_headers(extract_documents memory_file.h nested.h unpacker.h utf16.h)
+  utf16.cpp
+  xml_part.cpp)
+target_link_libraries(extract_documents
+  PUBLIC extract_sink PkgConfig::EXTRACT_DOCUMENTS PRIVATE project_flags)
+check_headers(extract_documents 
+  iso_date.h memory_file.h nested.h office_words.h unpacker.h utf16.h xml_part.h)

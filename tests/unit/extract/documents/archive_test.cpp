@@ -134,12 +134,12 @@ TEST(ArchiveTest, OnlySoManyMembersAreRead) {
   EXPECT_THAT(reading.Text(ContentField::MEMBERS), testing::EndsWith("\n1000"));
 }
 
-// 160 MiB of blanks in each of eight members, which fill no text.
+// Blanks fill no text: 600 MiB of them in archives in one of a few KiB.
 TEST(ArchiveTest, ABombIsUnpackedUpToABound) {
-  const std::string blanks(160 << 20, ' ');
+  const std::string blanks(50 << 20, ' ');
   std::string inner = Zipped({{"blank.txt", blanks}, {"blank2.txt", blanks}});
   std::vector<Member> members;
-  for (int i = 0; i < 8; ++i) {
+  for (int i = 0; i < 6; ++i) {
     members.push_back({std::to_string(i) + ".zip", inner});
   }
   members.push_back({"last.txt", "out of reach"});
