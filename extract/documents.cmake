@@ -5,6 +5,7 @@ pkg_check_modules(EXTRACT_DOCUMENTS REQUIRED IMPORTED_TARGET
 
 add_library(extract_documents STATIC
   archive.cpp
+  epub.cpp
   iso_date.cpp
   memory_file.cpp
   nested.cpp
