@@ -9,14 +9,19 @@ add_library(extract_documents STATIC
   iso_date.cpp
   memory_file.cpp
   nested.cpp
+  old_office.cpp
+  ole_file.cpp
   odf_words.cpp
   office_words.cpp
   office_zip.cpp
   pdf.cpp
+  slides_text.cpp
   unpacker.cpp
+  word_text.cpp
+  workbook_text.cpp
   utf16.cpp
   xml_part.cpp)
 target_link_libraries(extract_documents
   PUBLIC extract_sink PkgConfig::EXTRACT_DOCUMENTS PRIVATE project_flags)
 check_headers(extract_documents 
-  iso_date.h memory_file.h nested.h office_words.h unpacker.h utf16.h xml_part.h)
+  iso_date.h memory_file.h nested.h little_endian.h office_words.h old_office.h ole_file.h unpacker.h utf16.h xml_part.h)

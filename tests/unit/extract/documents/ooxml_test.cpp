@@ -90,13 +90,13 @@ TEST(OoxmlTest, CellsOfATableAreWordsOfTheirOwn) {
 }
 
 TEST(OoxmlTest, DeletedTextFieldCodesAndSecondFormsAreLeftOut) {
-  const Reading reading =
-      ReadBytes(ReadOfficeZip, "a.docx",
-                Docx("<w:p><w:del><w:r><w:delText>gone</w:delText></w:r>" + Piece("too") +
-                     "</w:del>" + "<w:moveFrom>" + Piece("moved") + "</w:moveFrom>" +
-                     "<w:r><w:instrText>HYPERLINK x</w:instrText></w:r>" + Piece("kept") +
-                     "<mc:AlternateContent><mc:Choice>" + Piece("box") + "</mc:Choice><mc:Fallback>" +
-                     Piece("box") + "</mc:Fallback></mc:AlternateContent></w:p>"));
+  const Reading reading = ReadBytes(
+      ReadOfficeZip, "a.docx",
+      Docx("<w:p><w:del><w:r><w:delText>gone</w:delText></w:r>" + Piece("too") + "</w:del>" +
+           "<w:moveFrom>" + Piece("moved") + "</w:moveFrom>" +
+           "<w:r><w:instrText>HYPERLINK x</w:instrText></w:r>" + Piece("kept") +
+           "<mc:AlternateContent><mc:Choice>" + Piece("box") + "</mc:Choice><mc:Fallback>" +
+           Piece("box") + "</mc:Fallback></mc:AlternateContent></w:p>"));
 
   EXPECT_EQ(reading.content.text, "keptbox footnote");
 }

@@ -37,11 +37,6 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
   return reader(document, sink, why);
 }
 
-bool ReadOldOffice(const Document&, ContentSink&, std::string& why) {
-  why = "encrypted";
-  return false;
-}
-
 bool ReadRtf(const Document&, ContentSink& sink, std::string&) {
   sink.converter = "unrtf";
   return true;
