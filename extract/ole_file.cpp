@@ -7,24 +7,16 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <memory>
+
+#include "extract/gobject.h"
 
 namespace fileindexd {
 
 namespace {
 
-struct Unref {
-  void operator()(void* object) const { g_object_unref(object); }
-};
-template <typename Type>
-using Owned = std::unique_ptr<Type, Unref>;
-
 void StartLibrary() {
   static const bool is_started = [] {
-    // Damaged files make the libraries below print their findings.
-    g_set_print_handler([](const gchar*) {});
-    g_set_printerr_handler([](const gchar*) {});
-    g_log_set_default_handler([](const gchar*, GLogLevelFlags, const gchar*, gpointer) {}, nullptr);
+    SilenceGlib();
     gsf_init();
     return true;
   }();
@@ -83,7 +75,7 @@ bool OleFile::Open(const Document& document, std::string& why) {
     return false;
   }
   rewind(stream);
-  const Owned<GsfInput> input(gsf_input_stdio_new_FILE("document", stream, FALSE));
+  const GOwned<GsfInput> input(gsf_input_stdio_new_FILE("document", stream, FALSE));
   if (!input) {
     (void)fclose(stream);
     why = "cannot be read";
@@ -100,13 +92,13 @@ bool OleFile::Open(const Document& document, std::string& why) {
 }
 
 bool OleFile::Has(const char* stream) const {
-  const Owned<GsfInput> child(gsf_infile_child_by_name(infile, stream));
+  const GOwned<GsfInput> child(gsf_infile_child_by_name(infile, stream));
   return child != nullptr;
 }
 
 std::string OleFile::Stream(const char* stream) const {
   std::string bytes;
-  const Owned<GsfInput> child(gsf_infile_child_by_name(infile, stream));
+  const GOwned<GsfInput> child(gsf_infile_child_by_name(infile, stream));
   if (!child) {
     return bytes;
   }
@@ -125,8 +117,8 @@ std::string OleFile::Stream(const char* stream) const {
 }
 
 void OleFile::SetSummary(ContentSink& sink) const {
-  const Owned<GsfInput> stream(gsf_infile_child_by_name(infile, "\005SummaryInformation"));
-  const Owned<GsfDocMetaData> summary(gsf_doc_meta_data_new());
+  const GOwned<GsfInput> stream(gsf_infile_child_by_name(infile, "\005SummaryInformation"));
+  const GOwned<GsfDocMetaData> summary(gsf_doc_meta_data_new());
   if (!stream || gsf_input_size(stream.get()) > static_cast<gsf_off_t>(1 << 20)) {
     return;
   }
