@@ -201,7 +201,8 @@ std::optional<Answer> DecodeAnswer(std::string_view frame, size_t text_cap, std:
     fault = why;
     return std::nullopt;
   };
-  if (frame.size() > MaxFrame(text_cap) || FrameSize(frame) != frame.size()) {
+  if (frame.size() < LENGTH_SIZE || frame.size() > MaxFrame(text_cap) ||
+      FrameSize(frame) != frame.size()) {
     return refuse("a frame of the wrong length");
   }
 
