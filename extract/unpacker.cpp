@@ -55,14 +55,17 @@ bool Unpacker::UseFormats(Formats formats) {
     return archive_read_support_format_zip(packed) == ARCHIVE_OK;
   }
   // One by one: "all" of the library's filters includes those that start a program.
-  for (const auto support : {archive_read_support_filter_gzip, archive_read_support_filter_bzip2,
-                             archive_read_support_filter_compress, archive_read_support_filter_lzma,
-                             archive_read_support_filter_xz, archive_read_support_filter_lzip,
-                             archive_read_support_filter_zstd, archive_read_support_filter_lz4,
-                             archive_read_support_format_zip, archive_read_support_format_tar,
-                             archive_read_support_format_7zip, archive_read_support_format_rar,
-                             archive_read_support_format_rar5, archive_read_support_format_iso9660,
-                             archive_read_support_format_raw}) {
+  for (const auto support :
+       {archive_read_support_filter_gzip,     archive_read_support_filter_bzip2,
+        archive_read_support_filter_compress, archive_read_support_filter_lzma,
+        archive_read_support_filter_xz,       archive_read_support_filter_lzip,
+        archive_read_support_filter_zstd,     archive_read_support_filter_lz4,
+        archive_read_support_filter_rpm,      archive_read_support_format_zip,
+        archive_read_support_format_tar,      archive_read_support_format_7zip,
+        archive_read_support_format_rar,      archive_read_support_format_rar5,
+        archive_read_support_format_iso9660,  archive_read_support_format_ar,
+        archive_read_support_format_cab,      archive_read_support_format_cpio,
+        archive_read_support_format_lha,      archive_read_support_format_raw}) {
     if (support(packed) != ARCHIVE_OK) {
       return false;
     }

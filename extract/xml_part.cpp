@@ -25,7 +25,8 @@ XmlPart::XmlPart(Source bytes_source) : source(std::move(bytes_source)) {
                               XML_PARSE_NOWARNING | XML_PARSE_COMPACT);
   if (reader != nullptr) {
     // Some errors are printed in spite of the options.
-    xmlTextReaderSetStructuredErrorHandler(reader, [](void*, xmlErrorPtr) {}, nullptr);
+    xmlTextReaderSetStructuredErrorHandler(
+        reader, [](void*, xmlErrorPtr) {}, nullptr);
   }
 }
 
