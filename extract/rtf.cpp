@@ -32,7 +32,7 @@ struct Group {
 
 // Words that begin what is no text, or a field.
 const std::map<std::string_view, Place>& Places() {
-  static const std::map<std::string_view, Place> PLACES{
+  static const std::map<std::string_view, Place> places{
       {"title", Place::TITLE},        {"author", Place::AUTHOR},
       {"subject", Place::SUBJECT},    {"keywords", Place::KEYWORDS},
       {"doccomm", Place::COMMENT},    {"creatim", Place::CREATED},
@@ -46,32 +46,32 @@ const std::map<std::string_view, Place>& Places() {
       {"bkmkend", Place::NOWHERE},    {"latentstyles", Place::NOWHERE},
       {"nonshppict", Place::NOWHERE}, {"generator", Place::NOWHERE},
   };
-  return PLACES;
+  return places;
 }
 
 int CodePageOfCharset(int charset) {
-  static const std::map<int, int> PAGES{
+  static const std::map<int, int> known{
       {128, 932},  {129, 949},  {134, 936},  {136, 950},  {161, 1253}, {162, 1254}, {163, 1258},
       {177, 1255}, {178, 1256}, {186, 1257}, {204, 1251}, {222, 874},  {238, 1250}};
-  const auto page = PAGES.find(charset);
-  return page != PAGES.end() ? page->second : 0;
+  const auto page = known.find(charset);
+  return page != known.end() ? page->second : 0;
 }
 
 // Text that words stand for.
 const char* TextOfWord(std::string_view word) {
-  static const std::map<std::string_view, const char*> TEXTS{
+  static const std::map<std::string_view, const char*> texts{
       {"par", "\n"},           {"line", "\n"},       {"tab", " "},         {"cell", "\n"},
       {"row", "\n"},           {"sect", "\n"},       {"page", "\n"},       {"emdash", "\u2014"},
       {"endash", "\u2013"},    {"lquote", "\u2018"}, {"rquote", "\u2019"}, {"ldblquote", "\u201c"},
       {"rdblquote", "\u201d"}, {"bullet", "\u2022"}, {"emspace", " "},     {"enspace", " "}};
-  const auto text = TEXTS.find(word);
-  return text != TEXTS.end() ? text->second : nullptr;
+  const auto text = texts.find(word);
+  return text != texts.end() ? text->second : nullptr;
 }
 
 std::string FromCodePage(int code_page, std::string_view bytes) {
   const std::string charset = "CP" + std::to_string(code_page);
   const iconv_t converter = iconv_open("UTF-8", charset.c_str());
-  if (converter == reinterpret_cast<iconv_t>(-1)) {
+  if (converter == reinterpret_cast<iconv_t>(-1)) {  // NOLINT: iconv_open's way to fail
     return code_page == 1252 ? std::string(bytes.size(), ' ') : FromCodePage(1252, bytes);
   }
   std::string text;
