@@ -1,0 +1,107 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <algorithm>
+#include <array>
+#include <string>
+#include <string_view>
+
+#include "extract/format.h"
+#include "extract/memory_file.h"
+#include "extract/nested.h"
+#include "extract/unpacker.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int MAX_NAMES = 10'000;
+
+std::string_view LastComponent(std::string_view path) {
+  while (path.ends_with('/')) {
+    path.remove_suffix(1);
+  }
+  return path.substr(path.rfind('/') + 1);  // npos + 1 is 0
+}
+
+bool EndsWith(std::string_view name, std::string_view ending) {
+  return name.size() > ending.size() &&
+         std::equal(ending.begin(), ending.end(), name.end() - static_cast<long>(ending.size()),
+                    [](char a, char b) { return a == (b >= 'A' && b <= 'Z' ? b + 32 : b); });
+}
+
+// Members without words are not worth the unpacking: only text is wanted of them.
+bool IsWordless(std::string_view name) {
+  constexpr std::array ENDINGS{".jpg", ".jpeg", ".png", ".gif",  ".webp", ".heic",  ".tif", ".tiff",
+                               ".bmp", ".ico",  ".mp3", ".flac", ".ogg",  ".opus",  ".m4a", ".wav",
+                               ".mp4", ".mkv",  ".avi", ".mov",  ".webm", ".exe",   ".dll", ".so",
+                               ".o",   ".a",    ".ttf", ".otf",  ".woff", ".class", ".pyc"};
+  return std::any_of(ENDINGS.begin(), ENDINGS.end(),
+                     [name](const char* ending) { return EndsWith(name, ending); });
+}
+
+// "paper.pdf.gz" holds "paper.pdf".
+std::string BareName(const std::string& name) {
+  const size_t dot = name.rfind('.');
+  return dot == std::string::npos || dot == 0 ? name : name.substr(0, dot);
+}
+
+void ReadMember(Unpacker& archive, const Document& document, ContentSink& sink) {
+  MemoryFile member;
+  (void)archive.ReadAll(Allowance::MAX_MEMBER_BYTES, member);  // of a long one, the beginning
+  if (member.size > 0) {
+    const std::string name(LastComponent(archive.name));
+    ReadNestedText(ReadDocument, member.AsDocument(name, document.depth + 1), sink);
+  }
+}
+
+// One compressed file is what it holds, fields and all.
+bool ReadBare(Unpacker& archive, const Document& document, ContentSink& sink, std::string& why) {
+  MemoryFile member;
+  const bool is_whole = archive.ReadAll(Allowance::MAX_MEMBER_BYTES, member);
+  if (!is_whole && member.size == 0) {
+    why = "damaged";
+    return false;
+  }
+  const bool is_good =
+      ReadDocument(member.AsDocument(BareName(document.name), document.depth + 1), sink, why);
+  sink.converter.clear();  // it would be given the compressed bytes
+  return is_good;
+}
+
+}  // namespace
+
+bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) {
+  sink.SetKind(Kind::DOCUMENT);
+  if (document.depth >= Allowance::MAX_DEPTH) {
+    return true;  // an archive so deep inside others counts as a member without text
+  }
+  Allowance allowance;
+  Unpacker archive;
+  if (!archive.Open(document, Unpacker::Formats::ALL, why)) {
+    return false;
+  }
+
+  int names = 0;
+  int read = 0;
+  bool is_encrypted = false;
+  while (names < MAX_NAMES && archive.Next()) {
+    if (archive.is_bare) {
+      return ReadBare(archive, document, sink, why);
+    }
+    ++names;
+    sink.Set(ContentField::MEMBERS, archive.name);
+    is_encrypted = is_encrypted || archive.is_encrypted;
+    if (archive.is_file && !archive.is_encrypted && !sink.IsFull() && !IsWordless(archive.name) &&
+        allowance.TakeMember()) {
+      ++read;
+      ReadMember(archive, document, sink);
+    }
+  }
+  if (is_encrypted && read == 0) {
+    why = "encrypted";
+  } else if (archive.is_damaged) {
+    why = names == 0 ? "not an archive" : "damaged";
+  }
+  return why.empty();
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,192 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/mail_parts.h"
+
+#include <array>
+#include <string>
+
+#include "extract/gobject.h"
+#include "extract/memory_file.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int MAX_LEVELS = 50;  // of parts within parts
+constexpr int MAX_PARTS = 10'000;
+
+bool IsType(GMimeObject* object, const char* type, const char* subtype) {
+  GMimeContentType* content_type = g_mime_object_get_content_type(object);
+  return content_type != nullptr && g_mime_content_type_is_type(content_type, type, subtype) != 0;
+}
+
+std::string CharsetOf(GMimePart* part) {
+  const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
+  return charset != nullptr ? charset : "";
+}
+
+// What is said of text without a charset, or of text that nobody looked at, need not be true.
+bool IsTelling(const std::string& charset) {
+  return !charset.empty() && g_ascii_strcasecmp(charset.c_str(), "us-ascii") != 0 &&
+         g_ascii_strcasecmp(charset.c_str(), "unknown-8bit") != 0;
+}
+
+// Appends a part's decoded bytes, from `charset` (empty: as they are) to UTF-8, up to the bound of
+// a member. Nothing where the charset is not known.
+bool Decode(GMimePart* part, const std::string& charset, Allowance& allowance, MemoryFile& file) {
+  GMimeDataWrapper* content = g_mime_part_get_content(part);
+  GMimeStream* packed = content != nullptr ? g_mime_data_wrapper_get_stream(content) : nullptr;
+  if (packed == nullptr) {
+    return false;
+  }
+  (void)g_mime_stream_reset(packed);  // fails on no stream that can be read at all
+  const GOwned<GMimeStream> stream(g_mime_stream_filter_new(packed));
+  const GOwned<GMimeFilter> decoder(
+      g_mime_filter_basic_new(g_mime_data_wrapper_get_encoding(content), FALSE));
+  g_mime_stream_filter_add(GMIME_STREAM_FILTER(stream.get()), decoder.get());
+  if (!charset.empty()) {
+    const GOwned<GMimeFilter> converter(g_mime_filter_charset_new(charset.c_str(), "utf-8"));
+    if (!converter) {
+      return false;
+    }
+    g_mime_stream_filter_add(GMIME_STREAM_FILTER(stream.get()), converter.get());
+  }
+
+  std::array<char, 64 * 1024> block;
+  while (file.size < Allowance::MAX_MEMBER_BYTES) {
+    const ssize_t got = g_mime_stream_read(stream.get(), block.data(), block.size());
+    if (got <= 0 || !allowance.TakeBytes(got) ||
+        !file.Append(std::string_view(block.data(), static_cast<size_t>(got)))) {
+      break;
+    }
+  }
+  return true;
+}
+
+bool IsMedia(GMimeObject* object) {
+  return IsType(object, "image", "*") || IsType(object, "audio", "*") ||
+         IsType(object, "video", "*");
+}
+
+}  // namespace
+
+std::string AddressesOf(InternetAddressList* list) {
+  char* made = list != nullptr ? internet_address_list_to_string(list, nullptr, FALSE) : nullptr;
+  std::string addresses = made != nullptr ? made : "";
+  g_free(made);
+  return addresses;
+}
+
+void AddHeaderText(GMimeMessage* message, ContentSink& sink) {
+  const auto add = [&sink](const std::string& text) {
+    sink.AddText("\n");
+    sink.AddText(text);
+  };
+  const char* subject = g_mime_message_get_subject(message);
+  add(AddressesOf(g_mime_message_get_from(message)));
+  add(AddressesOf(g_mime_message_get_to(message)));
+  add(AddressesOf(g_mime_message_get_cc(message)));
+  add(subject != nullptr ? subject : "");
+  sink.AddText("\n");
+}
+
+void MailParts::Take(GMimeMessage* message) {
+  GMimeObject* body = g_mime_message_get_mime_part(message);
+  if (body != nullptr) {
+    TakeObject(body, 0);
+  }
+}
+
+void MailParts::TakeObject(GMimeObject* object, int level) {
+  if (level > MAX_LEVELS || ++parts > MAX_PARTS || allowance.IsSpent()) {
+    return;
+  }
+  if (GMIME_IS_MULTIPART_ENCRYPTED(object) || IsType(object, "application", "pkcs7-mime")) {
+    is_encrypted = true;
+  } else if (GMIME_IS_MULTIPART(object)) {
+    TakeMultipart(GMIME_MULTIPART(object), level);
+  } else if (GMIME_IS_MESSAGE_PART(object)) {
+    GMimeMessage* message = g_mime_message_part_get_message(GMIME_MESSAGE_PART(object));
+    if (message != nullptr) {
+      TakeInnerMessage(message, level);
+    }
+  } else if (GMIME_IS_PART(object)) {
+    TakePart(GMIME_PART(object));
+  }
+}
+
+// Of alternatives the plain text is enough; where it is empty the others are read.
+void MailParts::TakeMultipart(GMimeMultipart* multipart, int level) {
+  const int count = g_mime_multipart_get_count(multipart);
+  const size_t before = sink.content.text.size();
+  if (IsType(GMIME_OBJECT(multipart), "multipart", "alternative")) {
+    for (int i = 0; i < count; ++i) {
+      GMimeObject* object = g_mime_multipart_get_part(multipart, i);
+      if (IsType(object, "text", "plain")) {
+        TakeObject(object, level + 1);
+        break;
+      }
+    }
+  }
+  if (sink.content.text.size() > before) {
+    return;
+  }
+  for (int i = 0; i < count; ++i) {
+    TakeObject(g_mime_multipart_get_part(multipart, i), level + 1);
+  }
+}
+
+void MailParts::TakeInnerMessage(GMimeMessage* message, int level) {
+  AddHeaderText(message, sink);
+  GMimeObject* body = g_mime_message_get_mime_part(message);
+  if (body != nullptr) {
+    TakeObject(body, level + 1);
+  }
+}
+
+void MailParts::TakePart(GMimePart* part) {
+  GMimeObject* object = GMIME_OBJECT(part);
+  const char* file_name = g_mime_part_get_filename(part);
+  const std::string name = file_name != nullptr ? file_name : "";
+  const char* disposition = g_mime_object_get_disposition(object);
+  const bool is_attached =
+      (disposition != nullptr && g_ascii_strcasecmp(disposition, "attachment") == 0) ||
+      !name.empty();
+  sink.Set(ContentField::ATTACHMENTS, name);
+  if (sink.IsFull() || IsMedia(object)) {
+    return;
+  }
+  if (IsType(object, "text", "*") && !is_attached) {
+    AddBody(part);
+  } else if (is_attached && document.depth < Allowance::MAX_DEPTH && allowance.TakeMember()) {
+    AddAttachment(part, name);
+  }
+}
+
+void MailParts::AddBody(GMimePart* part) {
+  constexpr std::string_view UTF8_MARK = "\xEF\xBB\xBF";  // stronger than what a page says itself
+  const std::string charset = CharsetOf(part);
+  const FormatReader reader =
+      IsType(GMIME_OBJECT(part), "text", "html") ? ReadHtml : FormatReader{ReadText};
+  MemoryFile text;
+  if (IsTelling(charset)) {
+    if (!text.Open() || !text.Append(UTF8_MARK)) {
+      return;
+    }
+    if (Decode(part, charset, allowance, text)) {
+      ReadNestedText(reader, text.AsDocument("", document.depth + 1), sink);
+      return;
+    }
+  }
+  if (text.Open() && Decode(part, "", allowance, text) && text.size > 0) {
+    ReadNestedText(reader, text.AsDocument("", document.depth + 1), sink);
+  }
+}
+
+void MailParts::AddAttachment(GMimePart* part, const std::string& name) {
+  MemoryFile file;
+  if (file.Open() && Decode(part, "", allowance, file) && file.size > 0) {
+    ReadNestedText(ReadDocument, file.AsDocument(name, document.depth + 1), sink);
+  }
+}
+
+}  // namespace fileindexd

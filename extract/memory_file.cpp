@@ -1,0 +1,96 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/memory_file.h"
+
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+
+namespace fileindexd {
+
+namespace {
+
+ssize_t ReadAt(int file, char* into, size_t count, off_t offset) {
+  ssize_t got = 0;
+  do {
+    got = pread(file, into, count, offset);
+  } while (got < 0 && errno == EINTR);
+  return got;
+}
+
+}  // namespace
+
+bool MemoryFile::Open() {
+  ScopedFd made(memfd_create("member", MFD_CLOEXEC));
+  file.Swap(made);
+  size = 0;
+  return file.fd >= 0;
+}
+
+bool MemoryFile::Append(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t written = pwrite(file.fd, bytes.data(), bytes.size(), size);
+    if (written < 0 && errno == EINTR) {
+      continue;
+    }
+    if (written <= 0) {
+      return false;
+    }
+    size += written;
+    bytes.remove_prefix(static_cast<size_t>(written));
+  }
+  return true;
+}
+
+Document MemoryFile::AsDocument(const std::string& name, int depth) const {
+  (void)lseek(file.fd, 0, SEEK_SET);  // cannot fail: a file in memory is seekable
+  return {file.fd, name, size, depth};
+}
+
+bool ReadWhole(const Document& document, int64_t limit, std::string& bytes, std::string& why) {
+  // The size on record only saves growing: the file may have changed since.
+  std::string read_bytes;
+  if (document.size > limit) {
+    why = "too big";
+    return false;
+  }
+  constexpr size_t STEP = 256 * 1024;
+  size_t length = 0;
+  read_bytes.resize(static_cast<size_t>(std::max<int64_t>(document.size, 0)) + 1);
+  for (;;) {
+    if (length == read_bytes.size()) {
+      read_bytes.resize(length + STEP);
+    }
+    const ssize_t got = ReadAt(document.file, read_bytes.data() + length,
+                               read_bytes.size() - length, static_cast<off_t>(length));
+    if (got < 0) {
+      why = "cannot be read";
+      return false;
+    }
+    if (got == 0) {
+      break;
+    }
+    length += static_cast<size_t>(got);
+    if (static_cast<int64_t>(length) > limit) {
+      why = "too big";
+      return false;
+    }
+  }
+  if (length == 0) {
+    why = "empty";
+    return false;
+  }
+  read_bytes.resize(length);
+  bytes.swap(read_bytes);
+  return true;
+}
+
+std::string FirstBytes(const Document& document, size_t count) {
+  std::string bytes(count, '\0');
+  const ssize_t got = ReadAt(document.file, bytes.data(), count, 0);
+  bytes.resize(got > 0 ? static_cast<size_t>(got) : 0);
+  return bytes;
+}
+
+}  // namespace fileindexd

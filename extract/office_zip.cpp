@@ -1,0 +1,147 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <unistd.h>
+
+#include <string>
+#include <string_view>
+
+#include "extract/format.h"
+#include "extract/memory_file.h"
+#include "extract/nested.h"
+#include "extract/office_words.h"
+#include "extract/unpacker.h"
+#include "extract/xml_part.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int MAX_PARTS = 100'000;
+
+using PartReader = void (*)(XmlPart& part, ContentSink& sink);
+
+struct PartRule {
+  std::string_view begin;  // of the part's name
+  PartReader read;
+};
+
+// Masters and layouts hold "click to edit", so slides alone are read of a presentation.
+constexpr PartRule RULES[] = {
+    {"word/document", AddOoxmlWords},
+    {"word/footnotes", AddOoxmlWords},
+    {"word/endnotes", AddOoxmlWords},
+    {"word/comments", AddOoxmlWords},
+    {"word/header", AddOoxmlWords},
+    {"word/footer", AddOoxmlWords},
+    {"word/diagrams/data", AddOoxmlWords},
+    {"ppt/slides/slide", AddOoxmlWords},
+    {"ppt/notesSlides/notesSlide", AddOoxmlWords},
+    {"ppt/comments/", AddOoxmlWords},
+    {"ppt/diagrams/data", AddOoxmlWords},
+    {"xl/sharedStrings", AddOoxmlWords},
+    {"xl/comments", AddOoxmlWords},
+    {"xl/drawings/drawing", AddOoxmlWords},
+    {"xl/worksheets/sheet", AddSheetWords},
+    {"xl/workbook.xml", AddSheetNames},
+    {"docProps/core", SetOoxmlFields},
+    {"docProps/app", SetOoxmlFields},
+    {"content.xml", ReadOdfPart},
+    {"meta.xml", ReadOdfMeta},
+    {"styles.xml", ReadOdfPart},
+};
+
+PartReader ReaderOf(std::string_view name) {
+  if (!name.ends_with(".xml")) {
+    return nullptr;
+  }
+  for (const PartRule& rule : RULES) {
+    if (name.starts_with(rule.begin)) {
+      return rule.read;
+    }
+  }
+  return nullptr;
+}
+
+class OfficeZip {
+ public:
+  OfficeZip(const Document& read_document, ContentSink& text_sink)
+      : document(read_document), sink(text_sink) {}
+
+  bool Read(std::string& why) {
+    Unpacker zip;
+    if (!zip.Open(document, Unpacker::Formats::ZIP, why)) {
+      return false;
+    }
+    for (int i = 0; i < MAX_PARTS && zip.Next(); ++i) {
+      ReadPart(zip);
+    }
+    if (is_encrypted) {
+      why = "encrypted";
+    } else if (parts == 0) {
+      why = zip.is_damaged ? "damaged" : "not an office document";
+    } else if (zip.is_damaged || is_damaged) {
+      why = "damaged";
+    }
+    return why.empty();
+  }
+
+ private:
+  void ReadPart(Unpacker& zip) {
+    const PartReader reader = ReaderOf(zip.name);
+    const bool is_manifest = zip.name == "META-INF/manifest.xml";
+    if (reader == nullptr && !is_manifest) {
+      return;
+    }
+    XmlPart part([&zip](char* into, size_t count) { return zip.Read(into, count); });
+    if (is_manifest) {
+      is_encrypted = IsOdfEncrypted(part) || is_encrypted;
+      return;
+    }
+    ++parts;
+    reader(part, sink);
+    sink.AddText("\n");
+    is_damaged = is_damaged || part.is_damaged;
+    is_encrypted = is_encrypted || zip.is_encrypted;
+  }
+
+  const Document& document;
+  ContentSink& sink;
+  int parts = 0;
+  bool is_damaged = false;
+  bool is_encrypted = false;
+};
+
+// The form in one XML file that is not packed.
+bool ReadFlat(const Document& document, ContentSink& sink, std::string& why) {
+  const Allowance allowance;
+  XmlPart part([&](char* into, size_t count) {
+    return allowance.IsSpent() ? -1 : read(document.file, into, count);
+  });
+  ReadOdfPart(part, sink);
+  if (part.is_damaged) {
+    why = "damaged";
+  }
+  return why.empty();
+}
+
+}  // namespace
+
+bool ReadOfficeZip(const Document& document, ContentSink& sink, std::string& why) {
+  sink.SetKind(Kind::DOCUMENT);
+  const std::string begin = FirstBytes(document, 8);
+  if (begin.starts_with("PK")) {
+    return OfficeZip(document, sink).Read(why);
+  }
+  if (begin.starts_with("\xD0\xCF\x11\xE0")) {
+    return ReadOldOffice(document, sink, why);  // a wrong ending, or an encrypted document's cover
+  }
+  if (begin.starts_with("{\\rtf")) {
+    return ReadRtf(document, sink, why);
+  }
+  if (begin.starts_with("<") || begin.starts_with("\xEF\xBB\xBF<")) {
+    return ReadFlat(document, sink, why);
+  }
+  why = "not an office document";
+  return false;
+}
+
+}  // namespace fileindexd

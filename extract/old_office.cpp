@@ -1,0 +1,87 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/old_office.h"
+
+#include <array>
+#include <string>
+
+#include "extract/memory_file.h"
+#include "extract/ole_file.h"
+
+namespace fileindexd {
+
+namespace {
+
+// A converter is given the document itself, which a member of an archive is not.
+bool LeaveTo(const char* converter, const Document& document, ContentSink& sink) {
+  if (document.depth == 0) {
+    sink.converter = converter;
+  }
+  return true;
+}
+
+bool ReadStreams(const OleFile& ole, const Document& document, ContentSink& sink,
+                 std::string& why) {
+  if (ole.Has("EncryptedPackage") || ole.Has("EncryptedSummary")) {
+    why = "encrypted";
+    return false;
+  }
+  ole.SetSummary(sink);
+  if (ole.Has("WordDocument")) {
+    return AddWordText(ole.Stream("WordDocument"), ole.Stream("0Table"), ole.Stream("1Table"), sink,
+                       why);
+  }
+  if (ole.Has("Workbook")) {
+    return AddWorkbookText(ole.Stream("Workbook"), sink, why);
+  }
+  if (ole.Has("Book")) {
+    return LeaveTo("xls2csv", document, sink);
+  }
+  if (ole.Has("PowerPoint Document")) {
+    return AddSlidesText(ole.Stream("PowerPoint Document"), ole.Stream("Current User"), sink, why);
+  }
+  why = "not an office document";
+  return false;
+}
+
+}  // namespace
+
+uint16_t FromWestern(uint8_t byte) {
+  constexpr std::array<uint16_t, 32> HIGH{
+      0x20AC, 0x81,   0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021, 0x02C6, 0x2030, 0x0160,
+      0x2039, 0x0152, 0x8D,   0x017D, 0x8F,   0x90,   0x2018, 0x2019, 0x201C, 0x201D, 0x2022,
+      0x2013, 0x2014, 0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x9D,   0x017E, 0x0178};
+  return byte >= 0x80 && byte < 0xA0 ? HIGH[byte - 0x80U] : byte;
+}
+
+bool ReadOldOffice(const Document& document, ContentSink& sink, std::string& why) {
+  sink.SetKind(Kind::DOCUMENT);
+  // Programs save under the old endings what is none of the old formats.
+  const std::string begin = FirstBytes(document, 64);
+  if (begin.starts_with("PK\3\4")) {
+    return ReadOfficeZip(document, sink, why);
+  }
+  if (begin.starts_with("{\\rtf")) {
+    return ReadRtf(document, sink, why);
+  }
+  if (begin.starts_with("<") || begin.starts_with("\xEF\xBB\xBF<")) {
+    return ReadHtml(document, sink, why);
+  }
+  OleFile ole;
+  if (begin.starts_with("\xDB\xA5") || begin.starts_with("\x31\xBE")) {
+    return LeaveTo("catdoc", document, sink);  // older than compound files
+  }
+  if (begin.starts_with(std::string_view("\x09\x08\x06\x00", 4)) ||
+      begin.starts_with(std::string_view("\x09\x04\x06\x00", 4))) {
+    return LeaveTo("xls2csv", document, sink);
+  }
+  if (!ole.Open(document, why)) {
+    return false;
+  }
+  const bool is_good = ReadStreams(ole, document, sink, why);
+  if (document.depth > 0) {
+    sink.converter.clear();
+  }
+  return is_good;
+}
+
+}  // namespace fileindexd

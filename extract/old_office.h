@@ -1,0 +1,26 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Text out of the streams of old office documents.
+//
+// Versions before those of 1997 are left to converters: `sink.converter` is set then.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "extract/format.h"
+
+namespace fileindexd {
+
+// `document` is the stream "WordDocument", `table0` and `table1` are "0Table" and "1Table".
+bool AddWordText(std::string_view document, std::string_view table0, std::string_view table1,
+                 ContentSink& sink, std::string& why);
+// The stream "Workbook".
+bool AddWorkbookText(std::string_view workbook, ContentSink& sink, std::string& why);
+// The streams "PowerPoint Document" and "Current User".
+bool AddSlidesText(std::string_view slides, std::string_view current_user, ContentSink& sink,
+                   std::string& why);
+
+// A byte of the Western code page that these formats shorten text with.
+uint16_t FromWestern(uint8_t byte);
+
+}  // namespace fileindexd

@@ -1,0 +1,159 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/unpacker.h"
+
+#include <archive.h>
+#include <archive_entry.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <clocale>
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t BLOCK = 64 * 1024;
+
+// Members' names are converted to the locale's charset; in the C locale every letter that is not
+// ASCII would be lost. The process's locale stays as it is.
+class Utf8Locale {
+ public:
+  Utf8Locale() : made(newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr)) {
+    if (made != nullptr) {
+      before = uselocale(made);
+    }
+  }
+  ~Utf8Locale() {
+    if (made != nullptr) {
+      uselocale(before);
+      freelocale(made);
+    }
+  }
+  Utf8Locale(const Utf8Locale&) = delete;
+  Utf8Locale& operator=(const Utf8Locale&) = delete;
+
+ private:
+  locale_t made;
+  locale_t before = nullptr;
+};
+
+bool IsUsable(int code) {
+  return code == ARCHIVE_OK || code == ARCHIVE_WARN;
+}
+
+}  // namespace
+
+Unpacker::~Unpacker() {
+  if (packed != nullptr) {
+    archive_read_free(packed);
+  }
+}
+
+bool Unpacker::UseFormats(Formats formats) {
+  if (formats == Formats::ZIP) {
+    return archive_read_support_format_zip(packed) == ARCHIVE_OK;
+  }
+  // One by one: "all" of the library's filters includes those that start a program.
+  for (const auto support :
+       {archive_read_support_filter_gzip,     archive_read_support_filter_bzip2,
+        archive_read_support_filter_compress, archive_read_support_filter_lzma,
+        archive_read_support_filter_xz,       archive_read_support_filter_lzip,
+        archive_read_support_filter_zstd,     archive_read_support_filter_lz4,
+        archive_read_support_filter_rpm,      archive_read_support_format_zip,
+        archive_read_support_format_tar,      archive_read_support_format_7zip,
+        archive_read_support_format_rar,      archive_read_support_format_rar5,
+        archive_read_support_format_iso9660,  archive_read_support_format_ar,
+        archive_read_support_format_cab,      archive_read_support_format_cpio,
+        archive_read_support_format_lha,      archive_read_support_format_raw}) {
+    if (support(packed) != ARCHIVE_OK) {
+      return false;
+    }
+  }
+  return true;
+}
+
+bool Unpacker::Open(const Document& document, Formats formats, std::string& why) {
+  packed = archive_read_new();
+  if (packed == nullptr || lseek(document.file, 0, SEEK_SET) != 0 || !UseFormats(formats)) {
+    why = "cannot be read";
+    return false;
+  }
+  if (archive_read_open_fd(packed, document.file, BLOCK) != ARCHIVE_OK) {
+    why = formats == Formats::ZIP ? "not a ZIP file" : "not an archive";
+    return false;
+  }
+  return true;
+}
+
+bool Unpacker::Next() {
+  const Utf8Locale locale;
+  // A compressed stream is unpacked even where its members are only skipped.
+  const int64_t unpacked = archive_filter_count(packed) > 1 ? archive_filter_bytes(packed, 0) : 0;
+  const int64_t skipped = std::max<int64_t>(unpacked - counted, 0);
+  counted += skipped;
+  if (!allowance.TakeBytes(skipped) || allowance.IsSpent()) {
+    return false;
+  }
+
+  struct archive_entry* entry = nullptr;
+  const int code = archive_read_next_header(packed, &entry);
+  if (!IsUsable(code)) {
+    is_damaged = code != ARCHIVE_EOF;
+    return false;
+  }
+  const char* path = archive_entry_pathname(entry);
+  name = path != nullptr ? path : "";
+  size = archive_entry_size_is_set(entry) != 0 ? archive_entry_size(entry) : -1;
+  is_file = archive_entry_filetype(entry) == AE_IFREG || archive_entry_filetype(entry) == 0;
+  is_encrypted = archive_entry_is_encrypted(entry) != 0;
+  is_bare = archive_format(packed) == ARCHIVE_FORMAT_RAW;
+  // Any file at all passes for one that is not even compressed.
+  is_damaged = is_bare && archive_filter_count(packed) == 1;
+  return !is_damaged;
+}
+
+ssize_t Unpacker::Read(char* into, size_t count) {
+  const Utf8Locale locale;
+  const ssize_t got = archive_read_data(packed, into, count);
+  if (got < 0) {
+    return -1;
+  }
+  counted += got;
+  return allowance.TakeBytes(got) ? got : -1;
+}
+
+bool Unpacker::ReadAll(size_t limit, std::string& bytes) {
+  std::array<char, BLOCK> block;
+  bytes.clear();
+  for (;;) {
+    const ssize_t got = Read(block.data(), block.size());
+    if (got <= 0) {
+      return got == 0;
+    }
+    const size_t taken = std::min(static_cast<size_t>(got), limit - bytes.size());
+    bytes.append(block.data(), taken);
+    if (taken < static_cast<size_t>(got)) {
+      return false;
+    }
+  }
+}
+
+bool Unpacker::ReadAll(int64_t limit, MemoryFile& file) {
+  std::array<char, BLOCK> block;
+  if (!file.Open()) {
+    return false;
+  }
+  for (;;) {
+    const ssize_t got = Read(block.data(), block.size());
+    if (got <= 0) {
+      return got == 0;
+    }
+    const int64_t taken = std::min<int64_t>(got, limit - file.size);
+    if (!file.Append(std::string_view(block.data(), static_cast<size_t>(taken))) || taken < got) {
+      return false;
+    }
+  }
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,57 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/utf16.h"
+
+namespace fileindexd {
+
+void AppendUtf8(uint32_t code_point, std::string& text) {
+  if (code_point > 0x10FFFF || (code_point >= 0xD800 && code_point < 0xE000)) {
+    code_point = 0xFFFD;
+  }
+  if (code_point < 0x80) {
+    text += static_cast<char>(code_point);
+    return;
+  }
+  const auto tail = [&](int shift) {
+    text += static_cast<char>(0x80 | ((code_point >> shift) & 0x3F));
+  };
+  if (code_point < 0x800) {
+    text += static_cast<char>(0xC0 | (code_point >> 6));
+  } else if (code_point < 0x10000) {
+    text += static_cast<char>(0xE0 | (code_point >> 12));
+    tail(6);
+  } else {
+    text += static_cast<char>(0xF0 | (code_point >> 18));
+    tail(12);
+    tail(6);
+  }
+  tail(0);
+}
+
+void Utf16Joiner::Add(uint16_t unit, std::string& text) {
+  if (unit >= 0xD800 && unit < 0xDC00) {
+    high = unit;
+    return;
+  }
+  if (unit >= 0xDC00 && unit < 0xE000) {
+    if (high != 0) {
+      AppendUtf8(0x10000 + ((uint32_t{high} - 0xD800) << 10) + (uint32_t{unit} - 0xDC00), text);
+    }
+  } else {
+    AppendUtf8(unit, text);
+  }
+  high = 0;
+}
+
+std::string Utf16ToUtf8(std::string_view bytes) {
+  std::string text;
+  text.reserve(bytes.size() / 2);
+  Utf16Joiner joiner;
+  for (size_t at = 0; at + 1 < bytes.size(); at += 2) {
+    const auto low = static_cast<uint8_t>(bytes[at]);
+    const auto high = static_cast<uint8_t>(bytes[at + 1]);
+    joiner.Add(static_cast<uint16_t>(low | high << 8), text);
+  }
+  return text;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,27 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// UTF-16 as file formats store it, to UTF-8.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace fileindexd {
+
+// Appends a code point; what is none becomes U+FFFD.
+void AppendUtf8(uint32_t code_point, std::string& text);
+
+// Takes code units one by one.
+class Utf16Joiner {
+ public:
+  // A half of a pair that stands alone is left out.
+  void Add(uint16_t unit, std::string& text);
+
+ private:
+  uint16_t high = 0;
+};
+
+// Little-endian bytes; an odd last byte is left out.
+std::string Utf16ToUtf8(std::string_view bytes);
+
+}  // namespace fileindexd

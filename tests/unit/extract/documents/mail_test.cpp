@@ -1,0 +1,144 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/extract/documents/fixture.h"
+#include "tests/unit/extract/documents/packing.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr char HEAD[] =
+    "From: =?utf-8?q?=C3=85sa?= Lind <asa@example.org>\n"
+    "To: Quay <quay@example.org>, crane@example.org\nCc: mate@example.org\n"
+    "Subject: =?iso-8859-1?q?Gr=FC=DFe?= =?utf-8?b?6K6h5YiS?=\n"
+    "Date: Thu, 02 Jan 2020 05:04:05 +0200\nMIME-Version: 1.0\n";
+
+std::string Base64(const std::string& bytes) {
+  constexpr char LETTERS[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+  std::string text;
+  for (size_t at = 0; at < bytes.size(); at += 3) {
+    uint32_t triple = 0;
+    for (size_t i = 0; i < 3; ++i) {
+      triple = triple << 8 | (at + i < bytes.size() ? static_cast<uint8_t>(bytes[at + i]) : 0);
+    }
+    for (size_t i = 0; i < 4; ++i) {
+      text += at + i <= bytes.size() ? LETTERS[triple >> (18 - 6 * i) & 63] : '=';
+    }
+    text += at % 48 == 45 ? "\n" : "";
+  }
+  return text + "\n";
+}
+
+std::string Multipart(const std::string& type, const std::vector<std::string>& parts) {
+  std::string text = "Content-Type: multipart/" + type + "; boundary=\"==" + type + "\"\n\n";
+  for (const std::string& part : parts) {
+    text += "--==" + type + "\n" + part + "\n";
+  }
+  return text + "--==" + type + "--\n";
+}
+
+std::string Attached(const std::string& name, const std::string& bytes) {
+  return "Content-Type: application/octet-stream\nContent-Transfer-Encoding: base64\n"
+         "Content-Disposition: attachment; filename=\"" +
+         name + "\"\n\n" + Base64(bytes);
+}
+
+const std::string PLAIN =
+    "Content-Type: text/plain; charset=iso-8859-2\nContent-Transfer-Encoding: quoted-printable\n\n"
+    "The light=\nhouse p=F8ed\n";
+const std::string PAGE =
+    "Content-Type: text/html; charset=koi8-r\n\n<meta "
+    "charset=utf-8><p>\xd0\xd2\xc9\xd7\xc5\xd4</p>\n";
+
+std::string Letter() {
+  return HEAD + Multipart("mixed", {Multipart("alternative", {PLAIN, PAGE}),
+                                    Attached("notes.txt", "attached words"),
+                                    Attached("pack.zip", Zipped({{"in.txt", "packed words"}}))});
+}
+
+}  // namespace
+
+TEST(MailTest, HeadersTextAndAttachmentsAreFound) {
+  const Reading reading = ReadBytes(ReadMessage, "a.eml", Letter());
+
+  ASSERT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.content.kind, Kind::DOCUMENT);
+  EXPECT_EQ(reading.Text(ContentField::FROM), "\u00c5sa Lind <asa@example.org>");
+  EXPECT_EQ(reading.Text(ContentField::TO),
+            "Quay <quay@example.org>, crane@example.org, mate@example.org");
+  EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Gr\u00fc\u00dfe\u8ba1\u5212");
+  EXPECT_EQ(reading.Number(ContentField::SENT), 1577934245);
+  EXPECT_EQ(reading.Text(ContentField::ATTACHMENTS), "notes.txt\npack.zip");
+  EXPECT_EQ(reading.Text(ContentField::MEMBERS), "");
+  EXPECT_EQ(reading.content.text, "The lighthouse p\u0159ed attached words packed words");
+}
+
+TEST(MailTest, APageIsReadByTheCharsetOfItsHeader) {
+  const Reading reading = ReadBytes(ReadMessage, "a.eml", HEAD + PAGE);
+
+  EXPECT_EQ(reading.content.text, "\u043f\u0440\u0438\u0432\u0435\u0442");
+}
+
+TEST(MailTest, TextWithoutACharsetIsGuessed) {
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", std::string(HEAD) + "\nna\u00efve \u8ba1\u5212\n")
+                .content.text,
+            "na\u00efve \u8ba1\u5212");
+}
+
+TEST(MailTest, AMessageWithinAMessageIsRead) {
+  const Reading reading =
+      ReadBytes(ReadMessage, "a.eml",
+                HEAD + Multipart("mixed", {"Content-Type: message/rfc822\n\nSubject: inner\nFrom: "
+                                           "deckhand@example.org\n\ninner words\n"}));
+
+  EXPECT_EQ(reading.content.text, "deckhand@example.org inner inner words");
+  EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Gr\u00fc\u00dfe\u8ba1\u5212");
+}
+
+TEST(MailTest, AnEncryptedMessageKeepsItsHeaders) {
+  const Reading reading = ReadBytes(
+      ReadMessage, "a.eml",
+      HEAD + Multipart("encrypted", {"Content-Type: application/pgp-encrypted\n\nVersion: 1\n",
+                                     "Content-Type: application/octet-stream\n\nxyz\n"}));
+
+  EXPECT_EQ(reading.why, "encrypted");
+  EXPECT_EQ(reading.Text(ContentField::FROM), "\u00c5sa Lind <asa@example.org>");
+}
+
+TEST(MailTest, AllMessagesOfAMailboxAreText) {
+  const std::string box = "From a@example.org Thu Jan  2 03:04:05 2020\n" + Letter() +
+                          "\nFrom b@example.org Thu Jan  2 03:04:05 2020\n"
+                          "Subject: second\nFrom: b@example.org\n\nlast words\n";
+
+  const Reading reading = ReadBytes(ReadMailbox, "a.mbox", box);
+
+  ASSERT_TRUE(reading.is_good) << reading.why;
+  EXPECT_THAT(reading.content.text,
+              testing::HasSubstr("Gr\u00fc\u00dfe\u8ba1\u5212 The lighthouse"));
+  EXPECT_THAT(reading.content.text, testing::EndsWith("b@example.org second last words"));
+  EXPECT_EQ(reading.Text(ContentField::ATTACHMENTS), "notes.txt\npack.zip");
+  EXPECT_EQ(reading.Text(ContentField::SUBJECT), "");
+}
+
+TEST(MailTest, WhatIsNoMessageIsSaidInWords) {
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", "").why, "not a message");
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", "words without headers\n").why, "not a message");
+  EXPECT_EQ(ReadBytes(ReadMailbox, "a.mbox", "words").why, "not a mailbox");
+}
+
+TEST(MailTest, PartsWithinPartsWithoutEndAreRead) {
+  std::string deep = HEAD;
+  for (int i = 0; i < 5000; ++i) {
+    const std::string mark = std::to_string(i);
+    deep += "Content-Type: multipart/mixed; boundary=\"" + mark + "\"\n\n--" + mark + "\n";
+  }
+
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", deep + "\ndeep\n").Text(ContentField::TO).substr(0, 4),
+            "Quay");
+}
+
+TEST(MailTest, DamageIsSurvived) {
+  ExpectSurvivesDamage(ReadMessage, "a.eml", Letter());
+  ExpectSurvivesDamage(ReadMailbox, "a.mbox", "From x\n" + Letter() + "\nFrom y\n" + Letter());
+}
+
+}  // namespace fileindexd

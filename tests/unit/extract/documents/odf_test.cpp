@@ -1,0 +1,94 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/extract/documents/fixture.h"
+#include "tests/unit/extract/documents/packing.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr char NAMES[] =
+    " xmlns:office=\"o\" xmlns:text=\"t\" xmlns:table=\"b\" xmlns:meta=\"m\" xmlns:dc=\"d\"";
+
+constexpr char META[] =
+    "<office:meta><dc:title>Kr\u00e4ne</dc:title><meta:initial-creator>First Hand"
+    "</meta:initial-creator><dc:creator>Last Hand</dc:creator><dc:subject>Harbour</dc:subject>"
+    "<dc:description>All</dc:description><meta:keyword>quay</meta:keyword>"
+    "<meta:keyword>crane</meta:keyword>"
+    "<meta:creation-date>2020-01-02T03:04:05.123</meta:creation-date>"
+    "<meta:document-statistic meta:table-count=\"1\" meta:page-count=\"4\"/></office:meta>";
+
+constexpr char BODY[] =
+    "<office:body><text:tracked-changes><text:p>deleted</text:p></text:tracked-changes>layout"
+    "<text:h>The<text:s/>light<text:span>house</text:span></text:h><table:table "
+    "table:name=\"Dues\"><table:table-cell><text:p>\u8ba1\u5212</text:p></table:table-cell>"
+    "<table:table-cell><text:p>42.5</text:p></table:table-cell></table:table></office:body>";
+
+std::string Odt(const std::string& manifest) {
+  return Zipped({{"mimetype", "application/vnd.oasis.opendocument.text"},
+                 {"content.xml", std::string("<office:document-content") + NAMES + ">" + BODY +
+                                     "</office:document-content>"},
+                 {"styles.xml", std::string("<office:document-styles") + NAMES +
+                                    "><text:p>running head</text:p></office:document-styles>"},
+                 {"meta.xml", std::string("<office:document-meta") + NAMES + ">" + META +
+                                  "</office:document-meta>"},
+                 {"META-INF/manifest.xml", manifest}});
+}
+
+std::string FlatOdt() {
+  return std::string("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<office:document") + NAMES + ">" +
+         META + BODY + "</office:document>";
+}
+
+void ExpectFields(const Reading& reading) {
+  EXPECT_EQ(reading.content.kind, Kind::DOCUMENT);
+  EXPECT_EQ(reading.Text(ContentField::TITLE), "Kr\u00e4ne");
+  EXPECT_EQ(reading.Text(ContentField::AUTHOR), "First Hand");
+  EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Harbour");
+  EXPECT_EQ(reading.Text(ContentField::DESCRIPTION), "All");
+  EXPECT_EQ(reading.Text(ContentField::KEYWORDS), "quay, crane");
+  EXPECT_EQ(reading.Number(ContentField::CREATED), 1577934245);
+  EXPECT_EQ(reading.Number(ContentField::PAGES), 4);
+}
+
+}  // namespace
+
+TEST(OdfTest, TextAndFieldsAreFoundDeletedTextIsNot) {
+  const Reading reading = ReadBytes(ReadOfficeZip, "a.odt", Odt("<manifest/>"));
+
+  ASSERT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.content.text, "The lighthouse Dues \u8ba1\u5212 42.5 running head");
+  ExpectFields(reading);
+}
+
+TEST(OdfTest, TheFlatFormIsReadAlike) {
+  const Reading reading = ReadBytes(ReadOfficeZip, "a.fodt", FlatOdt());
+
+  ASSERT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.content.text, "The lighthouse Dues \u8ba1\u5212 42.5");
+  ExpectFields(reading);
+}
+
+TEST(OdfTest, FieldsAreFoundBehindTextThatIsTooLong) {
+  const Reading reading = ReadBytes(ReadOfficeZip, "a.odt", Odt("<manifest/>"), {0, 8});
+
+  EXPECT_TRUE(reading.content.is_cut);
+  ExpectFields(reading);
+}
+
+TEST(OdfTest, AnEncryptedDocumentIsSaidToBeOne) {
+  const std::string manifest =
+      "<manifest><file-entry full-path=\"content.xml\"><encryption-data/></file-entry></manifest>";
+  const Reading reading = ReadBytes(
+      ReadOfficeZip, "a.odt",
+      Zipped({{"content.xml", "\x81\x02\x93garbled\xff"}, {"META-INF/manifest.xml", manifest}}));
+
+  EXPECT_FALSE(reading.is_good);
+  EXPECT_EQ(reading.why, "encrypted");
+}
+
+TEST(OdfTest, DamageIsSurvived) {
+  ExpectSurvivesDamage(ReadOfficeZip, "a.odt", Odt("<manifest/>"));
+  ExpectSurvivesDamage(ReadOfficeZip, "a.fodt", FlatOdt());
+}
+
+}  // namespace fileindexd
