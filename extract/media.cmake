@@ -10,6 +10,7 @@ add_library(extract_media STATIC
   audio_format.cpp
   audio_stream.cpp
   audio_tags.cpp
+  bmff_items.cpp
   media_text.cpp
   photo.cpp
   photo_fields.cpp
@@ -22,7 +23,9 @@ target_link_libraries(extract_media
   PRIVATE project_flags PkgConfig::TAGLIB PkgConfig::MEDIAINFO PkgConfig::EXIV2)
 check_headers(extract_media
   audio_format.h
+  audio_stream.h
   audio_tags.h
+  bmff_items.h
   media_text.h
   photo_fields.h
   photo_values.h

@@ -6,6 +6,7 @@
 #include <exiv2/exiv2.hpp>
 #include <exiv2/webpimage.hpp>
 
+#include "extract/bmff_items.h"
 #include "extract/format.h"
 #include "extract/media_text.h"
 #include "extract/photo_fields.h"
@@ -27,7 +28,8 @@ constexpr int READ_TYPES[] = {
     Exiv2::ImageType::psd,  Exiv2::ImageType::jp2,  Exiv2::ImageType::bmff,
 };
 
-constexpr int64_t MAX_PIXELS = 1 << 20;  // on a side
+constexpr size_t MAX_METADATA = 16 << 20;  // bytes of one sort
+constexpr int64_t MAX_PIXELS = 1 << 20;    // on a side
 
 // A file's bytes, mapped: the library wants all of a raw file at once, and looks at few of its
 // pages. A file that is cut while it is read ends the helper by SIGBUS.
@@ -61,16 +63,29 @@ void SetUp() {
   (void)IS_SET_UP;  // Without XMP the other sorts are still read.
 }
 
-void PutSize(const Exiv2::Image& image, ContentSink& sink) {
-  const int64_t width = image.pixelWidth();
-  const int64_t height = image.pixelHeight();
+void PutSize(int64_t width, int64_t height, ContentSink& sink) {
   if (width > 0 && height > 0 && width <= MAX_PIXELS && height <= MAX_PIXELS) {
     sink.Set(ContentField::WIDTH, width);
     sink.Set(ContentField::HEIGHT, height);
   }
 }
 
-bool ReadPicture(const Mapping& mapping, ContentSink& sink, std::string& why) {
+// Adds to the image what stands in items that the library did not find.
+void ReadItems(std::string_view file, Exiv2::Image& image, ContentSink& sink) {
+  const BmffItems items = FindBmffItems(file);
+  PutSize(items.width, items.height, sink);
+  if (image.exifData().empty() && !items.exif.empty() && items.exif.size() <= MAX_METADATA) {
+    (void)Exiv2::ExifParser::decode(image.exifData(),
+                                    reinterpret_cast<const Exiv2::byte*>(items.exif.data()),
+                                    static_cast<uint32_t>(items.exif.size()));
+  }
+  if (image.xmpData().empty() && !items.xmp.empty() && items.xmp.size() <= MAX_METADATA) {
+    // What it could not decode is not there.
+    (void)Exiv2::XmpParser::decode(image.xmpData(), std::string(items.xmp));
+  }
+}
+
+bool ReadPicture(int type, const Mapping& mapping, ContentSink& sink, std::string& why) {
   Exiv2::Image::AutoPtr image = Exiv2::ImageFactory::open(
       static_cast<const Exiv2::byte*>(mapping.bytes), static_cast<long>(mapping.size));
   bool is_whole = true;
@@ -80,7 +95,10 @@ bool ReadPicture(const Mapping& mapping, ContentSink& sink, std::string& why) {
     is_whole = false;  // What was read before is there.
   }
   try {
-    PutSize(*image, sink);
+    if (type == Exiv2::ImageType::bmff) {
+      ReadItems({static_cast<const char*>(mapping.bytes), mapping.size}, *image, sink);
+    }
+    PutSize(image->pixelWidth(), image->pixelHeight(), sink);
     PutPhotoFields(*image, sink);
   } catch (const std::exception&) {
     is_whole = false;
@@ -108,7 +126,7 @@ bool ReadPhoto(const Document& document, ContentSink& sink, std::string& why) {
   const int type = Exiv2::ImageFactory::getType(static_cast<const Exiv2::byte*>(mapping.bytes),
                                                 static_cast<long>(mapping.size));
   if (std::ranges::find(READ_TYPES, type) != std::end(READ_TYPES)) {
-    return ReadPicture(mapping, sink, why);
+    return ReadPicture(type, mapping, sink, why);
   }
   if (!HasEnding(document.name, READ_ENDINGS)) {
     return true;
