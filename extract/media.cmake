@@ -1,9 +1,9 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 # Readers of sound, film and pictures.
 find_package(PkgConfig REQUIRED)
-pkg_check_modules(TAGLIB REQUIRED IMPORTED_TARGET taglib)
+pkg_check_modules(TAGLIB REQUIRED IMPORTED_TARGET GLOBAL taglib)
 pkg_check_modules(MEDIAINFO REQUIRED IMPORTED_TARGET libmediainfo)
-pkg_check_modules(EXIV2 REQUIRED IMPORTED_TARGET exiv2)
+pkg_check_modules(EXIV2 REQUIRED IMPORTED_TARGET GLOBAL exiv2)
 
 add_library(extract_media STATIC
   audio.cpp

@@ -72,6 +72,10 @@ std::string Camera(const Exiv2::Image& image) {
   std::string maker = ExifText(exif, "Exif.Image.Make");
   std::string model = ExifText(exif, "Exif.Image.Model");
   if (maker.empty() && model.empty()) {
+    maker = ExifText(exif, "Exif.PanasonicRaw.Make");
+    model = ExifText(exif, "Exif.PanasonicRaw.Model");
+  }
+  if (maker.empty() && model.empty()) {
     maker = Joined(XmpTexts(image.xmpData(), "Xmp.tiff.Make"));
     model = Joined(XmpTexts(image.xmpData(), "Xmp.tiff.Model"));
   }
