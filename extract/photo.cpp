@@ -31,13 +31,23 @@ constexpr int READ_TYPES[] = {
 constexpr size_t MAX_METADATA = 16 << 20;  // bytes of one sort
 constexpr int64_t MAX_PIXELS = 1 << 20;    // on a side
 
+// Some formats' first looks throw over files that are shorter; zeros behind the end harm none.
+constexpr size_t SMALLEST = 256;
+
 // A file's bytes, mapped: the library wants all of a raw file at once, and looks at few of its
 // pages. A file that is cut while it is read ends the helper by SIGBUS.
 class Mapping {
  public:
   Mapping(int file, int64_t file_size) : size(static_cast<size_t>(file_size)) {
-    if (size > 0) {
+    if (size >= SMALLEST) {
       bytes = mmap(nullptr, size, PROT_READ, MAP_PRIVATE, file, 0);
+      return;
+    }
+    const size_t filled = size;
+    size = SMALLEST;
+    bytes = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    if (IsThere()) {
+      (void)ReadAt(file, 0, static_cast<char*>(bytes), filled);  // What is missing stays zero.
     }
   }
   ~Mapping() {
@@ -85,6 +95,15 @@ void ReadItems(std::string_view file, Exiv2::Image& image, ContentSink& sink) {
   }
 }
 
+int TypeOf(const Mapping& mapping) {
+  try {
+    return Exiv2::ImageFactory::getType(static_cast<const Exiv2::byte*>(mapping.bytes),
+                                        static_cast<long>(mapping.size));
+  } catch (const std::exception&) {
+    return Exiv2::ImageType::none;
+  }
+}
+
 bool ReadPicture(int type, const Mapping& mapping, ContentSink& sink, std::string& why) {
   Exiv2::Image::AutoPtr image = Exiv2::ImageFactory::open(
       static_cast<const Exiv2::byte*>(mapping.bytes), static_cast<long>(mapping.size));
@@ -123,8 +142,7 @@ bool ReadPhoto(const Document& document, ContentSink& sink, std::string& why) {
     why = "too big to be mapped";
     return false;
   }
-  const int type = Exiv2::ImageFactory::getType(static_cast<const Exiv2::byte*>(mapping.bytes),
-                                                static_cast<long>(mapping.size));
+  const int type = TypeOf(mapping);
   if (std::ranges::find(READ_TYPES, type) != std::end(READ_TYPES)) {
     return ReadPicture(type, mapping, sink, why);
   }

@@ -36,7 +36,7 @@ TEST_P(AudioTest, LengthAndBitRateOfEveryFormatAreFound) {
   const Found found = Read(ReadAudio, GetParam());
 
   EXPECT_LT(std::abs(found.Number(ContentField::DURATION) - 2000), 30);
-  EXPECT_GT(found.Number(ContentField::BIT_RATE), 1000);
+  EXPECT_GT(found.Number(ContentField::BIT_RATE), 0);
 }
 
 TEST_P(AudioTest, AWrongEndingHidesNothing) {

@@ -30,12 +30,14 @@ std::string FormChunk(std::string_view type, const std::string& payload) {
          std::string(payload.size() % 2, '\0');
 }
 
-std::string OggPage(int flags, int64_t granule, uint32_t number, const std::string& packet) {
+std::string OggPage(int flags, int64_t granule, uint32_t number, const std::string& packet,
+                    uint32_t stream) {
   std::string lengths(packet.size() / 255, '\xff');
   lengths += static_cast<char>(packet.size() % 255);
   std::string page = std::string("OggS\0", 5) + static_cast<char>(flags) +
-                     Little(static_cast<uint64_t>(granule), 8) + Little(7, 4) + Little(number, 4) +
-                     Little(0, 4) + static_cast<char>(lengths.size()) + lengths + packet;
+                     Little(static_cast<uint64_t>(granule), 8) + Little(stream, 4) +
+                     Little(number, 4) + Little(0, 4) + static_cast<char>(lengths.size()) +
+                     lengths + packet;
   uint32_t checksum = 0;
   for (const char byte : page) {
     checksum ^= static_cast<uint32_t>(static_cast<unsigned char>(byte)) << 24;

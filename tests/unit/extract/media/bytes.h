@@ -17,7 +17,8 @@ std::string Box(std::string_view type, const std::string& payload);
 std::string RiffChunk(std::string_view type, const std::string& payload);
 std::string FormChunk(std::string_view type, const std::string& payload);
 // Of Ogg: one page that holds one packet.
-std::string OggPage(int flags, int64_t granule, uint32_t number, const std::string& packet);
+std::string OggPage(int flags, int64_t granule, uint32_t number, const std::string& packet,
+                    uint32_t stream = 7);
 // Of text in hexadecimal digits; blanks are passed over.
 std::string Hex(std::string_view digits);
 // The checksum of PNG chunks and, read the other way round, of tables in transport streams.

@@ -178,8 +178,8 @@ std::string FlashNumber(std::string_view name, std::string_view eight_bytes) {
   return Big(name.size(), 2) + std::string(name) + std::string(1, '\0') + Hex(eight_bytes);
 }
 
-std::string FlashTag(char kind, const std::string& payload) {
-  return kind + Big(payload.size(), 3) + std::string(7, '\0') + payload +
+std::string FlashTag(char kind, uint64_t time_ms, const std::string& payload) {
+  return kind + Big(payload.size(), 3) + Big(time_ms, 3) + std::string(4, '\0') + payload +
          Big(payload.size() + 11, 4);
 }
 
@@ -256,8 +256,8 @@ Sample FlvSample() {
                                FlashNumber("height", "4048000000000000") + Hex("000009");
   // Sorenson's codec, a key frame of 64 by 48 pixels.
   const std::string picture = Hex("12 000080 00 201800") + std::string(40, '\x31');
-  return {"v.flv", "FLV" + Hex("01 01 00000009 00000000") + FlashTag('\x12', metadata) +
-                       FlashTag('\x09', picture)};
+  return {"v.flv", "FLV" + Hex("01 01 00000009 00000000") + FlashTag('\x12', 0, metadata) +
+                       FlashTag('\x09', 0, picture) + FlashTag('\x09', 2000, picture)};
 }
 
 Sample OgvSample() {
@@ -266,10 +266,16 @@ Sample OgvSample() {
   const std::string title = "TITLE=Wiesenfest";
   const std::string comments =
       "\x81theora" + Little(1, 4) + "x" + Little(1, 4) + Little(title.size(), 4) + title;
-  // Ten key frames a second: the granule counts key frames above its lowest bits.
-  return {"v.ogv", OggPage(2, 0, 0, head) + OggPage(0, 0, 1, comments) +
-                       OggPage(0, 0, 2, "\x82theora" + std::string(100, '\x17')) +
-                       OggPage(4, 20 << 6, 3, std::string(100, '\x33'))};
+  const std::string sound = "\x01vorbis" + Little(0, 4) + Little(1, 1) + Little(44100, 4) +
+                            Little(0, 4) + Little(64000, 4) + Little(0, 4) + Hex("b801");
+  const std::string data(100, '\x33');
+  constexpr uint32_t SOUND = 8;
+  // Every picture is a key frame: the granule counts those above its lowest six bits.
+  return {"v.ogv", OggPage(2, 0, 0, head) + OggPage(2, 0, 0, sound, SOUND) +
+                       OggPage(0, 0, 1, comments) + OggPage(0, 0, 2, "\x82theora" + data) +
+                       OggPage(0, 0, 1, "\x03vorbis" + Little(0, 8) + "\x01", SOUND) +
+                       OggPage(0, 0, 2, "\x05vorbis" + data, SOUND) + OggPage(4, 20 << 6, 3, data) +
+                       OggPage(4, 88200, 3, data, SOUND)};
 }
 
 std::vector<Sample> FilmSamples() {

@@ -67,12 +67,13 @@ std::vector<Sample> RawSamples() {
   samples.push_back({"p.cr2", TiffBytes("II*" + Hex("00 10000000") + "CR" + Hex("0200 00000000"))});
   samples.push_back({"p.orf", TiffBytes("IIRO" + Hex("08000000"))});
   const std::string rw2_header = "IIU" + Hex("00 18000000") + std::string(16, '\x0b');
+  TiffEntry shown = TiffBytesEntry(0x2e, CameraJpeg());
+  shown.type = 7;
   samples.push_back(
-      {"p.rw2",
-       TiffFile(rw2_header,
-                {TiffShort(2, 64), TiffShort(3, 48), TiffBytesEntry(0x2e, CameraJpeg()),
-                 TiffText(0x10f, "NIKON CORPORATION"), TiffText(0x110, "NIKON D70")},
-                {}, {})});
+      {"p.rw2", TiffFile(rw2_header,
+                         {TiffShort(2, 64), TiffShort(3, 48), shown,
+                          TiffText(0x10f, "NIKON CORPORATION"), TiffText(0x110, "NIKON D70")},
+                         {}, {})});
   return samples;
 }
 
@@ -142,7 +143,8 @@ Sample WebpSample() {
 }
 
 Sample GifSample() {
-  return {"p.gif", "GIF89a" + Little(64, 2) + Little(48, 2) + Hex("000000 3b")};
+  return {"p.gif", "GIF89a" + Little(64, 2) + Little(48, 2) +
+                       Hex("000000 2c 00000000 4000 3000 00 02 02 4c01 00 3b")};
 }
 
 Sample BmpSample() {

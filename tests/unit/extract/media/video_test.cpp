@@ -63,7 +63,7 @@ INSTANTIATE_TEST_SUITE_P(Formats, VideoTest,
                                          Film{TransportSample(), "MPEG Video", false, false},
                                          Film{WmvSample(), "VC-1", true, true},
                                          Film{FlvSample(), "Sorenson Spark", false, false},
-                                         Film{OgvSample(), "Theora", true, false}),
+                                         Film{OgvSample(), "Theora, Vorbis", true, false}),
                          FormatName);
 
 TEST(VideoReaderTest, AnMp4WithSoundAloneIsMusicWithItsTags) {
