@@ -32,7 +32,7 @@ class AudioStream : public TagLib::IOStream {
   // NOLINTEND(readability-identifier-naming)
 
   static constexpr int64_t MAX_READ = 64 << 20;   // bytes read from the file in all
-  static constexpr int64_t MAX_CALLS = 2000'000;  // blocks asked for
+  static constexpr int64_t MAX_CALLS = 200'000;   // blocks asked for
   static constexpr int64_t MAX_BLOCK = 32 << 20;  // a tag with its pictures
 
  private:
