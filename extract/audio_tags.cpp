@@ -66,13 +66,13 @@ class Silence : public TagLib::DebugListener {
 };
 
 void SetUp() {
-  static const Id3v1Text ID3V1_TEXT;
-  static const Id3v2Text ID3V2_TEXT;
-  static const RiffText RIFF_TEXT;
+  static const Id3v1Text id3v1_text;
+  static const Id3v2Text id3v2_text;
+  static const RiffText riff_text;
   static Silence silence;
-  TagLib::ID3v1::Tag::setStringHandler(&ID3V1_TEXT);
-  TagLib::ID3v2::Tag::setLatin1StringHandler(&ID3V2_TEXT);
-  TagLib::RIFF::Info::Tag::setStringHandler(&RIFF_TEXT);
+  TagLib::ID3v1::Tag::setStringHandler(&id3v1_text);
+  TagLib::ID3v2::Tag::setLatin1StringHandler(&id3v2_text);
+  TagLib::RIFF::Info::Tag::setStringHandler(&riff_text);
   TagLib::setDebugListener(&silence);
 }
 

@@ -64,13 +64,13 @@ class Mapping {
 };
 
 void SetUp() {
-  static const bool IS_SET_UP = [] {
+  static const bool is_set_up = [] {
     Exiv2::LogMsg::setLevel(Exiv2::LogMsg::mute);
     Exiv2::LogMsg::setHandler(nullptr);
     Exiv2::enableBMFF(true);
     return Exiv2::XmpParser::initialize();
   }();
-  (void)IS_SET_UP;  // Without XMP the other sorts are still read.
+  (void)is_set_up;  // Without XMP the other sorts are still read.
 }
 
 void PutSize(int64_t width, int64_t height, ContentSink& sink) {

@@ -6,7 +6,7 @@ namespace fileindexd {
 std::string Little(uint64_t number, size_t size) {
   std::string bytes;
   for (size_t i = 0; i < size; i++) {
-    bytes += static_cast<char>(number >> (8 * i) & 0xff);
+    bytes += i < 8 ? static_cast<char>(number >> (8 * i) & 0xff) : '\0';
   }
   return bytes;
 }
