@@ -61,7 +61,7 @@ std::string FormatName(const testing::TestParamInfo<Victim>& info) {
   return "of_" + info.param.sample.name.substr(info.param.sample.name.rfind('.') + 1);
 }
 
-constexpr rlim_t SECONDS = 3;  // of processor time for one file
+constexpr rlim_t SECONDS = 2;  // of processor time for one file
 
 void AllowSeconds() {
   rusage used = {};
