@@ -1,0 +1,44 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What the readers of sound, film and pictures share: bytes of a file, texts and clocks in tags.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace fileindexd {
+
+// Up to `size` bytes from `offset`; fewer only at the file's end or when reading fails. Does not
+// move the descriptor's position.
+size_t ReadAt(int file, int64_t offset, char* bytes, size_t size);
+
+// Tags carry UTF-8 or, in older files, some charset of eight bits that nothing names. What is valid
+// UTF-8 stays; all else is taken for Windows' western charset, of which Latin-1 is a part.
+std::string Utf8Of(std::string_view bytes);
+bool IsUtf8(std::string_view bytes);
+
+// Of UTF-16 with the low byte first.
+std::string Utf8OfUtf16(std::string_view bytes);
+void AppendUtf8(uint32_t character, std::string& text);
+
+// Without blanks, line ends and zeros at both ends.
+std::string_view Trimmed(std::string_view text);
+
+// Seconds since the epoch of a date and time in digits: "2003:01:02 10:11:12",
+// "2003-01-02T10:11:12.5+02:00", "2003-01-02 10:11:12 UTC", "2003-01-02". What stands before the
+// year is passed over; a missing time is midnight, a missing zone UTC. None where it is no date
+// between the years 1 and 9999, and for the zeros that cameras write when their clock is not set.
+std::optional<int64_t> ClockOf(std::string_view text);
+
+// Seconds east of Greenwich: "+02:00", "-0330", "Z".
+std::optional<int64_t> ZoneOf(std::string_view text);
+
+// The first number of a text: 3 of "3/12", 1999 of "1999-05-01". None above nine digits.
+std::optional<int64_t> LeadingNumber(std::string_view text);
+
+// Whether the name ends in one of the endings, which are separated by blanks, after a dot. ASCII
+// letters are compared without case.
+bool HasEnding(std::string_view name, std::string_view endings);
+
+}  // namespace fileindexd
