@@ -26,6 +26,8 @@ struct ShareStatus {
   bool missing = false;         // the last opening of the index found no database
   bool rebuild_wanted = false;  // the next opening may create the database
   bool accept_empty = false;    // an empty root is what the user wants; set by tools
+  // What failed to be read is to be tried again; set by tools, cleared by the content service.
+  bool retry_contents = false;
 };
 
 class StateStore {
