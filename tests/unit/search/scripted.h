@@ -1,0 +1,37 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A contents database that a test fills and looks at, in the place of the real writer.
+//
+// What is written stands in `now` until a commit makes it `kept`; an opening begins with what was
+// kept. One share, one thread.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "index/contents_writer.h"
+
+namespace fileindexd {
+
+struct ScriptedFile {
+  enum class State { WAITS, DONE, FAILED };
+  ContentJob job;
+  State state = State::WAITS;
+  int64_t tries = 0;  // begun, not taken back
+  std::string text;   // or the reason of a failure
+};
+
+struct ScriptedContents {
+  std::map<int64_t, ScriptedFile> entries;  // what TakeIn finds, by row
+  std::map<int64_t, ScriptedFile> kept;
+  std::map<int64_t, ScriptedFile> now;
+  std::vector<std::string> calls;
+  std::map<std::string, IndexError> failing;  // by the call's name: it fails so, until removed
+  size_t pending_bytes = 0;
+};
+
+// The one that all writers of the process write to.
+ScriptedContents& Scripted();
+
+}  // namespace fileindexd

@@ -1,0 +1,158 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <set>
+
+#include "tests/unit/search/scripted.h"
+
+namespace fileindexd {
+
+struct ContentsWriter::Impl {
+  bool open = false;
+  bool changed = false;
+  std::set<int64_t> out;  // given out and not ended
+  IndexError error = IndexError::NONE;
+
+  // False when the test wants this call to fail.
+  bool Call(const std::string& name, const std::string& about = "") {
+    ScriptedContents& scripted = Scripted();
+    scripted.calls.push_back(about.empty() ? name : name + " " + about);
+    const auto found = scripted.failing.find(name);
+    if (found != scripted.failing.end()) {
+      error = found->second;
+      return false;
+    }
+    return true;
+  }
+
+  bool End(const char* name, int64_t file, ScriptedFile::State state, const std::string& text) {
+    if (!Call(name, std::to_string(file))) {
+      return false;
+    }
+    ScriptedFile& row = Scripted().now[file];
+    row.state = state;
+    row.text = text;
+    out.erase(file);
+    changed = true;
+    return true;
+  }
+};
+
+ScriptedContents& Scripted() {
+  static ScriptedContents contents;
+  return contents;
+}
+
+ContentsWriter::ContentsWriter() : impl(std::make_unique<Impl>()) {}
+ContentsWriter::~ContentsWriter() = default;
+
+IndexError ContentsWriter::Open(const Share& /*share*/, int64_t /*extractor_version*/) {
+  if (!impl->Call("Open")) {
+    return impl->error;
+  }
+  impl->open = true;
+  Scripted().now = Scripted().kept;
+  return IndexError::NONE;
+}
+
+void ContentsWriter::Close() {
+  if (impl->open) {
+    (void)impl->Call("Close");
+  }
+  *impl = Impl();
+}
+
+bool ContentsWriter::IsOpen() const {
+  return impl->open;
+}
+
+bool ContentsWriter::TakeIn(size_t /*limit*/, bool& more) {
+  more = false;
+  if (!impl->Call("TakeIn")) {
+    return false;
+  }
+  for (const auto& [row, file] : Scripted().entries) {
+    impl->changed = Scripted().now.emplace(row, file).second || impl->changed;
+  }
+  return true;
+}
+
+void ContentsWriter::LookAtAll() {
+  (void)impl->Call("LookAtAll");
+}
+
+bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+  if (!impl->Call("NextJobs", std::to_string(limit))) {
+    return false;
+  }
+  for (const auto& [row, file] : Scripted().now) {
+    if (jobs.size() < limit && file.state == ScriptedFile::State::WAITS &&
+        impl->out.insert(row).second) {
+      jobs.push_back(file.job);
+      jobs.back().file = row;
+    }
+  }
+  return true;
+}
+
+bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
+  for (const int64_t file : files) {
+    ++Scripted().now[file].tries;
+  }
+  return impl->Call("BeginTries", std::to_string(files.size())) && Commit();
+}
+
+bool ContentsWriter::Finish(int64_t file, const Content& content) {
+  Scripted().pending_bytes += content.text.size();
+  return impl->End("Finish", file, ScriptedFile::State::DONE, content.text);
+}
+
+bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& /*found*/,
+                          bool killed) {
+  const bool again = killed && Scripted().now[file].tries < 2;
+  return impl->End("Fail", file, again ? ScriptedFile::State::WAITS : ScriptedFile::State::FAILED,
+                   reason);
+}
+
+bool ContentsWriter::Release(int64_t file) {
+  int64_t& tries = Scripted().now[file].tries;
+  tries = tries > 0 ? tries - 1 : 0;
+  return impl->End("Release", file, ScriptedFile::State::WAITS, "");
+}
+
+bool ContentsWriter::RetryFailed() {
+  for (auto& [row, file] : Scripted().now) {
+    if (file.state == ScriptedFile::State::FAILED) {
+      file.state = ScriptedFile::State::WAITS;
+    }
+  }
+  impl->changed = true;
+  return impl->Call("RetryFailed");
+}
+
+bool ContentsWriter::Sweep(int64_t /*now*/, size_t /*limit*/, bool& more) {
+  more = false;
+  return impl->Call("Sweep");
+}
+
+bool ContentsWriter::HasChanges() const {
+  return impl->changed;
+}
+
+size_t ContentsWriter::PendingBytes() const {
+  return Scripted().pending_bytes;
+}
+
+bool ContentsWriter::Commit() {
+  if (!impl->Call("Commit")) {
+    return false;
+  }
+  Scripted().kept = Scripted().now;
+  Scripted().pending_bytes = 0;
+  impl->changed = false;
+  return true;
+}
+
+IndexError ContentsWriter::Error() const {
+  return impl->error;
+}
+
+}  // namespace fileindexd
