@@ -79,7 +79,7 @@ Time ContentLoop::Due(Time now) const {
     due = std::min(due, next_listen);
   }
   if (!works) {
-    return due;
+    return due;  // the helpers are dead or dying, and their ends are polled for
   }
 
   const bool takes_jobs = pool != nullptr ? pool->Room() > 0 : true;
@@ -101,6 +101,9 @@ void ContentLoop::Step(const std::vector<pollfd>& polled, Time now, int64_t wall
     if (std::exchange(works, false)) {
       ServiceDebug("stops reading");
       End();
+    }
+    if (pool != nullptr) {
+      (void)pool->Work();  // those that were killed are buried
     }
     return;
   }
@@ -204,14 +207,20 @@ void ContentLoop::OpenPool(Time now) {
   pool = ExtractPool::Open(options, error);
   if (pool == nullptr) {
     RestPool(now, error);
+  }
+}
+
+// What a helper that was started says of it.
+void ContentLoop::TellLeftOut() {
+  const std::string current = pool->LeftOut();
+  if (left_out == current) {
     return;
   }
-
-  const std::string left_out = pool->LeftOut();
-  if (!left_out.empty()) {
-    ServiceLog("not read on this host: %s", left_out.c_str());
+  left_out = current;
+  if (!current.empty()) {
+    ServiceLog("not read on this host: %s", current.c_str());
   }
-  if (!WriteLeftOut(left_out)) {
+  if (!WriteLeftOut(current)) {
     ServiceLog("cannot note what is not read on this host, reason=%m");
   }
 }
@@ -228,8 +237,12 @@ void ContentLoop::TakeOutcomes(Time now) {
   if (pool == nullptr) {
     return;
   }
-  for (ExtractOutcome& outcome : pool->Work()) {
+  std::vector<ExtractOutcome> outcomes = pool->Work();
+  for (ExtractOutcome& outcome : outcomes) {
     TakeOutcome(std::move(outcome), now);
+  }
+  if (!outcomes.empty()) {
+    TellLeftOut();
   }
 }
 

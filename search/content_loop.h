@@ -21,6 +21,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -58,6 +59,7 @@ class ContentLoop {
   void Reload();
   void Follow(const Share& share, const std::string& folders);
   void OpenPool(Time now);
+  void TellLeftOut();
   void TakeOutcomes(Time now);
   void TakeOutcome(ExtractOutcome&& outcome, Time now);
   void HandOut(Time now);
@@ -77,6 +79,7 @@ class ContentLoop {
   Time pool_rest_until;
   std::chrono::seconds pool_rest{0};
   bool pool_told = false;                 // that it rests
+  std::optional<std::string> left_out;    // as it was told
   uint64_t last_job = 0;                  // id
   std::map<uint64_t, std::string> owner;  // share, by job
   std::string last_share;                 // that was given a turn

@@ -4,6 +4,7 @@
 #include <poll.h>
 #include <sys/resource.h>
 #include <sys/signalfd.h>
+#include <systemd/sd-daemon.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -122,6 +123,7 @@ int Serve() {
     return Complain(error);
   }
 
+  (void)sd_notify(0, "READY=1");  // without a service manager nothing happens
   ServiceDebug("runs");
   const int code = Follow(loop, signals.fd);
   ServiceDebug("ends");

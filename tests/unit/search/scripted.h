@@ -2,7 +2,7 @@
 // A contents database that a test fills and looks at, in the place of the real writer.
 //
 // What is written stands in `now` until a commit makes it `kept`; an opening begins with what was
-// kept. One share, one thread.
+// kept. And a pool whose helpers do what the test says. One thread.
 #pragma once
 
 #include <cstdint>
@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "extract/pool.h"
 #include "index/contents_writer.h"
 
 namespace fileindexd {
@@ -31,7 +32,23 @@ struct ScriptedContents {
   size_t pending_bytes = 0;
 };
 
-// The one that all writers of the process write to.
-ScriptedContents& Scripted();
+// Those of a share, which all its writers write to.
+ScriptedContents& Scripted(const std::string& share = "a");
+void ForgetScripted();
+
+struct ScriptedPool {
+  std::vector<ExtractJob> running;
+  std::vector<ExtractOutcome> outcomes;  // for the next Work
+  size_t room = 2;                       // for so many jobs
+  unsigned aborts = 0;
+  std::string left_out;
+  std::string opening_error;  // not empty: no pool can be opened
+
+  // That job ends so.
+  void End(size_t number, ExtractOutcome::Result result, const std::string& text);
+};
+
+// The one of the process.
+ScriptedPool& Pool();
 
 }  // namespace fileindexd

@@ -6,17 +6,16 @@
 namespace fileindexd {
 
 struct ContentsWriter::Impl {
-  bool open = false;
+  ScriptedContents* contents = nullptr;  // null: closed
   bool changed = false;
   std::set<int64_t> out;  // given out and not ended
   IndexError error = IndexError::NONE;
 
   // False when the test wants this call to fail.
   bool Call(const std::string& name, const std::string& about = "") {
-    ScriptedContents& scripted = Scripted();
-    scripted.calls.push_back(about.empty() ? name : name + " " + about);
-    const auto found = scripted.failing.find(name);
-    if (found != scripted.failing.end()) {
+    contents->calls.push_back(about.empty() ? name : name + " " + about);
+    const auto found = contents->failing.find(name);
+    if (found != contents->failing.end()) {
       error = found->second;
       return false;
     }
@@ -27,7 +26,7 @@ struct ContentsWriter::Impl {
     if (!Call(name, std::to_string(file))) {
       return false;
     }
-    ScriptedFile& row = Scripted().now[file];
+    ScriptedFile& row = contents->now[file];
     row.state = state;
     row.text = text;
     out.erase(file);
@@ -36,32 +35,47 @@ struct ContentsWriter::Impl {
   }
 };
 
-ScriptedContents& Scripted() {
-  static ScriptedContents contents;
-  return contents;
+namespace {
+
+std::map<std::string, ScriptedContents>& All() {
+  static std::map<std::string, ScriptedContents> all;
+  return all;
+}
+
+}  // namespace
+
+ScriptedContents& Scripted(const std::string& share) {
+  return All()[share];
+}
+
+void ForgetScripted() {
+  for (auto& [share, contents] : All()) {
+    contents = {};  // writers may still know it
+  }
 }
 
 ContentsWriter::ContentsWriter() : impl(std::make_unique<Impl>()) {}
 ContentsWriter::~ContentsWriter() = default;
 
-IndexError ContentsWriter::Open(const Share& /*share*/, int64_t /*extractor_version*/) {
+IndexError ContentsWriter::Open(const Share& share, int64_t /*extractor_version*/) {
+  impl->contents = &Scripted(share.name);
   if (!impl->Call("Open")) {
+    impl->contents = nullptr;
     return impl->error;
   }
-  impl->open = true;
-  Scripted().now = Scripted().kept;
+  impl->contents->now = impl->contents->kept;
   return IndexError::NONE;
 }
 
 void ContentsWriter::Close() {
-  if (impl->open) {
+  if (IsOpen()) {
     (void)impl->Call("Close");
   }
   *impl = Impl();
 }
 
 bool ContentsWriter::IsOpen() const {
-  return impl->open;
+  return impl->contents != nullptr;
 }
 
 bool ContentsWriter::TakeIn(size_t /*limit*/, bool& more) {
@@ -69,8 +83,8 @@ bool ContentsWriter::TakeIn(size_t /*limit*/, bool& more) {
   if (!impl->Call("TakeIn")) {
     return false;
   }
-  for (const auto& [row, file] : Scripted().entries) {
-    impl->changed = Scripted().now.emplace(row, file).second || impl->changed;
+  for (const auto& [row, file] : impl->contents->entries) {
+    impl->changed = impl->contents->now.emplace(row, file).second || impl->changed;
   }
   return true;
 }
@@ -83,7 +97,7 @@ bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
   if (!impl->Call("NextJobs", std::to_string(limit))) {
     return false;
   }
-  for (const auto& [row, file] : Scripted().now) {
+  for (const auto& [row, file] : impl->contents->now) {
     if (jobs.size() < limit && file.state == ScriptedFile::State::WAITS &&
         impl->out.insert(row).second) {
       jobs.push_back(file.job);
@@ -95,31 +109,31 @@ bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
 
 bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
   for (const int64_t file : files) {
-    ++Scripted().now[file].tries;
+    ++impl->contents->now[file].tries;
   }
   return impl->Call("BeginTries", std::to_string(files.size())) && Commit();
 }
 
 bool ContentsWriter::Finish(int64_t file, const Content& content) {
-  Scripted().pending_bytes += content.text.size();
+  impl->contents->pending_bytes += content.text.size();
   return impl->End("Finish", file, ScriptedFile::State::DONE, content.text);
 }
 
 bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& /*found*/,
                           bool killed) {
-  const bool again = killed && Scripted().now[file].tries < 2;
+  const bool again = killed && impl->contents->now[file].tries < 2;
   return impl->End("Fail", file, again ? ScriptedFile::State::WAITS : ScriptedFile::State::FAILED,
                    reason);
 }
 
 bool ContentsWriter::Release(int64_t file) {
-  int64_t& tries = Scripted().now[file].tries;
+  int64_t& tries = impl->contents->now[file].tries;
   tries = tries > 0 ? tries - 1 : 0;
   return impl->End("Release", file, ScriptedFile::State::WAITS, "");
 }
 
 bool ContentsWriter::RetryFailed() {
-  for (auto& [row, file] : Scripted().now) {
+  for (auto& [row, file] : impl->contents->now) {
     if (file.state == ScriptedFile::State::FAILED) {
       file.state = ScriptedFile::State::WAITS;
     }
@@ -138,15 +152,15 @@ bool ContentsWriter::HasChanges() const {
 }
 
 size_t ContentsWriter::PendingBytes() const {
-  return Scripted().pending_bytes;
+  return impl->contents->pending_bytes;
 }
 
 bool ContentsWriter::Commit() {
   if (!impl->Call("Commit")) {
     return false;
   }
-  Scripted().kept = Scripted().now;
-  Scripted().pending_bytes = 0;
+  impl->contents->kept = impl->contents->now;
+  impl->contents->pending_bytes = 0;
   impl->changed = false;
   return true;
 }

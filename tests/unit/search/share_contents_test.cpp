@@ -25,7 +25,7 @@ constexpr int64_t WALL = 1'900'000'000;
 class ShareContentsTest : public StateTest {
  protected:
   ShareContentsTest() : root(folder + "/share"), contents({"a", root, ""}) {
-    Scripted() = {};
+    ForgetScripted();
     std::filesystem::create_directory(root);
     std::filesystem::create_directory(state_root);
   }
@@ -251,7 +251,7 @@ TEST_F(ShareContentsTest, AFailingDatabaseRestsLongerEachTimeAndGoesOn) {
 
 TEST_F(ShareContentsTest, AFailureAtAnyCallLosesNothing) {
   for (const char* call : {"TakeIn", "Sweep", "NextJobs", "BeginTries", "Finish", "Commit"}) {
-    Scripted() = {};
+    ForgetScripted();
     ShareContents fresh({"a", root, ""});
     const auto run = [&] {
       for (int round = 0; round < 20; ++round, now += seconds(2)) {
