@@ -27,10 +27,12 @@ class ContentSink {
   explicit ContentSink(size_t text_cap_bytes) : text_cap(text_cap_bytes) {}
 
   // Appends running text. Bytes that are no UTF-8 and control characters are replaced by blanks,
-  // runs of white space become one. Ends no word by itself: give white space where words end.
+  // runs of white space become one. Ends no word by itself: give white space where words end. A
+  // character may be cut in two between one call and the next.
   void AddText(std::string_view bytes);
-  // False values and empty texts are left out; the first value of a field stays, but that KEYWORDS,
-  // MEMBERS, ATTACHMENTS, TO and CODECS gather what comes. Cut at MAX_FIELD bytes.
+  // Numbers that cannot be true (see IsPlausible) and empty texts are left out; the first value of
+  // a field stays, but that KEYWORDS, MEMBERS, ATTACHMENTS, TO and CODECS gather what comes.
+  // Cleaned like text, cut at MAX_FIELD bytes.
   void Set(ContentField field, std::string_view text);
   void Set(ContentField field, int64_t number);
   void SetKind(Kind kind) { content.kind = kind; }
@@ -44,7 +46,11 @@ class ContentSink {
   std::string converter;
 
  private:
+  void Append(std::string_view word);
+
   size_t text_cap;
+  bool is_apart = false;  // white space came since the last word
+  std::string pending;    // begin of a character
 };
 
 // False when the file cannot be read as that format, and `why` then says so in a few words for an

@@ -1,0 +1,115 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/characters.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t YEAR_1000 = -30'610'224'000;
+constexpr int64_t YEAR_10000 = 253'402'300'800;
+constexpr int64_t DEGREE = 10'000'000;
+
+unsigned Byte(std::string_view bytes, size_t at) {
+  return static_cast<unsigned char>(bytes[at]);
+}
+
+// What the second byte may be: narrower than the others where that keeps out a character in more
+// bytes than it needs, a half of a pair, and what lies beyond the last plane.
+bool IsSecond(unsigned first, unsigned second) {
+  switch (first) {
+    case 0xE0:
+      return second >= 0xA0 && second <= 0xBF;
+    case 0xED:
+      return second >= 0x80 && second <= 0x9F;
+    case 0xF0:
+      return second >= 0x90 && second <= 0xBF;
+    case 0xF4:
+      return second >= 0x80 && second <= 0x8F;
+    default:
+      return second >= 0x80 && second <= 0xBF;
+  }
+}
+
+bool IsBetween(int64_t number, int64_t least, int64_t most) {
+  return number >= least && number <= most;
+}
+
+}  // namespace
+
+Character FirstCharacter(std::string_view bytes) {
+  const unsigned first = Byte(bytes, 0);
+  if (first < 0x80) {
+    return {first, 1, false};
+  }
+  if (first < 0xC2 || first > 0xF4) {
+    return {};
+  }
+
+  const size_t length = first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
+  char32_t code = first & (0xFFU >> (length + 1));
+  for (size_t at = 1; at < length; ++at) {
+    if (at == bytes.size()) {
+      return {0, at, true};
+    }
+    const unsigned next = Byte(bytes, at);
+    if (at == 1 ? !IsSecond(first, next) : (next & 0xC0U) != 0x80) {
+      return {0, at, false};
+    }
+    code = code << 6 | (next & 0x3FU);
+  }
+  return {code, length, false};
+}
+
+bool IsBlank(char32_t code) {
+  if (code < 0x1680) {
+    return code <= 0x20 || (code >= 0x7F && code <= 0xA0);
+  }
+  return code == 0x1680 || (code >= 0x2000 && code <= 0x200A) || code == 0x2028 || code == 0x2029 ||
+         code == 0x202F || code == 0x205F || code == 0x3000 || code == 0xFEFF ||
+         (code >= 0xFFF9 && code <= 0xFFFD) || (code & 0xFFFEU) == 0xFFFE;
+}
+
+bool IsCleanText(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const Character character = FirstCharacter(bytes);
+    if (IsBlank(character.code) && bytes[0] != ' ' && bytes[0] != '\n') {
+      return false;
+    }
+    bytes.remove_prefix(character.length);
+  }
+  return true;
+}
+
+std::string_view CutText(std::string_view text, size_t limit) {
+  if (text.size() <= limit) {
+    return text;
+  }
+
+  size_t end = limit;
+  while (end > 0 && (Byte(text, end) & 0xC0U) == 0x80) {
+    --end;
+  }
+  return text.substr(0, end);
+}
+
+bool IsPlausible(ContentField field, int64_t number) {
+  switch (field) {
+    case ContentField::CREATED:
+    case ContentField::SENT:
+    case ContentField::TAKEN:
+    case ContentField::RECORDED:
+      return IsBetween(number, YEAR_1000, YEAR_10000 - 1) && number != 0;
+    case ContentField::YEAR:
+      return IsBetween(number, 1, 9999);
+    case ContentField::LATITUDE:
+      return IsBetween(number, -90 * DEGREE, 90 * DEGREE);
+    case ContentField::LONGITUDE:
+      return IsBetween(number, -180 * DEGREE, 180 * DEGREE);
+    case ContentField::RATING:
+      return IsBetween(number, 0, 5);
+    default:
+      return number > 0;
+  }
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,27 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Guessing the charset of bytes.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace fileindexd {
+
+struct ByteOrderMark {
+  const char* charset = nullptr;  // null: none
+  size_t length = 0;
+};
+ByteOrderMark FindByteOrderMark(std::string_view bytes);
+
+// Controls that no text has, more than a stray few.
+bool LooksBinary(std::string_view bytes);
+// "UTF-16LE", "UTF-16BE" where every second byte is mostly nothing; else null.
+const char* WideCharset(std::string_view bytes);
+
+bool IsAscii(std::string_view bytes);
+// The last character may be cut.
+bool CouldBeUtf8(std::string_view bytes);
+// Of bytes that are no UTF-8; never empty.
+std::string GuessCharset(std::string_view bytes);
+
+}  // namespace fileindexd

@@ -1,0 +1,136 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/decoder.h"
+
+#include <iconv.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <system_error>
+#include <vector>
+
+#include "extract/charset.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t CHUNK = 64 * 1024;
+
+class Iconv {
+ public:
+  Iconv() = default;
+  Iconv(const Iconv&) = delete;
+  Iconv& operator=(const Iconv&) = delete;
+  ~Iconv() {
+    if (IsOpen()) {
+      iconv_close(handle);
+    }
+  }
+
+  bool Open(const std::string& charset) {
+    handle = iconv_open("UTF-8", charset.c_str());
+    return IsOpen();
+  }
+  bool IsOpen() const { return handle != NONE; }
+
+  // A character that the bytes end within waits for the next call. What is wrong becomes a blank.
+  std::string Convert(std::string_view bytes) {
+    std::string input = pending + std::string(bytes);
+    char* from = input.data();
+    size_t left = input.size();
+    std::string text;
+    std::vector<char> made(CHUNK);
+    while (left > 0) {
+      char* to = made.data();
+      size_t room = made.size();
+      const size_t result = iconv(handle, &from, &left, &to, &room);
+      const int failure = result == static_cast<size_t>(-1) ? errno : 0;
+      text.append(made.data(), made.size() - room);
+      if (failure == EINVAL) {
+        break;
+      }
+      if (failure == EILSEQ) {
+        text += ' ';
+        ++from;
+        --left;
+      }
+    }
+    pending.assign(from, left);
+    return text;
+  }
+
+ private:
+  inline static const iconv_t NONE = reinterpret_cast<iconv_t>(-1);  // NOLINT: as iconv has it
+  iconv_t handle = NONE;
+  std::string pending;
+};
+
+// One file's way to UTF-8. The charset is settled by the first piece that tells.
+class Decoding {
+ public:
+  // False: what follows is no text.
+  bool Decode(std::string_view bytes, const CharsetFinder& declared, std::string& text) {
+    if (is_first) {
+      is_first = false;
+      const ByteOrderMark mark = FindByteOrderMark(bytes);
+      bytes.remove_prefix(mark.length);
+      Settle(mark.charset != nullptr ? mark.charset : declared ? declared(bytes) : "");
+      if (mark.charset == nullptr && WideCharset(bytes) != nullptr) {
+        Settle(WideCharset(bytes));
+      }
+    }
+    if (!is_wide && LooksBinary(bytes)) {
+      return false;
+    }
+    if (!is_settled && !IsAscii(bytes)) {
+      Settle(CouldBeUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
+    }
+    text = converter.IsOpen() ? converter.Convert(bytes) : std::string(bytes);
+    return true;
+  }
+
+ private:
+  // An unknown name settles nothing: the bytes will tell.
+  void Settle(const std::string& charset) {
+    if (charset.empty() || is_settled) {
+      return;
+    }
+    is_settled = charset == "UTF-8" || converter.Open(charset) || converter.Open("WINDOWS-1252");
+    is_wide = charset.starts_with("UTF-16") || charset.starts_with("UTF-32");
+  }
+
+  Iconv converter;
+  bool is_first = true;
+  bool is_settled = false;
+  bool is_wide = false;
+};
+
+}  // namespace
+
+bool DecodeText(const Document& document, const CharsetFinder& declared, const TextTaker& take,
+                std::string& why) {
+  Decoding decoding;
+  std::vector<char> chunk(CHUNK);
+  for (off_t at = 0;;) {
+    const ssize_t length = pread(document.file, chunk.data(), chunk.size(), at);
+    if (length < 0) {
+      why = std::generic_category().message(errno);
+      return false;
+    }
+    if (length == 0) {
+      return true;
+    }
+
+    std::string text;
+    if (!decoding.Decode({chunk.data(), static_cast<size_t>(length)}, declared, text)) {
+      why = "not a text";
+      return at > 0;
+    }
+    if (!take(text)) {
+      return true;
+    }
+    at += length;
+  }
+}
+
+}  // namespace fileindexd

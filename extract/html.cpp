@@ -1,0 +1,184 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <libxml/HTMLparser.h>
+
+#include <algorithm>
+#include <array>
+#include <memory>
+#include <new>
+
+#include "extract/decoder.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t HEAD = 4096;  // where a page says its charset
+
+// Within these, words go on.
+constexpr std::array<std::string_view, 26> INLINE = {
+    "a",    "abbr",  "acronym", "b",      "bdi", "bdo", "big",  "cite", "code",
+    "del",  "em",    "font",    "i",      "ins", "kbd", "mark", "q",    "s",
+    "samp", "small", "span",    "strong", "sub", "sup", "tt",   "u"};
+// Nobody reads what stands in these.
+constexpr std::array<std::string_view, 5> HIDDEN = {"script", "style", "template", "object",
+                                                    "noscript"};
+
+template <size_t SIZE>
+bool IsAmong(const std::array<std::string_view, SIZE>& names, std::string_view name) {
+  return std::find(names.begin(), names.end(), name) != names.end();
+}
+
+std::string Lower(std::string_view text) {
+  std::string lower(text);
+  for (char& letter : lower) {
+    letter = letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
+  }
+  return lower;
+}
+
+std::string_view View(const xmlChar* text) {
+  return text == nullptr ? std::string_view() : reinterpret_cast<const char*>(text);
+}
+
+// "charset=x", "charset = 'x'", and the encoding of an XML declaration.
+std::string DeclaredCharset(std::string_view bytes) {
+  const std::string head = Lower(bytes.substr(0, HEAD));
+  for (const std::string_view word : {"charset", "encoding"}) {
+    const size_t at = head.find(word);
+    if (at == std::string::npos) {
+      continue;
+    }
+    constexpr const char* NAME = "abcdefghijklmnopqrstuvwxyz0123456789-_.:+";
+    const size_t begin = head.find_first_not_of(" \t\r\n='\"", at + word.size());
+    if (begin == std::string::npos || head.find('=', at) > begin) {
+      continue;
+    }
+    const size_t end = std::min(head.find_first_not_of(NAME, begin), head.size());
+    const std::string name = head.substr(begin, end - begin);
+    // What was read so far would not be there if this were true.
+    return name.starts_with("utf-16") || name.starts_with("utf-32") ? "" : name;
+  }
+  return "";
+}
+
+struct Page {
+  ContentSink& sink;
+  int hidden = 0;         // elements around that nobody reads
+  bool in_title = false;  // of the page, not of a picture in it
+  std::string title;
+  bool failed = false;  // no memory: an exception cannot pass through the parser
+};
+
+void TakeMeta(Page& page, const xmlChar** attributes) {
+  std::string name;
+  std::string_view value;
+  for (; attributes != nullptr && attributes[0] != nullptr; attributes += 2) {
+    const std::string key = Lower(View(attributes[0]));
+    if (key == "name" || key == "property") {
+      name = Lower(View(attributes[1]));
+    } else if (key == "content") {
+      value = View(attributes[1]);
+    }
+  }
+
+  if (name == "author" || name == "dc.creator" || name == "article:author") {
+    page.sink.Set(ContentField::AUTHOR, value);
+  } else if (name == "description" || name == "dc.description" || name == "og:description") {
+    page.sink.Set(ContentField::DESCRIPTION, value);
+  } else if (name == "keywords" || name == "dc.subject") {
+    page.sink.Set(ContentField::KEYWORDS, value);
+  }
+}
+
+// Runs `step` where no exception may leave.
+template <typename Step>
+void Guarded(void* context, const Step& step) {
+  Page& page = *static_cast<Page*>(context);
+  try {
+    step(page);
+  } catch (const std::bad_alloc&) {
+    page.failed = true;
+  }
+}
+
+void StartElement(void* context, const xmlChar* name, const xmlChar** attributes) {
+  Guarded(context, [&](Page& page) {
+    const std::string_view element = View(name);
+    page.hidden += IsAmong(HIDDEN, element) ? 1 : 0;
+    page.in_title = page.in_title || (element == "title" && page.title.empty());
+    if (!IsAmong(INLINE, element)) {
+      page.sink.AddText(" ");
+    }
+    if (element == "meta") {
+      TakeMeta(page, attributes);
+    }
+  });
+}
+
+void EndElement(void* context, const xmlChar* name) {
+  Guarded(context, [&](Page& page) {
+    const std::string_view element = View(name);
+    page.hidden -= IsAmong(HIDDEN, element) && page.hidden > 0 ? 1 : 0;
+    if (element == "title") {
+      page.in_title = false;
+    }
+    if (!IsAmong(INLINE, element)) {
+      page.sink.AddText(" ");
+    }
+  });
+}
+
+void Characters(void* context, const xmlChar* text, int length) {
+  Guarded(context, [&](Page& page) {
+    const std::string_view bytes(reinterpret_cast<const char*>(text), static_cast<size_t>(length));
+    if (page.in_title && page.title.size() < ContentSink::MAX_FIELD) {
+      page.title += bytes;
+    } else if (page.hidden == 0 && !page.in_title) {
+      page.sink.AddText(bytes);
+    }
+  });
+}
+
+htmlSAXHandler Handler() {
+  htmlSAXHandler handler = {};
+  handler.startElement = StartElement;
+  handler.endElement = EndElement;
+  handler.characters = Characters;
+  handler.ignorableWhitespace = Characters;
+  // Scripts and styles come as cdataBlock, which nobody takes.
+  return handler;
+}
+
+}  // namespace
+
+bool ReadHtml(const Document& document, ContentSink& sink, std::string& why) {
+  Page page = {sink, 0, false, "", false};
+  htmlSAXHandler handler = Handler();
+  const std::unique_ptr<htmlParserCtxt, decltype(&htmlFreeParserCtxt)> parser(
+      htmlCreatePushParserCtxt(&handler, &page, nullptr, 0, nullptr, XML_CHAR_ENCODING_UTF8),
+      &htmlFreeParserCtxt);
+  if (parser == nullptr) {
+    throw std::bad_alloc();
+  }
+  (void)htmlCtxtUseOptions(parser.get(), HTML_PARSE_RECOVER | HTML_PARSE_NOERROR |
+                                             HTML_PARSE_NOWARNING | HTML_PARSE_NONET |
+                                             HTML_PARSE_IGNORE_ENC);
+
+  const bool is_read = DecodeText(
+      document, DeclaredCharset,
+      [&](std::string_view text) {
+        (void)htmlParseChunk(parser.get(), text.data(), static_cast<int>(text.size()), 0);
+        return !sink.IsFull() && !page.failed;
+      },
+      why);
+  if (!sink.IsFull() && !page.failed) {
+    (void)htmlParseChunk(parser.get(), nullptr, 0, 1);
+  }
+  if (page.failed) {
+    throw std::bad_alloc();
+  }
+  sink.Set(ContentField::TITLE, page.title);
+  return is_read;
+}
+
+}  // namespace fileindexd

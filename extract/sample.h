@@ -1,0 +1,13 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A hash that finds files which are probably the same without reading them wholly.
+#pragma once
+
+#include <cstdint>
+
+namespace fileindexd {
+
+// XXH3 of the file's first, middle and last 64 KiB, of all of it where it is no longer than that,
+// and of its size. What cannot be read counts as not there.
+uint64_t SampleFile(int file, int64_t size);
+
+}  // namespace fileindexd

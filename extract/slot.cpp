@@ -1,0 +1,383 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/slot.h"
+
+#include <fcntl.h>
+#include <sys/mman.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <system_error>
+
+#include "extract/converters.h"
+#include "extract/format.h"
+#include "extract/helper_codes.h"
+
+namespace fileindexd {
+
+namespace {
+
+using Result = ExtractOutcome::Result;
+
+// Libraries leak a little with each file.
+constexpr unsigned JOBS_OF_A_HELPER = 500;
+// A process that ends closes its socket a moment before it is seen to have ended.
+constexpr std::chrono::seconds GRACE(2);
+// Somebody who kills helpers means no file. Something that has them killed again and again at one
+// file, such as a host short of memory, may be that file's doing.
+constexpr int OUTSIDE_KILLS = 3;
+
+std::string ErrorText() {
+  return std::generic_category().message(errno);
+}
+
+// The text of both, and of the fields those that only `converted` has.
+void Merge(Content& found, const Content& converted, size_t text_cap) {
+  ContentSink sink(text_cap);
+  sink.content = std::move(found);
+  if (!converted.text.empty()) {
+    sink.AddText(" ");
+    sink.AddText(converted.text);
+  }
+  sink.content.is_cut = sink.content.is_cut || converted.is_cut;
+  for (const TextField& text : converted.texts) {
+    sink.Set(text.field, text.text);
+  }
+  for (const NumberField& number : converted.numbers) {
+    sink.Set(number.field, number.number);
+  }
+  found = std::move(sink.content);
+}
+
+}  // namespace
+
+std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now) {
+  current.id = job.id;
+  current.name = std::move(job.name);
+  current.file.Swap(job.file);
+  deadline = now + options.deadline;
+  outside_kills = 0;
+  return Begin();
+}
+
+std::optional<ExtractOutcome> Slot::Begin() {
+  stage = Stage::READING;
+  found = Content();
+  converter_fault.clear();
+  std::string error;
+  if (!Hand(current.file.fd, current.name, error)) {
+    return End(Result::LOST, error);
+  }
+  return std::nullopt;
+}
+
+bool Slot::Hand(int file, const std::string& name, std::string& error) {
+  const bool is_old = helper.IsThere();
+  if (!is_old && !Start(error)) {
+    return false;
+  }
+  if (Send(file, name)) {
+    return true;
+  }
+
+  const bool is_gone = errno == EPIPE;
+  error = "helper: " + ErrorText();
+  DropHelper();
+  // One that ended while it had nothing to do has nothing to do with this file.
+  return is_old && is_gone && Hand(file, name, error);
+}
+
+bool Slot::Start(std::string& error) {
+  int ends[2] = {-1, -1};
+  if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
+    error = "socket: " + ErrorText();
+    return false;
+  }
+
+  ScopedFd ours(ends[0]);
+  const ScopedFd theirs(ends[1]);
+  if (!StartChild(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
+    return false;
+  }
+  socket.Swap(ours);
+  received.clear();
+  is_ready = false;
+  closing = false;
+  jobs_done = 0;
+  return true;
+}
+
+// The message is small and the socket empty: it goes as a whole or not at all. False with errno.
+bool Slot::Send(int file, const std::string& name) {
+  if (lseek(file, 0, SEEK_SET) != 0) {
+    return false;
+  }
+
+  std::string frame = EncodeJob({static_cast<uint32_t>(options.text_cap), name});
+  iovec bytes = {frame.data(), frame.size()};
+  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
+  msghdr message = {};
+  message.msg_iov = &bytes;
+  message.msg_iovlen = 1;
+  message.msg_control = control;
+  message.msg_controllen = sizeof(control);
+  cmsghdr* head = CMSG_FIRSTHDR(&message);
+  head->cmsg_level = SOL_SOCKET;
+  head->cmsg_type = SCM_RIGHTS;
+  head->cmsg_len = CMSG_LEN(sizeof(int));
+  memcpy(CMSG_DATA(head), &file, sizeof(file));
+  return sendmsg(socket.fd, &message, MSG_DONTWAIT | MSG_NOSIGNAL) ==
+         static_cast<ssize_t>(frame.size());
+}
+
+std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
+  std::optional<ExtractOutcome> outcome;
+  if (stage == Stage::CONVERTING) {
+    outcome = AwaitConverter();
+  }
+  if (!outcome && helper.IsThere()) {
+    const std::optional<int> status = Reap(helper);
+    // What it said last came before its end.
+    Receive(now);
+    outcome = TakeFrames();
+    if (status) {
+      DropHelper();
+      outcome = outcome ? std::move(outcome) : JudgeEnd(*status);
+    } else if (!outcome && closing && now >= grace) {
+      outcome = Nonsense("it closed its connection");
+    }
+  }
+  if (!outcome && HasJob() && now >= deadline) {
+    outcome = Overdue();
+  }
+  return outcome;
+}
+
+void Slot::Receive(Clock::time_point now) {
+  char buffer[64 * 1024];
+  const size_t most = MaxFrame(options.text_cap) + 1;
+  while (!closing && socket.fd >= 0 && received.size() < most) {
+    const ssize_t length = recv(socket.fd, buffer, sizeof(buffer), MSG_DONTWAIT);
+    if (length < 0 && (errno == EAGAIN || errno == EINTR)) {
+      return;
+    }
+    if (length <= 0) {
+      closing = true;
+      grace = now + GRACE;
+      return;
+    }
+    received.append(buffer, static_cast<size_t>(length));
+  }
+}
+
+std::optional<ExtractOutcome> Slot::TakeFrames() {
+  while (true) {
+    const size_t size = FrameSize(received);
+    if (size > MaxFrame(options.text_cap)) {
+      return Nonsense("an answer too long");
+    }
+    if (size == 0 || received.size() < size) {
+      return std::nullopt;
+    }
+
+    std::string fault;
+    std::optional<Answer> answer =
+        DecodeAnswer(std::string_view(received).substr(0, size), options.text_cap, fault);
+    if (!answer) {
+      return Nonsense(fault);
+    }
+    received.erase(0, size);
+    if (!answer->is_ready) {
+      return TakeAnswer(*answer);
+    }
+    if (is_ready) {
+      return Nonsense("a second greeting");
+    }
+    is_ready = true;
+    left_out = answer->left_out;
+  }
+}
+
+std::optional<ExtractOutcome> Slot::TakeAnswer(Answer& answer) {
+  const bool is_asked = stage == Stage::READING || stage == Stage::READING_RESULT;
+  if (!is_ready || !is_asked || !received.empty()) {
+    return Nonsense("an answer that was not asked for");
+  }
+
+  ++jobs_done;
+  if (stage == Stage::READING_RESULT) {
+    Merge(found, answer.content, options.text_cap);
+    if (converter_fault.empty() && answer.has_failed) {
+      converter_fault = answer.reason;
+    }
+    const std::string fault = converter_fault;
+    return fault.empty() ? End(Result::DONE, "")
+                         : End(Result::FAILED, converter_name + ": " + fault);
+  }
+
+  found = std::move(answer.content);
+  if (answer.has_failed) {
+    return End(Result::FAILED, answer.reason);
+  }
+  if (!answer.converter.empty()) {
+    return StartConverter(answer.converter);
+  }
+  return End(Result::DONE, "");
+}
+
+std::optional<ExtractOutcome> Slot::StartConverter(const std::string& name) {
+  const Converter* wanted = FindConverter(name);
+  if (wanted == nullptr) {
+    return Nonsense("a converter that there is not");
+  }
+
+  converter_name = name;
+  ScopedFd made(memfd_create("converted", MFD_CLOEXEC));
+  std::string error;
+  if (made.fd < 0 || lseek(current.file.fd, 0, SEEK_SET) != 0) {
+    return End(Result::LOST, name + ": " + ErrorText());
+  }
+  if (!StartChild(options.program, {CONVERT_MODE, name}, {current.file.fd, made.fd, -1}, converter,
+                  error)) {
+    return End(Result::LOST, error);
+  }
+  result.Swap(made);
+  stage = Stage::CONVERTING;
+  return std::nullopt;
+}
+
+std::optional<ExtractOutcome> Slot::AwaitConverter() {
+  const std::optional<int> status = Reap(converter);
+  if (!status) {
+    return std::nullopt;
+  }
+
+  if (IsKilledFromOutside(*status) && ++outside_kills <= OUTSIDE_KILLS) {
+    return StartConverter(converter_name);
+  }
+  if (*status == EXIT_DOORS << 8) {
+    return End(Result::LOST, converter_name + ": the doors cannot be closed");
+  }
+  if (*status == EXIT_PROGRAM << 8) {
+    return End(Result::FAILED, converter_name + ": cannot be started");
+  }
+  if (*status != 0) {
+    converter_fault = StatusText(*status);
+  }
+  return BeginResult();
+}
+
+std::optional<ExtractOutcome> Slot::BeginResult() {
+  const off_t size = lseek(result.fd, 0, SEEK_END);
+  if (size <= 0) {  // nothing in it, or nothing that the program could read
+    return converter_fault.empty() ? End(Result::DONE, "")
+                                   : End(Result::FAILED, converter_name + ": " + converter_fault);
+  }
+
+  stage = Stage::READING_RESULT;
+  std::string error;
+  if (!Hand(result.fd, FindConverter(converter_name)->result, error)) {
+    return End(Result::LOST, error);
+  }
+  return std::nullopt;
+}
+
+std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
+  if (stage != Stage::READING && stage != Stage::READING_RESULT) {
+    return std::nullopt;  // the next job starts another
+  }
+  if (IsKilledFromOutside(status) && ++outside_kills <= OUTSIDE_KILLS) {
+    return stage == Stage::READING ? Begin() : BeginResult();
+  }
+  if (!is_ready) {
+    return End(Result::LOST, options.program + ": does not start: " + StatusText(status));
+  }
+  if (status == EXIT_MEMORY << 8) {
+    return End(Result::KILLED, "needs more memory than is allowed");
+  }
+  return End(Result::KILLED, "the helper ended with " + StatusText(status));
+}
+
+std::optional<ExtractOutcome> Slot::Overdue() {
+  const long long limit = options.deadline.count();
+  const std::string took = limit % 1000 == 0
+                               ? "took longer than " + std::to_string(limit / 1000) + " s"
+                               : "took longer than " + std::to_string(limit) + " ms";
+  if (stage == Stage::CONVERTING) {
+    return End(Result::FAILED, converter_name + ": " + took);
+  }
+
+  const bool has_begun = is_ready;
+  DropHelper();
+  return has_begun ? End(Result::KILLED, took)
+                   : End(Result::LOST, options.program + ": does not start in time");
+}
+
+std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
+  DropHelper();
+  if (!HasJob()) {
+    return std::nullopt;
+  }
+  return End(Result::KILLED, "the helper talked nonsense: " + what);
+}
+
+ExtractOutcome Slot::End(Result how, const std::string& reason) {
+  ExtractOutcome outcome;
+  outcome.id = current.id;
+  outcome.result = how;
+  outcome.reason = reason;
+  if (how == Result::DONE || how == Result::FAILED) {
+    outcome.content = std::move(found);
+  }
+
+  Kill(converter);
+  if (converter.IsThere()) {
+    dying.emplace_back().Swap(converter);
+  }
+  found = Content();
+  result.Close();
+  current.file.Close();
+  stage = Stage::IDLE;
+  if (jobs_done >= JOBS_OF_A_HELPER) {
+    DropHelper();
+  }
+  return outcome;
+}
+
+void Slot::DropHelper() {
+  Kill(helper);
+  if (helper.IsThere()) {
+    dying.emplace_back().Swap(helper);
+  }
+  socket.Close();
+  received.clear();
+  closing = false;
+}
+
+void Slot::Clear() {
+  DropHelper();
+  if (HasJob()) {
+    (void)End(Result::LOST, "");
+  }
+}
+
+void Slot::AddPolled(std::vector<pollfd>& polled) const {
+  if (helper.IsThere()) {
+    polled.push_back({helper.pid_fd.fd, POLLIN, 0});
+    if (!closing) {
+      polled.push_back({socket.fd, POLLIN, 0});
+    }
+  }
+  if (converter.IsThere()) {
+    polled.push_back({converter.pid_fd.fd, POLLIN, 0});
+  }
+}
+
+Slot::Clock::time_point Slot::Due() const {
+  Clock::time_point due = HasJob() ? deadline : Clock::time_point::max();
+  return closing ? std::min(due, grace) : due;
+}
+
+}  // namespace fileindexd

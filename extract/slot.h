@@ -1,0 +1,90 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// One helper of the pool and the job that it has.
+//
+//           Give                 answer names a converter            it ended
+//   idle  ------->  READING  ------------------------->  CONVERTING  ------->  READING_RESULT
+//     ^                | answer                              | no start, time         | answer
+//     +----------------+-------------------------------------+-----------------------+
+//
+// In each stage the helper may also die, be killed for its time, or talk nonsense: the slot is
+// empty then, and is filled again with the next job. One thread; nothing waits.
+#pragma once
+
+#include <poll.h>
+
+#include <chrono>
+#include <list>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "extract/answer.h"
+#include "extract/child.h"
+#include "extract/pool.h"
+
+namespace fileindexd {
+
+class Slot {
+ public:
+  using Clock = std::chrono::steady_clock;
+
+  // `options` outlive the slot; `left_out` and `dying` are the pool's.
+  Slot(const PoolOptions& pool_options, std::string& pool_left_out, std::list<Child>& pool_dying)
+      : options(pool_options), left_out(pool_left_out), dying(pool_dying) {}
+
+  bool IsFree() const { return stage == Stage::IDLE && !closing; }
+  bool HasJob() const { return stage != Stage::IDLE; }
+  // Only while free. An outcome at once where no helper can be had.
+  std::optional<ExtractOutcome> Give(ExtractJob&& job, Clock::time_point now);
+  std::optional<ExtractOutcome> Work(Clock::time_point now);
+  // Kills what runs; the job is gone without outcome.
+  void Clear();
+
+  void AddPolled(std::vector<pollfd>& polled) const;
+  Clock::time_point Due() const;
+
+ private:
+  enum class Stage { IDLE, READING, CONVERTING, READING_RESULT };
+
+  bool Start(std::string& error);
+  bool Send(int file, const std::string& name);
+  // To a helper that is there or is started.
+  bool Hand(int file, const std::string& name, std::string& error);
+  // Begins the job, or begins it again.
+  std::optional<ExtractOutcome> Begin();
+  void Receive(Clock::time_point now);
+  std::optional<ExtractOutcome> TakeFrames();
+  std::optional<ExtractOutcome> TakeAnswer(Answer& answer);
+  std::optional<ExtractOutcome> JudgeEnd(int status);
+  std::optional<ExtractOutcome> StartConverter(const std::string& name);
+  std::optional<ExtractOutcome> AwaitConverter();
+  std::optional<ExtractOutcome> BeginResult();
+  std::optional<ExtractOutcome> Overdue();
+  std::optional<ExtractOutcome> Nonsense(const std::string& what);
+  ExtractOutcome End(ExtractOutcome::Result result, const std::string& reason);
+  void DropHelper();
+
+  const PoolOptions& options;
+  std::string& left_out;
+  std::list<Child>& dying;  // killed, not reaped yet
+
+  Child helper;
+  ScopedFd socket;
+  std::string received;
+  bool is_ready = false;    // its doors are closed
+  bool closing = false;     // its socket is closed, its end not seen yet
+  Clock::time_point grace;  // until then
+  unsigned jobs_done = 0;
+
+  Stage stage = Stage::IDLE;
+  ExtractJob current;
+  Clock::time_point deadline;
+  int outside_kills = 0;  // of helpers at this job
+  Content found;          // by the first reading
+  Child converter;
+  std::string converter_name;
+  std::string converter_fault;
+  ScopedFd result;  // what the converter makes, in memory
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,166 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <libxml/xmlreader.h>
+#include <unistd.h>
+
+#include <memory>
+#include <new>
+#include <optional>
+
+#include "extract/format.h"
+
+namespace fileindexd {
+
+namespace {
+
+// No limits lifted, nothing fetched, no entity put in; what is half right is read as far as it
+// goes.
+constexpr int OPTIONS =
+    XML_PARSE_NONET | XML_PARSE_NOERROR | XML_PARSE_NOWARNING | XML_PARSE_RECOVER;
+
+// Below the root: a title further down is one of many.
+constexpr int DEEPEST_FIELD = 4;
+
+struct Source {
+  int file = -1;
+  off_t at = 0;
+};
+
+int ReadSource(void* context, char* buffer, int length) {
+  auto& source = *static_cast<Source*>(context);
+  const ssize_t got = pread(source.file, buffer, static_cast<size_t>(length), source.at);
+  source.at += got > 0 ? got : 0;
+  return static_cast<int>(got);
+}
+
+std::string_view View(const xmlChar* text) {
+  return text == nullptr ? std::string_view() : reinterpret_cast<const char*>(text);
+}
+
+// Elements whose text is a field, whatever their namespace's prefix.
+std::optional<ContentField> FieldOf(std::string_view element, int depth) {
+  if (depth > DEEPEST_FIELD) {
+    return std::nullopt;
+  }
+  if (element == "title") {
+    return ContentField::TITLE;
+  }
+  if (element == "creator" || element == "author") {
+    return ContentField::AUTHOR;
+  }
+  if (element == "description" || element == "desc") {
+    return ContentField::DESCRIPTION;
+  }
+  if (element == "keywords" || element == "keyword") {
+    return ContentField::KEYWORDS;
+  }
+  return std::nullopt;
+}
+
+bool IsHidden(std::string_view element) {
+  return element == "script" || element == "style" || element == "binary" ||
+         element == "binary-data";
+}
+
+// Walks the nodes. What stands in a field's element is text as well: it is part of the document.
+class Walk {
+ public:
+  Walk(xmlTextReader* opened, ContentSink& filled) : reader(opened), sink(filled) {}
+
+  void Take() {
+    const std::string_view name = View(xmlTextReaderConstLocalName(reader));
+    const int depth = xmlTextReaderDepth(reader);
+    switch (xmlTextReaderNodeType(reader)) {
+      case XML_READER_TYPE_ELEMENT:
+        Begin(name, depth);
+        break;
+      case XML_READER_TYPE_END_ELEMENT:
+        End(depth);
+        break;
+      case XML_READER_TYPE_TEXT:
+      case XML_READER_TYPE_CDATA:
+        Add(View(xmlTextReaderConstValue(reader)));
+        break;
+      case XML_READER_TYPE_SIGNIFICANT_WHITESPACE:
+      case XML_READER_TYPE_WHITESPACE:
+        sink.AddText(" ");
+        break;
+      default:
+        break;
+    }
+  }
+
+  bool has_element = false;
+
+ private:
+  void Begin(std::string_view name, int depth) {
+    has_element = true;
+    sink.AddText(" ");
+    if (xmlTextReaderIsEmptyElement(reader) == 1) {
+      return;
+    }
+    if (hidden_from < 0 && IsHidden(name)) {
+      hidden_from = depth;
+    }
+    if (!field) {
+      field = FieldOf(name, depth);
+      field_from = depth;
+      value.clear();
+    }
+  }
+
+  void End(int depth) {
+    sink.AddText(" ");
+    if (depth == hidden_from) {
+      hidden_from = -1;
+    }
+    if (field && depth == field_from) {
+      sink.Set(*field, value);
+      field.reset();
+    }
+  }
+
+  void Add(std::string_view text) {
+    if (hidden_from >= 0) {
+      return;
+    }
+    sink.AddText(text);
+    if (field && value.size() < ContentSink::MAX_FIELD) {
+      value += text.substr(0, ContentSink::MAX_FIELD);
+      value += ' ';
+    }
+  }
+
+  xmlTextReader* reader;
+  ContentSink& sink;
+  int hidden_from = -1;  // depth of the outermost element that nobody reads; -1: none
+  std::optional<ContentField> field;
+  int field_from = 0;
+  std::string value;
+};
+
+}  // namespace
+
+bool ReadXml(const Document& document, ContentSink& sink, std::string& why) {
+  Source source = {document.file, 0};
+  const std::unique_ptr<xmlTextReader, decltype(&xmlFreeTextReader)> reader(
+      xmlReaderForIO(ReadSource, nullptr, &source, nullptr, nullptr, OPTIONS), &xmlFreeTextReader);
+  if (reader == nullptr) {
+    throw std::bad_alloc();
+  }
+  xmlTextReaderSetErrorHandler(
+      reader.get(), [](void*, const char*, xmlParserSeverities, xmlTextReaderLocatorPtr) {},
+      nullptr);
+
+  Walk walk(reader.get(), sink);
+  int result = 1;
+  while (!sink.IsFull() && (result = xmlTextReaderRead(reader.get())) == 1) {
+    walk.Take();
+  }
+  if (result < 0) {
+    why = walk.has_element ? "damaged XML" : "not an XML file";
+    return false;
+  }
+  return true;
+}
+
+}  // namespace fileindexd
