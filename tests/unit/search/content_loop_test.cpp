@@ -88,17 +88,8 @@ class ContentLoopTest : public MountTest {
   void AddFile(const std::string& share, int64_t row) {
     const std::string path = folder + "/" + share + "/" + share + std::to_string(row);
     WriteFile(path, "text");
-    struct statx st {};
-    ASSERT_EQ(
-        statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, STATX_BASIC_STATS | STATX_BTIME, &st),
-        0);
-    const auto nanoseconds = [](const statx_timestamp& time) {
-      return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
-    };
     ScriptedFile& entry = Scripted(share).entries[row];
-    entry.job.identity = {st.stx_ino,
-                          (st.stx_mask & STATX_BTIME) != 0 ? nanoseconds(st.stx_btime) : 0,
-                          static_cast<int64_t>(st.stx_size), nanoseconds(st.stx_mtime)};
+    entry.job.identity = IdentityOf(path);
     entry.job.paths = {path};
   }
 
@@ -222,7 +213,7 @@ TEST_F(ContentLoopTest, WhatIsReadIsWrittenDownAndTheNextIsGivenOut) {
   ASSERT_THAT(Running(), ElementsAre("a1", "a2"));
 
   Pool().left_out = "some formats";
-  Pool().End(0, Result::DONE, "words");
+  Pool().End(Result::DONE, "words");
   Settle();
 
   EXPECT_THAT(Running(), ElementsAre("a2", "a3"));
@@ -237,7 +228,7 @@ TEST_F(ContentLoopTest, AHostWithoutProcessesIsTriedAgainLater) {
   Settle();
   ASSERT_THAT(Running(), ElementsAre("a1"));
 
-  Pool().End(0, Result::LOST, "");
+  Pool().End(Result::LOST, "");
   AddFile("a", 2);
   Settle();
   EXPECT_THAT(Running(), ElementsAre());
@@ -281,7 +272,7 @@ TEST_F(ContentLoopTest, AShareThatIsRemovedIsForgotten) {
   ASSERT_TRUE(store->RemoveShare("a"));
   Settle();
   Scripted("a").calls.clear();
-  Pool().End(0, Result::DONE, "words");
+  Pool().End(Result::DONE, "words");
   Settle();
 
   EXPECT_THAT(Scripted("a").calls, ElementsAre());

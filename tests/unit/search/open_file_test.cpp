@@ -7,6 +7,7 @@
 
 #include <filesystem>
 
+#include "tests/unit/search/scripted.h"
 #include "tests/unit/state/fixture.h"
 
 namespace fileindexd {
@@ -19,17 +20,7 @@ class OpenFileTest : public StateTest {
     Know(path);
   }
 
-  void Know(const std::string& known) {
-    struct statx st {};
-    ASSERT_EQ(
-        statx(AT_FDCWD, known.c_str(), AT_SYMLINK_NOFOLLOW, STATX_BASIC_STATS | STATX_BTIME, &st),
-        0);
-    const auto nanoseconds = [](const statx_timestamp& time) {
-      return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
-    };
-    identity = {st.stx_ino, (st.stx_mask & STATX_BTIME) != 0 ? nanoseconds(st.stx_btime) : 0,
-                static_cast<int64_t>(st.stx_size), nanoseconds(st.stx_mtime)};
-  }
+  void Know(const std::string& known) { identity = IdentityOf(known); }
   Opening Open(const std::string& asked) {
     return OpenFile({"a", folder, ""}, asked, identity, file, reason);
   }

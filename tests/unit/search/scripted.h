@@ -6,6 +6,7 @@
 #pragma once
 
 #include <cstdint>
+#include <list>
 #include <map>
 #include <string>
 #include <vector>
@@ -37,16 +38,19 @@ ScriptedContents& Scripted(const std::string& share = "a");
 void ForgetScripted();
 
 struct ScriptedPool {
-  std::vector<ExtractJob> running;
+  std::list<ExtractJob> running;
   std::vector<ExtractOutcome> outcomes;  // for the next Work
   size_t room = 2;                       // for so many jobs
   unsigned aborts = 0;
   std::string left_out;
   std::string opening_error;  // not empty: no pool can be opened
 
-  // That job ends so.
-  void End(size_t number, ExtractOutcome::Result result, const std::string& text);
+  // The first job ends so.
+  void End(ExtractOutcome::Result result, const std::string& text);
 };
+
+// As the entries would have it.
+FileIdentity IdentityOf(const std::string& path);
 
 // The one of the process.
 ScriptedPool& Pool();

@@ -12,22 +12,13 @@ ScriptedPool& Pool() {
   return pool;
 }
 
-void ScriptedPool::End(size_t number, ExtractOutcome::Result result, const std::string& text) {
+void ScriptedPool::End(ExtractOutcome::Result result, const std::string& text) {
   ExtractOutcome& outcome = outcomes.emplace_back();
-  outcome.id = running.at(number).id;
+  outcome.id = running.front().id;
   outcome.result = result;
   outcome.content.text = text;
   outcome.reason = "the reason";
-  std::vector<ExtractJob> left;
-  for (size_t at = 0; at < running.size(); ++at) {
-    if (at != number) {
-      ExtractJob& job = left.emplace_back();
-      job.id = running[at].id;
-      job.name = running[at].name;
-      job.file.Swap(running[at].file);
-    }
-  }
-  running.swap(left);
+  running.pop_front();
 }
 
 std::unique_ptr<ExtractPool> ExtractPool::Open(const PoolOptions& /*options*/, std::string& error) {

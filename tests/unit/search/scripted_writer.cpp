@@ -1,4 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
 #include <set>
 
 #include "tests/unit/search/scripted.h"
@@ -52,6 +56,17 @@ void ForgetScripted() {
   for (auto& [share, contents] : All()) {
     contents = {};  // writers may still know it
   }
+}
+
+FileIdentity IdentityOf(const std::string& path) {
+  struct statx st {};
+  EXPECT_EQ(
+      statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, STATX_BASIC_STATS | STATX_BTIME, &st), 0);
+  const auto nanoseconds = [](const statx_timestamp& time) {
+    return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
+  };
+  const int64_t birth = (st.stx_mask & STATX_BTIME) != 0 ? nanoseconds(st.stx_btime) : 0;
+  return {st.stx_ino, birth, static_cast<int64_t>(st.stx_size), nanoseconds(st.stx_mtime)};
 }
 
 ContentsWriter::ContentsWriter() : impl(std::make_unique<Impl>()) {}

@@ -1,9 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "search/share_contents.h"
 
-#include <fcntl.h>
 #include <gmock/gmock.h>
-#include <sys/stat.h>
 
 #include <algorithm>
 #include <filesystem>
@@ -28,18 +26,6 @@ class ShareContentsTest : public StateTest {
     ForgetScripted();
     std::filesystem::create_directory(root);
     std::filesystem::create_directory(state_root);
-  }
-
-  FileIdentity IdentityOf(const std::string& path) {
-    struct statx st {};
-    EXPECT_EQ(
-        statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, STATX_BASIC_STATS | STATX_BTIME, &st),
-        0);
-    const auto nanoseconds = [](const statx_timestamp& time) {
-      return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
-    };
-    const int64_t birth = (st.stx_mask & STATX_BTIME) != 0 ? nanoseconds(st.stx_btime) : 0;
-    return {st.stx_ino, birth, static_cast<int64_t>(st.stx_size), nanoseconds(st.stx_mtime)};
   }
 
   // A file of the share that the entries know.
