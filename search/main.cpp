@@ -70,7 +70,7 @@ std::string HelperPath() {
   std::string folder(own.data(), size > 0 ? static_cast<size_t>(size) : 0);
   folder.erase(std::min(folder.rfind('/'), folder.size()));
   for (const char* place : {"/", "/../libexec/", "/../libexec/fileindexd/"}) {
-    const std::string path = folder + place + HELPER_PROGRAM;
+    std::string path = folder + place + HELPER_PROGRAM;
     if (access(path.c_str(), X_OK) == 0) {
       return path;
     }
