@@ -1,0 +1,33 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The words of contents: a tokenizer for the full-text tables, and the languages that it knows.
+//
+//   tokenize='fileindex LANGUAGE'
+//
+// Case, accents and compatibility forms do not count. Every word stands beside its stem in that
+// language. Han, kana and Hangul stand as overlapping pairs of characters, and the last one of a
+// run alone, so that words are found without boundaries; one character is looked for as the
+// beginning of a pair. Identifiers (foo_bar, fooBar, v1.2) stand whole and in their parts, all in
+// one place. A question's words come whole, beside their stems.
+#pragma once
+
+#include <sqlite3.h>
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace fileindexd {
+
+constexpr const char* TEXT_TOKENIZER = "fileindex";
+constexpr const char* DEFAULT_LANGUAGE = "english";
+constexpr const char* NO_LANGUAGE = "none";  // no stems
+
+// Makes the tokenizer known to the connection: whoever reads or writes words needs it. SQLite's
+// code.
+int RegisterTextTokenizer(sqlite3* db);
+
+// The name under which a language is kept ("en" and "English" are "english"); empty: not known.
+std::string LanguageName(std::string_view given);
+std::vector<std::string> Languages();  // names, sorted, NO_LANGUAGE among them
+
+}  // namespace fileindexd
