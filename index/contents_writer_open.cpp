@@ -12,7 +12,8 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t SLICE = 1000;
-constexpr int64_t MOST_TRIES = 2;
+// Somebody who kills services means no file, and may well do so twice.
+constexpr int64_t MOST_DEATHS = 5;
 
 int64_t Now() {
   return static_cast<int64_t>(time(nullptr));
@@ -87,8 +88,8 @@ int ContentsWriter::Impl::Own() {
   return code == SQLITE_OK ? table->Commit(Now()) : code;
 }
 
-// What a service that died left in flight; what this process has handed out is none of that. One of
-// many is most likely innocent; one that was alone did it.
+// What a service that died left in flight. One of many is most likely innocent; one that was alone
+// as often did it. What this writer itself left in flight, when its database failed, is forgiven.
 int ContentsWriter::Impl::JudgeLeftBegun() {
   std::vector<ContentFile> left;
   int code = SQLITE_OK;
@@ -99,16 +100,17 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
       ContentFile file = left[i];
       const bool was_alone = file.begun == 1;
       file.begun = 0;
-      file.tries += was_alone ? 1 : 0;
-      file.unended += was_alone ? 0 : 1;
-      if (file.tries >= MOST_TRIES && file.state == ContentState::WAITING) {
+      file.unended += has_judged ? 0 : 1;
+      if (was_alone && file.unended >= MOST_DEATHS && file.state == ContentState::WAITING) {
         file.state = ContentState::QUARANTINED;
+        file.tries = file.unended;
         file.extractor = extractor;
-        code = table->SetReason(file.id, "the content service ended over it twice");
+        code = table->SetReason(file.id, "the content service ended over it again and again");
       }
       code = code == SQLITE_OK ? table->Update(left[i], file) : code;
     }
   } while (code == SQLITE_OK && !left.empty());
+  has_judged = has_judged || code == SQLITE_OK;
   return code;
 }
 

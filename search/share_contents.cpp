@@ -34,7 +34,8 @@ constexpr seconds LONGEST_REST(60);
 ShareContents::ShareContents(Share followed) : share(std::move(followed)) {}
 
 void ShareContents::Set(const Share& current, bool has_no_space, bool wants_retry) {
-  const bool is_other = current.path != share.path || current.filesystem != share.filesystem;
+  const bool is_other = current.path != share.path || current.filesystem != share.filesystem ||
+                        current.language != share.language;
   if (is_other) {
     FilesChanged();
     rest_until = Time();
@@ -119,7 +120,6 @@ void ShareContents::Open(Time now) {
   }
 
   idle_since = now;
-  may_have_jobs = true;
   has_news = true;
   if (next_full_look == Time::max()) {
     next_full_look = now + BETWEEN_FULL_LOOKS;
@@ -298,6 +298,9 @@ void ShareContents::Rest(Time now, const std::string& reason) {
   if (!rest_told) {
     ServiceLog("Share[%s] contents rest, reason=%s", share.name.c_str(), reason.c_str());
     rest_told = true;
+  }
+  if (writer.HasChanges()) {
+    (void)writer.Commit();  // good if it still can be done: it would be read once more
   }
   Forget();
   has_news = true;
