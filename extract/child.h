@@ -36,7 +36,7 @@ struct ChildFiles {
 // Starts `program` in a session of its own, in the root folder, with default signals, an empty
 // signal mask, a fixed environment, and no descriptor but those. Standard error is /dev/null, but
 // for sanitizers' sake the caller's in such builds. The last argument that it gets is our process
-// number, for HoldOnToParent. False, and `error` then says why, on failure.
+// number (see Doors::parent). False, and `error` then says why, on failure.
 bool StartChild(const std::string& program, std::vector<std::string> arguments,
                 const ChildFiles& files, Child& child, std::string& error);
 

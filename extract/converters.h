@@ -22,8 +22,8 @@ struct Converter {
 // Null when there is none of that name.
 const Converter* FindConverter(std::string_view name);
 
-// Closes the doors but for that program and becomes it. Returns only on failure, and `error` then
-// says why.
+// Becomes that program, behind doors that are closed but for it. Returns only on failure, and
+// `error` then says why.
 void BecomeConverter(const Converter& converter, std::string& error);
 
 }  // namespace fileindexd

@@ -1,0 +1,174 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/choice.h"
+
+#include <magic.h>
+#include <unistd.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace fileindexd {
+
+namespace {
+
+// What libmagic looks at: its tests for text and for tar need no more.
+constexpr size_t HEAD = 64 * 1024;
+
+struct Reading {
+  FormatReader read;
+  Kind kind;        // unless the reader knows better
+  bool uses_files;  // its library opens files of its own at run time
+};
+
+// Every reader that there is, by its format.
+Reading ReadingOf(Format format) {
+  switch (format) {
+    case Format::TEXT:
+      return {ReadText, Kind::DOCUMENT, false};
+    case Format::HTML:
+      return {ReadHtml, Kind::DOCUMENT, false};
+    case Format::XML:
+      return {ReadXml, Kind::DOCUMENT, false};
+    case Format::PDF:
+      return {ReadPdf, Kind::DOCUMENT, true};
+    case Format::OFFICE_ZIP:
+      return {ReadOfficeZip, Kind::DOCUMENT, false};
+    case Format::EPUB:
+      return {ReadEpub, Kind::DOCUMENT, false};
+    case Format::OLD_OFFICE:
+      return {ReadOldOffice, Kind::DOCUMENT, false};
+    case Format::RTF:
+      return {ReadRtf, Kind::DOCUMENT, false};
+    case Format::MESSAGE:
+      return {ReadMessage, Kind::DOCUMENT, false};
+    case Format::MAILBOX:
+      return {ReadMailbox, Kind::DOCUMENT, false};
+    case Format::ARCHIVE:
+      return {ReadArchive, Kind::DOCUMENT, false};
+    case Format::AUDIO:
+      return {ReadAudio, Kind::AUDIO, false};
+    case Format::VIDEO:
+      return {ReadVideo, Kind::VIDEO, false};
+    case Format::PHOTO:
+      return {ReadPhoto, Kind::PHOTO, false};
+    case Format::NONE:
+      break;
+  }
+  return {nullptr, Kind::OTHER, false};
+}
+
+// Set once, before the doors close; readers of members come back here without a way to be told.
+struct Surroundings {
+  magic_t magic = nullptr;
+  bool has_files = true;
+};
+
+Surroundings& Around() {
+  static Surroundings surroundings;
+  return surroundings;
+}
+
+std::string ReadHead(int file) {
+  std::string head(HEAD, '\0');
+  size_t filled = 0;
+  while (filled < head.size()) {
+    const ssize_t got =
+        pread(file, head.data() + filled, head.size() - filled, static_cast<off_t>(filled));
+    if (got <= 0) {
+      break;
+    }
+    filled += static_cast<size_t>(got);
+  }
+  head.resize(filled);
+  return head;
+}
+
+Format FormatOfContent(const Document& document) {
+  const std::string head = ReadHead(document.file);
+  if (head.empty() || Around().magic == nullptr) {
+    return Format::NONE;
+  }
+  // libmagic knows a single message and no box of them.
+  if (head.starts_with("From ") && head.find("\nFrom: ") != std::string::npos) {
+    return Format::MAILBOX;
+  }
+  const char* mime = magic_buffer(Around().magic, head.data(), head.size());
+  return mime == nullptr ? Format::NONE : FormatOfMime(mime);
+}
+
+bool Read(Format format, const Document& document, ContentSink& sink, std::string& why) {
+  const Reading reading = ReadingOf(format);
+  if (reading.uses_files && !Around().has_files) {
+    why = "left out: this kernel cannot confine its library";
+    return false;
+  }
+  if (lseek(document.file, 0, SEEK_SET) != 0) {
+    why = "cannot be read";
+    return false;
+  }
+
+  sink.SetKind(reading.kind);
+  const bool is_read = reading.read(document, sink, why);
+  if (!sink.converter.empty() && (document.depth > 0 || !Around().has_files)) {
+    if (document.depth == 0) {
+      why = "left out: this kernel cannot confine " + sink.converter;
+    }
+    sink.converter.clear();  // a member has no descriptor that a program could be given
+    return is_read && document.depth > 0;
+  }
+  return is_read;
+}
+
+}  // namespace
+
+bool LoadMagic(std::string& error) {
+  // Not what is inside compressed files, and nothing that runs a program for it.
+  magic_t magic = magic_open(MAGIC_MIME_TYPE | MAGIC_NO_CHECK_COMPRESS | MAGIC_NO_CHECK_ELF);
+  if (magic == nullptr || magic_load(magic, nullptr) != 0) {
+    const char* text = magic == nullptr ? nullptr : magic_error(magic);
+    error = std::string("libmagic: ") + (text == nullptr ? "no memory" : text);
+    if (magic != nullptr) {
+      magic_close(magic);
+    }
+    return false;
+  }
+  Around().magic = magic;
+  return true;
+}
+
+void LeaveOutFileUsers() {
+  Around().has_files = false;
+}
+
+bool ReadDocument(const Document& document, ContentSink& sink, std::string& why) {
+  const Format named = FormatOfName(document.name);
+  if (named == Format::NONE) {
+    const Format seen = FormatOfContent(document);
+    return seen == Format::NONE || Read(seen, document, sink, why);
+  }
+  if (document.size == 0) {
+    sink.SetKind(ReadingOf(named).kind);
+    return true;
+  }
+
+  // A name may lie. Whose reader refuses the content, is judged by the content.
+  std::string fault;
+  ContentSink tried = sink;
+  if (Read(named, document, tried, fault)) {
+    sink = std::move(tried);
+    return true;
+  }
+  const Format seen = FormatOfContent(document);
+  if (seen == Format::NONE && named == Format::TEXT) {
+    return true;  // many endings of source code name something else elsewhere
+  }
+  if (seen == Format::NONE || seen == named) {
+    sink = std::move(tried);
+    why = fault;
+    return false;
+  }
+  return Read(seen, document, sink, why);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,109 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/doors.h"
+
+#include <grp.h>
+#include <pwd.h>
+#include <sys/prctl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <csignal>
+#include <system_error>
+
+#include "base/capabilities.h"
+#include "base/landlock.h"
+#include "extract/limits.h"
+#include "extract/own_root.h"
+#include "extract/run_time_files.h"
+#include "extract/system_calls.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr id_t NOBODY = 65534;
+
+bool Failed(const std::string& what, std::string& error) {
+  error = what + ": " + std::generic_category().message(errno);
+  return false;
+}
+
+bool Limit(const LandlockRules& rules, const RunTimeFiles& files, std::string& error) {
+  for (const std::string& path : files.readable) {
+    if (!rules.Allow(path.c_str(), LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_READ_DIR)) {
+      return Failed(path, error);
+    }
+  }
+  for (const std::string& path : files.executable) {
+    if (!rules.Allow(path.c_str(), LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_EXECUTE)) {
+      return Failed(path, error);
+    }
+  }
+  return true;
+}
+
+// The superuser becomes nobody. In a user namespace that does not know that user (EINVAL) it stays
+// what it is there, without any capability.
+bool LeaveUser(std::string& error) {
+  if (geteuid() != 0) {
+    return true;
+  }
+  if (setgroups(0, nullptr) != 0 && errno != EPERM) {  // user namespaces may forbid it
+    return Failed("groups", error);
+  }
+  if (setresgid(NOBODY, NOBODY, NOBODY) != 0 && errno != EINVAL) {
+    return Failed("group", error);
+  }
+  if (setresuid(NOBODY, NOBODY, NOBODY) != 0 && errno != EINVAL) {
+    return Failed("user", error);
+  }
+  return true;
+}
+
+}  // namespace
+
+bool CloseDoors(Doors& doors, std::string& error) {
+  // The order matters: an own root takes a capability; Landlock's rules are made while everything
+  // can be named, and hold once no new privileges can be had; limits on processes count against the
+  // user, and are refused by none; the system calls go last.
+  (void)umask(S_IRWXG | S_IRWXO);
+  const RunTimeFiles files = FindRunTimeFiles(doors.converter);
+  LandlockRules rules;
+  const bool has_landlock = doors.has_landlock && LandlockVersion() >= 1;
+  if (has_landlock && (!rules.Open(LANDLOCK_READS | LandlockWrites(LandlockVersion())) ||
+                       !Limit(rules, files, error))) {
+    return error.empty() ? Failed("Landlock", error) : false;
+  }
+  std::string fault;
+  const bool has_own_root = !has_landlock && doors.has_namespaces && EnterOwnRoot(files, fault);
+  doors.can_open_files = has_landlock || has_own_root;
+  if (!doors.can_open_files && doors.converter != nullptr) {
+    error = "neither Landlock nor an own root: " + fault;
+    return false;
+  }
+
+  if (!LeaveUser(error)) {
+    return false;
+  }
+  if (!KeepCapabilities(0)) {
+    return Failed("capabilities", error);
+  }
+  if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0 || prctl(PR_SET_DUMPABLE, 0, 0, 0, 0) != 0) {
+    return Failed("privileges", error);
+  }
+  // Becoming another user has undone it, had it been done before.
+  if (prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0) != 0 || getppid() != doors.parent) {
+    return Failed("parent", error);
+  }
+  if (has_landlock && !rules.Restrict()) {
+    return Failed("Landlock", error);
+  }
+  if (!SetLimits()) {
+    return Failed("limits", error);
+  }
+  const SystemCalls calls = {doors.can_open_files, doors.converter != nullptr};
+  return LimitSystemCalls(calls, error);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,194 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// fileindex-extract: the closed helper. Started by the content service alone.
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <charconv>
+#include <clocale>
+#include <cstdio>
+#include <cstring>
+#include <exception>
+#include <new>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <system_error>
+
+#include "base/scoped_fd.h"
+#include "extract/answer.h"
+#include "extract/child.h"
+#include "extract/choice.h"
+#include "extract/converters.h"
+#include "extract/doors.h"
+#include "extract/format.h"
+#include "extract/helper_codes.h"
+#include "extract/run_time_files.h"
+#include "extract/sample.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr const char* PROGRAM = "fileindex-extract";
+
+int Complain(const std::string& error, int code) {
+  (void)fprintf(stderr, "%s: %s\n", PROGRAM, error.c_str());
+  return code;
+}
+
+bool SendAll(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t sent = write(HELPER_SOCKET, bytes.data(), bytes.size());
+    if (sent < 0) {
+      return false;
+    }
+    bytes.remove_prefix(static_cast<size_t>(sent));
+  }
+  return true;
+}
+
+// None when the service has closed its end, or what it says is no job.
+std::optional<JobOrder> ReceiveJob(ScopedFd& file) {
+  std::string frame(MAX_JOB_NAME + 64, '\0');
+  iovec bytes = {frame.data(), frame.size()};
+  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
+  msghdr message = {};
+  message.msg_iov = &bytes;
+  message.msg_iovlen = 1;
+  message.msg_control = control;
+  message.msg_controllen = sizeof(control);
+  const ssize_t length = recvmsg(HELPER_SOCKET, &message, MSG_CMSG_CLOEXEC);
+  const cmsghdr* head = length > 0 ? CMSG_FIRSTHDR(&message) : nullptr;
+  if (head == nullptr || head->cmsg_type != SCM_RIGHTS) {
+    return std::nullopt;
+  }
+
+  int received = -1;
+  memcpy(&received, CMSG_DATA(head), sizeof(received));
+  ScopedFd taken(received);
+  file.Swap(taken);
+  frame.resize(static_cast<size_t>(length));
+  return DecodeJob(frame);
+}
+
+// Memory that runs out ends the helper: what is left of it is not to be trusted with the next file.
+void ReadFile(const Document& document, size_t text_cap, Answer& answer) {
+  ContentSink sink(text_cap);
+  try {
+    answer.has_failed = !ReadDocument(document, sink, answer.reason);
+  } catch (const std::bad_alloc&) {
+    _exit(EXIT_MEMORY);
+  } catch (const std::exception& error) {
+    answer.has_failed = true;
+    answer.reason = error.what();
+  }
+  answer.content = std::move(sink.content);
+  answer.converter = std::move(sink.converter);
+}
+
+bool Answered(const JobOrder& job, int file) {
+  struct stat info = {};
+  Answer answer;
+  if (fstat(file, &info) != 0 || !S_ISREG(info.st_mode)) {
+    answer.has_failed = true;
+    answer.reason = "not a regular file";
+    return SendAll(EncodeAnswer(answer));
+  }
+
+  const uint64_t sample = SampleFile(file, info.st_size);
+  ReadFile({file, job.name, info.st_size, 0}, job.text_cap, answer);
+  answer.content.sample = sample;
+  return SendAll(EncodeAnswer(answer));
+}
+
+int Serve(int parent) {
+  // libmagic's database and the locale are opened while they can be.
+  std::string error;
+  (void)setlocale(LC_ALL, "C.UTF-8");
+  if (!LoadMagic(error)) {
+    return Complain(error, EXIT_DOORS);
+  }
+  Doors doors;
+  doors.parent = parent;
+  if (!CloseDoors(doors, error)) {
+    return Complain(error, EXIT_DOORS);
+  }
+
+  Answer greeting;
+  greeting.is_ready = true;
+  if (!doors.can_open_files) {
+    LeaveOutFileUsers();
+    greeting.left_out =
+        "PDF, old office formats, RTF, rare charsets (the kernel has neither Landlock nor "
+        "namespaces)";
+  }
+  if (!SendAll(EncodeAnswer(greeting))) {
+    return 0;
+  }
+  while (true) {
+    ScopedFd file;
+    const std::optional<JobOrder> job = ReceiveJob(file);
+    if (!job || !RefreshProcessorTime() || !Answered(*job, file.fd)) {
+      return 0;
+    }
+  }
+}
+
+int Convert(const Converter& converter, int parent) {
+  Doors doors;
+  doors.parent = parent;
+  doors.converter = &converter;
+  std::string error;
+  if (FindProgramFile(converter.name).empty()) {
+    return EXIT_PROGRAM;
+  }
+  if (!CloseDoors(doors, error)) {
+    return Complain(error, EXIT_DOORS);
+  }
+  BecomeConverter(converter, error);
+  return Complain(error, EXIT_PROGRAM);
+}
+
+// The number in `text`; 0: none.
+int ProcessNumber(std::string_view text) {
+  int number = 0;
+  const auto read = std::from_chars(text.data(), text.data() + text.size(), number);
+  return read.ec == std::errc() && read.ptr == text.data() + text.size() ? number : 0;
+}
+
+bool HasServiceSocket() {
+  int domain = 0;
+  socklen_t size = sizeof(domain);
+  return getsockopt(HELPER_SOCKET, SOL_SOCKET, SO_DOMAIN, &domain, &size) == 0 && domain == AF_UNIX;
+}
+
+int Main(int argc, char** argv) {
+  const std::string_view mode = argc > 1 ? argv[1] : "";
+  const int parent = ProcessNumber(argc > 2 ? argv[argc - 1] : "");
+  if (mode == SERVE_MODE && argc == 3 && parent > 0 && HasServiceSocket()) {
+    return Serve(parent);
+  }
+  const Converter* converter = mode == CONVERT_MODE && argc == 4 ? FindConverter(argv[2]) : nullptr;
+  if (converter != nullptr && parent > 0) {
+    return Convert(*converter, parent);
+  }
+  return Complain("is started by the content service, not by hand", EXIT_USAGE);
+}
+
+}  // namespace
+
+}  // namespace fileindexd
+
+int main(int argc, char** argv) {
+  // Not exit(): what libraries do at the end is of no use, and more than the doors let through.
+  int code = 1;
+  try {
+    code = fileindexd::Main(argc, argv);
+  } catch (const std::exception& error) {
+    code = fileindexd::Complain(error.what(), code);
+  }
+  (void)fflush(stderr);
+  _exit(code);
+}
