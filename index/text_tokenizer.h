@@ -26,6 +26,11 @@ constexpr const char* NO_LANGUAGE = "none";  // no stems
 // code.
 int RegisterTextTokenizer(sqlite3* db);
 
+// One word of a question in the full-text tables' own language: a quoted literal there, so that no
+// text of a user is taken for syntax. One that ends with '*' matches beginnings, as does a last
+// character of Han, kana or Hangul that stands alone.
+std::string TextQuery(std::string_view word);
+
 // The name under which a language is kept ("en" and "English" are "english"); empty: not known.
 std::string LanguageName(std::string_view given);
 std::vector<std::string> Languages();  // names, sorted, NO_LANGUAGE among them
