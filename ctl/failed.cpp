@@ -10,14 +10,15 @@ namespace fileindexd {
 
 namespace {
 
+// What could not be read at the first try is not tried again; what killed a helper is, once.
 std::string TriesText(int64_t tries) {
-  return tries == 1 ? "1 try" : std::to_string(tries) + " tries";
+  return tries > 1 ? " (" + std::to_string(tries) + " tries)" : "";
 }
 
 bool PutFailed(const Share& share, const FailedContent& failed, bool json, Json::Value& list) {
   if (!json) {
-    return PutLine(Printable(failed.path) + ": " + Printable(failed.reason) + " (" +
-                   TriesText(failed.tries) + ")");
+    return PutLine(Printable(failed.path) + ": " + Printable(failed.reason) +
+                   TriesText(failed.tries));
   }
 
   Json::Value object(Json::objectValue);

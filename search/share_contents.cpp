@@ -27,6 +27,7 @@ constexpr size_t COMMIT_BYTES = 8U << 20;
 constexpr milliseconds COMMIT_AGE(400);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
+constexpr seconds SHORTEST_REST(1);
 constexpr seconds LONGEST_REST(60);
 
 }  // namespace
@@ -284,10 +285,12 @@ bool ShareContents::IsFit(Time now) {
 }
 
 void ShareContents::RestForError(Time now) {
+  // A database was taken away while it was open: the next opening tells which.
   if (writer.Error() == IndexError::PATH_NOT_FOUND) {
     Forget();
     look_at_all = true;
-    is_missing = true;
+    has_news = true;
+    rest_until = now + SHORTEST_REST;
     return;
   }
   Rest(now, IndexErrorText(writer.Error()));
@@ -304,7 +307,7 @@ void ShareContents::Rest(Time now, const std::string& reason) {
   }
   Forget();
   has_news = true;
-  rest = std::clamp(rest * 2, seconds(1), LONGEST_REST);
+  rest = std::clamp(rest * 2, SHORTEST_REST, LONGEST_REST);
   rest_until = now + rest;
 }
 
