@@ -18,6 +18,8 @@ using std::chrono::seconds;
 
 // A database is written in many small pieces: between two readings of the events some gather.
 constexpr milliseconds BETWEEN_READINGS(20);
+// What is written into a database's log is told of at once, and counts only when the disk has it.
+constexpr milliseconds RELOAD_AGAIN(500);
 // For what no watch could be set on.
 constexpr seconds BETWEEN_LOOKS(60);
 constexpr seconds LONGEST_POOL_REST(60);
@@ -71,7 +73,7 @@ void ContentLoop::AddPolled(std::vector<pollfd>& polled, Time now) const {
 }
 
 Time ContentLoop::Due(Time now) const {
-  Time due = watches.HasGaps() ? next_look : Time::max();
+  Time due = watches.HasGaps() ? std::min(next_look, next_reload) : next_reload;
   if (hints.Any()) {
     return now;
   }
@@ -144,6 +146,10 @@ void ContentLoop::Listen(Time now) {
 
   if (std::exchange(hints.everything, false)) {
     Reload();
+    next_reload = now + RELOAD_AGAIN;
+  } else if (now >= next_reload) {
+    Reload();
+    next_reload = Time::max();
   }
   for (const std::string& name : std::exchange(hints.remade, {})) {
     const auto found = shares.find(name);

@@ -84,6 +84,7 @@ class ContentLoop {
   std::map<uint64_t, std::string> owner;  // share, by job
   std::string last_share;                 // that was given a turn
   Time next_listen;
+  Time next_reload = Time::max();
   Time next_look;  // where something could not be watched
 };
 

@@ -2,6 +2,7 @@
 #include "search/share_contents.h"
 
 #include <algorithm>
+#include <iterator>
 #include <utility>
 
 #include "search/log.h"
@@ -21,6 +22,8 @@ constexpr size_t TAKE_IN_ROWS = 1000;
 constexpr size_t SWEEP_ROWS = 500;
 // A busy daemon commits many times a second: one look serves them all.
 constexpr milliseconds BETWEEN_LOOKS(100);
+// What is written into a database's log is told of at once, and counts only when the disk has it.
+constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000)};
 constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
 // Bigger transactions cost memory and gain nothing.
 constexpr size_t COMMIT_BYTES = 8U << 20;
@@ -57,6 +60,7 @@ void ShareContents::Set(const Share& current, bool has_no_space, bool wants_retr
 
 void ShareContents::EntriesChanged() {
   has_news = true;
+  later_looks = 0;
   is_missing = false;
 }
 
@@ -75,8 +79,8 @@ bool ShareContents::CanWork(Time now) const {
 }
 
 bool ShareContents::IsIdle() const {
-  return !has_news && !look_at_all && !is_sweeping && !may_have_jobs && ready.empty() &&
-         running.empty() && !retry_wanted && !writer.HasChanges();
+  return !has_news && later_look == Time::max() && !look_at_all && !is_sweeping && !may_have_jobs &&
+         ready.empty() && running.empty() && !retry_wanted && !writer.HasChanges();
 }
 
 void ShareContents::Work(Time now, int64_t wall) {
@@ -121,6 +125,7 @@ void ShareContents::Open(Time now) {
   }
 
   idle_since = now;
+  next_take_in = now;
   has_news = true;
   if (next_full_look == Time::max()) {
     next_full_look = now + BETWEEN_FULL_LOOKS;
@@ -147,6 +152,10 @@ bool ShareContents::TakeIn(Time now) {
     has_news = true;
     next_take_in = now;
   }
+  if (now >= later_look) {
+    has_news = true;
+    later_look = Time::max();
+  }
   if (!has_news || now < next_take_in) {
     return true;
   }
@@ -160,8 +169,16 @@ bool ShareContents::TakeIn(Time now) {
   if (!more) {
     is_sweeping = true;
     next_take_in = now + BETWEEN_LOOKS;
+    LookLater(now);
   }
   return true;
+}
+
+void ShareContents::LookLater(Time now) {
+  later_look = Time::max();
+  if (later_looks < std::size(LATER_LOOKS)) {
+    later_look = now + LATER_LOOKS[later_looks++];
+  }
 }
 
 bool ShareContents::Sweep(int64_t wall) {
@@ -253,6 +270,7 @@ Time ShareContents::Due() const {
   if (has_news) {
     due = std::min(due, next_take_in);
   }
+  due = std::min(due, later_look);
   if (!patient.empty()) {
     due = std::min(due, patient.begin()->first);
   }
@@ -330,6 +348,7 @@ void ShareContents::Forget() {
   may_have_jobs = false;
   is_sweeping = false;
   has_news = false;
+  later_look = Time::max();
 }
 
 }  // namespace fileindexd

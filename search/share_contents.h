@@ -85,6 +85,7 @@ class ShareContents {
   bool Flows() const;
   void Open(Time now);
   bool TakeIn(Time now);
+  void LookLater(Time now);
   bool Sweep(int64_t wall);
   bool Retry();
   bool ReleasePatient(Time now);
@@ -114,6 +115,8 @@ class ShareContents {
   bool retried = false;
   bool may_have_jobs = false;
   Time next_take_in;
+  Time later_look = Time::max();  // for what was told of before it could be seen
+  size_t later_looks = 0;         // since the last news
   Time next_full_look = Time::max();
   Time idle_since;
   std::optional<Time> first_change;  // that is not committed
