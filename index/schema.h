@@ -50,4 +50,6 @@ extern const char* const ENTRIES_SCHEMA;
   "entries.first_seen, entries.owner, entries.grp, entries.mode, entries.written, " \
   "entries.reread"
 
+constexpr int ENTRY_COLUMN_COUNT = 16;
+
 }  // namespace fileindexd

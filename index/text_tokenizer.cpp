@@ -325,13 +325,38 @@ int RegisterTextTokenizer(sqlite3* db) {
   return api->xCreateTokenizer(api, TEXT_TOKENIZER, nullptr, &functions, nullptr);
 }
 
+struct TextCutter::Impl {
+  explicit Impl(const std::string& language) : tokenizer(language) {}
+  Tokenizer tokenizer;
+};
+
+TextCutter::TextCutter(const std::string& language) : impl(std::make_unique<Impl>(language)) {}
+
+TextCutter::~TextCutter() = default;
+
+void TextCutter::Cut(std::string_view text, bool is_question, const Visit& visit) {
+  const Emit emit = [](void* to, int /*flags*/, const char* word, int size, int start, int end) {
+    const auto& visitor = *static_cast<const Visit*>(to);
+    const bool more = visitor(std::string_view(word, static_cast<size_t>(size)),
+                              static_cast<size_t>(start), static_cast<size_t>(end));
+    return more ? SQLITE_OK : SQLITE_DONE;
+  };
+  Visit kept = visit;
+  (void)impl->tokenizer.Run(&kept, is_question ? FTS5_TOKENIZE_QUERY : FTS5_TOKENIZE_DOCUMENT, text,
+                            emit);  // whether it was stopped does not count
+}
+
+bool IsBeginning(std::string_view word) {
+  return word.ends_with('*') || EndsInOnePaired(word);
+}
+
 std::string TextQuery(std::string_view word) {
   std::string query = "\"";
   for (const char c : word) {
     query.append(c == '"' ? 2 : 1, c);
   }
   query += '"';
-  return word.ends_with('*') || EndsInOnePaired(word) ? query + " *" : query;
+  return IsBeginning(word) ? query + " *" : query;
 }
 
 }  // namespace fileindexd

@@ -12,6 +12,8 @@
 
 #include <sqlite3.h>
 
+#include <functional>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -26,10 +28,29 @@ constexpr const char* NO_LANGUAGE = "none";  // no stems
 // code.
 int RegisterTextTokenizer(sqlite3* db);
 
+// The same words outside a table. One thread.
+class TextCutter {
+ public:
+  explicit TextCutter(const std::string& language);  // one of LanguageName
+  ~TextCutter();
+  TextCutter(const TextCutter&) = delete;
+  TextCutter& operator=(const TextCutter&) = delete;
+
+  // Visits each word with the bytes that it stands for, until `visit` returns false. Throws
+  // std::bad_alloc, and nothing else.
+  using Visit = std::function<bool(std::string_view word, size_t start, size_t end)>;
+  void Cut(std::string_view text, bool is_question, const Visit& visit);
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl;
+};
+
 // One word of a question in the full-text tables' own language: a quoted literal there, so that no
 // text of a user is taken for syntax. One that ends with '*' matches beginnings, as does a last
 // character of Han, kana or Hangul that stands alone.
 std::string TextQuery(std::string_view word);
+bool IsBeginning(std::string_view word);  // whether it matches beginnings
 
 // The name under which a language is kept ("en" and "English" are "english"); empty: not known.
 std::string LanguageName(std::string_view given);

@@ -51,6 +51,9 @@ class StateStore {
   bool AddShare(const Share& share);
   bool RemoveShare(const std::string& name);  // with its folders and status
   bool SetShareFilesystem(const std::string& name, const std::string& filesystem);
+  // One that the words of contents know (see index/text_tokenizer.h): that is the caller's to
+  // check.
+  bool SetShareLanguage(const std::string& name, const std::string& language);
 
   // The share is that of the path. Adding a folder that is there fails, changing or removing one
   // that is not fails, and so does a pattern that is none (see excludes.h).

@@ -44,6 +44,7 @@ class StoreUpgradeTest : public StateTest {
     ASSERT_TRUE(store.GetSettings(settings)) << store.Error();
     ASSERT_EQ(settings->shares.size(), 1U);
     EXPECT_EQ(settings->shares[0].filesystem, "fs");
+    EXPECT_EQ(settings->shares[0].language, "english");
     ASSERT_EQ(settings->folders.size(), 1U);
     EXPECT_EQ(settings->folders[0].path, "/v/a/f");
     EXPECT_EQ(settings->folders[0].wanted, (ContentFlags{true, false, false, true}));
@@ -76,6 +77,15 @@ TEST_F(StoreUpgradeTest, WhatIsNewCanBeSetAfterAnUpgrade) {
   ShareStatus status;
   ASSERT_TRUE(OpenStore()->GetStatus("a", status));
   EXPECT_TRUE(status.accept_empty && status.retry_contents && status.needs_reindex);
+}
+
+TEST_F(StoreUpgradeTest, TheLanguageCanBeSetAfterAnUpgrade) {
+  ASSERT_TRUE(OpenStore()->SetShareLanguage("a", "german"));
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_EQ(settings->shares[0].language, "german");
+  EXPECT_FALSE(OpenStore()->SetShareLanguage("b", "german"));
 }
 
 TEST_F(StoreUpgradeTest, ACopyOfAnOlderVersionTakesTheDatabasesPlaceAndIsUpgraded) {
