@@ -221,6 +221,16 @@ void AddQuestions(Declarer& declare) {
   AddText(info, "PATH", into.path, "Any path");
   AddJson(info, into, "One JSON document");
 
+  CLI::App* failed = declare.Add(&declare.app, "failed", Failed,
+                                 "List the files whose content could not be read, and why");
+  failed
+      ->add_option_function<std::string>(
+          "SHARE", [&into](const std::string& given) { into.share = given; }, "Of that share alone")
+      ->check(NotEmpty())
+      ->type_name("");
+  failed->add_flag("--retry", into.retry, "Have all of them tried again");
+  AddJson(failed, into, "One JSON document");
+
   CLI::App* dump = declare.Add(&declare.app, "dump", Dump, "List every entry of a share's index");
   AddText(dump, "SHARE", into.share, "The share");
   CLI::Option* dump_json = AddJson(dump, into, "One JSON object a line");

@@ -41,6 +41,7 @@ struct Arguments {
   bool nul_ended = false;
   bool follow = false;
   bool wait = false;
+  bool retry = false;
 };
 
 using Command = int (*)(const Arguments& arguments);
@@ -68,6 +69,7 @@ int Status(const Arguments& arguments);
 int Search(const Arguments& arguments);
 int Dump(const Arguments& arguments);
 int Verify(const Arguments& arguments);
+int Failed(const Arguments& arguments);
 int Info(const Arguments& arguments);
 
 }  // namespace fileindexd

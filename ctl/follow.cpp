@@ -109,6 +109,7 @@ void Follower::Watch(const Settings& settings) {
   for (const Share& share : settings.shares) {
     (void)inotify_add_watch(changes.fd, ShareFolder(share.name).c_str(), FOLDER);
     (void)inotify_add_watch(changes.fd, IndexPath(share.name).c_str(), FOLDER);
+    (void)inotify_add_watch(changes.fd, ContentsPath(share.name).c_str(), FOLDER);
     (void)inotify_add_watch(changes.fd, share.path.c_str(),
                             ENTRIES | IN_DELETE_SELF | IN_MOVE_SELF);
   }

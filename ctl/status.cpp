@@ -11,6 +11,7 @@
 #include "ctl/status_report.h"
 #include "ctl/watches.h"
 #include "state/layout.h"
+#include "state/left_out.h"
 #include "state/pid_file.h"
 #include "state/queue_writer.h"
 
@@ -73,6 +74,7 @@ bool ReportShare(Session& session, const Share& share, pid_t daemon, ShareReport
   report.comparison = WorkAt(ComparisonProgressPath(share.name));
   LookAtFolders(*session.settings, report);
   ReadIndex(report);
+  report.contents = ReportContents(share.name, report.index.wanted);
   report.unwatched =
       report.has_folders && daemon > 0 && IsUnwatched(daemon, ShareFolder(share.name));
   report.root_emptied =
@@ -108,6 +110,7 @@ bool MakeReport(Session& session, const Watches& watches, StatusReport& report) 
   report = {};
   report.daemon = AliveByPidFile(DAEMON_PID_FILE, DAEMON_PROGRAM);
   report.paused_until = PausedUntil(resume_time);
+  report.left_out = ReadLeftOut();
   for (const Share& share : settings->shares) {
     ShareReport found;
     if (ReportShare(session, share, report.daemon, found)) {

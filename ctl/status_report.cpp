@@ -80,8 +80,7 @@ Json::Value ShareObject(const ShareReport& report) {
   }
   object["needs_reindex"] = report.needs_reindex;
   object["no_space"] = report.no_space;
-  object["contents_waiting"] = static_cast<Json::UInt64>(report.index.wanted);
-  object["contents_failed"] = 0;
+  AddContents(object, report.contents);
   AddWatch(object, report.watch);
   object["progress"] = WorkObject(report.work ? report.work : report.comparison);
   if (!report.index_problem.empty()) {
@@ -156,6 +155,9 @@ void AddShare(std::string& text, const ShareReport& report) {
   }
   AddLine(text, "waiting lines", std::to_string(report.waiting));
   AddLine(text, "entries", std::to_string(report.index.entries));
+  if (report.index.wanted > 0 || !report.contents.problem.empty()) {
+    AddLine(text, "contents", ContentsText(report.contents));
+  }
   AddLine(text, "last commit", last_commit == 0 ? "none" : LocalTime(last_commit));
   AddLine(text, "needs reindex", report.needs_reindex ? "yes" : "no");
   AddLine(text, "no space", report.no_space ? "yes" : "no");
@@ -177,6 +179,7 @@ Json::Value ReportObject(const StatusReport& report) {
   object["pid"] =
       report.daemon > 0 ? Json::Value(static_cast<Json::Int64>(report.daemon)) : Json::Value();
   object["paused_until"] = NumberOrNull(report.paused_until);
+  object["contents_left_out"] = report.left_out;
   object["shares"] = Json::arrayValue;
   for (const ShareReport& share : report.shares) {
     object["shares"].append(ShareObject(share));
@@ -193,6 +196,9 @@ std::string ReportText(const StatusReport& report) {
     text += "\npaused without end\n";
   } else {
     text += "\npaused until " + LocalTime(*report.paused_until) + "\n";
+  }
+  if (!report.left_out.empty()) {
+    text += "not read on this host: " + Printable(report.left_out) + "\n";
   }
   for (const ShareReport& share : report.shares) {
     AddShare(text, share);

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "ctl/contents_report.h"
 #include "ctl/places.h"
 #include "ctl/watch_report.h"
 #include "index/reader.h"
@@ -33,11 +34,13 @@ struct ShareReport {
   std::optional<ProgressRecord> work;        // of the Worker
   std::optional<ProgressRecord> comparison;  // of whoever compares
   WatchReport watch;
+  ContentsReport contents;
 };
 
 struct StatusReport {
   pid_t daemon = 0;                     // 0: it does not run
   std::optional<int64_t> paused_until;  // none: not paused; 0: without end
+  std::string left_out;                 // what is not read on this host; empty: nothing
   std::vector<ShareReport> shares;
 };
 

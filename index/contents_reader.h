@@ -30,6 +30,11 @@ struct FailedContent {
   int64_t tries = 0;
 };
 
+// Attaches the share's contents to its open entries as "contents", with all that questions need.
+// PATH_NOT_FOUND: nothing was read out of the share's files yet. The entries stay usable whatever
+// comes.
+IndexError AttachContents(IndexDatabase& entries, const std::string& share_name);
+
 class ContentsReader {
  public:
   // PATH_NOT_FOUND: nothing was read out of the share's files yet.

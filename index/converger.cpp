@@ -98,7 +98,8 @@ IndexError Converger::CheckMount(const Look& look) {
 
 IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
                               const std::string& path, const ContentFlags& wanted,
-                              const ContentFlags& decide, const Look* seen) {
+                              const ContentFlags& decide, const Look* seen, bool added) {
+  added_path = added ? &path : nullptr;
   settings = &in_force;
   share = &in_share;
   sql_failed = false;
@@ -201,7 +202,11 @@ IndexError Converger::Change(const Entry& known, const Look& look, const Content
   if (IsSame(known, seen)) {
     return IndexError::NONE;
   }
-  const IndexError error = Sql(table.Update(seen));
+  const bool reread = added_path != nullptr && known.path == *added_path && !replaced &&
+                      known.size == seen.size && known.mtime == seen.mtime &&
+                      known.ctime != seen.ctime;
+  seen.reread = replaced ? 0 : known.reread;
+  const IndexError error = Sql(table.Update(seen, reread));
   if (error == IndexError::NONE) {
     outcome = replaced ? Outcome::REPLACED : Outcome::CHANGED;
   }

@@ -25,9 +25,11 @@ class Converger {
       : table(rows), between(between_slices) {}
 
   // `path` is normal and lies in `in_share`, one of `in_force`; both stay for the length of the
-  // call. `seen` as for EntryWriter::Refresh.
+  // call. `seen` as for EntryWriter::Refresh. `added`: somebody wrote to it, so the content counts
+  // as another when no more than the change time is.
   IndexError Refresh(const Settings& in_force, const Share& in_share, const std::string& path,
-                     const ContentFlags& wanted, const ContentFlags& decide, const Look* seen);
+                     const ContentFlags& wanted, const ContentFlags& decide, const Look* seen,
+                     bool added);
   IndexError Delete(const Settings& in_force, const Share& in_share, const std::string& path,
                     DeleteMode mode);
 
@@ -69,6 +71,7 @@ class Converger {
   const std::function<void()>& between;
   const Settings* settings = nullptr;  // of the operation that runs
   const Share* share = nullptr;
+  const std::string* added_path = nullptr;  // of the operation, if it is an add
   bool mount_known = false;
   uint64_t mount_id = 0;  // last mount and device that were seen below a sound root
   uint64_t device = 0;

@@ -9,6 +9,7 @@ namespace fileindexd {
 
 IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
                              const std::string& path, DeleteMode mode) {
+  added_path = nullptr;
   settings = &in_force;
   share = &in_share;
   sql_failed = false;

@@ -110,10 +110,10 @@ IndexError FindFile(const std::string& index_path, const std::string& file) {
 }
 
 // Whether the open database is ours. Cheap: two numbers and the schema's text.
-IndexError CheckSchema(sqlite3* db) {
+IndexError CheckSchema(sqlite3* db, const DatabaseForm& form) {
   int64_t application = 0;
   int64_t version = 0;
-  int64_t entries = 0;
+  int64_t answer = 0;
   int code = ReadNumber(db, "PRAGMA application_id", application);
   if (code == SQLITE_OK) {
     code = ReadNumber(db, "PRAGMA user_version", version);
@@ -121,17 +121,18 @@ IndexError CheckSchema(sqlite3* db) {
   if (code != SQLITE_OK) {
     return FromSqlite(code);
   }
-  if (application != ENTRIES_APPLICATION || version != ENTRIES_VERSION) {
+  if (application != form.application || version != form.version) {
     return IndexError::PATH_NOT_FOUND;
   }
 
-  code = ReadNumber(db, "SELECT entries FROM meta WHERE id = 1", entries);
+  code = ReadNumber(db, form.probe, answer);
   // Our numbers without our tables: somebody's knife.
   return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }
 
-IndexError OpenExisting(const std::string& index_path, const char* pragmas, sqlite3*& db) {
-  const std::string file = index_path + "/" + ENTRIES_FILE;
+IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
+                        const char* pragmas, sqlite3*& db) {
+  const std::string file = index_path + "/" + form.file;
   const IndexError found = FindFile(index_path, file);
   if (found != IndexError::NONE) {
     return found;
@@ -140,7 +141,10 @@ IndexError OpenExisting(const std::string& index_path, const char* pragmas, sqli
   IndexError error = FromSqlite(OpenFile(file, db));
   if (error == IndexError::NONE) {
     KeepLog(db);
-    error = CheckSchema(db);
+    error = CheckSchema(db, form);
+  }
+  if (error == IndexError::NONE && form.prepare != nullptr) {
+    error = FromSqlite(form.prepare(db));
   }
   if (error == IndexError::NONE) {
     error = FromSqlite(Execute(db, pragmas));
@@ -156,12 +160,12 @@ IndexError FromErrno() {
 }
 
 // Made under SQLite's own lock, with the file's mode set first: SQLite gives its log the same.
-IndexError CreateDatabase(const std::string& index_path) {
+IndexError CreateDatabase(const std::string& index_path, const DatabaseForm& form) {
   if (!MakeEmptyIndex(index_path)) {
     return FromErrno();
   }
 
-  const std::string file = index_path + "/" + ENTRIES_FILE;
+  const std::string file = index_path + "/" + form.file;
   ScopedFd made(open(file.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
   if (made.fd < 0 || fchmod(made.fd, 0600) != 0) {
     return FromErrno();
@@ -170,7 +174,10 @@ IndexError CreateDatabase(const std::string& index_path) {
 
   sqlite3* db = nullptr;
   int code = OpenFile(file, db);
-  for (const char* sql : {PRAGMAS_FOR_CREATING, "BEGIN EXCLUSIVE", ENTRIES_SCHEMA, "COMMIT",
+  if (code == SQLITE_OK && form.prepare != nullptr) {
+    code = form.prepare(db);
+  }
+  for (const char* sql : {PRAGMAS_FOR_CREATING, "BEGIN EXCLUSIVE", form.schema, "COMMIT",
                           "PRAGMA journal_mode = WAL"}) {
     if (code == SQLITE_OK) {
       code = Execute(db, sql);
@@ -238,9 +245,10 @@ const char* IndexErrorText(IndexError error) {
   return "unexpected error";
 }
 
-IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create) {
+IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create,
+                                         const DatabaseForm& form) {
   Close();
-  IndexError error = OpenExisting(index_path, PRAGMAS_FOR_WRITING, db);
+  IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db);
   if (error == IndexError::NONE && HasLostCommits(db)) {
     Close();
     error = IndexError::DAMAGED;
@@ -252,9 +260,9 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
     error = IndexError::PATH_NOT_FOUND;
   }
   if (error == IndexError::PATH_NOT_FOUND && create) {
-    error = CreateDatabase(index_path);
+    error = CreateDatabase(index_path, form);
     if (error == IndexError::NONE) {
-      error = OpenExisting(index_path, PRAGMAS_FOR_WRITING, db);
+      error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db);
     }
   }
 
@@ -264,9 +272,9 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
   return error;
 }
 
-IndexError IndexDatabase::OpenForReading(const std::string& index_path) {
+IndexError IndexDatabase::OpenForReading(const std::string& index_path, const DatabaseForm& form) {
   Close();
-  return OpenExisting(index_path, PRAGMAS_FOR_READING, db);
+  return OpenExisting(index_path, form, PRAGMAS_FOR_READING, db);
 }
 
 void IndexDatabase::Close() {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// The entries database of one share: its files, its schema, its opening.
+// The databases of one share, entries and contents: their files, their schemas, their opening.
 #pragma once
 
 #include <sqlite3.h>
@@ -25,7 +25,19 @@ enum class IndexError {
 IndexError FromSqlite(int code);
 const char* IndexErrorText(IndexError error);
 
-// A connection to INDEX/entries.db. Nothing throws.
+// What a database is known by, and how it is made.
+struct DatabaseForm {
+  const char* file;  // name in its folder
+  int64_t application;
+  int64_t version;
+  const char* schema;           // makes the tables in an empty database, and sets both numbers
+  const char* probe;            // an answer in one number that only our tables give
+  int (*prepare)(sqlite3* db);  // what the tables need of a connection; null: nothing
+};
+
+extern const DatabaseForm ENTRIES_FORM;
+
+// A connection to a share's database, that of the entries if nothing else is said. Nothing throws.
 class IndexDatabase {
  public:
   IndexDatabase() = default;
@@ -37,9 +49,10 @@ class IndexDatabase {
   // is made, and one that is there and cannot be used (another schema version, damaged, a directory
   // or a pipe in its place) is replaced. Without it these are PATH_NOT_FOUND, and a damaged one has
   // been set aside, one copy, at most once an hour.
-  IndexError OpenForWriting(const std::string& index_path, bool create);
+  IndexError OpenForWriting(const std::string& index_path, bool create,
+                            const DatabaseForm& form = ENTRIES_FORM);
   // For reading; never creates, moves or repairs anything.
-  IndexError OpenForReading(const std::string& index_path);
+  IndexError OpenForReading(const std::string& index_path, const DatabaseForm& form = ENTRIES_FORM);
   void Close();
 
   bool IsOpen() const { return db != nullptr; }

@@ -22,17 +22,6 @@ int64_t Now() {
   return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
 }
 
-void BindAttributes(Statement& statement, int column, const Entry& entry) {
-  for (const int64_t value :
-       {static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
-        static_cast<int64_t>(entry.content_wanted), static_cast<int64_t>(entry.inode), entry.size,
-        entry.mtime, entry.ctime, entry.birth_time, entry.first_seen,
-        static_cast<int64_t>(entry.owner), static_cast<int64_t>(entry.group),
-        static_cast<int64_t>(entry.mode), Now()}) {
-    statement.BindInt(column++, value);
-  }
-}
-
 }  // namespace
 
 PathRange::PathRange(const std::string& path) : first(path), end() {
@@ -52,7 +41,7 @@ void ReadEntry(const Statement& statement, Entry& entry) {
   entry.path = statement.Bytes(1);
   entry.thing = static_cast<Thing>(statement.Int(2));
   entry.kind = static_cast<Kind>(statement.Int(3));
-  entry.content_wanted = statement.Int(4) != 0;
+  entry.content_wanted = statement.Int(4) == 1;
   entry.inode = static_cast<uint64_t>(statement.Int(5));
   entry.size = statement.Int(6);
   entry.mtime = statement.Int(7);
@@ -63,6 +52,7 @@ void ReadEntry(const Statement& statement, Entry& entry) {
   entry.group = static_cast<uint32_t>(statement.Int(12));
   entry.mode = static_cast<uint32_t>(statement.Int(13));
   entry.written = statement.Int(14);
+  entry.reread = statement.Int(15);
 }
 
 int EntryTable::Prepare(sqlite3* db) {
@@ -70,8 +60,10 @@ int EntryTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&begin, "BEGIN IMMEDIATE"},
       {&commit, "COMMIT"},
-      {&read_meta, "SELECT entries, removed FROM meta WHERE id = 1"},
-      {&write_meta, "UPDATE meta SET entries = ?1, last_commit = ?2, removed = ?3 WHERE id = 1"},
+      {&read_meta, "SELECT entries, removed, last_written FROM meta WHERE id = 1"},
+      {&write_meta,
+       "UPDATE meta SET entries = ?1, last_commit = ?2, removed = ?3, last_written = ?4"
+       " WHERE id = 1"},
       {&free_pages, "PRAGMA freelist_count"},
       {&give_back, "PRAGMA incremental_vacuum(64)"},
       {&find, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1"},
@@ -88,12 +80,13 @@ int EntryTable::Prepare(sqlite3* db) {
        "AND (birth_time = ?3 OR birth_time = 0 OR ?3 = 0) AND (?4 = 0 OR ctime <> ?5)"},
       {&insert,
        "INSERT INTO entries(path, thing, kind, content_wanted, inode, size, mtime, ctime, "
-       "birth_time, first_seen, owner, grp, mode, written) VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, "
-       "?9, ?10, ?11, ?12, ?13, ?14)"},
+       "birth_time, first_seen, owner, grp, mode, written, reread) VALUES(?1, ?2, ?3, ?4, ?5, ?6, "
+       "?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15)"},
       {&update,
-       "UPDATE entries SET thing = ?2, kind = ?3, content_wanted = ?4, inode = ?5, size = ?6, "
-       "mtime = ?7, ctime = ?8, birth_time = ?9, first_seen = ?10, owner = ?11, grp = ?12, "
-       "mode = ?13, written = ?14 WHERE id = ?1"},
+       "UPDATE entries SET thing = ?2, kind = ?3, content_wanted = "
+       "CASE WHEN ?4 <> 0 THEN 1 WHEN content_wanted <> 0 THEN 2 ELSE 0 END, inode = ?5, "
+       "size = ?6, mtime = ?7, ctime = ?8, birth_time = ?9, first_seen = ?10, owner = ?11, "
+       "grp = ?12, mode = ?13, written = ?14, reread = ?15 WHERE id = ?1"},
       {&remove, "DELETE FROM entries WHERE id = ?1"},
       {&insert_name, "INSERT INTO names(rowid, name) VALUES(?1, ?2)"},
       {&insert_part, "INSERT INTO parts(rowid, name) VALUES(?1, ?2)"},
@@ -119,6 +112,7 @@ int EntryTable::Begin() {
   code = read_meta.Step();
   entries = code == SQLITE_ROW ? read_meta.Int(0) : 0;
   removed = code == SQLITE_ROW ? read_meta.Int(1) : 0;
+  last_written = code == SQLITE_ROW ? read_meta.Int(2) : 0;
   read_meta.Reset();
   if (code == SQLITE_ROW) {
     return SQLITE_OK;
@@ -132,6 +126,7 @@ int EntryTable::Commit(int64_t now) {
   write_meta.BindInt(1, entries);
   write_meta.BindInt(2, now);
   write_meta.BindInt(3, removed);
+  write_meta.BindInt(4, last_written);
   int code = write_meta.Run();
   if (code == SQLITE_OK) {
     code = GiveBackPages();
@@ -251,9 +246,27 @@ int EntryTable::StaleTwins(const Entry& entry, std::vector<std::string>& paths) 
   return CollectPaths(twins, paths);
 }
 
+// A clock that steps back must not hide a row from those who follow them in this order.
+int64_t EntryTable::NextStamp() {
+  last_written = std::max(Now(), last_written + 1);
+  return last_written;
+}
+
+void EntryTable::BindAttributes(Statement& statement, int column, const Entry& entry, bool reread) {
+  const int64_t stamp = NextStamp();
+  for (const int64_t value :
+       {static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
+        static_cast<int64_t>(entry.content_wanted), static_cast<int64_t>(entry.inode), entry.size,
+        entry.mtime, entry.ctime, entry.birth_time, entry.first_seen,
+        static_cast<int64_t>(entry.owner), static_cast<int64_t>(entry.group),
+        static_cast<int64_t>(entry.mode), stamp, reread ? stamp : entry.reread}) {
+    statement.BindInt(column++, value);
+  }
+}
+
 int EntryTable::Insert(const Entry& entry) {
   insert.BindBlob(1, entry.path);
-  BindAttributes(insert, 2, entry);
+  BindAttributes(insert, 2, entry, false);
   ++changes;
   int code = insert.Run();
   if (code != SQLITE_OK) {
@@ -266,9 +279,9 @@ int EntryTable::Insert(const Entry& entry) {
   return code == SQLITE_OK ? RunText(insert_part, id, entry.path) : code;
 }
 
-int EntryTable::Update(const Entry& entry) {
+int EntryTable::Update(const Entry& entry, bool reread) {
   update.BindInt(1, entry.id);
-  BindAttributes(update, 2, entry);
+  BindAttributes(update, 2, entry, reread);
   ++changes;
   return update.Run();
 }

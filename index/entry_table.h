@@ -52,7 +52,9 @@ class EntryTable {
   int OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths);
 
   int Insert(const Entry& entry);  // `id` does not count
-  int Update(const Entry& entry);  // by `id`; the path does not change
+  // By `id`; the path does not change. `reread`: the content may be another, though nothing but the
+  // change time tells.
+  int Update(const Entry& entry, bool reread);
   int Remove(const Entry& entry);  // by `id`; needs the path
   // In the order of their ids. The full-text tables collect changes in memory while ids ascend, and
   // write a segment at each one that does not: in the order of paths, which is not the order in
@@ -64,6 +66,8 @@ class EntryTable {
   sqlite3* handle = nullptr;
 
  private:
+  int64_t NextStamp();
+  void BindAttributes(Statement& statement, int column, const Entry& entry, bool reread);
   static int CollectPaths(Statement& statement, std::vector<std::string>& paths);
   int RunText(Statement& statement, int64_t id, const std::string& path);
   int GiveBackPages();
@@ -72,7 +76,8 @@ class EntryTable {
   Statement find, next, row, below, slice, twins, other_paths;
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
-  int64_t removed = 0;  // rows since room was last given back, the same
+  int64_t removed = 0;       // rows since room was last given back, the same
+  int64_t last_written = 0;  // of all rows there ever were, the same
 };
 
 }  // namespace fileindexd

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/name_tokens.h"
 
-#include "state/sqlite.h"
+#include "index/fts5_api.h"
 
 namespace fileindexd {
 
@@ -10,17 +10,6 @@ namespace {
 int Collect(void* context, int /*flags*/, const char* token, int size, int /*start*/, int /*end*/) {
   static_cast<std::vector<std::string>*>(context)->emplace_back(token, static_cast<size_t>(size));
   return SQLITE_OK;
-}
-
-fts5_api* ApiOf(sqlite3* db) {
-  fts5_api* api = nullptr;
-  Statement statement;
-  if (statement.Prepare(db, "SELECT fts5(?1)") != SQLITE_OK) {
-    return nullptr;
-  }
-  sqlite3_bind_pointer(statement.handle, 1, static_cast<void*>(&api), "fts5_api_ptr", nullptr);
-  (void)statement.Run();  // what counts is the pointer
-  return api;
 }
 
 }  // namespace
@@ -38,7 +27,7 @@ bool NameTokenizer::Open() {
     return false;
   }
 
-  fts5_api* api = ApiOf(db);
+  fts5_api* api = Fts5Of(db);
   void* context = nullptr;
   if (api == nullptr || api->xFindTokenizer(api, "unicode61", &context, &functions) != SQLITE_OK) {
     return false;

@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "index/entry_table.h"
+#include "index/text_tokenizer.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -86,7 +87,7 @@ bool QuestionWords::Read(const std::string& text, std::string& error) {
       continue;
     }
     const bool prefix = part.back() == '*';
-    words.push_back({part, prefix});
+    words.push_back({part, prefix, found});
     for (const std::string& token : found) {
       tokens.push_back({token});
     }
@@ -101,6 +102,39 @@ std::string QuestionWords::NamesQuery() const {
     query += (query.empty() ? "" : " AND ") + Quoted(word.text) + (word.prefix ? " *" : "");
   }
   return query;
+}
+
+std::string QuestionWords::NameQuery(size_t word) const {
+  return Quoted(words[word].text) + (words[word].prefix ? " *" : "");
+}
+
+std::string QuestionWords::ContentQuery(size_t word) const {
+  return TextQuery(words[word].text);
+}
+
+// As the full-text table finds it: all tokens in a row, the last one maybe a beginning.
+bool QuestionWords::Holds(const std::vector<std::string>& name, const Word& word) {
+  const size_t count = word.tokens.size();
+  for (size_t at = 0; at + count <= name.size(); ++at) {
+    bool same = true;
+    for (size_t i = 0; i < count && same; ++i) {
+      const bool beginning = word.prefix && i + 1 == count;
+      same = beginning ? name[at + i].starts_with(word.tokens[i]) : name[at + i] == word.tokens[i];
+    }
+    if (same) {
+      return true;
+    }
+  }
+  return false;
+}
+
+std::vector<bool> QuestionWords::InName(std::string_view name) const {
+  const std::vector<std::string> name_tokens = tokenizer.Tokens(name);
+  std::vector<bool> in_name;
+  for (const Word& word : words) {
+    in_name.push_back(Holds(name_tokens, word));
+  }
+  return in_name;
 }
 
 std::string QuestionWords::PartsQuery() const {

@@ -21,6 +21,14 @@ class QuestionWords {
   std::string NamesQuery() const;
   std::string PartsQuery() const;
 
+  // Word by word, those without a token left out: the same, and for contents' words.
+  size_t Count() const { return words.size(); }
+  const std::string& Text(size_t word) const { return words[word].text; }
+  std::string NameQuery(size_t word) const;
+  std::string ContentQuery(size_t word) const;
+  // Which of them the name holds.
+  std::vector<bool> InName(std::string_view name) const;
+
   // Whether the name holds the words that are no words to the tables ("++").
   bool HoldsSigns(std::string_view name) const;
   // Greater is better: the whole name, all words at its start, the share of it that they cover.
@@ -34,8 +42,10 @@ class QuestionWords {
   struct Word {
     std::string text;
     bool prefix = false;
+    std::vector<std::string> tokens;
   };
 
+  static bool Holds(const std::vector<std::string>& name, const Word& word);
   double Covered(const std::vector<std::string>& name) const;
 
   NameTokenizer tokenizer;

@@ -47,10 +47,11 @@ IndexError EntryReader::Open(const std::string& share_name) {
 bool EntryReader::Summarise(Summary& summary) {
   // Counting what is wanted reads its own small index alone.
   Statement statement;
-  if (statement.Prepare(database.db,
-                        "SELECT entries, last_commit,"
-                        " (SELECT count(*) FROM entries WHERE content_wanted <> 0)"
-                        " FROM meta WHERE id = 1") != SQLITE_OK ||
+  if (statement.Prepare(
+          database.db,
+          "SELECT entries, last_commit,"
+          " (SELECT count(*) FROM entries WHERE content_wanted <> 0 AND content_wanted = 1)"
+          " FROM meta WHERE id = 1") != SQLITE_OK ||
       statement.Step() != SQLITE_ROW) {
     return false;
   }

@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/schema.h"
 
+#include "index/database.h"
+
 namespace fileindexd {
 
-static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 2,
+static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 3,
               "numbers in the text below");
 
 // The full-text tables merge sixteen segments into one, a few pages at each commit: an entry is
@@ -26,9 +28,10 @@ CREATE TABLE entries(
   owner INTEGER NOT NULL,
   grp INTEGER NOT NULL,
   mode INTEGER NOT NULL,
-  written INTEGER NOT NULL);
+  written INTEGER NOT NULL,
+  reread INTEGER NOT NULL);
 CREATE INDEX entries_by_inode ON entries(inode);
-CREATE INDEX entries_wanted ON entries(id) WHERE content_wanted <> 0;
+CREATE INDEX entries_wanted ON entries(written, content_wanted) WHERE content_wanted <> 0;
 CREATE VIRTUAL TABLE names USING fts5(
   name, content='', columnsize=0, tokenize='unicode61 remove_diacritics 2');
 CREATE VIRTUAL TABLE parts USING fts5(
@@ -37,14 +40,25 @@ CREATE TABLE meta(
   id INTEGER PRIMARY KEY CHECK (id = 1),
   entries INTEGER NOT NULL,
   last_commit INTEGER NOT NULL,
-  removed INTEGER NOT NULL);
-INSERT INTO meta VALUES(1, 0, 0, 0);
+  removed INTEGER NOT NULL,
+  last_written INTEGER NOT NULL,
+  made INTEGER NOT NULL);
+INSERT INTO meta VALUES(1, 0, 0, 0, 0, random());
 INSERT INTO names(names, rank) VALUES('automerge', 16);
 INSERT INTO names(names, rank) VALUES('crisismerge', 64);
 INSERT INTO parts(parts, rank) VALUES('automerge', 16);
 INSERT INTO parts(parts, rank) VALUES('crisismerge', 64);
 PRAGMA application_id = 1179209285;
-PRAGMA user_version = 2;
+PRAGMA user_version = 3;
 )sql";
+
+const DatabaseForm ENTRIES_FORM = {
+    .file = ENTRIES_FILE,
+    .application = ENTRIES_APPLICATION,
+    .version = ENTRIES_VERSION,
+    .schema = ENTRIES_SCHEMA,
+    .probe = "SELECT entries FROM meta WHERE id = 1",
+    .prepare = nullptr,
+};
 
 }  // namespace fileindexd

@@ -6,22 +6,27 @@
 //   entries      one row for each thing that belongs
 //     id              rowid; the same number in `names` and `parts`
 //     path            BLOB, unique, normal path byte for byte; '/' sorts as a byte, so that what
-//     lies
-//                     below P is the range ("P/", "P0")
+//                     lies below P is the range ("P/", "P0")
 //     thing           1 file, 2 directory, 3 symbolic link
 //     kind            0 other, 1 document, 2 audio, 3 video, 4 photo, 5 folder
-//     content_wanted  0, 1
+//     content_wanted  0 no, 1 yes, 2 not any more: whoever keeps contents has to be told, and
+//     follows
+//                     rows that are not 0
 //     inode           64 bits, as a signed number
 //     size            bytes; 0 for a directory
 //     mtime ctime birth_time first_seen   nanoseconds since the epoch; mtime 0 for a directory,
 //                     birth_time 0 where the file system keeps none
 //     owner grp mode  as the system counts them
-//     written         nanoseconds since the epoch: when this row was last written
+//     written         nanoseconds since the epoch: when this row was last written. Each write has a
+//                     greater number than all before it, even if the clock steps back
+//     reread          the `written` of the last add that found the change time alone to be another:
+//                     the bytes may differ though size and mtime do not; 0: none
 //   names        words of the last path component, made valid UTF-8; no stored copy, so deleting
 //                needs the text that was inserted
 //   parts        the same text by trigrams, for substrings
-//   meta         one row: number of rows in `entries`, when the last commit was made (seconds), and
-//                how many rows were removed since room was last given back
+//   meta         one row: number of rows in `entries`, when the last commit was made (seconds), how
+//                many rows were removed since room was last given back, the greatest `written`, and
+//                a random number that tells this database from the one that was there before it
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizers or of the text that is given to them is a new version.
@@ -33,7 +38,7 @@ namespace fileindexd {
 
 constexpr const char* ENTRIES_FILE = "entries.db";
 constexpr int64_t ENTRIES_APPLICATION = 0x46494e45;
-constexpr int64_t ENTRIES_VERSION = 2;
+constexpr int64_t ENTRIES_VERSION = 3;
 
 // Makes the tables in an empty database, and sets both numbers.
 extern const char* const ENTRIES_SCHEMA;
@@ -42,6 +47,9 @@ extern const char* const ENTRIES_SCHEMA;
 #define FILEINDEX_ENTRY_COLUMNS                                                     \
   "entries.id, entries.path, entries.thing, entries.kind, entries.content_wanted, " \
   "entries.inode, entries.size, entries.mtime, entries.ctime, entries.birth_time, " \
-  "entries.first_seen, entries.owner, entries.grp, entries.mode, entries.written"
+  "entries.first_seen, entries.owner, entries.grp, entries.mode, entries.written, " \
+  "entries.reread"
+
+constexpr int ENTRY_COLUMN_COUNT = 16;
 
 }  // namespace fileindexd

@@ -8,11 +8,13 @@
 #include <vector>
 
 #include "index/entry.h"
+#include "index/snippet.h"
 
 namespace fileindexd {
 
-// All words must match a word of the name; a word that ends with '*' matches words that begin with
-// it. Letter case and accents do not count.
+// Each word must match a word of the name or of the content; one that ends with '*' matches words
+// that begin with it. Letter case and accents do not count; in contents other forms of the word
+// match too.
 struct Question {
   std::string text;
   std::optional<Kind> kind;
@@ -20,12 +22,15 @@ struct Question {
   std::vector<std::string> shares;  // names to ask
   uint64_t limit = 20;
   uint64_t offset = 0;
+  bool count_all = true;  // false: of very many hits by content, `total` counts the best alone
 };
 
 struct Hit {
   std::string share;
   Entry entry;
   double score = 0;  // greater is better
+  int64_t text = 0;  // rowid of its content, if it matches; 0: by its name alone
+  Snippet snippet;   // empty where the content shows none of the words
 };
 
 struct Answer {

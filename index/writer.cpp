@@ -49,7 +49,12 @@ bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
 }
 
 bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted, const Seen* seen) {
-  return Refresh(path, wanted, EVERY_KIND, seen);
+  EntryOperation operation;
+  operation.wanted = wanted;
+  operation.decide = EVERY_KIND;
+  operation.added = true;
+  last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation), seen); });
+  return last_error == IndexError::NONE;
 }
 
 bool EntryWriter::Delete(const std::string& path, DeleteMode mode) {
@@ -161,7 +166,8 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
   return operation.removal
              ? converger->Delete(*settings, *share, operation.path, operation.mode)
              : converger->Refresh(*settings, *share, operation.path, operation.wanted,
-                                  operation.decide, seen != nullptr ? &seen->look : nullptr);
+                                  operation.decide, seen != nullptr ? &seen->look : nullptr,
+                                  operation.added);
 }
 
 // Whether the share's folder is empty where it was not, and nobody said that this is wanted: what

@@ -40,7 +40,8 @@ class EntryWriter {
   // whatever the operation tells of.
   bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide,
                const Seen* seen = nullptr);
-  // Like Refresh with every kind decided.
+  // Like Refresh with every kind decided, of what somebody wrote to: where only its change time is
+  // another, its content counts as changed all the same.
   bool Add(const std::string& path, const ContentFlags& wanted, const Seen* seen = nullptr);
   bool Delete(const std::string& path, DeleteMode mode);
   // True when everything since the last good commit is durable.

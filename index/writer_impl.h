@@ -30,6 +30,7 @@ struct EntryOperation {
   DeleteMode mode = DeleteMode::ENTRY;
   ContentFlags wanted;
   ContentFlags decide;
+  bool added = false;
   bool applied = false;      // in the transaction that runs
   bool passed_over = false;  // in the replay that runs
 };

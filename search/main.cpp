@@ -2,16 +2,26 @@
 // talocontentsearchd: the content service. Started and stopped by the daemon; stays in the
 // foreground.
 #include <poll.h>
+#include <sys/resource.h>
 #include <sys/signalfd.h>
+#include <systemd/sd-daemon.h>
+#include <unistd.h>
 
+#include <algorithm>
+#include <array>
 #include <cerrno>
 #include <chrono>
+#include <climits>
 #include <csignal>
 #include <cstdio>
 #include <cstring>
+#include <ctime>
 #include <exception>
+#include <string>
+#include <thread>
+#include <vector>
 
-#include "search/follower.h"
+#include "search/content_loop.h"
 #include "search/log.h"
 #include "search/service.h"
 #include "state/instance.h"
@@ -19,13 +29,6 @@
 namespace fileindexd {
 
 namespace {
-
-using Clock = std::chrono::steady_clock;
-
-// A busy daemon commits many times a second: one look serves them all.
-constexpr std::chrono::seconds BETWEEN_STEPS(1);
-// For what no watch could be set on.
-constexpr std::chrono::seconds BETWEEN_LOOKS(60);
 
 int Complain(const std::string& error) {
   (void)fprintf(stderr, "%s: %s\n", SERVICE_PROGRAM, error.c_str());
@@ -51,39 +54,56 @@ int OpenSignals() {
   return signalfd(-1, &ending, SFD_CLOEXEC);
 }
 
-int MillisecondsUntil(Clock::time_point time) {
-  const auto left = std::chrono::ceil<std::chrono::milliseconds>(time - Clock::now());
-  return left.count() > 0 ? static_cast<int>(left.count()) : 0;
+// A file for each helper, some for each share, and some to be given out next.
+void RaiseDescriptorLimit() {
+  rlimit limit = {};
+  if (getrlimit(RLIMIT_NOFILE, &limit) == 0) {
+    limit.rlim_cur = limit.rlim_max;
+    (void)setrlimit(RLIMIT_NOFILE, &limit);  // as good as it gets
+  }
+}
+
+// The helper beside this program, or where it is installed.
+std::string HelperPath() {
+  std::array<char, PATH_MAX> own = {};
+  const ssize_t size = readlink("/proc/self/exe", own.data(), own.size());
+  std::string folder(own.data(), size > 0 ? static_cast<size_t>(size) : 0);
+  folder.erase(std::min(folder.rfind('/'), folder.size()));
+  for (const char* place : {"/", "/../libexec/", "/../libexec/fileindexd/"}) {
+    std::string path = folder + place + HELPER_PROGRAM;
+    if (access(path.c_str(), X_OK) == 0) {
+      return path;
+    }
+  }
+  return folder + "/" + HELPER_PROGRAM;
+}
+
+// -1: for ever.
+int MillisecondsUntil(Time due, Time now) {
+  if (due == Time::max()) {
+    return -1;
+  }
+  const auto left = std::chrono::ceil<std::chrono::milliseconds>(due - now).count();
+  return static_cast<int>(std::clamp<int64_t>(left, 0, INT_MAX));
 }
 
 // Until a signal comes.
-int Follow(Follower& follower, int signal_fd) {
-  Clock::time_point next_step = Clock::now();
-  Clock::time_point next_look = next_step + BETWEEN_LOOKS;
-  pollfd waiting[] = {{signal_fd, POLLIN, 0}, {follower.watches.inotify.fd, POLLIN, 0}};
-
+int Follow(ContentLoop& loop, int signal_fd) {
+  std::vector<pollfd> polled;
   while (true) {
-    // With work at hand the events wait as well: one step takes in all that came until it begins.
-    const bool has_work = follower.HasWork();
-    const int ready =
-        poll(waiting, has_work ? 1 : 2, MillisecondsUntil(has_work ? next_step : next_look));
-    if (ready < 0 && errno != EINTR) {
+    const Time before = Clock::now();
+    polled = {{signal_fd, POLLIN, 0}};
+    loop.AddPolled(polled, before);
+    const int timeout = MillisecondsUntil(loop.Due(before), before);
+    if (poll(polled.data(), polled.size(), timeout) < 0 && errno != EINTR) {
       return Complain(std::string("poll: ") + strerror(errno));
     }
-    if (ready > 0 && waiting[0].revents != 0) {
+    if (polled[0].revents != 0) {
+      loop.End();
       return 0;
     }
 
-    follower.Listen();
-    const Clock::time_point now = Clock::now();
-    if (now >= next_look) {
-      follower.LookAtAll();
-      next_look = now + BETWEEN_LOOKS;
-    }
-    if (follower.HasWork() && now >= next_step) {
-      follower.Step();
-      next_step = Clock::now() + BETWEEN_STEPS;
-    }
+    loop.Step(polled, Clock::now(), time(nullptr));
   }
 }
 
@@ -95,14 +115,17 @@ int Serve() {
   }
 
   Instance instance(SERVICE_PROGRAM, SERVICE_PID_FILE, SERVICE_LOCK_FILE);
-  Follower follower;
+  RaiseDescriptorLimit();
+  ContentLoop loop(
+      {.helpers = std::max(std::thread::hardware_concurrency(), 1U), .program = HelperPath()});
   std::string error;
-  if (!instance.Claim(error) || !follower.Start(error) || !instance.Announce(error)) {
+  if (!instance.Claim(error) || !loop.Start(error) || !instance.Announce(error)) {
     return Complain(error);
   }
 
+  (void)sd_notify(0, "READY=1");  // without a service manager nothing happens
   ServiceDebug("runs");
-  const int code = Follow(follower, signals.fd);
+  const int code = Follow(loop, signals.fd);
   ServiceDebug("ends");
   return code;
 }

@@ -7,8 +7,10 @@
 #include <cerrno>
 #include <cstdint>
 #include <cstring>
+#include <string_view>
 
 #include "search/log.h"
+#include "state/daemon_socket.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -20,6 +22,12 @@ constexpr uint32_t CAME_OR_WENT =
 // Only writing counts: closing does not, because readers open a database's files for writing too,
 // and our own look would wake us again.
 constexpr uint32_t CHANGED = CAME_OR_WENT | IN_MODIFY;
+
+constexpr uint32_t WENT = IN_DELETE | IN_MOVED_FROM;
+
+constexpr const char* PID_FOLDER = "/var/run";
+constexpr std::string_view DAEMON_PID_NAME =
+    std::string_view(DAEMON_PID_FILE).substr(std::string_view(PID_FOLDER).size() + 1);
 
 // Rounds of one Read. What is left comes with the next one.
 constexpr int MAX_READS = 64;
@@ -45,6 +53,7 @@ void Watches::Set(const Settings& settings) {
   // A parent before its child: what appears after the parent's watch is set raises an event.
   std::map<int, Target> kept;
   refused = false;
+  Add(PID_FOLDER, {Target::RUN, ""}, kept);
   Add(StateRoot(), {Target::ROOT, ""}, kept);
   Add(StateRoot() + "/shares", {Target::SHARES, ""}, kept);
   for (const Share& share : settings.shares) {
@@ -62,11 +71,11 @@ void Watches::Set(const Settings& settings) {
 }
 
 void Watches::Add(const std::string& path, const Target& target, std::map<int, Target>& kept) {
-  const bool holds_database = target.place == Target::ROOT || target.place == Target::INDEX;
-  const uint32_t mask = (holds_database ? CHANGED : CAME_OR_WENT) | IN_ONLYDIR | IN_DONT_FOLLOW;
-  // The state root itself may be named by a link.
-  const uint32_t links = target.place == Target::ROOT ? mask & ~IN_DONT_FOLLOW : mask;
-  const int watch = inotify_add_watch(inotify.fd, path.c_str(), links);
+  const bool is_given = target.place == Target::ROOT || target.place == Target::RUN;
+  const uint32_t wanted = is_given || target.place == Target::INDEX ? CHANGED : CAME_OR_WENT;
+  // The state root, and the folder of pid files, may be named by a link.
+  const uint32_t mask = wanted | IN_ONLYDIR | (is_given ? 0U : IN_DONT_FOLLOW);
+  const int watch = inotify_add_watch(inotify.fd, path.c_str(), mask);
   if (watch >= 0) {
     kept[watch] = target;
     return;
@@ -130,11 +139,19 @@ void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hi
       break;
     case Target::SHARE:
       hints.everything = hints.everything || name == "index";
+      if (name == "index" || (name == "contents" && (mask & WENT) != 0)) {
+        hints.remade.insert(target.share);
+      }
       break;
     case Target::INDEX:
-      if (IsDatabaseFile(name, "entries.db")) {
+      if (name == "entries.db" && (mask & CAME_OR_WENT) != 0) {
+        hints.remade.insert(target.share);
+      } else if (IsDatabaseFile(name, "entries.db")) {
         hints.shares.insert(target.share);
       }
+      break;
+    case Target::RUN:
+      hints.everything = hints.everything || name == DAEMON_PID_NAME;
       break;
   }
 }

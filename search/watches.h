@@ -1,10 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// inotify watches on the state folder and on the shares' indexes.
+// inotify watches on the state folder, on the shares' indexes, and on the daemon's pid file.
 //
 //   ROOT                      state.db changed, "shares" appeared
 //   ROOT/shares               a share's folder came or went
-//   ROOT/shares/NAME          its "index" came or went
-//   ROOT/shares/NAME/index    a commit
+//   ROOT/shares/NAME          its "index" came or went, its "contents" went
+//   ROOT/shares/NAME/index    a commit; the database came or went
+//   /var/run                  the daemon began
 //
 // One thread. Events are hints: whoever gets one looks at what is there.
 #pragma once
@@ -20,8 +21,11 @@ namespace fileindexd {
 
 // What events have told since the last look.
 struct Hints {
-  bool everything = false;       // shares or folders may have come or gone
+  bool everything = false;       // shares, folders, flags, the pause or the daemon may be others
   std::set<std::string> shares;  // a commit, by the share's name
+  std::set<std::string> remade;  // a database came or went, by the share's name
+
+  bool Any() const { return everything || !shares.empty() || !remade.empty(); }
 };
 
 class Watches {
@@ -31,17 +35,19 @@ class Watches {
 
   // Watches what there is to watch for these shares, and no longer what there is not. Folders that
   // are missing have their parents watched; a watch that the host refuses is left out, with one log
-  // line until it succeeds again: the caller looks from time to time in any case.
+  // line until it succeeds again: the caller looks from time to time while HasGaps.
   void Set(const Settings& settings);
 
   // Reads the events that are waiting, a bounded number of them, and adds what they tell.
   void Read(Hints& hints);
 
+  bool HasGaps() const { return refused; }
+
   ScopedFd inotify;
 
  private:
   struct Target {
-    enum { ROOT, SHARES, SHARE, INDEX } place;
+    enum { ROOT, SHARES, SHARE, INDEX, RUN } place;
     std::string share;  // name; of SHARE and INDEX
   };
 

@@ -2,6 +2,7 @@
 // Where everything lies on disk, and the form in which paths are compared.
 //
 //   ROOT/state.db                               shares, folders, flags
+//   ROOT/contents-left-out                      what is not read on this host
 //   ROOT/shares/NAME/TALO@file_index_queue      the share's queue file
 //   ROOT/shares/NAME/TALO@file_index_queue.tmp  its drained copy
 //   ROOT/shares/NAME/index/                     entries

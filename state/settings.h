@@ -23,8 +23,9 @@ struct ContentFlags {
 
 struct Share {
   std::string name;
-  std::string path;        // normal
-  std::string filesystem;  // identity on record, see filesystem.h
+  std::string path;                  // normal
+  std::string filesystem;            // identity on record, see filesystem.h
+  std::string language = "english";  // whose word forms are found together; "none": of none
 };
 
 struct IndexedFolder {

@@ -125,12 +125,12 @@ bool StateStore::Impl::HasRow(const char* sql, const std::string& key, bool& fou
 
 bool StateStore::Impl::LoadTables(Settings& settings) {
   Statement shares;
-  if (!Prepare(shares, "SELECT name, path, filesystem FROM share ORDER BY name")) {
+  if (!Prepare(shares, "SELECT name, path, filesystem, language FROM share ORDER BY name")) {
     return false;
   }
   int result = SQLITE_OK;
   while ((result = shares.Step()) == SQLITE_ROW) {
-    settings.shares.push_back({shares.Bytes(0), shares.Bytes(1), shares.Bytes(2)});
+    settings.shares.push_back({shares.Bytes(0), shares.Bytes(1), shares.Bytes(2), shares.Bytes(3)});
   }
   if (result != SQLITE_DONE) {
     return FailSql();
@@ -249,12 +249,14 @@ bool StateStore::AddShare(const Share& share) {
       }
     }
     Statement insert;
-    if (!impl->Prepare(insert, "INSERT INTO share VALUES(?, ?, ?)")) {
+    if (!impl->Prepare(insert,
+                       "INSERT INTO share(name, path, filesystem, language) VALUES(?, ?, ?, ?)")) {
       return Impl::Outcome::FAILED;
     }
     insert.BindBlob(1, share.name);
     insert.BindBlob(2, share.path);
     insert.BindText(3, share.filesystem);
+    insert.BindText(4, share.language);
     return impl->Done(impl->Run(insert));
   });
 }
@@ -281,17 +283,30 @@ bool StateStore::RemoveShare(const std::string& name) {
   return impl->ChangeSettings([&] { return impl->Remove(name); });
 }
 
+StateStore::Impl::Outcome StateStore::Impl::SetOfShare(const char* sql,
+                                                       const std::string& share_name,
+                                                       const std::string& text) {
+  Statement update;
+  if (!Prepare(update, sql)) {
+    return Outcome::FAILED;
+  }
+  update.BindText(1, text);
+  update.BindBlob(2, share_name);
+  return Done(Run(update) &&
+              (sqlite3_changes(connection->db) == 1 || Fail("there is no share " + share_name)));
+}
+
 bool StateStore::SetShareFilesystem(const std::string& name, const std::string& filesystem) {
   const std::lock_guard guard(impl->mutex);
   return impl->ChangeSettings([&] {
-    Statement update;
-    if (!impl->Prepare(update, "UPDATE share SET filesystem = ? WHERE name = ?")) {
-      return Impl::Outcome::FAILED;
-    }
-    update.BindText(1, filesystem);
-    update.BindBlob(2, name);
-    return impl->Done(impl->Run(update) && (sqlite3_changes(impl->connection->db) == 1 ||
-                                            impl->Fail("there is no share " + name)));
+    return impl->SetOfShare("UPDATE share SET filesystem = ? WHERE name = ?", name, filesystem);
+  });
+}
+
+bool StateStore::SetShareLanguage(const std::string& name, const std::string& language) {
+  const std::lock_guard guard(impl->mutex);
+  return impl->ChangeSettings([&] {
+    return impl->SetOfShare("UPDATE share SET language = ? WHERE name = ?", name, language);
   });
 }
 

@@ -26,6 +26,8 @@ struct ShareStatus {
   bool missing = false;         // the last opening of the index found no database
   bool rebuild_wanted = false;  // the next opening may create the database
   bool accept_empty = false;    // an empty root is what the user wants; set by tools
+  // What failed to be read is to be tried again; set by tools, cleared by the content service.
+  bool retry_contents = false;
 };
 
 class StateStore {
@@ -49,6 +51,9 @@ class StateStore {
   bool AddShare(const Share& share);
   bool RemoveShare(const std::string& name);  // with its folders and status
   bool SetShareFilesystem(const std::string& name, const std::string& filesystem);
+  // One that the words of contents know (see index/text_tokenizer.h): that is the caller's to
+  // check.
+  bool SetShareLanguage(const std::string& name, const std::string& language);
 
   // The share is that of the path. Adding a folder that is there fails, changing or removing one
   // that is not fails, and so does a pattern that is none (see excludes.h).

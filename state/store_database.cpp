@@ -23,7 +23,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int SCHEMA_VERSION = 2;
+constexpr int SCHEMA_VERSION = 4;
 constexpr int BUSY_WAIT_MS = 5000;
 constexpr std::chrono::milliseconds LOCK_WAIT(BUSY_WAIT_MS);
 constexpr std::chrono::milliseconds LOCK_NAP(5);
@@ -42,6 +42,8 @@ constexpr const char* UPGRADES[SCHEMA_VERSION] = {
     "CREATE TABLE exclude(folder BLOB NOT NULL, place INT NOT NULL, pattern BLOB NOT NULL,"
     " PRIMARY KEY(folder, place)) WITHOUT ROWID;"
     "ALTER TABLE status ADD COLUMN accept_empty INT NOT NULL DEFAULT 0;",
+    "ALTER TABLE share ADD COLUMN language TEXT NOT NULL DEFAULT 'english';",
+    "ALTER TABLE status ADD COLUMN retry_contents INT NOT NULL DEFAULT 0;",
 };
 
 enum class Opened { GOOD, DAMAGED, FAILED };

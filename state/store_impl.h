@@ -57,6 +57,8 @@ struct StateStore::Impl {
   bool WriteExcludes(const std::string& folder, const std::vector<std::string>& patterns);
   bool WriteFlags(const std::string& folder, const ContentFlags& wanted);
   Outcome Remove(const std::string& share_name);
+  // The statement takes the text and then the name.
+  Outcome SetOfShare(const char* sql, const std::string& share_name, const std::string& text);
   bool LoadStatus(const std::string& share, ShareStatus& status);
 
   std::mutex mutex;

@@ -17,13 +17,15 @@ ShareStatus ReadStatus(const Statement& row) {
   status.missing = row.Int(3) != 0;
   status.rebuild_wanted = row.Int(4) != 0;
   status.accept_empty = row.Int(5) != 0;
+  status.retry_contents = row.Int(6) != 0;
   return status;
 }
 
 bool IsSame(const ShareStatus& a, const ShareStatus& b) {
   return a.needs_reindex == b.needs_reindex && a.reindex_begun == b.reindex_begun &&
          a.no_space == b.no_space && a.missing == b.missing &&
-         a.rebuild_wanted == b.rebuild_wanted && a.accept_empty == b.accept_empty;
+         a.rebuild_wanted == b.rebuild_wanted && a.accept_empty == b.accept_empty &&
+         a.retry_contents == b.retry_contents;
 }
 
 }  // namespace
@@ -40,7 +42,7 @@ bool StateStore::Impl::LoadStatus(const std::string& share, ShareStatus& status)
   Statement ask;
   if (!Prepare(ask,
                "SELECT needs_reindex, reindex_begun, no_space, missing, rebuild_wanted,"
-               " accept_empty FROM status WHERE share = ?")) {
+               " accept_empty, retry_contents FROM status WHERE share = ?")) {
     return false;
   }
   ask.BindBlob(1, share);
@@ -73,8 +75,8 @@ bool StateStore::UpdateStatus(const std::string& share,
     Statement write;
     if (!impl->Prepare(write,
                        "INSERT OR REPLACE INTO status(share, needs_reindex, reindex_begun,"
-                       " no_space, missing, rebuild_wanted, accept_empty)"
-                       " VALUES(?, ?, ?, ?, ?, ?, ?)")) {
+                       " no_space, missing, rebuild_wanted, accept_empty, retry_contents)"
+                       " VALUES(?, ?, ?, ?, ?, ?, ?, ?)")) {
       return Impl::Outcome::FAILED;
     }
     write.BindBlob(1, share);
@@ -84,6 +86,7 @@ bool StateStore::UpdateStatus(const std::string& share,
     write.BindInt(5, after.missing ? 1 : 0);
     write.BindInt(6, after.rebuild_wanted ? 1 : 0);
     write.BindInt(7, after.accept_empty ? 1 : 0);
+    write.BindInt(8, after.retry_contents ? 1 : 0);
     return impl->Done(impl->Run(write));
   });
 }

@@ -9,6 +9,7 @@ import time
 LIMIT = 60.0  # seconds; far beyond what anything takes that works
 
 IN_ANY = 0x00000FFE  # all changes of a folder and of what is in it, but reading
+IN_CHANGE = 0x00000FC2  # the same without opening and closing: what a look itself does not raise
 IN_CLOEXEC = 0o2000000
 
 _libc = ctypes.CDLL(None, use_errno=True)
@@ -23,9 +24,9 @@ def _deepest_folder(path):
 class FolderWatch:
     """Tells when something happens in a folder. Watch first, then look, then wait."""
 
-    def __init__(self, folder):
+    def __init__(self, folder, mask=IN_ANY):
         self.fd = _libc.inotify_init1(IN_CLOEXEC)
-        if self.fd < 0 or _libc.inotify_add_watch(self.fd, os.fsencode(folder), IN_ANY) < 0:
+        if self.fd < 0 or _libc.inotify_add_watch(self.fd, os.fsencode(folder), mask) < 0:
             error = ctypes.get_errno()
             raise OSError(error, os.strerror(error), folder)
 
@@ -43,7 +44,7 @@ class FolderWatch:
         os.close(self.fd)
 
 
-def await_in_folder(path, condition, limit=LIMIT):
+def await_in_folder(path, condition, limit=LIMIT, mask=IN_ANY):
     """Waits until condition() holds, looking again at each change in the folder of `path`.
 
     False when it does not hold within the limit.
@@ -51,7 +52,7 @@ def await_in_folder(path, condition, limit=LIMIT):
     deadline = time.monotonic() + limit
     while True:
         folder = _deepest_folder(os.path.dirname(path))
-        with FolderWatch(folder) as watch:
+        with FolderWatch(folder, mask) as watch:
             while folder == _deepest_folder(os.path.dirname(path)):
                 if condition():
                     return True
@@ -70,6 +71,18 @@ def await_exit(pid, limit=LIMIT):
     finally:
         os.close(fd)
     return os.waitstatus_to_exitcode(os.waitpid(pid, 0)[1])
+
+
+def await_exit_of(pid, limit=LIMIT):
+    """True once a process that is nobody's child of ours has ended."""
+    try:
+        fd = os.pidfd_open(pid)
+    except ProcessLookupError:
+        return True
+    try:
+        return bool(select.select([fd], [], [], limit)[0])
+    finally:
+        os.close(fd)
 
 
 def children():

@@ -44,13 +44,14 @@ class StoreUpgradeTest : public StateTest {
     ASSERT_TRUE(store.GetSettings(settings)) << store.Error();
     ASSERT_EQ(settings->shares.size(), 1U);
     EXPECT_EQ(settings->shares[0].filesystem, "fs");
+    EXPECT_EQ(settings->shares[0].language, "english");
     ASSERT_EQ(settings->folders.size(), 1U);
     EXPECT_EQ(settings->folders[0].path, "/v/a/f");
     EXPECT_EQ(settings->folders[0].wanted, (ContentFlags{true, false, false, true}));
     ShareStatus status;
     ASSERT_TRUE(store.GetStatus("a", status)) << store.Error();
     EXPECT_TRUE(status.needs_reindex && status.missing);
-    EXPECT_FALSE(status.reindex_begun || status.accept_empty);
+    EXPECT_FALSE(status.reindex_begun || status.accept_empty || status.retry_contents);
     int64_t resume_time = 0;
     EXPECT_TRUE(store.GetPause(resume_time));
     EXPECT_EQ(resume_time, 77);
@@ -68,12 +69,23 @@ TEST_F(StoreUpgradeTest, TheFirstVersionKeepsAllThatItHolds) {
 
 TEST_F(StoreUpgradeTest, WhatIsNewCanBeSetAfterAnUpgrade) {
   const auto store = OpenStore();
-  ASSERT_TRUE(store->UpdateStatus("a", [](ShareStatus& status) { status.accept_empty = true; }))
-      << store->Error();
+  ASSERT_TRUE(store->UpdateStatus("a", [](ShareStatus& status) {
+    status.accept_empty = true;
+    status.retry_contents = true;
+  })) << store->Error();
 
   ShareStatus status;
   ASSERT_TRUE(OpenStore()->GetStatus("a", status));
-  EXPECT_TRUE(status.accept_empty && status.needs_reindex);
+  EXPECT_TRUE(status.accept_empty && status.retry_contents && status.needs_reindex);
+}
+
+TEST_F(StoreUpgradeTest, TheLanguageCanBeSetAfterAnUpgrade) {
+  ASSERT_TRUE(OpenStore()->SetShareLanguage("a", "german"));
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_EQ(settings->shares[0].language, "german");
+  EXPECT_FALSE(OpenStore()->SetShareLanguage("b", "german"));
 }
 
 TEST_F(StoreUpgradeTest, ACopyOfAnOlderVersionTakesTheDatabasesPlaceAndIsUpgraded) {

@@ -1,0 +1,34 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The texts of one file, as they are stored and as they are cut into words.
+//
+//   packed   a zstd frame with its content's size, of:
+//   content  field… text
+//   field    number(1) length(4, little-endian) bytes      number: a ContentField that holds text
+//   text     0(1) bytes, to the end
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "base/content.h"
+
+namespace fileindexd {
+
+// What goes into the columns of the full-text table. Depends on nothing but what is packed:
+// deleting gives the same words again.
+struct ContentWords {
+  std::string title;
+  std::string fields;
+  std::string_view text;  // the content's own
+
+  bool IsEmpty() const { return title.empty() && fields.empty() && text.empty(); }
+  size_t Length() const { return title.size() + fields.size() + text.size(); }
+};
+ContentWords WordsOf(const Content& content);
+
+// Empty when there is no memory.
+std::string PackTexts(const Content& content);
+// Sets the texts of `content`. False when the bytes are damaged, or memory ran out.
+bool UnpackTexts(std::string_view packed, Content& content);
+
+}  // namespace fileindexd

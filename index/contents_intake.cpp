@@ -1,0 +1,188 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What entries say is wanted, and what they do not say any more.
+#include <algorithm>
+
+#include "index/contents_writer_impl.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t DAY = 24 * 60 * 60;
+
+// Begins to wait, as if nothing had been tried.
+void WaitAnew(ContentFile& file) {
+  file.state = ContentState::WAITING;
+  file.tries = 0;
+  file.unended = 0;
+}
+
+}  // namespace
+
+bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
+  more = false;
+  if (!Ready() || !ReadyToFollow()) {
+    return false;
+  }
+
+  known_until = table->meta.seen;
+  std::vector<FollowedEntry> rows;
+  int code = entries.Next(table->meta.seen, static_cast<int64_t>(limit), rows);
+  if (code != SQLITE_OK) {
+    return DoneWithEntries(code);
+  }
+  for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
+    code = TakeInEntry(rows[i]);
+    table->meta.seen = rows[i].written;
+  }
+  more = rows.size() == limit;
+  if (code == SQLITE_OK && more) {
+    code = table->Begin();  // so many rows are not looked at twice for nothing
+  }
+  if (code == SQLITE_OK && !more && is_looking) {
+    code = LookOn(static_cast<int64_t>(limit - rows.size()), more);
+  }
+  if (code == SQLITE_OK && !more) {
+    code = table->Reword(more);
+  }
+  return Done(code);
+}
+
+int ContentsWriter::Impl::LookOn(int64_t limit, bool& more) {
+  std::vector<FollowedEntry> rows;
+  int code = entries.Next(looked, limit, rows);
+  for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
+    code = TakeInEntry(rows[i]);
+    looked = rows[i].written;
+  }
+  more = static_cast<int64_t>(rows.size()) == limit;
+  is_looking = more;
+  return code;
+}
+
+int ContentsWriter::Impl::TakeInEntry(const FollowedEntry& entry) {
+  ContentFile file;
+  bool found = false;
+  const int code = table->Find(entry.identity.inode, entry.identity.birth_time, file, found);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  if (!entry.is_wanted) {
+    return found ? DropUnwanted(file) : SQLITE_OK;
+  }
+  if (found) {
+    return file.identity == entry.identity ? TakeInKnown(entry, file) : TakeInChanged(entry, file);
+  }
+
+  file.identity = entry.identity;
+  file.ctime = entry.ctime;
+  file.kind = entry.kind;
+  return table->Insert(file);
+}
+
+// A rename, a new link and a change of mode move the change time, too: only what somebody wrote to
+// is read once more. A name that tells nothing does not take away what another one told.
+int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentFile& file) {
+  ContentFile now = file;
+  bool again = false;
+  if (entry.ctime != file.ctime && entry.reread > known_until) {
+    now.ctime = entry.ctime;
+    again = true;
+  }
+  now.ctime = std::max(now.ctime, entry.ctime);
+  now.unreferred_since = 0;
+  if (file.kind == Kind::OTHER && entry.kind != Kind::OTHER) {
+    now.kind = entry.kind;
+    again = again || (file.state == ContentState::DONE && file.found_kind == Kind::OTHER);
+  }
+  if (again) {
+    WaitAnew(now);
+    const auto handed = out.find(file.id);
+    if (handed != out.end()) {
+      handed->second.is_stale = true;
+    }
+  }
+  const bool same =
+      now.ctime == file.ctime && now.kind == file.kind && !again && file.unreferred_since == 0;
+  return same ? SQLITE_OK : table->Update(file, now);
+}
+
+// The row follows the file: what was read of its old bytes goes at once.
+int ContentsWriter::Impl::TakeInChanged(const FollowedEntry& entry, const ContentFile& file) {
+  // Of two links the one that was looked at earlier may still show the old state.
+  if (entry.ctime < file.ctime) {
+    Reference reference = Reference::NONE;
+    const int code = entries.Refer(file.identity, reference);
+    if (code != SQLITE_OK || reference == Reference::WANTED) {
+      return code;
+    }
+  }
+
+  ContentFile now = file;
+  now.identity = entry.identity;
+  now.ctime = entry.ctime;
+  now.kind = entry.kind;
+  now.extractor = 0;
+  now.unreferred_since = 0;
+  WaitAnew(now);
+  int code = table->SetContent(file, Content(), now);
+  code = code == SQLITE_OK ? table->SetReason(file.id, "") : code;
+  return code == SQLITE_OK ? table->Update(file, now) : code;
+}
+
+int ContentsWriter::Impl::DropUnwanted(const ContentFile& file) {
+  Reference reference = Reference::NONE;
+  const int code = entries.Refer(file.identity, reference);
+  return code == SQLITE_OK && reference == Reference::UNWANTED ? table->Remove(file) : code;
+}
+
+bool ContentsWriter::Impl::Sweep(int64_t now, size_t limit, bool& more) {
+  more = false;
+  if (!Ready() || !ReadyToFollow()) {
+    return false;
+  }
+
+  std::vector<ContentFile> files;
+  int code = table->Unreferred(now - DAY, static_cast<int64_t>(limit), files);
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+    code = SweepFile(files[i], now);
+  }
+  more = files.size() == limit;
+  if (code != SQLITE_OK || more || !is_sweeping) {
+    return Done(code);
+  }
+
+  const auto left = static_cast<int64_t>(limit - files.size());
+  code = table->Slice(swept, left, files);
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+    code = SweepFile(files[i], now);
+    swept = files[i].id;
+  }
+  more = static_cast<int64_t>(files.size()) == left;
+  is_sweeping = more;
+  return Done(code);
+}
+
+int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
+  Reference reference = Reference::NONE;
+  const int code = entries.Refer(file.identity, reference);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  if (reference == Reference::UNWANTED) {
+    return table->Remove(file);
+  }
+
+  ContentFile changed = file;
+  if (reference == Reference::WANTED) {
+    changed.unreferred_since = 0;
+  } else if (file.unreferred_since == 0 || file.unreferred_since > now) {
+    changed.unreferred_since = now;
+  } else if (now - file.unreferred_since >= DAY) {
+    return table->Remove(file);
+  }
+  return changed.unreferred_since == file.unreferred_since ? SQLITE_OK
+                                                           : table->Update(file, changed);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,163 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/contents_reader.h"
+
+#include <ctime>
+#include <vector>
+
+#include "index/content_functions.h"
+#include "index/content_text.h"
+#include "index/contents_schema.h"
+#include "index/text_tokenizer.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int FIRST_NUMBER_COLUMN = 7;  // of FILE_OF_ENTRY
+
+const char* StateText(ContentState state) {
+  switch (state) {
+    case ContentState::WAITING:
+      return "waiting";
+    case ContentState::DONE:
+      return "done";
+    case ContentState::FAILED:
+    case ContentState::QUARANTINED:
+      break;
+  }
+  return "failed";
+}
+
+std::string FileOfEntrySql() {
+  return "SELECT state, reason, found_kind, is_cut, sample, text,"
+         " (SELECT packed FROM contents.texts WHERE id = text), " +
+         std::string(NUMBER_COLUMNS) +
+         " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
+}
+
+bool ReadContent(const Statement& row, Content& content) {
+  content = {};
+  content.kind = static_cast<Kind>(row.Int(2));
+  content.is_cut = row.Int(3) != 0;
+  content.sample = static_cast<uint64_t>(row.Int(4));
+  const auto last = static_cast<int>(ContentField::RATING);
+  for (int field = static_cast<int>(FIRST_NUMBER_FIELD); field <= last; ++field) {
+    const int column = FIRST_NUMBER_COLUMN + field - static_cast<int>(FIRST_NUMBER_FIELD);
+    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
+      content.numbers.push_back({static_cast<ContentField>(field), row.Int(column)});
+    }
+  }
+  return row.Int(5) == 0 || UnpackTexts(row.Bytes(6), content);
+}
+
+}  // namespace
+
+IndexError AttachContents(IndexDatabase& entries, const std::string& share_name) {
+  {
+    IndexDatabase trial;  // looks at everything that can be wrong with the files
+    const IndexError error = trial.OpenForReading(ContentsPath(share_name), CONTENTS_FORM);
+    if (error != IndexError::NONE) {
+      return error;
+    }
+  }
+
+  int code = RegisterTextTokenizer(entries.db);
+  code = code == SQLITE_OK ? RegisterContentFunctions(entries.db) : code;
+  Statement attach;
+  code = code == SQLITE_OK ? attach.Prepare(entries.db, "ATTACH ?1 AS contents") : code;
+  if (code != SQLITE_OK) {
+    return FromSqlite(code);
+  }
+  const std::string file = ContentsPath(share_name) + "/" + CONTENTS_FORM.file;
+  attach.BindText(1, file);
+  code = attach.Run();
+  if (code == SQLITE_OK) {
+    int persist = 1;
+    sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
+  }
+  return FromSqlite(code);
+}
+
+IndexError ContentsReader::Open(const std::string& share_name) {
+  const IndexError error = entries.OpenForReading(IndexPath(share_name));
+  return error == IndexError::NONE ? AttachContents(entries, share_name) : error;
+}
+
+bool ContentsReader::Count(ContentCounts& counts) {
+  Statement by_kind;
+  Statement rate;
+  if (by_kind.Prepare(entries.db, "SELECT kind, waiting, done, failed FROM contents.counts") !=
+          SQLITE_OK ||
+      rate.Prepare(entries.db,
+                   "SELECT ifnull(sum(done), 0) FROM contents.rate WHERE second > ?1") !=
+          SQLITE_OK) {
+    return false;
+  }
+
+  ContentCounts read;
+  int code = by_kind.Step();
+  for (; code == SQLITE_ROW; code = by_kind.Step()) {
+    const auto kind = static_cast<size_t>(by_kind.Int(0));
+    if (kind >= read.kinds.size()) {
+      continue;
+    }
+    ContentCounts::OfKind& of_kind = read.kinds[kind];
+    of_kind.waiting = static_cast<uint64_t>(by_kind.Int(1));
+    of_kind.done = static_cast<uint64_t>(by_kind.Int(2));
+    of_kind.failed = static_cast<uint64_t>(by_kind.Int(3));
+    read.all.waiting += of_kind.waiting;
+    read.all.done += of_kind.done;
+    read.all.failed += of_kind.failed;
+  }
+  rate.BindInt(1, static_cast<int64_t>(time(nullptr)) - 60);
+  if (code != SQLITE_DONE || rate.Step() != SQLITE_ROW) {
+    return false;
+  }
+  read.done_last_minute = static_cast<uint64_t>(rate.Int(0));
+  counts = read;
+  return true;
+}
+
+bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&)>& visit) {
+  Statement failed;
+  if (failed.Prepare(entries.db,
+                     "SELECT min(entries.path), files.reason, files.tries"
+                     " FROM contents.files AS files CROSS JOIN entries"
+                     " ON entries.inode = files.inode AND entries.birth_time = files.birth_time"
+                     " AND entries.size = files.size AND entries.mtime = files.mtime"
+                     " AND entries.content_wanted = 1"
+                     " WHERE files.state >= 2 GROUP BY files.id") != SQLITE_OK) {
+    return false;
+  }
+  int code = failed.Step();
+  for (; code == SQLITE_ROW; code = failed.Step()) {
+    if (!visit({failed.Bytes(0), failed.Bytes(1), failed.Int(2)})) {
+      return true;
+    }
+  }
+  return code == SQLITE_DONE;
+}
+
+bool ContentsReader::Find(const Entry& entry, Content& content, std::string& state,
+                          std::string& reason) {
+  Statement find;
+  if (find.Prepare(entries.db, FileOfEntrySql().c_str()) != SQLITE_OK) {
+    return false;
+  }
+  find.BindInt(1, static_cast<int64_t>(entry.inode));
+  find.BindInt(2, entry.birth_time);
+  find.BindInt(3, entry.size);
+  find.BindInt(4, entry.mtime);
+  Content read;
+  if (!entry.content_wanted || find.Step() != SQLITE_ROW || !ReadContent(find, read)) {
+    return false;
+  }
+  content = std::move(read);
+  state = StateText(static_cast<ContentState>(find.Int(0)));
+  reason = find.Bytes(1);
+  return true;
+}
+
+}  // namespace fileindexd

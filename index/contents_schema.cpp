@@ -1,0 +1,95 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/contents_schema.h"
+
+#include "index/text_tokenizer.h"
+
+namespace fileindexd {
+
+static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 1,
+              "numbers in the text below");
+
+namespace {
+
+// AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
+// What failed before comes last in the queue, so that it holds nothing else up.
+constexpr const char* CONTENTS_SCHEMA = R"sql(
+CREATE TABLE files(
+  id INTEGER PRIMARY KEY AUTOINCREMENT,
+  inode INTEGER NOT NULL,
+  birth_time INTEGER NOT NULL,
+  size INTEGER NOT NULL,
+  mtime INTEGER NOT NULL,
+  ctime INTEGER NOT NULL,
+  kind INTEGER NOT NULL,
+  found_kind INTEGER NOT NULL,
+  state INTEGER NOT NULL,
+  extractor INTEGER NOT NULL,
+  tries INTEGER NOT NULL,
+  unended INTEGER NOT NULL,
+  begun INTEGER NOT NULL,
+  unreferred_since INTEGER NOT NULL,
+  text INTEGER NOT NULL,
+  length INTEGER NOT NULL,
+  reason TEXT NOT NULL DEFAULT '',
+  is_cut INTEGER NOT NULL DEFAULT 0,
+  sample INTEGER NOT NULL DEFAULT 0,
+  pages INTEGER, created INTEGER, sent INTEGER, taken INTEGER, recorded INTEGER, year INTEGER,
+  track INTEGER, duration INTEGER, bit_rate INTEGER, width INTEGER, height INTEGER,
+  latitude INTEGER, longitude INTEGER, rating INTEGER,
+  UNIQUE(inode, birth_time));
+CREATE INDEX files_waiting ON files(tries, mtime DESC, size) WHERE state = 0;
+CREATE INDEX files_failed ON files(id) WHERE state >= 2;
+CREATE INDEX files_begun ON files(id) WHERE begun <> 0;
+CREATE INDEX files_unreferred ON files(unreferred_since) WHERE unreferred_since <> 0;
+CREATE INDEX files_by_text ON files(text, inode, birth_time, size, mtime) WHERE text <> 0;
+CREATE TABLE texts(id INTEGER PRIMARY KEY, packed BLOB NOT NULL);
+CREATE TABLE counts(
+  kind INTEGER PRIMARY KEY,
+  waiting INTEGER NOT NULL,
+  done INTEGER NOT NULL,
+  failed INTEGER NOT NULL);
+INSERT INTO counts VALUES(0, 0, 0, 0), (1, 0, 0, 0), (2, 0, 0, 0), (3, 0, 0, 0), (4, 0, 0, 0);
+CREATE TABLE rate(second INTEGER PRIMARY KEY, done INTEGER NOT NULL);
+CREATE TABLE meta(
+  id INTEGER PRIMARY KEY CHECK (id = 1),
+  filesystem TEXT NOT NULL,
+  language TEXT NOT NULL,
+  extractor INTEGER NOT NULL,
+  entries_made INTEGER NOT NULL,
+  seen INTEGER NOT NULL,
+  last_text INTEGER NOT NULL,
+  reworded INTEGER NOT NULL);
+INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807);
+PRAGMA application_id = 1179206479;
+PRAGMA user_version = 1;
+)sql";
+
+}  // namespace
+
+const DatabaseForm CONTENTS_FORM = {
+    .file = "contents.db",
+    .application = CONTENTS_APPLICATION,
+    .version = CONTENTS_VERSION,
+    .schema = CONTENTS_SCHEMA,
+    .probe = "SELECT last_text FROM meta WHERE id = 1",
+    .prepare = RegisterTextTokenizer,
+};
+
+const char* const NUMBER_COLUMNS =
+    "pages, created, sent, taken, recorded, year, track, duration, bit_rate, width, height, "
+    "latitude, longitude, rating";
+
+// The hash that collects words before they are written as a segment holds 8 MiB: fewer segments
+// to merge, which is what most of the time goes into.
+std::string WordsSchema(const std::string& language) {
+  return "DROP TABLE IF EXISTS words;"
+         "CREATE VIRTUAL TABLE words USING fts5(title, fields, text, content='', columnsize=0,"
+         " tokenize='" +
+         std::string(TEXT_TOKENIZER) + " " + language +
+         "');"
+         "INSERT INTO words(words, rank) VALUES('automerge', 16);"
+         "INSERT INTO words(words, rank) VALUES('crisismerge', 64);"
+         "INSERT INTO words(words, rank) VALUES('hashsize', 8388608)";
+}
+
+}  // namespace fileindexd

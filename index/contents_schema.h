@@ -1,0 +1,65 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Schema of the contents database, shared by all who read or write it.
+//
+//   CONTENTS/contents.db
+//
+//   files     one row for each file whose content is, or was, wanted
+//     id                rowid, never used again
+//     inode birth_time  the file; unique
+//     size mtime        with them its identity: what was read is the content of a file with exactly
+//                       these four
+//     ctime             as last seen
+//     kind              by the name of an entry; the entries' numbers
+//     found_kind        by the content; 0: not known, or nothing that is read
+//     state             ContentState
+//     extractor         version of the readers that read it last; 0: none did
+//     tries             how many ended with the death of whatever read it
+//     unended           how many began beside others and have no end on record: its fault or not
+//     begun             0 not in flight, 1 alone, 2 beside others
+//     reason            of the failure, one line
+//     is_cut, sample    as in Content
+//     unreferred_since  seconds since the epoch: found without an entry; 0: has one
+//     text              rowid in `texts` and `words`; 0: there is none
+//     length            bytes of its words
+//     pages … rating    the number fields; NULL: not known
+//   texts     the text fields and the text, packed (see content_text.h). Rowids ascend in the order
+//             of reading: the full-text table collects changes in memory only while they do
+//   words     the same by words: title, other fields, text. No stored copy, so deleting needs what
+//             was inserted. Made by the writer, as the share's language is among its arguments
+//   counts    for each kind (the found one, where it is known) how many files wait, are done and
+//             failed
+//   rate      for each second with commits of the last minute: how many files were done
+//   meta      one row: the share's file system (contents of another one say nothing), the language
+//             of the words, the version of the readers that what failed was tried with, the random
+//             number of the entries database that was followed and the greatest `written` seen in
+//             it, the last rowid in `texts`, and up to which of them there are words (all, unless
+//             the words are being made anew)
+//
+// application_id tells that a database is ours, user_version which schema it holds. A change of the
+// tables, of the tokenizer, or of the text that is given to it is a new version.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+#include "index/database.h"
+
+namespace fileindexd {
+
+constexpr int64_t CONTENTS_APPLICATION = 0x4649434f;
+constexpr int64_t CONTENTS_VERSION = 1;
+
+extern const DatabaseForm CONTENTS_FORM;
+
+// Numbers are stored.
+enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3 };
+
+constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being made anew
+
+// The columns of the number fields, in their order, separated by ", ".
+extern const char* const NUMBER_COLUMNS;
+
+// Makes the words anew, empty, for that language (one of IsLanguage).
+std::string WordsSchema(const std::string& language);
+
+}  // namespace fileindexd

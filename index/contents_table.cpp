@@ -1,0 +1,487 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/contents_table.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t FREE_PAGES_KEPT = 256;
+constexpr int64_t RATE_SECONDS = 60;
+constexpr size_t REWORD_BYTES = size_t{8} << 20;
+constexpr int64_t REWORD_ROWS = 500;
+constexpr size_t NUMBERS = 14;
+
+#define FILE_COLUMNS                                                                \
+  "id, inode, birth_time, size, mtime, ctime, kind, found_kind, state, extractor, " \
+  "tries, unended, begun, unreferred_since, text, length"
+
+void ReadFile(const Statement& row, ContentFile& file) {
+  file.id = row.Int(0);
+  file.identity.inode = static_cast<uint64_t>(row.Int(1));
+  file.identity.birth_time = row.Int(2);
+  file.identity.size = row.Int(3);
+  file.identity.mtime = row.Int(4);
+  file.ctime = row.Int(5);
+  file.kind = static_cast<Kind>(row.Int(6));
+  file.found_kind = static_cast<Kind>(row.Int(7));
+  file.state = static_cast<ContentState>(row.Int(8));
+  file.extractor = row.Int(9);
+  file.tries = row.Int(10);
+  file.unended = row.Int(11);
+  file.begun = row.Int(12);
+  file.unreferred_since = row.Int(13);
+  file.text = row.Int(14);
+  file.length = row.Int(15);
+}
+
+// All but the id, from column 2 on.
+void BindFile(Statement& statement, const ContentFile& file) {
+  int column = 2;
+  for (const int64_t value :
+       {static_cast<int64_t>(file.identity.inode), file.identity.birth_time, file.identity.size,
+        file.identity.mtime, file.ctime, static_cast<int64_t>(file.kind),
+        static_cast<int64_t>(file.found_kind), static_cast<int64_t>(file.state), file.extractor,
+        file.tries, file.unended, file.begun, file.unreferred_since, file.text, file.length}) {
+    statement.BindInt(column++, value);
+  }
+}
+
+int Execute(sqlite3* db, const std::string& sql) {
+  return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
+}
+
+std::string SetContentSql() {
+  std::string sql = "UPDATE files SET is_cut = ?2, sample = ?3, (" + std::string(NUMBER_COLUMNS);
+  sql += ") = (?4";
+  for (size_t i = 1; i < NUMBERS; ++i) {
+    sql += ", ?" + std::to_string(i + 4);
+  }
+  return sql + ") WHERE id = ?1";
+}
+
+}  // namespace
+
+int ContentsTable::Prepare(sqlite3* db) {
+  handle = db;
+  const std::string content_sql = SetContentSql();
+  const std::pair<Statement*, const char*> statements[] = {
+      {&find, "SELECT " FILE_COLUMNS " FROM files WHERE inode = ?1 AND birth_time = ?2"},
+      {&find_by_id, "SELECT " FILE_COLUMNS " FROM files WHERE id = ?1"},
+      {&waiting, "SELECT " FILE_COLUMNS
+                 " FROM files WHERE state = 0 ORDER BY tries, mtime DESC, size LIMIT ?1"},
+      {&failed,
+       "SELECT " FILE_COLUMNS " FROM files WHERE state >= 2 AND id > ?1 ORDER BY id LIMIT ?2"},
+      {&left_begun, "SELECT " FILE_COLUMNS " FROM files WHERE begun <> 0 LIMIT ?1"},
+      {&unreferred, "SELECT " FILE_COLUMNS
+                    " FROM files WHERE unreferred_since <> 0 AND unreferred_since <= ?1 LIMIT ?2"},
+      {&slice, "SELECT " FILE_COLUMNS " FROM files WHERE id > ?1 ORDER BY id LIMIT ?2"},
+      {&insert, "INSERT INTO files(" FILE_COLUMNS ") VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, "
+                "?10, ?11, ?12, ?13, ?14, ?15, ?16)"},
+      {&update,
+       "UPDATE files SET inode = ?2, birth_time = ?3, size = ?4, mtime = ?5, ctime = ?6, "
+       "kind = ?7, found_kind = ?8, state = ?9, extractor = ?10, tries = ?11, "
+       "unended = ?12, begun = ?13, unreferred_since = ?14, text = ?15, length = ?16 "
+       "WHERE id = ?1"},
+      {&set_reason, "UPDATE files SET reason = ?2 WHERE id = ?1 AND reason <> ?2"},
+      {&set_content, content_sql.c_str()},
+      {&remove, "DELETE FROM files WHERE id = ?1"},
+      {&insert_text, "INSERT INTO texts(id, packed) VALUES(?1, ?2)"},
+      {&read_text, "SELECT packed FROM texts WHERE id = ?1"},
+      {&next_texts, "SELECT id, packed FROM texts WHERE id > ?1 ORDER BY id LIMIT ?2"},
+      {&remove_text, "DELETE FROM texts WHERE id = ?1"},
+      {&write_meta,
+       "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
+       "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7 WHERE id = 1"},
+      {&write_counts,
+       "UPDATE counts SET waiting = waiting + ?2, done = done + ?3, "
+       "failed = failed + ?4 WHERE kind = ?1"},
+      {&write_rate,
+       "INSERT INTO rate VALUES(?1, ?2) "
+       "ON CONFLICT(second) DO UPDATE SET done = done + excluded.done"},
+      // Those of the future too: the clock was set back.
+      {&cut_rate, "DELETE FROM rate WHERE second <= ?1 - 60 OR second > ?1"},
+      {&free_pages, "PRAGMA freelist_count"},
+      {&give_back, "PRAGMA incremental_vacuum(256)"},
+  };
+  for (const auto& [statement, sql] : statements) {
+    const int code = statement->Prepare(db, sql);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+  }
+  return ReadMeta();
+}
+
+int ContentsTable::PrepareWords() {
+  const int code = insert_words.Prepare(
+      handle, "INSERT INTO words(rowid, title, fields, text) VALUES(?1, ?2, ?3, ?4)");
+  return code != SQLITE_OK
+             ? code
+             : remove_words.Prepare(handle,
+                                    "INSERT INTO words(words, rowid, title, fields, text) "
+                                    "VALUES('delete', ?1, ?2, ?3, ?4)");
+}
+
+int ContentsTable::MakeWords(const std::string& language) {
+  int code = Begin();
+  if (code == SQLITE_OK) {
+    code = Execute(handle, WordsSchema(language));
+  }
+  meta.language = language;
+  meta.reworded = meta.last_text == 0 ? ALL_WORDS : 0;
+  return code;
+}
+
+int ContentsTable::ReadMeta() {
+  Statement statement;
+  int code = statement.Prepare(handle,
+                               "SELECT filesystem, language, extractor, entries_made, seen, "
+                               "last_text, reworded FROM meta WHERE id = 1");
+  if (code == SQLITE_OK) {
+    code = statement.Step();
+  }
+  if (code != SQLITE_ROW) {
+    return code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+  }
+  meta.filesystem = statement.Bytes(0);
+  meta.language = statement.Bytes(1);
+  meta.extractor = statement.Int(2);
+  meta.entries_made = statement.Int(3);
+  meta.seen = statement.Int(4);
+  meta.last_text = statement.Int(5);
+  meta.reworded = statement.Int(6);
+  return SQLITE_OK;
+}
+
+int ContentsTable::Begin() {
+  changed = true;
+  return sqlite3_get_autocommit(handle) == 0 ? SQLITE_OK : Execute(handle, "BEGIN IMMEDIATE");
+}
+
+int ContentsTable::WriteMeta() {
+  write_meta.BindText(1, meta.filesystem);
+  write_meta.BindText(2, meta.language);
+  write_meta.BindInt(3, meta.extractor);
+  write_meta.BindInt(4, meta.entries_made);
+  write_meta.BindInt(5, meta.seen);
+  write_meta.BindInt(6, meta.last_text);
+  write_meta.BindInt(7, meta.reworded);
+  return write_meta.Run();
+}
+
+int ContentsTable::WriteCounts(int64_t now) {
+  int code = SQLITE_OK;
+  for (size_t kind = 0; kind < counted.size() && code == SQLITE_OK; ++kind) {
+    if (!counted[kind].IsZero()) {
+      write_counts.BindInt(1, static_cast<int64_t>(kind));
+      write_counts.BindInt(2, counted[kind].waiting);
+      write_counts.BindInt(3, counted[kind].done);
+      write_counts.BindInt(4, counted[kind].failed);
+      code = write_counts.Run();
+    }
+  }
+  if (code != SQLITE_OK || done_now == 0) {
+    return code;
+  }
+
+  cut_rate.BindInt(1, now);
+  write_rate.BindInt(1, now);
+  write_rate.BindInt(2, done_now);
+  code = cut_rate.Run();
+  return code == SQLITE_OK ? write_rate.Run() : code;
+}
+
+int ContentsTable::Commit(int64_t now) {
+  if (!changed) {
+    return SQLITE_OK;
+  }
+  int code = Begin();
+  for (const auto& step : {&ContentsTable::RemoveWords, &ContentsTable::WriteMeta}) {
+    code = code == SQLITE_OK ? (this->*step)() : code;
+  }
+  code = code == SQLITE_OK ? WriteCounts(now) : code;
+  if (code == SQLITE_OK && free_pages.Step() == SQLITE_ROW && free_pages.Int(0) > FREE_PAGES_KEPT) {
+    do {
+      code = give_back.Step();
+    } while (code == SQLITE_ROW);
+    give_back.Reset();
+    code = code == SQLITE_DONE ? SQLITE_OK : code;
+  }
+  free_pages.Reset();
+  code = code == SQLITE_OK ? Execute(handle, "COMMIT") : code;
+  if (code == SQLITE_OK) {
+    changed = false;
+    pending_bytes = 0;
+    done_now = 0;
+    counted = {};
+  }
+  return code;
+}
+
+// A failure has usually rolled back already, and then this one has nothing to do.
+void ContentsTable::Rollback() {
+  if (sqlite3_get_autocommit(handle) == 0) {
+    (void)Execute(handle, "ROLLBACK");
+  }
+  changed = false;
+  pending_bytes = 0;
+  done_now = 0;
+  counted = {};
+  leaving.clear();
+}
+
+int ContentsTable::Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found) {
+  find.BindInt(1, static_cast<int64_t>(inode));
+  find.BindInt(2, birth_time);
+  const int code = find.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    ReadFile(find, file);
+  }
+  find.Reset();
+  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int ContentsTable::FindById(int64_t id, ContentFile& file, bool& found) {
+  find_by_id.BindInt(1, id);
+  const int code = find_by_id.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    ReadFile(find_by_id, file);
+  }
+  find_by_id.Reset();
+  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int ContentsTable::ReadFiles(Statement& statement, std::vector<ContentFile>& files) {
+  files.clear();
+  int code = statement.Step();
+  for (; code == SQLITE_ROW; code = statement.Step()) {
+    ReadFile(statement, files.emplace_back());
+  }
+  statement.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int ContentsTable::Waiting(int64_t limit, std::vector<ContentFile>& files) {
+  waiting.BindInt(1, limit);
+  return ReadFiles(waiting, files);
+}
+
+int ContentsTable::Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
+  failed.BindInt(1, after);
+  failed.BindInt(2, limit);
+  return ReadFiles(failed, files);
+}
+
+int ContentsTable::LeftBegun(int64_t limit, std::vector<ContentFile>& files) {
+  left_begun.BindInt(1, limit);
+  return ReadFiles(left_begun, files);
+}
+
+int ContentsTable::Unreferred(int64_t until, int64_t limit, std::vector<ContentFile>& files) {
+  unreferred.BindInt(1, until);
+  unreferred.BindInt(2, limit);
+  return ReadFiles(unreferred, files);
+}
+
+int ContentsTable::Slice(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
+  slice.BindInt(1, after);
+  slice.BindInt(2, limit);
+  return ReadFiles(slice, files);
+}
+
+void ContentsTable::Count(const ContentFile& file, int64_t number) {
+  const Kind kind = file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
+  const auto place = static_cast<size_t>(kind);
+  CountOfKind& count = counted[place < counted.size() ? place : 0];
+  switch (file.state) {
+    case ContentState::WAITING:
+      count.waiting += number;
+      break;
+    case ContentState::DONE:
+      count.done += number;
+      break;
+    default:
+      count.failed += number;
+      break;
+  }
+}
+
+int ContentsTable::Insert(const ContentFile& file) {
+  int code = Begin();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  sqlite3_bind_null(insert.handle, 1);
+  BindFile(insert, file);
+  code = insert.Run();
+  if (code == SQLITE_OK) {
+    Count(file, 1);
+  }
+  return code;
+}
+
+int ContentsTable::Update(const ContentFile& before, const ContentFile& file) {
+  int code = Begin();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  update.BindInt(1, file.id);
+  BindFile(update, file);
+  code = update.Run();
+  if (code == SQLITE_OK) {
+    Count(before, -1);
+    Count(file, 1);
+  }
+  return code;
+}
+
+int ContentsTable::SetReason(int64_t id, const std::string& reason) {
+  const int code = Begin();
+  set_reason.BindInt(1, id);
+  set_reason.BindText(2, reason);
+  return code == SQLITE_OK ? set_reason.Run() : code;
+}
+
+int ContentsTable::SetContent(const ContentFile& before, const Content& content,
+                              ContentFile& file) {
+  int code = Begin();
+  if (code == SQLITE_OK && before.text != 0) {
+    code = RemoveContent(file);
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  file.found_kind = content.kind;
+  set_content.BindInt(1, before.id);
+  set_content.BindInt(2, content.is_cut ? 1 : 0);
+  set_content.BindInt(3, static_cast<int64_t>(content.sample));
+  for (size_t i = 0; i < NUMBERS; ++i) {
+    sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 4);
+  }
+  for (const NumberField& field : content.numbers) {
+    set_content.BindInt(4 + static_cast<int>(field.field) - static_cast<int>(FIRST_NUMBER_FIELD),
+                        field.number);
+  }
+  code = set_content.Run();
+  const ContentWords words = WordsOf(content);
+  if (code != SQLITE_OK || words.IsEmpty()) {
+    return code;
+  }
+
+  const std::string packed = PackTexts(content);
+  if (packed.empty()) {
+    return SQLITE_NOMEM;
+  }
+  file.text = ++meta.last_text;
+  insert_text.BindInt(1, file.text);
+  insert_text.BindBlob(2, packed);
+  code = insert_text.Run();
+  file.length = static_cast<int64_t>(words.Length());
+  pending_bytes += words.Length();
+  // Where words are being made anew, these are met on the way.
+  return code == SQLITE_OK && meta.reworded == ALL_WORDS ? AddWords(file.text, words) : code;
+}
+
+int ContentsTable::RemoveContent(ContentFile& file) {
+  if (file.text != 0) {
+    leaving.push_back(file.text);
+    pending_bytes += static_cast<size_t>(file.length);
+  }
+  file.text = 0;
+  file.length = 0;
+  return Begin();
+}
+
+int ContentsTable::Remove(const ContentFile& file) {
+  ContentFile emptied = file;
+  int code = RemoveContent(emptied);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  remove.BindInt(1, file.id);
+  code = remove.Run();
+  if (code == SQLITE_OK) {
+    Count(file, -1);
+  }
+  return code;
+}
+
+int ContentsTable::AddWords(int64_t text, const ContentWords& words) {
+  insert_words.BindInt(1, text);
+  insert_words.BindText(2, words.title);
+  insert_words.BindText(3, words.fields);
+  insert_words.BindText(4, words.text);
+  return insert_words.Run();
+}
+
+int ContentsTable::RemoveWords() {
+  std::sort(leaving.begin(), leaving.end());
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < leaving.size() && code == SQLITE_OK; ++i) {
+    code = RemoveWordsOf(leaving[i]);
+  }
+  leaving.clear();
+  return code;
+}
+
+int ContentsTable::RemoveWordsOf(int64_t text) {
+  Content content;
+  read_text.BindInt(1, text);
+  int code = read_text.Step();
+  const bool sound = code == SQLITE_ROW && UnpackTexts(read_text.Bytes(0), content);
+  read_text.Reset();
+  if (!sound) {
+    return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+  }
+
+  code = SQLITE_OK;
+  if (text <= meta.reworded) {
+    const ContentWords words = WordsOf(content);
+    remove_words.BindInt(1, text);
+    remove_words.BindText(2, words.title);
+    remove_words.BindText(3, words.fields);
+    remove_words.BindText(4, words.text);
+    code = remove_words.Run();
+  }
+  remove_text.BindInt(1, text);
+  return code == SQLITE_OK ? remove_text.Run() : code;
+}
+
+int ContentsTable::Reword(bool& more) {
+  more = meta.reworded != ALL_WORDS;
+  int code = more ? Begin() : SQLITE_OK;
+  if (code != SQLITE_OK || !more) {
+    return code;
+  }
+
+  next_texts.BindInt(1, meta.reworded);
+  next_texts.BindInt(2, REWORD_ROWS);
+  code = next_texts.Step();
+  more = code == SQLITE_ROW;
+  for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {
+    Content content;
+    const int64_t text = next_texts.Int(0);
+    if (!UnpackTexts(next_texts.Bytes(1), content)) {
+      code = SQLITE_CORRUPT;
+      break;
+    }
+    bytes += content.text.size();
+    pending_bytes += content.text.size();
+    code = AddWords(text, WordsOf(content));
+    meta.reworded = text;
+    code = code == SQLITE_OK ? next_texts.Step() : code;
+  }
+  next_texts.Reset();
+  if (!more && code == SQLITE_DONE) {
+    meta.reworded = ALL_WORDS;
+  }
+  return code == SQLITE_DONE || code == SQLITE_ROW ? SQLITE_OK : code;
+}
+
+}  // namespace fileindexd

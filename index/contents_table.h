@@ -1,0 +1,115 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Rows of a contents database: the writer's statements, prepared once for each connection.
+//
+// Results are SQLite's codes, SQLITE_OK for success. The first change begins a transaction. Words
+// are taken away at the commit, in the order of their rowids: the full-text table writes a segment
+// at each rowid that does not ascend. A failure leaves the transaction half done: the caller rolls
+// back.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "base/content.h"
+#include "index/content_text.h"
+#include "index/contents_schema.h"
+#include "index/contents_writer.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+// A row of `files` without what only readers want.
+struct ContentFile {
+  int64_t id = 0;
+  FileIdentity identity;
+  int64_t ctime = 0;
+  Kind kind = Kind::OTHER;
+  Kind found_kind = Kind::OTHER;
+  ContentState state = ContentState::WAITING;
+  int64_t extractor = 0;
+  int64_t tries = 0;
+  int64_t unended = 0;
+  int64_t begun = 0;
+  int64_t unreferred_since = 0;
+  int64_t text = 0;
+  int64_t length = 0;
+};
+
+struct ContentsMeta {
+  std::string filesystem;
+  std::string language;
+  int64_t extractor = 0;
+  int64_t entries_made = 0;
+  int64_t seen = 0;
+  int64_t last_text = 0;
+  int64_t reworded = ALL_WORDS;
+};
+
+class ContentsTable {
+ public:
+  // Reads `meta` too. There are no words yet in a database that was just made: MakeWords, and then
+  // PrepareWords.
+  int Prepare(sqlite3* db);
+  int PrepareWords();
+  int MakeWords(const std::string& language);  // all anew, from what is stored: see Reword
+
+  // Commit writes `meta`, and counts `done_now` files as done in that second.
+  int Begin();  // nothing, if a transaction is open
+  int Commit(int64_t now);
+  void Rollback();  // `meta` has to be read again
+  int ReadMeta();
+
+  int Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found);
+  int FindById(int64_t id, ContentFile& file, bool& found);
+  // Each of these gives up to `limit` rows.
+  int Waiting(int64_t limit, std::vector<ContentFile>& files);
+  int Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files);
+  int LeftBegun(int64_t limit, std::vector<ContentFile>& files);
+  int Unreferred(int64_t until, int64_t limit, std::vector<ContentFile>& files);
+  int Slice(int64_t after, int64_t limit, std::vector<ContentFile>& files);
+
+  int Insert(const ContentFile& file);
+  int Update(const ContentFile& before, const ContentFile& file);
+  int SetReason(int64_t id, const std::string& reason);
+  // In place of what was stored. Sets `text`, `length` and `found_kind` of `file`, which Update
+  // then writes; `before` is the row as it stands.
+  int SetContent(const ContentFile& before, const Content& content, ContentFile& file);
+  int RemoveContent(ContentFile& file);  // sets `text` and `length`
+  int Remove(const ContentFile& file);
+
+  // Makes words of stored texts, about 8 MiB. `more`: there are others.
+  int Reword(bool& more);
+
+  ContentsMeta meta;
+  bool changed = false;  // since the last commit, `meta` included
+  size_t pending_bytes = 0;
+  int64_t done_now = 0;
+  sqlite3* handle = nullptr;
+
+ private:
+  struct CountOfKind {
+    int64_t waiting = 0;
+    int64_t done = 0;
+    int64_t failed = 0;
+    bool IsZero() const { return waiting == 0 && done == 0 && failed == 0; }
+  };
+
+  int WriteMeta();
+  int WriteCounts(int64_t now);
+  void Count(const ContentFile& file, int64_t number);
+  int ReadFiles(Statement& statement, std::vector<ContentFile>& files);
+  int AddWords(int64_t text, const ContentWords& words);
+  int RemoveWords();
+  int RemoveWordsOf(int64_t text);
+
+  std::array<CountOfKind, 5> counted;  // since the last commit
+  std::vector<int64_t> leaving;        // rowids in `texts`
+  Statement find, find_by_id, waiting, failed, left_begun, unreferred, slice;
+  Statement insert, update, set_reason, set_content, remove;
+  Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
+  Statement write_meta, write_counts, write_rate, cut_rate, free_pages, give_back;
+};
+
+}  // namespace fileindexd

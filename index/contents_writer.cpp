@@ -1,0 +1,371 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/contents_writer.h"
+
+#include <algorithm>
+#include <ctime>
+#include <exception>
+#include <utility>
+
+#include "index/contents_writer_impl.h"
+#include "index/set_aside.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t MOST_TRIES = 2;
+constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file any more
+constexpr int ROUNDS = 8;
+
+int64_t Now() {
+  return static_cast<int64_t>(time(nullptr));
+}
+
+}  // namespace
+
+bool ContentsWriter::Impl::Guarded(const std::function<bool()>& step) {
+  try {
+    return step();
+  } catch (const std::exception&) {
+    CloseAll();
+    error = IndexError::NO_MEMORY;
+    return false;
+  }
+}
+
+bool ContentsWriter::Impl::Ready() {
+  if (!table.has_value() && error == IndexError::NONE) {
+    error = IndexError::OTHER;
+  }
+  return table.has_value();
+}
+
+// The entries database may have been made anew; it is then looked at from its beginning.
+bool ContentsWriter::Impl::ReadyToFollow() {
+  error = entries.EnsureOpen(share.name);
+  if (error != IndexError::NONE) {
+    return false;
+  }
+  if (entries.made != table->meta.entries_made) {
+    table->meta.entries_made = entries.made;
+    table->meta.seen = 0;
+    is_looking = false;
+    is_sweeping = true;
+    swept = 0;
+  }
+  return true;
+}
+
+bool ContentsWriter::Impl::Done(int code) {
+  if (code == SQLITE_OK) {
+    return true;
+  }
+  error = FromSqlite(code);
+  // `files` has its rows unique; a violation comes of damage.
+  error = error == IndexError::OTHER ? IndexError::DAMAGED : error;
+  CloseDatabase();
+  if (error == IndexError::DAMAGED) {
+    (void)SetAside(ContentsPath(share.name), "found at work");
+  }
+  return false;
+}
+
+// Nothing of the contents is to blame.
+bool ContentsWriter::Impl::DoneWithEntries(int code) {
+  if (code == SQLITE_OK) {
+    return true;
+  }
+  error = FromSqlite(code);
+  CloseAll();
+  return false;
+}
+
+bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+  jobs.clear();
+  if (!Ready() || !ReadyToFollow()) {
+    return false;
+  }
+
+  bool dropped = true;
+  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit; ++round) {
+    dropped = false;
+    std::vector<ContentFile> rows;
+    int code =
+        table->Waiting(static_cast<int64_t>(limit + out.size() + released.size()) + SLACK, rows);
+    // What was given back goes last: it may be given back again at once.
+    std::stable_partition(rows.begin(), rows.end(),
+                          [this](const ContentFile& file) { return !released.contains(file.id); });
+    for (size_t i = 0; i < rows.size() && code == SQLITE_OK && jobs.size() < limit; ++i) {
+      if (!out.contains(rows[i].id)) {
+        code = Offer(rows[i], jobs, dropped);
+      }
+    }
+    if (code != SQLITE_OK) {
+      return Done(code);
+    }
+  }
+  return true;
+}
+
+int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>& jobs,
+                                bool& dropped) {
+  ContentJob job;
+  int code = entries.Paths(file.identity, job.paths);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  if (!job.paths.empty()) {
+    job.file = file.id;
+    job.identity = file.identity;
+    job.kind = file.kind;
+    job.tries = file.tries + file.unended;
+    out[file.id] = {file.identity};
+    released.erase(file.id);
+    jobs.push_back(std::move(job));
+    return SQLITE_OK;
+  }
+
+  // No entry waits for it. Whatever stands for that file now is taken in anew.
+  dropped = true;
+  released.erase(file.id);
+  FollowedEntry latest;
+  bool found = false;
+  code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);
+  code = code == SQLITE_OK ? table->Remove(file) : code;
+  return code == SQLITE_OK && found ? TakeInEntry(latest) : code;
+}
+
+bool ContentsWriter::Impl::BeginTries(const std::vector<int64_t>& files) {
+  if (!Ready()) {
+    return false;
+  }
+  size_t in_flight = files.size();
+  for (const auto& [id, handed] : out) {
+    in_flight += handed.is_begun ? 1 : 0;
+  }
+  const int64_t begun = in_flight == 1 ? 1 : 2;
+
+  int code = SQLITE_OK;
+  if (begun == 2 && alone != 0) {
+    code = MarkBegun(alone, begun);
+  }
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+    code = MarkBegun(files[i], begun);
+    const auto handed = out.find(files[i]);
+    if (handed != out.end()) {
+      handed->second.is_begun = true;
+    }
+  }
+  alone = begun == 1 ? files.front() : 0;
+  return Done(code) && Commit();
+}
+
+int ContentsWriter::Impl::MarkBegun(int64_t id, int64_t begun) {
+  ContentFile file;
+  bool found = false;
+  const int code = table->FindById(id, file, found);
+  if (code != SQLITE_OK || !found) {
+    return code;
+  }
+  ContentFile marked = file;
+  marked.begun = begun;
+  return table->Update(file, marked);
+}
+
+int ContentsWriter::Impl::TakeBack(int64_t id, ContentFile& file, bool& found, bool& current) {
+  const auto handed = out.find(id);
+  found = false;
+  current = false;
+  if (handed == out.end()) {
+    return SQLITE_OK;
+  }
+  const HandedOut was = handed->second;
+  out.erase(handed);
+  alone = alone == id ? 0 : alone;
+  const int code = table->FindById(id, file, found);
+  current = found && was.identity == file.identity && !was.is_stale;
+  return code;
+}
+
+bool ContentsWriter::Impl::Finish(int64_t id, const Content& content) {
+  ContentFile file;
+  bool found = false;
+  bool current = false;
+  if (!Ready()) {
+    return false;
+  }
+  int code = TakeBack(id, file, found, current);
+  if (code != SQLITE_OK || !found) {
+    return Done(code);
+  }
+
+  ContentFile now = file;
+  now.begun = 0;
+  now.unended = 0;
+  if (current) {
+    now.state = ContentState::DONE;
+    now.tries = 0;
+    now.extractor = extractor;
+    code = table->SetContent(file, content, now);
+    code = code == SQLITE_OK ? table->SetReason(id, "") : code;
+    ++table->done_now;
+  }
+  return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+}
+
+bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
+                                bool killed) {
+  ContentFile file;
+  bool found = false;
+  bool current = false;
+  if (!Ready()) {
+    return false;
+  }
+  int code = TakeBack(id, file, found, current);
+  if (code != SQLITE_OK || !found) {
+    return Done(code);
+  }
+
+  ContentFile now = file;
+  now.begun = 0;
+  now.unended = 0;
+  if (current) {
+    now.tries += killed ? 1 : 0;
+    if (!killed || now.tries >= MOST_TRIES) {
+      now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
+      now.extractor = extractor;
+      code = table->SetContent(file, content, now);
+    }
+    code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
+  }
+  return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+}
+
+bool ContentsWriter::Impl::Release(int64_t id) {
+  ContentFile file;
+  bool found = false;
+  bool current = false;
+  if (!Ready()) {
+    return false;
+  }
+  const int code = TakeBack(id, file, found, current);
+  if (code != SQLITE_OK || !found) {
+    return Done(code);
+  }
+  released.insert(id);
+  if (file.begun == 0) {
+    return true;
+  }
+  ContentFile now = file;
+  now.begun = 0;
+  return Done(table->Update(file, now));
+}
+
+// A database that was removed is written into nowhere without an error, so the file is asked for
+// after the commit.
+bool ContentsWriter::Impl::Commit() {
+  if (!Ready()) {
+    return false;
+  }
+  if (!Done(table->Commit(Now()))) {
+    return false;
+  }
+  if (database.HasMoved()) {
+    error = IndexError::PATH_NOT_FOUND;
+    CloseDatabase();
+    return false;
+  }
+  return true;
+}
+
+ContentsWriter::ContentsWriter() : impl(std::make_unique<Impl>()) {}
+
+ContentsWriter::~ContentsWriter() {
+  impl->CloseAll();
+}
+
+IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
+  return impl->Guarded([&] { return impl->Open(share, extractor_version) == IndexError::NONE; })
+             ? IndexError::NONE
+             : impl->error;
+}
+
+// What was handed out is taken back: nobody will tell how it ended.
+void ContentsWriter::Close() {
+  if (IsOpen()) {
+    impl->table->Rollback();
+    (void)impl->Done(impl->table->ReadMeta());
+  }
+  while (IsOpen() && !impl->out.empty() && Release(impl->out.begin()->first)) {
+  }
+  if (IsOpen()) {
+    (void)Commit();
+  }
+  impl->out.clear();
+  impl->released.clear();
+  impl->alone = 0;
+  impl->CloseAll();
+}
+
+bool ContentsWriter::IsOpen() const {
+  return impl->table.has_value();
+}
+
+bool ContentsWriter::TakeIn(size_t limit, bool& more) {
+  return impl->Guarded([&] { return impl->TakeIn(limit, more); });
+}
+
+void ContentsWriter::LookAtAll() {
+  impl->is_looking = true;
+  impl->looked = 0;
+  impl->is_sweeping = true;
+  impl->swept = 0;
+}
+
+bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+  return impl->Guarded([&] { return impl->NextJobs(limit, jobs); });
+}
+
+bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
+  return impl->Guarded([&] { return impl->BeginTries(files); });
+}
+
+bool ContentsWriter::Finish(int64_t file, const Content& content) {
+  return impl->Guarded([&] { return impl->Finish(file, content); });
+}
+
+bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& found,
+                          bool killed) {
+  return impl->Guarded([&] { return impl->Fail(file, reason, found, killed); });
+}
+
+bool ContentsWriter::Release(int64_t file) {
+  return impl->Guarded([&] { return impl->Release(file); });
+}
+
+bool ContentsWriter::RetryFailed() {
+  return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->RetryAll(false)); });
+}
+
+bool ContentsWriter::Sweep(int64_t now, size_t limit, bool& more) {
+  return impl->Guarded([&] { return impl->Sweep(now, limit, more); });
+}
+
+bool ContentsWriter::HasChanges() const {
+  return IsOpen() && impl->table->changed;
+}
+
+size_t ContentsWriter::PendingBytes() const {
+  return IsOpen() ? impl->table->pending_bytes : 0;
+}
+
+bool ContentsWriter::Commit() {
+  return impl->Guarded([&] { return impl->Commit(); });
+}
+
+IndexError ContentsWriter::Error() const {
+  return impl->error;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,89 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The insides of ContentsWriter.
+//
+// DESIGN: entries are followed by their `written`, which grows with each write of a row: `seen` in
+// `meta` is how far, and commits with what was taken in. A removed entry leaves no trace there. So
+// a second, slower pass looks at everything again when it is asked to: first at every entry, for
+// what is missing, then (in Sweep) at every file, for what no entry refers to.
+//
+// What is handed out is known in memory, by row. A row that changes meanwhile keeps what it waits
+// for: the outcome of the old bytes is thrown away.
+#pragma once
+
+#include <functional>
+#include <map>
+#include <optional>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "index/contents_table.h"
+#include "index/contents_writer.h"
+#include "index/entry_follower.h"
+
+namespace fileindexd {
+
+struct ContentsWriter::Impl {
+  // contents_writer_open.cpp
+  IndexError Open(const Share& share, int64_t extractor_version);
+  IndexError TryOpen();
+  IndexError SetUp();
+  int Own();
+  int JudgeLeftBegun();
+  int RetryAll(bool old_only);
+  void CloseDatabase();
+  void CloseAll();
+
+  // contents_intake.cpp
+  bool TakeIn(size_t limit, bool& more);
+  int TakeInEntry(const FollowedEntry& entry);
+  int TakeInKnown(const FollowedEntry& entry, const ContentFile& file);
+  int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
+  int DropUnwanted(const ContentFile& file);
+  int LookOn(int64_t limit, bool& more);
+  bool Sweep(int64_t now, size_t limit, bool& more);
+  int SweepFile(const ContentFile& file, int64_t now);
+
+  // contents_writer.cpp
+  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs);
+  int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
+  bool BeginTries(const std::vector<int64_t>& files);
+  int MarkBegun(int64_t id, int64_t begun);
+  bool Finish(int64_t file, const Content& content);
+  bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
+  bool Release(int64_t file);
+  bool Commit();
+  // The row of a file that was handed out. `current`: its bytes are still those that are wanted.
+  int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
+
+  // Runs one operation. Memory that runs out undoes what a failure undoes.
+  bool Guarded(const std::function<bool()>& step);
+  bool Ready();  // sets the error where nothing is open
+  bool ReadyToFollow();
+  bool Done(int code);
+  bool DoneWithEntries(int code);
+
+  struct HandedOut {
+    FileIdentity identity;
+    bool is_stale = false;  // it has to be read once more
+    bool is_begun = false;
+  };
+
+  Share share;
+  int64_t extractor = 0;
+  IndexDatabase database;
+  std::optional<ContentsTable> table;
+  EntryFollower entries;
+  IndexError error = IndexError::PATH_NOT_FOUND;
+  std::map<int64_t, HandedOut> out;
+  std::set<int64_t> released;  // those are offered last
+  bool has_judged = false;     // what an earlier service left in flight
+  int64_t alone = 0;           // the one that was begun without another; 0: none
+  int64_t known_until = 0;     // `seen` before what is being taken in
+  bool is_looking = false;     // at every entry
+  int64_t looked = 0;          // up to this `written`
+  bool is_sweeping = false;    // over every file
+  int64_t swept = 0;           // up to this row
+};
+
+}  // namespace fileindexd

@@ -1,0 +1,133 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/entry_follower.h"
+
+#include <algorithm>
+
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+#define FOLLOWED_COLUMNS \
+  "inode, birth_time, size, mtime, ctime, kind, content_wanted, written, reread"
+constexpr const char* NEXT =
+    "SELECT " FOLLOWED_COLUMNS
+    " FROM entries WHERE content_wanted <> 0 AND written > ?1 ORDER BY written LIMIT ?2";
+constexpr const char* OF_INODE =
+    "SELECT size, mtime, content_wanted FROM entries WHERE inode = ?1 AND birth_time = ?2 "
+    "AND thing = 1";
+constexpr const char* LATEST = "SELECT " FOLLOWED_COLUMNS
+                               " FROM entries WHERE inode = ?1 AND birth_time = ?2 "
+                               "AND content_wanted = 1 ORDER BY written DESC LIMIT 1";
+// A file may have thousands of links; any of them will do.
+constexpr const char* PATHS =
+    "SELECT path FROM entries WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4 "
+    "AND content_wanted = 1 LIMIT 16";
+
+void ReadFollowed(const Statement& row, FollowedEntry& entry) {
+  entry.identity = {static_cast<uint64_t>(row.Int(0)), row.Int(1), row.Int(2), row.Int(3)};
+  entry.ctime = row.Int(4);
+  entry.kind = static_cast<Kind>(row.Int(5));
+  entry.is_wanted = row.Int(6) == 1;
+  entry.written = row.Int(7);
+  entry.reread = row.Int(8);
+}
+
+}  // namespace
+
+IndexError EntryFollower::EnsureOpen(const std::string& share_name) {
+  if (database.IsOpen() && !database.HasMoved()) {
+    return IndexError::NONE;
+  }
+  Close();
+  IndexError error = database.OpenForReading(IndexPath(share_name));
+  if (error != IndexError::NONE) {
+    return error;
+  }
+
+  Statement ask;
+  int code = ask.Prepare(database.db, "SELECT made FROM meta WHERE id = 1");
+  if (code == SQLITE_OK) {
+    code = ask.Step();
+  }
+  if (code == SQLITE_ROW) {
+    made = ask.Int(0);
+    code = SQLITE_OK;
+  }
+  for (const auto& [statement, sql] :
+       {std::pair{&next, NEXT}, std::pair{&of_inode, OF_INODE}, std::pair{&latest_of, LATEST},
+        std::pair{&paths_of, PATHS}}) {
+    code = code == SQLITE_OK ? statement->Prepare(database.db, sql) : code;
+  }
+  if (code != SQLITE_OK) {
+    ask.Reset();
+    Close();
+    return code == SQLITE_DONE ? IndexError::DAMAGED : FromSqlite(code);
+  }
+  return IndexError::NONE;
+}
+
+void EntryFollower::Close() {
+  for (Statement* statement : {&next, &of_inode, &latest_of, &paths_of}) {
+    sqlite3_finalize(statement->handle);
+    statement->handle = nullptr;
+  }
+  database.Close();
+}
+
+int EntryFollower::Next(int64_t written, int64_t limit, std::vector<FollowedEntry>& entries) {
+  entries.clear();
+  next.BindInt(1, written);
+  next.BindInt(2, limit);
+  int code = next.Step();
+  for (; code == SQLITE_ROW; code = next.Step()) {
+    ReadFollowed(next, entries.emplace_back());
+  }
+  next.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryFollower::Refer(const FileIdentity& identity, Reference& reference) {
+  reference = Reference::NONE;
+  of_inode.BindInt(1, static_cast<int64_t>(identity.inode));
+  of_inode.BindInt(2, identity.birth_time);
+  int code = of_inode.Step();
+  for (; code == SQLITE_ROW && reference != Reference::WANTED; code = of_inode.Step()) {
+    Reference found = Reference::OTHER;
+    if (of_inode.Int(0) == identity.size && of_inode.Int(1) == identity.mtime) {
+      found = of_inode.Int(2) == 1 ? Reference::WANTED : Reference::UNWANTED;
+    }
+    reference = std::max(reference, found);
+  }
+  of_inode.Reset();
+  return code == SQLITE_DONE || code == SQLITE_ROW ? SQLITE_OK : code;
+}
+
+int EntryFollower::Latest(uint64_t inode, int64_t birth_time, FollowedEntry& entry, bool& found) {
+  latest_of.BindInt(1, static_cast<int64_t>(inode));
+  latest_of.BindInt(2, birth_time);
+  const int code = latest_of.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    ReadFollowed(latest_of, entry);
+  }
+  latest_of.Reset();
+  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int EntryFollower::Paths(const FileIdentity& identity, std::vector<std::string>& paths) {
+  paths.clear();
+  paths_of.BindInt(1, static_cast<int64_t>(identity.inode));
+  paths_of.BindInt(2, identity.birth_time);
+  paths_of.BindInt(3, identity.size);
+  paths_of.BindInt(4, identity.mtime);
+  int code = paths_of.Step();
+  for (; code == SQLITE_ROW; code = paths_of.Step()) {
+    paths.push_back(paths_of.Bytes(0));
+  }
+  paths_of.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+}  // namespace fileindexd

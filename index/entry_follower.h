@@ -1,0 +1,55 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Entries as whoever keeps contents looks at them: in the order in which they were written, and by
+// what file they stand for. Reads alone; results are SQLite's codes.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "index/contents_writer.h"
+#include "index/database.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+// A row that is wanted, or was.
+struct FollowedEntry {
+  FileIdentity identity;
+  int64_t ctime = 0;
+  Kind kind = Kind::OTHER;
+  bool is_wanted = false;
+  int64_t written = 0;
+  int64_t reread = 0;
+};
+
+// How entries refer to a file.
+enum class Reference {
+  NONE,      // no entry stands for that file at all
+  OTHER,     // one does, with another size or mtime
+  UNWANTED,  // one has that identity, and its content is not wanted
+  WANTED,
+};
+
+class EntryFollower {
+ public:
+  // Opens the share's entries, anew where the file at that path is another one by now.
+  IndexError EnsureOpen(const std::string& share_name);
+  void Close();
+
+  // Up to `limit` rows after `written`, in that order.
+  int Next(int64_t written, int64_t limit, std::vector<FollowedEntry>& entries);
+  int Refer(const FileIdentity& identity, Reference& reference);
+  // The wanted entry of that file that was written last.
+  int Latest(uint64_t inode, int64_t birth_time, FollowedEntry& entry, bool& found);
+  // Of wanted entries with that identity, a few of them.
+  int Paths(const FileIdentity& identity, std::vector<std::string>& paths);
+
+  int64_t made = 0;  // tells one entries database from another
+
+ private:
+  IndexDatabase database;
+  Statement next, of_inode, latest_of, paths_of;
+};
+
+}  // namespace fileindexd

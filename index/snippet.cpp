@@ -1,0 +1,140 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/snippet.h"
+
+#include <algorithm>
+#include <set>
+#include <string_view>
+#include <utility>
+
+#include "base/content.h"
+#include "index/question_words.h"
+#include "index/text_tokenizer.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t WIDTH = 160;          // bytes
+constexpr size_t BEFORE = 40;          // of them before the first word
+constexpr size_t MOST_TEXT = 1 << 18;  // looked at
+constexpr size_t MOST_PLACES = 256;
+
+struct Wanted {
+  std::string token;
+  bool is_beginning;
+  size_t word;
+};
+
+struct Place {
+  size_t start;
+  size_t end;
+  size_t word;
+};
+
+// Of a word with several tokens each one counts: where one stands, the others do.
+std::vector<Wanted> TokensOf(const QuestionWords& words, TextCutter& cutter) {
+  std::vector<Wanted> tokens;
+  for (size_t word = 0; word < words.Count(); ++word) {
+    const bool is_beginning = IsBeginning(words.Text(word));
+    cutter.Cut(words.Text(word), true, [&](std::string_view token, size_t, size_t) {
+      tokens.push_back({std::string(token), is_beginning, word});
+      return true;
+    });
+  }
+  return tokens;
+}
+
+std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& tokens,
+                            TextCutter& cutter) {
+  std::vector<Place> places;
+  cutter.Cut(text, false, [&](std::string_view token, size_t start, size_t end) {
+    for (const Wanted& wanted : tokens) {
+      const bool same =
+          wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token;
+      const bool known = !places.empty() && places.back().start == start;
+      if (same && !known) {
+        places.push_back({start, end, wanted.word});
+      }
+    }
+    return places.size() < MOST_PLACES;
+  });
+  return places;
+}
+
+// The place from which on most different words are shown.
+size_t BestOf(const std::vector<Place>& places) {
+  size_t best = 0;
+  size_t most = 0;
+  for (size_t i = 0; i < places.size(); ++i) {
+    std::set<size_t> shown;
+    for (size_t j = i; j < places.size() && places[j].end < places[i].start + WIDTH - BEFORE; ++j) {
+      shown.insert(places[j].word);
+    }
+    if (shown.size() > most) {
+      most = shown.size();
+      best = i;
+    }
+  }
+  return best;
+}
+
+bool IsInside(std::string_view text, size_t at) {
+  return at < text.size() && (static_cast<unsigned char>(text[at]) & 0xc0) == 0x80;
+}
+
+// Begins and ends at a blank where one is near.
+std::pair<size_t, size_t> RangeAround(std::string_view text, const Place& place) {
+  constexpr size_t NEAR = 20;
+  size_t start = place.start > BEFORE ? place.start - BEFORE : 0;
+  const size_t blank = start == 0 ? std::string_view::npos : text.find_first_of(" \t\n\r", start);
+  if (blank != std::string_view::npos && blank < start + NEAR && blank < place.start) {
+    start = blank + 1;
+  }
+  size_t end = std::min(std::max(start + WIDTH, place.end), text.size());
+  const size_t last =
+      end == text.size() ? std::string_view::npos : text.find_last_of(" \t\n\r", end);
+  if (last != std::string_view::npos && last + NEAR > end && last > place.end) {
+    end = last;
+  }
+  while (IsInside(text, start)) {
+    ++start;
+  }
+  while (IsInside(text, end)) {
+    ++end;
+  }
+  return {start, end};
+}
+
+Snippet Around(std::string_view text, const std::vector<Place>& places) {
+  Snippet snippet;
+  const auto [start, end] = RangeAround(text, places[BestOf(places)]);
+  snippet.text = std::string(text.substr(start, end - start));
+  for (char& c : snippet.text) {
+    c = static_cast<unsigned char>(c) < 0x20 || c == 0x7f ? ' ' : c;
+  }
+  for (const Place& place : places) {
+    if (place.start >= start && place.end <= end) {
+      snippet.marks.push_back({place.start - start, place.end - start});
+    }
+  }
+  return snippet;
+}
+
+}  // namespace
+
+Snippet MakeSnippet(const Content& content, const QuestionWords& words, TextCutter& cutter) {
+  const std::vector<Wanted> tokens = TokensOf(words, cutter);
+  std::vector<std::string_view> texts = {std::string_view(content.text).substr(0, MOST_TEXT)};
+  for (const TextField& field : content.texts) {
+    texts.emplace_back(field.text);
+  }
+  for (const std::string_view text : texts) {
+    const std::vector<Place> places = PlacesIn(text, tokens, cutter);
+    if (!places.empty()) {
+      return Around(text, places);
+    }
+  }
+  return {};
+}
+
+}  // namespace fileindexd

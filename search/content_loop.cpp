@@ -1,0 +1,325 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "search/content_loop.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <utility>
+
+#include "search/log.h"
+#include "state/left_out.h"
+
+namespace fileindexd {
+
+namespace {
+
+using std::chrono::milliseconds;
+using std::chrono::seconds;
+
+// A database is written in many small pieces: between two readings of the events some gather.
+constexpr milliseconds BETWEEN_READINGS(20);
+// What is written into a database's log is told of at once, and counts only when the disk has it.
+constexpr milliseconds RELOAD_AGAIN(500);
+// For what no watch could be set on.
+constexpr seconds BETWEEN_LOOKS(60);
+constexpr seconds LONGEST_POOL_REST(60);
+// Files of all shares that are held open to be given out next.
+constexpr size_t MOST_READY = 256;
+
+// The share's folders and what of them is wanted, to be compared.
+std::string FoldersText(const Settings& settings, const std::string& share) {
+  std::string text;
+  for (const IndexedFolder& folder : settings.folders) {
+    if (folder.share != share) {
+      continue;
+    }
+    text += folder.path + '\0';
+    for (const bool wanted :
+         {folder.wanted.document, folder.wanted.audio, folder.wanted.video, folder.wanted.photo}) {
+      text += wanted ? '1' : '0';
+    }
+    for (const std::string& pattern : folder.excludes.patterns) {
+      text += pattern + '\0';
+    }
+    text += '\0';
+  }
+  return text;
+}
+
+}  // namespace
+
+bool ContentLoop::Start(std::string& error) {
+  store = StateStore::Open(error);
+  if (!store) {
+    return false;
+  }
+  if (!watches.Open()) {
+    error = std::string("inotify: ") + strerror(errno);  // NOLINT(concurrency-mt-unsafe)
+    return false;
+  }
+
+  hints.everything = true;
+  return true;
+}
+
+void ContentLoop::AddPolled(std::vector<pollfd>& polled, Time now) const {
+  permission.AddPolled(polled);
+  if (now >= next_listen) {
+    polled.push_back({watches.inotify.fd, POLLIN, 0});
+  }
+  if (pool != nullptr) {
+    pool->AddPolled(polled);
+  }
+}
+
+Time ContentLoop::Due(Time now) const {
+  Time due = watches.HasGaps() ? std::min(next_look, next_reload) : next_reload;
+  if (hints.Any()) {
+    return now;
+  }
+  if (now < next_listen) {
+    due = std::min(due, next_listen);
+  }
+  if (!works) {
+    return due;  // the helpers are dead or dying, and their ends are polled for
+  }
+
+  const bool takes_jobs = pool != nullptr ? pool->Room() > 0 : true;
+  for (const auto& [name, followed] : shares) {
+    due = std::min(due, followed.contents.Due());
+    if (takes_jobs && followed.contents.MayHaveJobs(now)) {
+      due = std::min(due, std::max(now, pool_rest_until));
+    }
+  }
+  return pool != nullptr ? std::min(due, pool->Due()) : due;
+}
+
+void ContentLoop::Step(const std::vector<pollfd>& polled, Time now, int64_t wall) {
+  if (permission.IsTold(polled)) {
+    hints.everything = true;
+  }
+  Listen(now);
+  if (!permission.MayWork()) {
+    if (std::exchange(works, false)) {
+      ServiceDebug("stops reading");
+      End();
+    }
+    if (pool != nullptr) {
+      (void)pool->Work();  // those that were killed are buried
+    }
+    return;
+  }
+  if (!std::exchange(works, true)) {
+    ServiceDebug("reads");
+  }
+
+  TakeOutcomes(now);
+  for (auto& [name, followed] : shares) {
+    followed.contents.Work(now, wall);
+  }
+  HandOut(now);
+  SettleRetries();
+}
+
+void ContentLoop::End() {
+  if (pool != nullptr) {
+    pool->Abort();
+  }
+  owner.clear();
+  for (auto& [name, followed] : shares) {
+    followed.contents.Halt();
+  }
+}
+
+void ContentLoop::Listen(Time now) {
+  if (now >= next_listen) {
+    watches.Read(hints);
+    next_listen = hints.Any() ? now + BETWEEN_READINGS : now;
+  }
+  if (watches.HasGaps() && now >= next_look) {
+    next_look = now + BETWEEN_LOOKS;
+    hints.everything = true;
+    for (auto& [name, followed] : shares) {
+      followed.contents.EntriesChanged();
+    }
+  }
+
+  if (std::exchange(hints.everything, false)) {
+    Reload();
+    next_reload = now + RELOAD_AGAIN;
+  } else if (now >= next_reload) {
+    Reload();
+    next_reload = Time::max();
+  }
+  for (const std::string& name : std::exchange(hints.remade, {})) {
+    const auto found = shares.find(name);
+    if (found != shares.end()) {
+      found->second.contents.FilesChanged();
+    }
+  }
+  for (const std::string& name : std::exchange(hints.shares, {})) {
+    const auto found = shares.find(name);
+    if (found != shares.end()) {
+      found->second.contents.EntriesChanged();
+    }
+  }
+}
+
+void ContentLoop::Reload() {
+  permission.Look(*store);
+  std::shared_ptr<const Settings> settings;
+  if (!store->GetSettings(settings)) {
+    ServiceLog("%s", store->Error().c_str());
+    return;
+  }
+
+  watches.Set(*settings);
+  std::map<std::string, std::string> current;  // folders, by share; those that have any
+  for (const Share& share : settings->shares) {
+    std::string folders = FoldersText(*settings, share.name);
+    if (!folders.empty()) {
+      Follow(share, folders);
+      current.emplace(share.name, std::move(folders));
+    }
+  }
+  std::erase_if(shares, [&current](const auto& one) {
+    const bool is_gone = !current.contains(one.first);
+    if (is_gone) {
+      ServiceDebug("Share[%s] followed no longer", one.first.c_str());
+    }
+    return is_gone;
+  });
+}
+
+void ContentLoop::Follow(const Share& share, const std::string& folders) {
+  ShareStatus status;
+  if (!store->GetStatus(share.name, status)) {
+    return;  // it has just been removed
+  }
+
+  const auto [found, is_new] = shares.try_emplace(share.name, share);
+  Followed& followed = found->second;
+  if (is_new) {
+    ServiceDebug("Share[%s] followed", share.name.c_str());
+  } else if (followed.folders != folders) {
+    followed.contents.LookAtAll();
+  }
+  followed.folders = folders;
+  followed.contents.Set(share, status.no_space, status.retry_contents);
+}
+
+void ContentLoop::OpenPool(Time now) {
+  std::string error;
+  pool = ExtractPool::Open(options, error);
+  if (pool == nullptr) {
+    RestPool(now, error);
+  }
+}
+
+// What a helper that was started says of it.
+void ContentLoop::TellLeftOut() {
+  const std::string current = pool->LeftOut();
+  if (left_out == current) {
+    return;
+  }
+  left_out = current;
+  if (!current.empty()) {
+    ServiceLog("not read on this host: %s", current.c_str());
+  }
+  if (!WriteLeftOut(current)) {
+    ServiceLog("cannot note what is not read on this host, reason=%m");
+  }
+}
+
+void ContentLoop::RestPool(Time now, const std::string& reason) {
+  if (!std::exchange(pool_told, true)) {
+    ServiceLog("no files can be read now, reason=%s", reason.c_str());
+  }
+  pool_rest = std::clamp(pool_rest * 2, seconds(1), LONGEST_POOL_REST);
+  pool_rest_until = now + pool_rest;
+}
+
+void ContentLoop::TakeOutcomes(Time now) {
+  if (pool == nullptr) {
+    return;
+  }
+  std::vector<ExtractOutcome> outcomes = pool->Work();
+  for (ExtractOutcome& outcome : outcomes) {
+    TakeOutcome(std::move(outcome), now);
+  }
+  if (!outcomes.empty()) {
+    TellLeftOut();
+  }
+}
+
+void ContentLoop::TakeOutcome(ExtractOutcome&& outcome, Time now) {
+  if (outcome.result == ExtractOutcome::Result::LOST) {
+    RestPool(now, outcome.reason);
+  } else {
+    pool_rest = seconds(0);
+    if (std::exchange(pool_told, false)) {
+      ServiceLog("files can be read again");
+    }
+  }
+
+  const auto job = owner.find(outcome.id);
+  if (job == owner.end()) {
+    return;
+  }
+  const auto found = shares.find(job->second);
+  if (found != shares.end()) {
+    found->second.contents.End(std::move(outcome), now);
+  }
+  owner.erase(job);
+}
+
+void ContentLoop::HandOut(Time now) {
+  size_t busy = 0;
+  for (const auto& [name, followed] : shares) {
+    busy += followed.contents.MayHaveJobs(now) ? 1 : 0;
+  }
+  if (busy == 0 || now < pool_rest_until) {
+    return;
+  }
+  if (pool == nullptr) {
+    OpenPool(now);
+  }
+
+  for (auto& [name, followed] : shares) {
+    followed.contents.largest_batch = std::min(MOST_READY / busy, ShareContents::LARGEST_BATCH);
+  }
+  while (pool != nullptr && pool->Room() > 0 && HandOutOne(now)) {
+  }
+}
+
+// Of the share whose turn it is, or of the next one that has something.
+bool ContentLoop::HandOutOne(Time now) {
+  auto turn = shares.upper_bound(last_share);
+  for (size_t tried = 0; tried < shares.size(); ++tried, ++turn) {
+    if (turn == shares.end()) {
+      turn = shares.begin();
+    }
+    ExtractJob job;
+    if (turn->second.contents.Next(now, last_job + 1, job)) {
+      last_share = turn->first;
+      owner.emplace(++last_job, turn->first);
+      pool->Submit(std::move(job));
+      return true;
+    }
+  }
+  return false;
+}
+
+// The wish is taken off the record only when it is fulfilled: better twice than not at all.
+void ContentLoop::SettleRetries() {
+  for (auto& [name, followed] : shares) {
+    if (!followed.contents.TakeRetried()) {
+      continue;
+    }
+    if (!store->UpdateStatus(name, [](ShareStatus& status) { status.retry_contents = false; })) {
+      ServiceLog("%s", store->Error().c_str());
+    }
+  }
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,354 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "search/share_contents.h"
+
+#include <algorithm>
+#include <iterator>
+#include <utility>
+
+#include "search/log.h"
+#include "state/belonging.h"
+#include "state/filesystem.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+using std::chrono::milliseconds;
+using std::chrono::seconds;
+
+// Rows of one slice: some milliseconds.
+constexpr size_t TAKE_IN_ROWS = 1000;
+constexpr size_t SWEEP_ROWS = 500;
+// A busy daemon commits many times a second: one look serves them all.
+constexpr milliseconds BETWEEN_LOOKS(100);
+// What is written into a database's log is told of at once, and counts only when the disk has it.
+constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000)};
+constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
+// Bigger transactions cost memory and gain nothing.
+constexpr size_t COMMIT_BYTES = 8U << 20;
+constexpr milliseconds COMMIT_AGE(400);
+// Its page cache is of no use any more.
+constexpr seconds CLOSE_AFTER(10);
+constexpr seconds SHORTEST_REST(1);
+constexpr seconds LONGEST_REST(60);
+
+}  // namespace
+
+ShareContents::ShareContents(Share followed) : share(std::move(followed)) {}
+
+void ShareContents::Set(const Share& current, bool has_no_space, bool wants_retry) {
+  const bool is_other = current.path != share.path || current.filesystem != share.filesystem ||
+                        current.language != share.language;
+  if (is_other) {
+    FilesChanged();
+    rest_until = Time();
+  }
+  share = current;
+  retry_wanted = wants_retry;
+
+  if (has_no_space != no_space) {
+    ServiceLog(
+        has_no_space ? "Share[%s] low on space, no contents are read" : "Share[%s] has space again",
+        share.name.c_str());
+    no_space = has_no_space;
+    if (no_space) {
+      Halt();
+    }
+  }
+}
+
+void ShareContents::EntriesChanged() {
+  has_news = true;
+  later_looks = 0;
+  is_missing = false;
+}
+
+void ShareContents::LookAtAll() {
+  look_at_all = true;
+  is_missing = false;
+}
+
+void ShareContents::FilesChanged() {
+  Halt();
+  LookAtAll();
+}
+
+bool ShareContents::CanWork(Time now) const {
+  return !no_space && !IsResting(now);
+}
+
+bool ShareContents::IsIdle() const {
+  return !has_news && later_look == Time::max() && !look_at_all && !is_sweeping && !may_have_jobs &&
+         ready.empty() && running.empty() && !retry_wanted && !writer.HasChanges();
+}
+
+void ShareContents::Work(Time now, int64_t wall) {
+  if (!CanWork(now)) {
+    return;
+  }
+  if (now >= next_full_look) {
+    look_at_all = true;
+    next_full_look = now + BETWEEN_FULL_LOOKS;
+  }
+  if (!writer.IsOpen()) {
+    if (is_missing || IsIdle()) {
+      return;
+    }
+    Open(now);
+    return;
+  }
+
+  const bool good =
+      Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now);
+  if (!good) {
+    RestForError(now);
+    return;
+  }
+  CloseIfIdle(now);
+}
+
+void ShareContents::Open(Time now) {
+  if (!IsFit(now)) {
+    return;
+  }
+  const IndexError opened = writer.Open(share, EXTRACTOR_VERSION);
+  if (opened == IndexError::PATH_NOT_FOUND) {
+    is_missing = true;  // until the daemon has made them
+    has_news = false;
+    look_at_all = true;
+    return;
+  }
+  if (opened != IndexError::NONE) {
+    Rest(now, IndexErrorText(opened));
+    return;
+  }
+
+  idle_since = now;
+  next_take_in = now;
+  has_news = true;
+  if (next_full_look == Time::max()) {
+    next_full_look = now + BETWEEN_FULL_LOOKS;
+  }
+}
+
+bool ShareContents::Retry() {
+  if (!retry_wanted) {
+    return true;
+  }
+  if (!writer.RetryFailed() || !Commit()) {
+    return false;
+  }
+  retry_wanted = false;
+  retried = true;
+  may_have_jobs = true;
+  return true;
+}
+
+bool ShareContents::TakeIn(Time now) {
+  if (look_at_all) {
+    writer.LookAtAll();
+    look_at_all = false;
+    has_news = true;
+    next_take_in = now;
+  }
+  if (now >= later_look) {
+    has_news = true;
+    later_look = Time::max();
+  }
+  if (!has_news || now < next_take_in) {
+    return true;
+  }
+
+  bool more = false;
+  if (!writer.TakeIn(TAKE_IN_ROWS, more)) {
+    return false;
+  }
+  may_have_jobs = true;
+  has_news = more;
+  if (!more) {
+    is_sweeping = true;
+    next_take_in = now + BETWEEN_LOOKS;
+    LookLater(now);
+  }
+  return true;
+}
+
+void ShareContents::LookLater(Time now) {
+  later_look = Time::max();
+  if (later_looks < std::size(LATER_LOOKS)) {
+    later_look = now + LATER_LOOKS[later_looks++];
+  }
+}
+
+bool ShareContents::Sweep(int64_t wall) {
+  return !is_sweeping || writer.Sweep(wall, SWEEP_ROWS, is_sweeping);
+}
+
+bool ShareContents::ReleasePatient(Time now) {
+  while (!patient.empty() && patient.begin()->first <= now) {
+    if (!writer.Release(patient.begin()->second)) {
+      return false;
+    }
+    patient.erase(patient.begin());
+    may_have_jobs = true;
+  }
+  return true;
+}
+
+bool ShareContents::Flows() const {
+  return has_news || is_sweeping || may_have_jobs || !ready.empty() || !running.empty();
+}
+
+// With nothing more to come, at once: somebody may be waiting for it.
+bool ShareContents::CommitIfDue(Time now) {
+  if (!writer.HasChanges()) {
+    first_change.reset();
+    return true;
+  }
+
+  first_change = first_change.value_or(now);
+  if (Flows() && writer.PendingBytes() < COMMIT_BYTES && now - *first_change < COMMIT_AGE) {
+    return true;
+  }
+  return Commit();
+}
+
+bool ShareContents::Commit() {
+  if (!writer.Commit()) {
+    return false;
+  }
+  first_change.reset();
+  GoneOn();
+  return true;
+}
+
+void ShareContents::CloseIfIdle(Time now) {
+  if (!IsIdle() || !patient.empty()) {
+    idle_since = now;
+  } else if (now - idle_since >= CLOSE_AFTER) {
+    GoneOn();
+    Forget();
+  }
+}
+
+void ShareContents::Halt() {
+  if (!writer.IsOpen()) {
+    return;
+  }
+
+  // A failure here costs no more than a try on record of files that were not to blame.
+  bool good = true;
+  for (const auto& [id, one] : running) {
+    good = good && writer.Release(one.file);
+  }
+  for (const Ready& one : ready) {
+    good = good && writer.Release(one.job.file);
+  }
+  if (!good || (writer.HasChanges() && !writer.Commit())) {
+    ServiceDebug("Share[%s] stopped in the middle, reason=%s", share.name.c_str(),
+                 IndexErrorText(writer.Error()));
+  }
+  Forget();
+  has_news = true;
+}
+
+Time ShareContents::Due() const {
+  if (no_space) {
+    return Time::max();
+  }
+  Time due = next_full_look;
+  const bool has_work = is_sweeping || look_at_all || retry_wanted;
+  if (!writer.IsOpen()) {
+    due = !is_missing && (has_news || has_work) ? Time() : due;
+    return std::max(due, rest_until);
+  }
+
+  if (has_work) {
+    return Time();
+  }
+  if (has_news) {
+    due = std::min(due, next_take_in);
+  }
+  due = std::min(due, later_look);
+  if (!patient.empty()) {
+    due = std::min(due, patient.begin()->first);
+  }
+  if (writer.HasChanges()) {
+    due = std::min(due, first_change && Flows() ? *first_change + COMMIT_AGE : Time());
+  }
+  return std::min(due, IsIdle() ? idle_since + CLOSE_AFTER : Time::max());
+}
+
+bool ShareContents::IsFit(Time now) {
+  // The entries need what little there is left.
+  if (!HasSpace(StateRoot(), false)) {
+    Rest(now, "little space is left on the disk of the index");
+    return false;
+  }
+  switch (LookAtRoot(share)) {
+    case RootState::SOUND:
+      return true;
+    case RootState::MISSING:
+      Rest(now, "its root is missing");
+      return false;
+    case RootState::FOREIGN:
+      Rest(now, "its root lies on another file system");
+      return false;
+    case RootState::UNKNOWN:
+      Rest(now, "its root does not answer");
+      return false;
+  }
+  return false;
+}
+
+void ShareContents::RestForError(Time now) {
+  // A database was taken away while it was open: the next opening tells which.
+  if (writer.Error() == IndexError::PATH_NOT_FOUND) {
+    Forget();
+    look_at_all = true;
+    has_news = true;
+    rest_until = now + SHORTEST_REST;
+    return;
+  }
+  Rest(now, IndexErrorText(writer.Error()));
+}
+
+// One line at the beginning of the first rest; the others are the same one that goes on.
+void ShareContents::Rest(Time now, const std::string& reason) {
+  if (!rest_told) {
+    ServiceLog("Share[%s] contents rest, reason=%s", share.name.c_str(), reason.c_str());
+    rest_told = true;
+  }
+  if (writer.HasChanges()) {
+    (void)writer.Commit();  // good if it still can be done: it would be read once more
+  }
+  Forget();
+  has_news = true;
+  rest = std::clamp(rest * 2, SHORTEST_REST, LONGEST_REST);
+  rest_until = now + rest;
+}
+
+void ShareContents::GoneOn() {
+  rest = seconds(0);
+  if (rest_told) {
+    ServiceLog("Share[%s] contents go on", share.name.c_str());
+    rest_told = false;
+  }
+}
+
+// What was given out is not waited for any more.
+void ShareContents::Forget() {
+  writer.Close();
+  ready.clear();
+  running.clear();
+  patient.clear();
+  patience.clear();
+  first_change.reset();
+  may_have_jobs = false;
+  is_sweeping = false;
+  has_news = false;
+  later_look = Time::max();
+}
+
+}  // namespace fileindexd

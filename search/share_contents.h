@@ -1,0 +1,137 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// One share's contents, as the service works on them: takes in what the daemon committed, gives out
+// the files to read, writes down what was found.
+//
+// Everything is done in slices of some milliseconds, so that many shares can be worked on in turn.
+// A share whose databases or whose root fail rests, for longer each time, and nobody else is held
+// up by it. What is given out is opened, looked at and on record before.
+//
+// One thread. Times are passed in.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <deque>
+#include <map>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "base/scoped_fd.h"
+#include "extract/pool.h"
+#include "index/contents_writer.h"
+#include "state/settings.h"
+
+namespace fileindexd {
+
+using Clock = std::chrono::steady_clock;
+using Time = Clock::time_point;
+
+class ShareContents {
+ public:
+  explicit ShareContents(Share followed);
+
+  // What is known of the share from outside, as it is now.
+  void Set(const Share& current, bool has_no_space, bool wants_retry);
+  void EntriesChanged();
+  // All entries are looked at again.
+  void LookAtAll();
+  // The databases' files came or went: what is open may be of no use.
+  void FilesChanged();
+
+  // One slice of all but reading: opening, taking in, sweeping, committing. `wall`: seconds since
+  // the epoch.
+  void Work(Time now, int64_t wall);
+  // The next file to read. False when there is none now; MayHaveJobs tells whether to ask again.
+  bool Next(Time now, uint64_t id, ExtractJob& job);
+  bool MayHaveJobs(Time now) const;
+  // What came of a file that was given out under that id; of one that was taken back: nothing.
+  void End(ExtractOutcome&& outcome, Time now);
+  // Takes back what was given out, and closes. For pauses: it goes on as it was.
+  void Halt();
+
+  // When Work wants to be called; max() if nothing is to be done.
+  Time Due() const;
+  // True once after all that failed was made to wait again, and that is on disk.
+  bool TakeRetried() { return std::exchange(retried, false); }
+
+  Share share;
+  size_t largest_batch = LARGEST_BATCH;  // files held open to be given out next
+
+  static constexpr size_t SMALLEST_BATCH = 4;
+  static constexpr size_t LARGEST_BATCH = 64;
+
+ private:
+  struct Ready {
+    ContentJob job;
+    ScopedFd file;
+    std::string name;
+  };
+  struct Running {
+    int64_t file = 0;
+    FileIdentity identity;
+    ScopedFd open;  // the same open file, to be looked at afterwards
+  };
+  // Of a file that was not what the index knows: it is looked at again later.
+  struct Patience {
+    std::chrono::seconds rest{0};
+    Time until;
+  };
+
+  bool IsResting(Time now) const { return now < rest_until; }
+  bool CanWork(Time now) const;
+  bool IsIdle() const;
+  bool Flows() const;
+  void Open(Time now);
+  bool TakeIn(Time now);
+  void LookLater(Time now);
+  bool Sweep(int64_t wall);
+  bool Retry();
+  bool ReleasePatient(Time now);
+  bool CommitIfDue(Time now);
+  bool Commit();
+  void CloseIfIdle(Time now);
+
+  bool Refill(Time now);
+  void OpenJob(ContentJob&& job, Time now);
+  bool BeginTries();
+  void BePatient(int64_t file, Time now);
+  void AdaptBatch(Time now);
+
+  bool IsFit(Time now);  // rests if not
+  void Rest(Time now, const std::string& reason);
+  void RestForError(Time now);
+  void GoneOn();
+  void Forget();
+
+  ContentsWriter writer;
+  bool has_news = true;
+  bool look_at_all = true;
+  bool is_missing = false;  // there were no entries at the last opening
+  bool is_sweeping = false;
+  bool no_space = false;
+  bool retry_wanted = false;
+  bool retried = false;
+  bool may_have_jobs = false;
+  Time next_take_in;
+  Time later_look = Time::max();  // for what was told of before it could be seen
+  size_t later_looks = 0;         // since the last news
+  Time next_full_look = Time::max();
+  Time idle_since;
+  std::optional<Time> first_change;  // that is not committed
+
+  Time rest_until;
+  std::chrono::seconds rest{0};  // the last one; 0: all was well since
+  bool rest_told = false;
+  bool root_suspect = false;
+
+  size_t batch = 0;
+  Time refilled;
+  std::deque<Ready> ready;
+  std::map<uint64_t, Running> running;   // by the id of the job
+  std::map<int64_t, Patience> patience;  // by file
+  std::multimap<Time, int64_t> patient;  // files that the writer has given out and that wait here
+};
+
+}  // namespace fileindexd

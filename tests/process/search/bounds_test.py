@@ -1,0 +1,40 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""With the real helper: much text goes through, and the service stays small."""
+
+import os
+import re
+
+from harness import main
+from search.library import ContentsTest
+
+LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
+LARGE, SMALL = (500, 20000) if LONG else (40, 400)  # files; each large one beyond the text's cap
+WORDS = "lighthouse keepers number their lamps "
+
+
+class BoundsTest(ContentsTest):
+    def highest_memory(self, pid):
+        """KiB."""
+        with open(f"/proc/{pid}/status", encoding="utf-8") as file:
+            return int(re.search(r"VmHWM:\s+(\d+) kB", file.read())[1])
+
+    def test_memory_and_descriptors_are_bounded(self):
+        root = self.make_share(folders=())
+        for number in range(LARGE):
+            self.write(f"{root}/large{number}.txt", f"{WORDS} {number} " * 30000)
+        for number in range(SMALL):
+            self.write(f"{root}/small{number}.txt", f"{WORDS} {number}")
+        self.start()
+        service = self.service_pid()
+        self.ctl("folder", "add", root, "--document")
+
+        self.await_counts(done=LARGE + SMALL, waiting=0, failed=0)
+
+        self.assertLess(self.highest_memory(service), 64 * 1024)
+        self.assertLess(len(os.listdir(f"/proc/{service}/fd")), 100)
+        self.assertEqual(self.ctl("search", "--count", "lighthouse").out.strip().decode(),
+                         str(LARGE + SMALL))
+
+
+if __name__ == "__main__":
+    main()

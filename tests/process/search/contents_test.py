@@ -1,0 +1,217 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""From files to hits on what is inside them: what is read when, and what is not."""
+
+import os
+import shutil
+import signal
+
+from harness import main, namespace
+from harness.awaiting import await_exit_of
+from search.library import ScriptedTest
+
+MS_RDONLY = 1
+
+
+class ContentsFollowTest(ScriptedTest):
+    def make_documents(self, **texts):
+        """A share with these files, whose contents are wanted, and a daemon."""
+        root = self.make_share(folders=())
+        for name, text in texts.items():
+            self.write(f"{root}/{name}.txt", text)
+        self.daemon = self.start()
+        self.ctl("folder", "add", root, "--document")
+        return root
+
+    def change(self, root, name, code=8):
+        self.append("alpha", {"event": code, "path": f"{root}/{name}"})
+
+    def test_files_are_found_by_what_is_in_them(self):
+        root = self.make_documents(one="lighthouse keeper", two="harbour master")
+
+        self.await_hits("lighthouse", ["one.txt"])
+        self.await_hits("harbour", ["two.txt"])
+        self.await_counts(done=2, waiting=0, failed=0)
+
+        self.write(f"{root}/three.txt", "lighthouse again")
+        self.change(root, "three.txt")
+        self.await_hits("lighthouse", ["one.txt", "three.txt"])
+        self.assertEqual(self.given(), ["one.txt", "three.txt", "two.txt"])
+
+    def test_what_only_gets_another_name_is_not_read_again(self):
+        root = self.make_documents(one="lighthouse", two="harbour")
+        self.await_counts(done=2, waiting=0)
+
+        os.mkdir(f"{root}/folder")
+        os.rename(f"{root}/one.txt", f"{root}/folder/other.txt")
+        os.link(f"{root}/two.txt", f"{root}/twin.txt")
+        self.ctl("reindex", root)
+
+        self.await_hits("lighthouse", ["other.txt"])
+        self.await_hits("harbour", ["twin.txt", "two.txt"])
+        self.assertEqual(self.given(), ["one.txt", "two.txt"])
+
+    def test_a_rebuilt_index_costs_no_reading(self):
+        root = self.make_documents(one="lighthouse")
+        self.await_counts(done=1, waiting=0)
+        self.stop(self.daemon)
+
+        shutil.rmtree(f"{os.path.dirname(self.queue('alpha'))}/index")
+        self.start()
+        self.ctl("reindex", root)
+
+        self.await_drained("alpha")
+        self.write(f"{root}/last.txt", "afterwards")
+        self.change(root, "last.txt")
+        self.await_hits("afterwards", ["last.txt"])
+        self.await_hits("lighthouse", ["one.txt"])
+        self.assertEqual(self.given(), ["last.txt", "one.txt"])
+
+    def test_kinds_that_are_switched_off_are_dropped(self):
+        root = self.make_documents(one="lighthouse")
+        self.await_counts(done=1)
+
+        self.ctl("folder", "set", root, "--document=off")
+
+        self.await_counts(done=0, waiting=0)
+        self.assertEqual(self.hits("lighthouse"), [])
+        self.ctl("folder", "set", root, "--document=on")
+        self.await_hits("lighthouse", ["one.txt"])
+
+    def test_a_file_that_changes_while_it_is_read_is_read_again(self):
+        root = self.make_documents(gate="lighthouse")
+        self.await_given("gate.txt")
+
+        self.write(f"{root}/gate.txt", "a harbour instead")
+        self.open_gate()
+        self.change(root, "gate.txt")
+
+        self.await_hits("harbour", ["gate.txt"])
+        self.assertEqual(self.hits("lighthouse"), [])
+
+    def test_what_is_no_file_any_more_is_not_opened(self):
+        root = self.make_share(folders=())
+        names = ["link.txt", "pipe.txt", "device.txt", "folder.txt", "gone.txt", "good.txt"]
+        for name in names:
+            self.write(f"{root}/{name}", f"lighthouse {name}")
+        daemon = self.start()
+        service = self.service_pid()
+        os.kill(service, signal.SIGSTOP)
+        self.ctl("folder", "add", root, "--document")
+        self.await_drained("alpha")
+        os.kill(daemon, signal.SIGSTOP)  # it would see what follows at a reindex
+
+        for name in names[:-1]:
+            os.unlink(f"{root}/{name}")
+        os.symlink("good.txt", f"{root}/link.txt")
+        os.mkfifo(f"{root}/pipe.txt")
+        os.mknod(f"{root}/device.txt", 0o20666, os.makedev(1, 5))
+        os.mkdir(f"{root}/folder.txt")
+        os.kill(service, signal.SIGCONT)
+
+        self.await_counts(done=1)
+        self.assertEqual(self.given(), ["good.txt"])
+        os.kill(daemon, signal.SIGCONT)
+
+    def test_one_broken_share_does_not_hold_the_others(self):
+        broken = self.make_documents(one="lighthouse")
+        self.await_hits("lighthouse", ["one.txt"])
+        folder = os.path.dirname(self.contents())
+        namespace.mount("tmpfs", folder, "tmpfs", flags=MS_RDONLY)
+        self.write(f"{broken}/two.txt", "lighthouse")
+        self.change(broken, "two.txt")
+
+        other = self.make_share("beta", folders=())
+        self.write(f"{other}/three.txt", "harbour")
+        self.ctl("folder", "add", other, "--document")
+        self.await_hits("harbour", ["three.txt"], "beta")
+
+        namespace.unmount(folder)
+        self.await_hits("lighthouse", ["one.txt", "two.txt"])
+
+
+class PauseTest(ScriptedTest):
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(folders=())
+        self.write(f"{self.root}/gate.txt", "lighthouse")
+        self.daemon = self.start()
+        self.ctl("folder", "add", self.root, "--document")
+        self.helper = self.await_given("gate.txt")
+
+    def test_a_pause_stops_a_document_in_the_middle(self):
+        self.ctl("pause")
+        self.assertTrue(await_exit_of(self.helper))
+        self.assertEqual(self.given(), ["gate.txt"])
+
+        self.open_gate()
+        self.ctl("resume")
+        self.await_hits("lighthouse", ["gate.txt"])
+        self.assertEqual(self.failed(), {})
+        self.assertEqual(self.given(), ["gate.txt"] * 2)
+
+    def test_a_pause_ends_by_itself(self):
+        self.ctl("pause", "--for", "2s")
+        self.assertTrue(await_exit_of(self.helper))
+
+        self.open_gate()
+
+        self.await_hits("lighthouse", ["gate.txt"])
+
+    def test_without_a_daemon_nothing_is_read(self):
+        self.kill(self.daemon)
+        self.assertTrue(await_exit_of(self.helper))
+
+        self.open_gate()
+        self.start()
+
+        self.await_hits("lighthouse", ["gate.txt"])
+        self.assertEqual(self.failed(), {})
+
+
+class QuarantineTest(ScriptedTest):
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(folders=())
+        for name in ("crash.txt", "bad.txt", "nonsense.txt", "good.txt"):
+            self.write(f"{self.root}/{name}", "lighthouse")
+        self.start()
+        self.ctl("folder", "add", self.root, "--document")
+        self.await_counts(done=1, failed=3, waiting=0)
+
+    def test_what_killed_a_helper_twice_is_not_tried_again(self):
+        self.assertEqual(
+            self.given(),
+            ["bad.txt", "crash.txt", "crash.txt", "good.txt", "nonsense.txt", "nonsense.txt"],
+        )
+
+        failed = self.failed()
+        self.assertEqual(sorted(failed), ["bad.txt", "crash.txt", "nonsense.txt"])
+        self.assertEqual(failed["bad.txt"][0], "damaged")
+        self.assertEqual(failed["crash.txt"], ("the helper ended with SIGABRT", 2))
+        self.assertEqual(failed["nonsense.txt"][1], 2)
+        self.assertEqual(sorted(self.failed("alpha")), sorted(failed))
+        self.assertIn(b"crash.txt: the helper ended with SIGABRT (2 tries)", self.ctl("failed").out)
+        self.assertIn(b"1 read, 3 failed", self.ctl("status").out)
+        self.ctl("failed", "beta", code=1)
+
+    def test_retry_reads_it_once_more(self):
+        self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
+
+        self.ctl("failed", "alpha", "--retry")
+
+        self.await_counts(done=2, failed=2, waiting=0)
+        self.assertEqual(self.hits("lighthouse"), ["crash.txt", "good.txt"])
+        self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
+
+    def test_a_changed_file_is_tried_again(self):
+        self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
+        self.write(f"{self.root}/crash.txt", "another harbour")
+
+        self.append("alpha", {"event": 8, "path": f"{self.root}/crash.txt"})
+
+        self.await_hits("harbour", ["crash.txt"])
+        self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,64 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""kill -9 of helper, service and daemon at random moments: all is read in the end, nothing blamed."""
+
+import contextlib
+import os
+import random
+import signal
+
+from harness import main
+from search.library import ScriptedTest
+
+LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
+KILLS = 300 if LONG else 15
+FILES_BETWEEN = 6  # that are read between two kills, at most
+
+
+class RandomKillsTest(ScriptedTest):
+    def setUp(self):
+        super().setUp()
+        self.seed = int(os.environ.get("FILEINDEXD_TEST_SEED", "0")) or random.randrange(1, 1 << 32)
+        print(f"seed {self.seed}", flush=True)
+        self.choice = random.Random(self.seed)
+
+    def kill_helper(self):
+        with contextlib.suppress(ProcessLookupError):  # it was killed with its service
+            os.kill(self.diary()[-1][1], signal.SIGKILL)
+
+    def kill_service(self):
+        self.kill(self.service)
+        self.service = self.start_service()
+
+    def kill_daemon(self):
+        self.kill(self.daemon)
+        self.daemon = self.start()
+
+    def add_files(self, count):
+        for _ in range(count):
+            self.added += 1
+            self.write(f"{self.root}/f{self.added}.txt", f"lighthouse{self.added} everywhere")
+        self.ctl("reindex", self.root)
+
+    def test_kills(self):
+        self.root = self.make_share(folders=())
+        self.added = 0
+        self.daemon = self.start()
+        self.service = self.service_pid()
+        self.ctl("folder", "add", self.root, "--document")
+
+        for _ in range(KILLS):
+            read = len(self.diary())
+            self.add_files(FILES_BETWEEN)
+            until = read + self.choice.randrange(1, FILES_BETWEEN)
+            self.await_diary(lambda given, until=until: len(given) >= until)
+            self.choice.choice([self.kill_helper, self.kill_service, self.kill_daemon])()
+
+        self.await_counts(done=self.added, waiting=0, failed=0)
+        self.assertEqual(self.failed(), {})
+        self.assertEqual(len(self.hits("everywhere")), min(self.added, 1000))
+        for number in range(1, self.added + 1):
+            self.assertEqual(self.hits(f"lighthouse{number}"), [f"f{number}.txt"])
+
+
+if __name__ == "__main__":
+    main()

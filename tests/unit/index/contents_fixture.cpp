@@ -1,0 +1,109 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/index/contents_fixture.h"
+
+#include "index/contents_schema.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+Content TextContent(const std::string& text) {
+  Content content;
+  content.kind = Kind::DOCUMENT;
+  content.text = text;
+  return content;
+}
+
+void ContentsTest::SetUp() {
+  IndexTest::SetUp();
+  wanted = {true, true, true, true};
+  if (store != nullptr) {
+    ASSERT_TRUE(store->SetFolder(root, wanted));
+    Commit();
+    OpenContents();
+  }
+}
+
+Share ContentsTest::TheShare() {
+  std::shared_ptr<const Settings> in_force;
+  EXPECT_TRUE(store->GetSettings(in_force));
+  return *in_force->ShareByName("s");
+}
+
+void ContentsTest::OpenContents(int64_t extractor) {
+  handed.clear();
+  contents.reset();
+  contents = std::make_unique<ContentsWriter>();
+  const IndexError error = contents->Open(TheShare(), extractor);
+  ASSERT_EQ(error, IndexError::NONE) << IndexErrorText(error);
+}
+
+void ContentsTest::TakeIn() {
+  bool more = true;
+  while (more) {
+    ASSERT_TRUE(contents->TakeIn(3, more)) << IndexErrorText(contents->Error());
+  }
+  ASSERT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
+}
+
+void ContentsTest::Sweep(int64_t now) {
+  bool more = true;
+  while (more) {
+    ASSERT_TRUE(contents->Sweep(now, 3, more)) << IndexErrorText(contents->Error());
+  }
+  ASSERT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
+}
+
+Names ContentsTest::Jobs(size_t limit) {
+  std::vector<ContentJob> jobs;
+  EXPECT_TRUE(contents->NextJobs(limit, jobs)) << IndexErrorText(contents->Error());
+  Names names;
+  for (const ContentJob& job : jobs) {
+    EXPECT_FALSE(job.paths.empty());
+    names.push_back(job.paths.front().substr(root.size() + 1));
+    handed[names.back()] = job;
+  }
+  return names;
+}
+
+ContentJob ContentsTest::JobOf(const std::string& name) {
+  EXPECT_TRUE(handed.contains(name)) << name;
+  return handed[name];
+}
+
+void ContentsTest::File(const std::string& name, const std::string& bytes) {
+  WriteFile(At(name), bytes);
+  Add(name);
+  Commit();
+  TakeIn();
+}
+
+void ContentsTest::Finish(const std::string& name, const std::string& text) {
+  EXPECT_TRUE(contents->Finish(JobOf(name).file, TextContent(text)))
+      << IndexErrorText(contents->Error());
+  EXPECT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
+}
+
+Names ContentsTest::Read() {
+  const Names names = Jobs();
+  for (const std::string& name : names) {
+    Finish(name, name);
+  }
+  return names;
+}
+
+int64_t ContentsTest::Number(const std::string& sql) {
+  IndexDatabase database;
+  EXPECT_EQ(database.OpenForReading(ContentsPath("s"), CONTENTS_FORM), IndexError::NONE);
+  Statement statement;
+  EXPECT_EQ(statement.Prepare(database.db, sql.c_str()), SQLITE_OK)
+      << sql << ": " << sqlite3_errmsg(database.db);
+  EXPECT_EQ(statement.Step(), SQLITE_ROW) << sql << ": " << sqlite3_errmsg(database.db);
+  return statement.Int(0);
+}
+
+int64_t ContentsTest::Holding(const std::string& word) {
+  return Number("SELECT count(*) FROM words WHERE words MATCH '\"" + word + "\"'");
+}
+
+}  // namespace fileindexd

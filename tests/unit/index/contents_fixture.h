@@ -1,0 +1,41 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A share "s" whose contents are all wanted, and a writer of them.
+#pragma once
+
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "index/contents_writer.h"
+#include "tests/unit/index/fixture.h"
+
+namespace fileindexd {
+
+class ContentsTest : public IndexTest {
+ protected:
+  void SetUp() override;
+
+  Share TheShare();
+  void OpenContents(int64_t extractor = 1);  // anew
+  void TakeIn();                             // all there is, and commits
+  void Sweep(int64_t now);                   // all there is, and commits
+  // Names of what is handed out, in order; each stays handed out.
+  Names Jobs(size_t limit = 100);
+  ContentJob JobOf(const std::string& name);  // of what was handed out
+  // Puts a file there, adds it to the entries, and takes it in.
+  void File(const std::string& name, const std::string& bytes = "bytes");
+  void Finish(const std::string& name, const std::string& text);
+  // Hands out all that waits, and finishes each with its own name as its text.
+  Names Read();
+  int64_t Number(const std::string& sql);  // an answer of the contents database
+  // How many stored files hold that word.
+  int64_t Holding(const std::string& word);
+
+  std::unique_ptr<ContentsWriter> contents;
+  std::map<std::string, ContentJob> handed;  // by name
+};
+
+Content TextContent(const std::string& text);
+
+}  // namespace fileindexd

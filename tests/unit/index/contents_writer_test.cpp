@@ -1,0 +1,418 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/contents_writer.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdio>
+
+#include "state/layout.h"
+#include "tests/unit/index/contents_fixture.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t NOW = 2'000'000'000;
+constexpr int64_t DAY = 86400;
+
+void SetTime(const std::string& path, time_t seconds) {
+  const timespec times[2] = {{seconds, 0}, {seconds, 0}};
+  ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
+}
+
+}  // namespace
+
+class ContentsWriterTest : public ContentsTest {
+ protected:
+  // Old enough that nothing else has that time.
+  void OldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes") {
+    WriteFile(At(name), bytes);
+    SetTime(At(name), mtime);
+    Add(name);
+    Commit();
+  }
+};
+
+TEST_F(ContentsWriterTest, WantedFilesWaitNewestAndSmallestFirst) {
+  OldFile("old.txt", 1000);
+  OldFile("new big.txt", 3000, "many bytes");
+  OldFile("new small.txt", 3000, "few");
+  MakeFolder(At("d.txt"));
+  Add("d.txt");
+  Commit();
+  TakeIn();
+
+  EXPECT_EQ(Jobs(2), Names({"new small.txt", "new big.txt"}));
+  EXPECT_EQ(Jobs(), Names({"old.txt"}));
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 3);
+}
+
+TEST_F(ContentsWriterTest, ContentIsStoredOnce) {
+  File("a.txt");
+
+  EXPECT_EQ(Read(), Names({"a.txt"}));
+  EXPECT_EQ(Read(), Names());
+
+  EXPECT_EQ(Holding("txt"), 1);
+  EXPECT_EQ(Number("SELECT done FROM counts WHERE kind = 1"), 1);
+  EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 0);
+  EXPECT_EQ(Number("SELECT sum(done) FROM rate"), 1);
+}
+
+TEST_F(ContentsWriterTest, RenameMoveLinkAndRebuildCostNoReading) {
+  File("a.txt");
+  MakeFolder(At("d"));
+  Add("d");
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+
+  ASSERT_EQ(rename(At("a.txt").c_str(), At("b.txt").c_str()), 0);
+  Add("b.txt");
+  Delete("a.txt");
+  Commit();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "renamed";
+
+  ASSERT_EQ(rename(At("b.txt").c_str(), At("d/c.txt").c_str()), 0);
+  Delete("b.txt");
+  Commit();
+  TakeIn();
+  Add("d/c.txt");
+  Commit();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "moved";
+
+  ASSERT_EQ(link(At("d/c.txt").c_str(), At("e.txt").c_str()), 0);
+  Add("e.txt");
+  Commit();
+  TakeIn();
+  Add("d/c.txt");
+  Commit();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "linked";
+
+  writer.reset();
+  RemoveTree(IndexPath("s"));
+  WantRebuild();
+  OpenWriter();
+  AddAll();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "rebuilt";
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
+}
+
+TEST_F(ContentsWriterTest, ChangedFileIsReadAnewAndItsOldContentIsGone) {
+  File("a.txt");
+  Jobs();
+  Finish("a.txt", "first");
+
+  File("a.txt", "other bytes");
+  EXPECT_EQ(Holding("first"), 0);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  Finish("a.txt", "second");
+
+  EXPECT_EQ(Holding("second"), 1);
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 1);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 1);
+}
+
+TEST_F(ContentsWriterTest, AddWithAnotherChangeTimeReadsAnewAnUpdateOnlyStoresIt) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  Commit();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "updated";
+
+  WriteFile(At("a.txt"), "bytea");
+  SetTime(At("a.txt"), 1000);
+  Add("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"})) << "added";
+  EXPECT_EQ(Holding("txt"), 1) << "until it is read, what was read stays";
+  Finish("a.txt", "anew");
+
+  contents->LookAtAll();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Holding("txt"), 0);
+}
+
+TEST_F(ContentsWriterTest, WhatEntriesDidWhileNobodyFollowedIsTakenIn) {
+  File("a.txt");
+  Read();
+  contents.reset();
+  OldFile("b.txt", 1000);
+
+  OpenContents();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"b.txt"}));
+}
+
+TEST_F(ContentsWriterTest, OutcomeForOldBytesIsThrownAway) {
+  File("a.txt");
+  Jobs();
+  File("a.txt", "other bytes");
+
+  Finish("a.txt", "first");
+
+  EXPECT_EQ(Holding("first"), 0);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, KindThatIsSwitchedOffIsDroppedAtOnce) {
+  File("a.txt");
+  File("b.mp3");
+  Read();
+  ASSERT_EQ(Number("SELECT count(*) FROM texts"), 2);
+
+  Decide("a.txt", {false, true, true, true});
+  Decide("b.mp3", {false, true, true, true});
+  wanted.document = false;
+  Refresh("a.txt");
+  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {true, false, false, false}));
+  Commit();
+  TakeIn();
+
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 1);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 1);
+  EXPECT_EQ(Holding("mp3"), 1);
+}
+
+TEST_F(ContentsWriterTest, WhatNoEntryRefersToIsSweptAfterADay) {
+  File("a.txt");
+  File("b.txt");
+  Read();
+  ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
+  Delete("a.txt");
+  Commit();
+
+  contents->LookAtAll();
+  TakeIn();
+  Sweep(NOW);
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 2);
+  Sweep(NOW + DAY - 1);
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 2);
+  Sweep(NOW + DAY);
+
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 1);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 1);
+  EXPECT_EQ(Holding("b"), 1);
+  EXPECT_EQ(Number("SELECT sum(done) FROM counts"), 1);
+}
+
+TEST_F(ContentsWriterTest, WhatComesBackWithinADayIsKept) {
+  File("a.txt");
+  Read();
+  ASSERT_EQ(rename(At("a.txt").c_str(), (folder + "/aside").c_str()), 0);
+  Delete("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+  Sweep(NOW);
+
+  ASSERT_EQ(rename((folder + "/aside").c_str(), At("b.txt").c_str()), 0);
+  Add("b.txt");
+  Commit();
+  TakeIn();
+  Sweep(NOW + 2 * DAY);
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
+}
+
+TEST_F(ContentsWriterTest, WaitingFileWithoutAnEntryIsNotHandedOut) {
+  File("a.txt");
+  ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
+  Delete("a.txt");
+  Commit();
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_TRUE(contents->Commit());
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 0);
+  EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 0);
+}
+
+TEST_F(ContentsWriterTest, SecondDeathIsTheLast) {
+  File("a.txt");
+  for (const char* reason : {"killed", "killed again"}) {
+    ASSERT_EQ(Jobs(), Names({"a.txt"})) << reason;
+    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+    ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, reason, {}, true));
+    ASSERT_TRUE(contents->Commit());
+  }
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Number("SELECT state FROM files"), 3);
+  EXPECT_EQ(Number("SELECT reason = 'killed again' FROM files"), 1);
+  EXPECT_EQ(Number("SELECT failed FROM counts WHERE kind = 1"), 1);
+
+  OpenContents(1);
+  EXPECT_EQ(Jobs(), Names()) << "nothing changed";
+  OpenContents(2);
+  EXPECT_EQ(Jobs(), Names({"a.txt"})) << "other readers";
+  File("a.txt", "other bytes");
+  EXPECT_EQ(JobOf("a.txt").tries, 0);
+}
+
+TEST_F(ContentsWriterTest, FailureKeepsWhatWasFoundAndIsTriedAgainWhenAsked) {
+  File("a.txt");
+  Jobs();
+  ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "damaged", TextContent("half"), false));
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Holding("half"), 1);
+  EXPECT_EQ(Number("SELECT failed FROM counts WHERE kind = 1"), 1);
+
+  ASSERT_TRUE(contents->RetryFailed());
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  Finish("a.txt", "whole");
+  EXPECT_EQ(Holding("half"), 0);
+  EXPECT_EQ(Holding("whole"), 1);
+}
+
+TEST_F(ContentsWriterTest, ReleasedFilesWaitAgainBehindTheOthers) {
+  OldFile("a.txt", 3000);
+  OldFile("b.txt", 2000);
+  TakeIn();
+  ASSERT_EQ(Jobs(1), Names({"a.txt"}));
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+
+  ASSERT_TRUE(contents->Release(JobOf("a.txt").file));
+
+  EXPECT_EQ(Jobs(), Names({"b.txt", "a.txt"}));
+  EXPECT_EQ(JobOf("a.txt").tries, 0);
+}
+
+// A service that is killed: the writer goes without a word.
+TEST_F(ContentsWriterTest, OfManyThatWereInFlightAtADeathNoneIsGuilty) {
+  File("a.txt");
+  File("b.txt");
+  for (int round = 0; round < 5; ++round) {
+    ASSERT_EQ(Jobs().size(), 2U) << round;
+    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file, JobOf("b.txt").file}));
+    OpenContents();
+  }
+
+  EXPECT_EQ(Jobs().size(), 2U);
+  EXPECT_GT(JobOf("a.txt").tries, 0) << "best tried alone";
+}
+
+TEST_F(ContentsWriterTest, WhoWasAloneInFlightAtFiveDeathsIsGuilty) {
+  File("a.txt");
+  for (int round = 0; round < 5; ++round) {
+    ASSERT_EQ(Jobs(), Names({"a.txt"})) << round;
+    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+    OpenContents();
+  }
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Number("SELECT state FROM files"), 3);
+}
+
+TEST_F(ContentsWriterTest, WhoIsJoinedByAnotherIsNotAlone) {
+  OldFile("a.txt", 3000);
+  OldFile("b.txt", 2000);
+  TakeIn();
+  for (int round = 0; round < 2; ++round) {
+    Jobs();
+    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+    ASSERT_TRUE(contents->BeginTries({JobOf("b.txt").file}));
+    OpenContents();
+  }
+
+  EXPECT_EQ(Jobs().size(), 2U);
+}
+
+TEST_F(ContentsWriterTest, ClosingTakesBackWhatIsInFlight) {
+  File("a.txt");
+  for (int round = 0; round < 3; ++round) {
+    ASSERT_EQ(Jobs(), Names({"a.txt"})) << round;
+    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+    contents->Close();
+    OpenContents();
+  }
+
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  EXPECT_EQ(JobOf("a.txt").tries, 0);
+}
+
+TEST_F(ContentsWriterTest, OpeningAnewDoesNotJudgeWhatIsStillInFlight) {
+  File("a.txt");
+  for (int round = 0; round < 3; ++round) {
+    if (round == 0) {
+      Jobs();
+      ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+    }
+    ASSERT_EQ(contents->Open(TheShare(), 1), IndexError::NONE);
+  }
+
+  Finish("a.txt", "found");
+  EXPECT_EQ(Holding("found"), 1);
+  EXPECT_EQ(Number("SELECT state * 10 + tries FROM files"), 10);
+}
+
+TEST_F(ContentsWriterTest, UncommittedOutcomesAreReadAgain) {
+  File("a.txt");
+  Jobs();
+  ASSERT_TRUE(contents->Finish(JobOf("a.txt").file, TextContent("lost")));
+  EXPECT_TRUE(contents->HasChanges());
+  EXPECT_EQ(contents->PendingBytes(), 4U);
+  OpenContents();
+
+  EXPECT_EQ(Read(), Names({"a.txt"}));
+  EXPECT_FALSE(contents->HasChanges());
+  EXPECT_EQ(Number("SELECT sum(waiting) * 10 + sum(done) FROM counts"), 1);
+}
+
+TEST_F(ContentsWriterTest, ContentsOfAnotherFileSystemAreDropped) {
+  File("a.txt");
+  Read();
+  ASSERT_TRUE(store->SetShareFilesystem("s", "another"));
+
+  OpenContents();
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 0);
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, DamagedContentsAreSetAsideAndMadeAnew) {
+  File("a.txt");
+  Read();
+  contents.reset();
+  WriteFile(ContentsPath("s") + "/contents.db", std::string(9000, 'x'));
+
+  OpenContents();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+}
+
+TEST_F(ContentsWriterTest, FilesAreTheOwnersAlone) {
+  File("a.txt");
+  EXPECT_EQ(ModeOf(ContentsPath("s")), 0700U);
+  EXPECT_EQ(ModeOf(ContentsPath("s") + "/contents.db"), 0600U);
+  EXPECT_EQ(ModeOf(ContentsPath("s") + "/contents.db-wal"), 0600U);
+}
+
+TEST_F(ContentsWriterTest, WithoutEntriesThereAreNoContents) {
+  contents.reset();
+  writer.reset();
+  RemoveTree(IndexPath("s"));
+  RemoveTree(ContentsPath("s"));
+
+  ContentsWriter other;
+  EXPECT_EQ(other.Open(TheShare(), 1), IndexError::PATH_NOT_FOUND);
+  EXPECT_FALSE(other.IsOpen());
+  EXPECT_NE(access(ContentsPath("s").c_str(), F_OK), 0);
+}
+
+}  // namespace fileindexd

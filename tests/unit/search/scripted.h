@@ -1,0 +1,58 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A contents database that a test fills and looks at, in the place of the real writer.
+//
+// What is written stands in `now` until a commit makes it `kept`; an opening begins with what was
+// kept. And a pool whose helpers do what the test says. One thread.
+#pragma once
+
+#include <cstdint>
+#include <list>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "extract/pool.h"
+#include "index/contents_writer.h"
+
+namespace fileindexd {
+
+struct ScriptedFile {
+  enum class State { WAITS, DONE, FAILED };
+  ContentJob job;
+  State state = State::WAITS;
+  int64_t tries = 0;  // begun, not taken back
+  std::string text;   // or the reason of a failure
+};
+
+struct ScriptedContents {
+  std::map<int64_t, ScriptedFile> entries;  // what TakeIn finds, by row
+  std::map<int64_t, ScriptedFile> kept;
+  std::map<int64_t, ScriptedFile> now;
+  std::vector<std::string> calls;
+  std::map<std::string, IndexError> failing;  // by the call's name: it fails so, until removed
+  size_t pending_bytes = 0;
+};
+
+// Those of a share, which all its writers write to.
+ScriptedContents& Scripted(const std::string& share = "a");
+void ForgetScripted();
+
+struct ScriptedPool {
+  std::list<ExtractJob> running;
+  std::vector<ExtractOutcome> outcomes;  // for the next Work
+  size_t room = 2;                       // for so many jobs
+  unsigned aborts = 0;
+  std::string left_out;
+  std::string opening_error;  // not empty: no pool can be opened
+
+  // The first job ends so.
+  void End(ExtractOutcome::Result result, const std::string& text);
+};
+
+// As the entries would have it.
+FileIdentity IdentityOf(const std::string& path);
+
+// The one of the process.
+ScriptedPool& Pool();
+
+}  // namespace fileindexd

@@ -1,0 +1,187 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <set>
+
+#include "tests/unit/search/scripted.h"
+
+namespace fileindexd {
+
+struct ContentsWriter::Impl {
+  ScriptedContents* contents = nullptr;  // null: closed
+  bool changed = false;
+  std::set<int64_t> out;  // given out and not ended
+  IndexError error = IndexError::NONE;
+
+  // False when the test wants this call to fail.
+  bool Call(const std::string& name, const std::string& about = "") {
+    contents->calls.push_back(about.empty() ? name : name + " " + about);
+    const auto found = contents->failing.find(name);
+    if (found != contents->failing.end()) {
+      error = found->second;
+      return false;
+    }
+    return true;
+  }
+
+  bool End(const char* name, int64_t file, ScriptedFile::State state, const std::string& text) {
+    if (!Call(name, std::to_string(file))) {
+      return false;
+    }
+    ScriptedFile& row = contents->now[file];
+    row.state = state;
+    row.text = text;
+    out.erase(file);
+    changed = true;
+    return true;
+  }
+};
+
+namespace {
+
+std::map<std::string, ScriptedContents>& All() {
+  static std::map<std::string, ScriptedContents> all;
+  return all;
+}
+
+}  // namespace
+
+ScriptedContents& Scripted(const std::string& share) {
+  return All()[share];
+}
+
+void ForgetScripted() {
+  for (auto& [share, contents] : All()) {
+    contents = {};  // writers may still know it
+  }
+}
+
+FileIdentity IdentityOf(const std::string& path) {
+  struct statx st {};
+  EXPECT_EQ(
+      statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, STATX_BASIC_STATS | STATX_BTIME, &st), 0);
+  const auto nanoseconds = [](const statx_timestamp& time) {
+    return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
+  };
+  const int64_t birth = (st.stx_mask & STATX_BTIME) != 0 ? nanoseconds(st.stx_btime) : 0;
+  return {st.stx_ino, birth, static_cast<int64_t>(st.stx_size), nanoseconds(st.stx_mtime)};
+}
+
+ContentsWriter::ContentsWriter() : impl(std::make_unique<Impl>()) {}
+ContentsWriter::~ContentsWriter() = default;
+
+IndexError ContentsWriter::Open(const Share& share, int64_t /*extractor_version*/) {
+  impl->contents = &Scripted(share.name);
+  if (!impl->Call("Open")) {
+    impl->contents = nullptr;
+    return impl->error;
+  }
+  impl->contents->now = impl->contents->kept;
+  return IndexError::NONE;
+}
+
+void ContentsWriter::Close() {
+  if (IsOpen()) {
+    (void)impl->Call("Close");
+  }
+  *impl = Impl();
+}
+
+bool ContentsWriter::IsOpen() const {
+  return impl->contents != nullptr;
+}
+
+bool ContentsWriter::TakeIn(size_t /*limit*/, bool& more) {
+  more = false;
+  if (!impl->Call("TakeIn")) {
+    return false;
+  }
+  for (const auto& [row, file] : impl->contents->entries) {
+    impl->changed = impl->contents->now.emplace(row, file).second || impl->changed;
+  }
+  return true;
+}
+
+void ContentsWriter::LookAtAll() {
+  (void)impl->Call("LookAtAll");
+}
+
+bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+  if (!impl->Call("NextJobs", std::to_string(limit))) {
+    return false;
+  }
+  for (const auto& [row, file] : impl->contents->now) {
+    if (jobs.size() < limit && file.state == ScriptedFile::State::WAITS &&
+        impl->out.insert(row).second) {
+      jobs.push_back(file.job);
+      jobs.back().file = row;
+    }
+  }
+  return true;
+}
+
+bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
+  for (const int64_t file : files) {
+    ++impl->contents->now[file].tries;
+  }
+  return impl->Call("BeginTries", std::to_string(files.size())) && Commit();
+}
+
+bool ContentsWriter::Finish(int64_t file, const Content& content) {
+  impl->contents->pending_bytes += content.text.size();
+  return impl->End("Finish", file, ScriptedFile::State::DONE, content.text);
+}
+
+bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& /*found*/,
+                          bool killed) {
+  const bool again = killed && impl->contents->now[file].tries < 2;
+  return impl->End("Fail", file, again ? ScriptedFile::State::WAITS : ScriptedFile::State::FAILED,
+                   reason);
+}
+
+bool ContentsWriter::Release(int64_t file) {
+  int64_t& tries = impl->contents->now[file].tries;
+  tries = tries > 0 ? tries - 1 : 0;
+  return impl->End("Release", file, ScriptedFile::State::WAITS, "");
+}
+
+bool ContentsWriter::RetryFailed() {
+  for (auto& [row, file] : impl->contents->now) {
+    if (file.state == ScriptedFile::State::FAILED) {
+      file.state = ScriptedFile::State::WAITS;
+    }
+  }
+  impl->changed = true;
+  return impl->Call("RetryFailed");
+}
+
+bool ContentsWriter::Sweep(int64_t /*now*/, size_t /*limit*/, bool& more) {
+  more = false;
+  return impl->Call("Sweep");
+}
+
+bool ContentsWriter::HasChanges() const {
+  return impl->changed;
+}
+
+size_t ContentsWriter::PendingBytes() const {
+  return impl->contents->pending_bytes;
+}
+
+bool ContentsWriter::Commit() {
+  if (!impl->Call("Commit")) {
+    return false;
+  }
+  impl->contents->kept = impl->contents->now;
+  impl->contents->pending_bytes = 0;
+  impl->changed = false;
+  return true;
+}
+
+IndexError ContentsWriter::Error() const {
+  return impl->error;
+}
+
+}  // namespace fileindexd

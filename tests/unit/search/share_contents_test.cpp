@@ -1,0 +1,381 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "search/share_contents.h"
+
+#include <gmock/gmock.h>
+
+#include <algorithm>
+#include <filesystem>
+
+#include "tests/unit/search/scripted.h"
+#include "tests/unit/state/fixture.h"
+
+namespace fileindexd {
+namespace {
+
+using std::chrono::milliseconds;
+using std::chrono::seconds;
+using testing::Contains;
+using testing::IsEmpty;
+using testing::Not;
+
+constexpr int64_t WALL = 1'900'000'000;
+
+class ShareContentsTest : public StateTest {
+ protected:
+  ShareContentsTest() : root(folder + "/share"), contents({"a", root, ""}) {
+    ForgetScripted();
+    std::filesystem::create_directory(root);
+    std::filesystem::create_directory(state_root);
+  }
+
+  // A file of the share that the entries know.
+  std::string AddFile(int64_t row) {
+    std::string path = root + "/f" + std::to_string(row);
+    WriteFile(path, "text " + std::to_string(row));
+    AddEntry(row, path);
+    return path;
+  }
+  void AddEntry(int64_t row, const std::string& path) {
+    Scripted().entries[row].job.identity = IdentityOf(path);
+    Scripted().entries[row].job.paths = {path};
+  }
+
+  // Works until the share waits for something else than its next slice.
+  void Settle() {
+    for (int slices = 0; slices < 100 && contents.Due() <= now; ++slices) {
+      contents.Work(now, WALL);
+    }
+  }
+  void Pass(milliseconds time) {
+    now += time;
+    Settle();
+  }
+  // Until what may have been told of too early would have been seen.
+  void Quieten() {
+    for (int second = 0; second < 10; ++second) {
+      Pass(seconds(1));
+      EXPECT_THAT(GiveOut(), IsEmpty());
+    }
+    Settle();
+  }
+  // The rows that are given out.
+  std::vector<uint64_t> GiveOut(size_t most = 100) {
+    std::vector<uint64_t> ids;
+    while (ids.size() < most) {
+      ExtractJob job;
+      if (!contents.Next(now, last_id + 1, job)) {
+        break;
+      }
+      ids.push_back(++last_id);
+      names.push_back(job.name);
+    }
+    return ids;
+  }
+  void End(uint64_t id, ExtractOutcome::Result result, const std::string& text = "words") {
+    ExtractOutcome outcome;
+    outcome.id = id;
+    outcome.result = result;
+    outcome.content.text = text;
+    outcome.reason = "the reason";
+    contents.End(std::move(outcome), now);
+  }
+
+  size_t Count(const std::string& call) {
+    return static_cast<size_t>(std::count(Scripted().calls.begin(), Scripted().calls.end(), call));
+  }
+  ScriptedFile Kept(int64_t row) {
+    const auto found = Scripted().kept.find(row);
+    return found != Scripted().kept.end() ? found->second : ScriptedFile();
+  }
+
+  std::string root;
+  ShareContents contents;
+  Time now = Time(std::chrono::hours(1));
+  uint64_t last_id = 0;
+  std::vector<std::string> names;
+};
+
+TEST_F(ShareContentsTest, AFileIsReadAndWrittenDown) {
+  AddFile(1);
+  Settle();
+
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  EXPECT_EQ(names, std::vector<std::string>{"f1"});
+  EXPECT_EQ(Kept(1).tries, 1);  // on record before it is read
+  End(ids[0], ExtractOutcome::Result::DONE, "words");
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);  // nothing else comes: at once
+  EXPECT_EQ(Kept(1).text, "words");
+}
+
+TEST_F(ShareContentsTest, WhileWorkFlowsResultsAreCommittedAfterHalfASecondAtMost) {
+  AddFile(1);
+  AddFile(2);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 2U);
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
+  EXPECT_LE(contents.Due() - now, milliseconds(500));
+  Pass(milliseconds(500));
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+}
+
+TEST_F(ShareContentsTest, MuchTextIsCommittedAtOnce) {
+  AddFile(1);
+  AddFile(2);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 2U);
+
+  End(ids[0], ExtractOutcome::Result::DONE, std::string(9 << 20, 'x'));
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+}
+
+TEST_F(ShareContentsTest, AFileThatChangesWhileItIsReadWaitsAgain) {
+  const std::string path = AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+
+  WriteFile(path, "longer than before");
+  End(ids[0], ExtractOutcome::Result::DONE);
+  Pass(milliseconds(500));
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
+  EXPECT_EQ(Kept(1).tries, 0);
+  EXPECT_THAT(GiveOut(), IsEmpty());  // not at once: whoever writes it is still at it
+}
+
+TEST_F(ShareContentsTest, AFileThatIsAnotherThanTheIndexKnowsIsNotTried) {
+  AddFile(1);
+  WriteFile(root + "/f1", "longer than before");
+  Settle();
+
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_THAT(Scripted().calls, Not(Contains("BeginTries 1")));
+
+  AddEntry(2, root + "/f1");
+  contents.EntriesChanged();
+  Pass(milliseconds(200));
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AFileThatCameBackIsReadLater) {
+  const std::string path = AddFile(1);
+  std::filesystem::rename(path, path + "x");
+  Settle();
+  EXPECT_THAT(GiveOut(), IsEmpty());
+
+  std::filesystem::rename(path + "x", path);
+  Pass(seconds(3));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, WhatKillsHelpersTwiceIsNotTriedAgain) {
+  AddFile(1);
+  Settle();
+  for (int time = 0; time < 2; ++time) {
+    const auto ids = GiveOut();
+    ASSERT_EQ(ids.size(), 1U) << time;
+    End(ids[0], ExtractOutcome::Result::KILLED);
+    Pass(milliseconds(500));
+  }
+
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::FAILED);
+  EXPECT_EQ(Kept(1).text, "the reason");
+}
+
+TEST_F(ShareContentsTest, AHelperThatTheHostTookCostsNoTry) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+
+  End(ids[0], ExtractOutcome::Result::LOST);
+  Pass(milliseconds(500));
+  EXPECT_EQ(Kept(1).tries, 0);
+  (void)GiveOut();
+  Pass(seconds(3));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AHaltTakesBackWhatIsGivenOut) {
+  for (int64_t row = 1; row <= 4; ++row) {
+    AddFile(row);
+  }
+  Settle();
+  const auto ids = GiveOut(2);
+  ASSERT_EQ(ids.size(), 2U);
+  EXPECT_EQ(Kept(1).tries + Kept(2).tries + Kept(3).tries + Kept(4).tries, 4);
+
+  contents.Halt();
+  End(ids[0], ExtractOutcome::Result::DONE);  // too late
+
+  for (int64_t row = 1; row <= 4; ++row) {
+    EXPECT_EQ(Kept(row).tries, 0) << row;
+    EXPECT_EQ(Kept(row).state, ScriptedFile::State::WAITS) << row;
+  }
+  Settle();
+  EXPECT_EQ(GiveOut().size(), 4U);
+}
+
+TEST_F(ShareContentsTest, AFailingDatabaseRestsLongerEachTimeAndGoesOn) {
+  AddFile(1);
+  Scripted().failing["Open"] = IndexError::IO;
+  Settle();
+  const Time first = contents.Due();
+  EXPECT_GT(first, now);
+  now = first;
+  Settle();
+  EXPECT_GE(contents.Due() - now, 2 * seconds(1));
+
+  Scripted().failing.clear();
+  now = contents.Due();
+  Settle();
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AFailureAtAnyCallLosesNothing) {
+  for (const char* call : {"TakeIn", "Sweep", "NextJobs", "BeginTries", "Finish", "Commit"}) {
+    ForgetScripted();
+    ShareContents fresh({"a", root, ""});
+    const auto run = [&] {
+      for (int round = 0; round < 20; ++round, now += seconds(2)) {
+        fresh.Work(now, WALL);
+        ExtractJob job;
+        if (fresh.Next(now, ++last_id, job)) {
+          ExtractOutcome outcome;
+          outcome.id = last_id;
+          outcome.result = ExtractOutcome::Result::DONE;
+          fresh.End(std::move(outcome), now);
+        }
+      }
+    };
+    AddFile(1);
+    Scripted().failing[call] = IndexError::FULL;
+    run();
+    EXPECT_NE(Kept(1).state, ScriptedFile::State::DONE) << call;
+
+    Scripted().failing.clear();
+    now += seconds(100);
+    run();
+    EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE) << call;
+  }
+}
+
+TEST_F(ShareContentsTest, WithoutEntriesItWaitsForThem) {
+  AddFile(1);
+  Scripted().failing["Open"] = IndexError::PATH_NOT_FOUND;
+  Settle();
+  Pass(seconds(30));
+  EXPECT_EQ(Count("Open"), 1U);
+
+  Scripted().failing.clear();
+  contents.EntriesChanged();
+  Settle();
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AMissingRootIsNotTakenForMissingFiles) {
+  AddFile(1);
+  Settle();
+  std::filesystem::rename(root, root + ".away");
+
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_FALSE(contents.MayHaveJobs(now));  // rests
+  std::filesystem::rename(root + ".away", root);
+  Pass(seconds(100));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AShareLowOnSpaceGetsNoContents) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+
+  contents.Set(contents.share, true, false);
+  End(ids[0], ExtractOutcome::Result::DONE);
+  EXPECT_EQ(contents.Due(), Time::max());
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
+
+  contents.Set(contents.share, false, false);
+  Settle();
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AWishToRetryIsFulfilledOnce) {
+  AddFile(1);
+  Scripted().kept = Scripted().entries;
+  Scripted().kept[1].state = ScriptedFile::State::FAILED;
+  Settle();
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_FALSE(contents.TakeRetried());
+
+  contents.Set(contents.share, false, true);
+  Settle();
+
+  EXPECT_TRUE(contents.TakeRetried());
+  EXPECT_FALSE(contents.TakeRetried());
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, WhatIsToldOfBeforeItCountsIsSeenALittleLater) {
+  Settle();
+  contents.EntriesChanged();
+  Pass(milliseconds(200));
+  AddFile(1);  // the commit's end, which nothing tells of
+
+  Pass(seconds(2));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AllIsLookedAtOnceADay) {
+  Quieten();
+  EXPECT_EQ(Count("LookAtAll"), 1U);
+  Pass(std::chrono::hours(23));
+  EXPECT_EQ(Count("LookAtAll"), 1U);
+
+  Pass(std::chrono::hours(2));
+
+  EXPECT_EQ(Count("LookAtAll"), 2U);
+}
+
+TEST_F(ShareContentsTest, WithNothingToDoItClosesAndSleeps) {
+  Settle();
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  Quieten();
+  Pass(seconds(11));
+
+  EXPECT_EQ(Count("Close"), 1U);
+  EXPECT_GT(contents.Due() - now, std::chrono::hours(20));
+  contents.EntriesChanged();
+  Settle();
+  EXPECT_EQ(Count("Open"), 2U);
+  EXPECT_EQ(Count("LookAtAll"), 1U);
+}
+
+TEST_F(ShareContentsTest, QuickFilesAreGivenOutInLargerBatches) {
+  for (int64_t row = 1; row <= 300; ++row) {
+    AddFile(row);
+  }
+  Settle();
+  EXPECT_EQ(GiveOut(300).size(), 300U);
+
+  EXPECT_EQ(Count("NextJobs 4"), 1U);
+  EXPECT_GT(Count("NextJobs 64"), 1U);
+  EXPECT_EQ(Count("NextJobs 128"), 0U);
+}
+
+}  // namespace
+}  // namespace fileindexd
