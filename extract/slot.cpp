@@ -25,9 +25,9 @@ using Result = ExtractOutcome::Result;
 constexpr unsigned JOBS_OF_A_HELPER = 500;
 // A process that ends closes its socket a moment before it is seen to have ended.
 constexpr std::chrono::seconds GRACE(2);
-// Somebody who kills helpers means no file. Something that has them killed again and again at one
-// file, such as a host short of memory, may be that file's doing.
-constexpr int OUTSIDE_KILLS = 3;
+// Who ends before it has begun, or is killed by somebody, tells nothing about the file. Killed
+// again and again at the same one, as by a host short of memory, it may be that file's doing.
+constexpr int LOST_HELPERS = 3;
 
 std::string ErrorText() {
   return std::generic_category().message(errno);
@@ -58,7 +58,7 @@ std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now
   current.name = std::move(job.name);
   current.file.Swap(job.file);
   deadline = now + options.deadline;
-  outside_kills = 0;
+  lost_helpers = 0;
   return Begin();
 }
 
@@ -78,6 +78,7 @@ bool Slot::Hand(int file, const std::string& name, std::string& error) {
   if (!is_old && !Start(error)) {
     return false;
   }
+  has_begun = false;
   if (Send(file, name)) {
     return true;
   }
@@ -189,23 +190,38 @@ std::optional<ExtractOutcome> Slot::TakeFrames() {
       return Nonsense(fault);
     }
     received.erase(0, size);
-    if (!answer->is_ready) {
-      return TakeAnswer(*answer);
+    if (auto outcome = Take(*answer)) {
+      return outcome;
     }
-    if (is_ready) {
-      return Nonsense("a second greeting");
-    }
-    is_ready = true;
-    left_out = answer->left_out;
   }
 }
 
-std::optional<ExtractOutcome> Slot::TakeAnswer(Answer& answer) {
+std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
   const bool is_asked = stage == Stage::READING || stage == Stage::READING_RESULT;
-  if (!is_ready || !is_asked || !received.empty()) {
-    return Nonsense("an answer that was not asked for");
+  switch (answer.sort) {
+    case Answer::Sort::READY:
+      if (is_ready) {
+        return Nonsense("a second greeting");
+      }
+      is_ready = true;
+      left_out = answer.left_out;
+      return std::nullopt;
+    case Answer::Sort::BEGUN:
+      if (!is_ready || !is_asked || has_begun) {
+        return Nonsense("it begins what it was not asked for");
+      }
+      has_begun = true;
+      return std::nullopt;
+    case Answer::Sort::ANSWER:
+      if (!is_asked || !has_begun || !received.empty()) {
+        return Nonsense("an answer that was not asked for");
+      }
+      return TakeAnswer(answer);
   }
+  return std::nullopt;
+}
 
+std::optional<ExtractOutcome> Slot::TakeAnswer(Answer& answer) {
   ++jobs_done;
   if (stage == Stage::READING_RESULT) {
     Merge(found, answer.content, options.text_cap);
@@ -254,7 +270,7 @@ std::optional<ExtractOutcome> Slot::AwaitConverter() {
     return std::nullopt;
   }
 
-  if (IsKilledFromOutside(*status) && ++outside_kills <= OUTSIDE_KILLS) {
+  if (IsKilledFromOutside(*status) && ++lost_helpers <= LOST_HELPERS) {
     return StartConverter(converter_name);
   }
   if (*status == EXIT_DOORS << 8) {
@@ -288,11 +304,11 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
   if (stage != Stage::READING && stage != Stage::READING_RESULT) {
     return std::nullopt;  // the next job starts another
   }
-  if (IsKilledFromOutside(status) && ++outside_kills <= OUTSIDE_KILLS) {
-    return stage == Stage::READING ? Begin() : BeginResult();
-  }
   if (!is_ready) {
     return End(Result::LOST, options.program + ": does not start: " + StatusText(status));
+  }
+  if ((!has_begun || IsKilledFromOutside(status)) && ++lost_helpers <= LOST_HELPERS) {
+    return stage == Stage::READING ? Begin() : BeginResult();
   }
   if (status == EXIT_MEMORY << 8) {
     return End(Result::KILLED, "needs more memory than is allowed");
@@ -309,7 +325,6 @@ std::optional<ExtractOutcome> Slot::Overdue() {
     return End(Result::FAILED, converter_name + ": " + took);
   }
 
-  const bool has_begun = is_ready;
   DropHelper();
   return has_begun ? End(Result::KILLED, took)
                    : End(Result::LOST, options.program + ": does not start in time");
