@@ -99,7 +99,7 @@ TEST_F(PoolTest, AKillFromOutsideIsNotTheFilesFault) {
 
 TEST_F(PoolTest, AnIdleHelperThatIsGoneIsReplacedUnseen) {
   const pid_t helper = std::stoi(Run("pid").content.text);
-  ASSERT_EQ(kill(helper, SIGSEGV), 0);
+  ASSERT_EQ(kill(helper, SIGUSR1), 0);
   const ExtractOutcome next = Run("pid");
   EXPECT_EQ(Told(next), "done");
   EXPECT_NE(std::stoi(next.content.text), helper);

@@ -23,6 +23,7 @@
 #include "extract/answer.h"
 #include "extract/child.h"
 #include "extract/helper_codes.h"
+#include "extract/sanitized.h"
 
 namespace fileindexd {
 
@@ -60,6 +61,10 @@ std::string State() {
   std::string state;
   for (int number = 1; number < 32; ++number) {
     struct sigaction action = {};
+    // A sanitizer wants to tell of its own.
+    if (IS_SANITIZED && (number == SIGSEGV || number == SIGBUS || number == SIGFPE)) {
+      continue;
+    }
     if (sigaction(number, nullptr, &action) == 0 && action.sa_handler != SIG_DFL) {
       state += "signal" + std::to_string(number) + " ";
     }
