@@ -84,30 +84,13 @@ bool Slot::Hand(int file, const std::string& name, std::string& error) {
   }
 
   const bool is_gone = errno == EPIPE;
+  if (is_gone && !is_old) {
+    return true;  // its end will be judged
+  }
   error = "helper: " + ErrorText();
   DropHelper();
   // One that ended while it had nothing to do has nothing to do with this file.
-  return is_old && is_gone && Hand(file, name, error);
-}
-
-bool Slot::Start(std::string& error) {
-  int ends[2] = {-1, -1};
-  if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
-    error = "socket: " + ErrorText();
-    return false;
-  }
-
-  ScopedFd ours(ends[0]);
-  const ScopedFd theirs(ends[1]);
-  if (!StartChild(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
-    return false;
-  }
-  socket.Swap(ours);
-  received.clear();
-  is_ready = false;
-  closing = false;
-  jobs_done = 0;
-  return true;
+  return is_gone && Hand(file, name, error);
 }
 
 // The message is small and the socket empty: it goes as a whole or not at all. False with errno.
