@@ -24,11 +24,9 @@ inline void KeepCapabilityHalf(uint32_t wanted, __user_cap_data_struct& half) {
   half.inheritable = 0;
 }
 
-// Drops all capabilities but the wanted ones from all sets, the bounding set included where that is
-// allowed. What the process does not have cannot be had; whoever needs it says so. False with
-// errno.
-inline bool KeepCapabilities(uint64_t wanted) {
-  // The bounding set first: changing it takes a capability that goes with the others.
+// Drops all capabilities but the wanted ones from the bounding set, where the process may do that:
+// before it gives up the capability for it. False with errno.
+inline bool BoundCapabilities(uint64_t wanted) {
   int is_bound = 0;
   for (int capability = 0; is_bound >= 0; ++capability) {
     is_bound = prctl(PR_CAPBSET_READ, capability, 0, 0, 0);  // negative beyond the last
@@ -37,6 +35,12 @@ inline bool KeepCapabilities(uint64_t wanted) {
       return false;
     }
   }
+  return true;
+}
+
+// The same for all other sets. What the process does not have cannot be had; whoever needs it says
+// so. False with errno.
+inline bool KeepCapabilities(uint64_t wanted) {
   // Kernels without ambient capabilities have none to clear.
   if (prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0) != 0 && errno != EINVAL) {
     return false;

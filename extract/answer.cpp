@@ -70,6 +70,25 @@ void AppendFields(std::string& frame, const Content& content) {
   }
 }
 
+void AppendContent(std::string& body, const Answer& answer) {
+  const Content& content = answer.content;
+  AppendFields(body, content);
+  if (!content.text.empty()) {
+    AppendRecord(body, TAG_TEXT, content.text);
+  }
+  if (content.is_cut) {
+    AppendRecord(body, TAG_CUT, "");
+  }
+  AppendRecord(body, TAG_KIND, std::string(1, static_cast<char>(content.kind)));
+  AppendNumberRecord(body, TAG_SAMPLE, content.sample);
+  if (!answer.converter.empty()) {
+    AppendRecord(body, TAG_CONVERTER, answer.converter);
+  }
+  if (answer.has_failed) {
+    AppendRecord(body, TAG_FAILED, CleanReason(answer.reason));
+  }
+}
+
 bool IsCleanWithin(std::string_view value, size_t limit) {
   return !value.empty() && value.size() <= limit && IsCleanText(value);
 }
@@ -100,7 +119,7 @@ bool TakeReady(std::string_view value, Answer& answer) {
   if (value.empty() || static_cast<uint8_t>(value[0]) != ANSWER_VERSION) {
     return false;
   }
-  answer.is_ready = true;
+  answer.sort = Answer::Sort::READY;
   answer.left_out = value.substr(1);
   return answer.left_out.size() <= MAX_REASON && IsCleanText(answer.left_out);
 }
@@ -129,6 +148,9 @@ bool TakeRecord(uint8_t tag, std::string_view value, size_t text_cap, Answer& an
       answer.has_failed = true;
       answer.reason = value;
       return IsCleanWithin(value, MAX_REASON);
+    case TAG_BEGUN:
+      answer.sort = Answer::Sort::BEGUN;
+      return value.empty();
     case TAG_READY:
       return TakeReady(value, answer);
     default:
@@ -159,26 +181,18 @@ std::optional<JobOrder> DecodeJob(std::string_view frame) {
 
 std::string EncodeAnswer(const Answer& answer) {
   std::string body;
-  if (answer.is_ready) {
-    const std::string left_out = answer.left_out.empty() ? "" : CleanReason(answer.left_out);
-    AppendRecord(body, TAG_READY, static_cast<char>(ANSWER_VERSION) + left_out);
-  } else {
-    const Content& content = answer.content;
-    AppendFields(body, content);
-    if (!content.text.empty()) {
-      AppendRecord(body, TAG_TEXT, content.text);
+  switch (answer.sort) {
+    case Answer::Sort::READY: {
+      const std::string left_out = answer.left_out.empty() ? "" : CleanReason(answer.left_out);
+      AppendRecord(body, TAG_READY, static_cast<char>(ANSWER_VERSION) + left_out);
+      break;
     }
-    if (content.is_cut) {
-      AppendRecord(body, TAG_CUT, "");
-    }
-    AppendRecord(body, TAG_KIND, std::string(1, static_cast<char>(content.kind)));
-    AppendNumberRecord(body, TAG_SAMPLE, content.sample);
-    if (!answer.converter.empty()) {
-      AppendRecord(body, TAG_CONVERTER, answer.converter);
-    }
-    if (answer.has_failed) {
-      AppendRecord(body, TAG_FAILED, CleanReason(answer.reason));
-    }
+    case Answer::Sort::BEGUN:
+      AppendRecord(body, TAG_BEGUN, "");
+      break;
+    case Answer::Sort::ANSWER:
+      AppendContent(body, answer);
+      break;
   }
 
   std::string frame;
@@ -223,15 +237,15 @@ std::optional<Answer> DecodeAnswer(std::string_view frame, size_t text_cap, std:
     if (!TakeRecord(tag, rest.substr(0, size), text_cap, answer)) {
       return refuse("record " + std::to_string(tag) + " with a wrong value");
     }
-    if (tag == TAG_READY && last != 0) {
-      return refuse("a greeting within an answer");
+    if (answer.sort != Answer::Sort::ANSWER && last != 0) {
+      return refuse("more than one record where one stands alone");
     }
     has_kind = has_kind || tag == TAG_KIND;
     has_sample = has_sample || tag == TAG_SAMPLE;
     last = tag;
     rest.remove_prefix(size);
   }
-  if (!answer.is_ready && (!has_kind || !has_sample)) {
+  if (answer.sort == Answer::Sort::ANSWER && (!has_kind || !has_sample)) {
     return refuse("an answer without kind or sample");
   }
   return answer;

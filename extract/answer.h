@@ -2,10 +2,12 @@
 // What the service and its closed helper say to each other, over a stream socket.
 //
 //   service:  job*                    one at a time: the next after the answer
-//   helper:   ready answer*
+//   helper:   ready (begun answer)*
 //
 //   job     = length text-cap name    in one message, the file's descriptor with it
 //   ready   = length record           READY alone
+//   begun   = length record           BEGUN alone: it has the job, and whatever happens to it now
+//                                     may be the file's doing
 //   answer  = length record*          KIND and SAMPLE at least
 //   record  = tag size value
 //
@@ -24,6 +26,7 @@
 //   SAMPLE         8 bytes
 //   CONVERTER      name of a program that reads the file's text better, 1 to MAX_REASON bytes
 //   FAILED         the file cannot be read, and why: clean, 1 to MAX_REASON bytes
+//   BEGUN          empty
 //   READY          1 byte ANSWER_VERSION, and which formats are left out: clean, up to MAX_REASON
 //
 // Numbers are little-endian. The helper may have been taken over by a file: whoever receives from
@@ -47,7 +50,8 @@ constexpr uint8_t TAG_KIND = 130;
 constexpr uint8_t TAG_SAMPLE = 131;
 constexpr uint8_t TAG_CONVERTER = 132;
 constexpr uint8_t TAG_FAILED = 133;
-constexpr uint8_t TAG_READY = 134;
+constexpr uint8_t TAG_BEGUN = 134;
+constexpr uint8_t TAG_READY = 135;
 
 constexpr size_t MAX_JOB_NAME = 4096;
 constexpr size_t MAX_REASON = 512;
@@ -58,8 +62,10 @@ struct JobOrder {
 };
 
 struct Answer {
-  bool is_ready = false;  // a greeting: of the rest only left_out counts
-  std::string left_out;
+  enum class Sort { ANSWER, BEGUN, READY };
+
+  Sort sort = Sort::ANSWER;
+  std::string left_out;  // of READY; the rest is of ANSWER
   Content content;
   std::string converter;
   bool has_failed = false;

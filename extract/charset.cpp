@@ -73,6 +73,10 @@ bool IsAscii(std::string_view bytes) {
                      [](char byte) { return static_cast<unsigned char>(byte) < 0x80; });
 }
 
+bool HasShifts(std::string_view bytes) {
+  return bytes.find("\x1B$") != std::string_view::npos;
+}
+
 bool CouldBeUtf8(std::string_view bytes) {
   while (!bytes.empty()) {
     const Character character = FirstCharacter(bytes);

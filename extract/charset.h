@@ -19,6 +19,8 @@ bool LooksBinary(std::string_view bytes);
 const char* WideCharset(std::string_view bytes);
 
 bool IsAscii(std::string_view bytes);
+// Sequences that change the meaning of the seven-bit bytes behind them.
+bool HasShifts(std::string_view bytes);
 // The last character may be cut.
 bool CouldBeUtf8(std::string_view bytes);
 // Of bytes that are no UTF-8; never empty.

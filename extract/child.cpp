@@ -80,10 +80,12 @@ class SpawnPlan {
 // Text is UTF-8, and clocks without a zone count as UTC, whatever the service was started with.
 std::vector<std::string> Environment() {
   std::vector<std::string> set = {"PATH=/usr/bin:/bin", "LC_ALL=C.UTF-8", "TZ=UTC0", "HOME=/"};
-  for (const char* name : {"ASAN_OPTIONS", "UBSAN_OPTIONS", "TSAN_OPTIONS"}) {
-    const char* value = getenv(name);  // NOLINT(concurrency-mt-unsafe): nobody sets variables
-    if (IS_SANITIZED && value != nullptr) {
-      set.push_back(std::string(name) + "=" + value);
+  if constexpr (IS_SANITIZED) {
+    for (const char* name : {"ASAN_OPTIONS", "UBSAN_OPTIONS", "TSAN_OPTIONS"}) {
+      const char* value = getenv(name);  // NOLINT(concurrency-mt-unsafe): nobody sets variables
+      if (value != nullptr) {
+        set.push_back(std::string(name) + "=" + value);
+      }
     }
   }
   return set;

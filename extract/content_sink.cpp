@@ -100,10 +100,10 @@ void ContentSink::AddText(std::string_view bytes) {
 void ContentSink::Append(std::string_view word) {
   std::string& text = content.text;
   const size_t ended = text.size();
-  if (is_apart && !text.empty() && text.size() < text_cap) {
+  const bool begins = is_apart;
+  if (begins && !text.empty() && text.size() < text_cap) {
     text += ' ';
   }
-  const size_t blank = is_apart ? ended : text.rfind(' ');
   is_apart = false;
   const std::string_view fitting = CutText(word, text_cap - text.size());
   text += fitting;
@@ -112,6 +112,7 @@ void ContentSink::Append(std::string_view word) {
   }
 
   content.is_cut = true;
+  const size_t blank = begins ? ended : text.rfind(' ');
   if (blank != std::string::npos && text.size() - blank <= LONGEST_WORD) {
     text.resize(blank);
   }

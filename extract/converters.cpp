@@ -16,14 +16,14 @@ namespace {
 
 const std::array<Converter, 4>& Converters() {
   // UTF-8 as the charset of what comes out; lines as long as their paragraphs; bare cells.
-  static const std::array<Converter, 4> CONVERTERS = {{
+  static const std::array<Converter, 4> converters = {{
       {"catdoc", {"-w", "-dutf-8"}, "converted.txt"},
       {"xls2csv", {"-q0", "-dutf-8"}, "converted.txt"},
       {"catppt", {"-dutf-8"}, "converted.txt"},
       // As plain text it writes a mixture of charsets; pictures would be files.
       {"unrtf", {"--nopict", "--html"}, "converted.html"},
   }};
-  return CONVERTERS;
+  return converters;
 }
 
 }  // namespace

@@ -84,6 +84,9 @@ class Decoding {
     }
     if (!is_settled && !IsAscii(bytes)) {
       Settle(CouldBeUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
+      Settle("WINDOWS-1252");  // where that is one which the C library does not know
+    } else if (!is_settled && HasShifts(bytes)) {
+      Settle(GuessCharset(bytes));
     }
     text = converter.IsOpen() ? converter.Convert(bytes) : std::string(bytes);
     return true;
@@ -95,7 +98,7 @@ class Decoding {
     if (charset.empty() || is_settled) {
       return;
     }
-    is_settled = charset == "UTF-8" || converter.Open(charset) || converter.Open("WINDOWS-1252");
+    is_settled = charset == "UTF-8" || converter.Open(charset);
     is_wide = charset.starts_with("UTF-16") || charset.starts_with("UTF-32");
   }
 

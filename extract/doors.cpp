@@ -67,7 +67,6 @@ bool CloseDoors(Doors& doors, std::string& error) {
   // The order matters: an own root takes a capability; Landlock's rules are made while everything
   // can be named, and hold once no new privileges can be had; limits on processes count against the
   // user, and are refused by none; the system calls go last.
-  (void)umask(S_IRWXG | S_IRWXO);
   const RunTimeFiles files = FindRunTimeFiles(doors.converter);
   LandlockRules rules;
   const bool has_landlock = doors.has_landlock && LandlockVersion() >= 1;
@@ -83,6 +82,10 @@ bool CloseDoors(Doors& doors, std::string& error) {
     return false;
   }
 
+  (void)umask(S_IRWXG | S_IRWXO);
+  if (!BoundCapabilities(0)) {
+    return Failed("capabilities", error);
+  }
   if (!LeaveUser(error)) {
     return false;
   }

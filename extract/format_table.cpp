@@ -52,7 +52,8 @@ constexpr EndingRow ENDINGS[] = {
     {Format::VIDEO,
      "mp4 m4v mp4v mov qt avi divx xvid mkv mk3d webm wmv asf flv f4v mpg mpeg mpe m1v m2v mpv "
      "mp2v "
-     "vob evo ts tp trp m2t m2ts mts tod 3gp 3gpp 3g2 3gp2 ogv ogm ogx rm rmvb dv mxf mka weba"},
+     "vob evo ts tp trp m2t m2ts mts tod 3gp 3gpp 3g2 3gp2 ogv ogm ogx rm rmvb dv mxf mka weba "
+     "ac3 eac3 dts amr"},
     {Format::PHOTO,
      "jpg jpeg jpe jfif jif png tif tiff webp heic heif heics heifs hif avif avifs gif bmp dib jp2 "
      "psd tga pgf raw dng cr2 cr3 crw nef nrw arw sr2 srf srw orf raf rw2 rwl pef ptx dcr kdc 3fr "

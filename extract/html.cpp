@@ -164,6 +164,8 @@ bool ReadHtml(const Document& document, ContentSink& sink, std::string& why) {
                                              HTML_PARSE_NOWARNING | HTML_PARSE_NONET |
                                              HTML_PARSE_IGNORE_ENC);
 
+  // A page that begins with a stray end of something would count as empty.
+  (void)htmlParseChunk(parser.get(), "<html>", 6, 0);
   const bool is_read = DecodeText(
       document, DeclaredCharset,
       [&](std::string_view text) {

@@ -117,7 +117,7 @@ int Serve(int parent) {
   }
 
   Answer greeting;
-  greeting.is_ready = true;
+  greeting.sort = Answer::Sort::READY;
   if (!doors.can_open_files) {
     LeaveOutFileUsers();
     greeting.left_out =
@@ -127,10 +127,13 @@ int Serve(int parent) {
   if (!SendAll(EncodeAnswer(greeting))) {
     return 0;
   }
+  Answer begun;
+  begun.sort = Answer::Sort::BEGUN;
   while (true) {
     ScopedFd file;
     const std::optional<JobOrder> job = ReceiveJob(file);
-    if (!job || !RefreshProcessorTime() || !Answered(*job, file.fd)) {
+    if (!job || !RefreshProcessorTime() || !SendAll(EncodeAnswer(begun)) ||
+        !Answered(*job, file.fd)) {
       return 0;
     }
   }

@@ -98,6 +98,7 @@ bool Enter() {
 }  // namespace
 
 bool EnterOwnRoot(const RunTimeFiles& files, std::string& error) {
+  (void)umask(S_IWGRP | S_IWOTH);  // whoever the process becomes goes through its folders
   if (!EnterNamespace()) {
     return Failed("mount namespace", error);
   }

@@ -25,9 +25,9 @@ using Result = ExtractOutcome::Result;
 constexpr unsigned JOBS_OF_A_HELPER = 500;
 // A process that ends closes its socket a moment before it is seen to have ended.
 constexpr std::chrono::seconds GRACE(2);
-// Somebody who kills helpers means no file. Something that has them killed again and again at one
-// file, such as a host short of memory, may be that file's doing.
-constexpr int OUTSIDE_KILLS = 3;
+// Who ends before it has begun, or is killed by somebody, tells nothing about the file. Killed
+// again and again at the same one, as by a host short of memory, it may be that file's doing.
+constexpr int LOST_HELPERS = 3;
 
 std::string ErrorText() {
   return std::generic_category().message(errno);
@@ -58,7 +58,7 @@ std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now
   current.name = std::move(job.name);
   current.file.Swap(job.file);
   deadline = now + options.deadline;
-  outside_kills = 0;
+  lost_helpers = 0;
   return Begin();
 }
 
@@ -78,35 +78,19 @@ bool Slot::Hand(int file, const std::string& name, std::string& error) {
   if (!is_old && !Start(error)) {
     return false;
   }
+  has_begun = false;
   if (Send(file, name)) {
     return true;
   }
 
   const bool is_gone = errno == EPIPE;
+  if (is_gone && !is_old) {
+    return true;  // its end will be judged
+  }
   error = "helper: " + ErrorText();
   DropHelper();
   // One that ended while it had nothing to do has nothing to do with this file.
-  return is_old && is_gone && Hand(file, name, error);
-}
-
-bool Slot::Start(std::string& error) {
-  int ends[2] = {-1, -1};
-  if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
-    error = "socket: " + ErrorText();
-    return false;
-  }
-
-  ScopedFd ours(ends[0]);
-  const ScopedFd theirs(ends[1]);
-  if (!StartChild(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
-    return false;
-  }
-  socket.Swap(ours);
-  received.clear();
-  is_ready = false;
-  closing = false;
-  jobs_done = 0;
-  return true;
+  return is_gone && Hand(file, name, error);
 }
 
 // The message is small and the socket empty: it goes as a whole or not at all. False with errno.
@@ -189,23 +173,38 @@ std::optional<ExtractOutcome> Slot::TakeFrames() {
       return Nonsense(fault);
     }
     received.erase(0, size);
-    if (!answer->is_ready) {
-      return TakeAnswer(*answer);
+    if (auto outcome = Take(*answer)) {
+      return outcome;
     }
-    if (is_ready) {
-      return Nonsense("a second greeting");
-    }
-    is_ready = true;
-    left_out = answer->left_out;
   }
 }
 
-std::optional<ExtractOutcome> Slot::TakeAnswer(Answer& answer) {
+std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
   const bool is_asked = stage == Stage::READING || stage == Stage::READING_RESULT;
-  if (!is_ready || !is_asked || !received.empty()) {
-    return Nonsense("an answer that was not asked for");
+  switch (answer.sort) {
+    case Answer::Sort::READY:
+      if (is_ready) {
+        return Nonsense("a second greeting");
+      }
+      is_ready = true;
+      left_out = answer.left_out;
+      return std::nullopt;
+    case Answer::Sort::BEGUN:
+      if (!is_ready || !is_asked || has_begun) {
+        return Nonsense("it begins what it was not asked for");
+      }
+      has_begun = true;
+      return std::nullopt;
+    case Answer::Sort::ANSWER:
+      if (!is_asked || !has_begun || !received.empty()) {
+        return Nonsense("an answer that was not asked for");
+      }
+      return TakeAnswer(answer);
   }
+  return std::nullopt;
+}
 
+std::optional<ExtractOutcome> Slot::TakeAnswer(Answer& answer) {
   ++jobs_done;
   if (stage == Stage::READING_RESULT) {
     Merge(found, answer.content, options.text_cap);
@@ -254,7 +253,7 @@ std::optional<ExtractOutcome> Slot::AwaitConverter() {
     return std::nullopt;
   }
 
-  if (IsKilledFromOutside(*status) && ++outside_kills <= OUTSIDE_KILLS) {
+  if (IsKilledFromOutside(*status) && ++lost_helpers <= LOST_HELPERS) {
     return StartConverter(converter_name);
   }
   if (*status == EXIT_DOORS << 8) {
@@ -288,11 +287,11 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
   if (stage != Stage::READING && stage != Stage::READING_RESULT) {
     return std::nullopt;  // the next job starts another
   }
-  if (IsKilledFromOutside(status) && ++outside_kills <= OUTSIDE_KILLS) {
-    return stage == Stage::READING ? Begin() : BeginResult();
-  }
   if (!is_ready) {
     return End(Result::LOST, options.program + ": does not start: " + StatusText(status));
+  }
+  if ((!has_begun || IsKilledFromOutside(status)) && ++lost_helpers <= LOST_HELPERS) {
+    return stage == Stage::READING ? Begin() : BeginResult();
   }
   if (status == EXIT_MEMORY << 8) {
     return End(Result::KILLED, "needs more memory than is allowed");
@@ -309,7 +308,6 @@ std::optional<ExtractOutcome> Slot::Overdue() {
     return End(Result::FAILED, converter_name + ": " + took);
   }
 
-  const bool has_begun = is_ready;
   DropHelper();
   return has_begun ? End(Result::KILLED, took)
                    : End(Result::LOST, options.program + ": does not start in time");

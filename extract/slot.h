@@ -54,6 +54,7 @@ class Slot {
   std::optional<ExtractOutcome> Begin();
   void Receive(Clock::time_point now);
   std::optional<ExtractOutcome> TakeFrames();
+  std::optional<ExtractOutcome> Take(Answer& answer);
   std::optional<ExtractOutcome> TakeAnswer(Answer& answer);
   std::optional<ExtractOutcome> JudgeEnd(int status);
   std::optional<ExtractOutcome> StartConverter(const std::string& name);
@@ -79,8 +80,9 @@ class Slot {
   Stage stage = Stage::IDLE;
   ExtractJob current;
   Clock::time_point deadline;
-  int outside_kills = 0;  // of helpers at this job
-  Content found;          // by the first reading
+  bool has_begun = false;  // the helper has it
+  int lost_helpers = 0;    // at this job, by no fault of its own
+  Content found;           // by the first reading
   Child converter;
   std::string converter_name;
   std::string converter_fault;

@@ -70,8 +70,11 @@ bool Confine(std::string& missing, std::string& error) {
   if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0) {
     return Failed("no new privileges", error);
   }
-  return LimitWriting(missing, error) &&
-         (KeepCapabilities(WantedCapabilities()) || Failed("capabilities", error));
+  if (!LimitWriting(missing, error)) {
+    return false;
+  }
+  const uint64_t wanted = WantedCapabilities();
+  return (BoundCapabilities(wanted) && KeepCapabilities(wanted)) || Failed("capabilities", error);
 }
 
 }  // namespace fileindexd

@@ -54,7 +54,7 @@ TEST(AnswerTest, WhatIsEncodedComesBack) {
   std::string fault;
   const auto got = DecodeAnswer(EncodeAnswer(sent), CAP, fault);
   ASSERT_TRUE(got) << fault;
-  EXPECT_FALSE(got->is_ready);
+  EXPECT_EQ(got->sort, Answer::Sort::ANSWER);
   EXPECT_EQ(got->content.kind, Kind::PHOTO);
   ASSERT_EQ(got->content.texts.size(), 2u);
   EXPECT_EQ(got->content.texts[0].text, "T\xC3\xA9");
@@ -69,15 +69,20 @@ TEST(AnswerTest, WhatIsEncodedComesBack) {
   EXPECT_EQ(got->reason, "damaged here");
 }
 
-TEST(AnswerTest, AGreetingComesBack) {
+TEST(AnswerTest, AGreetingAndABeginningComeBack) {
   Answer sent;
-  sent.is_ready = true;
+  sent.sort = Answer::Sort::READY;
   sent.left_out = "PDF";
   std::string fault;
   const auto got = DecodeAnswer(EncodeAnswer(sent), CAP, fault);
   ASSERT_TRUE(got) << fault;
-  EXPECT_TRUE(got->is_ready);
+  EXPECT_EQ(got->sort, Answer::Sort::READY);
   EXPECT_EQ(got->left_out, "PDF");
+
+  sent.sort = Answer::Sort::BEGUN;
+  const auto begun = DecodeAnswer(EncodeAnswer(sent), CAP, fault);
+  ASSERT_TRUE(begun) << fault;
+  EXPECT_EQ(begun->sort, Answer::Sort::BEGUN);
 }
 
 TEST(AnswerTest, TheLeastAnswerIsTaken) {
@@ -126,6 +131,9 @@ TEST(AnswerTest, NonsenseIsRefused) {
       Frame(Record(TAG_READY, "\x7F")),
       Frame(Record(TAG_READY, "\1\t")),
       Frame(Least() + Record(TAG_READY, "\1")),
+      Frame(Record(TAG_BEGUN, "x")),
+      Frame(Least() + Record(TAG_BEGUN, "")),
+      Frame(Record(TAG_BEGUN, "") + Record(TAG_READY, "\1")),
   };
   for (size_t row = 0; row < std::size(rows); ++row) {
     EXPECT_NE(FaultOf(rows[row]), "") << "row " << row;

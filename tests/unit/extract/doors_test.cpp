@@ -1,0 +1,276 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/doors.h"
+
+#include <arpa/inet.h>
+#include <dirent.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/mman.h>
+#include <sys/mount.h>
+#include <sys/prctl.h>
+#include <sys/ptrace.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <csignal>
+#include <functional>
+#include <string>
+
+#include "base/scoped_fd.h"
+#include "extract/converters.h"
+#include "extract/sanitized.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Everything here is tried by a process of its own, behind its doors, and told through a pipe.
+std::string Behind(Doors doors, const std::function<std::string()>& attempt) {
+  int ends[2] = {-1, -1};
+  EXPECT_EQ(pipe2(ends, O_CLOEXEC), 0);
+  ScopedFd reading(ends[0]);
+  ScopedFd writing(ends[1]);
+  doors.parent = getpid();
+  const pid_t child = fork();
+  if (child == 0) {
+    std::string error;
+    const std::string told = CloseDoors(doors, error) ? attempt() : "not closed: " + error;
+    (void)!write(writing.fd, told.data(), told.size());
+    _exit(0);
+  }
+
+  writing.Close();
+  std::string told;
+  char buffer[512];
+  for (ssize_t length = 0; (length = read(reading.fd, buffer, sizeof(buffer))) > 0;) {
+    told.append(buffer, static_cast<size_t>(length));
+  }
+  int status = 0;
+  waitpid(child, &status, 0);
+  if (status != 0) {
+    told += " ended with " + std::to_string(status);
+  }
+  return told;
+}
+
+// "" when it was refused.
+std::string Refused(bool succeeded, const char* what) {
+  return succeeded ? std::string(what) + " " : "";
+}
+
+std::string OpenForReading() {
+  std::string open_ones;
+  for (const char* path : {"/etc/passwd", "/etc/shadow", "/proc/self/maps", "/proc/1/environ",
+                           "/dev/zero", "/usr/bin/env", "/tmp", "/home", "/proc", "/dev", "/etc"}) {
+    open_ones += Refused(open(path, O_RDONLY | O_CLOEXEC) >= 0, path);
+  }
+  return open_ones;
+}
+
+std::string ChangeFiles(const std::string& folder) {
+  const std::string file = folder + "/file";
+  const std::string made = folder + "/made";
+  std::string done;
+  done += Refused(open(file.c_str(), O_WRONLY | O_CLOEXEC) >= 0, "write");
+  done += Refused(open(file.c_str(), O_RDONLY | O_TRUNC | O_CLOEXEC) >= 0, "truncate");
+  done += Refused(open(made.c_str(), O_CREAT | O_RDWR | O_CLOEXEC, 0600) >= 0, "create");
+  done += Refused(open(folder.c_str(), O_TMPFILE | O_RDWR | O_CLOEXEC, 0600) >= 0, "tmpfile");
+  done += Refused(mkdir(made.c_str(), 0700) == 0, "mkdir");
+  done += Refused(unlink(file.c_str()) == 0, "unlink");
+  done += Refused(rename(file.c_str(), made.c_str()) == 0, "rename");
+  done += Refused(link(file.c_str(), made.c_str()) == 0, "link");
+  done += Refused(symlink("x", made.c_str()) == 0, "symlink");
+  done += Refused(chmod(file.c_str(), 0) == 0, "chmod");
+  done += Refused(truncate(file.c_str(), 0) == 0, "truncate");
+  return done;
+}
+
+std::string Communicate(int connected) {
+  std::string done;
+  for (const int family : {AF_INET, AF_INET6, AF_UNIX, AF_NETLINK, AF_PACKET}) {
+    done +=
+        Refused(socket(family, SOCK_STREAM, 0) >= 0 || socket(family, SOCK_RAW, 0) >= 0, "socket");
+  }
+  sockaddr_un name = {AF_UNIX, "/dev/log"};
+  done +=
+      Refused(connect(connected, reinterpret_cast<sockaddr*>(&name), sizeof(name)) == 0, "connect");
+  int pair[2];
+  done += Refused(socketpair(AF_UNIX, SOCK_STREAM, 0, pair) == 0, "socketpair");
+  return done;
+}
+
+std::string Start() {
+  std::string done;
+  const pid_t forked = fork();
+  if (forked == 0) {
+    _exit(0);
+  }
+  done += Refused(forked > 0, "fork");
+  const char* arguments[] = {"true", nullptr};
+  done += Refused(execv("/bin/true", const_cast<char**>(arguments)) == 0, "execve");
+  done += Refused(syscall(SYS_execveat, -100, "/bin/true", arguments, nullptr, 0) == 0, "execveat");
+  return done;
+}
+
+std::string Reach() {
+  std::string done;
+  done += Refused(ptrace(PTRACE_ATTACH, getppid(), nullptr, nullptr) == 0, "ptrace");
+  done += Refused(kill(getppid(), 0) == 0, "kill");
+  done += Refused(syscall(SYS_tgkill, getppid(), getppid(), 0) == 0, "tgkill");
+  done += Refused(syscall(SYS_pidfd_open, getppid(), 0) >= 0, "pidfd");
+  char byte = 0;
+  iovec ours = {&byte, 1};
+  done += Refused(syscall(SYS_process_vm_readv, getppid(), &ours, 1, &ours, 1, 0) >= 0, "vm_readv");
+  done += Refused(mount("none", "/tmp", "tmpfs", 0, nullptr) == 0, "mount");
+  done += Refused(unshare(CLONE_NEWUSER) == 0, "unshare");
+  done += Refused(setuid(0) == 0, "setuid");
+  done += Refused(syscall(SYS_bpf, 0, nullptr, 0) >= 0, "bpf");
+  done += Refused(syscall(SYS_io_uring_setup, 1, nullptr) >= 0, "io_uring");
+  done += Refused(syscall(SYS_perf_event_open, nullptr, 0, 0, 0, 0) >= 0, "perf");
+  done += Refused(syscall(SYS_keyctl, 0, -3, 1) >= 0, "keyctl");
+  return done;
+}
+
+class DoorsTest : public ::testing::TestWithParam<int> {
+ public:
+  // 0: as this kernel has them; 1: without Landlock; 2: without namespaces too.
+  static Doors Kind() {
+    Doors doors;
+    doors.has_landlock = GetParam() == 0;
+    doors.has_namespaces = GetParam() < 2;
+    return doors;
+  }
+
+  void SetUp() override {
+    char made[] = "/tmp/extract-doors-XXXXXX";
+    ASSERT_NE(mkdtemp(made), nullptr);
+    folder = made;
+    ASSERT_EQ(chmod(made, 0777), 0);
+    const std::string file = folder + "/file";
+    ScopedFd opened(open(file.c_str(), O_CREAT | O_RDWR | O_CLOEXEC, 0666));
+    ASSERT_EQ(fchmod(opened.fd, 0666), 0);
+    ASSERT_EQ(write(opened.fd, "words", 5), 5);
+  }
+  void TearDown() override {
+    (void)unlink((folder + "/file").c_str());
+    EXPECT_EQ(rmdir(folder.c_str()), 0);
+  }
+
+  std::string folder;
+};
+
+INSTANTIATE_TEST_SUITE_P(Walls, DoorsTest, ::testing::Values(0, 1, 2));
+
+TEST_P(DoorsTest, NothingOfTheSystemCanBeOpened) {
+  EXPECT_EQ(Behind(Kind(), OpenForReading), "");
+}
+
+TEST_P(DoorsTest, NothingCanBeChanged) {
+  EXPECT_EQ(Behind(Kind(), [this] { return ChangeFiles(folder); }), "");
+}
+
+TEST_P(DoorsTest, ThereIsNoNetwork) {
+  const ScopedFd before(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  EXPECT_EQ(Behind(Kind(), [&] { return Communicate(before.fd); }), "");
+}
+
+TEST_P(DoorsTest, NothingCanBeStarted) {
+  EXPECT_EQ(Behind(Kind(), Start), "");
+}
+
+TEST_P(DoorsTest, NobodyElseCanBeReached) {
+  EXPECT_EQ(Behind(Kind(), Reach), "");
+}
+
+TEST_P(DoorsTest, WhatWasOpenBeforeIsRead) {
+  const ScopedFd file(open((folder + "/file").c_str(), O_RDONLY | O_CLOEXEC));
+  EXPECT_EQ(Behind(Kind(),
+                   [&] {
+                     char bytes[8] = {};
+                     return read(file.fd, bytes, sizeof(bytes)) == 5 ? std::string(bytes) : "?";
+                   }),
+            "words");
+}
+
+TEST_P(DoorsTest, TheRunTimeFilesOfLibrariesAreReadWhereWallsAreLeft) {
+  const std::string told = Behind(Kind(), [] {
+    DIR* maps = opendir("/usr/share/poppler");
+    const bool is_there = maps != nullptr && readdir(maps) != nullptr;
+    return std::string(is_there ? "read" : "refused");
+  });
+  EXPECT_EQ(told, GetParam() < 2 ? "read" : "refused");
+}
+
+TEST_P(DoorsTest, AmountsAreBounded) {
+  const std::string told = Behind(Kind(), [] {
+    std::string beyond;
+    if (!IS_SANITIZED) {
+      void* memory =
+          mmap(nullptr, ADDRESS_SPACE, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+      beyond += Refused(memory != MAP_FAILED, "memory");
+    }
+    const int file = memfd_create("test", MFD_CLOEXEC);
+    beyond += file >= 0 && pwrite(file, "x", 1, MEMORY_FILE - 1) == 1 ? "" : "no-memory-file ";
+    beyond += Refused(pwrite(file, "xx", 2, MEMORY_FILE) > 0, "long-file");
+    beyond += Refused(ftruncate(file, MEMORY_FILE + 1) == 0, "longer-file");
+    for (uint64_t opened = 0; opened < OPEN_FILES; ++opened) {
+      (void)!dup(file);
+    }
+    beyond += Refused(dup(file) >= 0, "files");
+    rlimit limit = {};
+    beyond += Refused(getrlimit(RLIMIT_CORE, &limit) != 0 || limit.rlim_max != 0, "core");
+    limit = {RLIM_INFINITY, RLIM_INFINITY};
+    beyond += Refused(setrlimit(RLIMIT_FSIZE, &limit) == 0, "raised");
+    beyond += Refused(getrlimit(RLIMIT_CPU, &limit) != 0 || limit.rlim_cur > PROCESSOR_SECONDS + 10,
+                      "processor");
+    beyond += RefreshProcessorTime() ? "" : "no-refresh ";
+    return beyond;
+  });
+  EXPECT_EQ(told, "");
+}
+
+TEST_P(DoorsTest, ItIsNobodyWithoutAnyRight) {
+  const std::string told = Behind(Kind(), [] {
+    std::string wrong;
+    wrong += Refused(getuid() == 0 || geteuid() == 0 || getgid() == 0, "root");
+    wrong += Refused(prctl(PR_GET_NO_NEW_PRIVS, 0, 0, 0, 0) == 0, "privileges");
+    return wrong;
+  });
+  EXPECT_EQ(told, "");
+}
+
+TEST(ConverterDoorsTest, ThatProgramAloneIsExecuted) {
+  Doors doors;
+  doors.converter = FindConverter("catdoc");
+  const std::string told = Behind(doors, [] {
+    std::string done;
+    for (const char* path : {"/bin/true", "/usr/bin/unrtf", "/bin/sh", "/usr/bin/python3"}) {
+      const char* arguments[] = {path, nullptr};
+      const char* environment[] = {nullptr};
+      done += Refused(
+          execve(path, const_cast<char**>(arguments), const_cast<char**>(environment)) == 0, path);
+      done += errno == EACCES || errno == ENOENT ? "" : "other ";
+    }
+    return done;
+  });
+  EXPECT_EQ(told, "");
+}
+
+TEST(ConverterDoorsTest, WithoutWallsThereIsNone) {
+  Doors doors;
+  doors.converter = FindConverter("catdoc");
+  doors.has_landlock = false;
+  doors.has_namespaces = false;
+  EXPECT_TRUE(
+      Behind(doors, [] { return std::string("closed"); }).starts_with("not closed: neither"));
+}
+
+}  // namespace
+
+}  // namespace fileindexd

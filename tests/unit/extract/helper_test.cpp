@@ -1,0 +1,163 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The helper itself, through the pool.
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+
+#include <fstream>
+#include <sstream>
+
+#include "pool_fixture.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Of the one child that this process has.
+pid_t ChildOf(pid_t process) {
+  const std::string number = std::to_string(process);
+  std::ifstream children("/proc/" + number + "/task/" + number + "/children");
+  pid_t child = -1;
+  children >> child;
+  return child;
+}
+
+std::string StatusLine(pid_t process, const std::string& key) {
+  std::ifstream status("/proc/" + std::to_string(process) + "/status");
+  for (std::string line; std::getline(status, line);) {
+    if (line.starts_with(key + ":\t")) {
+      return line.substr(key.size() + 2);
+    }
+  }
+  return "";
+}
+
+std::string FieldOf(const ExtractOutcome& outcome, ContentField field) {
+  for (const TextField& text : outcome.content.texts) {
+    if (text.field == field) {
+      return text.text;
+    }
+  }
+  return "";
+}
+
+class HelperTest : public PoolFixture {
+ public:
+  void SetUp() override {
+    PoolOptions options;
+    options.program = HELPER;
+    options.text_cap = 1000;
+    OpenPool(options);
+  }
+};
+
+TEST_F(HelperTest, ItStandsBehindItsDoors) {
+  ASSERT_EQ(Told(Run("a.txt", "words")), "done");
+  const pid_t helper = ChildOf(getpid());
+  ASSERT_GT(helper, 0);
+  EXPECT_EQ(StatusLine(helper, "Seccomp"), "2");
+  EXPECT_EQ(StatusLine(helper, "NoNewPrivs"), "1");
+  EXPECT_EQ(StatusLine(helper, "CapEff"), "0000000000000000");
+  EXPECT_EQ(StatusLine(helper, "CapPrm"), "0000000000000000");
+  EXPECT_EQ(StatusLine(helper, "CapBnd"), "0000000000000000");
+  if (geteuid() == 0) {
+    EXPECT_EQ(StatusLine(helper, "Uid"), "65534\t65534\t65534\t65534");
+    EXPECT_EQ(StatusLine(helper, "Groups"), " ");
+  }
+}
+
+TEST_F(HelperTest, ItDoesNotOutliveTheService) {
+  const pid_t service = fork();
+  if (service == 0) {
+    (void)Run("a.txt", "words");
+    raise(SIGSTOP);
+    _exit(0);
+  }
+  int status = 0;
+  ASSERT_EQ(waitpid(service, &status, WUNTRACED), service);
+  ASSERT_TRUE(WIFSTOPPED(status));
+  const pid_t helper = ChildOf(service);
+  ASSERT_GT(helper, 0);
+  const ScopedFd ended(static_cast<int>(syscall(SYS_pidfd_open, helper, 0)));
+  ASSERT_GE(ended.fd, 0);
+
+  ASSERT_EQ(kill(service, SIGKILL), 0);
+  ASSERT_EQ(waitpid(service, &status, 0), service);
+  pollfd waiting = {ended.fd, POLLIN, 0};
+  EXPECT_EQ(poll(&waiting, 1, 60'000), 1);
+}
+
+TEST_F(HelperTest, TheSampleTellsWhetherFilesAreTheSame) {
+  std::string bytes(500'000, 'x');
+  const uint64_t sample = Run("a.txt", bytes).content.sample;
+  EXPECT_EQ(Run("b.dat", bytes).content.sample, sample);
+  EXPECT_NE(Run("a.txt", bytes + "x").content.sample, sample);
+  for (const size_t at : {size_t{0}, bytes.size() / 2, bytes.size() - 1}) {
+    std::string other = bytes;
+    other[at] = 'y';
+    EXPECT_NE(Run("a.txt", other).content.sample, sample) << at;
+  }
+  EXPECT_NE(Run("a.txt", "").content.sample, Run("a.txt", "x").content.sample);
+}
+
+TEST_F(HelperTest, TextIsCutAtTheCap) {
+  std::string long_text;
+  while (long_text.size() < 5'000'000) {
+    long_text += "words and more ";
+  }
+  const ExtractOutcome outcome = Run("a.txt", long_text);
+  EXPECT_EQ(Told(outcome), "done");
+  EXPECT_TRUE(outcome.content.is_cut);
+  EXPECT_LE(outcome.content.text.size(), 1000u);
+  EXPECT_GT(outcome.content.text.size(), 980u);
+}
+
+TEST_F(HelperTest, WhatNoReaderIsForIsDoneWithoutContent) {
+  const std::string rows[] = {std::string("\x7F"
+                                          "ELF\2\1\1\0\0\0\0\0\0\0\0\0\2\0\x3E\0",
+                                          20),
+                              std::string(100, '\0'), "\x01\x02\x03\x04\x80\x81\xFE\xFF\x05\x06"};
+  for (const std::string& bytes : rows) {
+    const ExtractOutcome outcome = Run("thing", bytes);
+    EXPECT_EQ(Told(outcome), "done");
+    EXPECT_EQ(outcome.content.kind, Kind::OTHER);
+    EXPECT_TRUE(outcome.content.text.empty());
+  }
+}
+
+TEST_F(HelperTest, ContentTellsWhereTheNameDoesNot) {
+  const struct {
+    const char* name;
+    const char* bytes;
+    const char* text;
+  } rows[] = {
+      {"README", "some plain words\n", "some plain words"},
+      {"page", "<!DOCTYPE html><html><body><p>A pa<b>ge</b></body></html>", "A page"},
+      {"drawing.pdf", "just a few words of text\n", "just a few words of text"},
+      {"old.xml", "this is no markup\n", "this is no markup"},
+      {"letter.txt", "{\\rtf1\\ansi\\pard Dear Sir\\par}", "{\\rtf1\\ansi\\pard Dear Sir\\par}"},
+  };
+  for (const auto& row : rows) {
+    const ExtractOutcome outcome = Run(row.name, row.bytes);
+    EXPECT_EQ(Told(outcome), "done") << row.name;
+    EXPECT_EQ(outcome.content.text, row.text) << row.name;
+    EXPECT_EQ(outcome.content.kind, Kind::DOCUMENT) << row.name;
+  }
+}
+
+TEST_F(HelperTest, AConverterReadsBehindTheSameDoors) {
+  const ExtractOutcome outcome =
+      Run("letter.rtf",
+          "{\\rtf1\\ansi\\ansicpg1252{\\info{\\title A title}{\\author Me}}"
+          "Caf\\'e9 w\\u1086\\'3f {\\b bo}ld\\par next}");
+  EXPECT_EQ(Told(outcome), "done");
+  EXPECT_EQ(outcome.content.text, "Caf\xC3\xA9 w\xD0\xBE bold next");
+  EXPECT_EQ(FieldOf(outcome, ContentField::TITLE), "A title");
+  EXPECT_EQ(outcome.content.kind, Kind::DOCUMENT);
+  EXPECT_NE(outcome.content.sample, 0u);
+}
+
+}  // namespace
+
+}  // namespace fileindexd

@@ -1,0 +1,196 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/pool.h"
+
+#include <csignal>
+#include <cstdlib>
+#include <thread>
+
+#include "pool_fixture.h"
+
+namespace fileindexd {
+
+namespace {
+
+class PoolTest : public PoolFixture {
+ public:
+  void SetUp() override {
+    PoolOptions options;
+    options.program = SCRIPTED_HELPER;
+    OpenPool(options);
+  }
+
+  void OpenWith(unsigned helpers, std::chrono::milliseconds deadline) {
+    PoolOptions options;
+    options.program = SCRIPTED_HELPER;
+    options.helpers = helpers;
+    options.deadline = deadline;
+    OpenPool(options);
+  }
+};
+
+TEST_F(PoolTest, AnAnswerComesBackUnderItsId) {
+  Submit(77, "text some words");
+  const auto ended = Await(1);
+  ASSERT_TRUE(ended.contains(77));
+  EXPECT_EQ(Told(ended.at(77)), "done");
+  EXPECT_EQ(ended.at(77).content.text, "some words");
+  EXPECT_EQ(ended.at(77).content.kind, Kind::DOCUMENT);
+  EXPECT_EQ(pool->LeftOut(), "nothing much");
+  EXPECT_EQ(pool->Running(), 0u);
+}
+
+TEST_F(PoolTest, AFailureKeepsItsReasonAndWhatWasFound) {
+  const ExtractOutcome outcome = Run("fail it is damaged");
+  EXPECT_EQ(Told(outcome), "failed: it is damaged");
+  EXPECT_EQ(outcome.content.text, "it is damaged");
+}
+
+TEST_F(PoolTest, AHelperServesOneJobAfterTheOther) {
+  EXPECT_EQ(Run("count").content.text, "1");
+  EXPECT_EQ(Run("count").content.text, "2");
+}
+
+TEST_F(PoolTest, WhoeverMisbehavesIsKilledAndReplaced) {
+  const struct {
+    const char* name;
+    const char* told;
+  } rows[] = {{"crash", "killed: the helper ended with SIGSEGV"},
+              {"exit", "killed: the helper ended with code 7"},
+              {"memory", "killed: needs more memory than is allowed"},
+              {"close", "killed: the helper talked nonsense: it closed its connection"},
+              {"grow", "killed: the helper talked nonsense: an answer too long"},
+              {"nonsense", "killed: the helper talked nonsense: half a record"},
+              {"twice", "killed: the helper talked nonsense: an answer that was not asked for"},
+              {"convert sh", "killed: the helper talked nonsense: a converter that there is not"}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(Told(Run(row.name)), row.told);
+    EXPECT_EQ(Told(Run("text next")), "done") << "after " << row.name;
+  }
+}
+
+TEST_F(PoolTest, WhatIsSaidBeforeTheEndCounts) {
+  const ExtractOutcome outcome = Run("last");
+  EXPECT_EQ(Told(outcome), "done");
+  EXPECT_EQ(outcome.content.text, "said and gone");
+  EXPECT_EQ(Run("count").content.text, "1");
+}
+
+TEST_F(PoolTest, ADocumentHasItsDeadline) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  EXPECT_EQ(Told(Run("loop")), "killed: took longer than 300 ms");
+  EXPECT_EQ(Told(Run("half")), "killed: took longer than 300 ms");
+}
+
+TEST_F(PoolTest, ASlowDocumentHoldsNobodyUp) {
+  OpenWith(2, PoolFixture::LIMIT);
+  Submit(1, "loop");
+  for (uint64_t id = 2; id < 20; ++id) {
+    Submit(id, "text quick");
+  }
+  const auto ended = Await(18);
+  EXPECT_FALSE(ended.contains(1));
+  EXPECT_EQ(pool->Running(), 1u);
+}
+
+TEST_F(PoolTest, AKillFromOutsideIsNotTheFilesFault) {
+  const ExtractOutcome outcome = Run("killed", "");
+  EXPECT_EQ(Told(outcome), "done");
+}
+
+TEST_F(PoolTest, AnIdleHelperThatIsGoneIsReplacedUnseen) {
+  const pid_t helper = std::stoi(Run("pid").content.text);
+  ASSERT_EQ(kill(helper, SIGUSR1), 0);
+  const ExtractOutcome next = Run("pid");
+  EXPECT_EQ(Told(next), "done");
+  EXPECT_NE(std::stoi(next.content.text), helper);
+}
+
+TEST_F(PoolTest, AHelperThatEndsBeforeItBeginsIsNotTheFilesFault) {
+  EXPECT_EQ(Told(Run("text a")), "done");
+  EXPECT_EQ(Told(Run("refuse")), "done");
+}
+
+TEST_F(PoolTest, ManyJobsAtOnceAllEnd) {
+  OpenWith(4, PoolFixture::LIMIT);
+  const char* names[] = {"text a", "crash", "fail b", "text c", "nonsense"};
+  constexpr const char* TOLD[] = {"done", "killed", "failed", "done", "killed"};
+  for (uint64_t id = 0; id < 200; ++id) {
+    Submit(id, names[id % 5]);
+  }
+  const auto ended = Await(200);
+  for (const auto& [id, outcome] : ended) {
+    EXPECT_TRUE(Told(outcome).starts_with(TOLD[id % 5])) << id << " " << Told(outcome);
+  }
+}
+
+TEST_F(PoolTest, RoomIsForIdleHelpersAndOneWaitingJobEach) {
+  OpenWith(2, PoolFixture::LIMIT);
+  EXPECT_EQ(pool->Room(), 4u);
+  for (uint64_t id = 0; id < 3; ++id) {
+    Submit(id, "loop");
+  }
+  EXPECT_EQ(pool->Room(), 1u);
+  EXPECT_EQ(pool->Running(), 3u);
+}
+
+TEST_F(PoolTest, AbortEndsAllWithoutOutcome) {
+  OpenWith(2, PoolFixture::LIMIT);
+  for (uint64_t id = 0; id < 4; ++id) {
+    Submit(id, "loop");
+  }
+  pool->Abort();
+  EXPECT_EQ(pool->Running(), 0u);
+  EXPECT_EQ(pool->Due(), std::chrono::steady_clock::time_point::max());
+  EXPECT_TRUE(pool->Work().empty());
+  EXPECT_EQ(Told(Run("text on")), "done");
+}
+
+TEST_F(PoolTest, NoHelperIsLeftBehind) {
+  const pid_t helper = std::stoi(Run("pid").content.text);
+  EXPECT_EQ(kill(helper, 0), 0);
+  pool.reset();
+  EXPECT_NE(kill(helper, 0), 0);
+}
+
+TEST_F(PoolTest, HelpersAreStartedClean) {
+  setenv("EXTRACT_TEST_SECRET", "1", 1);
+  signal(SIGPIPE, SIG_IGN);
+  sigset_t blocked;
+  sigset_t before;
+  sigemptyset(&blocked);
+  sigaddset(&blocked, SIGTERM);
+  sigprocmask(SIG_BLOCK, &blocked, &before);
+  const ScopedFd open_here(dup2(STDERR_FILENO, 40));  // not close-on-exec
+
+  const std::string state = Run("state").content.text;
+  sigprocmask(SIG_SETMASK, &before, nullptr);
+  signal(SIGPIPE, SIG_DFL);
+  // The job's own file is the one above the socket.
+  EXPECT_EQ(state, "0 1 3 4 / own-session");
+}
+
+TEST_F(PoolTest, AProgramThatDoesNotStartLosesTheJob) {
+  PoolOptions options;
+  options.program = "/bin/false";
+  OpenPool(options);
+  EXPECT_EQ(Told(Run("text a")), "lost: /bin/false: does not start: code 1");
+}
+
+TEST_F(PoolTest, AProgramThatIsNotThereIsToldAtOnce) {
+  PoolOptions options;
+  options.program = "/nonexistent/program";
+  std::string error;
+  EXPECT_FALSE(ExtractPool::Open(options, error));
+  EXPECT_EQ(error, "/nonexistent/program: No such file or directory");
+}
+
+TEST_F(PoolTest, AConverterThatMakesNothingLeavesTheFields) {
+  const ExtractOutcome outcome = Run("convert catdoc");
+  EXPECT_EQ(Told(outcome), "failed: catdoc: code 9");
+  ASSERT_EQ(outcome.content.texts.size(), 1u);
+  EXPECT_EQ(outcome.content.texts[0].text, "kept");
+}
+
+}  // namespace
+
+}  // namespace fileindexd

@@ -1,0 +1,195 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Stands in for fileindex-extract: greets, takes jobs, and does what each job's name says.
+//
+//   text WORDS     answers with these words          field TITLE    with a title and no text
+//   fail REASON    says that it cannot be read       convert NAME   asks for a converter
+//   crash, loop, exit, memory, close, grow, nonsense, twice, half, last  misbehaves
+//   killed         is killed from outside, as long as the file is empty; adds a byte to it
+//   pid            answers with its process number   count          how many jobs it has had
+//   state          answers with what it was started with
+//   refuse         ends before it begins, if it had a job before
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdlib>
+#include <cstring>
+#include <map>
+#include <string>
+
+#include "extract/answer.h"
+#include "extract/child.h"
+#include "extract/helper_codes.h"
+#include "extract/sanitized.h"
+
+namespace fileindexd {
+
+namespace {
+
+using std::string_literals::operator""s;
+
+void Say(const std::string& bytes) {
+  size_t said = 0;
+  while (said < bytes.size()) {
+    const ssize_t sent = write(HELPER_SOCKET, bytes.data() + said, bytes.size() - said);
+    if (sent <= 0) {
+      _exit(0);
+    }
+    said += static_cast<size_t>(sent);
+  }
+}
+
+Answer Ready() {
+  Answer answer;
+  answer.sort = Answer::Sort::READY;
+  answer.left_out = "nothing much";
+  return answer;
+}
+
+Answer Words(const std::string& text) {
+  Answer answer;
+  answer.content.kind = Kind::DOCUMENT;
+  answer.content.text = text;
+  return answer;
+}
+
+// Signals that are not as a new process has them, descriptors, folder, variables, session.
+std::string State() {
+  std::string state;
+  for (int number = 1; number < 32; ++number) {
+    struct sigaction action = {};
+    // A sanitizer wants to tell of its own.
+    if (IS_SANITIZED && (number == SIGSEGV || number == SIGBUS || number == SIGFPE)) {
+      continue;
+    }
+    if (sigaction(number, nullptr, &action) == 0 && action.sa_handler != SIG_DFL) {
+      state += "signal" + std::to_string(number) + " ";
+    }
+  }
+  sigset_t blocked;
+  sigprocmask(SIG_BLOCK, nullptr, &blocked);
+  state += sigismember(&blocked, SIGTERM) == 1 ? "blocked " : "";
+  for (int file = 0; file < 64; ++file) {
+    state += fcntl(file, F_GETFD) >= 0 && file != STDERR_FILENO ? std::to_string(file) + " " : "";
+  }
+  char folder[PATH_MAX] = {};
+  state += getcwd(folder, sizeof(folder)) != nullptr ? folder : "?";
+  state += getenv("EXTRACT_TEST_SECRET") != nullptr ? " secret" : "";
+  state += getsid(0) == getpid() ? " own-session" : "";
+  return state;
+}
+
+void Misbehave(const std::string& verb, int file) {
+  if (verb == "crash") {
+    signal(SIGSEGV, SIG_DFL);
+    raise(SIGSEGV);
+  } else if (verb == "loop") {
+    while (true) {
+      pause();
+    }
+  } else if (verb == "exit") {
+    _exit(7);
+  } else if (verb == "memory") {
+    _exit(EXIT_MEMORY);
+  } else if (verb == "close") {
+    close(HELPER_SOCKET);
+    while (true) {
+      pause();
+    }
+  } else if (verb == "grow") {
+    const std::string chunk(64 * 1024, 'x');
+    Say("\xFF\xFF\xFF\x0F"s);
+    while (true) {
+      Say(chunk);
+    }
+  } else if (verb == "nonsense") {
+    Say("\x03\0\0\0abc"s);
+    pause();
+  } else if (verb == "twice") {
+    Say(EncodeAnswer(Words("a")) + EncodeAnswer(Words("b")));
+    pause();
+  } else if (verb == "half") {
+    Say(EncodeAnswer(Words("half of it")).substr(0, 20));
+    pause();
+  } else if (verb == "last") {
+    Say(EncodeAnswer(Words("said and gone")));
+    _exit(0);
+  } else if (verb == "killed") {
+    struct stat info = {};
+    // The file's own descriptor is shared: how far it stands tells how often this was tried.
+    if (fstat(file, &info) == 0 && info.st_size == 0) {
+      (void)!write(file, "x", 1);
+      raise(SIGKILL);
+    }
+  }
+}
+
+void Do(const std::string& verb, const std::string& rest, int file, int count) {
+  Misbehave(verb, file);
+  Answer answer = Words(rest.empty() ? verb : rest);
+  if (verb == "fail") {
+    answer.has_failed = true;
+    answer.reason = rest;
+  } else if (verb == "field") {
+    answer.content.texts = {{ContentField::TITLE, rest}};
+    answer.content.text.clear();
+  } else if (verb == "convert") {
+    answer.content.texts = {{ContentField::TITLE, "kept"}};
+    answer.content.text.clear();
+    answer.converter = rest;
+  } else if (verb == "pid") {
+    answer.content.text = std::to_string(getpid());
+  } else if (verb == "count") {
+    answer.content.text = std::to_string(count);
+  } else if (verb == "state") {
+    answer.content.text = State();
+  }
+  Say(EncodeAnswer(answer));
+}
+
+int Serve() {
+  Say(EncodeAnswer(Ready()));
+  for (int count = 1;; ++count) {
+    char frame[8192];
+    iovec bytes = {frame, sizeof(frame)};
+    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
+    msghdr message = {};
+    message.msg_iov = &bytes;
+    message.msg_iovlen = 1;
+    message.msg_control = control;
+    message.msg_controllen = sizeof(control);
+    const ssize_t length = recvmsg(HELPER_SOCKET, &message, MSG_CMSG_CLOEXEC);
+    const auto job = length > 0 ? DecodeJob({frame, static_cast<size_t>(length)}) : std::nullopt;
+    const cmsghdr* head = job ? CMSG_FIRSTHDR(&message) : nullptr;
+    if (head == nullptr) {
+      return 0;
+    }
+    int file = -1;
+    memcpy(&file, CMSG_DATA(head), sizeof(file));
+    if (job->name == "refuse" && count > 1) {
+      _exit(5);  // ends over it without having begun
+    }
+    Answer begun;
+    begun.sort = Answer::Sort::BEGUN;
+    Say(EncodeAnswer(begun));
+    const size_t blank = job->name.find(' ');
+    Do(job->name.substr(0, blank), blank == std::string::npos ? "" : job->name.substr(blank + 1),
+       file, count);
+    close(file);
+  }
+}
+
+}  // namespace
+
+}  // namespace fileindexd
+
+int main(int argc, char** argv) {
+  // As a converter it has nothing to say, and takes its time about it where its name is "slow".
+  if (argc > 2 && std::string(argv[1]) == fileindexd::CONVERT_MODE) {
+    return 9;
+  }
+  return fileindexd::Serve();
+}
