@@ -170,20 +170,20 @@ TEST_F(ContentsWriterTest, OutcomeForOldBytesIsThrownAway) {
 TEST_F(ContentsWriterTest, KindThatIsSwitchedOffIsDroppedAtOnce) {
   File("a.txt");
   File("b.mp3");
+  AddAll();
   Read();
   ASSERT_EQ(Number("SELECT count(*) FROM texts"), 2);
 
-  Decide("a.txt", {false, true, true, true});
-  Decide("b.mp3", {false, true, true, true});
   wanted.document = false;
-  Refresh("a.txt");
-  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {true, false, false, false}));
+  ASSERT_TRUE(store->SetFolder(root, wanted));
+  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {.document = true}));
   Commit();
   TakeIn();
 
   EXPECT_EQ(Number("SELECT count(*) FROM files"), 1);
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 1);
   EXPECT_EQ(Holding("mp3"), 1);
+  EXPECT_EQ(Differences(), Names()) << "for all others the entry is one that is not wanted";
 }
 
 TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
