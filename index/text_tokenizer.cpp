@@ -14,6 +14,7 @@
 #include "index/text_characters.h"
 #include "index/text_parts.h"
 #include "index/text_stems.h"
+#include "index/token_memory.h"
 
 namespace fileindexd {
 
@@ -56,6 +57,8 @@ class Tokenizer {
  private:
   size_t AsciiWord(std::string_view text, size_t at);
   size_t Word(std::string_view text, size_t at);
+  size_t AnyWord(std::string_view text, size_t at);
+  void PutAgain(std::string_view tokens, size_t start, size_t end);
   size_t Pairs(std::string_view text, size_t at);
   void Fold(std::string_view stem);
   void PutStem(std::string_view stem, std::string_view word, size_t start, size_t end);
@@ -64,6 +67,11 @@ class Tokenizer {
 
   void Put(std::string_view token, size_t start, size_t end, int flags = 0) {
     if (code == SQLITE_OK && !token.empty()) {
+      if (is_recording) {
+        record += static_cast<char>(flags);
+        record += static_cast<char>(token.size());
+        record += token;
+      }
       code = emit(context, flags, token.data(), static_cast<int>(token.size()),
                   static_cast<int>(start), static_cast<int>(end));
     }
@@ -81,12 +89,16 @@ class Tokenizer {
   std::string exact;  // lower case, with accents
   std::string folded_stem;
   TextWord word;
+  bool is_recording = false;
+  std::string record;  // what is put, to be remembered
+  TokenMemory memory;
 };
 
 int Tokenizer::Run(void* to, int flags, std::string_view text, Emit function) {
   context = to;
   emit = function;
   code = SQLITE_OK;
+  is_recording = false;
   is_question = (flags & FTS5_TOKENIZE_QUERY) != 0;
   is_beginning = (flags & FTS5_TOKENIZE_PREFIX) != 0;
   for (size_t at = 0; at < text.size() && code == SQLITE_OK;) {
@@ -143,6 +155,42 @@ size_t Tokenizer::AsciiWord(std::string_view text, size_t at) {
 }
 
 size_t Tokenizer::Word(std::string_view text, size_t at) {
+  size_t end = at;
+  while (end < text.size() && static_cast<unsigned char>(text[end]) < 0x80 &&
+         (ASCII_CLASSES[static_cast<unsigned char>(text[end])] != CharacterClass::SEPARATOR ||
+          IsDotInNumber(text, end))) {
+    ++end;
+  }
+  const bool is_ascii = end == text.size() || static_cast<unsigned char>(text[end]) < 0x80;
+  if (!is_ascii || is_question || end - at > TokenMemory::MOST_BYTES) {
+    return AnyWord(text, at);
+  }
+
+  const std::string_view raw = text.substr(at, end - at);
+  const std::string* tokens = memory.Find(raw);
+  if (tokens != nullptr) {
+    PutAgain(*tokens, at, end);
+    return end;
+  }
+  record.clear();
+  is_recording = true;
+  end = AnyWord(text, at);
+  is_recording = false;
+  if (code == SQLITE_OK) {  // else it is not all of them
+    memory.Remember(raw, record);
+  }
+  return end;
+}
+
+void Tokenizer::PutAgain(std::string_view tokens, size_t start, size_t end) {
+  while (!tokens.empty()) {
+    const auto size = static_cast<size_t>(static_cast<unsigned char>(tokens[1]));
+    Put(tokens.substr(2, size), start, end, tokens[0]);
+    tokens.remove_prefix(2 + size);
+  }
+}
+
+size_t Tokenizer::AnyWord(std::string_view text, size_t at) {
   exact.clear();
   word.Clear();
   const size_t start = at;

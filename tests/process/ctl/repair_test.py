@@ -144,7 +144,7 @@ class RepairTest(IndexTest):
         self.alter("DELETE FROM entries WHERE path IN (?, ?)", self.path("d"), self.path("x/y/z"))
         for name in ("d/none", "a.txt/below", "x/y/z/below", "none/none/none"):
             self.alter(
-                "INSERT INTO entries SELECT NULL, ?, 1, 0, 0, 5, 0, 0, 0, 0, 0, 0, 0, 0, 0",
+                "INSERT INTO entries SELECT NULL, ?, 1, 0, 0, 5, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0",
                 self.path(name),
             )
 

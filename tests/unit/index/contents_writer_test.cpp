@@ -170,20 +170,48 @@ TEST_F(ContentsWriterTest, OutcomeForOldBytesIsThrownAway) {
 TEST_F(ContentsWriterTest, KindThatIsSwitchedOffIsDroppedAtOnce) {
   File("a.txt");
   File("b.mp3");
+  AddAll();
   Read();
   ASSERT_EQ(Number("SELECT count(*) FROM texts"), 2);
 
-  Decide("a.txt", {false, true, true, true});
-  Decide("b.mp3", {false, true, true, true});
   wanted.document = false;
-  Refresh("a.txt");
-  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {true, false, false, false}));
+  ASSERT_TRUE(store->SetFolder(root, wanted));
+  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {.document = true}));
   Commit();
   TakeIn();
 
   EXPECT_EQ(Number("SELECT count(*) FROM files"), 1);
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 1);
   EXPECT_EQ(Holding("mp3"), 1);
+  EXPECT_EQ(Differences(), Names()) << "for all others the entry is one that is not wanted";
+}
+
+TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
+  const auto use = [this](const ContentFlags& flags) {
+    ASSERT_TRUE(store->SetFolder(root, flags));
+    std::shared_ptr<const Settings> in_force;
+    ASSERT_TRUE(store->GetSettings(in_force));
+    contents->UseSettings(in_force);
+    contents->LookAtAll();
+    TakeIn();
+  };
+  File("plain");
+  use({false, true, true, true});
+  ASSERT_EQ(Read(), Names({"plain"}));
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+  EXPECT_EQ(Number("SELECT found_kind FROM files"), 1);
+  EXPECT_EQ(Jobs(), Names());
+
+  use({true, true, true, true});
+  EXPECT_EQ(Read(), Names({"plain"}));
+  EXPECT_EQ(Holding("plain"), 1);
+  use({true, false, false, false});
+  EXPECT_EQ(Jobs(), Names());
+
+  use({false, true, true, true});
+  EXPECT_EQ(Holding("plain"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+  EXPECT_EQ(Jobs(), Names());
 }
 
 TEST_F(ContentsWriterTest, WhatNoEntryRefersToIsSweptAfterADay) {

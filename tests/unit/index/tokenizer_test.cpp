@@ -216,6 +216,23 @@ TEST_F(TokenizerTest, EncodedDataHasNoParts) {
   EXPECT_EQ(Words(std::string(100'000, '_') + "a" + std::string(100'000, '_')), Names({"a"}));
 }
 
+TEST_F(TokenizerTest, WordThatWasMetBeforeIsCutTheSame) {
+  EXPECT_EQ(Words("fooBar_1 fooBar_1 v1.2 fooBar_1"),
+            Names({"1|bar|foo|foobar|foobar_1", "1|bar|foo|foobar|foobar_1", "1|1.2|2|v|v1|v1.2",
+                   "1|bar|foo|foobar|foobar_1"}));
+
+  TextCutter cutter("english");
+  Names words;
+  const auto take = [&words](std::string_view word, size_t, size_t) {
+    words.emplace_back(word);
+    return words.size() != 1;
+  };
+  cutter.Cut("fooBar", false, take);  // stopped within the word
+  words = {"", ""};
+  cutter.Cut("fooBar", false, take);
+  EXPECT_EQ(words, Names({"", "", "foobar", "foo", "bar"}));
+}
+
 TEST_F(TokenizerTest, AnyBytesAreTaken) {
   std::string bytes;
   uint32_t seed = 7;
