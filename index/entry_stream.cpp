@@ -55,7 +55,7 @@ bool EntryStream::ReadSlice() {
     AssignPath(statement, 0, entry.path);
     entry.thing = static_cast<Thing>(statement.Int(1));
     entry.kind = static_cast<Kind>(statement.Int(2));
-    entry.content_wanted = statement.Int(3) != 0;
+    entry.content_wanted = statement.Int(3) == 1;
     entry.inode = static_cast<uint64_t>(statement.Int(4));
     entry.size = statement.Int(5);
     entry.mtime = statement.Int(6);
