@@ -111,6 +111,12 @@ void AddShares(Declarer& declare) {
                                  "or nothing where something was");
   AddText(accept, "NAME", into.share, "The share");
 
+  CLI::App* set = declare.Add(group, "set", ShareSet, "Change what holds for a share");
+  AddText(set, "NAME", into.share, "The share");
+  AddOption(set, "--language", into.language, "L",
+            "Find the forms of that language's words together; none: of no language's")
+      ->required();
+
   CLI::App* list = declare.Add(group, "list", ShareList, "List the shares");
   AddJson(list, into, "One JSON document");
 }

@@ -28,6 +28,7 @@ struct Arguments {
   std::optional<std::string> limit;
   std::optional<std::string> offset;
   std::optional<std::string> timeout;
+  std::optional<std::string> language;
   std::optional<bool> document;
   std::optional<bool> audio;
   std::optional<bool> video;
@@ -50,6 +51,7 @@ int ShareAdd(const Arguments& arguments);
 int ShareRemove(const Arguments& arguments);
 int ShareList(const Arguments& arguments);
 int ShareAccept(const Arguments& arguments);
+int ShareSet(const Arguments& arguments);
 
 int FolderAdd(const Arguments& arguments);
 int FolderSet(const Arguments& arguments);

@@ -152,6 +152,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   }
   object["state"] = AgreementText(facts.agreement);
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
+  object["stored"] = ContentObject(facts.content);
   object["needs_reindex"] = NeedsReindex(facts);
   object["root_problem"] = ProblemOfRoot(facts);
   object["index_problem"] = facts.index_problem;
@@ -208,6 +209,9 @@ void PutFacts(const PathFacts& facts) {
   }
   if (facts.in_index) {
     PutEntry(facts.entry);
+    for (const auto& [name, text] : ContentLines(facts.content)) {
+      PutFact("  content " + name, text);
+    }
   }
   for (const PendingEvent& event : facts.pending.events) {
     PutFact(

@@ -4,6 +4,7 @@
 
 #include <string>
 
+#include "ctl/info_content.h"
 #include "ctl/pending.h"
 #include "ctl/places.h"
 #include "index/entry.h"
@@ -36,6 +37,7 @@ struct PathFacts {
   std::string at;  // the component that decides (a link, a mount point, a name); empty: none
   bool in_index = false;
   Entry entry;  // if so
+  EntryContent content;
   bool index_read = true;
   std::string index_problem;  // why there is nothing to read; empty: there is
   Agreement agreement = Agreement::UNKNOWN;

@@ -96,7 +96,7 @@ Json::Value HitObject(const Hit& hit) {
   object["size"] = static_cast<Json::Int64>(hit.entry.size);
   object["mtime"] = static_cast<Json::Int64>(WholeSeconds(hit.entry.mtime));
   object["score"] = hit.score;
-  object["snippet"] = "";
+  object["snippet"] = hit.snippet.text;
   return object;
 }
 
@@ -114,6 +114,20 @@ std::string ShortSize(int64_t bytes) {
   (void)snprintf(text, sizeof(text), unit > 0 && size < 10 ? "%.1f%c" : "%.0f%c", size,
                  UNITS[unit]);
   return text;
+}
+
+// Below its hit, the question's words bright.
+void PutSnippet(const Snippet& snippet) {
+  constexpr const char* BRIGHT = "\x1b[1m";
+  constexpr const char* PLAIN = "\x1b[0m";
+  std::string line = "    ";
+  size_t at = 0;
+  for (const Snippet::Mark& mark : snippet.marks) {
+    line += Printable(snippet.text.substr(at, mark.start - at)) + BRIGHT +
+            Printable(snippet.text.substr(mark.start, mark.end - mark.start)) + PLAIN;
+    at = mark.end;
+  }
+  (void)PutLine(line + Printable(snippet.text.substr(at)));
 }
 
 // For people: columns, and nothing in a name that would move the cursor.
@@ -135,6 +149,9 @@ void PutColumns(const std::vector<Hit>& hits) {
     line += "  " + std::string(size.size() < 6 ? 6 - size.size() : 0, ' ') + size;
     line += "  " + (is_folder ? "-" : LocalTime(WholeSeconds(entry.mtime)));
     (void)PutLine(line);
+    if (!hits[index].snippet.text.empty()) {
+      PutSnippet(hits[index].snippet);
+    }
   }
 }
 
@@ -181,6 +198,8 @@ int Search(const Arguments& arguments) {
   // A share without an index yet holds nothing to find: that is no failure.
   std::erase_if(question.shares,
                 [](const std::string& share) { return IsDirectoryGone(IndexPath(share)); });
+
+  question.count_all = arguments.count;
 
   Answer answer;
   std::string error;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// share add, remove, accept, list.
+// share add, remove, accept, set, list.
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
@@ -10,6 +10,7 @@
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "index/reader.h"
+#include "index/text_tokenizer.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
@@ -224,6 +225,26 @@ int ShareAccept(const Arguments& arguments) {
   return CodeOfReply(AskDaemon("upsert_folder_setting", data), share->name);
 }
 
+int ShareSet(const Arguments& arguments) {
+  const std::string language = LanguageName(arguments.language.value_or(""));
+  if (language.empty()) {
+    std::string known;
+    for (const std::string& name : Languages()) {
+      known += (known.empty() ? "" : ", ") + name;
+    }
+    return Fail(EXIT_USAGE, "share set: --language: not one of %s: %s", known.c_str(),
+                arguments.language.value_or("").c_str());
+  }
+
+  Session session;
+  if (!session.Open() || session.FindShare(arguments.share) == nullptr) {
+    return EXIT_FAILED;
+  }
+  return session.store->SetShareLanguage(arguments.share, language)
+             ? EXIT_DONE
+             : Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
+}
+
 int ShareList(const Arguments& arguments) {
   Session session;
   if (!session.Open()) {
@@ -240,6 +261,7 @@ int ShareList(const Arguments& arguments) {
     Json::Value item(Json::objectValue);
     item["name"] = ToUtf8(share.name);
     SetPath(item, share.path);
+    item["language"] = share.language;
     list.append(item);
   }
   if (arguments.json) {

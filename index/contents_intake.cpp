@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "index/contents_writer_impl.h"
+#include "index/kind.h"
 
 namespace fileindexd {
 
@@ -95,6 +96,12 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
     now.kind = entry.kind;
     again = again || (file.state == ContentState::DONE && file.found_kind == Kind::OTHER);
   }
+  if (!again) {
+    const int code = JudgeFound(file, now, again);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+  }
   if (again) {
     WaitAnew(now);
     const auto handed = out.find(file.id);
@@ -102,9 +109,38 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
       handed->second.is_stale = true;
     }
   }
-  const bool same =
-      now.ctime == file.ctime && now.kind == file.kind && !again && file.unreferred_since == 0;
+  const bool same = now.ctime == file.ctime && now.kind == file.kind && !again &&
+                    file.unreferred_since == 0 && now.extractor == file.extractor;
   return same ? SQLITE_OK : table->Update(file, now);
+}
+
+// Of a file whose name tells no kind, settings may want what was found by now, or not any more.
+int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, bool& again) {
+  if (file.state != ContentState::DONE) {
+    return SQLITE_OK;
+  }
+  bool is_kept = true;
+  const int code = IsKept(file, file.found_kind, is_kept);
+  if (code != SQLITE_OK || is_kept == (file.extractor != KEPT_OUT)) {
+    return code;
+  }
+  again = is_kept;
+  now.extractor = KEPT_OUT;
+  return is_kept ? SQLITE_OK : table->SetContent(file, OfKind(file.found_kind), now);
+}
+
+int ContentsWriter::Impl::IsKept(const ContentFile& file, Kind found, bool& is_kept) {
+  is_kept = true;
+  if (settings == nullptr || file.kind != Kind::OTHER || found == Kind::OTHER) {
+    return SQLITE_OK;
+  }
+  std::vector<std::string> paths;
+  const int code = entries.Paths(file.identity, paths);
+  is_kept = paths.empty() || std::any_of(paths.begin(), paths.end(), [&](const auto& path) {
+              const IndexedFolder* folder = settings->FolderOfPath(path);
+              return folder != nullptr && IsContentWanted(found, folder->wanted);
+            });
+  return code;
 }
 
 // The row follows the file: what was read of its old bytes goes at once.

@@ -12,7 +12,9 @@
 //     kind              by the name of an entry; the entries' numbers
 //     found_kind        by the content; 0: not known, or nothing that is read
 //     state             ContentState
-//     extractor         version of the readers that read it last; 0: none did
+//     extractor         version of the readers that read it last; 0: none did, or, of a file that
+//     is
+//                       done, nothing was kept, as what it was found to be is not wanted
 //     tries             how many ended with the death of whatever read it
 //     unended           how many began beside others and have no end on record: its fault or not
 //     begun             0 not in flight, 1 alone, 2 beside others

@@ -96,6 +96,7 @@ class ContentsTable {
     bool IsZero() const { return waiting == 0 && done == 0 && failed == 0; }
   };
 
+  int PrepareTexts();
   int WriteMeta();
   int WriteCounts(int64_t now);
   void Count(const ContentFile& file, int64_t number);

@@ -206,8 +206,12 @@ bool ContentsWriter::Impl::Finish(int64_t id, const Content& content) {
   if (current) {
     now.state = ContentState::DONE;
     now.tries = 0;
-    now.extractor = extractor;
-    code = table->SetContent(file, content, now);
+    bool is_kept = true;
+    code = IsKept(file, content.kind, is_kept);
+    now.extractor = is_kept ? extractor : KEPT_OUT;
+    if (code == SQLITE_OK) {
+      code = table->SetContent(file, is_kept ? content : OfKind(content.kind), now);
+    }
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
     ++table->done_now;
   }
@@ -310,6 +314,10 @@ void ContentsWriter::Close() {
 
 bool ContentsWriter::IsOpen() const {
   return impl->table.has_value();
+}
+
+void ContentsWriter::UseSettings(std::shared_ptr<const Settings> in_force) {
+  impl->settings = std::move(in_force);
 }
 
 bool ContentsWriter::TakeIn(size_t limit, bool& more) {

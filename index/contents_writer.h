@@ -46,6 +46,10 @@ class ContentsWriter {
   void Close();
   bool IsOpen() const;
 
+  // Whose folders tell which kinds are wanted of files whose names tell none: what was found to be
+  // of another kind is not kept. Until it is called, all are. When they changed: LookAtAll.
+  void UseSettings(std::shared_ptr<const Settings> in_force);
+
   // Takes in entries that changed since the last call, at most `limit` rows: files wanted and not
   // known begin to wait; a file whose ctime is another while all else is the same waits again when
   // the entry was added anew, and only has the ctime stored when it was updated. `more`: call

@@ -12,6 +12,7 @@
 
 #include <functional>
 #include <map>
+#include <memory>
 #include <optional>
 #include <set>
 #include <string>
@@ -22,6 +23,15 @@
 #include "index/entry_follower.h"
 
 namespace fileindexd {
+
+// `extractor` of a file that is done and of which nothing was kept: its kind is not wanted.
+constexpr int64_t KEPT_OUT = 0;
+
+inline Content OfKind(Kind kind) {
+  Content content;
+  content.kind = kind;
+  return content;
+}
 
 struct ContentsWriter::Impl {
   // contents_writer_open.cpp
@@ -39,6 +49,8 @@ struct ContentsWriter::Impl {
   int TakeInEntry(const FollowedEntry& entry);
   int TakeInKnown(const FollowedEntry& entry, const ContentFile& file);
   int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
+  int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
+  int IsKept(const ContentFile& file, Kind found, bool& is_kept);
   int DropUnwanted(const ContentFile& file);
   int LookOn(int64_t limit, bool& more);
   bool Sweep(int64_t now, size_t limit, bool& more);
@@ -74,6 +86,7 @@ struct ContentsWriter::Impl {
   IndexDatabase database;
   std::optional<ContentsTable> table;
   EntryFollower entries;
+  std::shared_ptr<const Settings> settings;  // null: all kinds are wanted
   IndexError error = IndexError::PATH_NOT_FOUND;
   std::map<int64_t, HandedOut> out;
   std::set<int64_t> released;  // those are offered last

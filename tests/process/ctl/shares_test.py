@@ -1,5 +1,5 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
-"""share add, remove, list."""
+"""share add, remove, set, list."""
 
 import os
 
@@ -97,6 +97,15 @@ class SharesTest(IndexTest):
         (share,) = self.ctl("share", "list", "--json").json()
         self.assertEqual(bytes.fromhex(share["path_hex"]), path)
         self.assertEqual(share["path"], f"{namespace.DATA}/\ufffd\ufffd")
+
+    def test_language_is_kept_under_its_name(self):
+        self.ctl("share", "add", "alpha", self.root)
+        for given, kept in (("de", "german"), ("French", "french"), ("none", "none")):
+            self.ctl("share", "set", "alpha", "--language", given)
+            (share,) = self.ctl("share", "list", "--json").json()
+            self.assertEqual(share["language"], kept)
+
+        self.ctl("share", "set", "beta", "--language", "german", code=1)
 
     def check_remove(self):
         self.ctl("share", "remove", "alpha")

@@ -20,6 +20,9 @@ WRONG = [
     ("share", "remove"),
     ("share", "list", "x"),
     ("share", "accept"),
+    ("share", "set", "a"),
+    ("share", "set", "--language", "german"),
+    ("share", "set", "a", "--language", "klingon"),
     ("status", "--follow", "x"),
     ("folder",),
     ("folder", "add"),
@@ -56,6 +59,7 @@ WRONG = [
 COMMANDS = [
     ("share",),
     ("share", "add"),
+    ("share", "set"),
     ("folder", "add"),
     ("folder", "set"),
     ("event",),

@@ -186,6 +186,34 @@ TEST_F(ContentsWriterTest, KindThatIsSwitchedOffIsDroppedAtOnce) {
   EXPECT_EQ(Holding("mp3"), 1);
 }
 
+TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
+  const auto use = [this](const ContentFlags& flags) {
+    ASSERT_TRUE(store->SetFolder(root, flags));
+    std::shared_ptr<const Settings> in_force;
+    ASSERT_TRUE(store->GetSettings(in_force));
+    contents->UseSettings(in_force);
+    contents->LookAtAll();
+    TakeIn();
+  };
+  File("plain");
+  use({false, true, true, true});
+  ASSERT_EQ(Read(), Names({"plain"}));
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+  EXPECT_EQ(Number("SELECT found_kind FROM files"), 1);
+  EXPECT_EQ(Jobs(), Names());
+
+  use({true, true, true, true});
+  EXPECT_EQ(Read(), Names({"plain"}));
+  EXPECT_EQ(Holding("plain"), 1);
+  use({true, false, false, false});
+  EXPECT_EQ(Jobs(), Names());
+
+  use({false, true, true, true});
+  EXPECT_EQ(Holding("plain"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+  EXPECT_EQ(Jobs(), Names());
+}
+
 TEST_F(ContentsWriterTest, WhatNoEntryRefersToIsSweptAfterADay) {
   File("a.txt");
   File("b.txt");

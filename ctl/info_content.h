@@ -1,0 +1,30 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What was read out of a file, as info shows it.
+#pragma once
+
+#include <json/value.h>
+
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "base/content.h"
+#include "index/entry.h"
+
+namespace fileindexd {
+
+struct EntryContent {
+  bool is_known = false;
+  std::string state;   // "waiting", "done", "failed"
+  std::string reason;  // of a failure
+  Content content;
+};
+
+// Not known: nothing was read of it yet, or its content is not wanted, or cannot be read.
+EntryContent ContentOf(const std::string& share, const Entry& entry);
+
+Json::Value ContentObject(const EntryContent& content);  // null when not known
+// Names and values for people: state first, then the fields.
+std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content);
+
+}  // namespace fileindexd

@@ -1,0 +1,188 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Texts of contents, and their words.
+#include <algorithm>
+#include <utility>
+
+#include "index/contents_table.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t REWORD_BYTES = size_t{8} << 20;
+constexpr int64_t REWORD_ROWS = 500;
+constexpr size_t NUMBERS = 14;
+
+std::string SetContentSql() {
+  std::string sql = "UPDATE files SET is_cut = ?2, sample = ?3, (" + std::string(NUMBER_COLUMNS);
+  sql += ") = (?4";
+  for (size_t i = 1; i < NUMBERS; ++i) {
+    sql += ", ?" + std::to_string(i + 4);
+  }
+  return sql + ") WHERE id = ?1";
+}
+
+}  // namespace
+
+int ContentsTable::PrepareTexts() {
+  const std::string content_sql = SetContentSql();
+  const std::pair<Statement*, const char*> statements[] = {
+      {&set_content, content_sql.c_str()},
+      {&insert_text, "INSERT INTO texts(id, packed) VALUES(?1, ?2)"},
+      {&read_text, "SELECT packed FROM texts WHERE id = ?1"},
+      {&next_texts, "SELECT id, packed FROM texts WHERE id > ?1 ORDER BY id LIMIT ?2"},
+      {&remove_text, "DELETE FROM texts WHERE id = ?1"},
+  };
+  for (const auto& [statement, sql] : statements) {
+    const int code = statement->Prepare(handle, sql);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+  }
+  return SQLITE_OK;
+}
+
+int ContentsTable::PrepareWords() {
+  const int code = insert_words.Prepare(
+      handle, "INSERT INTO words(rowid, title, fields, text) VALUES(?1, ?2, ?3, ?4)");
+  return code != SQLITE_OK
+             ? code
+             : remove_words.Prepare(handle,
+                                    "INSERT INTO words(words, rowid, title, fields, text) "
+                                    "VALUES('delete', ?1, ?2, ?3, ?4)");
+}
+
+int ContentsTable::MakeWords(const std::string& language) {
+  int code = Begin();
+  if (code == SQLITE_OK) {
+    code = sqlite3_exec(handle, WordsSchema(language).c_str(), nullptr, nullptr, nullptr);
+  }
+  meta.language = language;
+  meta.reworded = meta.last_text == 0 ? ALL_WORDS : 0;
+  return code;
+}
+
+int ContentsTable::SetContent(const ContentFile& before, const Content& content,
+                              ContentFile& file) {
+  int code = Begin();
+  if (code == SQLITE_OK && before.text != 0) {
+    code = RemoveContent(file);
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  file.found_kind = content.kind;
+  set_content.BindInt(1, before.id);
+  set_content.BindInt(2, content.is_cut ? 1 : 0);
+  set_content.BindInt(3, static_cast<int64_t>(content.sample));
+  for (size_t i = 0; i < NUMBERS; ++i) {
+    sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 4);
+  }
+  for (const NumberField& field : content.numbers) {
+    set_content.BindInt(4 + static_cast<int>(field.field) - static_cast<int>(FIRST_NUMBER_FIELD),
+                        field.number);
+  }
+  code = set_content.Run();
+  const ContentWords words = WordsOf(content);
+  if (code != SQLITE_OK || words.IsEmpty()) {
+    return code;
+  }
+
+  const std::string packed = PackTexts(content);
+  if (packed.empty()) {
+    return SQLITE_NOMEM;
+  }
+  file.text = ++meta.last_text;
+  insert_text.BindInt(1, file.text);
+  insert_text.BindBlob(2, packed);
+  code = insert_text.Run();
+  file.length = static_cast<int64_t>(words.Length());
+  pending_bytes += words.Length();
+  // Where words are being made anew, these are met on the way.
+  return code == SQLITE_OK && meta.reworded == ALL_WORDS ? AddWords(file.text, words) : code;
+}
+
+int ContentsTable::RemoveContent(ContentFile& file) {
+  if (file.text != 0) {
+    leaving.push_back(file.text);
+    pending_bytes += static_cast<size_t>(file.length);
+  }
+  file.text = 0;
+  file.length = 0;
+  return Begin();
+}
+
+int ContentsTable::AddWords(int64_t text, const ContentWords& words) {
+  insert_words.BindInt(1, text);
+  insert_words.BindText(2, words.title);
+  insert_words.BindText(3, words.fields);
+  insert_words.BindText(4, words.text);
+  return insert_words.Run();
+}
+
+int ContentsTable::RemoveWords() {
+  std::sort(leaving.begin(), leaving.end());
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < leaving.size() && code == SQLITE_OK; ++i) {
+    code = RemoveWordsOf(leaving[i]);
+  }
+  leaving.clear();
+  return code;
+}
+
+int ContentsTable::RemoveWordsOf(int64_t text) {
+  Content content;
+  read_text.BindInt(1, text);
+  int code = read_text.Step();
+  const bool sound = code == SQLITE_ROW && UnpackTexts(read_text.Bytes(0), content);
+  read_text.Reset();
+  if (!sound) {
+    return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+  }
+
+  code = SQLITE_OK;
+  if (text <= meta.reworded) {
+    const ContentWords words = WordsOf(content);
+    remove_words.BindInt(1, text);
+    remove_words.BindText(2, words.title);
+    remove_words.BindText(3, words.fields);
+    remove_words.BindText(4, words.text);
+    code = remove_words.Run();
+  }
+  remove_text.BindInt(1, text);
+  return code == SQLITE_OK ? remove_text.Run() : code;
+}
+
+int ContentsTable::Reword(bool& more) {
+  more = meta.reworded != ALL_WORDS;
+  int code = more ? Begin() : SQLITE_OK;
+  if (code != SQLITE_OK || !more) {
+    return code;
+  }
+
+  next_texts.BindInt(1, meta.reworded);
+  next_texts.BindInt(2, REWORD_ROWS);
+  code = next_texts.Step();
+  more = code == SQLITE_ROW;
+  for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {
+    Content content;
+    const int64_t text = next_texts.Int(0);
+    if (!UnpackTexts(next_texts.Bytes(1), content)) {
+      code = SQLITE_CORRUPT;
+      break;
+    }
+    bytes += content.text.size();
+    pending_bytes += content.text.size();
+    code = AddWords(text, WordsOf(content));
+    meta.reworded = text;
+    code = code == SQLITE_OK ? next_texts.Step() : code;
+  }
+  next_texts.Reset();
+  if (!more && code == SQLITE_DONE) {
+    meta.reworded = ALL_WORDS;
+  }
+  return code == SQLITE_DONE || code == SQLITE_ROW ? SQLITE_OK : code;
+}
+
+}  // namespace fileindexd
