@@ -178,7 +178,7 @@ void ContentLoop::Reload() {
   for (const Share& share : settings->shares) {
     std::string folders = FoldersText(*settings, share.name);
     if (!folders.empty()) {
-      Follow(share, folders);
+      Follow(share, folders, settings);
       current.emplace(share.name, std::move(folders));
     }
   }
@@ -191,7 +191,8 @@ void ContentLoop::Reload() {
   });
 }
 
-void ContentLoop::Follow(const Share& share, const std::string& folders) {
+void ContentLoop::Follow(const Share& share, const std::string& folders,
+                         const std::shared_ptr<const Settings>& settings) {
   ShareStatus status;
   if (!store->GetStatus(share.name, status)) {
     return;  // it has just been removed
@@ -205,6 +206,7 @@ void ContentLoop::Follow(const Share& share, const std::string& folders) {
     followed.contents.LookAtAll();
   }
   followed.folders = folders;
+  followed.contents.Use(settings);
   followed.contents.Set(share, status.no_space, status.retry_contents);
 }
 

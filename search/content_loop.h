@@ -57,7 +57,8 @@ class ContentLoop {
 
   void Listen(Time now);
   void Reload();
-  void Follow(const Share& share, const std::string& folders);
+  void Follow(const Share& share, const std::string& folders,
+              const std::shared_ptr<const Settings>& settings);
   void OpenPool(Time now);
   void TellLeftOut();
   void TakeOutcomes(Time now);

@@ -13,6 +13,7 @@
 #include <cstdint>
 #include <deque>
 #include <map>
+#include <memory>
 #include <optional>
 #include <string>
 #include <utility>
@@ -32,6 +33,8 @@ class ShareContents {
  public:
   explicit ShareContents(Share followed);
 
+  // Settings in force: which kinds are wanted where. Folders that changed want LookAtAll.
+  void Use(std::shared_ptr<const Settings> settings) { writer.UseSettings(std::move(settings)); }
   // What is known of the share from outside, as it is now.
   void Set(const Share& current, bool has_no_space, bool wants_retry);
   void EntriesChanged();

@@ -3,7 +3,6 @@
 
 import os
 import shutil
-import subprocess
 import sys
 import unittest.mock
 
@@ -59,9 +58,8 @@ class ContentsTest(IndexTest):
 
     def start_service(self):
         """By hand, as a service manager would after it was killed."""
-        # pylint: disable=consider-using-with: it runs on
-        process = subprocess.Popen([program("talocontentsearchd")], env=environment())
-        return process.pid
+        path = program("talocontentsearchd")
+        return os.posix_spawn(path, [path], environment())
 
 
 class ScriptedTest(ContentsTest):

@@ -93,6 +93,8 @@ bool ContentsWriter::IsOpen() const {
   return impl->contents != nullptr;
 }
 
+void ContentsWriter::UseSettings(std::shared_ptr<const Settings> /*in_force*/) {}
+
 bool ContentsWriter::TakeIn(size_t /*limit*/, bool& more) {
   more = false;
   if (!impl->Call("TakeIn")) {
