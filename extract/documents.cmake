@@ -22,7 +22,6 @@ add_library(extract_documents STATIC
   rtf_tokens.cpp
   slides_text.cpp
   unpacker.cpp
-  utf16.cpp
   word_text.cpp
   workbook_text.cpp
   xml_part.cpp)

@@ -8,6 +8,7 @@
 #include <chrono>
 
 #include "extract/characters.h"
+#include "extract/utf16.h"
 
 namespace fileindexd {
 
@@ -104,22 +105,6 @@ bool IsUtf8(std::string_view bytes) {
     bytes.remove_prefix(character.length);
   }
   return true;
-}
-
-void AppendUtf8(uint32_t character, std::string& text) {
-  if (character < 0x80) {
-    text += static_cast<char>(character);
-    return;
-  }
-  if (character >= 0x110000) {
-    character = 0xfffd;
-  }
-  const int length = character < 0x800 ? 2 : character < 0x10000 ? 3 : 4;
-  constexpr uint32_t FIRST[] = {0, 0, 0xc0, 0xe0, 0xf0};
-  text += static_cast<char>(FIRST[length] | (character >> (6 * (length - 1))));
-  for (int rest = length - 2; rest >= 0; rest--) {
-    text += static_cast<char>(0x80 | ((character >> (6 * rest)) & 0x3f));
-  }
 }
 
 std::string Utf8OfUtf16(std::string_view bytes) {

@@ -20,7 +20,6 @@ bool IsUtf8(std::string_view bytes);
 
 // Of UTF-16 with the low byte first.
 std::string Utf8OfUtf16(std::string_view bytes);
-void AppendUtf8(uint32_t character, std::string& text);
 
 // Without blanks, line ends and zeros at both ends.
 std::string_view Trimmed(std::string_view text);

@@ -6,6 +6,7 @@
 #include <algorithm>
 
 #include "extract/media_text.h"
+#include "extract/utf16.h"
 #include "extract/track_format.h"
 
 namespace fileindexd {
