@@ -41,7 +41,7 @@ struct ExtractOutcome {
 struct PoolOptions {
   unsigned helpers = 1;
   size_t text_cap = 1 << 20;                   // bytes of text kept of a document
-  std::chrono::milliseconds deadline{60'000};  // for one document
+  std::chrono::milliseconds deadline{60'000};  // for one document, from when a helper has it
   std::string program;                         // fileindex-extract's path
 };
 

@@ -25,6 +25,8 @@ using Result = ExtractOutcome::Result;
 constexpr unsigned JOBS_OF_A_HELPER = 500;
 // A process that ends closes its socket a moment before it is seen to have ended.
 constexpr std::chrono::seconds GRACE(2);
+// A busy host starts processes slowly; the document's own time begins when the helper has it.
+constexpr std::chrono::seconds TO_BEGIN(60);
 // Who ends before it has begun, or is killed by somebody, tells nothing about the file. Killed
 // again and again at the same one, as by a host short of memory, it may be that file's doing.
 constexpr int LOST_HELPERS = 3;
@@ -57,7 +59,7 @@ std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now
   current.id = job.id;
   current.name = std::move(job.name);
   current.file.Swap(job.file);
-  deadline = now + options.deadline;
+  deadline = now + std::max<Clock::duration>(options.deadline, TO_BEGIN);
   lost_helpers = 0;
   return Begin();
 }
@@ -91,6 +93,26 @@ bool Slot::Hand(int file, const std::string& name, std::string& error) {
   DropHelper();
   // One that ended while it had nothing to do has nothing to do with this file.
   return is_gone && Hand(file, name, error);
+}
+
+bool Slot::Start(std::string& error) {
+  int ends[2] = {-1, -1};
+  if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
+    error = "socket: " + ErrorText();
+    return false;
+  }
+
+  ScopedFd ours(ends[0]);
+  const ScopedFd theirs(ends[1]);
+  if (!StartChild(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
+    return false;
+  }
+  socket.Swap(ours);
+  received.clear();
+  is_ready = false;
+  closing = false;
+  jobs_done = 0;
+  return true;
 }
 
 // The message is small and the socket empty: it goes as a whole or not at all. False with errno.
@@ -130,7 +152,12 @@ std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
       DropHelper();
       outcome = outcome ? std::move(outcome) : JudgeEnd(*status);
     } else if (!outcome && closing && now >= grace) {
-      outcome = Nonsense("it closed its connection");
+      if (has_begun) {
+        outcome = Nonsense("it closed its connection");
+      } else {
+        Kill(helper);  // and then another gets the job
+        grace = Clock::time_point::max();
+      }
     }
   }
   if (!outcome && HasJob() && now >= deadline) {
@@ -194,6 +221,9 @@ std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
         return Nonsense("it begins what it was not asked for");
       }
       has_begun = true;
+      if (stage == Stage::READING) {
+        deadline = Clock::now() + options.deadline;
+      }
       return std::nullopt;
     case Answer::Sort::ANSWER:
       if (!is_asked || !has_begun || !received.empty()) {
@@ -304,11 +334,12 @@ std::optional<ExtractOutcome> Slot::Overdue() {
   const std::string took = limit % 1000 == 0
                                ? "took longer than " + std::to_string(limit / 1000) + " s"
                                : "took longer than " + std::to_string(limit) + " ms";
-  if (stage == Stage::CONVERTING) {
+  if (stage != Stage::CONVERTING) {
+    DropHelper();
+  }
+  if (stage != Stage::READING) {
     return End(Result::FAILED, converter_name + ": " + took);
   }
-
-  DropHelper();
   return has_begun ? End(Result::KILLED, took)
                    : End(Result::LOST, options.program + ": does not start in time");
 }
