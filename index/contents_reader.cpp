@@ -73,11 +73,17 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
   const std::string file = ContentsPath(share_name) + "/" + CONTENTS_FORM.file;
   attach.BindText(1, file);
   code = attach.Run();
-  if (code == SQLITE_OK) {
-    int persist = 1;
-    sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
+  if (code != SQLITE_OK) {
+    return FromSqlite(code);
   }
-  return FromSqlite(code);
+  int persist = 1;
+  sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
+
+  // The words' table is made after the others, once the share's language is known.
+  Statement words;
+  code = words.Prepare(entries.db, "SELECT 1 FROM contents.sqlite_master WHERE name = 'words'");
+  code = code == SQLITE_OK ? words.Step() : code;
+  return code == SQLITE_DONE ? IndexError::PATH_NOT_FOUND : FromSqlite(code);
 }
 
 IndexError ContentsReader::Open(const std::string& share_name) {

@@ -1,12 +1,14 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Shares on real file systems: ext4 and btrfs on loop devices, tmpfs."""
 
+import errno
 import os
 import subprocess
 import sys
+import time
 
 from harness import namespace
-from harness.awaiting import LIMIT
+from harness.awaiting import IN_CLOSE, LIMIT, FolderWatch
 from harness.checks import IndexTest
 
 IMAGE_SIZE = {"ext4": 512 << 20, "btrfs": 512 << 20, "xfs": 512 << 20}
@@ -32,6 +34,18 @@ def run(*command):
         list(map(os.fsencode, command)), capture_output=True, check=False, timeout=LIMIT
     )
     assert done.returncode == 0, f"{command}: {done.stderr!r}"
+
+
+def unmount(folder):
+    """Once nothing there is open: the content service may be reading a document."""
+    deadline = time.monotonic() + LIMIT
+    with FolderWatch(*(path for path, _, _ in os.walk(folder)), mask=IN_CLOSE) as watch:
+        while True:
+            try:
+                return namespace.unmount(folder)
+            except OSError as error:
+                if error.errno != errno.EBUSY or not watch.wait(deadline - time.monotonic()):
+                    raise
 
 
 def make_image(kind, name):
@@ -69,7 +83,7 @@ class FilesystemTest(IndexTest):
             namespace.mount("tmpfs", self.disk, "tmpfs")
 
     def unmount_disk(self):
-        run("umount", self.disk)
+        unmount(self.disk)
 
     def add_share(self, *folders, flags=()):
         self.ctl("share", "add", "alpha", self.root)
