@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Shares on real file systems: ext4 and btrfs on loop devices, tmpfs."""
 
+import contextlib
 import errno
 import os
 import subprocess
@@ -36,16 +37,32 @@ def run(*command):
     assert done.returncode == 0, f"{command}: {done.stderr!r}"
 
 
+def _is_mounted_somewhere(folder):
+    mounted = f" {folder} ".encode()
+    for process in filter(str.isdigit, os.listdir("/proc")):
+        with contextlib.suppress(OSError), open(f"/proc/{process}/mountinfo", "rb") as mounts:
+            if mounted in mounts.read():
+                return True
+    return False
+
+
 def unmount(folder):
-    """Once nothing there is open: the content service may be reading a document."""
+    """Once nothing there is open: the content service may be reading a document.
+
+    A reader's helper that has just begun holds copies of all mounts, until it has a root of its
+    own; nothing tells of the end of that.
+    """
     deadline = time.monotonic() + LIMIT
     with FolderWatch(*(path for path, _, _ in os.walk(folder)), mask=IN_CLOSE) as watch:
         while True:
             try:
-                return namespace.unmount(folder)
+                namespace.unmount(folder)
+                break
             except OSError as error:
                 if error.errno != errno.EBUSY or not watch.wait(deadline - time.monotonic()):
                     raise
+    while _is_mounted_somewhere(folder) and time.monotonic() < deadline:
+        time.sleep(0.01)
 
 
 def make_image(kind, name):
