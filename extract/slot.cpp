@@ -239,6 +239,9 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
   if ((!has_begun || IsKilledFromOutside(status)) && ++lost_helpers <= LOST_HELPERS) {
     return stage == Stage::READING ? Begin() : BeginResult();
   }
+  if (!has_begun) {  // it has not seen the file: whatever ends it, the file does not
+    return End(Result::LOST, "the helper ended before it began, with " + StatusText(status));
+  }
   if (status == EXIT_MEMORY << 8) {
     return End(Result::KILLED, "needs more memory than is allowed");
   }
@@ -265,7 +268,7 @@ std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
   if (!HasJob()) {
     return std::nullopt;
   }
-  return End(Result::KILLED, "the helper talked nonsense: " + what);
+  return End(has_begun ? Result::KILLED : Result::LOST, "the helper talked nonsense: " + what);
 }
 
 ExtractOutcome Slot::End(Result how, const std::string& reason) {

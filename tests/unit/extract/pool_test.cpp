@@ -110,6 +110,11 @@ TEST_F(PoolTest, AHelperThatEndsBeforeItBeginsIsNotTheFilesFault) {
   EXPECT_EQ(Told(Run("refuse")), "done");
 }
 
+TEST_F(PoolTest, AFileThatNoHelperHasBegunIsNeverToBlame) {
+  EXPECT_EQ(Told(Run("never")), "lost: the helper ended before it began, with code 5");
+  EXPECT_EQ(Told(Run("text next")), "done");
+}
+
 TEST_F(PoolTest, ManyJobsAtOnceAllEnd) {
   OpenWith(4, PoolFixture::LIMIT);
   const char* names[] = {"text a", "crash", "fail b", "text c", "nonsense"};

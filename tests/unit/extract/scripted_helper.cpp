@@ -8,6 +8,7 @@
 //   pid            answers with its process number   count          how many jobs it has had
 //   state          answers with what it was started with
 //   refuse         ends before it begins, if it had a job before
+//   never          ends before it begins
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/socket.h>
@@ -169,7 +170,7 @@ int Serve() {
     }
     int file = -1;
     memcpy(&file, CMSG_DATA(head), sizeof(file));
-    if (job->name == "refuse" && count > 1) {
+    if (job->name == "never" || (job->name == "refuse" && count > 1)) {
       _exit(5);  // ends over it without having begun
     }
     Answer begun;
