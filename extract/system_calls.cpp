@@ -18,8 +18,7 @@ namespace {
 constexpr const char* ALWAYS[] = {
     // its files, its socket, files in memory
     "read", "pread64", "readv", "preadv", "preadv2", "write", "pwrite64", "writev", "pwritev",
-    "lseek", "_llseek", "close", "dup", "dup2", "dup3", "fcntl", "fcntl64", "ftruncate",
-    "ftruncate64", "memfd_create", "recvmsg", "poll", "ppoll", "ppoll_time64", "fadvise64",
+    "lseek", "_llseek", "close", "dup", "dup2", "dup3", "ftruncate", "ftruncate64", "memfd_create", "recvmsg", "poll", "ppoll", "ppoll_time64", "fadvise64",
     "fadvise64_64", "arm_fadvise64_64",
     // looking at files
     "fstat", "fstat64", "fstatfs", "fstatfs64", "getcwd",
@@ -42,6 +41,10 @@ constexpr const char* BY_PATH[] = {"stat",      "stat64",     "lstat",     "lsta
                                    "fstatat64", "newfstatat", "statx",     "statfs",
                                    "statfs64",  "access",     "faccessat", "faccessat2",
                                    "readlink",  "readlinkat", "getdents",  "getdents64"};
+
+// About a descriptor of its own. Not its mode, locks, seals, owner: those of a file that it was
+// handed are the service's, too, and an owner is sent signals.
+constexpr scmp_datum_t FILE_COMMANDS[] = {F_GETFD, F_SETFD, F_GETFL, F_DUPFD, F_DUPFD_CLOEXEC};
 
 // Any of these bits writes, or makes a file.
 constexpr scmp_datum_t WRITING = O_WRONLY | O_RDWR | O_CREAT | O_TRUNC | (O_TMPFILE & ~O_DIRECTORY);
@@ -86,6 +89,10 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
   Filter filter;
   for (const char* name : ALWAYS) {
     filter.Allow(name);
+  }
+  for (const scmp_datum_t command : FILE_COMMANDS) {
+    filter.Allow("fcntl", SCMP_A1(SCMP_CMP_EQ, command));
+    filter.Allow("fcntl64", SCMP_A1(SCMP_CMP_EQ, command));
   }
   if (calls.can_open_files) {
     for (const char* name : BY_PATH) {
