@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/charset.h"
 
+#include <iconv.h>
 #include <uchardet/uchardet.h>
 
 #include <algorithm>
@@ -97,6 +98,16 @@ std::string GuessCharset(std::string_view bytes) {
   uchardet_data_end(detector.get());
   const std::string found = uchardet_get_charset(detector.get());
   return found.empty() || found == "ASCII" || found == "UTF-8" ? LIKELIEST : found;
+}
+
+void KeepCommonCharsets() {
+  for (const char* charset :
+       {"ISO-8859-1", "ISO-8859-2", "ISO-8859-5", "ISO-8859-7", "ISO-8859-15", "CP1250",
+        "CP1251",     "CP1252",     "CP1253",     "CP1254",     "CP437",       "CP850",
+        "KOI8-R",     "CP932",      "SHIFT_JIS",  "EUC-JP",     "ISO-2022-JP", "GB18030",
+        "BIG5",       "EUC-KR",     "CP949",      "UTF-7",      "UTF-16",      "UTF-32"}) {
+    (void)iconv_open("UTF-8", charset);  // never closed: the table stays as long as it is open
+  }
 }
 
 }  // namespace fileindexd

@@ -26,4 +26,8 @@ bool CouldBeUtf8(std::string_view bytes);
 // Of bytes that are no UTF-8; never empty.
 std::string GuessCharset(std::string_view bytes);
 
+// Has the C library hold its tables of the charsets in common use, for when it can open no file any
+// more.
+void KeepCommonCharsets();
+
 }  // namespace fileindexd

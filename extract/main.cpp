@@ -16,8 +16,10 @@
 #include <string_view>
 #include <system_error>
 
+#include "base/landlock.h"
 #include "base/scoped_fd.h"
 #include "extract/answer.h"
+#include "extract/charset.h"
 #include "extract/child.h"
 #include "extract/choice.h"
 #include "extract/converters.h"
@@ -109,6 +111,9 @@ int Serve(int parent) {
   (void)setlocale(LC_ALL, "C.UTF-8");
   if (!LoadMagic(error)) {
     return Complain(error, EXIT_DOORS);
+  }
+  if (LandlockVersion() < 1) {  // then perhaps no file can be opened later
+    KeepCommonCharsets();
   }
   Doors doors;
   doors.parent = parent;

@@ -18,8 +18,8 @@ namespace {
 constexpr const char* ALWAYS[] = {
     // its files, its socket, files in memory
     "read", "pread64", "readv", "preadv", "preadv2", "write", "pwrite64", "writev", "pwritev",
-    "lseek", "_llseek", "close", "dup", "dup2", "dup3", "ftruncate", "ftruncate64", "memfd_create", "recvmsg", "poll", "ppoll", "ppoll_time64", "fadvise64",
-    "fadvise64_64", "arm_fadvise64_64",
+    "lseek", "_llseek", "close", "dup", "dup2", "dup3", "ftruncate", "ftruncate64", "memfd_create",
+    "recvmsg", "poll", "ppoll", "ppoll_time64", "fadvise64", "fadvise64_64", "arm_fadvise64_64",
     // looking at files
     "fstat", "fstat64", "fstatfs", "fstatfs64", "getcwd",
     // memory
