@@ -3,6 +3,7 @@
 
 #include <array>
 #include <string>
+#include <utility>
 
 #include "extract/gobject.h"
 #include "extract/memory_file.h"
@@ -22,6 +23,15 @@ bool IsType(GMimeObject* object, const char* type, const char* subtype) {
 std::string CharsetOf(GMimePart* part) {
   const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
   return charset != nullptr ? charset : "";
+}
+
+// Of the file that is attached; empty: none.
+std::string NameOf(GMimeObject* object) {
+  const char* name = g_mime_object_get_content_disposition_parameter(object, "filename");
+  if (name == nullptr) {
+    name = g_mime_object_get_content_type_parameter(object, "name");
+  }
+  return name != nullptr ? name : "";
 }
 
 // What is said of text without a charset, or of text that nobody looked at, need not be true.
@@ -105,6 +115,7 @@ void MailParts::TakeObject(GMimeObject* object, int level) {
   } else if (GMIME_IS_MULTIPART(object)) {
     TakeMultipart(GMIME_MULTIPART(object), level);
   } else if (GMIME_IS_MESSAGE_PART(object)) {
+    sink.Set(ContentField::ATTACHMENTS, NameOf(object));
     GMimeMessage* message = g_mime_message_part_get_message(GMIME_MESSAGE_PART(object));
     if (message != nullptr) {
       TakeInnerMessage(message, level);
@@ -114,39 +125,44 @@ void MailParts::TakeObject(GMimeObject* object, int level) {
   }
 }
 
-// Of alternatives the plain text is enough; where it is empty the others are read.
+// Of alternatives the plain text is enough, but for what is attached to the others; where it is
+// empty they are read.
 void MailParts::TakeMultipart(GMimeMultipart* multipart, int level) {
   const int count = g_mime_multipart_get_count(multipart);
   const size_t before = sink.content.text.size();
+  const bool had_body = has_body;
+  int plain = -1;
   if (IsType(GMIME_OBJECT(multipart), "multipart", "alternative")) {
-    for (int i = 0; i < count; ++i) {
+    for (int i = 0; i < count && plain < 0; ++i) {
       GMimeObject* object = g_mime_multipart_get_part(multipart, i);
       if (IsType(object, "text", "plain")) {
+        plain = i;
         TakeObject(object, level + 1);
-        break;
       }
     }
   }
-  if (sink.content.text.size() > before) {
-    return;
-  }
+  has_body = had_body || sink.content.text.size() > before;
   for (int i = 0; i < count; ++i) {
-    TakeObject(g_mime_multipart_get_part(multipart, i), level + 1);
+    if (i != plain) {
+      TakeObject(g_mime_multipart_get_part(multipart, i), level + 1);
+    }
   }
+  has_body = had_body;
 }
 
 void MailParts::TakeInnerMessage(GMimeMessage* message, int level) {
+  const bool had_body = std::exchange(has_body, false);
   AddHeaderText(message, sink);
   GMimeObject* body = g_mime_message_get_mime_part(message);
   if (body != nullptr) {
     TakeObject(body, level + 1);
   }
+  has_body = had_body;
 }
 
 void MailParts::TakePart(GMimePart* part) {
   GMimeObject* object = GMIME_OBJECT(part);
-  const char* file_name = g_mime_part_get_filename(part);
-  const std::string name = file_name != nullptr ? file_name : "";
+  const std::string name = NameOf(object);
   const char* disposition = g_mime_object_get_disposition(object);
   const bool is_attached =
       (disposition != nullptr && g_ascii_strcasecmp(disposition, "attachment") == 0) ||
@@ -156,7 +172,9 @@ void MailParts::TakePart(GMimePart* part) {
     return;
   }
   if (IsType(object, "text", "*") && !is_attached) {
-    AddBody(part);
+    if (!has_body) {
+      AddBody(part);
+    }
   } else if (is_attached && document.depth < Allowance::MAX_DEPTH && allowance.TakeMember()) {
     AddAttachment(part, name);
   }

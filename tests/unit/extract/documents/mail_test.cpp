@@ -94,6 +94,30 @@ TEST(MailTest, AMessageWithinAMessageIsRead) {
   EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Gr\u00fc\u00dfe\u8ba1\u5212");
 }
 
+TEST(MailTest, WhatIsAttachedToAnAlternativeIsFoundItsTextIsNotReadTwice) {
+  const Reading reading = ReadBytes(
+      ReadMessage, "a.eml",
+      HEAD + Multipart("alternative", {PLAIN, Multipart("mixed", {PAGE, Attached("notes.txt",
+                                                                                 "attached "
+                                                                                 "words")})}));
+
+  EXPECT_EQ(reading.content.text, "The lighthouse p\u0159ed attached words");
+  EXPECT_EQ(reading.Text(ContentField::ATTACHMENTS), "notes.txt");
+}
+
+TEST(MailTest, AnAttachedMessageHasItsName) {
+  const Reading reading =
+      ReadBytes(ReadMessage, "a.eml",
+                HEAD + Multipart("alternative", {PLAIN,
+                                                 "Content-Type: message/rfc822\n"
+                                                 "Content-Disposition: attachment; "
+                                                 "filename=\"tide.eml\"\n\n"
+                                                 "Subject: inner\n\ninner words\n"}));
+
+  EXPECT_EQ(reading.Text(ContentField::ATTACHMENTS), "tide.eml");
+  EXPECT_EQ(reading.content.text, "The lighthouse p\u0159ed inner inner words");
+}
+
 TEST(MailTest, AnEncryptedMessageKeepsItsHeaders) {
   const Reading reading = ReadBytes(
       ReadMessage, "a.eml",
