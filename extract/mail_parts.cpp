@@ -5,6 +5,7 @@
 #include <string>
 #include <utility>
 
+#include "extract/charset.h"
 #include "extract/gobject.h"
 #include "extract/memory_file.h"
 
@@ -20,9 +21,11 @@ bool IsType(GMimeObject* object, const char* type, const char* subtype) {
   return content_type != nullptr && g_mime_content_type_is_type(content_type, type, subtype) != 0;
 }
 
+// Empty where nobody looked at the text.
 std::string CharsetOf(GMimePart* part) {
-  const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
-  return charset != nullptr ? charset : "";
+  const char* label = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
+  const std::string charset = label != nullptr ? MeantCharset(label) : "";
+  return charset == "UNKNOWN-8BIT" ? "" : charset;
 }
 
 // Of the file that is attached; empty: none.
@@ -32,12 +35,6 @@ std::string NameOf(GMimeObject* object) {
     name = g_mime_object_get_content_type_parameter(object, "name");
   }
   return name != nullptr ? name : "";
-}
-
-// What is said of text without a charset, or of text that nobody looked at, need not be true.
-bool IsTelling(const std::string& charset) {
-  return !charset.empty() && g_ascii_strcasecmp(charset.c_str(), "us-ascii") != 0 &&
-         g_ascii_strcasecmp(charset.c_str(), "unknown-8bit") != 0;
 }
 
 // Appends a part's decoded bytes, from `charset` (empty: as they are) to UTF-8, up to the bound of
@@ -186,7 +183,7 @@ void MailParts::AddBody(GMimePart* part) {
   const FormatReader reader =
       IsType(GMIME_OBJECT(part), "text", "html") ? ReadHtml : FormatReader{ReadText};
   MemoryFile text;
-  if (IsTelling(charset)) {
+  if (!charset.empty()) {
     if (!text.Open() || !text.Append(UTF8_MARK)) {
       return;
     }

@@ -78,6 +78,14 @@ TEST(MailTest, APageIsReadByTheCharsetOfItsHeader) {
   EXPECT_EQ(reading.content.text, "\u043f\u0440\u0438\u0432\u0435\u0442");
 }
 
+TEST(MailTest, ACharsetIsWhatPeopleMeanByItsName) {
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml",
+                      std::string(HEAD) + "Content-Type: text/plain; charset=ISO-8859-1\n\n"
+                                          "\x93quay\x94 \x80\n")
+                .content.text,
+            "\u201cquay\u201d \u20ac");
+}
+
 TEST(MailTest, TextWithoutACharsetIsGuessed) {
   EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", std::string(HEAD) + "\nna\u00efve \u8ba1\u5212\n")
                 .content.text,
