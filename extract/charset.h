@@ -21,8 +21,8 @@ const char* WideCharset(std::string_view bytes);
 bool IsAscii(std::string_view bytes);
 // Sequences that change the meaning of the seven-bit bytes behind them.
 bool HasShifts(std::string_view bytes);
-// Nearly all characters beyond ASCII are sequences of UTF-8: a bad byte among many good ones does not
-// make it another charset. The last character may be cut.
+// Nearly all characters beyond ASCII are sequences of UTF-8: a bad byte among many good ones does
+// not make it another charset. The last character may be cut.
 bool IsMostlyUtf8(std::string_view bytes);
 // Of bytes that are no UTF-8; never empty.
 std::string GuessCharset(std::string_view bytes);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // The helper with no more rights than the shipped units leave to the service that starts it.
 #include <fcntl.h>
+#include <sched.h>
 #include <sys/prctl.h>
 #include <sys/wait.h>
 
@@ -50,7 +51,8 @@ uint64_t BoundingSetOf(const std::string& unit) {
 class UnitsTest : public PoolFixture {
  public:
   // What a service with these rights gets from its helper.
-  std::string ReadWithin(uint64_t capabilities, const std::string& name, const char* bytes) {
+  std::string ReadWithin(const char* helper, uint64_t capabilities, const std::string& name,
+                         const char* bytes) {
     int ends[2] = {-1, -1};
     EXPECT_EQ(pipe2(ends, O_CLOEXEC), 0);
     const ScopedFd reading(ends[0]);
@@ -61,7 +63,7 @@ class UnitsTest : public PoolFixture {
       if (BoundCapabilities(capabilities) && KeepCapabilities(capabilities) &&
           prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0) {
         PoolOptions options;
-        options.program = HELPER;
+        options.program = helper;
         OpenPool(options);
         const ExtractOutcome outcome = Run(name, bytes);
         told = Told(outcome) + ": " + outcome.content.text;
@@ -85,9 +87,31 @@ TEST_F(UnitsTest, HelpersCloseTheirDoorsWithTheRightsOfTheUnits) {
   }
   for (const char* unit : {"talocontentsearchd.service.in", "fileindexd.service.in"}) {
     const uint64_t set = BoundingSetOf(unit);
-    EXPECT_EQ(ReadWithin(set, "a.txt", "some words"), "done: some words") << unit;
-    EXPECT_EQ(ReadWithin(set, "a.rtf", "{\\rtf1\\ansi some words}"), "done: some words") << unit;
+    EXPECT_EQ(ReadWithin(HELPER, set, "a.txt", "some words"), "done: some words") << unit;
+    EXPECT_EQ(ReadWithin(HELPER, set, "a.rtf", "{\\rtf1\\ansi some words}"), "done: some words")
+        << unit;
   }
+}
+
+// Whether everybody may have one here.
+bool HasUserNamespaces() {
+  const pid_t child = fork();
+  if (child == 0) {
+    _exit(setresuid(65534, 65534, 65534) == 0 && unshare(CLONE_NEWUSER) == 0 ? 0 : 1);
+  }
+  int status = 1;
+  EXPECT_EQ(waitpid(child, &status, 0), child);
+  return status == 0;
+}
+
+TEST_F(UnitsTest, WithoutLandlockTheyHaveAnOwnRootAllTheSame) {
+  if (geteuid() != 0 || !HasUserNamespaces()) {
+    GTEST_SKIP() << "takes a superuser, and user namespaces for everybody";
+  }
+  const uint64_t set = BoundingSetOf("talocontentsearchd.service.in");
+  EXPECT_EQ(ReadWithin(WITHOUT_LANDLOCK, set, "a.txt", "some words"), "done: some words");
+  EXPECT_EQ(ReadWithin(WITHOUT_LANDLOCK, set, "a.rtf", "{\\rtf1\\ansi some words}"),
+            "done: some words");
 }
 
 }  // namespace
