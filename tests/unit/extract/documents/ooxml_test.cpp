@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/choice.h"
 #include "tests/unit/extract/documents/fixture.h"
 #include "tests/unit/extract/documents/packing.h"
 
@@ -199,6 +200,20 @@ TEST(OoxmlTest, OfAPartThatBreaksOffTheBeginningIsKept) {
 
   EXPECT_EQ(reading.why, "damaged");
   EXPECT_THAT(reading.content.text, testing::StartsWith("half a"));
+}
+
+TEST(OoxmlTest, ADamagedDocumentIsNotReadAsAnArchive) {
+  std::string error;
+  ASSERT_TRUE(LoadMagic(error)) << error;
+  const Reading damaged =
+      ReadBytes(ReadDocument, "a.docx", Zipped({CORE, {"word/document.xml", "<d><p><t>half a"}}));
+  EXPECT_EQ(damaged.why, "damaged");
+  EXPECT_EQ(damaged.Text(ContentField::SUBJECT), "Harbour");
+  EXPECT_EQ(damaged.Text(ContentField::MEMBERS), "");
+
+  const Reading other = ReadBytes(ReadDocument, "a.docx", Zipped({{"a.txt", "words"}}));
+  EXPECT_TRUE(other.is_good) << other.why;
+  EXPECT_EQ(other.Text(ContentField::MEMBERS), "a.txt");
 }
 
 TEST(OoxmlTest, WhatIsNoDocumentIsSaidInWords) {
