@@ -26,6 +26,10 @@ constexpr std::chrono::seconds TO_BEGIN(60);
 // Who ends before it has begun, or is killed by somebody, tells nothing about the file. Killed
 // again and again at the same one, as by a host short of memory, it may be that file's doing.
 constexpr int LOST_HELPERS = 3;
+// Whose helper got less than this part of the deadline as processor time is begun again. A few
+// times only: a helper that waits for something that never comes gets none either.
+constexpr int USED_PART = 4;
+constexpr int STARVED_TIMES = 2;
 
 std::string ErrorText() {
   return std::generic_category().message(errno);
@@ -55,9 +59,14 @@ std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now
   current.id = job.id;
   current.name = std::move(job.name);
   current.file.Swap(job.file);
-  deadline = now + std::max<Clock::duration>(options.deadline, TO_BEGIN);
   lost_helpers = 0;
+  AllowTime(now);
   return Begin();
+}
+
+void Slot::AllowTime(Clock::time_point now) {
+  deadline = now + std::max<Clock::duration>(options.deadline, TO_BEGIN);
+  is_timed = false;
 }
 
 std::optional<ExtractOutcome> Slot::Begin() {
@@ -94,12 +103,15 @@ std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
     }
   }
   if (!outcome && HasJob() && now >= deadline) {
-    outcome = Overdue();
+    outcome = Overdue(now);
   }
   return outcome;
 }
 
 std::optional<ExtractOutcome> Slot::TakeFrames() {
+  if (!received.empty() && stage != Stage::READING && stage != Stage::READING_RESULT) {
+    return Nonsense("it was not asked anything");
+  }
   while (true) {
     const size_t size = FrameSize(received);
     if (size > MaxFrame(options.text_cap)) {
@@ -137,8 +149,10 @@ std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
         return Nonsense("it begins what it was not asked for");
       }
       has_begun = true;
-      if (stage == Stage::READING) {
+      used_before = ProcessorTime(helper);
+      if (!is_timed) {  // once for a document, however many helpers begin it
         deadline = Clock::now() + options.deadline;
+        is_timed = true;
       }
       return std::nullopt;
     case Answer::Sort::ANSWER:
@@ -248,7 +262,19 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
   return End(Result::KILLED, "the helper ended with " + StatusText(status));
 }
 
-std::optional<ExtractOutcome> Slot::Overdue() {
+// On a host that is busy with other things a document may not have had the time that has passed.
+bool Slot::IsStarved() const {
+  return stage == Stage::READING && has_begun && helper.IsThere() &&
+         ProcessorTime(helper) - used_before < options.deadline / USED_PART;
+}
+
+std::optional<ExtractOutcome> Slot::Overdue(Clock::time_point now) {
+  if (IsStarved() && ++lost_helpers <= STARVED_TIMES) {
+    DropHelper();
+    AllowTime(now);
+    return Begin();
+  }
+
   const long long limit = options.deadline.count();
   const std::string took = limit % 1000 == 0
                                ? "took longer than " + std::to_string(limit / 1000) + " s"

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/pool.h"
 
+#include <sys/wait.h>
+
 #include <csignal>
 #include <cstdlib>
 #include <thread>
@@ -79,6 +81,24 @@ TEST_F(PoolTest, ADocumentHasItsDeadline) {
   OpenWith(1, std::chrono::milliseconds(300));
   EXPECT_EQ(Told(Run("loop")), "killed: took longer than 300 ms");
   EXPECT_EQ(Told(Run("half")), "killed: took longer than 300 ms");
+}
+
+TEST_F(PoolTest, ADocumentThatGotNoProcessorTimeIsBegunAgain) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  EXPECT_EQ(Told(Run("starve", "")), "done");
+}
+
+TEST_F(PoolTest, AnIdleHelperThatSaysAnythingIsReplaced) {
+  const ExtractOutcome outcome = Run("more");
+  EXPECT_EQ(Told(outcome), "done");
+  const pid_t helper = std::stoi(outcome.content.text);
+  int status = 0;
+  ASSERT_EQ(waitpid(helper, &status, WUNTRACED), helper);
+  ASSERT_TRUE(WIFSTOPPED(status));
+  ASSERT_EQ(kill(helper, SIGCONT), 0);
+  Wait(std::chrono::steady_clock::now() + LIMIT);
+  EXPECT_TRUE(pool->Work().empty());
+  EXPECT_NE(std::stoi(Run("pid").content.text), helper);
 }
 
 TEST_F(PoolTest, ASlowDocumentHoldsNobodyUp) {
