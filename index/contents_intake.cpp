@@ -29,9 +29,6 @@ bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
   known_until = table->meta.seen;
   std::vector<FollowedEntry> rows;
   int code = entries.Next(table->meta.seen, static_cast<int64_t>(limit), rows);
-  if (code != SQLITE_OK) {
-    return DoneWithEntries(code);
-  }
   for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
     code = TakeInEntry(rows[i]);
     table->meta.seen = rows[i].written;

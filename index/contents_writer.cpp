@@ -57,27 +57,22 @@ bool ContentsWriter::Impl::ReadyToFollow() {
   return true;
 }
 
+// What fails in the entries takes nothing from the contents. There, `files` has its rows unique: a
+// violation comes of damage.
 bool ContentsWriter::Impl::Done(int code) {
   if (code == SQLITE_OK) {
     return true;
   }
   error = FromSqlite(code);
-  // `files` has its rows unique; a violation comes of damage.
-  error = error == IndexError::OTHER ? IndexError::DAMAGED : error;
+  if (std::exchange(entries.failed, false)) {
+    CloseAll();
+    return false;
+  }
+  error = (code & 0xff) == SQLITE_CONSTRAINT ? IndexError::DAMAGED : error;
   CloseDatabase();
   if (error == IndexError::DAMAGED) {
     (void)SetAside(ContentsPath(share.name), "found at work");
   }
-  return false;
-}
-
-// Nothing of the contents is to blame.
-bool ContentsWriter::Impl::DoneWithEntries(int code) {
-  if (code == SQLITE_OK) {
-    return true;
-  }
-  error = FromSqlite(code);
-  CloseAll();
   return false;
 }
 

@@ -73,7 +73,6 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
-  bool DoneWithEntries(int code);
 
   struct HandedOut {
     FileIdentity identity;

@@ -45,9 +45,11 @@ class EntryFollower {
   // Of wanted entries with that identity, a few of them.
   int Paths(const FileIdentity& identity, std::vector<std::string>& paths);
 
-  int64_t made = 0;  // tells one entries database from another
+  int64_t made = 0;     // tells one entries database from another
+  bool failed = false;  // whether the last operation did: the entries are to blame
 
  private:
+  int End(Statement& statement, int code);
   IndexDatabase database;
   Statement next, of_inode, latest_of, paths_of;
 };

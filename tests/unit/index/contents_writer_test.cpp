@@ -6,8 +6,12 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <functional>
+#include <utility>
 
+#include "base/scoped_fd.h"
 #include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/contents_fixture.h"
 
 namespace fileindexd {
@@ -32,6 +36,33 @@ class ContentsWriterTest : public ContentsTest {
     SetTime(At(name), mtime);
     Add(name);
     Commit();
+  }
+
+  // Writes over the first page of each of these tables or indexes of the entries.
+  void DamageEntries(const std::vector<std::string>& names) {
+    const std::string path = IndexPath("s") + "/entries.db";
+    std::vector<int64_t> pages;
+    {
+      IndexDatabase database;
+      ASSERT_EQ(database.OpenForWriting(IndexPath("s"), false), IndexError::NONE);
+      Statement page;
+      ASSERT_EQ(page.Prepare(database.db, "SELECT rootpage FROM sqlite_schema WHERE name = ?1"),
+                SQLITE_OK);
+      for (const std::string& name : names) {
+        page.BindText(1, name);
+        ASSERT_EQ(page.Step(), SQLITE_ROW) << name;
+        pages.push_back(page.Int(0));
+        page.Reset();
+      }
+      ASSERT_EQ(sqlite3_wal_checkpoint_v2(database.db, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr,
+                                          nullptr),
+                SQLITE_OK);
+    }
+    const ScopedFd file(open(path.c_str(), O_WRONLY | O_CLOEXEC));
+    const std::string garbage(4096, 'x');
+    for (const int64_t page : pages) {
+      ASSERT_EQ(pwrite(file.fd, garbage.data(), garbage.size(), (page - 1) * 4096), 4096);
+    }
   }
 };
 
@@ -422,6 +453,39 @@ TEST_F(ContentsWriterTest, DamagedContentsAreSetAsideAndMadeAnew) {
   TakeIn();
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
   EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+}
+
+// Every question that the writer asks of the entries meets a page that is not whole.
+TEST_F(ContentsWriterTest, DamagedEntriesTakeNothingFromTheContents) {
+  File("a.txt");
+  Read();
+  File("b.txt");
+  writer.reset();
+  DamageEntries({"entries", "entries_by_inode", "entries_wanted"});
+  bool more = false;
+  std::vector<ContentJob> jobs;
+  const std::pair<const char*, std::function<bool()>> steps[] = {
+      {"TakeIn",
+       [&] {
+         contents->LookAtAll();
+         return contents->TakeIn(10, more);
+       }},
+      {"Sweep",
+       [&] {
+         contents->LookAtAll();
+         return contents->Sweep(NOW, 10, more);
+       }},
+      {"NextJobs", [&] { return contents->NextJobs(10, jobs); }},
+  };
+  for (const auto& [name, step] : steps) {
+    OpenContents();
+    EXPECT_FALSE(step()) << name;
+    EXPECT_EQ(contents->Error(), IndexError::DAMAGED) << name;
+  }
+
+  OpenContents();
+  EXPECT_EQ(Holding("txt"), 1);
+  EXPECT_NE(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
 }
 
 TEST_F(ContentsWriterTest, FilesAreTheOwnersAlone) {
