@@ -53,6 +53,7 @@ int ContentsWriter::Impl::LookOn(int64_t limit, bool& more) {
     code = TakeInEntry(rows[i]);
     looked = rows[i].written;
   }
+  has_passed = table->changed;
   more = static_cast<int64_t>(rows.size()) == limit;
   is_looking = more;
   return code;
@@ -191,6 +192,7 @@ bool ContentsWriter::Impl::Sweep(int64_t now, size_t limit, bool& more) {
     code = SweepFile(files[i], now);
     swept = files[i].id;
   }
+  has_passed = table->changed;
   more = static_cast<int64_t>(files.size()) == left;
   is_sweeping = more;
   return Done(code);

@@ -261,6 +261,21 @@ bool ContentsWriter::Impl::Release(int64_t id) {
   return Done(table->Update(file, now));
 }
 
+void ContentsWriter::Impl::LookAtAll() {
+  is_looking = true;
+  looked = 0;
+  is_sweeping = true;
+  swept = 0;
+}
+
+// How far the passes have come is no part of the transaction: they begin anew.
+void ContentsWriter::Impl::Rollback() {
+  table->Rollback();
+  if (std::exchange(has_passed, false)) {
+    LookAtAll();
+  }
+}
+
 // A database that was removed is written into nowhere without an error, so the file is asked for
 // after the commit.
 bool ContentsWriter::Impl::Commit() {
@@ -270,6 +285,7 @@ bool ContentsWriter::Impl::Commit() {
   if (!Done(table->Commit(Now()))) {
     return false;
   }
+  has_passed = false;
   if (database.HasMoved()) {
     error = IndexError::PATH_NOT_FOUND;
     CloseDatabase();
@@ -293,7 +309,7 @@ IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
 // What was handed out is taken back: nobody will tell how it ended.
 void ContentsWriter::Close() {
   if (IsOpen()) {
-    impl->table->Rollback();
+    impl->Rollback();
     (void)impl->Done(impl->table->ReadMeta());
   }
   while (IsOpen() && !impl->out.empty() && Release(impl->out.begin()->first)) {
@@ -320,10 +336,7 @@ bool ContentsWriter::TakeIn(size_t limit, bool& more) {
 }
 
 void ContentsWriter::LookAtAll() {
-  impl->is_looking = true;
-  impl->looked = 0;
-  impl->is_sweeping = true;
-  impl->swept = 0;
+  impl->LookAtAll();
 }
 
 bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {

@@ -64,6 +64,8 @@ struct ContentsWriter::Impl {
   bool Finish(int64_t file, const Content& content);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Release(int64_t file);
+  void LookAtAll();
+  void Rollback();
   bool Commit();
   // The row of a file that was handed out. `current`: its bytes are still those that are wanted.
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
@@ -96,6 +98,7 @@ struct ContentsWriter::Impl {
   int64_t looked = 0;          // up to this `written`
   bool is_sweeping = false;    // over every file
   int64_t swept = 0;           // up to this row
+  bool has_passed = false;     // one of these changed what is not committed
 };
 
 }  // namespace fileindexd

@@ -137,7 +137,7 @@ int ContentsWriter::Impl::RetryAll(bool old_only) {
 // What is in flight goes on: its outcome comes to whatever is opened next.
 void ContentsWriter::Impl::CloseDatabase() {
   if (table.has_value()) {
-    table->Rollback();
+    Rollback();
   }
   table.reset();
   database.Close();
