@@ -101,9 +101,10 @@ int EntryFollower::Refer(const FileIdentity& identity, Reference& reference) {
   of_inode.BindInt(2, identity.birth_time);
   int code = of_inode.Step();
   for (; code == SQLITE_ROW && reference != Reference::WANTED; code = of_inode.Step()) {
-    Reference found = Reference::OTHER;
-    if (of_inode.Int(0) == identity.size && of_inode.Int(1) == identity.mtime) {
-      found = of_inode.Int(2) == 1 ? Reference::WANTED : Reference::UNWANTED;
+    Reference found = Reference::UNWANTED;
+    if (of_inode.Int(2) == 1) {
+      const bool is_same = of_inode.Int(0) == identity.size && of_inode.Int(1) == identity.mtime;
+      found = is_same ? Reference::WANTED : Reference::OTHER;
     }
     reference = std::max(reference, found);
   }

@@ -26,9 +26,9 @@ struct FollowedEntry {
 // How entries refer to a file.
 enum class Reference {
   NONE,      // no entry stands for that file at all
-  OTHER,     // one does, with another size or mtime
-  UNWANTED,  // one has that identity, and its content is not wanted
-  WANTED,
+  UNWANTED,  // some do, and none wants its content
+  OTHER,     // one wants it, with another size or mtime
+  WANTED,    // with just that identity
 };
 
 class EntryFollower {

@@ -217,6 +217,21 @@ TEST_F(ContentsWriterTest, KindThatIsSwitchedOffIsDroppedAtOnce) {
   EXPECT_EQ(Differences(), Names()) << "for all others the entry is one that is not wanted";
 }
 
+TEST_F(ContentsWriterTest, SwitchedOffKindIsDroppedThoughItsFileChangedBefore) {
+  File("a.txt");
+  Read();
+  WriteFile(At("a.txt"), "other bytes");
+  wanted.document = false;
+  ASSERT_TRUE(store->SetFolder(root, wanted));
+  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {.document = true}));
+  Commit();
+
+  TakeIn();
+
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+}
+
 TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
   const auto use = [this](const ContentFlags& flags) {
     ASSERT_TRUE(store->SetFolder(root, flags));
@@ -285,6 +300,25 @@ TEST_F(ContentsWriterTest, WhatComesBackWithinADayIsKept) {
 
   EXPECT_EQ(Jobs(), Names());
   EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
+}
+
+TEST_F(ContentsWriterTest, PassesThatWereUndoneBeginAnew) {
+  File("a.txt");
+  Read();
+  ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
+  Delete("a.txt");
+  Commit();
+  contents->LookAtAll();
+  bool more = false;
+  ASSERT_TRUE(contents->TakeIn(100, more));
+  ASSERT_TRUE(contents->Sweep(NOW, 100, more));
+
+  contents->Close();  // nothing of it is on disk
+  ASSERT_EQ(contents->Open(TheShare(), 1), IndexError::NONE);
+  TakeIn();
+  Sweep(NOW);
+
+  EXPECT_EQ(Number("SELECT unreferred_since FROM files"), NOW);
 }
 
 TEST_F(ContentsWriterTest, WaitingFileWithoutAnEntryIsNotHandedOut) {
