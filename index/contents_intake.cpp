@@ -26,7 +26,6 @@ bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
     return false;
   }
 
-  known_until = table->meta.seen;
   std::vector<FollowedEntry> rows;
   int code = entries.Next(table->meta.seen, static_cast<int64_t>(limit), rows);
   for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
@@ -76,6 +75,7 @@ int ContentsWriter::Impl::TakeInEntry(const FollowedEntry& entry) {
   file.identity = entry.identity;
   file.ctime = entry.ctime;
   file.kind = entry.kind;
+  file.reread = entry.reread;
   return table->Insert(file);
 }
 
@@ -83,11 +83,8 @@ int ContentsWriter::Impl::TakeInEntry(const FollowedEntry& entry) {
 // is read once more. A name that tells nothing does not take away what another one told.
 int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentFile& file) {
   ContentFile now = file;
-  bool again = false;
-  if (entry.ctime != file.ctime && entry.reread > known_until) {
-    now.ctime = entry.ctime;
-    again = true;
-  }
+  bool again = entry.reread > file.reread;
+  now.reread = std::max(file.reread, entry.reread);
   now.ctime = std::max(now.ctime, entry.ctime);
   now.unreferred_since = 0;
   if (file.kind == Kind::OTHER && entry.kind != Kind::OTHER) {
@@ -156,6 +153,7 @@ int ContentsWriter::Impl::TakeInChanged(const FollowedEntry& entry, const Conten
   now.identity = entry.identity;
   now.ctime = entry.ctime;
   now.kind = entry.kind;
+  now.reread = std::max(file.reread, entry.reread);
   now.extractor = 0;
   now.unreferred_since = 0;
   WaitAnew(now);

@@ -5,7 +5,7 @@
 
 namespace fileindexd {
 
-static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 1,
+static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 2,
               "numbers in the text below");
 
 namespace {
@@ -28,6 +28,7 @@ CREATE TABLE files(
   unended INTEGER NOT NULL,
   begun INTEGER NOT NULL,
   unreferred_since INTEGER NOT NULL,
+  reread INTEGER NOT NULL,
   text INTEGER NOT NULL,
   length INTEGER NOT NULL,
   reason TEXT NOT NULL DEFAULT '',
@@ -61,7 +62,7 @@ CREATE TABLE meta(
   reworded INTEGER NOT NULL);
 INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807);
 PRAGMA application_id = 1179206479;
-PRAGMA user_version = 1;
+PRAGMA user_version = 2;
 )sql";
 
 }  // namespace

@@ -12,15 +12,17 @@
 //     kind              by the name of an entry; the entries' numbers
 //     found_kind        by the content; 0: not known, or nothing that is read
 //     state             ContentState
-//     extractor         version of the readers that read it last; 0: none did, or, of a file that
-//     is
-//                       done, nothing was kept, as what it was found to be is not wanted
+//     extractor         version of the readers that read it last; 0: none did, or, of a file
+//                       that was read, nothing was kept, as what it was found to be is not wanted
 //     tries             how many ended with the death of whatever read it
 //     unended           how many began beside others and have no end on record: its fault or not
 //     begun             0 not in flight, 1 alone, 2 beside others
 //     reason            of the failure, one line
 //     is_cut, sample    as in Content
 //     unreferred_since  seconds since the epoch: found without an entry; 0: has one
+//     reread            the greatest `reread` of its entries: what was written to before is read,
+//     or
+//                       waits
 //     text              rowid in `texts` and `words`; 0: there is none
 //     length            bytes of its words
 //     pages … rating    the number fields; NULL: not known
@@ -49,7 +51,7 @@
 namespace fileindexd {
 
 constexpr int64_t CONTENTS_APPLICATION = 0x4649434f;
-constexpr int64_t CONTENTS_VERSION = 1;
+constexpr int64_t CONTENTS_VERSION = 2;
 
 extern const DatabaseForm CONTENTS_FORM;
 

@@ -13,7 +13,7 @@ constexpr int64_t RATE_SECONDS = 60;
 
 #define FILE_COLUMNS                                                                \
   "id, inode, birth_time, size, mtime, ctime, kind, found_kind, state, extractor, " \
-  "tries, unended, begun, unreferred_since, text, length"
+  "tries, unended, begun, unreferred_since, reread, text, length"
 
 void ReadFile(const Statement& row, ContentFile& file) {
   file.id = row.Int(0);
@@ -30,8 +30,9 @@ void ReadFile(const Statement& row, ContentFile& file) {
   file.unended = row.Int(11);
   file.begun = row.Int(12);
   file.unreferred_since = row.Int(13);
-  file.text = row.Int(14);
-  file.length = row.Int(15);
+  file.reread = row.Int(14);
+  file.text = row.Int(15);
+  file.length = row.Int(16);
 }
 
 // All but the id, from column 2 on.
@@ -41,7 +42,8 @@ void BindFile(Statement& statement, const ContentFile& file) {
        {static_cast<int64_t>(file.identity.inode), file.identity.birth_time, file.identity.size,
         file.identity.mtime, file.ctime, static_cast<int64_t>(file.kind),
         static_cast<int64_t>(file.found_kind), static_cast<int64_t>(file.state), file.extractor,
-        file.tries, file.unended, file.begun, file.unreferred_since, file.text, file.length}) {
+        file.tries, file.unended, file.begun, file.unreferred_since, file.reread, file.text,
+        file.length}) {
     statement.BindInt(column++, value);
   }
 }
@@ -66,11 +68,12 @@ int ContentsTable::Prepare(sqlite3* db) {
                     " FROM files WHERE unreferred_since <> 0 AND unreferred_since <= ?1 LIMIT ?2"},
       {&slice, "SELECT " FILE_COLUMNS " FROM files WHERE id > ?1 ORDER BY id LIMIT ?2"},
       {&insert, "INSERT INTO files(" FILE_COLUMNS ") VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, "
-                "?10, ?11, ?12, ?13, ?14, ?15, ?16)"},
+                "?10, ?11, ?12, ?13, ?14, ?15, ?16, ?17)"},
       {&update,
        "UPDATE files SET inode = ?2, birth_time = ?3, size = ?4, mtime = ?5, ctime = ?6, "
        "kind = ?7, found_kind = ?8, state = ?9, extractor = ?10, tries = ?11, "
-       "unended = ?12, begun = ?13, unreferred_since = ?14, text = ?15, length = ?16 "
+       "unended = ?12, begun = ?13, unreferred_since = ?14, reread = ?15, "
+       "text = ?16, length = ?17 "
        "WHERE id = ?1"},
       {&set_reason, "UPDATE files SET reason = ?2 WHERE id = ?1 AND reason <> ?2"},
       {&remove, "DELETE FROM files WHERE id = ?1"},

@@ -33,6 +33,7 @@ struct ContentFile {
   int64_t unended = 0;
   int64_t begun = 0;
   int64_t unreferred_since = 0;
+  int64_t reread = 0;
   int64_t text = 0;
   int64_t length = 0;
 };

@@ -51,9 +51,9 @@ class ContentsWriter {
   void UseSettings(std::shared_ptr<const Settings> in_force);
 
   // Takes in entries that changed since the last call, at most `limit` rows: files wanted and not
-  // known begin to wait; a file whose ctime is another while all else is the same waits again when
-  // the entry was added anew, and only has the ctime stored when it was updated. `more`: call
-  // again.
+  // known, or changed, begin to wait. One of which only the ctime is another waits again when an
+  // add said that it was written to (see `reread` in schema.h); else the ctime is just stored.
+  // `more`: call again.
   bool TakeIn(size_t limit, bool& more);
   // Has TakeIn look at every entry again: at the start, after a rebuild, when settings changed,
   // once a day. Along with it goes what entries no longer want (see Sweep).

@@ -93,7 +93,6 @@ struct ContentsWriter::Impl {
   std::set<int64_t> released;  // those are offered last
   bool has_judged = false;     // what an earlier service left in flight
   int64_t alone = 0;           // the one that was begun without another; 0: none
-  int64_t known_until = 0;     // `seen` before what is being taken in
   bool is_looking = false;     // at every entry
   int64_t looked = 0;          // up to this `written`
   bool is_sweeping = false;    // over every file

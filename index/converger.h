@@ -26,7 +26,7 @@ class Converger {
 
   // `path` is normal and lies in `in_share`, one of `in_force`; both stay for the length of the
   // call. `seen` as for EntryWriter::Refresh. `added`: somebody wrote to it, so the content counts
-  // as another when no more than the change time is.
+  // as another when anything about it is.
   IndexError Refresh(const Settings& in_force, const Share& in_share, const std::string& path,
                      const ContentFlags& wanted, const ContentFlags& decide, const Look* seen,
                      bool added);

@@ -176,6 +176,93 @@ TEST_F(ContentsWriterTest, AddWithAnotherChangeTimeReadsAnewAnUpdateOnlyStoresIt
   EXPECT_EQ(Holding("txt"), 0);
 }
 
+TEST_F(ContentsWriterTest, WriteThatIsHiddenBehindAChangeOfModeIsReadAnew) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+
+  WriteFile(At("a.txt"), "bytea");
+  SetTime(At("a.txt"), 1000);
+  Add("a.txt");
+  Commit();
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, WriteWhoseTimeIsSetBackBeforeAnybodyLooksIsReadAnew) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+
+  WriteFile(At("a.txt"), "bytea");
+  Add("a.txt");
+  Commit();
+  SetTime(At("a.txt"), 1000);
+  Refresh("a.txt");
+  Commit();
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, WriteIsReadOnceWhateverComesAfterwards) {
+  File("a.txt");
+  ASSERT_EQ(link(At("a.txt").c_str(), At("b.txt").c_str()), 0);
+  File("b.txt", "of either name");
+  Add("a.txt");
+  Commit();
+  TakeIn();
+  ASSERT_EQ(Read().size(), 1U);
+  const auto nothing_is_left = [this](const char* after) {
+    Commit();
+    TakeIn();
+    contents->LookAtAll();
+    TakeIn();
+    EXPECT_EQ(Jobs(), Names()) << after;
+  };
+
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  nothing_is_left("another mode");
+  ASSERT_EQ(rename(At("a.txt").c_str(), At("c.txt").c_str()), 0);
+  Delete("a.txt");
+  Add("c.txt");
+  nothing_is_left("another name");
+  AddAll();
+  nothing_is_left("a reindex");
+}
+
+// More rows than one slice takes, of which each tells of a write: none is missed.
+TEST_F(ContentsWriterTest, WritesAreSeenWhateverSliceTheyFallInto) {
+  constexpr int FILES = 10;
+  Names names;
+  for (int i = 0; i < FILES; ++i) {
+    names.push_back("f" + std::to_string(i) + ".txt");
+    OldFile(names.back(), 1000);
+  }
+  TakeIn();
+  ASSERT_EQ(Read().size(), names.size());
+  for (const std::string& name : names) {
+    WriteFile(At(name), "bytea");
+    SetTime(At(name), 1000);
+    Add(name);
+  }
+  for (const std::string& name : names) {
+    ASSERT_EQ(chmod(At(name).c_str(), 0640), 0);
+    Refresh(name);
+  }
+  Commit();
+
+  TakeIn();
+
+  EXPECT_EQ(Read().size(), names.size());
+}
+
 TEST_F(ContentsWriterTest, WhatEntriesDidWhileNobodyFollowedIsTakenIn) {
   File("a.txt");
   Read();
