@@ -26,18 +26,15 @@ bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
     return false;
   }
 
-  std::vector<FollowedEntry> rows;
-  int code = entries.Next(table->meta.seen, static_cast<int64_t>(limit), rows);
-  for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
-    code = TakeInEntry(rows[i]);
-    table->meta.seen = rows[i].written;
-  }
-  more = rows.size() == limit;
+  auto left = static_cast<int64_t>(limit);
+  int code = TakeInAfter(table->meta.seen, left, more);
   if (code == SQLITE_OK && more) {
     code = table->Begin();  // so many rows are not looked at twice for nothing
   }
   if (code == SQLITE_OK && !more && is_looking) {
-    code = LookOn(static_cast<int64_t>(limit - rows.size()), more);
+    code = TakeInAfter(looked, left, more);
+    has_passed = table->changed;
+    is_looking = more;
   }
   if (code == SQLITE_OK && !more) {
     code = table->Reword(more);
@@ -45,16 +42,20 @@ bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
   return Done(code);
 }
 
-int ContentsWriter::Impl::LookOn(int64_t limit, bool& more) {
+// Of the entries written after `done`, `left` ones at most; both follow.
+int ContentsWriter::Impl::TakeInAfter(int64_t& done, int64_t& left, bool& more) {
   std::vector<FollowedEntry> rows;
-  int code = entries.Next(looked, limit, rows);
+  int code = entries.Next(done, left, rows);
+  more = static_cast<int64_t>(rows.size()) == left;
   for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
+    if (IsFull()) {
+      more = true;
+      break;
+    }
     code = TakeInEntry(rows[i]);
-    looked = rows[i].written;
+    done = rows[i].written;
+    --left;
   }
-  has_passed = table->changed;
-  more = static_cast<int64_t>(rows.size()) == limit;
-  is_looking = more;
   return code;
 }
 
@@ -176,22 +177,27 @@ bool ContentsWriter::Impl::Sweep(int64_t now, size_t limit, bool& more) {
 
   std::vector<ContentFile> files;
   int code = table->Unreferred(now - DAY, static_cast<int64_t>(limit), files);
-  for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+  more = files.size() == limit;
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK && !IsFull(); ++i) {
     code = SweepFile(files[i], now);
   }
-  more = files.size() == limit;
-  if (code != SQLITE_OK || more || !is_sweeping) {
+  if (code != SQLITE_OK || more || IsFull() || !is_sweeping) {
+    more = more || IsFull();
     return Done(code);
   }
 
   const auto left = static_cast<int64_t>(limit - files.size());
   code = table->Slice(swept, left, files);
+  more = static_cast<int64_t>(files.size()) == left;
   for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+    if (IsFull()) {
+      more = true;
+      break;
+    }
     code = SweepFile(files[i], now);
     swept = files[i].id;
   }
   has_passed = table->changed;
-  more = static_cast<int64_t>(files.size()) == left;
   is_sweeping = more;
   return Done(code);
 }

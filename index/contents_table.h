@@ -84,8 +84,8 @@ class ContentsTable {
   int Reword(bool& more);
 
   ContentsMeta meta;
-  bool changed = false;  // since the last commit, `meta` included
-  size_t pending_bytes = 0;
+  bool changed = false;      // since the last commit, `meta` included
+  size_t pending_bytes = 0;  // see ContentsWriter::PendingBytes
   int64_t done_now = 0;
   sqlite3* handle = nullptr;
 

@@ -106,7 +106,7 @@ int ContentsTable::SetContent(const ContentFile& before, const Content& content,
 int ContentsTable::RemoveContent(ContentFile& file) {
   if (file.text != 0) {
     leaving.push_back(file.text);
-    pending_bytes += static_cast<size_t>(file.length);
+    pending_bytes += 2 * static_cast<size_t>(file.length);
   }
   file.text = 0;
   file.length = 0;

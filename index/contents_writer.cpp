@@ -76,14 +76,15 @@ bool ContentsWriter::Impl::Done(int code) {
   return false;
 }
 
-bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more) {
   jobs.clear();
+  more = false;
   if (!Ready() || !ReadyToFollow()) {
     return false;
   }
 
   bool dropped = true;
-  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit; ++round) {
+  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit && !IsFull(); ++round) {
     dropped = false;
     std::vector<ContentFile> rows;
     int code =
@@ -100,6 +101,7 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs)
       return Done(code);
     }
   }
+  more = dropped || jobs.size() >= limit;
   return true;
 }
 
@@ -339,8 +341,8 @@ void ContentsWriter::LookAtAll() {
   impl->LookAtAll();
 }
 
-bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
-  return impl->Guarded([&] { return impl->NextJobs(limit, jobs); });
+bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more) {
+  return impl->Guarded([&] { return impl->NextJobs(limit, jobs, more); });
 }
 
 bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {

@@ -52,12 +52,12 @@ struct ContentsWriter::Impl {
   int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
   int IsKept(const ContentFile& file, Kind found, bool& is_kept);
   int DropUnwanted(const ContentFile& file);
-  int LookOn(int64_t limit, bool& more);
+  int TakeInAfter(int64_t& done, int64_t& left, bool& more);
   bool Sweep(int64_t now, size_t limit, bool& more);
   int SweepFile(const ContentFile& file, int64_t now);
 
   // contents_writer.cpp
-  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs);
+  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
@@ -75,6 +75,7 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
+  bool IsFull() const { return table->pending_bytes >= ENOUGH_PENDING; }
 
   struct HandedOut {
     FileIdentity identity;

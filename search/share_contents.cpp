@@ -25,8 +25,6 @@ constexpr milliseconds BETWEEN_LOOKS(100);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
 constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000)};
 constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
-// Bigger transactions cost memory and gain nothing.
-constexpr size_t COMMIT_BYTES = 8U << 20;
 constexpr milliseconds COMMIT_AGE(400);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
@@ -208,7 +206,8 @@ bool ShareContents::CommitIfDue(Time now) {
   }
 
   first_change = first_change.value_or(now);
-  if (Flows() && writer.PendingBytes() < COMMIT_BYTES && now - *first_change < COMMIT_AGE) {
+  if (Flows() && writer.PendingBytes() < ContentsWriter::ENOUGH_PENDING &&
+      now - *first_change < COMMIT_AGE) {
     return true;
   }
   return Commit();

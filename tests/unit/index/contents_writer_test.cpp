@@ -420,6 +420,57 @@ TEST_F(ContentsWriterTest, WaitingFileWithoutAnEntryIsNotHandedOut) {
   EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 0);
 }
 
+TEST_F(ContentsWriterTest, BehindManyFilesWithoutAnEntryOthersAreFound) {
+  constexpr int GONE = 1100;
+  for (int i = 0; i < GONE; ++i) {
+    WriteFile(At("gone" + std::to_string(i) + ".txt"), "bytes");
+  }
+  OldFile("a.txt", 1000);
+  AddAll();
+  TakeIn();
+  for (int i = 0; i < GONE; ++i) {
+    ASSERT_EQ(unlink(At("gone" + std::to_string(i) + ".txt").c_str()), 0);
+    Delete("gone" + std::to_string(i) + ".txt");
+  }
+  Commit();
+
+  Names found;
+  for (int round = 0; found.empty() && round < 10; ++round) {
+    found = Jobs(4);
+    EXPECT_TRUE(!found.empty() || more_jobs) << round;
+  }
+  EXPECT_EQ(found, Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, RemovalsOfMuchTextAreSpreadOverTransactions) {
+  constexpr int FILES = 12;
+  std::string text;
+  while (text.size() < 1 << 20) {
+    text += "word ";
+  }
+  for (int i = 0; i < FILES; ++i) {
+    OldFile("f" + std::to_string(i) + ".txt", 1000);
+  }
+  TakeIn();
+  for (const std::string& name : Jobs()) {
+    Finish(name, text);
+  }
+  for (int i = 0; i < FILES; ++i) {
+    WriteFile(At("f" + std::to_string(i) + ".txt"), "other bytes");
+    Add("f" + std::to_string(i) + ".txt");
+  }
+  Commit();
+
+  int commits = 0;
+  for (bool more = true; more; ++commits) {
+    ASSERT_TRUE(contents->TakeIn(1000, more));
+    EXPECT_LE(contents->PendingBytes(), ContentsWriter::ENOUGH_PENDING + 2 * text.size());
+    ASSERT_TRUE(contents->Commit());
+  }
+  EXPECT_GE(commits, 3);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+}
+
 TEST_F(ContentsWriterTest, SecondDeathIsTheLast) {
   File("a.txt");
   for (const char* reason : {"killed", "killed again"}) {
@@ -596,7 +647,7 @@ TEST_F(ContentsWriterTest, DamagedEntriesTakeNothingFromTheContents) {
          contents->LookAtAll();
          return contents->Sweep(NOW, 10, more);
        }},
-      {"NextJobs", [&] { return contents->NextJobs(10, jobs); }},
+      {"NextJobs", [&] { return contents->NextJobs(10, jobs, more); }},
   };
   for (const auto& [name, step] : steps) {
     OpenContents();

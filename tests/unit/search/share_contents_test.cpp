@@ -271,6 +271,28 @@ TEST_F(ShareContentsTest, AFailureAtAnyCallLosesNothing) {
   }
 }
 
+TEST_F(ShareContentsTest, ItAsksAgainWhileMoreMayWait) {
+  AddFile(1);
+  Scripted().unseen = true;
+  Settle();
+  EXPECT_THAT(GiveOut(), IsEmpty());
+
+  EXPECT_TRUE(contents.MayHaveJobs(now));
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AnEndMayLetAnotherFileGo) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  ASSERT_FALSE(contents.MayHaveJobs(now));
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+
+  EXPECT_TRUE(contents.MayHaveJobs(now));
+}
+
 TEST_F(ShareContentsTest, WithoutEntriesItWaitsForThem) {
   AddFile(1);
   Scripted().failing["Open"] = IndexError::PATH_NOT_FOUND;
