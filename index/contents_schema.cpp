@@ -11,7 +11,6 @@ static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 2,
 namespace {
 
 // AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
-// What failed before comes last in the queue, so that it holds nothing else up.
 constexpr const char* CONTENTS_SCHEMA = R"sql(
 CREATE TABLE files(
   id INTEGER PRIMARY KEY AUTOINCREMENT,
@@ -38,7 +37,7 @@ CREATE TABLE files(
   track INTEGER, duration INTEGER, bit_rate INTEGER, width INTEGER, height INTEGER,
   latitude INTEGER, longitude INTEGER, rating INTEGER,
   UNIQUE(inode, birth_time));
-CREATE INDEX files_waiting ON files(tries, mtime DESC, size) WHERE state = 0;
+CREATE INDEX files_waiting ON files()sql" WAITING_ORDER R"sql() WHERE state = 0;
 CREATE INDEX files_failed ON files(id) WHERE state >= 2;
 CREATE INDEX files_begun ON files(id) WHERE begun <> 0;
 CREATE INDEX files_unreferred ON files(unreferred_since) WHERE unreferred_since <> 0;

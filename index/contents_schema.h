@@ -60,6 +60,11 @@ enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3 };
 
 constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being made anew
 
+// The order in which files are read: what failed before comes last, so that it holds nothing else
+// up; then the newest, by the minute, as of no two files the same time would ever be met; then the
+// smallest. An index has these expressions.
+#define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
+
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;
 

@@ -59,8 +59,8 @@ int ContentsTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&find, "SELECT " FILE_COLUMNS " FROM files WHERE inode = ?1 AND birth_time = ?2"},
       {&find_by_id, "SELECT " FILE_COLUMNS " FROM files WHERE id = ?1"},
-      {&waiting, "SELECT " FILE_COLUMNS
-                 " FROM files WHERE state = 0 ORDER BY tries, mtime DESC, size LIMIT ?1"},
+      {&waiting,
+       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 ORDER BY " WAITING_ORDER " LIMIT ?1"},
       {&failed,
        "SELECT " FILE_COLUMNS " FROM files WHERE state >= 2 AND id > ?1 ORDER BY id LIMIT ?2"},
       {&left_begun, "SELECT " FILE_COLUMNS " FROM files WHERE begun <> 0 LIMIT ?1"},

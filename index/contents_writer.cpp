@@ -15,6 +15,9 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t MOST_TRIES = 2;
+// What was in flight at so many deaths of the service is read alone: only so does another one tell
+// who it was.
+constexpr int64_t SUSPECT_DEATHS = 2;
 constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file any more
 constexpr int ROUNDS = 8;
 
@@ -83,6 +86,7 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs,
     return false;
   }
 
+  Company company = Begun();
   bool dropped = true;
   for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit && !IsFull(); ++round) {
     dropped = false;
@@ -93,9 +97,13 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs,
     std::stable_partition(rows.begin(), rows.end(),
                           [this](const ContentFile& file) { return !released.contains(file.id); });
     for (size_t i = 0; i < rows.size() && code == SQLITE_OK && jobs.size() < limit; ++i) {
-      if (!out.contains(rows[i].id)) {
-        code = Offer(rows[i], jobs, dropped);
+      const bool is_suspect = rows[i].unended >= SUSPECT_DEATHS;
+      if (out.contains(rows[i].id) || company.suspect || (is_suspect && company.any)) {
+        continue;
       }
+      code = Offer(rows[i], jobs, dropped);
+      company.any = company.any || !jobs.empty();
+      company.suspect = is_suspect && !jobs.empty();
     }
     if (code != SQLITE_OK) {
       return Done(code);
@@ -103,6 +111,15 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs,
   }
   more = dropped || jobs.size() >= limit;
   return true;
+}
+
+ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
+  Company company;
+  for (const auto& [id, handed] : out) {
+    company.any = company.any || handed.is_begun;
+    company.suspect = company.suspect || (handed.is_begun && handed.is_suspect);
+  }
+  return company;
 }
 
 int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>& jobs,
@@ -117,7 +134,7 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
     job.identity = file.identity;
     job.kind = file.kind;
     job.tries = file.tries + file.unended;
-    out[file.id] = {file.identity};
+    out[file.id] = {.identity = file.identity, .is_suspect = file.unended >= SUSPECT_DEATHS};
     released.erase(file.id);
     jobs.push_back(std::move(job));
     return SQLITE_OK;

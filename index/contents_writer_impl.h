@@ -67,6 +67,13 @@ struct ContentsWriter::Impl {
   void LookAtAll();
   void Rollback();
   bool Commit();
+  // What is with helpers, and what is about to be. A suspect is alone.
+  struct Company {
+    bool any = false;
+    bool suspect = false;
+  };
+  Company Begun() const;
+
   // The row of a file that was handed out. `current`: its bytes are still those that are wanted.
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
@@ -81,6 +88,7 @@ struct ContentsWriter::Impl {
     FileIdentity identity;
     bool is_stale = false;  // it has to be read once more
     bool is_begun = false;
+    bool is_suspect = false;
   };
 
   Share share;

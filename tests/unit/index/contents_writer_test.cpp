@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <functional>
 #include <utility>
@@ -79,6 +80,15 @@ TEST_F(ContentsWriterTest, WantedFilesWaitNewestAndSmallestFirst) {
   EXPECT_EQ(Jobs(), Names({"old.txt"}));
   EXPECT_EQ(Jobs(), Names());
   EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 3);
+}
+
+// Within a minute the size counts.
+TEST_F(ContentsWriterTest, SmallerFilesOfTheSameMinuteComeFirst) {
+  OldFile("big.txt", 6030, "many bytes");
+  OldFile("small.txt", 6000, "few");
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"small.txt", "big.txt"}));
 }
 
 TEST_F(ContentsWriterTest, ContentIsStoredOnce) {
@@ -347,6 +357,34 @@ TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
   EXPECT_EQ(Jobs(), Names());
 }
 
+TEST_F(ContentsWriterTest, PartOfAnUnwantedKindIsNotKeptEither) {
+  const auto use = [this](const ContentFlags& flags) {
+    ASSERT_TRUE(store->SetFolder(root, flags));
+    std::shared_ptr<const Settings> in_force;
+    ASSERT_TRUE(store->GetSettings(in_force));
+    contents->UseSettings(in_force);
+    contents->LookAtAll();
+    TakeIn();
+  };
+  File("plain");
+  use({false, true, true, true});
+  Jobs();
+  ASSERT_TRUE(contents->Fail(JobOf("plain").file, "damaged", TextContent("half"), false));
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+
+  use({true, true, true, true});
+  ASSERT_EQ(Jobs(), Names({"plain"})) << "wanted by now";
+  ASSERT_TRUE(contents->Fail(JobOf("plain").file, "damaged", TextContent("half"), false));
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Holding("half"), 1);
+
+  use({false, true, true, true});
+  EXPECT_EQ(Holding("half"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+  EXPECT_EQ(Jobs(), Names());
+}
+
 TEST_F(ContentsWriterTest, WhatNoEntryRefersToIsSweptAfterADay) {
   File("a.txt");
   File("b.txt");
@@ -524,17 +562,57 @@ TEST_F(ContentsWriterTest, ReleasedFilesWaitAgainBehindTheOthers) {
 }
 
 // A service that is killed: the writer goes without a word.
-TEST_F(ContentsWriterTest, OfManyThatWereInFlightAtADeathNoneIsGuilty) {
-  File("a.txt");
-  File("b.txt");
-  for (int round = 0; round < 5; ++round) {
-    ASSERT_EQ(Jobs().size(), 2U) << round;
+TEST_F(ContentsWriterTest, OfManyThatWereInFlightAtTwoDeathsNoneIsGuiltyAndEachIsTriedAlone) {
+  OldFile("a.txt", 3000);
+  OldFile("b.txt", 2000);
+  TakeIn();
+  for (int round = 0; round < 2; ++round) {
+    ASSERT_EQ(Jobs(), Names({"a.txt", "b.txt"})) << round;
     ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file, JobOf("b.txt").file}));
     OpenContents();
   }
+  OldFile("c.txt", 1000);
+  TakeIn();
 
-  EXPECT_EQ(Jobs().size(), 2U);
-  EXPECT_GT(JobOf("a.txt").tries, 0) << "best tried alone";
+  ASSERT_EQ(Jobs(), Names({"c.txt"}));
+  Finish("c.txt", "c");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+  OldFile("d.txt", 500);
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "beside a suspect";
+  Finish("a.txt", "a");
+  ASSERT_EQ(Jobs(), Names({"d.txt"}));
+  Finish("d.txt", "d");
+  EXPECT_EQ(Jobs(), Names({"b.txt"}));
+}
+
+// Others come without end, and one file ends the service each time that it is read.
+TEST_F(ContentsWriterTest, WhoEndsTheServiceIsFoundAmongOthers) {
+  OldFile("a.txt", 3000);
+  OldFile("killer.txt", 4000);
+  TakeIn();
+  for (int deaths = 0; deaths < 5; ++deaths) {
+    OldFile("n" + std::to_string(deaths) + ".txt", 5000 + deaths);
+    TakeIn();
+    for (Names names = Jobs(); !names.empty(); names = Jobs()) {
+      std::vector<int64_t> files;
+      for (const std::string& name : names) {
+        files.push_back(JobOf(name).file);
+      }
+      ASSERT_TRUE(contents->BeginTries(files));
+      if (std::count(names.begin(), names.end(), "killer.txt") != 0) {
+        break;
+      }
+      for (const std::string& name : names) {
+        Finish(name, name);
+      }
+    }
+    OpenContents();
+  }
+
+  EXPECT_EQ(Number("SELECT state FROM files WHERE mtime = 4000000000000"), 3);
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 3"), 1);
 }
 
 TEST_F(ContentsWriterTest, WhoWasAloneInFlightAtFiveDeathsIsGuilty) {
@@ -553,14 +631,13 @@ TEST_F(ContentsWriterTest, WhoIsJoinedByAnotherIsNotAlone) {
   OldFile("a.txt", 3000);
   OldFile("b.txt", 2000);
   TakeIn();
-  for (int round = 0; round < 2; ++round) {
-    Jobs();
-    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
-    ASSERT_TRUE(contents->BeginTries({JobOf("b.txt").file}));
-    OpenContents();
-  }
+  Jobs();
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+  ASSERT_EQ(Number("SELECT begun FROM files WHERE mtime = 3000000000000"), 1);
 
-  EXPECT_EQ(Jobs().size(), 2U);
+  ASSERT_TRUE(contents->BeginTries({JobOf("b.txt").file}));
+
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE begun = 2"), 2);
 }
 
 TEST_F(ContentsWriterTest, ClosingTakesBackWhatIsInFlight) {
