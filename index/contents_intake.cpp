@@ -112,15 +112,16 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
 
 // Of a file whose name tells no kind, settings may want what was found by now, or not any more.
 int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, bool& again) {
-  if (file.state != ContentState::DONE) {
+  const bool waits = file.state == ContentState::WAITING;
+  if (waits && file.text == 0) {
     return SQLITE_OK;
   }
   bool is_kept = true;
   const int code = IsKept(file, file.found_kind, is_kept);
-  if (code != SQLITE_OK || is_kept == (file.extractor != KEPT_OUT)) {
+  if (code != SQLITE_OK || (waits ? is_kept : is_kept == (file.extractor != KEPT_OUT))) {
     return code;
   }
-  again = is_kept;
+  again = is_kept && file.state != ContentState::QUARANTINED;
   now.extractor = KEPT_OUT;
   return is_kept ? SQLITE_OK : table->SetContent(file, OfKind(file.found_kind), now);
 }

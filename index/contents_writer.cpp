@@ -220,16 +220,20 @@ bool ContentsWriter::Impl::Finish(int64_t id, const Content& content) {
   if (current) {
     now.state = ContentState::DONE;
     now.tries = 0;
-    bool is_kept = true;
-    code = IsKept(file, content.kind, is_kept);
-    now.extractor = is_kept ? extractor : KEPT_OUT;
-    if (code == SQLITE_OK) {
-      code = table->SetContent(file, is_kept ? content : OfKind(content.kind), now);
-    }
+    code = Keep(file, content, now);
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
     ++table->done_now;
   }
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+}
+
+// What was found, if it turned out to be of a kind that is wanted.
+int ContentsWriter::Impl::Keep(const ContentFile& file, const Content& content, ContentFile& now) {
+  bool is_kept = true;
+  const int code = IsKept(file, content.kind, is_kept);
+  now.extractor = is_kept ? extractor : KEPT_OUT;
+  return code == SQLITE_OK ? table->SetContent(file, is_kept ? content : OfKind(content.kind), now)
+                           : code;
 }
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
@@ -252,8 +256,7 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
     now.tries += killed ? 1 : 0;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
-      now.extractor = extractor;
-      code = table->SetContent(file, content, now);
+      code = Keep(file, content, now);
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
   }

@@ -24,7 +24,7 @@
 
 namespace fileindexd {
 
-// `extractor` of a file that is done and of which nothing was kept: its kind is not wanted.
+// `extractor` of a file that was read and of which nothing was kept: its kind is not wanted.
 constexpr int64_t KEPT_OUT = 0;
 
 inline Content OfKind(Kind kind) {
@@ -62,6 +62,7 @@ struct ContentsWriter::Impl {
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
   bool Finish(int64_t file, const Content& content);
+  int Keep(const ContentFile& file, const Content& content, ContentFile& now);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Release(int64_t file);
   void LookAtAll();
