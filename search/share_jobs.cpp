@@ -114,7 +114,7 @@ void ShareContents::OpenJob(ContentJob&& job, Time now) {
       next.job = std::move(job);  // `path` with it
       return;
     }
-    outcome = opened == Opening::CHANGED ? outcome : opened;
+    outcome = std::max(outcome, opened);  // of all its names, the one that promises most
   }
 
   if (outcome == Opening::REFUSED) {
