@@ -6,6 +6,7 @@
 #include <cstring>
 #include <utility>
 
+#include "index/database.h"
 #include "search/log.h"
 #include "state/left_out.h"
 
@@ -25,6 +26,8 @@ constexpr seconds BETWEEN_LOOKS(60);
 constexpr seconds LONGEST_POOL_REST(60);
 // Files of all shares that are held open to be given out next.
 constexpr size_t MOST_READY = 256;
+// Of all shares' databases: a share's own caches could take as much.
+constexpr int64_t MOST_CACHED = int64_t{20} << 20;
 
 // The share's folders and what of them is wanted, to be compared.
 std::string FoldersText(const Settings& settings, const std::string& share) {
@@ -58,6 +61,7 @@ bool ContentLoop::Start(std::string& error) {
     return false;
   }
 
+  LimitCaches(MOST_CACHED);
   hints.everything = true;
   return true;
 }
@@ -289,6 +293,7 @@ void ContentLoop::HandOut(Time now) {
 
   for (auto& [name, followed] : shares) {
     followed.contents.largest_batch = std::min(MOST_READY / busy, ShareContents::LARGEST_BATCH);
+    followed.contents.enough_pending = ContentsWriter::ENOUGH_PENDING / busy;
   }
   while (pool != nullptr && pool->Room() > 0 && HandOutOne(now)) {
   }

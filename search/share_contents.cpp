@@ -206,8 +206,7 @@ bool ShareContents::CommitIfDue(Time now) {
   }
 
   first_change = first_change.value_or(now);
-  if (Flows() && writer.PendingBytes() < ContentsWriter::ENOUGH_PENDING &&
-      now - *first_change < COMMIT_AGE) {
+  if (Flows() && writer.PendingBytes() < enough_pending && now - *first_change < COMMIT_AGE) {
     return true;
   }
   return Commit();

@@ -61,6 +61,8 @@ class ShareContents {
 
   Share share;
   size_t largest_batch = LARGEST_BATCH;  // files held open to be given out next
+  // Bytes of a transaction: words are collected in memory until its end.
+  size_t enough_pending = ContentsWriter::ENOUGH_PENDING;
 
   static constexpr size_t SMALLEST_BATCH = 4;
   static constexpr size_t LARGEST_BATCH = 64;
