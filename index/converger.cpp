@@ -120,7 +120,8 @@ IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
   }
 
   error = RemoveAt(path, look.verdict == Verdict::GONE);
-  return error == IndexError::NONE ? RemoveBelow(path, false) : error;
+  error = error == IndexError::NONE ? RemoveBelow(path, false) : error;
+  return error == IndexError::NONE ? SettleOtherPaths() : error;
 }
 
 IndexError Converger::Settle(const std::string& path, const Look& look, const ContentFlags& wanted,

@@ -144,6 +144,27 @@ TEST_F(ContentsWriterTest, RenameMoveLinkAndRebuildCostNoReading) {
   EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
 }
 
+TEST_F(ContentsWriterTest, LinkThatIsTakenAwayCostsNoReading) {
+  OldFile("a.txt", 1000);
+  MakeFolder(At("d"));
+  for (const char* name : {"b.txt", "d/c.txt"}) {
+    ASSERT_EQ(link(At("a.txt").c_str(), At(name).c_str()), 0);
+  }
+  AddAll();
+  TakeIn();
+  ASSERT_EQ(Read().size(), 1U);
+
+  for (const char* name : {"b.txt", "d"}) {
+    RemoveTree(At(name));
+    Delete(name);
+    Commit();
+    TakeIn();
+    AddAll();
+    TakeIn();
+    EXPECT_EQ(Jobs(), Names()) << name;
+  }
+}
+
 TEST_F(ContentsWriterTest, ChangedFileIsReadAnewAndItsOldContentIsGone) {
   File("a.txt");
   Jobs();
