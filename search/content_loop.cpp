@@ -21,6 +21,7 @@ using std::chrono::seconds;
 constexpr milliseconds BETWEEN_READINGS(20);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
 constexpr milliseconds RELOAD_AGAIN(500);
+constexpr milliseconds RELOAD_FAILED(1000);
 // For what no watch could be set on.
 constexpr seconds BETWEEN_LOOKS(60);
 constexpr seconds LONGEST_POOL_REST(60);
@@ -148,12 +149,10 @@ void ContentLoop::Listen(Time now) {
     }
   }
 
-  if (std::exchange(hints.everything, false)) {
-    Reload();
-    next_reload = now + RELOAD_AGAIN;
-  } else if (now >= next_reload) {
-    Reload();
-    next_reload = Time::max();
+  const bool is_told = std::exchange(hints.everything, false);
+  if (is_told || now >= next_reload) {
+    const Time good = is_told ? now + RELOAD_AGAIN : Time::max();
+    next_reload = Reload() ? good : now + RELOAD_FAILED;
   }
   for (const std::string& name : std::exchange(hints.remade, {})) {
     const auto found = shares.find(name);
@@ -169,12 +168,13 @@ void ContentLoop::Listen(Time now) {
   }
 }
 
-void ContentLoop::Reload() {
-  permission.Look(*store);
+// False when something could not be read: it stays as it was.
+bool ContentLoop::Reload() {
+  const bool is_good = permission.Look(*store);
   std::shared_ptr<const Settings> settings;
   if (!store->GetSettings(settings)) {
     ServiceLog("%s", store->Error().c_str());
-    return;
+    return false;
   }
 
   watches.Set(*settings);
@@ -193,6 +193,7 @@ void ContentLoop::Reload() {
     }
     return is_gone;
   });
+  return is_good;
 }
 
 void ContentLoop::Follow(const Share& share, const std::string& folders,
@@ -211,7 +212,7 @@ void ContentLoop::Follow(const Share& share, const std::string& folders,
   }
   followed.folders = folders;
   followed.contents.Use(settings);
-  followed.contents.Set(share, status.no_space, status.retry_contents);
+  followed.contents.Set(share, status);
 }
 
 void ContentLoop::OpenPool(Time now) {
