@@ -167,7 +167,7 @@ int ContentsWriter::Impl::TakeInChanged(const FollowedEntry& entry, const Conten
 int ContentsWriter::Impl::DropUnwanted(const ContentFile& file) {
   Reference reference = Reference::NONE;
   const int code = entries.Refer(file.identity, reference);
-  return code == SQLITE_OK && reference == Reference::UNWANTED ? table->Remove(file) : code;
+  return code == SQLITE_OK && reference == Reference::UNWANTED ? Remove(file) : code;
 }
 
 bool ContentsWriter::Impl::Sweep(int64_t now, size_t limit, bool& more) {
@@ -210,7 +210,7 @@ int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
     return code;
   }
   if (reference == Reference::UNWANTED) {
-    return table->Remove(file);
+    return Remove(file);
   }
 
   ContentFile changed = file;
@@ -219,7 +219,7 @@ int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
   } else if (file.unreferred_since == 0 || file.unreferred_since > now) {
     changed.unreferred_since = now;
   } else if (now - file.unreferred_since >= DAY) {
-    return table->Remove(file);
+    return Remove(file);
   }
   return changed.unreferred_since == file.unreferred_since ? SQLITE_OK
                                                            : table->Update(file, changed);

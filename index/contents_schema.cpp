@@ -58,8 +58,10 @@ CREATE TABLE meta(
   entries_made INTEGER NOT NULL,
   seen INTEGER NOT NULL,
   last_text INTEGER NOT NULL,
-  reworded INTEGER NOT NULL);
-INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807);
+  reworded INTEGER NOT NULL,
+  reword_end INTEGER NOT NULL,
+  words_version TEXT NOT NULL);
+INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '');
 PRAGMA application_id = 1179206479;
 PRAGMA user_version = 2;
 )sql";

@@ -14,7 +14,7 @@
 //     state             ContentState
 //     extractor         version of the readers that read it last; 0: none did, or, of a file
 //                       that was read, nothing was kept, as what it was found to be is not wanted
-//     tries             how many ended with the death of whatever read it
+//     tries             how many ended in failure; while it waits, with the death of what read it
 //     unended           how many began beside others and have no end on record: its fault or not
 //     begun             0 not in flight, 1 alone, 2 beside others
 //     reason            of the failure, one line
@@ -36,8 +36,9 @@
 //   meta      one row: the share's file system (contents of another one say nothing), the language
 //             of the words, the version of the readers that what failed was tried with, the random
 //             number of the entries database that was followed and the greatest `written` seen in
-//             it, the last rowid in `texts`, and up to which of them there are words (all, unless
-//             the words are being made anew)
+//             it, the last rowid in `texts`, and while the words are being made anew, up to which
+//             of them that is done (all, unless it is going on) and up to which it has to be, and
+//             the version of what cuts texts into words
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.

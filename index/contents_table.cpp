@@ -79,7 +79,8 @@ int ContentsTable::Prepare(sqlite3* db) {
       {&remove, "DELETE FROM files WHERE id = ?1"},
       {&write_meta,
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
-       "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7 WHERE id = 1"},
+       "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
+       "words_version = ?9 WHERE id = 1"},
       {&write_counts,
        "UPDATE counts SET waiting = waiting + ?2, done = done + ?3, "
        "failed = failed + ?4 WHERE kind = ?1"},
@@ -103,9 +104,10 @@ int ContentsTable::Prepare(sqlite3* db) {
 
 int ContentsTable::ReadMeta() {
   Statement statement;
-  int code = statement.Prepare(handle,
-                               "SELECT filesystem, language, extractor, entries_made, seen, "
-                               "last_text, reworded FROM meta WHERE id = 1");
+  int code =
+      statement.Prepare(handle,
+                        "SELECT filesystem, language, extractor, entries_made, seen, "
+                        "last_text, reworded, reword_end, words_version FROM meta WHERE id = 1");
   if (code == SQLITE_OK) {
     code = statement.Step();
   }
@@ -119,6 +121,8 @@ int ContentsTable::ReadMeta() {
   meta.seen = statement.Int(4);
   meta.last_text = statement.Int(5);
   meta.reworded = statement.Int(6);
+  meta.reword_end = statement.Int(7);
+  meta.words_version = statement.Bytes(8);
   return SQLITE_OK;
 }
 
@@ -135,6 +139,8 @@ int ContentsTable::WriteMeta() {
   write_meta.BindInt(5, meta.seen);
   write_meta.BindInt(6, meta.last_text);
   write_meta.BindInt(7, meta.reworded);
+  write_meta.BindInt(8, meta.reword_end);
+  write_meta.BindText(9, meta.words_version);
   return write_meta.Run();
 }
 

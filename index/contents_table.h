@@ -46,6 +46,8 @@ struct ContentsMeta {
   int64_t seen = 0;
   int64_t last_text = 0;
   int64_t reworded = ALL_WORDS;
+  int64_t reword_end = 0;
+  std::string words_version;
 };
 
 class ContentsTable {
@@ -54,7 +56,8 @@ class ContentsTable {
   // PrepareWords.
   int Prepare(sqlite3* db);
   int PrepareWords();
-  int MakeWords(const std::string& language);  // all anew, from what is stored: see Reword
+  // All anew, from what is stored: see Reword. What is stored from now on has its words at once.
+  int MakeWords(const std::string& language, const std::string& version);
 
   // Commit writes `meta`, and counts `done_now` files as done in that second.
   int Begin();  // nothing, if a transaction is open
@@ -80,7 +83,7 @@ class ContentsTable {
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 
-  // Makes words of stored texts, about 8 MiB. `more`: there are others.
+  // Makes words of stored texts, about a MiB. `more`: there are others.
   int Reword(bool& more);
 
   ContentsMeta meta;

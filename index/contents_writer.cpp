@@ -142,12 +142,16 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
 
   // No entry waits for it. Whatever stands for that file now is taken in anew.
   dropped = true;
-  released.erase(file.id);
   FollowedEntry latest;
   bool found = false;
   code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);
-  code = code == SQLITE_OK ? table->Remove(file) : code;
+  code = code == SQLITE_OK ? Remove(file) : code;
   return code == SQLITE_OK && found ? TakeInEntry(latest) : code;
+}
+
+int ContentsWriter::Impl::Remove(const ContentFile& file) {
+  released.erase(file.id);
+  return table->Remove(file);
 }
 
 bool ContentsWriter::Impl::BeginTries(const std::vector<int64_t>& files) {
@@ -253,7 +257,7 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
   now.begun = 0;
   now.unended = 0;
   if (current) {
-    now.tries += killed ? 1 : 0;
+    ++now.tries;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
       code = Keep(file, content, now);

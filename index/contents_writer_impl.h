@@ -51,6 +51,7 @@ struct ContentsWriter::Impl {
   int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
   int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
   int IsKept(const ContentFile& file, Kind found, bool& is_kept);
+  int Remove(const ContentFile& file);
   int DropUnwanted(const ContentFile& file);
   int TakeInAfter(int64_t& done, int64_t& left, bool& more);
   bool Sweep(int64_t now, size_t limit, bool& more);
