@@ -3,6 +3,9 @@
 
 #include <zstd.h>
 
+#include <algorithm>
+#include <charconv>
+#include <system_error>
 #include <utility>
 
 namespace fileindexd {
@@ -40,6 +43,28 @@ bool Unpack(std::string_view packed, std::string& content) {
   return ZSTD_isError(got) == 0 && got == content.size();
 }
 
+// Numbers that people look for as words.
+bool IsWord(ContentField field) {
+  return field == ContentField::YEAR || field == ContentField::TRACK;
+}
+
+// Those that are known already, from their columns, stay.
+bool AddNumber(ContentField field, const std::string& digits, Content& content) {
+  int64_t number = 0;
+  const char* end = digits.data() + digits.size();
+  const auto [stop, error] = std::from_chars(digits.data(), end, number);
+  if (!IsWord(field) || error != std::errc() || stop != end) {
+    return false;
+  }
+  const bool is_known =
+      std::any_of(content.numbers.begin(), content.numbers.end(),
+                  [field](const NumberField& known) { return known.field == field; });
+  if (!is_known) {
+    content.numbers.push_back({field, number});
+  }
+  return true;
+}
+
 }  // namespace
 
 ContentWords WordsOf(const Content& content) {
@@ -47,6 +72,11 @@ ContentWords WordsOf(const Content& content) {
   for (const TextField& field : content.texts) {
     std::string& column = field.field == ContentField::TITLE ? words.title : words.fields;
     column += (column.empty() ? "" : "\n") + field.text;
+  }
+  for (const NumberField& number : content.numbers) {
+    if (IsWord(number.field)) {
+      words.fields += (words.fields.empty() ? "" : "\n") + std::to_string(number.number);
+    }
   }
   words.text = content.text;
   return words;
@@ -61,6 +91,11 @@ std::string PackTexts(const Content& content) {
   unpacked.reserve(size);
   for (const TextField& field : content.texts) {
     AddField(unpacked, field);
+  }
+  for (const NumberField& number : content.numbers) {
+    if (IsWord(number.field)) {
+      AddField(unpacked, {number.field, std::to_string(number.number)});
+    }
   }
   unpacked += '\0';
   unpacked += content.text;
@@ -82,8 +117,7 @@ bool UnpackTexts(std::string_view packed, Content& content) {
   size_t at = 0;
   while (at < unpacked.size() && unpacked[at] != '\0') {
     const auto number = static_cast<uint8_t>(unpacked[at]);
-    if (unpacked.size() - at < FIELD_HEAD || !IsContentField(number) ||
-        IsNumberField(static_cast<ContentField>(number))) {
+    if (unpacked.size() - at < FIELD_HEAD || !IsContentField(number)) {
       return false;
     }
     const size_t length = LengthAt(unpacked, at + 1);
@@ -91,7 +125,13 @@ bool UnpackTexts(std::string_view packed, Content& content) {
     if (unpacked.size() - at < length) {
       return false;
     }
-    texts.push_back({static_cast<ContentField>(number), unpacked.substr(at, length)});
+    const auto field = static_cast<ContentField>(number);
+    std::string text = unpacked.substr(at, length);
+    if (!IsNumberField(field)) {
+      texts.push_back({field, std::move(text)});
+    } else if (!AddNumber(field, text, content)) {
+      return false;
+    }
     at += length;
   }
   if (at >= unpacked.size()) {

@@ -3,7 +3,8 @@
 //
 //   packed   a zstd frame with its content's size, of:
 //   content  field… text
-//   field    number(1) length(4, little-endian) bytes      number: a ContentField that holds text
+//   field    number(1) length(4, little-endian) bytes      number: a ContentField that holds text,
+//                                                          or one whose digits are a word: a year
 //   text     0(1) bytes, to the end
 #pragma once
 
@@ -28,7 +29,8 @@ ContentWords WordsOf(const Content& content);
 
 // Empty when there is no memory.
 std::string PackTexts(const Content& content);
-// Sets the texts of `content`. False when the bytes are damaged, or memory ran out.
+// Sets the texts of `content`, and adds the numbers that are words. False when the bytes are
+// damaged, or memory ran out.
 bool UnpackTexts(std::string_view packed, Content& content);
 
 }  // namespace fileindexd

@@ -26,22 +26,15 @@ bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
     return false;
   }
 
-  known_until = table->meta.seen;
-  std::vector<FollowedEntry> rows;
-  int code = entries.Next(table->meta.seen, static_cast<int64_t>(limit), rows);
-  if (code != SQLITE_OK) {
-    return DoneWithEntries(code);
-  }
-  for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
-    code = TakeInEntry(rows[i]);
-    table->meta.seen = rows[i].written;
-  }
-  more = rows.size() == limit;
+  auto left = static_cast<int64_t>(limit);
+  int code = TakeInAfter(table->meta.seen, left, more);
   if (code == SQLITE_OK && more) {
     code = table->Begin();  // so many rows are not looked at twice for nothing
   }
   if (code == SQLITE_OK && !more && is_looking) {
-    code = LookOn(static_cast<int64_t>(limit - rows.size()), more);
+    code = TakeInAfter(looked, left, more);
+    has_passed = table->changed;
+    is_looking = more;
   }
   if (code == SQLITE_OK && !more) {
     code = table->Reword(more);
@@ -49,15 +42,20 @@ bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
   return Done(code);
 }
 
-int ContentsWriter::Impl::LookOn(int64_t limit, bool& more) {
+// Of the entries written after `done`, `left` ones at most; both follow.
+int ContentsWriter::Impl::TakeInAfter(int64_t& done, int64_t& left, bool& more) {
   std::vector<FollowedEntry> rows;
-  int code = entries.Next(looked, limit, rows);
+  int code = entries.Next(done, left, rows);
+  more = static_cast<int64_t>(rows.size()) == left;
   for (size_t i = 0; i < rows.size() && code == SQLITE_OK; ++i) {
+    if (IsFull()) {
+      more = true;
+      break;
+    }
     code = TakeInEntry(rows[i]);
-    looked = rows[i].written;
+    done = rows[i].written;
+    --left;
   }
-  more = static_cast<int64_t>(rows.size()) == limit;
-  is_looking = more;
   return code;
 }
 
@@ -78,6 +76,7 @@ int ContentsWriter::Impl::TakeInEntry(const FollowedEntry& entry) {
   file.identity = entry.identity;
   file.ctime = entry.ctime;
   file.kind = entry.kind;
+  file.reread = entry.reread;
   return table->Insert(file);
 }
 
@@ -85,11 +84,8 @@ int ContentsWriter::Impl::TakeInEntry(const FollowedEntry& entry) {
 // is read once more. A name that tells nothing does not take away what another one told.
 int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentFile& file) {
   ContentFile now = file;
-  bool again = false;
-  if (entry.ctime != file.ctime && entry.reread > known_until) {
-    now.ctime = entry.ctime;
-    again = true;
-  }
+  bool again = entry.reread > file.reread;
+  now.reread = std::max(file.reread, entry.reread);
   now.ctime = std::max(now.ctime, entry.ctime);
   now.unreferred_since = 0;
   if (file.kind == Kind::OTHER && entry.kind != Kind::OTHER) {
@@ -116,15 +112,16 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
 
 // Of a file whose name tells no kind, settings may want what was found by now, or not any more.
 int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, bool& again) {
-  if (file.state != ContentState::DONE) {
+  const bool waits = file.state == ContentState::WAITING;
+  if (waits && file.text == 0) {
     return SQLITE_OK;
   }
   bool is_kept = true;
   const int code = IsKept(file, file.found_kind, is_kept);
-  if (code != SQLITE_OK || is_kept == (file.extractor != KEPT_OUT)) {
+  if (code != SQLITE_OK || (waits ? is_kept : is_kept == (file.extractor != KEPT_OUT))) {
     return code;
   }
-  again = is_kept;
+  again = is_kept && file.state != ContentState::QUARANTINED;
   now.extractor = KEPT_OUT;
   return is_kept ? SQLITE_OK : table->SetContent(file, OfKind(file.found_kind), now);
 }
@@ -158,6 +155,7 @@ int ContentsWriter::Impl::TakeInChanged(const FollowedEntry& entry, const Conten
   now.identity = entry.identity;
   now.ctime = entry.ctime;
   now.kind = entry.kind;
+  now.reread = std::max(file.reread, entry.reread);
   now.extractor = 0;
   now.unreferred_since = 0;
   WaitAnew(now);
@@ -169,7 +167,7 @@ int ContentsWriter::Impl::TakeInChanged(const FollowedEntry& entry, const Conten
 int ContentsWriter::Impl::DropUnwanted(const ContentFile& file) {
   Reference reference = Reference::NONE;
   const int code = entries.Refer(file.identity, reference);
-  return code == SQLITE_OK && reference == Reference::UNWANTED ? table->Remove(file) : code;
+  return code == SQLITE_OK && reference == Reference::UNWANTED ? Remove(file) : code;
 }
 
 bool ContentsWriter::Impl::Sweep(int64_t now, size_t limit, bool& more) {
@@ -180,21 +178,27 @@ bool ContentsWriter::Impl::Sweep(int64_t now, size_t limit, bool& more) {
 
   std::vector<ContentFile> files;
   int code = table->Unreferred(now - DAY, static_cast<int64_t>(limit), files);
-  for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+  more = files.size() == limit;
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK && !IsFull(); ++i) {
     code = SweepFile(files[i], now);
   }
-  more = files.size() == limit;
-  if (code != SQLITE_OK || more || !is_sweeping) {
+  if (code != SQLITE_OK || more || IsFull() || !is_sweeping) {
+    more = more || IsFull();
     return Done(code);
   }
 
   const auto left = static_cast<int64_t>(limit - files.size());
   code = table->Slice(swept, left, files);
+  more = static_cast<int64_t>(files.size()) == left;
   for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+    if (IsFull()) {
+      more = true;
+      break;
+    }
     code = SweepFile(files[i], now);
     swept = files[i].id;
   }
-  more = static_cast<int64_t>(files.size()) == left;
+  has_passed = table->changed;
   is_sweeping = more;
   return Done(code);
 }
@@ -206,7 +210,7 @@ int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
     return code;
   }
   if (reference == Reference::UNWANTED) {
-    return table->Remove(file);
+    return Remove(file);
   }
 
   ContentFile changed = file;
@@ -215,7 +219,7 @@ int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
   } else if (file.unreferred_since == 0 || file.unreferred_since > now) {
     changed.unreferred_since = now;
   } else if (now - file.unreferred_since >= DAY) {
-    return table->Remove(file);
+    return Remove(file);
   }
   return changed.unreferred_since == file.unreferred_since ? SQLITE_OK
                                                            : table->Update(file, changed);

@@ -5,13 +5,12 @@
 
 namespace fileindexd {
 
-static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 1,
+static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 2,
               "numbers in the text below");
 
 namespace {
 
 // AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
-// What failed before comes last in the queue, so that it holds nothing else up.
 constexpr const char* CONTENTS_SCHEMA = R"sql(
 CREATE TABLE files(
   id INTEGER PRIMARY KEY AUTOINCREMENT,
@@ -28,6 +27,7 @@ CREATE TABLE files(
   unended INTEGER NOT NULL,
   begun INTEGER NOT NULL,
   unreferred_since INTEGER NOT NULL,
+  reread INTEGER NOT NULL,
   text INTEGER NOT NULL,
   length INTEGER NOT NULL,
   reason TEXT NOT NULL DEFAULT '',
@@ -37,7 +37,7 @@ CREATE TABLE files(
   track INTEGER, duration INTEGER, bit_rate INTEGER, width INTEGER, height INTEGER,
   latitude INTEGER, longitude INTEGER, rating INTEGER,
   UNIQUE(inode, birth_time));
-CREATE INDEX files_waiting ON files(tries, mtime DESC, size) WHERE state = 0;
+CREATE INDEX files_waiting ON files()sql" WAITING_ORDER R"sql() WHERE state = 0;
 CREATE INDEX files_failed ON files(id) WHERE state >= 2;
 CREATE INDEX files_begun ON files(id) WHERE begun <> 0;
 CREATE INDEX files_unreferred ON files(unreferred_since) WHERE unreferred_since <> 0;
@@ -58,10 +58,12 @@ CREATE TABLE meta(
   entries_made INTEGER NOT NULL,
   seen INTEGER NOT NULL,
   last_text INTEGER NOT NULL,
-  reworded INTEGER NOT NULL);
-INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807);
+  reworded INTEGER NOT NULL,
+  reword_end INTEGER NOT NULL,
+  words_version TEXT NOT NULL);
+INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '');
 PRAGMA application_id = 1179206479;
-PRAGMA user_version = 1;
+PRAGMA user_version = 2;
 )sql";
 
 }  // namespace

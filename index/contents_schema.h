@@ -12,15 +12,17 @@
 //     kind              by the name of an entry; the entries' numbers
 //     found_kind        by the content; 0: not known, or nothing that is read
 //     state             ContentState
-//     extractor         version of the readers that read it last; 0: none did, or, of a file that
-//     is
-//                       done, nothing was kept, as what it was found to be is not wanted
-//     tries             how many ended with the death of whatever read it
+//     extractor         version of the readers that read it last; 0: none did, or, of a file
+//                       that was read, nothing was kept, as what it was found to be is not wanted
+//     tries             how many ended in failure; while it waits, with the death of what read it
 //     unended           how many began beside others and have no end on record: its fault or not
 //     begun             0 not in flight, 1 alone, 2 beside others
 //     reason            of the failure, one line
 //     is_cut, sample    as in Content
 //     unreferred_since  seconds since the epoch: found without an entry; 0: has one
+//     reread            the greatest `reread` of its entries: what was written to before is read,
+//     or
+//                       waits
 //     text              rowid in `texts` and `words`; 0: there is none
 //     length            bytes of its words
 //     pages … rating    the number fields; NULL: not known
@@ -34,8 +36,9 @@
 //   meta      one row: the share's file system (contents of another one say nothing), the language
 //             of the words, the version of the readers that what failed was tried with, the random
 //             number of the entries database that was followed and the greatest `written` seen in
-//             it, the last rowid in `texts`, and up to which of them there are words (all, unless
-//             the words are being made anew)
+//             it, the last rowid in `texts`, and while the words are being made anew, up to which
+//             of them that is done (all, unless it is going on) and up to which it has to be, and
+//             the version of what cuts texts into words
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.
@@ -49,7 +52,7 @@
 namespace fileindexd {
 
 constexpr int64_t CONTENTS_APPLICATION = 0x4649434f;
-constexpr int64_t CONTENTS_VERSION = 1;
+constexpr int64_t CONTENTS_VERSION = 2;
 
 extern const DatabaseForm CONTENTS_FORM;
 
@@ -57,6 +60,11 @@ extern const DatabaseForm CONTENTS_FORM;
 enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3 };
 
 constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being made anew
+
+// The order in which files are read: what failed before comes last, so that it holds nothing else
+// up; then the newest, by the minute, as of no two files the same time would ever be met; then the
+// smallest. An index has these expressions.
+#define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;

@@ -13,7 +13,7 @@ constexpr int64_t RATE_SECONDS = 60;
 
 #define FILE_COLUMNS                                                                \
   "id, inode, birth_time, size, mtime, ctime, kind, found_kind, state, extractor, " \
-  "tries, unended, begun, unreferred_since, text, length"
+  "tries, unended, begun, unreferred_since, reread, text, length"
 
 void ReadFile(const Statement& row, ContentFile& file) {
   file.id = row.Int(0);
@@ -30,8 +30,9 @@ void ReadFile(const Statement& row, ContentFile& file) {
   file.unended = row.Int(11);
   file.begun = row.Int(12);
   file.unreferred_since = row.Int(13);
-  file.text = row.Int(14);
-  file.length = row.Int(15);
+  file.reread = row.Int(14);
+  file.text = row.Int(15);
+  file.length = row.Int(16);
 }
 
 // All but the id, from column 2 on.
@@ -41,7 +42,8 @@ void BindFile(Statement& statement, const ContentFile& file) {
        {static_cast<int64_t>(file.identity.inode), file.identity.birth_time, file.identity.size,
         file.identity.mtime, file.ctime, static_cast<int64_t>(file.kind),
         static_cast<int64_t>(file.found_kind), static_cast<int64_t>(file.state), file.extractor,
-        file.tries, file.unended, file.begun, file.unreferred_since, file.text, file.length}) {
+        file.tries, file.unended, file.begun, file.unreferred_since, file.reread, file.text,
+        file.length}) {
     statement.BindInt(column++, value);
   }
 }
@@ -57,8 +59,8 @@ int ContentsTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&find, "SELECT " FILE_COLUMNS " FROM files WHERE inode = ?1 AND birth_time = ?2"},
       {&find_by_id, "SELECT " FILE_COLUMNS " FROM files WHERE id = ?1"},
-      {&waiting, "SELECT " FILE_COLUMNS
-                 " FROM files WHERE state = 0 ORDER BY tries, mtime DESC, size LIMIT ?1"},
+      {&waiting,
+       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 ORDER BY " WAITING_ORDER " LIMIT ?1"},
       {&failed,
        "SELECT " FILE_COLUMNS " FROM files WHERE state >= 2 AND id > ?1 ORDER BY id LIMIT ?2"},
       {&left_begun, "SELECT " FILE_COLUMNS " FROM files WHERE begun <> 0 LIMIT ?1"},
@@ -66,17 +68,19 @@ int ContentsTable::Prepare(sqlite3* db) {
                     " FROM files WHERE unreferred_since <> 0 AND unreferred_since <= ?1 LIMIT ?2"},
       {&slice, "SELECT " FILE_COLUMNS " FROM files WHERE id > ?1 ORDER BY id LIMIT ?2"},
       {&insert, "INSERT INTO files(" FILE_COLUMNS ") VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, "
-                "?10, ?11, ?12, ?13, ?14, ?15, ?16)"},
+                "?10, ?11, ?12, ?13, ?14, ?15, ?16, ?17)"},
       {&update,
        "UPDATE files SET inode = ?2, birth_time = ?3, size = ?4, mtime = ?5, ctime = ?6, "
        "kind = ?7, found_kind = ?8, state = ?9, extractor = ?10, tries = ?11, "
-       "unended = ?12, begun = ?13, unreferred_since = ?14, text = ?15, length = ?16 "
+       "unended = ?12, begun = ?13, unreferred_since = ?14, reread = ?15, "
+       "text = ?16, length = ?17 "
        "WHERE id = ?1"},
       {&set_reason, "UPDATE files SET reason = ?2 WHERE id = ?1 AND reason <> ?2"},
       {&remove, "DELETE FROM files WHERE id = ?1"},
       {&write_meta,
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
-       "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7 WHERE id = 1"},
+       "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
+       "words_version = ?9 WHERE id = 1"},
       {&write_counts,
        "UPDATE counts SET waiting = waiting + ?2, done = done + ?3, "
        "failed = failed + ?4 WHERE kind = ?1"},
@@ -100,9 +104,10 @@ int ContentsTable::Prepare(sqlite3* db) {
 
 int ContentsTable::ReadMeta() {
   Statement statement;
-  int code = statement.Prepare(handle,
-                               "SELECT filesystem, language, extractor, entries_made, seen, "
-                               "last_text, reworded FROM meta WHERE id = 1");
+  int code =
+      statement.Prepare(handle,
+                        "SELECT filesystem, language, extractor, entries_made, seen, "
+                        "last_text, reworded, reword_end, words_version FROM meta WHERE id = 1");
   if (code == SQLITE_OK) {
     code = statement.Step();
   }
@@ -116,6 +121,8 @@ int ContentsTable::ReadMeta() {
   meta.seen = statement.Int(4);
   meta.last_text = statement.Int(5);
   meta.reworded = statement.Int(6);
+  meta.reword_end = statement.Int(7);
+  meta.words_version = statement.Bytes(8);
   return SQLITE_OK;
 }
 
@@ -132,6 +139,8 @@ int ContentsTable::WriteMeta() {
   write_meta.BindInt(5, meta.seen);
   write_meta.BindInt(6, meta.last_text);
   write_meta.BindInt(7, meta.reworded);
+  write_meta.BindInt(8, meta.reword_end);
+  write_meta.BindText(9, meta.words_version);
   return write_meta.Run();
 }
 

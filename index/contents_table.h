@@ -33,6 +33,7 @@ struct ContentFile {
   int64_t unended = 0;
   int64_t begun = 0;
   int64_t unreferred_since = 0;
+  int64_t reread = 0;
   int64_t text = 0;
   int64_t length = 0;
 };
@@ -45,6 +46,8 @@ struct ContentsMeta {
   int64_t seen = 0;
   int64_t last_text = 0;
   int64_t reworded = ALL_WORDS;
+  int64_t reword_end = 0;
+  std::string words_version;
 };
 
 class ContentsTable {
@@ -53,7 +56,8 @@ class ContentsTable {
   // PrepareWords.
   int Prepare(sqlite3* db);
   int PrepareWords();
-  int MakeWords(const std::string& language);  // all anew, from what is stored: see Reword
+  // All anew, from what is stored: see Reword. What is stored from now on has its words at once.
+  int MakeWords(const std::string& language, const std::string& version);
 
   // Commit writes `meta`, and counts `done_now` files as done in that second.
   int Begin();  // nothing, if a transaction is open
@@ -79,12 +83,12 @@ class ContentsTable {
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 
-  // Makes words of stored texts, about 8 MiB. `more`: there are others.
+  // Makes words of stored texts, about a MiB. `more`: there are others.
   int Reword(bool& more);
 
   ContentsMeta meta;
-  bool changed = false;  // since the last commit, `meta` included
-  size_t pending_bytes = 0;
+  bool changed = false;      // since the last commit, `meta` included
+  size_t pending_bytes = 0;  // see ContentsWriter::PendingBytes
   int64_t done_now = 0;
   sqlite3* handle = nullptr;
 

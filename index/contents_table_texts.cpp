@@ -9,8 +9,8 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t REWORD_BYTES = size_t{8} << 20;
-constexpr int64_t REWORD_ROWS = 500;
+constexpr size_t REWORD_BYTES = size_t{1} << 20;
+constexpr size_t REWORD_ROW = 500;  // a text is not free, however short
 constexpr size_t NUMBERS = 14;
 
 std::string SetContentSql() {
@@ -30,7 +30,7 @@ int ContentsTable::PrepareTexts() {
       {&set_content, content_sql.c_str()},
       {&insert_text, "INSERT INTO texts(id, packed) VALUES(?1, ?2)"},
       {&read_text, "SELECT packed FROM texts WHERE id = ?1"},
-      {&next_texts, "SELECT id, packed FROM texts WHERE id > ?1 ORDER BY id LIMIT ?2"},
+      {&next_texts, "SELECT id, packed FROM texts WHERE id > ?1 AND id <= ?2 ORDER BY id"},
       {&remove_text, "DELETE FROM texts WHERE id = ?1"},
   };
   for (const auto& [statement, sql] : statements) {
@@ -52,12 +52,14 @@ int ContentsTable::PrepareWords() {
                                     "VALUES('delete', ?1, ?2, ?3, ?4)");
 }
 
-int ContentsTable::MakeWords(const std::string& language) {
+int ContentsTable::MakeWords(const std::string& language, const std::string& version) {
   int code = Begin();
   if (code == SQLITE_OK) {
     code = sqlite3_exec(handle, WordsSchema(language).c_str(), nullptr, nullptr, nullptr);
   }
   meta.language = language;
+  meta.words_version = version;
+  meta.reword_end = meta.last_text;
   meta.reworded = meta.last_text == 0 ? ALL_WORDS : 0;
   return code;
 }
@@ -99,14 +101,13 @@ int ContentsTable::SetContent(const ContentFile& before, const Content& content,
   code = insert_text.Run();
   file.length = static_cast<int64_t>(words.Length());
   pending_bytes += words.Length();
-  // Where words are being made anew, these are met on the way.
-  return code == SQLITE_OK && meta.reworded == ALL_WORDS ? AddWords(file.text, words) : code;
+  return code == SQLITE_OK ? AddWords(file.text, words) : code;
 }
 
 int ContentsTable::RemoveContent(ContentFile& file) {
   if (file.text != 0) {
     leaving.push_back(file.text);
-    pending_bytes += static_cast<size_t>(file.length);
+    pending_bytes += 2 * static_cast<size_t>(file.length);
   }
   file.text = 0;
   file.length = 0;
@@ -142,7 +143,7 @@ int ContentsTable::RemoveWordsOf(int64_t text) {
   }
 
   code = SQLITE_OK;
-  if (text <= meta.reworded) {
+  if (text <= meta.reworded || text > meta.reword_end) {
     const ContentWords words = WordsOf(content);
     remove_words.BindInt(1, text);
     remove_words.BindText(2, words.title);
@@ -162,7 +163,7 @@ int ContentsTable::Reword(bool& more) {
   }
 
   next_texts.BindInt(1, meta.reworded);
-  next_texts.BindInt(2, REWORD_ROWS);
+  next_texts.BindInt(2, meta.reword_end);
   code = next_texts.Step();
   more = code == SQLITE_ROW;
   for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {
@@ -172,7 +173,7 @@ int ContentsTable::Reword(bool& more) {
       code = SQLITE_CORRUPT;
       break;
     }
-    bytes += content.text.size();
+    bytes += content.text.size() + REWORD_ROW;
     pending_bytes += content.text.size();
     code = AddWords(text, WordsOf(content));
     meta.reworded = text;

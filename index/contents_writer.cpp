@@ -15,6 +15,9 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t MOST_TRIES = 2;
+// What was in flight at so many deaths of the service is read alone: only so does another one tell
+// who it was.
+constexpr int64_t SUSPECT_DEATHS = 2;
 constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file any more
 constexpr int ROUNDS = 8;
 
@@ -57,13 +60,18 @@ bool ContentsWriter::Impl::ReadyToFollow() {
   return true;
 }
 
+// What fails in the entries takes nothing from the contents. There, `files` has its rows unique: a
+// violation comes of damage.
 bool ContentsWriter::Impl::Done(int code) {
   if (code == SQLITE_OK) {
     return true;
   }
   error = FromSqlite(code);
-  // `files` has its rows unique; a violation comes of damage.
-  error = error == IndexError::OTHER ? IndexError::DAMAGED : error;
+  if (std::exchange(entries.failed, false)) {
+    CloseAll();
+    return false;
+  }
+  error = (code & 0xff) == SQLITE_CONSTRAINT ? IndexError::DAMAGED : error;
   CloseDatabase();
   if (error == IndexError::DAMAGED) {
     (void)SetAside(ContentsPath(share.name), "found at work");
@@ -71,24 +79,16 @@ bool ContentsWriter::Impl::Done(int code) {
   return false;
 }
 
-// Nothing of the contents is to blame.
-bool ContentsWriter::Impl::DoneWithEntries(int code) {
-  if (code == SQLITE_OK) {
-    return true;
-  }
-  error = FromSqlite(code);
-  CloseAll();
-  return false;
-}
-
-bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more) {
   jobs.clear();
+  more = false;
   if (!Ready() || !ReadyToFollow()) {
     return false;
   }
 
+  Company company = Begun();
   bool dropped = true;
-  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit; ++round) {
+  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit && !IsFull(); ++round) {
     dropped = false;
     std::vector<ContentFile> rows;
     int code =
@@ -97,15 +97,29 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs)
     std::stable_partition(rows.begin(), rows.end(),
                           [this](const ContentFile& file) { return !released.contains(file.id); });
     for (size_t i = 0; i < rows.size() && code == SQLITE_OK && jobs.size() < limit; ++i) {
-      if (!out.contains(rows[i].id)) {
-        code = Offer(rows[i], jobs, dropped);
+      const bool is_suspect = rows[i].unended >= SUSPECT_DEATHS;
+      if (out.contains(rows[i].id) || company.suspect || (is_suspect && company.any)) {
+        continue;
       }
+      code = Offer(rows[i], jobs, dropped);
+      company.any = company.any || !jobs.empty();
+      company.suspect = is_suspect && !jobs.empty();
     }
     if (code != SQLITE_OK) {
       return Done(code);
     }
   }
+  more = dropped || jobs.size() >= limit;
   return true;
+}
+
+ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
+  Company company;
+  for (const auto& [id, handed] : out) {
+    company.any = company.any || handed.is_begun;
+    company.suspect = company.suspect || (handed.is_begun && handed.is_suspect);
+  }
+  return company;
 }
 
 int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>& jobs,
@@ -120,7 +134,7 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
     job.identity = file.identity;
     job.kind = file.kind;
     job.tries = file.tries + file.unended;
-    out[file.id] = {file.identity};
+    out[file.id] = {.identity = file.identity, .is_suspect = file.unended >= SUSPECT_DEATHS};
     released.erase(file.id);
     jobs.push_back(std::move(job));
     return SQLITE_OK;
@@ -128,12 +142,16 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
 
   // No entry waits for it. Whatever stands for that file now is taken in anew.
   dropped = true;
-  released.erase(file.id);
   FollowedEntry latest;
   bool found = false;
   code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);
-  code = code == SQLITE_OK ? table->Remove(file) : code;
+  code = code == SQLITE_OK ? Remove(file) : code;
   return code == SQLITE_OK && found ? TakeInEntry(latest) : code;
+}
+
+int ContentsWriter::Impl::Remove(const ContentFile& file) {
+  released.erase(file.id);
+  return table->Remove(file);
 }
 
 bool ContentsWriter::Impl::BeginTries(const std::vector<int64_t>& files) {
@@ -206,16 +224,20 @@ bool ContentsWriter::Impl::Finish(int64_t id, const Content& content) {
   if (current) {
     now.state = ContentState::DONE;
     now.tries = 0;
-    bool is_kept = true;
-    code = IsKept(file, content.kind, is_kept);
-    now.extractor = is_kept ? extractor : KEPT_OUT;
-    if (code == SQLITE_OK) {
-      code = table->SetContent(file, is_kept ? content : OfKind(content.kind), now);
-    }
+    code = Keep(file, content, now);
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
     ++table->done_now;
   }
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+}
+
+// What was found, if it turned out to be of a kind that is wanted.
+int ContentsWriter::Impl::Keep(const ContentFile& file, const Content& content, ContentFile& now) {
+  bool is_kept = true;
+  const int code = IsKept(file, content.kind, is_kept);
+  now.extractor = is_kept ? extractor : KEPT_OUT;
+  return code == SQLITE_OK ? table->SetContent(file, is_kept ? content : OfKind(content.kind), now)
+                           : code;
 }
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
@@ -235,11 +257,10 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
   now.begun = 0;
   now.unended = 0;
   if (current) {
-    now.tries += killed ? 1 : 0;
+    ++now.tries;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
-      now.extractor = extractor;
-      code = table->SetContent(file, content, now);
+      code = Keep(file, content, now);
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
   }
@@ -266,6 +287,21 @@ bool ContentsWriter::Impl::Release(int64_t id) {
   return Done(table->Update(file, now));
 }
 
+void ContentsWriter::Impl::LookAtAll() {
+  is_looking = true;
+  looked = 0;
+  is_sweeping = true;
+  swept = 0;
+}
+
+// How far the passes have come is no part of the transaction: they begin anew.
+void ContentsWriter::Impl::Rollback() {
+  table->Rollback();
+  if (std::exchange(has_passed, false)) {
+    LookAtAll();
+  }
+}
+
 // A database that was removed is written into nowhere without an error, so the file is asked for
 // after the commit.
 bool ContentsWriter::Impl::Commit() {
@@ -275,6 +311,7 @@ bool ContentsWriter::Impl::Commit() {
   if (!Done(table->Commit(Now()))) {
     return false;
   }
+  has_passed = false;
   if (database.HasMoved()) {
     error = IndexError::PATH_NOT_FOUND;
     CloseDatabase();
@@ -298,7 +335,7 @@ IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
 // What was handed out is taken back: nobody will tell how it ended.
 void ContentsWriter::Close() {
   if (IsOpen()) {
-    impl->table->Rollback();
+    impl->Rollback();
     (void)impl->Done(impl->table->ReadMeta());
   }
   while (IsOpen() && !impl->out.empty() && Release(impl->out.begin()->first)) {
@@ -325,14 +362,11 @@ bool ContentsWriter::TakeIn(size_t limit, bool& more) {
 }
 
 void ContentsWriter::LookAtAll() {
-  impl->is_looking = true;
-  impl->looked = 0;
-  impl->is_sweeping = true;
-  impl->swept = 0;
+  impl->LookAtAll();
 }
 
-bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
-  return impl->Guarded([&] { return impl->NextJobs(limit, jobs); });
+bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more) {
+  return impl->Guarded([&] { return impl->NextJobs(limit, jobs, more); });
 }
 
 bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {

@@ -36,6 +36,9 @@ struct ContentJob {
 
 class ContentsWriter {
  public:
+  // Bigger transactions cost memory and gain nothing.
+  static constexpr size_t ENOUGH_PENDING = size_t{8} << 20;
+
   ContentsWriter();
   ~ContentsWriter();
 
@@ -50,17 +53,18 @@ class ContentsWriter {
   // of another kind is not kept. Until it is called, all are. When they changed: LookAtAll.
   void UseSettings(std::shared_ptr<const Settings> in_force);
 
-  // Takes in entries that changed since the last call, at most `limit` rows: files wanted and not
-  // known begin to wait; a file whose ctime is another while all else is the same waits again when
-  // the entry was added anew, and only has the ctime stored when it was updated. `more`: call
-  // again.
+  // Takes in entries that changed since the last call, at most `limit` rows and ENOUGH_PENDING:
+  // files wanted and not known, or changed, begin to wait. One of which only the ctime is another
+  // waits again when an add said that it was written to (see `reread` in schema.h); else the ctime
+  // is just stored. `more`: call again.
   bool TakeIn(size_t limit, bool& more);
   // Has TakeIn look at every entry again: at the start, after a rebuild, when settings changed,
   // once a day. Along with it goes what entries no longer want (see Sweep).
   void LookAtAll();
 
-  // Files that wait, newest and smallest first, without those handed out and not ended.
-  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs);
+  // Files that wait, newest and smallest first, without those handed out and not ended. `more`:
+  // others may wait, though these are less than `limit`.
+  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   // On disk when it returns: what is about to be tried.
   bool BeginTries(const std::vector<int64_t>& files);
   bool Finish(int64_t file, const Content& content);
@@ -72,12 +76,13 @@ class ContentsWriter {
   // All that failed waits again.
   bool RetryFailed();
 
-  // Removes, at most `limit` rows, contents whose kind is no longer wanted, and those that no entry
-  // referred to for a day. `now`: seconds since the epoch.
+  // Removes, at most `limit` rows and ENOUGH_PENDING, contents whose kind is no longer wanted, and
+  // those that no entry referred to for a day. `now`: seconds since the epoch.
   bool Sweep(int64_t now, size_t limit, bool& more);
 
   bool HasChanges() const;
-  size_t PendingBytes() const;  // text since the last commit
+  // Text since the last commit. What is removed counts twice: that is done by the commit, at once.
+  size_t PendingBytes() const;
   bool Commit();
 
   IndexError Error() const;  // of the last operation that returned false

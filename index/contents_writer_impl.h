@@ -24,7 +24,7 @@
 
 namespace fileindexd {
 
-// `extractor` of a file that is done and of which nothing was kept: its kind is not wanted.
+// `extractor` of a file that was read and of which nothing was kept: its kind is not wanted.
 constexpr int64_t KEPT_OUT = 0;
 
 inline Content OfKind(Kind kind) {
@@ -51,20 +51,31 @@ struct ContentsWriter::Impl {
   int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
   int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
   int IsKept(const ContentFile& file, Kind found, bool& is_kept);
+  int Remove(const ContentFile& file);
   int DropUnwanted(const ContentFile& file);
-  int LookOn(int64_t limit, bool& more);
+  int TakeInAfter(int64_t& done, int64_t& left, bool& more);
   bool Sweep(int64_t now, size_t limit, bool& more);
   int SweepFile(const ContentFile& file, int64_t now);
 
   // contents_writer.cpp
-  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs);
+  bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
   bool Finish(int64_t file, const Content& content);
+  int Keep(const ContentFile& file, const Content& content, ContentFile& now);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Release(int64_t file);
+  void LookAtAll();
+  void Rollback();
   bool Commit();
+  // What is with helpers, and what is about to be. A suspect is alone.
+  struct Company {
+    bool any = false;
+    bool suspect = false;
+  };
+  Company Begun() const;
+
   // The row of a file that was handed out. `current`: its bytes are still those that are wanted.
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
@@ -73,12 +84,13 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
-  bool DoneWithEntries(int code);
+  bool IsFull() const { return table->pending_bytes >= ENOUGH_PENDING; }
 
   struct HandedOut {
     FileIdentity identity;
     bool is_stale = false;  // it has to be read once more
     bool is_begun = false;
+    bool is_suspect = false;
   };
 
   Share share;
@@ -92,11 +104,11 @@ struct ContentsWriter::Impl {
   std::set<int64_t> released;  // those are offered last
   bool has_judged = false;     // what an earlier service left in flight
   int64_t alone = 0;           // the one that was begun without another; 0: none
-  int64_t known_until = 0;     // `seen` before what is being taken in
   bool is_looking = false;     // at every entry
   int64_t looked = 0;          // up to this `written`
   bool is_sweeping = false;    // over every file
   int64_t swept = 0;           // up to this row
+  bool has_passed = false;     // one of these changed what is not committed
 };
 
 }  // namespace fileindexd

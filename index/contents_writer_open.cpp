@@ -5,6 +5,7 @@
 #include "index/contents_writer_impl.h"
 #include "index/set_aside.h"
 #include "index/text_tokenizer.h"
+#include "index/words_version.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -58,7 +59,11 @@ IndexError ContentsWriter::Impl::TryOpen() {
     opened = database.OpenForWriting(path, true, CONTENTS_FORM);
     opened = opened == IndexError::NONE ? SetUp() : opened;
   }
-  return opened == IndexError::NONE ? FromSqlite(Own()) : opened;
+  if (opened != IndexError::NONE) {
+    return opened;
+  }
+  const int code = Own();
+  return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }
 
 IndexError ContentsWriter::Impl::SetUp() {
@@ -70,14 +75,17 @@ IndexError ContentsWriter::Impl::SetUp() {
 
 // Makes it this share's, this language's and these readers' database.
 int ContentsWriter::Impl::Own() {
-  const std::string language = LanguageName(share.language);
+  const std::string given = LanguageName(share.language);
+  const std::string language = given.empty() ? DEFAULT_LANGUAGE : given;
+  const std::string version = WordsVersion(language);
   int code = SQLITE_OK;
   if (table->meta.filesystem != share.filesystem) {
     code = table->Begin();
     table->meta.filesystem = share.filesystem;
   }
-  if (code == SQLITE_OK && table->meta.language != language) {
-    code = table->MakeWords(language.empty() ? DEFAULT_LANGUAGE : language);
+  if (code == SQLITE_OK &&
+      (table->meta.language != language || table->meta.words_version != version)) {
+    code = table->MakeWords(language, version);
   }
   code = code == SQLITE_OK ? table->PrepareWords() : code;
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
@@ -137,7 +145,7 @@ int ContentsWriter::Impl::RetryAll(bool old_only) {
 // What is in flight goes on: its outcome comes to whatever is opened next.
 void ContentsWriter::Impl::CloseDatabase() {
   if (table.has_value()) {
-    table->Rollback();
+    Rollback();
   }
   table.reset();
   database.Close();

@@ -120,7 +120,8 @@ IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
   }
 
   error = RemoveAt(path, look.verdict == Verdict::GONE);
-  return error == IndexError::NONE ? RemoveBelow(path, false) : error;
+  error = error == IndexError::NONE ? RemoveBelow(path, false) : error;
+  return error == IndexError::NONE ? SettleOtherPaths() : error;
 }
 
 IndexError Converger::Settle(const std::string& path, const Look& look, const ContentFlags& wanted,
@@ -202,9 +203,8 @@ IndexError Converger::Change(const Entry& known, const Look& look, const Content
   if (IsSame(known, seen)) {
     return IndexError::NONE;
   }
-  const bool reread = added_path != nullptr && known.path == *added_path && !replaced &&
-                      known.size == seen.size && known.mtime == seen.mtime &&
-                      known.ctime != seen.ctime;
+  // Even where size or mtime changed, too: whoever wrote may set them back before anybody follows.
+  const bool reread = added_path != nullptr && known.path == *added_path && !replaced;
   seen.reread = replaced ? 0 : known.reread;
   const IndexError error = Sql(table.Update(seen, reread));
   if (error == IndexError::NONE) {

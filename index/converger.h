@@ -26,7 +26,7 @@ class Converger {
 
   // `path` is normal and lies in `in_share`, one of `in_force`; both stay for the length of the
   // call. `seen` as for EntryWriter::Refresh. `added`: somebody wrote to it, so the content counts
-  // as another when no more than the change time is.
+  // as another when anything about it is.
   IndexError Refresh(const Settings& in_force, const Share& in_share, const std::string& path,
                      const ContentFlags& wanted, const ContentFlags& decide, const Look* seen,
                      bool added);
@@ -61,6 +61,7 @@ class Converger {
   IndexError SettleSlice(const std::vector<Entry>& rows, std::vector<std::string>& replaced);
   IndexError AddBelow(const std::string& directory);
 
+  IndexError NoteLinks(const Entry& removed);
   IndexError RemoveAt(const std::string& path, bool root_counts);
   IndexError RemoveBelow(const std::string& path, bool even_what_belongs);
   IndexError RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs);
@@ -75,7 +76,7 @@ class Converger {
   bool mount_known = false;
   uint64_t mount_id = 0;  // last mount and device that were seen below a sound root
   uint64_t device = 0;
-  std::vector<std::string> other_paths;  // where what the operation added was known before
+  std::vector<std::string> other_paths;  // of what the operation added or removed
   std::set<std::string> looked_at;       // subtrees, where the file system has no birth times
 };
 

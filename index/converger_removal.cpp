@@ -1,11 +1,17 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What leaves the index. The root is looked at last: before anything is taken away, and after what
 // is to leave was found gone.
-#include <utility>
-
 #include "index/converger.h"
 
 namespace fileindexd {
+
+namespace {
+
+// Of one file, and of a tree of links: what is not refreshed is read once more by a reindex.
+constexpr size_t MOST_LINKS = 1000;
+constexpr size_t MOST_LINKS_NOTED = 10000;
+
+}  // namespace
 
 IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
                              const std::string& path, DeleteMode mode) {
@@ -13,6 +19,7 @@ IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
   settings = &in_force;
   share = &in_share;
   sql_failed = false;
+  other_paths.clear();
   if (mode == DeleteMode::ALL) {
     const IndexError error = RemoveAt(path, true);
     return error == IndexError::NONE ? RemoveBelow(path, true) : error;
@@ -30,7 +37,23 @@ IndexError Converger::Delete(const Settings& in_force, const Share& in_share,
   if (mode == DeleteMode::ENTRY || look.verdict != Verdict::BELONGS) {
     error = RemoveAt(path, look.verdict == Verdict::GONE);
   }
-  return error == IndexError::NONE ? RemoveBelow(path, false) : error;
+  error = error == IndexError::NONE ? RemoveBelow(path, false) : error;
+  return error == IndexError::NONE ? SettleOtherPaths() : error;
+}
+
+// Taking a link away moves the change time of the others: unrefreshed, they would look to the next
+// add as if somebody had written to them, and be read anew.
+IndexError Converger::NoteLinks(const Entry& removed) {
+  if (removed.thing != Thing::FILE || !removed.content_wanted ||
+      other_paths.size() >= MOST_LINKS_NOTED) {
+    return IndexError::NONE;
+  }
+  const size_t before = other_paths.size();
+  const IndexError error = Sql(table.OtherPaths(removed, false, other_paths));
+  if (other_paths.size() - before > MOST_LINKS) {
+    other_paths.resize(before);
+  }
+  return error;
 }
 
 // `root_counts`: the root is looked at even if no entry stands there.
@@ -41,7 +64,11 @@ IndexError Converger::RemoveAt(const std::string& path, bool root_counts) {
   if (error == IndexError::NONE && (found || root_counts)) {
     error = CheckRoot();
   }
-  return error == IndexError::NONE && found ? Sql(table.Remove(known)) : error;
+  if (error != IndexError::NONE || !found) {
+    return error;
+  }
+  error = Sql(table.Remove(known));
+  return error == IndexError::NONE && root_counts ? NoteLinks(known) : error;
 }
 
 IndexError Converger::RemoveBelow(const std::string& path, bool even_what_belongs) {
@@ -66,7 +93,11 @@ IndexError Converger::RemoveFromSlice(const std::vector<Entry>& rows, bool even_
   }
 
   IndexError error = leaving.empty() ? IndexError::NONE : CheckRoot();
-  return error == IndexError::NONE ? Sql(table.RemoveAll(std::move(leaving))) : error;
+  error = error == IndexError::NONE ? Sql(table.RemoveAll(leaving)) : error;
+  for (size_t i = 0; i < leaving.size() && error == IndexError::NONE && !even_what_belongs; ++i) {
+    error = NoteLinks(*leaving[i]);
+  }
+  return error;
 }
 
 }  // namespace fileindexd

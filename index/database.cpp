@@ -245,6 +245,10 @@ const char* IndexErrorText(IndexError error) {
   return "unexpected error";
 }
 
+void LimitCaches(int64_t bytes) {
+  (void)sqlite3_soft_heap_limit64(bytes);
+}
+
 IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create,
                                          const DatabaseForm& form) {
   Close();

@@ -37,6 +37,10 @@ struct DatabaseForm {
 
 extern const DatabaseForm ENTRIES_FORM;
 
+// Of the whole process: where all connections together hold so much memory, their page caches grow
+// no further.
+void LimitCaches(int64_t bytes);
+
 // A connection to a share's database, that of the entries if nothing else is said. Nothing throws.
 class IndexDatabase {
  public:

@@ -28,7 +28,7 @@ struct Entry {
   uint32_t mode = 0;
   int64_t written =
       0;  // when the row was last written, a greater number each time; set by the table
-  int64_t reread = 0;  // the `written` of the last add that found only ctime to differ; 0: none
+  int64_t reread = 0;  // the `written` of the last add that found it changed; 0: none
 };
 
 }  // namespace fileindexd

@@ -36,7 +36,15 @@ void ReadFollowed(const Statement& row, FollowedEntry& entry) {
 
 }  // namespace
 
+// SQLITE_ROW: there is more than was asked for.
+int EntryFollower::End(Statement& statement, int code) {
+  statement.Reset();
+  failed = code != SQLITE_DONE && code != SQLITE_ROW;
+  return failed ? code : SQLITE_OK;
+}
+
 IndexError EntryFollower::EnsureOpen(const std::string& share_name) {
+  failed = false;
   if (database.IsOpen() && !database.HasMoved()) {
     return IndexError::NONE;
   }
@@ -84,8 +92,7 @@ int EntryFollower::Next(int64_t written, int64_t limit, std::vector<FollowedEntr
   for (; code == SQLITE_ROW; code = next.Step()) {
     ReadFollowed(next, entries.emplace_back());
   }
-  next.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return End(next, code);
 }
 
 int EntryFollower::Refer(const FileIdentity& identity, Reference& reference) {
@@ -94,14 +101,14 @@ int EntryFollower::Refer(const FileIdentity& identity, Reference& reference) {
   of_inode.BindInt(2, identity.birth_time);
   int code = of_inode.Step();
   for (; code == SQLITE_ROW && reference != Reference::WANTED; code = of_inode.Step()) {
-    Reference found = Reference::OTHER;
-    if (of_inode.Int(0) == identity.size && of_inode.Int(1) == identity.mtime) {
-      found = of_inode.Int(2) == 1 ? Reference::WANTED : Reference::UNWANTED;
+    Reference found = Reference::UNWANTED;
+    if (of_inode.Int(2) == 1) {
+      const bool is_same = of_inode.Int(0) == identity.size && of_inode.Int(1) == identity.mtime;
+      found = is_same ? Reference::WANTED : Reference::OTHER;
     }
     reference = std::max(reference, found);
   }
-  of_inode.Reset();
-  return code == SQLITE_DONE || code == SQLITE_ROW ? SQLITE_OK : code;
+  return End(of_inode, code);
 }
 
 int EntryFollower::Latest(uint64_t inode, int64_t birth_time, FollowedEntry& entry, bool& found) {
@@ -112,8 +119,7 @@ int EntryFollower::Latest(uint64_t inode, int64_t birth_time, FollowedEntry& ent
   if (found) {
     ReadFollowed(latest_of, entry);
   }
-  latest_of.Reset();
-  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+  return End(latest_of, code);
 }
 
 int EntryFollower::Paths(const FileIdentity& identity, std::vector<std::string>& paths) {
@@ -126,8 +132,7 @@ int EntryFollower::Paths(const FileIdentity& identity, std::vector<std::string>&
   for (; code == SQLITE_ROW; code = paths_of.Step()) {
     paths.push_back(paths_of.Bytes(0));
   }
-  paths_of.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return End(paths_of, code);
 }
 
 }  // namespace fileindexd

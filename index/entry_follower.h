@@ -26,9 +26,9 @@ struct FollowedEntry {
 // How entries refer to a file.
 enum class Reference {
   NONE,      // no entry stands for that file at all
-  OTHER,     // one does, with another size or mtime
-  UNWANTED,  // one has that identity, and its content is not wanted
-  WANTED,
+  UNWANTED,  // some do, and none wants its content
+  OTHER,     // one wants it, with another size or mtime
+  WANTED,    // with just that identity
 };
 
 class EntryFollower {
@@ -45,9 +45,11 @@ class EntryFollower {
   // Of wanted entries with that identity, a few of them.
   int Paths(const FileIdentity& identity, std::vector<std::string>& paths);
 
-  int64_t made = 0;  // tells one entries database from another
+  int64_t made = 0;     // tells one entries database from another
+  bool failed = false;  // whether the last operation did: the entries are to blame
 
  private:
+  int End(Statement& statement, int code);
   IndexDatabase database;
   Statement next, of_inode, latest_of, paths_of;
 };

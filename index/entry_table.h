@@ -52,8 +52,7 @@ class EntryTable {
   int OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths);
 
   int Insert(const Entry& entry);  // `id` does not count
-  // By `id`; the path does not change. `reread`: the content may be another, though nothing but the
-  // change time tells.
+  // By `id`; the path does not change. `reread`: somebody wrote to it: the content may be another.
   int Update(const Entry& entry, bool reread);
   int Remove(const Entry& entry);  // by `id`; needs the path
   // In the order of their ids. The full-text tables collect changes in memory while ids ascend, and

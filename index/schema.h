@@ -9,9 +9,8 @@
 //                     lies below P is the range ("P/", "P0")
 //     thing           1 file, 2 directory, 3 symbolic link
 //     kind            0 other, 1 document, 2 audio, 3 video, 4 photo, 5 folder
-//     content_wanted  0 no, 1 yes, 2 not any more: whoever keeps contents has to be told, and
-//     follows
-//                     rows that are not 0
+//     content_wanted  0 no, 1 yes, 2 not any more: whoever keeps contents has to be told,
+//                     and follows rows that are not 0
 //     inode           64 bits, as a signed number
 //     size            bytes; 0 for a directory
 //     mtime ctime birth_time first_seen   nanoseconds since the epoch; mtime 0 for a directory,
@@ -19,8 +18,10 @@
 //     owner grp mode  as the system counts them
 //     written         nanoseconds since the epoch: when this row was last written. Each write has a
 //                     greater number than all before it, even if the clock steps back
-//     reread          the `written` of the last add that found the change time alone to be another:
-//                     the bytes may differ though size and mtime do not; 0: none
+//     reread          the `written` of the last add that found the same thing with other
+//     attributes:
+//                     its bytes may differ from those that were there before, even if size and
+//                     mtime do not; 0: none
 //   names        words of the last path component, made valid UTF-8; no stored copy, so deleting
 //                needs the text that was inserted
 //   parts        the same text by trigrams, for substrings

@@ -6,6 +6,7 @@
 #include <cstring>
 #include <utility>
 
+#include "index/database.h"
 #include "search/log.h"
 #include "state/left_out.h"
 
@@ -20,11 +21,14 @@ using std::chrono::seconds;
 constexpr milliseconds BETWEEN_READINGS(20);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
 constexpr milliseconds RELOAD_AGAIN(500);
+constexpr milliseconds RELOAD_FAILED(1000);
 // For what no watch could be set on.
 constexpr seconds BETWEEN_LOOKS(60);
 constexpr seconds LONGEST_POOL_REST(60);
 // Files of all shares that are held open to be given out next.
 constexpr size_t MOST_READY = 256;
+// Of all shares' databases: a share's own caches could take as much.
+constexpr int64_t MOST_CACHED = int64_t{20} << 20;
 
 // The share's folders and what of them is wanted, to be compared.
 std::string FoldersText(const Settings& settings, const std::string& share) {
@@ -58,6 +62,7 @@ bool ContentLoop::Start(std::string& error) {
     return false;
   }
 
+  LimitCaches(MOST_CACHED);
   hints.everything = true;
   return true;
 }
@@ -144,12 +149,10 @@ void ContentLoop::Listen(Time now) {
     }
   }
 
-  if (std::exchange(hints.everything, false)) {
-    Reload();
-    next_reload = now + RELOAD_AGAIN;
-  } else if (now >= next_reload) {
-    Reload();
-    next_reload = Time::max();
+  const bool is_told = std::exchange(hints.everything, false);
+  if (is_told || now >= next_reload) {
+    const Time good = is_told ? now + RELOAD_AGAIN : Time::max();
+    next_reload = Reload() ? good : now + RELOAD_FAILED;
   }
   for (const std::string& name : std::exchange(hints.remade, {})) {
     const auto found = shares.find(name);
@@ -165,12 +168,13 @@ void ContentLoop::Listen(Time now) {
   }
 }
 
-void ContentLoop::Reload() {
-  permission.Look(*store);
+// False when something could not be read: it stays as it was.
+bool ContentLoop::Reload() {
+  const bool is_good = permission.Look(*store);
   std::shared_ptr<const Settings> settings;
   if (!store->GetSettings(settings)) {
     ServiceLog("%s", store->Error().c_str());
-    return;
+    return false;
   }
 
   watches.Set(*settings);
@@ -189,6 +193,7 @@ void ContentLoop::Reload() {
     }
     return is_gone;
   });
+  return is_good;
 }
 
 void ContentLoop::Follow(const Share& share, const std::string& folders,
@@ -207,7 +212,7 @@ void ContentLoop::Follow(const Share& share, const std::string& folders,
   }
   followed.folders = folders;
   followed.contents.Use(settings);
-  followed.contents.Set(share, status.no_space, status.retry_contents);
+  followed.contents.Set(share, status);
 }
 
 void ContentLoop::OpenPool(Time now) {
@@ -289,6 +294,7 @@ void ContentLoop::HandOut(Time now) {
 
   for (auto& [name, followed] : shares) {
     followed.contents.largest_batch = std::min(MOST_READY / busy, ShareContents::LARGEST_BATCH);
+    followed.contents.enough_pending = ContentsWriter::ENOUGH_PENDING / busy;
   }
   while (pool != nullptr && pool->Room() > 0 && HandOutOne(now)) {
   }

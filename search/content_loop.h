@@ -56,7 +56,7 @@ class ContentLoop {
   };
 
   void Listen(Time now);
-  void Reload();
+  bool Reload();
   void Follow(const Share& share, const std::string& folders,
               const std::shared_ptr<const Settings>& settings);
   void OpenPool(Time now);

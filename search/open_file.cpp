@@ -26,28 +26,6 @@ int OpenSeen(int seen) {
   return fd < 0 && errno == EPERM ? open(path.c_str(), FLAGS) : fd;
 }
 
-Opening OfError(int error, std::string& reason) {
-  switch (error) {
-    case ENOENT:
-    case ENOTDIR:
-    case ELOOP:
-    case ENAMETOOLONG:
-    case ESTALE:
-    case ENXIO:
-    case EAGAIN:  // somebody holds a lease on it
-      return Opening::CHANGED;
-    case EMFILE:
-    case ENFILE:
-    case ENOMEM:
-    case EINTR:
-      reason = strerror(error);  // NOLINT(concurrency-mt-unsafe): one thread
-      return Opening::LATER;
-    default:
-      reason = std::string("cannot be opened: ") + strerror(error);  // NOLINT: one thread
-      return Opening::REFUSED;
-  }
-}
-
 }  // namespace
 
 bool IsStill(int file, const FileIdentity& identity) {
@@ -62,11 +40,34 @@ bool IsStill(int file, const FileIdentity& identity) {
                       Nanoseconds(st.stx_mtime)} == identity;
 }
 
+// What the host or the disk may get over is no file's fault: a failure is on record for good.
+Opening OpeningOfError(int error, std::string& reason) {
+  switch (error) {
+    case ENOENT:
+    case ENOTDIR:
+    case ELOOP:
+    case ENAMETOOLONG:
+    case ESTALE:
+    case ENXIO:
+    case EAGAIN:  // somebody holds a lease on it
+      return Opening::CHANGED;
+    case EACCES:
+    case EPERM:
+    case EFBIG:
+    case EOVERFLOW:
+      reason = std::string("cannot be opened: ") + strerror(error);  // NOLINT: one thread
+      return Opening::REFUSED;
+    default:
+      reason = strerror(error);  // NOLINT(concurrency-mt-unsafe): one thread
+      return Opening::LATER;
+  }
+}
+
 Opening OpenFile(const Share& share, const std::string& path, const FileIdentity& identity,
                  ScopedFd& file, std::string& reason) {
   const ScopedFd seen(OpenInShare(share.path, path));
   if (seen.fd < 0) {
-    return OfError(errno, reason);
+    return OpeningOfError(errno, reason);
   }
   if (!IsStill(seen.fd, identity)) {
     return Opening::CHANGED;
@@ -74,7 +75,7 @@ Opening OpenFile(const Share& share, const std::string& path, const FileIdentity
 
   ScopedFd opened(OpenSeen(seen.fd));
   if (opened.fd < 0) {
-    return OfError(errno, reason);
+    return OpeningOfError(errno, reason);
   }
 
   file.Swap(opened);

@@ -14,7 +14,7 @@ enum class Opening {
   DONE,
   CHANGED,  // gone, behind a link, no regular file, or another one than the index knows
   REFUSED,  // the file's own fault: `reason`
-  LATER,    // the host's fault: `reason`
+  LATER,    // the host's or the disk's fault: `reason`
 };
 
 // Opens the file for reading. Nothing that is no regular file is ever opened, so that no pipe and
@@ -22,6 +22,9 @@ enum class Opening {
 // the reading leaves no trace in the file's times. `file` and `reason` are set as said.
 Opening OpenFile(const Share& share, const std::string& path, const FileIdentity& identity,
                  ScopedFd& file, std::string& reason);
+
+// Of an `errno` at the opening. `reason` as for OpenFile.
+Opening OpeningOfError(int error, std::string& reason);
 
 // Whether the open file still is what the index knows.
 bool IsStill(int file, const FileIdentity& identity);

@@ -28,16 +28,18 @@ bool IsReady(int fd) {
 
 }  // namespace
 
-void Permission::Look(StateStore& store) {
+bool Permission::Look(StateStore& store) {
   LookAtDaemon();
 
   int64_t resume_time = 0;
   if (!store.GetPause(resume_time)) {
     ServiceLog("%s", store.Error().c_str());
-    return;
+    resume.Close();  // what has come true once would be told of without end
+    return false;
   }
   paused = resume_time == 0 || resume_time > time(nullptr);
   AwaitResume(paused ? resume_time : 0);
+  return true;
 }
 
 void Permission::LookAtDaemon() {

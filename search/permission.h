@@ -17,8 +17,9 @@ namespace fileindexd {
 
 class Permission {
  public:
-  // Looks at the pid file and at the store. What cannot be read stays as it was.
-  void Look(StateStore& store);
+  // Looks at the pid file and at the store. What cannot be read stays as it was: false, and nobody
+  // tells when to look again.
+  bool Look(StateStore& store);
   bool MayWork() const { return daemon_end.fd >= 0 && !paused; }
 
   void AddPolled(std::vector<pollfd>& polled) const;

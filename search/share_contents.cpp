@@ -23,10 +23,10 @@ constexpr size_t SWEEP_ROWS = 500;
 // A busy daemon commits many times a second: one look serves them all.
 constexpr milliseconds BETWEEN_LOOKS(100);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
-constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000)};
+// A slow disk may take its time.
+constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000),
+                                        milliseconds(30000), milliseconds(120000)};
 constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
-// Bigger transactions cost memory and gain nothing.
-constexpr size_t COMMIT_BYTES = 8U << 20;
 constexpr milliseconds COMMIT_AGE(400);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
@@ -37,7 +37,7 @@ constexpr seconds LONGEST_REST(60);
 
 ShareContents::ShareContents(Share followed) : share(std::move(followed)) {}
 
-void ShareContents::Set(const Share& current, bool has_no_space, bool wants_retry) {
+void ShareContents::Set(const Share& current, const ShareStatus& status) {
   const bool is_other = current.path != share.path || current.filesystem != share.filesystem ||
                         current.language != share.language;
   if (is_other) {
@@ -45,13 +45,14 @@ void ShareContents::Set(const Share& current, bool has_no_space, bool wants_retr
     rest_until = Time();
   }
   share = current;
-  retry_wanted = wants_retry;
+  retry_wanted = status.retry_contents;
+  is_reindexing = status.needs_reindex || status.reindex_begun;
 
-  if (has_no_space != no_space) {
-    ServiceLog(
-        has_no_space ? "Share[%s] low on space, no contents are read" : "Share[%s] has space again",
-        share.name.c_str());
-    no_space = has_no_space;
+  if (status.no_space != no_space) {
+    ServiceLog(status.no_space ? "Share[%s] low on space, no contents are read"
+                               : "Share[%s] has space again",
+               share.name.c_str());
+    no_space = status.no_space;
     if (no_space) {
       Halt();
     }
@@ -79,8 +80,8 @@ bool ShareContents::CanWork(Time now) const {
 }
 
 bool ShareContents::IsIdle() const {
-  return !has_news && later_look == Time::max() && !look_at_all && !is_sweeping && !may_have_jobs &&
-         ready.empty() && running.empty() && !retry_wanted && !writer.HasChanges();
+  return !has_news && !look_at_all && !Sweeps() && !may_have_jobs && ready.empty() &&
+         running.empty() && !retry_wanted && !writer.HasChanges();
 }
 
 void ShareContents::Work(Time now, int64_t wall) {
@@ -90,6 +91,10 @@ void ShareContents::Work(Time now, int64_t wall) {
   if (now >= next_full_look) {
     look_at_all = true;
     next_full_look = now + BETWEEN_FULL_LOOKS;
+  }
+  if (now >= later_look) {
+    has_news = true;
+    later_look = Time::max();
   }
   if (!writer.IsOpen()) {
     if (is_missing || IsIdle()) {
@@ -152,10 +157,6 @@ bool ShareContents::TakeIn(Time now) {
     has_news = true;
     next_take_in = now;
   }
-  if (now >= later_look) {
-    has_news = true;
-    later_look = Time::max();
-  }
   if (!has_news || now < next_take_in) {
     return true;
   }
@@ -182,7 +183,7 @@ void ShareContents::LookLater(Time now) {
 }
 
 bool ShareContents::Sweep(int64_t wall) {
-  return !is_sweeping || writer.Sweep(wall, SWEEP_ROWS, is_sweeping);
+  return !Sweeps() || writer.Sweep(wall, SWEEP_ROWS, is_sweeping);
 }
 
 bool ShareContents::ReleasePatient(Time now) {
@@ -197,7 +198,7 @@ bool ShareContents::ReleasePatient(Time now) {
 }
 
 bool ShareContents::Flows() const {
-  return has_news || is_sweeping || may_have_jobs || !ready.empty() || !running.empty();
+  return has_news || Sweeps() || may_have_jobs || !ready.empty() || !running.empty();
 }
 
 // With nothing more to come, at once: somebody may be waiting for it.
@@ -208,7 +209,7 @@ bool ShareContents::CommitIfDue(Time now) {
   }
 
   first_change = first_change.value_or(now);
-  if (Flows() && writer.PendingBytes() < COMMIT_BYTES && now - *first_change < COMMIT_AGE) {
+  if (Flows() && writer.PendingBytes() < enough_pending && now - *first_change < COMMIT_AGE) {
     return true;
   }
   return Commit();
@@ -224,11 +225,16 @@ bool ShareContents::Commit() {
 }
 
 void ShareContents::CloseIfIdle(Time now) {
-  if (!IsIdle() || !patient.empty()) {
+  const bool is_short = later_look != Time::max() && later_look - now < CLOSE_AFTER;
+  if (!IsIdle() || !patient.empty() || is_short) {
     idle_since = now;
   } else if (now - idle_since >= CLOSE_AFTER) {
+    const Time look = later_look;
+    const bool sweep = is_sweeping;
     GoneOn();
     Forget();
+    later_look = look;
+    is_sweeping = sweep;
   }
 }
 
@@ -258,9 +264,9 @@ Time ShareContents::Due() const {
     return Time::max();
   }
   Time due = next_full_look;
-  const bool has_work = is_sweeping || look_at_all || retry_wanted;
+  const bool has_work = Sweeps() || look_at_all || retry_wanted;
   if (!writer.IsOpen()) {
-    due = !is_missing && (has_news || has_work) ? Time() : due;
+    due = is_missing ? due : has_news || has_work ? Time() : std::min(due, later_look);
     return std::max(due, rest_until);
   }
 

@@ -23,6 +23,7 @@
 #include "extract/pool.h"
 #include "index/contents_writer.h"
 #include "state/settings.h"
+#include "state/store.h"
 
 namespace fileindexd {
 
@@ -36,7 +37,7 @@ class ShareContents {
   // Settings in force: which kinds are wanted where. Folders that changed want LookAtAll.
   void Use(std::shared_ptr<const Settings> settings) { writer.UseSettings(std::move(settings)); }
   // What is known of the share from outside, as it is now.
-  void Set(const Share& current, bool has_no_space, bool wants_retry);
+  void Set(const Share& current, const ShareStatus& status);
   void EntriesChanged();
   // All entries are looked at again.
   void LookAtAll();
@@ -61,6 +62,8 @@ class ShareContents {
 
   Share share;
   size_t largest_batch = LARGEST_BATCH;  // files held open to be given out next
+  // Bytes of a transaction: words are collected in memory until its end.
+  size_t enough_pending = ContentsWriter::ENOUGH_PENDING;
 
   static constexpr size_t SMALLEST_BATCH = 4;
   static constexpr size_t LARGEST_BATCH = 64;
@@ -86,6 +89,7 @@ class ShareContents {
   bool CanWork(Time now) const;
   bool IsIdle() const;
   bool Flows() const;
+  bool Sweeps() const { return is_sweeping && !is_reindexing; }
   void Open(Time now);
   bool TakeIn(Time now);
   void LookLater(Time now);
@@ -114,6 +118,7 @@ class ShareContents {
   bool is_missing = false;  // there were no entries at the last opening
   bool is_sweeping = false;
   bool no_space = false;
+  bool is_reindexing = false;  // what has no entry may be about to get one
   bool retry_wanted = false;
   bool retried = false;
   bool may_have_jobs = false;

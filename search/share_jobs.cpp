@@ -60,11 +60,10 @@ bool ShareContents::Refill(Time now) {
   }
   AdaptBatch(now);
   std::vector<ContentJob> jobs;
-  if (!writer.NextJobs(batch, jobs)) {
+  if (!writer.NextJobs(batch, jobs, may_have_jobs)) {
     RestForError(now);
     return false;
   }
-  may_have_jobs = jobs.size() >= batch;
 
   root_suspect = false;
   for (ContentJob& job : jobs) {
@@ -115,7 +114,7 @@ void ShareContents::OpenJob(ContentJob&& job, Time now) {
       next.job = std::move(job);  // `path` with it
       return;
     }
-    outcome = opened == Opening::CHANGED ? outcome : opened;
+    outcome = std::max(outcome, opened);  // of all its names, the one that promises most
   }
 
   if (outcome == Opening::REFUSED) {
@@ -167,7 +166,6 @@ void ShareContents::End(ExtractOutcome&& outcome, Time now) {
   if (outcome.result == ExtractOutcome::Result::LOST || !is_still) {
     BePatient(file, now);
     good = writer.Release(file);
-    may_have_jobs = true;
   } else {
     patience.erase(file);
     switch (outcome.result) {
@@ -179,13 +177,14 @@ void ShareContents::End(ExtractOutcome&& outcome, Time now) {
         break;
       default:
         good = writer.Fail(file, outcome.reason, {}, true);
-        may_have_jobs = true;  // the first time
         break;
     }
   }
   if (!good || !CommitIfDue(now)) {
     RestForError(now);
+    return;
   }
+  may_have_jobs = true;  // it may wait again, or another have waited for its end
 }
 
 }  // namespace fileindexd

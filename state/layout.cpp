@@ -82,6 +82,10 @@ std::string DamagedIndexPath(const std::string& share_name) {
   return ShareFolder(share_name) + "/index.damaged";
 }
 
+std::string DamagedContentsPath(const std::string& share_name) {
+  return ShareFolder(share_name) + "/contents.damaged";
+}
+
 bool MakeStateRoot(std::string& error) {
   const std::string root = StateRoot();
   return MakeFolderAndParents(root, error) && MakeFolder(root + "/shares", error);

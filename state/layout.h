@@ -28,6 +28,7 @@ std::string DrainedPath(const std::string& share_name);
 std::string IndexPath(const std::string& share_name);
 std::string ContentsPath(const std::string& share_name);
 std::string DamagedIndexPath(const std::string& share_name);
+std::string DamagedContentsPath(const std::string& share_name);
 
 // Creates ROOT and ROOT/shares where they are missing, mode 0700 whatever the umask. False on
 // failure, and `error` then says what and why.

@@ -154,7 +154,8 @@ class FoldersTest(IndexTest):
     def check_nothing_left(self):
         share = f"{namespace.STATE}/shares/alpha"
         self.assertEqual(self.ctl("dump", "alpha").out, b"")
-        for name in ("index", "TALO@file_index_queue", "TALO@file_index_queue.tmp"):
+        for name in ("index", "contents", "index.damaged", "contents.damaged",
+                     "TALO@file_index_queue", "TALO@file_index_queue.tmp"):
             self.assertFalse(os.path.lexists(f"{share}/{name}"), name)
 
     def test_remove_of_the_last_while_running(self):
@@ -171,6 +172,8 @@ class FoldersTest(IndexTest):
     def test_remove_of_the_last_while_stopped(self):
         self.ctl("folder", "add", self.root)
         self.stop(self.start())
+        for name in ("index.damaged", "contents.damaged"):
+            os.mkdir(f"{namespace.STATE}/shares/alpha/{name}")
 
         self.ctl("folder", "remove", self.root)
 

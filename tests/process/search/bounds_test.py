@@ -9,6 +9,7 @@ from search.library import ContentsTest
 
 LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
 LARGE, SMALL = (500, 20000) if LONG else (40, 400)  # files; each large one beyond the text's cap
+SHARES = 6
 WORDS = "lighthouse keepers number their lamps "
 
 
@@ -34,6 +35,23 @@ class BoundsTest(ContentsTest):
         self.assertLess(len(os.listdir(f"/proc/{service}/fd")), 100)
         self.assertEqual(self.ctl("search", "--count", "lighthouse").out.strip().decode(),
                          str(LARGE + SMALL))
+
+    def test_many_shares_take_no_more_memory_than_one(self):
+        names = [f"share{number}" for number in range(SHARES)]
+        roots = [self.make_share(name, folders=()) for name in names]
+        for name, root in zip(names, roots):
+            for number in range(LARGE // 2):
+                text = "".join(f"{WORDS} {name}x{number}y{word} " for word in range(12000))
+                self.write(f"{root}/large{number}.txt", text)
+        self.start()
+        service = self.service_pid()
+        for root in roots:
+            self.ctl("folder", "add", root, "--document")
+
+        for name in names:
+            self.await_counts(name, done=LARGE // 2, waiting=0, failed=0)
+
+        self.assertLess(self.highest_memory(service), 64 * 1024)
 
 
 if __name__ == "__main__":

@@ -56,7 +56,7 @@ void ContentsTest::Sweep(int64_t now) {
 
 Names ContentsTest::Jobs(size_t limit) {
   std::vector<ContentJob> jobs;
-  EXPECT_TRUE(contents->NextJobs(limit, jobs)) << IndexErrorText(contents->Error());
+  EXPECT_TRUE(contents->NextJobs(limit, jobs, more_jobs)) << IndexErrorText(contents->Error());
   Names names;
   for (const ContentJob& job : jobs) {
     EXPECT_FALSE(job.paths.empty());

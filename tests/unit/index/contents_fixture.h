@@ -34,6 +34,7 @@ class ContentsTest : public IndexTest {
 
   std::unique_ptr<ContentsWriter> contents;
   std::map<std::string, ContentJob> handed;  // by name
+  bool more_jobs = false;                    // as the last Jobs was told
 };
 
 Content TextContent(const std::string& text);

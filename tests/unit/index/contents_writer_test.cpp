@@ -5,9 +5,14 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <functional>
+#include <utility>
 
+#include "base/scoped_fd.h"
 #include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/contents_fixture.h"
 
 namespace fileindexd {
@@ -33,6 +38,33 @@ class ContentsWriterTest : public ContentsTest {
     Add(name);
     Commit();
   }
+
+  // Writes over the first page of each of these tables or indexes of the entries.
+  void DamageEntries(const std::vector<std::string>& names) {
+    const std::string path = IndexPath("s") + "/entries.db";
+    std::vector<int64_t> pages;
+    {
+      IndexDatabase database;
+      ASSERT_EQ(database.OpenForWriting(IndexPath("s"), false), IndexError::NONE);
+      Statement page;
+      ASSERT_EQ(page.Prepare(database.db, "SELECT rootpage FROM sqlite_schema WHERE name = ?1"),
+                SQLITE_OK);
+      for (const std::string& name : names) {
+        page.BindText(1, name);
+        ASSERT_EQ(page.Step(), SQLITE_ROW) << name;
+        pages.push_back(page.Int(0));
+        page.Reset();
+      }
+      ASSERT_EQ(sqlite3_wal_checkpoint_v2(database.db, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr,
+                                          nullptr),
+                SQLITE_OK);
+    }
+    const ScopedFd file(open(path.c_str(), O_WRONLY | O_CLOEXEC));
+    const std::string garbage(4096, 'x');
+    for (const int64_t page : pages) {
+      ASSERT_EQ(pwrite(file.fd, garbage.data(), garbage.size(), (page - 1) * 4096), 4096);
+    }
+  }
 };
 
 TEST_F(ContentsWriterTest, WantedFilesWaitNewestAndSmallestFirst) {
@@ -48,6 +80,15 @@ TEST_F(ContentsWriterTest, WantedFilesWaitNewestAndSmallestFirst) {
   EXPECT_EQ(Jobs(), Names({"old.txt"}));
   EXPECT_EQ(Jobs(), Names());
   EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 3);
+}
+
+// Within a minute the size counts.
+TEST_F(ContentsWriterTest, SmallerFilesOfTheSameMinuteComeFirst) {
+  OldFile("big.txt", 6030, "many bytes");
+  OldFile("small.txt", 6000, "few");
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"small.txt", "big.txt"}));
 }
 
 TEST_F(ContentsWriterTest, ContentIsStoredOnce) {
@@ -103,6 +144,27 @@ TEST_F(ContentsWriterTest, RenameMoveLinkAndRebuildCostNoReading) {
   EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
 }
 
+TEST_F(ContentsWriterTest, LinkThatIsTakenAwayCostsNoReading) {
+  OldFile("a.txt", 1000);
+  MakeFolder(At("d"));
+  for (const char* name : {"b.txt", "d/c.txt"}) {
+    ASSERT_EQ(link(At("a.txt").c_str(), At(name).c_str()), 0);
+  }
+  AddAll();
+  TakeIn();
+  ASSERT_EQ(Read().size(), 1U);
+
+  for (const char* name : {"b.txt", "d"}) {
+    RemoveTree(At(name));
+    Delete(name);
+    Commit();
+    TakeIn();
+    AddAll();
+    TakeIn();
+    EXPECT_EQ(Jobs(), Names()) << name;
+  }
+}
+
 TEST_F(ContentsWriterTest, ChangedFileIsReadAnewAndItsOldContentIsGone) {
   File("a.txt");
   Jobs();
@@ -143,6 +205,93 @@ TEST_F(ContentsWriterTest, AddWithAnotherChangeTimeReadsAnewAnUpdateOnlyStoresIt
   TakeIn();
   EXPECT_EQ(Jobs(), Names());
   EXPECT_EQ(Holding("txt"), 0);
+}
+
+TEST_F(ContentsWriterTest, WriteThatIsHiddenBehindAChangeOfModeIsReadAnew) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+
+  WriteFile(At("a.txt"), "bytea");
+  SetTime(At("a.txt"), 1000);
+  Add("a.txt");
+  Commit();
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, WriteWhoseTimeIsSetBackBeforeAnybodyLooksIsReadAnew) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+
+  WriteFile(At("a.txt"), "bytea");
+  Add("a.txt");
+  Commit();
+  SetTime(At("a.txt"), 1000);
+  Refresh("a.txt");
+  Commit();
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, WriteIsReadOnceWhateverComesAfterwards) {
+  File("a.txt");
+  ASSERT_EQ(link(At("a.txt").c_str(), At("b.txt").c_str()), 0);
+  File("b.txt", "of either name");
+  Add("a.txt");
+  Commit();
+  TakeIn();
+  ASSERT_EQ(Read().size(), 1U);
+  const auto nothing_is_left = [this](const char* after) {
+    Commit();
+    TakeIn();
+    contents->LookAtAll();
+    TakeIn();
+    EXPECT_EQ(Jobs(), Names()) << after;
+  };
+
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  nothing_is_left("another mode");
+  ASSERT_EQ(rename(At("a.txt").c_str(), At("c.txt").c_str()), 0);
+  Delete("a.txt");
+  Add("c.txt");
+  nothing_is_left("another name");
+  AddAll();
+  nothing_is_left("a reindex");
+}
+
+// More rows than one slice takes, of which each tells of a write: none is missed.
+TEST_F(ContentsWriterTest, WritesAreSeenWhateverSliceTheyFallInto) {
+  constexpr int FILES = 10;
+  Names names;
+  for (int i = 0; i < FILES; ++i) {
+    names.push_back("f" + std::to_string(i) + ".txt");
+    OldFile(names.back(), 1000);
+  }
+  TakeIn();
+  ASSERT_EQ(Read().size(), names.size());
+  for (const std::string& name : names) {
+    WriteFile(At(name), "bytea");
+    SetTime(At(name), 1000);
+    Add(name);
+  }
+  for (const std::string& name : names) {
+    ASSERT_EQ(chmod(At(name).c_str(), 0640), 0);
+    Refresh(name);
+  }
+  Commit();
+
+  TakeIn();
+
+  EXPECT_EQ(Read().size(), names.size());
 }
 
 TEST_F(ContentsWriterTest, WhatEntriesDidWhileNobodyFollowedIsTakenIn) {
@@ -186,6 +335,21 @@ TEST_F(ContentsWriterTest, KindThatIsSwitchedOffIsDroppedAtOnce) {
   EXPECT_EQ(Differences(), Names()) << "for all others the entry is one that is not wanted";
 }
 
+TEST_F(ContentsWriterTest, SwitchedOffKindIsDroppedThoughItsFileChangedBefore) {
+  File("a.txt");
+  Read();
+  WriteFile(At("a.txt"), "other bytes");
+  wanted.document = false;
+  ASSERT_TRUE(store->SetFolder(root, wanted));
+  EXPECT_TRUE(writer->Refresh(At("a.txt"), wanted, {.document = true}));
+  Commit();
+
+  TakeIn();
+
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+}
+
 TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
   const auto use = [this](const ContentFlags& flags) {
     ASSERT_TRUE(store->SetFolder(root, flags));
@@ -210,6 +374,34 @@ TEST_F(ContentsWriterTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
 
   use({false, true, true, true});
   EXPECT_EQ(Holding("plain"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+  EXPECT_EQ(Jobs(), Names());
+}
+
+TEST_F(ContentsWriterTest, PartOfAnUnwantedKindIsNotKeptEither) {
+  const auto use = [this](const ContentFlags& flags) {
+    ASSERT_TRUE(store->SetFolder(root, flags));
+    std::shared_ptr<const Settings> in_force;
+    ASSERT_TRUE(store->GetSettings(in_force));
+    contents->UseSettings(in_force);
+    contents->LookAtAll();
+    TakeIn();
+  };
+  File("plain");
+  use({false, true, true, true});
+  Jobs();
+  ASSERT_TRUE(contents->Fail(JobOf("plain").file, "damaged", TextContent("half"), false));
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
+
+  use({true, true, true, true});
+  ASSERT_EQ(Jobs(), Names({"plain"})) << "wanted by now";
+  ASSERT_TRUE(contents->Fail(JobOf("plain").file, "damaged", TextContent("half"), false));
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Holding("half"), 1);
+
+  use({false, true, true, true});
+  EXPECT_EQ(Holding("half"), 0);
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
   EXPECT_EQ(Jobs(), Names());
 }
@@ -256,6 +448,25 @@ TEST_F(ContentsWriterTest, WhatComesBackWithinADayIsKept) {
   EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
 }
 
+TEST_F(ContentsWriterTest, PassesThatWereUndoneBeginAnew) {
+  File("a.txt");
+  Read();
+  ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
+  Delete("a.txt");
+  Commit();
+  contents->LookAtAll();
+  bool more = false;
+  ASSERT_TRUE(contents->TakeIn(100, more));
+  ASSERT_TRUE(contents->Sweep(NOW, 100, more));
+
+  contents->Close();  // nothing of it is on disk
+  ASSERT_EQ(contents->Open(TheShare(), 1), IndexError::NONE);
+  TakeIn();
+  Sweep(NOW);
+
+  EXPECT_EQ(Number("SELECT unreferred_since FROM files"), NOW);
+}
+
 TEST_F(ContentsWriterTest, WaitingFileWithoutAnEntryIsNotHandedOut) {
   File("a.txt");
   ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
@@ -266,6 +477,57 @@ TEST_F(ContentsWriterTest, WaitingFileWithoutAnEntryIsNotHandedOut) {
   EXPECT_TRUE(contents->Commit());
   EXPECT_EQ(Number("SELECT count(*) FROM files"), 0);
   EXPECT_EQ(Number("SELECT sum(waiting) FROM counts"), 0);
+}
+
+TEST_F(ContentsWriterTest, BehindManyFilesWithoutAnEntryOthersAreFound) {
+  constexpr int GONE = 1100;
+  for (int i = 0; i < GONE; ++i) {
+    WriteFile(At("gone" + std::to_string(i) + ".txt"), "bytes");
+  }
+  OldFile("a.txt", 1000);
+  AddAll();
+  TakeIn();
+  for (int i = 0; i < GONE; ++i) {
+    ASSERT_EQ(unlink(At("gone" + std::to_string(i) + ".txt").c_str()), 0);
+    Delete("gone" + std::to_string(i) + ".txt");
+  }
+  Commit();
+
+  Names found;
+  for (int round = 0; found.empty() && round < 10; ++round) {
+    found = Jobs(4);
+    EXPECT_TRUE(!found.empty() || more_jobs) << round;
+  }
+  EXPECT_EQ(found, Names({"a.txt"}));
+}
+
+TEST_F(ContentsWriterTest, RemovalsOfMuchTextAreSpreadOverTransactions) {
+  constexpr int FILES = 12;
+  std::string text;
+  while (text.size() < 1 << 20) {
+    text += "word ";
+  }
+  for (int i = 0; i < FILES; ++i) {
+    OldFile("f" + std::to_string(i) + ".txt", 1000);
+  }
+  TakeIn();
+  for (const std::string& name : Jobs()) {
+    Finish(name, text);
+  }
+  for (int i = 0; i < FILES; ++i) {
+    WriteFile(At("f" + std::to_string(i) + ".txt"), "other bytes");
+    Add("f" + std::to_string(i) + ".txt");
+  }
+  Commit();
+
+  int commits = 0;
+  for (bool more = true; more; ++commits) {
+    ASSERT_TRUE(contents->TakeIn(1000, more));
+    EXPECT_LE(contents->PendingBytes(), ContentsWriter::ENOUGH_PENDING + 2 * text.size());
+    ASSERT_TRUE(contents->Commit());
+  }
+  EXPECT_GE(commits, 3);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
 }
 
 TEST_F(ContentsWriterTest, SecondDeathIsTheLast) {
@@ -321,17 +583,57 @@ TEST_F(ContentsWriterTest, ReleasedFilesWaitAgainBehindTheOthers) {
 }
 
 // A service that is killed: the writer goes without a word.
-TEST_F(ContentsWriterTest, OfManyThatWereInFlightAtADeathNoneIsGuilty) {
-  File("a.txt");
-  File("b.txt");
-  for (int round = 0; round < 5; ++round) {
-    ASSERT_EQ(Jobs().size(), 2U) << round;
+TEST_F(ContentsWriterTest, OfManyThatWereInFlightAtTwoDeathsNoneIsGuiltyAndEachIsTriedAlone) {
+  OldFile("a.txt", 3000);
+  OldFile("b.txt", 2000);
+  TakeIn();
+  for (int round = 0; round < 2; ++round) {
+    ASSERT_EQ(Jobs(), Names({"a.txt", "b.txt"})) << round;
     ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file, JobOf("b.txt").file}));
     OpenContents();
   }
+  OldFile("c.txt", 1000);
+  TakeIn();
 
-  EXPECT_EQ(Jobs().size(), 2U);
-  EXPECT_GT(JobOf("a.txt").tries, 0) << "best tried alone";
+  ASSERT_EQ(Jobs(), Names({"c.txt"}));
+  Finish("c.txt", "c");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+  OldFile("d.txt", 500);
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names()) << "beside a suspect";
+  Finish("a.txt", "a");
+  ASSERT_EQ(Jobs(), Names({"d.txt"}));
+  Finish("d.txt", "d");
+  EXPECT_EQ(Jobs(), Names({"b.txt"}));
+}
+
+// Others come without end, and one file ends the service each time that it is read.
+TEST_F(ContentsWriterTest, WhoEndsTheServiceIsFoundAmongOthers) {
+  OldFile("a.txt", 3000);
+  OldFile("killer.txt", 4000);
+  TakeIn();
+  for (int deaths = 0; deaths < 5; ++deaths) {
+    OldFile("n" + std::to_string(deaths) + ".txt", 5000 + deaths);
+    TakeIn();
+    for (Names names = Jobs(); !names.empty(); names = Jobs()) {
+      std::vector<int64_t> files;
+      for (const std::string& name : names) {
+        files.push_back(JobOf(name).file);
+      }
+      ASSERT_TRUE(contents->BeginTries(files));
+      if (std::count(names.begin(), names.end(), "killer.txt") != 0) {
+        break;
+      }
+      for (const std::string& name : names) {
+        Finish(name, name);
+      }
+    }
+    OpenContents();
+  }
+
+  EXPECT_EQ(Number("SELECT state FROM files WHERE mtime = 4000000000000"), 3);
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 3"), 1);
 }
 
 TEST_F(ContentsWriterTest, WhoWasAloneInFlightAtFiveDeathsIsGuilty) {
@@ -350,14 +652,13 @@ TEST_F(ContentsWriterTest, WhoIsJoinedByAnotherIsNotAlone) {
   OldFile("a.txt", 3000);
   OldFile("b.txt", 2000);
   TakeIn();
-  for (int round = 0; round < 2; ++round) {
-    Jobs();
-    ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
-    ASSERT_TRUE(contents->BeginTries({JobOf("b.txt").file}));
-    OpenContents();
-  }
+  Jobs();
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+  ASSERT_EQ(Number("SELECT begun FROM files WHERE mtime = 3000000000000"), 1);
 
-  EXPECT_EQ(Jobs().size(), 2U);
+  ASSERT_TRUE(contents->BeginTries({JobOf("b.txt").file}));
+
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE begun = 2"), 2);
 }
 
 TEST_F(ContentsWriterTest, ClosingTakesBackWhatIsInFlight) {
@@ -422,6 +723,39 @@ TEST_F(ContentsWriterTest, DamagedContentsAreSetAsideAndMadeAnew) {
   TakeIn();
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
   EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+}
+
+// Every question that the writer asks of the entries meets a page that is not whole.
+TEST_F(ContentsWriterTest, DamagedEntriesTakeNothingFromTheContents) {
+  File("a.txt");
+  Read();
+  File("b.txt");
+  writer.reset();
+  DamageEntries({"entries", "entries_by_inode", "entries_wanted"});
+  bool more = false;
+  std::vector<ContentJob> jobs;
+  const std::pair<const char*, std::function<bool()>> steps[] = {
+      {"TakeIn",
+       [&] {
+         contents->LookAtAll();
+         return contents->TakeIn(10, more);
+       }},
+      {"Sweep",
+       [&] {
+         contents->LookAtAll();
+         return contents->Sweep(NOW, 10, more);
+       }},
+      {"NextJobs", [&] { return contents->NextJobs(10, jobs, more); }},
+  };
+  for (const auto& [name, step] : steps) {
+    OpenContents();
+    EXPECT_FALSE(step()) << name;
+    EXPECT_EQ(contents->Error(), IndexError::DAMAGED) << name;
+  }
+
+  OpenContents();
+  EXPECT_EQ(Holding("txt"), 1);
+  EXPECT_NE(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
 }
 
 TEST_F(ContentsWriterTest, FilesAreTheOwnersAlone) {

@@ -2,10 +2,14 @@
 #include "search/open_file.h"
 
 #include <fcntl.h>
+#include <sys/inotify.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <filesystem>
+#include <utility>
+#include <vector>
 
 #include "tests/unit/search/scripted.h"
 #include "tests/unit/state/fixture.h"
@@ -23,6 +27,19 @@ class OpenFileTest : public StateTest {
   void Know(const std::string& known) { identity = IdentityOf(known); }
   Opening Open(const std::string& asked) {
     return OpenFile({"a", folder, ""}, asked, identity, file, reason);
+  }
+
+  // That were opened since the last call.
+  static std::vector<std::string> NamesOpened(int watch) {
+    std::vector<std::string> names;
+    alignas(inotify_event) char events[4096];
+    const ssize_t length = read(watch, events, sizeof(events));
+    for (ssize_t at = 0; at < length;) {
+      const auto* event = reinterpret_cast<const inotify_event*>(events + at);
+      names.emplace_back(event->len != 0 ? event->name : "");
+      at += static_cast<ssize_t>(sizeof(inotify_event) + event->len);
+    }
+    return names;
   }
 
   std::string path;
@@ -58,10 +75,31 @@ TEST_F(OpenFileTest, APipeUnderADocumentsNameIsNotOpened) {
   const std::string pipe = folder + "/pipe.txt";
   ASSERT_EQ(mkfifo(pipe.c_str(), 0600), 0);
   Know(pipe);
+  const ScopedFd watch(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
+  ASSERT_GE(inotify_add_watch(watch.fd, folder.c_str(), IN_OPEN), 0);
 
   EXPECT_EQ(Open(pipe), Opening::CHANGED);
-  // Nobody reads: had it been opened, a writer would find a reader now.
-  EXPECT_LT(open(pipe.c_str(), O_WRONLY | O_NONBLOCK | O_CLOEXEC), 0);
+  EXPECT_EQ(NamesOpened(watch.fd), std::vector<std::string>());
+
+  const ScopedFd opened(open(pipe.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  EXPECT_EQ(NamesOpened(watch.fd), std::vector<std::string>{"pipe.txt"});  // it would be told
+}
+
+TEST_F(OpenFileTest, OnlyWhatTheFileIsToBlameForIsRefused) {
+  const std::pair<Opening, std::vector<int>> cases[] = {
+      {Opening::REFUSED, {EACCES, EPERM, EFBIG, EOVERFLOW}},
+      {Opening::CHANGED, {ENOENT, ENOTDIR, ELOOP, ENAMETOOLONG, ESTALE, ENXIO, EAGAIN}},
+      {Opening::LATER,
+       {EIO, ENOTCONN, ETIMEDOUT, EHOSTDOWN, EHOSTUNREACH, ENODEV, ENOMEM, EMFILE, ENFILE, EINTR,
+        ECONNREFUSED, EKEYEXPIRED, EREMOTEIO, EUCLEAN}},
+  };
+  for (const auto& [opening, errors] : cases) {
+    for (const int error : errors) {
+      reason.clear();
+      EXPECT_EQ(OpeningOfError(error, reason), opening) << error;
+      EXPECT_EQ(reason.empty(), opening == Opening::CHANGED) << error;
+    }
+  }
 }
 
 TEST_F(OpenFileTest, LinksAreNotFollowed) {

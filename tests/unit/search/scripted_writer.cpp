@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <set>
+#include <utility>
 
 #include "tests/unit/search/scripted.h"
 
@@ -110,7 +111,11 @@ void ContentsWriter::LookAtAll() {
   (void)impl->Call("LookAtAll");
 }
 
-bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
+bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more) {
+  more = std::exchange(impl->contents->unseen, false);
+  if (more) {
+    return true;  // as if all that was looked at had no entry any more
+  }
   if (!impl->Call("NextJobs", std::to_string(limit))) {
     return false;
   }
@@ -121,6 +126,7 @@ bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs) {
       jobs.back().file = row;
     }
   }
+  more = jobs.size() >= limit;
   return true;
 }
 

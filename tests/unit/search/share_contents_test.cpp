@@ -50,14 +50,16 @@ class ShareContentsTest : public StateTest {
     now += time;
     Settle();
   }
-  // Until what may have been told of too early would have been seen.
-  void Quieten() {
-    for (int second = 0; second < 10; ++second) {
+  // Second by second, with nothing to read.
+  void Wait(int seconds_long) {
+    for (int second = 0; second < seconds_long; ++second) {
       Pass(seconds(1));
       EXPECT_THAT(GiveOut(), IsEmpty());
     }
     Settle();
   }
+  // Until what may have been told of too early would have been seen.
+  void Quieten() { Wait(180); }
   // The rows that are given out.
   std::vector<uint64_t> GiveOut(size_t most = 100) {
     std::vector<uint64_t> ids;
@@ -271,6 +273,28 @@ TEST_F(ShareContentsTest, AFailureAtAnyCallLosesNothing) {
   }
 }
 
+TEST_F(ShareContentsTest, ItAsksAgainWhileMoreMayWait) {
+  AddFile(1);
+  Scripted().unseen = true;
+  Settle();
+  EXPECT_THAT(GiveOut(), IsEmpty());
+
+  EXPECT_TRUE(contents.MayHaveJobs(now));
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, AnEndMayLetAnotherFileGo) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  ASSERT_FALSE(contents.MayHaveJobs(now));
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+
+  EXPECT_TRUE(contents.MayHaveJobs(now));
+}
+
 TEST_F(ShareContentsTest, WithoutEntriesItWaitsForThem) {
   AddFile(1);
   Scripted().failing["Open"] = IndexError::PATH_NOT_FOUND;
@@ -303,12 +327,12 @@ TEST_F(ShareContentsTest, AShareLowOnSpaceGetsNoContents) {
   const auto ids = GiveOut();
   ASSERT_EQ(ids.size(), 1U);
 
-  contents.Set(contents.share, true, false);
+  contents.Set(contents.share, {.no_space = true});
   End(ids[0], ExtractOutcome::Result::DONE);
   EXPECT_EQ(contents.Due(), Time::max());
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
 
-  contents.Set(contents.share, false, false);
+  contents.Set(contents.share, {});
   Settle();
   EXPECT_EQ(GiveOut().size(), 1U);
 }
@@ -321,7 +345,7 @@ TEST_F(ShareContentsTest, AWishToRetryIsFulfilledOnce) {
   EXPECT_THAT(GiveOut(), IsEmpty());
   EXPECT_FALSE(contents.TakeRetried());
 
-  contents.Set(contents.share, false, true);
+  contents.Set(contents.share, {.retry_contents = true});
   Settle();
 
   EXPECT_TRUE(contents.TakeRetried());
@@ -354,15 +378,42 @@ TEST_F(ShareContentsTest, AllIsLookedAtOnceADay) {
 TEST_F(ShareContentsTest, WithNothingToDoItClosesAndSleeps) {
   Settle();
   EXPECT_THAT(GiveOut(), IsEmpty());
+  Wait(20);
+  EXPECT_EQ(Count("Close"), 1U);  // though it looks once more later
   Quieten();
-  Pass(seconds(11));
 
-  EXPECT_EQ(Count("Close"), 1U);
   EXPECT_GT(contents.Due() - now, std::chrono::hours(20));
+  const size_t opened = Count("Open");
   contents.EntriesChanged();
   Settle();
-  EXPECT_EQ(Count("Open"), 2U);
+  EXPECT_GT(Count("Open"), opened);
   EXPECT_EQ(Count("LookAtAll"), 1U);
+}
+
+TEST_F(ShareContentsTest, ACommitThatTheDiskTakesLongForIsSeen) {
+  Settle();
+  Wait(20);
+  AddFile(1);  // the commit's end, which nothing tells of
+
+  Pass(seconds(20));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, NothingIsSweptWhileTheEntriesAreMadeAnew) {
+  for (const ShareStatus& status :
+       {ShareStatus{.needs_reindex = true}, ShareStatus{.reindex_begun = true}}) {
+    contents.Set(contents.share, status);
+    contents.EntriesChanged();
+    Pass(seconds(1));
+    EXPECT_EQ(Count("Sweep"), 0U);
+  }
+  EXPECT_GT(contents.Due(), now);
+
+  contents.Set(contents.share, {});
+  Settle();
+
+  EXPECT_GT(Count("Sweep"), 0U);
 }
 
 TEST_F(ShareContentsTest, QuickFilesAreGivenOutInLargerBatches) {

@@ -1,0 +1,166 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Words of contents: made anew from what is stored, and counted.
+#include <unistd.h>
+
+#include <ctime>
+
+#include "index/contents_reader.h"
+#include "index/contents_schema.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
+#include "tests/unit/index/contents_fixture.h"
+
+namespace fileindexd {
+
+class ContentsWordsTest : public ContentsTest {
+ protected:
+  ContentCounts Counts() {
+    ContentsReader reader;
+    EXPECT_EQ(reader.Open("s"), IndexError::NONE);
+    ContentCounts counts;
+    EXPECT_TRUE(reader.Count(counts));
+    return counts;
+  }
+  // With the contents closed.
+  void Change(const char* sql) {
+    contents.reset();
+    IndexDatabase database;
+    ASSERT_EQ(database.OpenForWriting(ContentsPath("s"), false, CONTENTS_FORM), IndexError::NONE);
+    ASSERT_EQ(sqlite3_exec(database.db, sql, nullptr, nullptr, nullptr), SQLITE_OK)
+        << sqlite3_errmsg(database.db);
+  }
+};
+
+TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndWhatIsNewIsFoundMeanwhile) {
+  std::string text;
+  while (text.size() < 700000) {
+    text += "houses ";
+  }
+  for (const char* name : {"a.txt", "b.txt", "c.txt", "d.txt"}) {
+    File(name);
+    Jobs();
+    Finish(name, text + name);
+  }
+  ASSERT_TRUE(store->SetShareLanguage("s", "german")) << store->Error();
+  OpenContents();
+  EXPECT_EQ(Holding("houses"), 0);
+
+  bool more = false;
+  ASSERT_TRUE(contents->TakeIn(100, more));
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_TRUE(more);
+  const int64_t held = Holding("houses");
+  EXPECT_GT(held, 0);
+  EXPECT_LT(held, 4);
+  WriteFile(At("new.txt"), "bytes");
+  WriteFile(At("d.txt"), "other bytes");
+  Add("new.txt");
+  Add("d.txt");
+  Commit();
+  ASSERT_TRUE(contents->TakeIn(100, more));
+  Jobs();
+  Finish("new.txt", "fresh");
+  EXPECT_EQ(Holding("fresh"), 1);
+  Finish("d.txt", "anew");
+
+  TakeIn();
+  EXPECT_EQ(Holding("houses"), 3);
+  EXPECT_EQ(Holding("fresh"), 1);
+  EXPECT_EQ(Holding("anew"), 1);
+  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 5);
+  File("new.txt", "gone");
+  EXPECT_EQ(Holding("fresh"), 0);
+}
+
+TEST_F(ContentsWordsTest, WordsAreMadeAnewOnceForALanguageThatIsNotKnown) {
+  File("a.txt");
+  Read();
+  for (const char* sql : {"UPDATE meta SET words_version = 'another'",
+                          "UPDATE meta SET reworded = 0", "UPDATE meta SET language = 'klingon'"}) {
+    Change(sql);
+    OpenContents();
+    TakeIn();
+    EXPECT_EQ(Holding("txt"), 1) << sql;
+  }
+
+  ASSERT_TRUE(store->SetShareLanguage("s", "klingon")) << store->Error();
+  OpenContents();
+  TakeIn();
+  OpenContents();
+  EXPECT_EQ(Number("SELECT reworded = 9223372036854775807 FROM meta"), 1);
+  EXPECT_EQ(Holding("txt"), 1);
+}
+
+TEST_F(ContentsWordsTest, ContentsWithoutWordsAreDamaged) {
+  File("a.txt");
+  Read();
+  Change("DROP TABLE words");
+
+  OpenContents();
+  TakeIn();
+
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+}
+
+TEST_F(ContentsWordsTest, YearAndTrackAreWords) {
+  File("a.mp3");
+  File("b.mp3");
+  Jobs();
+  for (const char* name : {"a.mp3", "b.mp3"}) {
+    Content song = TextContent("");
+    song.kind = Kind::AUDIO;
+    song.texts = {{ContentField::TITLE, name}};
+    song.numbers = {
+        {ContentField::YEAR, 1999}, {ContentField::TRACK, 17}, {ContentField::DURATION, 3}};
+    ASSERT_TRUE(contents->Finish(JobOf(name).file, song));
+  }
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Holding("1999"), 2);
+  EXPECT_EQ(Holding("17"), 2);
+  EXPECT_EQ(Holding("3"), 0);
+
+  Content content;
+  std::string state;
+  std::string reason;
+  ContentsReader reader;
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  ASSERT_TRUE(reader.Find(ContentsTest::Find("a.mp3"), content, state, reason));
+  EXPECT_EQ(content.numbers.size(), 3U);
+  EXPECT_EQ(content.texts.size(), 1U);
+
+  File("a.mp3", "other bytes");
+  EXPECT_EQ(Holding("1999"), 1) << "words go as they came";
+}
+
+TEST_F(ContentsWordsTest, WhatIsNotTakenInWaitsAndWhatIsGoneHasNotFailed) {
+  File("a.txt");
+  File("b.txt");
+  Read();
+  File("c.txt");
+  Jobs();
+  ASSERT_TRUE(contents->Fail(JobOf("c.txt").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Counts().all.failed, 1U);
+  EXPECT_EQ(Counts().all.waiting, 0U);
+  EXPECT_EQ(Number("SELECT tries FROM files WHERE state = 2"), 1);
+
+  ASSERT_EQ(rename(At("a.txt").c_str(), At("e.txt").c_str()), 0);
+  ASSERT_EQ(unlink(At("c.txt").c_str()), 0);
+  WriteFile(At("d.mp3"), "bytes");
+  for (const char* name : {"a.txt", "c.txt"}) {
+    Delete(name);
+  }
+  Add("e.txt");
+  Add("d.mp3");
+  Commit();
+
+  const ContentCounts counts = Counts();
+  EXPECT_EQ(counts.all.failed, 0U);
+  EXPECT_EQ(counts.all.waiting, 1U) << "what was renamed is known";
+  EXPECT_EQ(counts.kinds[static_cast<size_t>(Kind::AUDIO)].waiting, 1U);
+  TakeIn();
+  EXPECT_EQ(Counts().all.waiting, 1U);
+}
+
+}  // namespace fileindexd
