@@ -21,7 +21,7 @@ import time
 
 import contents_corpus
 import slow_document
-from machine import Log, Machine, row, wait
+from machine import Log, Machine, look_until, row, wait
 
 DIVISOR = int(sys.argv[1])
 PROGRAMS = sys.argv[2]
@@ -30,7 +30,8 @@ ROUNDS = 3 if DIVISOR < 10 else 1
 NEW_FILES = max(200 // DIVISOR, 20)
 QUICK_FILES = 100
 SLOW_SECONDS = 30 if DIVISOR < 10 else 3
-BETWEEN_LOOKS = 0.05  # seconds, where a whole tree is waited for: looks take time from others
+SHORT_REST = 0.001  # seconds between two looks
+LONG_REST = 0.05    # where a whole tree is waited for: looks take time from others
 MANUALS = contents_corpus.SUFFIXES["manual"]
 TRACKER = "/usr/libexec/tracker-miner-fs-3"
 TRACKER_EXTRACT = "/usr/libexec/tracker-extract-3"  # which the session's bus starts
@@ -65,7 +66,7 @@ class ContentMachine(Machine):
         return self.ask("SELECT sum(done) FROM counts") or 0
 
     def await_done(self, count):
-        wait(lambda: self.done() >= count, self.contents, rest=BETWEEN_LOOKS)
+        look_until(lambda: self.done() >= count, LONG_REST)
 
     def has_read(self, inode):
         return self.ask("SELECT count(*) FROM files WHERE inode = ? AND state = ?", inode, DONE)
@@ -243,7 +244,7 @@ def one_new_text(machine):
         began = time.monotonic()
         wait(lambda path=path: machine.found(path), machine.index)
         names.append(time.monotonic() - began)
-        wait(lambda inode=inode: machine.has_read(inode), machine.contents)
+        look_until(lambda inode=inode: machine.has_read(inode), SHORT_REST)
         contents.append(time.monotonic() - began)
         machine.await_quiet()
     last = machine.ctl("search", "--share", "bench", "--count", f"newtext{NEW_FILES - 1}")
@@ -258,7 +259,7 @@ def quick_ones(machine, name):
     began = time.monotonic()
     for number in range(QUICK_FILES):
         write(f"{machine.root}/{name}{number}.txt", f"{name} " + "some other words " * 200)
-    wait(lambda: machine.done() >= before + QUICK_FILES, machine.contents)
+    look_until(lambda: machine.done() >= before + QUICK_FILES, SHORT_REST)
     return time.monotonic() - began
 
 
@@ -269,11 +270,11 @@ def beside_a_slow_one(machine, repeats, number):
     with open(path, "wb") as file:
         file.write(slow_document.document(f"slowtext{number}", repeats))
         inode = os.fstat(file.fileno()).st_ino
-    wait(lambda: machine.has_begun(inode), machine.contents)
+    look_until(lambda: machine.has_begun(inode), SHORT_REST)
     seconds = quick_ones(machine, f"beside{number}")
     if machine.has_read(inode):
         raise AssertionError("the slow document was too quick")
-    wait(lambda: machine.has_read(inode), machine.contents)
+    look_until(lambda: machine.has_read(inode), LONG_REST)
     took = time.monotonic() - began
     found = machine.ctl("search", "--share", "bench", "--count", f"slowtext{number}")
     check(int(found), 1, "we")

@@ -1,7 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """The programs under measurement on a state folder of their own, and the rows of the table.
 
-Everything waits for events in folders, and looks again after each.
+Where there are events to wait for, that is what is done.
 """
 
 import ctypes
@@ -24,8 +24,8 @@ def row(name, ours, reference, target, unit=1e3, text="ms"):
     print(f"{name:<52} {ours * unit:>9.2f} {text} {shown:>12} {ratio:>8} {target:>8}", flush=True)
 
 
-def wait(condition, *folders, rest=0):
-    """Until the condition holds; looked at after each change in a folder, `rest` seconds later."""
+def wait(condition, *folders):
+    """Until the condition holds; looked at after each change in a folder."""
     deadline = time.monotonic() + LIMIT
     fd = libc.inotify_init1(0o2000000)
     for folder in folders:
@@ -34,10 +34,19 @@ def wait(condition, *folders, rest=0):
         while not condition():
             if not select.select([fd], [], [], deadline - time.monotonic())[0]:
                 raise TimeoutError(folders)
-            time.sleep(rest)
-            os.read(fd, 1 << 20)
+            os.read(fd, 65536)
     finally:
         os.close(fd)
+
+
+def look_until(condition, between):
+    """Until the condition holds, with so many seconds between two looks. For a database that is kept
+    open by who writes it: its files change for the last time before the change can be seen."""
+    deadline = time.monotonic() + LIMIT
+    while not condition():
+        if time.monotonic() > deadline:
+            raise TimeoutError
+        time.sleep(between)
 
 
 class Log:

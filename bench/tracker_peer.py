@@ -17,7 +17,7 @@ import sys
 import time
 from urllib.parse import quote
 
-from machine import wait
+from machine import look_until, wait
 
 FOLDER = os.path.realpath(sys.argv[1])
 HOME = f"{FOLDER}/home"
@@ -103,7 +103,7 @@ def names(rounds):
 def tree_of_texts(tree, documents):
     began = time.monotonic()
     with miner(tree):
-        wait(lambda: texts() >= documents, CACHE, rest=BETWEEN_COUNTS)
+        look_until(lambda: texts() >= documents, BETWEEN_COUNTS)
         print(time.monotonic() - began, flush=True)
 
 
