@@ -81,7 +81,7 @@ class Machine:
     def ctl(self, *arguments):
         return subprocess.run(
             [f"{self.programs}/fileindexctl", *arguments],
-            env=self.env, check=True, capture_output=True,
+            env=self.env, check=True, stdout=subprocess.PIPE,
         ).stdout
 
     def start_daemon(self):

@@ -28,6 +28,8 @@ constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
 // Bigger transactions cost memory and gain nothing.
 constexpr size_t COMMIT_BYTES = 8U << 20;
 constexpr milliseconds COMMIT_AGE(400);
+// What is still being read after that time is slow, and what was read beside it does not wait.
+constexpr milliseconds LULL(20);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
 constexpr seconds SHORTEST_REST(1);
@@ -196,11 +198,18 @@ bool ShareContents::ReleasePatient(Time now) {
   return true;
 }
 
-bool ShareContents::Flows() const {
-  return has_news || is_sweeping || may_have_jobs || !ready.empty() || !running.empty();
+// With nothing more to come, at once: somebody may be waiting for it.
+Time ShareContents::CommitDue() const {
+  if (!first_change) {
+    return Time();
+  }
+  const Time latest = *first_change + COMMIT_AGE;
+  if (has_news || is_sweeping || may_have_jobs || !ready.empty()) {
+    return latest;
+  }
+  return running.empty() ? Time() : std::min(latest, last_end + LULL);
 }
 
-// With nothing more to come, at once: somebody may be waiting for it.
 bool ShareContents::CommitIfDue(Time now) {
   if (!writer.HasChanges()) {
     first_change.reset();
@@ -208,7 +217,7 @@ bool ShareContents::CommitIfDue(Time now) {
   }
 
   first_change = first_change.value_or(now);
-  if (Flows() && writer.PendingBytes() < COMMIT_BYTES && now - *first_change < COMMIT_AGE) {
+  if (writer.PendingBytes() < COMMIT_BYTES && now < CommitDue()) {
     return true;
   }
   return Commit();
@@ -275,7 +284,7 @@ Time ShareContents::Due() const {
     due = std::min(due, patient.begin()->first);
   }
   if (writer.HasChanges()) {
-    due = std::min(due, first_change && Flows() ? *first_change + COMMIT_AGE : Time());
+    due = std::min(due, CommitDue());
   }
   return std::min(due, IsIdle() ? idle_since + CLOSE_AFTER : Time::max());
 }

@@ -85,7 +85,7 @@ class ShareContents {
   bool IsResting(Time now) const { return now < rest_until; }
   bool CanWork(Time now) const;
   bool IsIdle() const;
-  bool Flows() const;
+  Time CommitDue() const;
   void Open(Time now);
   bool TakeIn(Time now);
   void LookLater(Time now);
@@ -123,6 +123,7 @@ class ShareContents {
   Time next_full_look = Time::max();
   Time idle_since;
   std::optional<Time> first_change;  // that is not committed
+  Time last_end;                     // of a file that was given out
 
   Time rest_until;
   std::chrono::seconds rest{0};  // the last one; 0: all was well since

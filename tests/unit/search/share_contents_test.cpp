@@ -124,6 +124,21 @@ TEST_F(ShareContentsTest, WhileWorkFlowsResultsAreCommittedAfterHalfASecondAtMos
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
 }
 
+TEST_F(ShareContentsTest, WhatWasReadBesideASlowFileDoesNotWaitForIt) {
+  AddFile(1);
+  AddFile(2);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 2U);
+  Quieten();
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+  Pass(milliseconds(50));
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+  EXPECT_EQ(Kept(2).state, ScriptedFile::State::WAITS);
+}
+
 TEST_F(ShareContentsTest, MuchTextIsCommittedAtOnce) {
   AddFile(1);
   AddFile(2);
