@@ -20,8 +20,10 @@ using std::chrono::seconds;
 // Rows of one slice: some milliseconds.
 constexpr size_t TAKE_IN_ROWS = 1000;
 constexpr size_t SWEEP_ROWS = 500;
-// A busy daemon commits many times a second: one look serves them all.
-constexpr milliseconds BETWEEN_LOOKS(100);
+// A busy daemon commits many times a second, and some of its commits take long: looks become rarer,
+// from one to the next, until it closes the entries.
+constexpr milliseconds SHORTEST_BETWEEN_LOOKS(2);
+constexpr milliseconds LONGEST_BETWEEN_LOOKS(100);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
 constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000)};
 constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
@@ -64,6 +66,15 @@ void ShareContents::EntriesChanged() {
   has_news = true;
   later_looks = 0;
   is_missing = false;
+}
+
+// Nothing is opened for it, or our own closing would keep us awake for ever.
+void ShareContents::EntriesClosed() {
+  if (writer.IsOpen()) {
+    has_news = true;
+    between_looks = milliseconds(0);
+    next_take_in = std::min(next_take_in, taken_in + SHORTEST_BETWEEN_LOOKS);
+  }
 }
 
 void ShareContents::LookAtAll() {
@@ -170,7 +181,9 @@ bool ShareContents::TakeIn(Time now) {
   has_news = more;
   if (!more) {
     is_sweeping = true;
-    next_take_in = now + BETWEEN_LOOKS;
+    taken_in = now;
+    between_looks = std::clamp(2 * between_looks, SHORTEST_BETWEEN_LOOKS, LONGEST_BETWEEN_LOOKS);
+    next_take_in = now + between_looks;
     LookLater(now);
   }
   return true;

@@ -38,6 +38,8 @@ class ShareContents {
   // What is known of the share from outside, as it is now.
   void Set(const Share& current, bool has_no_space, bool wants_retry);
   void EntriesChanged();
+  // Whoever wrote to them is done with it: what EntriesChanged told of can be seen now.
+  void EntriesClosed();
   // All entries are looked at again.
   void LookAtAll();
   // The databases' files came or went: what is open may be of no use.
@@ -118,8 +120,10 @@ class ShareContents {
   bool retried = false;
   bool may_have_jobs = false;
   Time next_take_in;
-  Time later_look = Time::max();  // for what was told of before it could be seen
-  size_t later_looks = 0;         // since the last news
+  Time taken_in;                               // the last time
+  std::chrono::milliseconds between_looks{0};  // that find nothing
+  Time later_look = Time::max();               // for what was told of before it could be seen
+  size_t later_looks = 0;                      // since the last news
   Time next_full_look = Time::max();
   Time idle_since;
   std::optional<Time> first_change;  // that is not committed

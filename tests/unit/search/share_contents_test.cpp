@@ -355,6 +355,29 @@ TEST_F(ShareContentsTest, WhatIsToldOfBeforeItCountsIsSeenALittleLater) {
   EXPECT_EQ(GiveOut().size(), 1U);
 }
 
+TEST_F(ShareContentsTest, WhatIsClosedIsLookedAtAtOnce) {
+  Quieten();
+  contents.EntriesChanged();
+  Settle();
+  AddFile(1);
+
+  contents.EntriesClosed();
+  Pass(milliseconds(2));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, NothingIsOpenedForAClosing) {
+  Quieten();
+  Pass(seconds(11));
+  ASSERT_EQ(Count("Close"), 1U);
+
+  contents.EntriesClosed();
+  Pass(seconds(11));
+
+  EXPECT_EQ(Count("Open"), 1U);
+}
+
 TEST_F(ShareContentsTest, AllIsLookedAtOnceADay) {
   Quieten();
   EXPECT_EQ(Count("LookAtAll"), 1U);
