@@ -21,6 +21,7 @@ constexpr int TRIES = 3;
 constexpr int STEPS_BETWEEN_LOOKS = 20000;  // of SQLite's machine, at the clock
 
 // A database is made in some milliseconds, and until then there is none.
+// Of a share without a folder there will be none.
 constexpr int MAKING_TRIES = 20;
 constexpr std::chrono::milliseconds MAKING_PAUSE{10};
 
@@ -48,7 +49,7 @@ IndexError AskedShare::Open(bool with_contents) {
   IndexError error = reader.Open(name);
   for (int i = 0; i < MAKING_TRIES && error == IndexError::PATH_NOT_FOUND; ++i) {
     struct stat status {};
-    if (stat(IndexPath(name).c_str(), &status) != 0) {
+    if (stat(ShareFolder(name).c_str(), &status) != 0) {
       return error;
     }
     std::this_thread::sleep_for(MAKING_PAUSE);  // nothing tells when it is there
@@ -94,8 +95,9 @@ void AskedShare::Ask(const Question& question, const Asked& asked, const HitOrde
 // The last try goes without contents: what is wrong with them does not hide what the names answer.
 void AskedShare::AskTries(const Question& question, const Asked& asked, const HitOrder& order,
                           uint64_t wanted) {
-  deadline = std::chrono::steady_clock::now() + MOST_ASKING;
+  deadline = std::chrono::steady_clock::now() + patience;
   IndexError error = IndexError::NONE;
+  bool was_there = false;
   for (int tries = 1; tries <= TRIES; ++tries) {
     const bool with_contents = tries < TRIES;
     const IndexError before = error;
@@ -111,8 +113,12 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
     }
     hits.clear();
     total = 0;
+    if (error == IndexError::PATH_NOT_FOUND && was_there) {
+      return;  // the share was removed meanwhile: it holds nothing to find
+    }
+    was_there = was_there || error == IndexError::NONE;
     if ((code & 0xff) == SQLITE_INTERRUPT) {
-      Fail("no answer within " + std::to_string(MOST_ASKING.count()) + " seconds");
+      Fail("no answer within " + std::to_string(patience.count()) + " seconds");
       return;
     }
     error = error == IndexError::NONE ? FromSqlite(code) : error;

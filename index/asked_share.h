@@ -31,6 +31,7 @@ class AskedShare {
   void Complete(std::vector<Hit>& hits);
 
   std::string name;
+  std::chrono::seconds patience = MOST_ASKING;
   EntryReader reader;
   bool has_contents = false;
   IndexError contents_error = IndexError::NONE;

@@ -19,35 +19,6 @@ const FileFacts* ReadFactsOf(const Candidate& candidate) {
              : nullptr;
 }
 
-// Pieces one behind the other. The earliest place of each leaves most room for the next; an
-// anchored last one stands at the end.
-bool HoldsPieces(std::string_view name, const std::vector<std::string>& pieces, bool at_start,
-                 bool at_end) {
-  size_t at = 0;
-  for (size_t i = 0; i < pieces.size(); ++i) {
-    const std::string& piece = pieces[i];
-    const bool is_last = i + 1 == pieces.size();
-    if (i == 0 && at_start) {
-      if (!name.starts_with(piece)) {
-        return false;
-      }
-      at = piece.size();
-      if (is_last && at_end) {
-        return at == name.size();
-      }
-    } else if (is_last && at_end) {
-      return name.size() >= at + piece.size() && name.ends_with(piece);
-    } else {
-      at = name.find(piece, at);
-      if (at == std::string_view::npos) {
-        return false;
-      }
-      at += piece.size();
-    }
-  }
-  return true;
-}
-
 }  // namespace
 
 bool NeedsFacts(const QueryNode& node) {
@@ -130,7 +101,7 @@ int RowCheck::MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& mat
       matches = InName(node, candidate);
       return matches ? SQLITE_OK : InText(node, candidate, matches);
     case Part::NAME_PATTERN:
-      matches = sets.Of(node).is_sure ? InName(node, candidate) : MatchesPattern(node, candidate);
+      matches = InName(node, candidate);
       return SQLITE_OK;
     case Part::EXACT_NAME:
       matches = rows.FoldedName(candidate) == folder.Parts(node.text);
@@ -166,14 +137,6 @@ int RowCheck::MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& mat
       matches = MatchesContent(node, candidate);
       return SQLITE_OK;
   }
-}
-
-bool RowCheck::MatchesPattern(const QueryNode& node, Candidate& candidate) {
-  std::vector<std::string> pieces;
-  for (const std::string& piece : node.pieces) {
-    pieces.push_back(folder.Parts(piece));
-  }
-  return HoldsPieces(rows.FoldedName(candidate), pieces, node.at_start, node.at_end);
 }
 
 bool RowCheck::MatchesEnding(const QueryNode& node, Candidate& candidate) {

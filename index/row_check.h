@@ -14,14 +14,13 @@ class RowCheck {
 
   // SQLite's code. What decides without another look at the tables is asked first.
   int Matches(const QueryNode& node, Candidate& candidate, bool& matches);
-  // Of a WORD.
+  // Of a WORD or a NAME_PATTERN.
   bool InName(const QueryNode& word, const Candidate& candidate) const;
   int InText(const QueryNode& word, Candidate& candidate, bool& matches);
 
  private:
   int MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& matches);
   int MatchesGroup(const QueryNode& node, Candidate& candidate, bool& matches);
-  bool MatchesPattern(const QueryNode& node, Candidate& candidate);
   bool MatchesEnding(const QueryNode& node, Candidate& candidate);
   static bool MatchesProperty(Property property, const Entry& entry);
   static bool MatchesContent(const QueryNode& node, const Candidate& candidate);

@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "index/entry_table.h"
+#include "index/name_pattern.h"
 #include "index/name_text.h"
 
 namespace fileindexd {
@@ -12,28 +13,6 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
-
-// Trigrams of the piece, all of which its names hold. Empty for a shorter one.
-std::string PartsQuery(const std::string& folded, std::string query) {
-  const std::vector<size_t> starts = CharacterStarts(folded);
-  for (size_t i = 0; i + 3 < starts.size(); ++i) {
-    query += (query.empty() ? "" : " AND ") +
-             Quoted(std::string_view(folded).substr(starts[i], starts[i + 3] - starts[i]));
-  }
-  return query;
-}
-
-bool IsPaired(const std::string& folded) {
-  CharacterTable characters;
-  for (size_t at = 0; at < folded.size();) {
-    const Character character = CharacterAt(folded, at);
-    if (character.code < 0x80 || characters.Of(character.code).type != CharacterClass::PAIRED) {
-      return false;
-    }
-    at += character.size;
-  }
-  return !folded.empty();
-}
 
 }  // namespace
 
@@ -82,7 +61,8 @@ int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, boo
 int WordSets::ReadLeaf(const WordLeaf& leaf) {
   WordSet& set = sets[leaf.node];
   if (leaf.node->part == Part::NAME_PATTERN) {
-    return ReadParts(*leaf.node, set);
+    set.is_sure = true;
+    return NamePattern(*leaf.node).Find(db, set.names);
   }
   set.is_sure = leaf.node->part == Part::WORD;
   set.everything = !set.is_sure && leaf.tokens.empty();
@@ -96,29 +76,6 @@ int WordSets::ReadLeaf(const WordLeaf& leaf) {
                    leaf.text_query, set.texts, leaf.is_positive);
   }
   return code;
-}
-
-int WordSets::ReadParts(const QueryNode& node, WordSet& set) {
-  NameFolder folder;
-  std::string query;
-  for (const std::string& piece : node.pieces) {
-    query = PartsQuery(folder.Parts(piece), std::move(query));
-  }
-  if (!query.empty()) {
-    const std::vector<size_t> starts = CharacterStarts(folder.Parts(node.pieces.front()));
-    // One trigram is the piece itself.
-    set.is_sure = node.pieces.size() == 1 && starts.size() == 4 && !node.at_start && !node.at_end;
-    return Collect("SELECT rowid FROM parts WHERE parts MATCH ?1", query, set.names, false);
-  }
-
-  // Short ones of Han and the like stand as rows of words.
-  const std::string first = folder.Parts(node.pieces.front());
-  if (IsPaired(first)) {
-    return Collect("SELECT rowid FROM names WHERE names MATCH ?1",
-                   Quoted(folder.Words(node.pieces.front())), set.names, false);
-  }
-  set.everything = true;
-  return SQLITE_OK;
 }
 
 // The ending of a name is its last word.

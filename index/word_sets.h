@@ -44,7 +44,6 @@ class WordSets {
   int ReadAttributes(const QueryNode& node);
   int ReadEndings(const QueryNode& node);
   int ReadUnder(const QueryNode& node);
-  int ReadParts(const QueryNode& node, WordSet& set);
   int Collect(const char* sql, const std::string& query, IdSet& ids, bool counts);
   WordSet UpperOfAll(const QueryNode& node) const;
 
