@@ -17,7 +17,8 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int TRIES = 3;
+constexpr int TRIES = 6;
+constexpr int MOST_CONTENTS_TRIES = 2;
 constexpr int STEPS_BETWEEN_LOOKS = 20000;  // of SQLite's machine, at the clock
 
 // A database is made in some milliseconds, and until then there is none.
@@ -46,6 +47,7 @@ void AskedShare::Fail(const std::string& what) {
 
 IndexError AskedShare::Open(bool with_contents) {
   run.reset();
+  has_contents = false;
   IndexError error = reader.Open(name);
   for (int i = 0; i < MAKING_TRIES && error == IndexError::PATH_NOT_FOUND; ++i) {
     struct stat status {};
@@ -92,42 +94,49 @@ void AskedShare::Ask(const Question& question, const Asked& asked, const HitOrde
   }
 }
 
-// The last try goes without contents: what is wrong with them does not hide what the names answer.
+// What fails twice with contents is tried without them: what is wrong with them does not hide what
+// the names answer.
 void AskedShare::AskTries(const Question& question, const Asked& asked, const HitOrder& order,
                           uint64_t wanted) {
   deadline = std::chrono::steady_clock::now() + patience;
-  IndexError error = IndexError::NONE;
+  IndexError of_contents = IndexError::NONE;
+  int failed_with_contents = 0;
   bool was_there = false;
-  for (int tries = 1; tries <= TRIES; ++tries) {
-    const bool with_contents = tries < TRIES;
-    const IndexError before = error;
-    error = Open(with_contents);
+  for (int tries = 1;; ++tries) {
+    const bool with_contents = failed_with_contents < MOST_CONTENTS_TRIES;
+    IndexError error = Open(with_contents);
+    was_there = was_there || error == IndexError::NONE;
     const int code =
         error == IndexError::NONE ? RunOnce(question, asked, order, wanted) : SQLITE_OK;
     if (error == IndexError::NONE && code == SQLITE_OK) {
-      const IndexError of_contents = with_contents ? contents_error : before;
+      of_contents = with_contents ? contents_error : of_contents;
       if (of_contents != IndexError::NONE && of_contents != IndexError::PATH_NOT_FOUND) {
         Fail(std::string("contents: ") + IndexErrorText(of_contents));
       }
       return;
     }
+
     hits.clear();
     total = 0;
-    if (error == IndexError::PATH_NOT_FOUND && was_there) {
-      return;  // the share was removed meanwhile: it holds nothing to find
-    }
-    was_there = was_there || error == IndexError::NONE;
+    run.reset();
     if ((code & 0xff) == SQLITE_INTERRUPT) {
       Fail("no answer within " + std::to_string(patience.count()) + " seconds");
       return;
     }
-    error = error == IndexError::NONE ? FromSqlite(code) : error;
-    if (error == IndexError::PATH_NOT_FOUND) {
-      break;
+    if (error == IndexError::PATH_NOT_FOUND && was_there) {
+      return;  // the share was removed meanwhile: it holds nothing to find
     }
+    error = error == IndexError::NONE ? FromSqlite(code) : error;
+    if (has_contents) {
+      ++failed_with_contents;
+      of_contents = error;
+    }
+    if (tries == TRIES || error == IndexError::PATH_NOT_FOUND) {
+      Fail(IndexErrorText(error));
+      return;
+    }
+    std::this_thread::sleep_for(MAKING_PAUSE);  // whoever replaces it is not done yet
   }
-  run.reset();
-  Fail(IndexErrorText(error));
 }
 
 void AskedShare::Complete(std::vector<Hit>& shown) {

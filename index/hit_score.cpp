@@ -157,15 +157,16 @@ double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found
   if (IsSame(words, tokens)) {
     return WHOLE_NAME + covered;
   }
-  const bool has_stem = candidate.entry.kind != Kind::FOLDER;
-  if (has_stem && IsSame(tokenizer.Tokens(StemOf(name)), tokens)) {
-    return WHOLE_STEM + covered;
-  }
   const bool at_start =
       words.size() >= tokens.size() &&
       std::equal(tokens.begin(), tokens.end(), words.begin(),
                  [](const Token& token, const std::string& word) { return token.Fits(word); });
-  return (at_start ? AT_START : 0) + covered;
+  if (!at_start) {
+    return covered;
+  }
+  const bool has_stem = candidate.entry.kind != Kind::FOLDER;
+  const bool is_stem = has_stem && IsSame(tokenizer.Tokens(StemOf(name)), tokens);
+  return (is_stem ? WHOLE_STEM : AT_START) + covered;
 }
 
 int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score) {

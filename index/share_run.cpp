@@ -16,6 +16,7 @@ namespace {
 
 constexpr size_t BLOCK = 1000;  // names that are looked at before it is asked if that is enough
 constexpr size_t SCORED_TEXTS = 300;     // the same of texts
+constexpr uint64_t MOST_RANKED = 50000;  // names whose words are all compared
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -104,66 +105,86 @@ int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
   return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;
 }
 
-int ShareRun::NamesByRank(std::vector<int64_t>& ids) {
-  ids = upper.names.Ids();
-  if (ids.size() <= BLOCK || !IsScored() || wanted == 0) {
-    return SQLITE_OK;
-  }
+// What the words of names say of their order, in the full-text table's language.
+std::string ShareRun::RankQuery(bool at_start) const {
   std::string query;
   for (const WordLeaf& leaf : asked.leaves) {
     if (leaf.is_positive && !leaf.tokens.empty()) {
-      query += (query.empty() ? "(" : " OR ") + leaf.names_query;
+      query +=
+          (query.empty() ? "(" : " OR ") + std::string(at_start ? "^ " : "") + leaf.names_query;
     }
   }
+  return query.empty() ? "" : query + ") AND " + Quoted(NAME_END);
+}
+
+// The best first, then the youngest rows. Of very many, those that begin with a word are enough.
+int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
+  const uint64_t count = upper.names.Count();
+  const std::string query =
+      count <= BLOCK || !IsScored() || wanted == 0 ? "" : RankQuery(count > MOST_RANKED);
   if (query.empty()) {
+    ids = upper.names.Ids();
     return SQLITE_OK;
   }
-  query += std::string(") AND ") + Quoted(NAME_END);
-
   Statement rank;
   int code =
       rank.Prepare(rows.db, "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1");
   if (code != SQLITE_OK) {
     return code;
   }
+  // Where all of them answer, those that are shown are enough.
+  const uint64_t kept = lower.Count() == count ? wanted + BLOCK : count;
+  using Ranked = std::pair<double, int64_t>;
+  std::vector<Ranked> heap;  // the worst on top
   rank.BindText(1, query);
-  std::vector<std::pair<double, int64_t>> ranked;  // the best first, then the youngest rows
   for (code = rank.Step(); code == SQLITE_ROW; code = rank.Step()) {
-    if (upper.names.Has(rank.Int(0))) {
-      ranked.emplace_back(-sqlite3_column_double(rank.handle, 1), -rank.Int(0));
+    const Ranked one(-sqlite3_column_double(rank.handle, 1), -rank.Int(0));
+    if (!upper.names.Has(-one.second) || (heap.size() >= kept && heap.front() < one)) {
+      continue;
     }
+    if (heap.size() >= kept) {
+      std::pop_heap(heap.begin(), heap.end());
+      heap.pop_back();
+    }
+    heap.push_back(one);
+    std::push_heap(heap.begin(), heap.end());
   }
   if (code != SQLITE_DONE) {
     return code;
   }
-  IdSet unranked = upper.names;
-  IdSet seen;
-  // Where all of them answer, the best are enough.
-  const uint64_t reached = lower.Count() == ids.size() ? wanted + BLOCK : ranked.size();
-  const size_t sorted = std::min<size_t>(ranked.size(), reached);
-  std::partial_sort(ranked.begin(), ranked.begin() + static_cast<std::ptrdiff_t>(sorted),
-                    ranked.end());
-  ids.clear();
-  for (const auto& [rank_of, id] : ranked) {
-    ids.push_back(-id);
-    seen.Add(-id);
+  std::sort_heap(heap.begin(), heap.end());
+  IdSet ranked;
+  for (const Ranked& one : heap) {
+    ids.push_back(-one.second);
+    ranked.Add(-one.second);
   }
-  unranked.Subtract(seen);
-  const std::vector<int64_t> rest = unranked.Ids();
-  ids.insert(ids.end(), rest.begin(), rest.end());
+  rest = upper.names;
+  rest.Subtract(ranked);
   return SQLITE_OK;
 }
 
 int ShareRun::WalkNames(BestHits& best) {
   std::vector<int64_t> ids;
-  int code = NamesByRank(ids);
+  IdSet rest;
+  int code = NamesByRank(ids, rest);
   Block block;
-  for (size_t i = 0; i < ids.size() && code == SQLITE_OK; ++i) {
+  for (size_t i = 0; code == SQLITE_OK; ++i) {
+    if (i == ids.size()) {
+      const std::vector<int64_t> others = rest.Ids();
+      ids.insert(ids.end(), others.rbegin(), others.rend());
+      rest = IdSet();
+    }
     if (i % BLOCK == 0 && (wanted == 0 || IsScored())) {
       if (answered_by_name >= wanted) {
-        return CountNames(ids, i);
+        for (; i < ids.size(); ++i) {
+          rest.Add(ids[i]);
+        }
+        return CountNames(rest);
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 1.0);
+    }
+    if (i == ids.size()) {
+      break;
     }
     Candidate candidate;
     bool found = false;
@@ -180,16 +201,17 @@ int ShareRun::WalkNames(BestHits& best) {
 }
 
 // None of them is among the best.
-int ShareRun::CountNames(const std::vector<int64_t>& ids, size_t from) {
+int ShareRun::CountNames(IdSet& others) {
+  IdSet sure = others;
+  sure.Intersect(lower);
+  answered += sure.Count();
+  if (!question.count_all) {
+    return SQLITE_OK;
+  }
+  others.Subtract(sure);
+  const std::vector<int64_t> ids = others.Ids();
   int code = SQLITE_OK;
-  for (size_t i = from; i < ids.size() && code == SQLITE_OK; ++i) {
-    if (lower.Has(ids[i])) {
-      ++answered;
-      continue;
-    }
-    if (!question.count_all) {
-      continue;
-    }
+  for (size_t i = 0; i < ids.size() && code == SQLITE_OK; ++i) {
     Candidate candidate;
     bool found = false;
     bool answers = false;

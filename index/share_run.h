@@ -40,12 +40,13 @@ class ShareRun {
   };
 
   int WalkNames(BestHits& best);
-  int CountNames(const std::vector<int64_t>& ids, size_t from);
+  int CountNames(IdSet& others);
   int WalkTexts(BestHits& best);
   int CountTexts(const std::vector<int64_t>& texts, size_t from);
   int WalkRows(BestHits& best);
   int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
-  int NamesByRank(std::vector<int64_t>& ids);
+  std::string RankQuery(bool at_start) const;
+  int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
   std::vector<int64_t> TextsByHits() const;
   int Answers(Candidate& candidate, bool& answers);
   int AddHit(Candidate& candidate, BestHits& best, Block& block);

@@ -13,6 +13,9 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
+// As in the schema's indexes.
+constexpr int64_t LARGE = 1 << 20;
+constexpr int64_t WEEK = 604'800'000'000'000;
 
 }  // namespace
 
@@ -29,6 +32,7 @@ int WordSets::Read() {
 int WordSets::ReadAttributes(const QueryNode& node) {
   int code = node.part == Part::EXT     ? ReadEndings(node)
              : node.part == Part::UNDER ? ReadUnder(node)
+             : node.part == Part::RANGE ? ReadRange(node)
                                         : SQLITE_OK;
   for (size_t i = 0; i < node.below.size() && code == SQLITE_OK; ++i) {
     code = ReadAttributes(node.below[i]);
@@ -100,35 +104,64 @@ int WordSets::ReadEndings(const QueryNode& node) {
   return SQLITE_OK;
 }
 
-// What a small folder holds is read out of the index of paths alone.
-int WordSets::ReadUnder(const QueryNode& node) {
+// Ids that an index alone gives. Of more than a bounded number nothing is known.
+int WordSets::ReadFew(Statement& statement, WordSet& set) {
   constexpr int64_t MOST = 10000;
-  WordSet& set = sets[&node];
-  const PathRange range(node.names.front());
-  Statement below;
-  int code = below.Prepare(db,
-                           "SELECT id FROM entries WHERE path = ?1 UNION ALL "
-                           "SELECT id FROM (SELECT id FROM entries WHERE path > ?2 AND path < ?3 "
-                           "LIMIT ?4)");
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  below.BindBlob(1, node.names.front());
-  below.BindBlob(2, range.first);
-  below.BindBlob(3, range.end);
-  below.BindInt(4, MOST);
   int64_t found = 0;
-  for (code = below.Step(); code == SQLITE_ROW && found < MOST; code = below.Step()) {
-    const int64_t id = below.Int(0);
+  int code = statement.Step();
+  for (; code == SQLITE_ROW && found < MOST; code = statement.Step()) {
+    const int64_t id = statement.Int(0);
     if (id < 0 || id > MOST_ROWS) {
       return SQLITE_CORRUPT;
     }
     set.names.Add(id);
     ++found;
   }
-  set.is_sure = found < MOST;
-  set.everything = !set.is_sure;
+  if (code == SQLITE_ROW) {
+    set = unknown;
+  }
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+// What a small folder holds.
+int WordSets::ReadUnder(const QueryNode& node) {
+  const PathRange range(node.names.front());
+  Statement below;
+  const int code = below.Prepare(db,
+                                 "SELECT id FROM entries WHERE path = ?1 UNION ALL "
+                                 "SELECT id FROM entries WHERE path > ?2 AND path < ?3");
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  below.BindBlob(1, node.names.front());
+  below.BindBlob(2, range.first);
+  below.BindBlob(3, range.end);
+  WordSet& set = sets[&node];
+  set.is_sure = true;
+  return ReadFew(below, set);
+}
+
+// The large ones, and those of some weeks.
+int WordSets::ReadRange(const QueryNode& node) {
+  const bool by_size = node.column == Column::SIZE && node.lowest >= LARGE;
+  const bool by_week = node.column == Column::MODIFIED && node.lowest >= WEEK;
+  if (!by_size && !by_week) {
+    return SQLITE_OK;
+  }
+  Statement inside;
+  const int code = inside.Prepare(
+      db, by_size ? "SELECT id FROM entries INDEXED BY entries_large "
+                    "WHERE size >= 1048576 AND size >= ?1 AND size <= ?2"
+                  : "SELECT id FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND "
+                    "mtime / 604800000000000 >= ?1 AND mtime / 604800000000000 <= ?2");
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  inside.BindInt(1, by_size ? node.lowest : node.lowest / WEEK);
+  inside.BindInt(2, by_size ? node.highest : node.highest / WEEK);
+  WordSet& set = sets[&node];
+  set.is_sure = by_size;
+  return ReadFew(inside, set);
 }
 
 const WordSet& WordSets::Of(const QueryNode& leaf) const {

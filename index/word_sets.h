@@ -44,6 +44,8 @@ class WordSets {
   int ReadAttributes(const QueryNode& node);
   int ReadEndings(const QueryNode& node);
   int ReadUnder(const QueryNode& node);
+  int ReadRange(const QueryNode& node);
+  int ReadFew(Statement& statement, WordSet& set);
   int Collect(const char* sql, const std::string& query, IdSet& ids, bool counts);
   WordSet UpperOfAll(const QueryNode& node) const;
 
