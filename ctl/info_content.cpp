@@ -113,6 +113,7 @@ EntryContent ContentOf(const std::string& share, const Entry& entry) {
   ContentsReader reader;
   content.is_known = reader.Open(share) == IndexError::NONE &&
                      reader.Find(entry, content.content, content.state, content.reason);
+  content.language = content.is_known ? reader.Language() : "";
   return content;
 }
 

@@ -18,6 +18,7 @@ struct EntryContent {
   std::string state;   // "waiting", "done", "failed"
   std::string reason;  // of a failure
   Content content;
+  std::string language;  // whose word forms are found together
 };
 
 // Not known: nothing was read of it yet, or its content is not wanted, or cannot be read.

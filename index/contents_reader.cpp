@@ -160,4 +160,13 @@ bool ContentsReader::Find(const Entry& entry, Content& content, std::string& sta
   return true;
 }
 
+std::string ContentsReader::Language() {
+  Statement read;
+  const bool found =
+      read.Prepare(entries.db, "SELECT language FROM contents.meta WHERE id = 1") == SQLITE_OK &&
+      read.Step() == SQLITE_ROW;
+  const std::string name = found ? LanguageName(read.Bytes(0)) : "";
+  return name.empty() ? NO_LANGUAGE : name;
+}
+
 }  // namespace fileindexd

@@ -45,6 +45,8 @@ class ContentsReader {
   // The content that stands for the entry: state in words ("waiting", "done", "failed"), and the
   // reason of a failure. False when there is none, or reading failed.
   bool Find(const Entry& entry, Content& content, std::string& state, std::string& reason);
+  // Whose word forms its words were cut to; NO_LANGUAGE where that is not to be had.
+  std::string Language();
 
   IndexDatabase entries;  // with the contents attached as "contents"
 };
