@@ -52,6 +52,17 @@ bool ReadContent(const Statement& row, Content& content) {
   return row.Int(5) == 0 || UnpackTexts(row.Bytes(6), content);
 }
 
+// The table of words comes a moment after the others, once its language is known.
+IndexError LookForWords(IndexDatabase& entries) {
+  Statement words;
+  int code = words.Prepare(entries.db, "SELECT 1 FROM contents.sqlite_master WHERE name = 'words'");
+  code = code == SQLITE_OK ? words.Step() : code;
+  if (code == SQLITE_ROW) {
+    return IndexError::NONE;
+  }
+  return code == SQLITE_DONE ? IndexError::PATH_NOT_FOUND : FromSqlite(code);
+}
+
 }  // namespace
 
 IndexError AttachContents(IndexDatabase& entries, const std::string& share_name) {
@@ -77,7 +88,7 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
     int persist = 1;
     sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
   }
-  return FromSqlite(code);
+  return code == SQLITE_OK ? LookForWords(entries) : FromSqlite(code);
 }
 
 IndexError ContentsReader::Open(const std::string& share_name) {

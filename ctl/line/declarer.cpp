@@ -24,7 +24,7 @@ class CommandFormatter : public CLI::Formatter {
     for (const CLI::App* command : app->get_subcommands({})) {
       const std::string name = before + command->get_name();
       if (command->get_subcommands({}).empty()) {
-        CLI::detail::format_help(text, "  " + name, command->get_description(), get_column_width());
+        CLI::detail::format_help(text, name, command->get_description(), get_column_width());
       } else {
         AddCommands(command, name + " ", text);
       }

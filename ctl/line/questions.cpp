@@ -50,23 +50,24 @@ void AddInfo(Declarer& declare) {
 
 void AddStats(Declarer& declare) {
   Arguments& into = declare.arguments;
-  CLI::App* stats = declare.Add(
-      &declare.app, "stats", Stats,
-      "Count entries and bytes, the most bytes first.\n"
-      "A file with several names counts once for each, its bytes once: at its first path",
-      "--share projects --by ext");
+  CLI::App* stats =
+      declare.Add(&declare.app, "stats", Stats, "Count entries and bytes, the most bytes first",
+                  "--share projects --by ext");
   AddOption(stats, "--share", into.in_share, "NAME", "In that share alone");
-  AddChoice(stats, "--by", into.by, "kind|ext|owner|folder|age",
-            "By kind, ending (of files), owner, folder right below a share's, "
-            "or time since the last change (of files)",
+  AddChoice(stats, "--by", into.by, "KEY", "kind, ext, owner, folder or age",
             {"kind", "ext", "owner", "folder", "age"});
   AddOption(stats, "--largest", into.largest, "N", "The N largest files");
-  stats->add_flag("--duplicates", into.duplicates,
-                  "Files that are probably alike, of those whose content is indexed: same size, "
-                  "same beginning, middle and end");
+  stats->add_flag("--duplicates", into.duplicates, "Files that are probably alike");
   AddOption(stats, "--growth", into.growth, "DURATION",
             "What was added since, by folder: 90s, 15m, 2h, 7d");
   AddJson(stats, into, "One JSON document");
+  stats->footer(
+      "Each name of a file counts, its bytes count once: at the first of its paths.\n"
+      "ext and age (since the last change) are of files and links alone; folder is the one\n"
+      "right below the share's. Alike are, of the files whose content is indexed, those of\n"
+      "one size whose beginning, middle and end are the same: probably, as nothing is\n"
+      "compared in full.\n\n" +
+      stats->get_footer());
 }
 
 void AddReports(Declarer& declare) {
