@@ -2,14 +2,20 @@
 """Completion of the command line in bash and zsh: what is offered, and that it is what there is."""
 
 import os
+import pty
 import re
+import select
+import shlex
+import shutil
 import subprocess
+import unittest
 
 from harness import IndexTest, main, namespace
 from harness.awaiting import LIMIT
 from harness.machine import environment, program
 
 FOLDER = os.path.join(os.path.dirname(__file__), "../../../packaging/completions")
+ZSH = os.path.realpath(FOLDER)
 BASH = os.path.realpath(f"{FOLDER}/fileindexctl.bash")
 
 COMMANDS = ["dump", "event", "failed", "folder", "info", "log-level", "pause", "reindex", "resume",
@@ -126,6 +132,91 @@ class BashTest(CompletionTest):
 
         self.assertEqual(self.offered("dump", "", **broken), [])
         self.assertEqual(self.offered("dump", "-", **broken), ["--help", "--json", "-0"])
+
+
+# Sends what completion would offer down a pipe, and offers nothing.
+ZSH_SETUP = """
+PS1= PS2= ; unsetopt zle_bracketed_paste prompt_cr prompt_sp beep
+fpath=({folder} $fpath); autoload -Uz compinit; compinit -D -u
+compadd() {{
+  local -a given=("$@") found
+  if (( ${{given[(I)-[a-zA-Z]#[OAD]]}} )); then
+    builtin compadd "$@"; return
+  fi
+  builtin compadd -A found "$@"
+  (( $#found )) && print -rlu {pipe} -- $found
+  builtin compadd "$@"
+}}
+offer() {{ _main_complete; compstate[insert]=''; compstate[list]=''; print -u {pipe} END; }}
+setopt extended_glob; zle -C offer complete-word offer; bindkey -e; bindkey '^T' offer
+print -u {pipe} END
+"""
+
+
+@unittest.skipUnless(shutil.which("zsh"), "no zsh here")
+class ZshTest(CompletionTest):
+    def setUp(self):
+        super().setUp()
+        self.keyboard, terminal = pty.openpty()
+        self.pipe, theirs = os.pipe()
+        setup = f"{namespace.RUN}/setup.zsh"
+        with open(setup, "w", encoding="ascii") as file:
+            file.write(ZSH_SETUP.format(folder=shlex.quote(ZSH), pipe=theirs))
+        path = f"{os.path.dirname(program('fileindexctl'))}:{os.environ['PATH']}"
+        self.shell = subprocess.Popen(
+            ["zsh", "-f", "-i"],
+            env=environment(TERM="dumb", PATH=path),
+            stdin=terminal,
+            stdout=terminal,
+            stderr=terminal,
+            pass_fds=[theirs],
+            start_new_session=True,
+        )
+        os.close(terminal)
+        os.close(theirs)
+        self.addCleanup(self.end)
+        self.type(f"source {setup}\n")
+
+    def end(self):
+        self.shell.kill()
+        self.shell.wait(LIMIT)
+        os.close(self.keyboard)
+        os.close(self.pipe)
+
+    def type(self, text):
+        """What comes down the pipe up to its end; the screen is read and dropped meanwhile."""
+        os.write(self.keyboard, text.encode())
+        told, screen = b"", b""
+        while not told.endswith(b"END\n"):
+            ready, _, _ = select.select([self.keyboard, self.pipe], [], [], LIMIT)
+            self.assertTrue(ready, f"nothing comes: {told!r}, {screen!r}")
+            if self.keyboard in ready:
+                screen += os.read(self.keyboard, 4096)
+            if self.pipe in ready:
+                told += os.read(self.pipe, 4096)
+        return told.decode().splitlines()[:-1]
+
+    def offered(self, *words):
+        line = " ".join(["fileindexctl", *words])
+        return sorted(set(self.type(f"\x15{line}\x14")))
+
+    def test_what_is_offered(self):
+        for words, wanted in OFFERED:
+            if not wanted and not words[-1]:
+                continue  # it goes on to offer options, or files
+            with self.subTest(words=words):
+                self.assertEqual(self.offered(*words), wanted)
+
+    def test_every_option_of_every_command(self):
+        for words in commands(self.ctl):
+            with self.subTest(command=words):
+                listed = self.ctl(*words, "--help").out.decode().partition("\nOptions:\n")[2]
+                wanted = re.findall(r"^  (?:-h,)?(--[a-z-]+|-0)", listed, re.MULTILINE)
+                offered = [reply.rstrip("=") for reply in self.offered(*words, "-")]
+                self.assertEqual(offered, sorted(wanted))
+
+    def test_values_behind_an_equals_sign(self):
+        self.assertEqual(self.offered("folder", "set", "--document="), ["off", "on"])
 
 
 if __name__ == "__main__":
