@@ -15,7 +15,9 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int FIRST_NUMBER_COLUMN = 7;  // of FILE_OF_ENTRY
+constexpr int FIRST_NUMBER_COLUMN = 7;  // of FileOfEntrySql
+constexpr const char* FILE_OF_ENTRY =
+    " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
 
 const char* StateText(ContentState state) {
   switch (state) {
@@ -33,8 +35,19 @@ const char* StateText(ContentState state) {
 std::string FileOfEntrySql() {
   return "SELECT state, reason, found_kind, is_cut, sample, text,"
          " (SELECT packed FROM contents.texts WHERE id = text), " +
-         std::string(NUMBER_COLUMNS) +
-         " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
+         std::string(NUMBER_COLUMNS) + FILE_OF_ENTRY;
+}
+
+// The row of the file that the entry shows now; false when there is none.
+bool StepTo(sqlite3* db, const std::string& sql, const Entry& entry, Statement& row) {
+  if (row.Prepare(db, sql.c_str()) != SQLITE_OK) {
+    return false;
+  }
+  row.BindInt(1, static_cast<int64_t>(entry.inode));
+  row.BindInt(2, entry.birth_time);
+  row.BindInt(3, entry.size);
+  row.BindInt(4, entry.mtime);
+  return row.Step() == SQLITE_ROW;
 }
 
 bool ReadContent(const Statement& row, Content& content) {
@@ -154,20 +167,24 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
 bool ContentsReader::Find(const Entry& entry, Content& content, std::string& state,
                           std::string& reason) {
   Statement find;
-  if (find.Prepare(entries.db, FileOfEntrySql().c_str()) != SQLITE_OK) {
-    return false;
-  }
-  find.BindInt(1, static_cast<int64_t>(entry.inode));
-  find.BindInt(2, entry.birth_time);
-  find.BindInt(3, entry.size);
-  find.BindInt(4, entry.mtime);
   Content read;
-  if (!entry.content_wanted || find.Step() != SQLITE_ROW || !ReadContent(find, read)) {
+  if (!entry.content_wanted || !StepTo(entries.db, FileOfEntrySql(), entry, find) ||
+      !ReadContent(find, read)) {
     return false;
   }
   content = std::move(read);
   state = StateText(static_cast<ContentState>(find.Int(0)));
   reason = find.Bytes(1);
+  return true;
+}
+
+bool ContentsReader::FindReading(const Entry& entry, ContentReading& reading) {
+  Statement find;
+  if (!entry.content_wanted ||
+      !StepTo(entries.db, std::string("SELECT extractor, tries") + FILE_OF_ENTRY, entry, find)) {
+    return false;
+  }
+  reading = {find.Int(0), find.Int(1)};
   return true;
 }
 

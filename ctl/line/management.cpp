@@ -1,7 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Commands that change something: shares, folders, queues, the daemon.
-#include <algorithm>
-
 #include "ctl/line/declarer.h"
 
 namespace fileindexd {

@@ -54,6 +54,18 @@ class TermsTest(InfoQuestionTest):
         self.assertNotIn("terms", self.ctl("info", self.path, "--json").json())
 
 
+class ReadingTest(InfoQuestionTest):
+    def test_it_tells_what_read_the_content(self):
+        stored = self.ctl("info", self.path, "--json").json()["stored"]
+
+        self.assertEqual((stored["state"], stored["kind"], stored["tries"]),
+                         ("done", "document", 0))
+        self.assertGreaterEqual(stored["extractor"], 1)
+        plain = self.ctl("info", self.path).out.decode()
+        self.assertIn("content state", plain)
+        self.assertRegex(plain, rf"content read by +version {stored['extractor']}\n")
+
+
 class QueryTest(InfoQuestionTest):
     def test_each_part_is_told(self):
         answer = self.ask("report lighthouses")
