@@ -25,7 +25,8 @@ constexpr const char* ALIKE_NOTE =
 // The user's name, or the number where there is none. One thread.
 std::string UserName(const std::string& number) {
   // A number of the index's own: it converts.
-  const passwd* user = getpwuid(static_cast<uid_t>(std::stoul(number)));
+  const auto id = static_cast<uid_t>(std::stoul(number));
+  const passwd* user = getpwuid(id);  // NOLINT(concurrency-mt-unsafe): one thread
   return user == nullptr ? number : user->pw_name;
 }
 
@@ -161,6 +162,7 @@ struct Lines {
 
   void AddLargest(const std::vector<LargeFile>& largest) {
     std::vector<TableRow> rows;
+    rows.reserve(largest.size());
     for (const LargeFile& file : largest) {
       rows.push_back({Bytes(file.size), LocalTime(WholeSeconds(file.mtime)), file.path});
     }

@@ -36,8 +36,10 @@ std::vector<EntryGroup> Sorted(std::unordered_map<std::string, EntryGroup>& grou
 class Merge {
  public:
   void Add(const std::string& share, bool by_share, GroupCounts& counts) {
+    const std::string before = by_share ? share + '/' : "";
     for (auto& [name, group] : counts.groups) {
-      EntryGroup& sum = sums[by_share ? share + '/' + name : name];
+      std::string key = before;
+      EntryGroup& sum = sums[key.append(name)];
       sum.share = by_share ? share : "";
       sum.name = name;
       sum.entries += group.entries;

@@ -66,7 +66,8 @@ void AddStats(Declarer& declare) {
       "ext and age (since the last change) are of files and links alone; folder is the one\n"
       "right below the share's. Alike are, of the files whose content is indexed, those of\n"
       "one size whose beginning, middle and end are the same: probably, as nothing is\n"
-      "compared in full.\n\n" +
+      "compared in full. Where the output is no terminal, columns are separated by\n"
+      "tabulators, and bytes are exact.\n\n" +
       stats->get_footer());
 }
 

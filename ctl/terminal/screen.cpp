@@ -14,7 +14,7 @@ namespace fileindexd {
 namespace {
 
 std::string_view Variable(const char* name) {
-  const char* value = getenv(name);
+  const char* value = getenv(name);  // NOLINT(concurrency-mt-unsafe): one thread
   return value == nullptr ? "" : value;
 }
 

@@ -13,6 +13,15 @@ from search.library import ContentsTest
 DAY = 24 * 60 * 60
 
 
+def spoil(database):
+    """No database any more; its log would bring the first page back."""
+    for ending in ("-wal", "-shm"):
+        if os.path.exists(database + ending):
+            os.unlink(database + ending)
+    with open(database, "wb") as file:
+        file.write(b"no database at all")
+
+
 class StatsTest(IndexTest):
     def make(self, share, **sizes):
         """A share with files of these sizes; "__" in a name is a slash, "_" a dot."""
@@ -175,9 +184,7 @@ class TroubleTest(StatsTest):
         roots = [self.make(name, one_txt=100) for name in ("alpha", "beta")]
         self.index(*roots)
         self.stop(self.daemon_pid())
-        path = f"{namespace.STATE}/shares/alpha/index/entries.db"
-        with open(path, "r+b") as file:
-            file.write(b"no database at all")
+        spoil(f"{namespace.STATE}/shares/alpha/index/entries.db")
 
         for arguments in ((), ("--by", "kind"), ("--largest", "3"), ("--growth", "1d")):
             with self.subTest(arguments=arguments):
@@ -270,6 +277,22 @@ class DuplicatesTest(ContentsTest):
         self.await_drained("beta")
 
         self.assertEqual(self.sets(), [])
+
+    def test_contents_that_cannot_be_read_are_named(self):
+        self.fill(0, one="lighthouse", two="lighthouse")
+        self.fill(1, three="harbour", four="harbour")
+        self.index(0, done=2)
+        self.index(1, done=2)
+        service = self.service_pid()
+        self.stop(self.daemon_pid())
+        self.await_exit(service)
+        spoil(self.contents("alpha"))
+
+        result = self.ctl("stats", "--duplicates", code=1)
+        self.assertIn(b"alpha: contents", result.err)
+        self.assertIn(b"beta/three.txt", result.out)
+        result = self.ctl("stats", "--by", "kind", code=1)
+        self.assertEqual(result.out, b"34\t4\tdocument\n0\t2\tfolder\n")
 
     def test_it_says_that_nothing_was_compared(self):
         self.fill(0, one="lighthouse", two="lighthouse")
