@@ -88,7 +88,7 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
   }
 
   int code = RegisterTextTokenizer(entries.db);
-  code = code == SQLITE_OK ? RegisterContentFunctions(entries.db) : code;
+  code = code == SQLITE_OK ? RegisterQuestionFunctions(entries.db) : code;
   Statement attach;
   code = code == SQLITE_OK ? attach.Prepare(entries.db, "ATTACH ?1 AS contents") : code;
   if (code != SQLITE_OK) {

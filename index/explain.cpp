@@ -1,76 +1,216 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Why one entry answers a question, or does not.
-#include "index/contents_reader.h"
-#include "index/entry_table.h"
-#include "index/question_words.h"
-#include "index/reader.h"
+#include <cmath>
+#include <ctime>
+#include <exception>
+#include <utility>
+
+#include "index/asked_share.h"
+#include "index/kind.h"
+#include "index/query_fields.h"
+#include "index/row_check.h"
 #include "index/search.h"
-#include "state/layout.h"
-#include "state/sqlite.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
 namespace {
 
-// Whether the text that stands for the entry holds the word.
-int IsInText(sqlite3* db, const Entry& entry, const std::string& query, bool& is_in) {
-  Statement match;
-  const int code = match.Prepare(
-      db,
-      "SELECT 1 FROM contents.words WHERE words MATCH ?1 AND rowid = "
-      "(SELECT text FROM contents.files WHERE inode = ?2 AND birth_time = ?3 AND size = ?4 AND "
-      "mtime = ?5 AND text <> 0)");
-  if (code != SQLITE_OK) {
+std::string TimeText(int64_t seconds) {
+  const time_t time = seconds;
+  tm broken{};
+  char text[64];
+  const bool made = localtime_r(&time, &broken) != nullptr &&
+                    strftime(text, sizeof(text), "%Y-%m-%d %H:%M:%S", &broken) > 0;
+  return made ? text : std::to_string(seconds);
+}
+
+std::string NumberText(const QueryNode& node, int64_t number) {
+  switch (FormOf(node.column, node.field)) {
+    case ValueForm::NANOSECONDS:
+      return TimeText(number / 1'000'000'000);
+    case ValueForm::SECONDS:
+      return TimeText(number);
+    case ValueForm::CAMERA_TIME: {
+      const time_t time = number;
+      tm broken{};
+      char text[64];
+      const bool made = gmtime_r(&time, &broken) != nullptr &&
+                        strftime(text, sizeof(text), "%Y-%m-%d %H:%M:%S", &broken) > 0;
+      return made ? text : std::to_string(number);
+    }
+    case ValueForm::DURATION:
+      return std::to_string(number / 1000) + " s";
+    case ValueForm::BYTES:
+      return std::to_string(number) + " bytes";
+    case ValueForm::BITS:
+      return std::to_string(number) + " bits/s";
+    case ValueForm::NUMBER:
+      break;
+  }
+  return std::to_string(number);
+}
+
+class Explainer {
+ public:
+  Explainer(AskedShare& of_share, const Asked& in_question)
+      : share(of_share),
+        asked(in_question),
+        rows(of_share.reader.database.db, of_share.has_contents),
+        sets(of_share.reader.database.db, of_share.has_contents, in_question),
+        check(rows, sets) {}
+
+  int Run(const Entry& entry, Explanation& explanation) {
+    Candidate candidate;
+    candidate.entry = entry;
+    int code = sets.Read();
+    code = code == SQLITE_OK ? AddReasons(asked.tree, candidate, explanation) : code;
+    return code == SQLITE_OK ? check.Matches(asked.tree, candidate, explanation.matches) : code;
+  }
+
+ private:
+  // Groups are told part by part; what is negated, as a whole.
+  int AddReasons(const QueryNode& node, Candidate& candidate, Explanation& explanation) {
+    if (node.part == Part::AND || node.part == Part::OR) {
+      int code = SQLITE_OK;
+      for (size_t i = 0; i < node.below.size() && code == SQLITE_OK; ++i) {
+        code = AddReasons(node.below[i], candidate, explanation);
+      }
+      return code;
+    }
+    Reason reason;
+    // What came from an option has no text.
+    reason.part = node.end > node.start ? asked.text.substr(node.start, node.end - node.start)
+                                        : QueryText(node);
+    int code = check.Matches(node, candidate, reason.matches);
+    if (code == SQLITE_OK && (reason.matches || node.part == Part::RANGE ||
+                              node.part == Part::NEAR || node.part == Part::KIND)) {
+      code = Where(node, candidate, reason.where);
+    }
+    explanation.reasons.push_back(std::move(reason));
     return code;
   }
-  match.BindText(1, query);
-  match.BindInt(2, static_cast<int64_t>(entry.inode));
-  match.BindInt(3, entry.birth_time);
-  match.BindInt(4, entry.size);
-  match.BindInt(5, entry.mtime);
-  const int stepped = match.Step();
-  is_in = stepped == SQLITE_ROW;
-  return stepped == SQLITE_ROW || stepped == SQLITE_DONE ? SQLITE_OK : stepped;
+
+  int Where(const QueryNode& node, Candidate& candidate, std::string& where) {
+    switch (node.part) {
+      case Part::WORD:
+        return WhereWord(node, candidate, where);
+      case Part::NAME_PATTERN:
+      case Part::EXACT_NAME:
+      case Part::EXT:
+        where = "name";
+        return SQLITE_OK;
+      case Part::RANGE: {
+        const std::optional<int64_t> number = NumberOf(node, candidate);
+        where = number.has_value() ? NumberText(node, *number) : "none";
+        return SQLITE_OK;
+      }
+      case Part::NEAR: {
+        const std::optional<double> distance = DistanceOf(node, candidate);
+        where = distance.has_value() ? std::to_string(std::llround(*distance)) + " m away" : "none";
+        return SQLITE_OK;
+      }
+      case Part::KIND: {
+        Kind kind = Kind::OTHER;
+        const int code = rows.KindOf(candidate, kind);
+        where = KindText(kind);
+        return code;
+      }
+      default:
+        return SQLITE_OK;
+    }
+  }
+
+  // The fields of its content that hold it, after the name.
+  int WhereWord(const QueryNode& node, Candidate& candidate, std::string& where) {
+    if (check.InName(node, candidate)) {
+      where = "name";
+    }
+    bool in_text = false;
+    int code = check.InText(node, candidate, in_text);
+    if (code != SQLITE_OK || !in_text) {
+      return code;
+    }
+    Statement match;
+    code = match.Prepare(share.reader.database.db,
+                         "SELECT 1 FROM contents.words WHERE words MATCH ?1 AND rowid = ?2");
+    for (size_t number = 1; number <= TEXT_FIELDS + 1 && code == SQLITE_OK; ++number) {
+      QueryNode in_field = node;
+      in_field.scope = number > TEXT_FIELDS ? Scope::TEXT : Scope::FIELD;
+      in_field.field = static_cast<ContentField>(number);
+      const bool is_asked =
+          node.scope == Scope::ANY || (node.scope == in_field.scope &&
+                                       (node.scope == Scope::TEXT || node.field == in_field.field));
+      if (!is_asked) {
+        continue;
+      }
+      const std::string query = TextQueryOf(in_field);
+      match.BindText(1, query);
+      match.BindInt(2, candidate.facts->text);
+      code = match.Step();
+      if (code == SQLITE_ROW) {
+        where += where.empty() ? "" : ", ";
+        where += number > TEXT_FIELDS ? "text" : FieldName(in_field.field);
+      }
+      code = code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+      match.Reset();
+    }
+    return code;
+  }
+
+  AskedShare& share;
+  const Asked& asked;
+  CandidateRows rows;
+  WordSets sets;
+  RowCheck check;
+};
+
+IndexError ExplainIn(AskedShare& share, const Asked& asked, const std::string& path,
+                     Explanation& explanation, std::string& error) {
+  IndexError opened = share.Open(true);
+  if (opened != IndexError::NONE) {
+    error = IndexErrorText(opened);
+    return opened;
+  }
+  if (share.contents_error != IndexError::NONE &&
+      share.contents_error != IndexError::PATH_NOT_FOUND) {
+    error = std::string("contents: ") + IndexErrorText(share.contents_error);
+    return share.contents_error;
+  }
+  Entry entry;
+  if (!share.reader.Find(path, entry)) {
+    error = "not in the index: " + path;
+    return IndexError::PATH_NOT_FOUND;
+  }
+  Explanation made;
+  const int code = Explainer(share, asked).Run(entry, made);
+  if (code != SQLITE_OK) {
+    error = IndexErrorText(FromSqlite(code));
+    return FromSqlite(code);
+  }
+  explanation = std::move(made);
+  return IndexError::NONE;
 }
 
 }  // namespace
 
 IndexError Explain(const Question& question, const std::string& path, Explanation& explanation,
                    std::string& error) {
-  QuestionWords words;
-  if (!words.Read(question.text, error)) {
+  Asked asked;
+  if (!asked.Read(question, error)) {
     return IndexError::OTHER;
   }
-  EntryReader reader;
-  const IndexError opened =
-      question.shares.empty() ? IndexError::PATH_NOT_FOUND : reader.Open(question.shares.front());
-  Entry entry;
-  if (opened != IndexError::NONE || !reader.Find(path, entry)) {
-    error = opened != IndexError::NONE ? IndexErrorText(opened) : "not in the index: " + path;
-    return opened != IndexError::NONE ? opened : IndexError::PATH_NOT_FOUND;
+  if (question.shares.empty()) {
+    error = "in no share: " + path;
+    return IndexError::PATH_NOT_FOUND;
   }
-
-  const IndexError attached = AttachContents(reader.database, question.shares.front());
-  const std::string name = ToUtf8(LastComponent(path));
-  const std::vector<bool> in_name = words.InName(name);
-  Explanation made;
-  made.matches = words.HoldsSigns(name);
-  for (size_t word = 0; word < words.Count(); ++word) {
-    bool in_text = false;
-    if (attached == IndexError::NONE && entry.content_wanted) {
-      const int code = IsInText(reader.database.db, entry, words.ContentQuery(word), in_text);
-      if (code != SQLITE_OK) {
-        error = IndexErrorText(FromSqlite(code));
-        return FromSqlite(code);
-      }
-    }
-    const bool matches = in_name[word] || in_text;
-    made.reasons.push_back(
-        {words.Text(word), matches, in_name[word] ? "name" : in_text ? "text" : ""});
-    made.matches = made.matches && matches;
+  AskedShare share(question.shares.front());
+  try {
+    return ExplainIn(share, asked, path, explanation, error);
+  } catch (const std::exception& failure) {
+    error = failure.what();
+    return IndexError::NO_MEMORY;
   }
-  explanation = std::move(made);
-  return IndexError::NONE;
 }
 
 }  // namespace fileindexd
