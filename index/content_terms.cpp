@@ -12,10 +12,8 @@ namespace fileindexd {
 std::vector<ContentTerm> TermsOf(const Content& content, const std::string& language) {
   std::map<std::string, uint64_t, std::less<>> counts;
   TextCutter cutter(language);
-  const ContentWords words = WordsOf(content);
-  for (const std::string_view column :
-       {std::string_view(words.title), std::string_view(words.fields), words.text}) {
-    cutter.Cut(column, false, [&counts](std::string_view word, size_t, size_t) {
+  const auto count_words = [&](std::string_view text) {
+    cutter.Cut(text, false, [&counts](std::string_view word, size_t, size_t) {
       const auto known = counts.find(word);
       if (known != counts.end()) {
         ++known->second;
@@ -24,7 +22,12 @@ std::vector<ContentTerm> TermsOf(const Content& content, const std::string& lang
       }
       return true;
     });
+  };
+  const ContentWords words = WordsOf(content);
+  for (const std::string_view field : words.fields) {
+    count_words(field);
   }
+  count_words(words.text);
 
   std::vector<ContentTerm> terms;
   terms.reserve(counts.size());
