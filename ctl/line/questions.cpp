@@ -9,11 +9,12 @@ namespace {
 void AddSearch(Declarer& declare) {
   Arguments& into = declare.arguments;
   CLI::App* search = declare.Add(&declare.app, "search", Search, "Search the index, best first",
-                                 "--kind document --under /srv/projects annual report");
+                                 "--kind document --under /srv/projects 'annual report -draft'");
   // For the help alone: the words are taken out before, see SplitSearchArguments.
   search
       ->add_option_function<std::vector<std::string>>(
-          "QUERY", [](const std::vector<std::string>&) {}, "Words, joined by a blank")
+          "QUERY", [](const std::vector<std::string>&) {},
+          "What to find, see below; joined by a blank")
       ->type_name("");
   search->set_help_flag("--help", "Print this help message and exit");
   AddOption(search, "--share", into.in_share, "NAME", "In that share alone");
@@ -33,6 +34,11 @@ void AddSearch(Declarer& declare) {
       ->needs(wait);
   CLI::Option* json = AddJson(search, into, "One JSON object a line; marks count in bytes");
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")->excludes(json);
+  search->footer(
+      "Every word of QUERY must stand in a file's name or content. \"words in a row\", begin*,\n"
+      "-without, one OR another, (groups), name:*.tar.gz, title:word, size:>10M; QUERY.md tells\n"
+      "of all. Options may stand between the words; what follows a lone -- is QUERY.\n\n" +
+      search->get_footer());
 }
 
 void AddInfo(Declarer& declare) {
