@@ -255,6 +255,8 @@ TEST_P(DoorsTest, AmountsAreBounded) {
     beyond += Refused(getrlimit(RLIMIT_CPU, &limit) != 0 || limit.rlim_cur > PROCESSOR_SECONDS + 10,
                       "processor");
     beyond += RefreshProcessorTime() ? "" : "no-refresh ";
+    limit = {RLIM_INFINITY, RLIM_INFINITY};
+    beyond += Refused(setrlimit(RLIMIT_CPU, &limit) == 0, "more-processor");
     return beyond;
   });
   EXPECT_EQ(told, "");
