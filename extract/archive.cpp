@@ -4,7 +4,9 @@
 #include <string>
 #include <string_view>
 
+#include "extract/charset.h"
 #include "extract/format.h"
+#include "extract/media_text.h"
 #include "extract/memory_file.h"
 #include "extract/nested.h"
 #include "extract/unpacker.h"
@@ -67,6 +69,19 @@ bool ReadBare(Unpacker& archive, const Document& document, ContentSink& sink, st
   return is_good;
 }
 
+// All of them together tell their charset better than each for itself.
+void SetForeignNames(std::string_view names, ContentSink& sink) {
+  if (names.empty()) {
+    return;
+  }
+  const std::string known = ToUtf8(names, GuessNamesCharset(names));
+  for (std::string_view rest = known; !rest.empty();) {
+    const size_t end = std::min(rest.find('\n'), rest.size() - 1);
+    sink.Set(ContentField::MEMBERS, rest.substr(0, end));
+    rest.remove_prefix(end + 1);
+  }
+}
+
 }  // namespace
 
 bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) {
@@ -82,13 +97,18 @@ bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) 
 
   int names = 0;
   int read = 0;
+  std::string foreign;  // names in a charset that the archive does not tell, a line each
   bool is_encrypted = false;
   while (names < MAX_NAMES && archive.Next()) {
     if (archive.is_bare) {
       return ReadBare(archive, document, sink, why);
     }
     ++names;
-    sink.Set(ContentField::MEMBERS, archive.name);
+    if (IsUtf8(archive.name)) {
+      sink.Set(ContentField::MEMBERS, archive.name);
+    } else if (foreign.size() < ContentSink::MAX_FIELD) {
+      foreign += archive.name + "\n";
+    }
     is_encrypted = is_encrypted || archive.is_encrypted;
     if (archive.is_file && !archive.is_encrypted && !sink.IsFull() && !IsWordless(archive.name) &&
         allowance.TakeMember()) {
@@ -96,7 +116,8 @@ bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) 
       ReadMember(archive, document, sink);
     }
   }
-  if (is_encrypted && read == 0) {
+  SetForeignNames(foreign, sink);
+  if ((is_encrypted && read == 0) || archive.is_closed) {
     why = "encrypted";
   } else if (archive.is_damaged) {
     why = names == 0 ? "not an archive" : "damaged";

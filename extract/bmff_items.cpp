@@ -154,6 +154,8 @@ std::string_view ItemBytes(std::string_view payload, uint64_t wanted, std::strin
   if (offset_size > 8 || length_size > 8 || base_size > 8 || index_size > 8) {
     return {};
   }
+  // Extents that take no bytes would be counted to any number without an end.
+  const uint64_t most = index_size + offset_size + length_size == 0 ? 1 : UINT16_MAX;
   const uint64_t count = cursor.Number(version < 2 ? 2 : 4);
   for (uint64_t i = 0; i < count && i < MAX_ITEMS && cursor.is_good; i++) {
     const uint64_t item = cursor.Number(version < 2 ? 2 : 4);
@@ -161,6 +163,9 @@ std::string_view ItemBytes(std::string_view payload, uint64_t wanted, std::strin
     (void)cursor.Number(2);  // In which file: always this one.
     const uint64_t base = cursor.Number(base_size);
     const uint64_t extents = cursor.Number(2);
+    if (extents > most) {
+      return {};
+    }
     uint64_t offset = 0;
     uint64_t length = 0;
     for (uint64_t extent = 0; extent < extents && cursor.is_good; extent++) {

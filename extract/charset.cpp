@@ -109,6 +109,35 @@ std::string GuessCharset(std::string_view bytes) {
   return found.empty() || found == "ASCII" || found == "UTF-8" ? LIKELIEST : found;
 }
 
+std::string GuessNamesCharset(std::string_view names) {
+  const std::string guess = MeantCharset(GuessCharset(names));
+  // Short names look like anything: letters of the East come in rows, Cyrillic ones as well, those
+  // of the West one at a time.
+  const std::string text = ToUtf8(names, guess);
+  size_t high = 0;
+  size_t in_rows = 0;
+  bool was_high = false;
+  for (std::string_view rest = text; !rest.empty();) {
+    const Character character = FirstCharacter(rest);
+    const bool is_high = character.code >= 0x370;
+    high += is_high ? 1 : 0;
+    in_rows += is_high && was_high ? 1 : 0;
+    was_high = is_high;
+    rest.remove_prefix(character.length);
+  }
+  if (in_rows * 2 >= high && in_rows > 0) {
+    return guess;
+  }
+  // DOS has its letters where others have controls and signs, and lines where they have letters.
+  const auto count = [names](unsigned char first, unsigned char last) {
+    return std::count_if(names.begin(), names.end(), [first, last](char byte) {
+      const auto code = static_cast<unsigned char>(byte);
+      return code >= first && code <= last;
+    });
+  };
+  return count(0x80, 0xA5) > count(0xB0, 0xFF) ? "CP437" : "CP1252";
+}
+
 std::string MeantCharset(std::string_view label) {
   // As the web's standard for encodings maps its labels; but of ASCII, bytes beyond it tell more.
   constexpr std::pair<std::string_view, const char*> MEANT[] = {

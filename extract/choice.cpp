@@ -141,6 +141,9 @@ bool IsStillPackage(Format named, Format seen, const Content& found, const std::
 }  // namespace
 
 bool LoadMagic(std::string& error) {
+  if (Around().magic != nullptr) {
+    return true;
+  }
   // Not what is inside compressed files, and nothing that runs a program for it.
   magic_t magic = magic_open(MAGIC_MIME_TYPE | MAGIC_NO_CHECK_COMPRESS | MAGIC_NO_CHECK_ELF);
   if (magic == nullptr || magic_load(magic, nullptr) != 0) {

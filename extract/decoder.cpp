@@ -120,6 +120,11 @@ class Decoding {
 
 }  // namespace
 
+std::string ToUtf8(std::string_view bytes, const std::string& charset) {
+  Iconv converter;
+  return converter.Open(charset) ? converter.Convert(bytes) : std::string(bytes);
+}
+
 bool DecodeText(const Document& document, const CharsetFinder& declared, const TextTaker& take,
                 std::string& why) {
   const Allowance allowance;

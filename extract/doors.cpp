@@ -46,6 +46,7 @@ bool CloseDoors(Doors& doors, std::string& error) {
   // The order matters: an own root takes a capability; Landlock's rules are made while everything
   // can be named, and hold once no new privileges can be had; limits on processes count against the
   // user, and are refused by none; the system calls go last.
+  GoFirst();
   const RunTimeFiles files = FindRunTimeFiles(doors.converter);
   LandlockRules rules;
   const bool has_landlock = doors.has_landlock && LandlockVersion() >= 1;

@@ -24,9 +24,12 @@ struct Converter;
 
 // Bounds of what one file may cost.
 constexpr uint64_t ADDRESS_SPACE = uint64_t{1} << 30;  // not where a sanitizer watches
-constexpr uint64_t MEMORY_FILE = uint64_t{64} << 20;   // each, of those in memory
-constexpr uint64_t OPEN_FILES = 32;
+// Files in memory are no part of the address space: each of them, and how many are open at a time.
+constexpr uint64_t MEMORY_FILE = uint64_t{48} << 20;
+constexpr uint64_t OPEN_FILES = 16;
 constexpr uint64_t PROCESSOR_SECONDS = 60;
+// Of a helper, all its files together; cannot be raised by it.
+constexpr uint64_t PROCESSOR_SECONDS_OF_ALL = 3600;
 
 struct Doors {
   int parent = 0;                        // its process number: when it ends, so does this process
@@ -40,7 +43,7 @@ struct Doors {
 // read.
 bool CloseDoors(Doors& doors, std::string& error);
 
-// The next file's share of processor time begins. False with errno.
+// The next file's share of processor time begins. False where no whole one is left, or with errno.
 bool RefreshProcessorTime();
 
 }  // namespace fileindexd

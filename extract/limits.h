@@ -4,6 +4,9 @@
 
 namespace fileindexd {
 
+// Where the host runs short of memory, the process is the first to go. While files can be opened.
+void GoFirst();
+
 // False with errno.
 bool SetLimits();
 

@@ -11,6 +11,7 @@ add_library(extract_media STATIC
   audio_stream.cpp
   audio_tags.cpp
   bmff_items.cpp
+  gif_comment.cpp
   media_text.cpp
   photo.cpp
   photo_fields.cpp
@@ -26,6 +27,7 @@ check_headers(extract_media
   audio_stream.h
   audio_tags.h
   bmff_items.h
+  gif_comment.h
   media_text.h
   photo_fields.h
   photo_values.h

@@ -29,9 +29,9 @@ bool IsPageEdge(std::string_view name) {
   return name.ends_with("Header") || name.ends_with("Footer");
 }
 
-// Their text is mixed with marks: &L, &C and &R begin a third of the line, &"font", &12 and &K with
-// six digits change the look, && is the letter itself, and others stand for a number or a name.
-std::string WithoutMarks(std::string_view line) {
+}  // namespace
+
+std::string WithoutPageMarks(std::string_view line) {
   std::string words;
   for (size_t at = 0; at < line.size(); ++at) {
     if (line[at] != '&') {
@@ -54,8 +54,6 @@ std::string WithoutMarks(std::string_view line) {
   }
   return words;
 }
-
-}  // namespace
 
 void SetDate(ContentField field, std::string_view text, ContentSink& sink) {
   const std::optional<int64_t> date = ParseIsoDate(text);
@@ -119,7 +117,7 @@ void AddSheetWords(XmlPart& part, ContentSink& sink) {
     } else if (begins && part.name == "rPh") {
       part.Skip();
     } else if (begins && IsPageEdge(part.name)) {
-      sink.AddText(WithoutMarks(TextOfElement(part)) + "\n");
+      sink.AddText(WithoutPageMarks(TextOfElement(part)) + "\n");
     }
   }
 }

@@ -24,6 +24,11 @@ void ReadOdfMeta(XmlPart& part, ContentSink& sink);
 // META-INF/manifest.xml.
 bool IsOdfEncrypted(XmlPart& part);
 
+// The words of a sheet's head or foot, which is mixed with marks: &L, &C and &R begin a third of
+// the line, &"font", &12 and &K with six digits change the look, && is the letter itself, and
+// others stand for a number or a name.
+std::string WithoutPageMarks(std::string_view line);
+
 // Of dates: sets it if it is one.
 void SetDate(ContentField field, std::string_view text, ContentSink& sink);
 // The text up to the end of the element that has just begun.

@@ -8,6 +8,7 @@
 
 #include "extract/bmff_items.h"
 #include "extract/format.h"
+#include "extract/gif_comment.h"
 #include "extract/media_text.h"
 #include "extract/photo_fields.h"
 
@@ -124,6 +125,11 @@ bool ReadPicture(int type, const Mapping& mapping, ContentSink& sink, std::strin
     }
     PutSize(image->pixelWidth(), image->pixelHeight(), sink);
     PutPhotoFields(*image, sink);
+    if (type == Exiv2::ImageType::gif) {
+      sink.Set(ContentField::CAPTION,
+               Trimmed(Utf8Of(GifComment({static_cast<const char*>(mapping.bytes), mapping.size},
+                                         ContentSink::MAX_FIELD))));
+    }
   } catch (const std::exception&) {
     is_whole = false;
   }

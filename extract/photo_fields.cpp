@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/photo_fields.h"
 
+#include <algorithm>
 #include <exiv2/easyaccess.hpp>
 #include <exiv2/exif.hpp>
 #include <exiv2/iptc.hpp>
@@ -85,6 +86,20 @@ std::string Camera(const Exiv2::Image& image) {
   return maker + " " + model;
 }
 
+// What makers write in their own notes, mostly a number, by the library's tables.
+std::string LensOfMaker(const Exiv2::ExifData& exif) {
+  const auto found = Exiv2::lensName(exif);
+  if (found == exif.end()) {
+    return {};
+  }
+  const std::string name = Utf8Of(found->print(&exif));
+  // A number that no table has is shown as it is, "(255)", or said to be unknown.
+  const bool is_name = std::any_of(name.begin(), name.end(), [](unsigned char letter) {
+    return (letter | 0x20) >= 'a' && (letter | 0x20) <= 'z';
+  });
+  return is_name && name[0] != '(' && name != "n/a" && !name.starts_with("Unknown") ? name : "";
+}
+
 std::string Lens(const Exiv2::Image& image) {
   const Exiv2::ExifData& exif = image.exifData();
   for (const char* key : {"Exif.Photo.LensModel", "Exif.Canon.LensModel",
@@ -100,7 +115,7 @@ std::string Lens(const Exiv2::Image& image) {
       return lens;
     }
   }
-  return {};
+  return LensOfMaker(exif);
 }
 
 void PutTexts(const Exiv2::Image& image, ContentSink& sink) {
@@ -114,6 +129,7 @@ void PutTexts(const Exiv2::Image& image, ContentSink& sink) {
   sink.Set(ContentField::CAPTION, ExifText(exif, "Exif.Image.ImageDescription"));
   sink.Set(ContentField::CAPTION, ExifComment(exif));
   sink.Set(ContentField::CAPTION, ExifWideText(exif, "Exif.Image.XPComment"));
+  sink.Set(ContentField::CAPTION, Trimmed(Utf8Of(image.comment())));  // of the file, not the photo
 
   sink.Set(ContentField::TITLE, Joined(XmpTexts(xmp, "Xmp.dc.title")));
   sink.Set(ContentField::TITLE, Joined(IptcTexts(iptc, "Iptc.Application2.ObjectName")));

@@ -20,6 +20,10 @@ namespace {
 
 enum RecordType : uint16_t {
   RECORD_MASTER = 0x03F8,
+  RECORD_STRING = 0x0FBA,  // of many uses; its instance tells which
+  RECORD_PAGE_EDGES = 0x0FD9,
+  RECORD_TAG_DATA = 0x138B,  // records of later versions
+  RECORD_COMMENT = 0x2EE0,
   RECORD_TEXT_WIDE = 0x0FA0,
   RECORD_TEXT_SHORT = 0x0FA8,
   RECORD_HANDOUT = 0x0FC9,
@@ -58,7 +62,7 @@ class SlidesText {
   void Add() {
     const Allowance allowance;
     if (objects.empty()) {
-      AddRecords(0, bytes.Size(), 0);
+      AddRecords(0, bytes.Size(), 0, 0);
       return;
     }
     std::set<size_t> done;
@@ -67,7 +71,7 @@ class SlidesText {
         return;
       }
       if (done.insert(object.second).second) {
-        AddRecord(object.second, bytes.Size(), 0);
+        AddRecord(object.second, bytes.Size(), 0, 0);
       }
     }
   }
@@ -90,14 +94,20 @@ class SlidesText {
     }
   }
 
-  void AddRecords(size_t begin, size_t end, int depth) {
+  void AddRecords(size_t begin, size_t end, uint16_t around, int depth) {
     for (size_t at = begin; at + HEADER <= end && !sink.IsFull();) {
-      at = AddRecord(at, end, depth);
+      at = AddRecord(at, end, around, depth);
     }
   }
 
-  // Returns where the next one begins.
-  size_t AddRecord(size_t at, size_t end, int depth) {
+  // Heads and feet of pages, and who says what in a comment.
+  static bool IsWord(uint16_t around, uint16_t instance) {
+    return (around == RECORD_PAGE_EDGES && instance <= 2) ||
+           (around == RECORD_COMMENT && instance <= 1);
+  }
+
+  // `around` is the type of the record that holds it. Returns where the next one begins.
+  size_t AddRecord(size_t at, size_t end, uint16_t around, int depth) {
     constexpr uint16_t CONTAINER = 0xF;
     const uint16_t version = bytes.Word(at) & 0xF;
     const uint16_t instance = static_cast<uint16_t>(bytes.Word(at) >> 4);
@@ -112,9 +122,10 @@ class SlidesText {
     // Masters hold "click to edit"; their texts are the list of the instance 1.
     const bool is_master =
         type == RECORD_MASTER || type == RECORD_HANDOUT || (type == RECORD_TEXTS && instance == 1);
-    if (version == CONTAINER && !is_master && depth < MAX_DEPTH) {
-      AddRecords(begin, record_end, depth + 1);
-    } else if (type == RECORD_TEXT_WIDE) {
+    const bool holds_records = version == CONTAINER || type == RECORD_TAG_DATA;
+    if (holds_records && !is_master && depth < MAX_DEPTH) {
+      AddRecords(begin, record_end, type, depth + 1);
+    } else if (type == RECORD_TEXT_WIDE || (type == RECORD_STRING && IsWord(around, instance))) {
       sink.AddText(Utf16ToUtf8(bytes.Part(begin, record_end - begin)));
       sink.AddText("\n");
     } else if (type == RECORD_TEXT_SHORT) {

@@ -38,11 +38,12 @@ constexpr const char* ALWAYS[] = {
     "time", "nanosleep", "clock_nanosleep", "clock_nanosleep_time64", "getrandom", "uname",
     "sysinfo"};
 
-// What goes by a path: needs the walls of Landlock or of an own root around it.
-constexpr const char* BY_PATH[] = {"stat",      "stat64",     "lstat",     "lstat64",
-                                   "fstatat64", "newfstatat", "statx",     "statfs",
-                                   "statfs64",  "access",     "faccessat", "faccessat2",
-                                   "readlink",  "readlinkat", "getdents",  "getdents64"};
+// What goes by a path: needs the walls of Landlock or of an own root around it. Landlock hides what
+// is in files and folders, but not that they are there, nor their attributes; libraries ask for
+// those of their own files, and a filter cannot see for which.
+constexpr const char* BY_PATH[] = {"stat",       "stat64",     "lstat",    "lstat64",   "fstatat64",
+                                   "newfstatat", "statx",      "statfs",   "statfs64",  "access",
+                                   "faccessat",  "faccessat2", "getdents", "getdents64"};
 
 // About a descriptor of its own. Not its mode, locks, seals, owner: those of a file that it was
 // handed are the service's, too, and an owner is sent signals.
@@ -103,7 +104,8 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
     filter.Allow("openat", SCMP_A2(SCMP_CMP_MASKED_EQ, WRITING, 0));
     filter.Allow("open", SCMP_A1(SCMP_CMP_MASKED_EQ, WRITING, 0));
   } else {
-    // The C library looks at descriptors through this one.
+    // The C library looks at descriptors through this one, with this flag and an empty path. Other
+    // attributes can be asked for so, as behind Landlock: a filter cannot see the path.
     filter.Allow("newfstatat", SCMP_A3(SCMP_CMP_MASKED_EQ, AT_EMPTY_PATH, AT_EMPTY_PATH));
   }
   // Its own limits can be asked for; of them processor time alone is set anew, for each file.

@@ -95,16 +95,24 @@ std::string FirstOf(MediaInfo& parser, std::initializer_list<std::string_view> n
   return {};
 }
 
+// A clock that was never set: the first moment of its count.
+bool IsUnset(int64_t clock) {
+  constexpr int64_t YEAR_1904 = -2082844800;
+  return clock == 0 || clock == YEAR_1904;
+}
+
 // When the film was recorded. A day without a time is one of publication more often than not.
 std::optional<int64_t> Recorded(MediaInfo& parser) {
   const std::string recorded = FirstOf(parser, {"Recorded_Date"});
-  if (recorded.find(':') != std::string::npos) {
-    if (const auto clock = ClockOf(recorded)) {
+  const bool has_time = recorded.find(':') != std::string::npos;
+  const std::string encoded = FirstOf(parser, {"Encoded_Date", "Mastered_Date"});
+  for (const std::string& text : {has_time ? recorded : "", encoded, recorded}) {
+    const std::optional<int64_t> clock = ClockOf(text);
+    if (clock && !IsUnset(*clock)) {
       return clock;
     }
   }
-  const auto clock = ClockOf(FirstOf(parser, {"Encoded_Date", "Mastered_Date"}));
-  return clock ? clock : ClockOf(recorded);
+  return std::nullopt;
 }
 
 // The names under which people look for them, beside those of the standards.

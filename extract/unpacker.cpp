@@ -127,6 +127,7 @@ bool Unpacker::Next() {
   const int code = archive_read_next_header(packed, &entry);
   if (!IsUsable(code)) {
     is_damaged = code != ARCHIVE_EOF;
+    is_closed = is_damaged && archive_read_has_encrypted_entries(packed) > 0;
     return false;
   }
   const char* path = archive_entry_pathname(entry);

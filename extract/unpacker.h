@@ -48,7 +48,8 @@ class Unpacker {
   bool is_encrypted = false;
 
   bool is_damaged = false;
-  bool is_bare = false;  // no archive, one compressed file
+  bool is_closed = false;  // not even the names can be had without a password
+  bool is_bare = false;    // no archive, one compressed file
 
  private:
   bool UseFormats(Formats formats);

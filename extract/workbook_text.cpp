@@ -13,6 +13,7 @@
 
 #include "extract/little_endian.h"
 #include "extract/nested.h"
+#include "extract/office_words.h"
 #include "extract/old_office.h"
 #include "extract/utf16.h"
 
@@ -21,6 +22,8 @@ namespace fileindexd {
 namespace {
 
 enum RecordType : uint16_t {
+  RECORD_PAGE_HEAD = 0x14,
+  RECORD_PAGE_FOOT = 0x15,
   RECORD_FILEPASS = 0x2F,
   RECORD_CONTINUE = 0x3C,
   RECORD_BOUNDSHEET = 0x85,
@@ -214,6 +217,10 @@ class WorkbookText {
       case RECORD_LABEL:
         pieces.Skip(6);
         Add(ReadString(pieces, pieces.Word()));
+        break;
+      case RECORD_PAGE_HEAD:
+      case RECORD_PAGE_FOOT:
+        Add(WithoutPageMarks(ReadString(pieces, pieces.Word())));
         break;
       case RECORD_STRING:
         Add(ReadString(pieces, pieces.Word()));

@@ -22,6 +22,7 @@
 #include <functional>
 #include <string>
 
+#include "base/landlock.h"
 #include "base/scoped_fd.h"
 #include "extract/converters.h"
 #include "extract/sanitized.h"
@@ -71,6 +72,20 @@ std::string OpenForReading() {
     open_ones += Refused(open(path, O_RDONLY | O_CLOEXEC) >= 0, path);
   }
   return open_ones;
+}
+
+std::string LookAtFiles() {
+  std::string seen;
+  struct stat info = {};
+  struct statx more = {};
+  char target[64];
+  seen += Refused(stat("/etc/passwd", &info) == 0, "stat");
+  seen += Refused(lstat("/etc/passwd", &info) == 0, "lstat");
+  seen += Refused(statx(AT_FDCWD, "/etc/passwd", 0, STATX_ALL, &more) == 0, "statx");
+  seen += Refused(access("/etc/passwd", F_OK) == 0, "access");
+  seen += Refused(readlink("/proc/self/cwd", target, sizeof(target)) >= 0, "readlink");
+  seen += Refused(readlink("/etc/mtab", target, sizeof(target)) >= 0, "readlink");
+  return seen;
 }
 
 std::string ChangeFiles(const std::string& folder) {
@@ -191,6 +206,11 @@ TEST_P(DoorsTest, NothingOfTheSystemCanBeOpened) {
   EXPECT_EQ(Behind(Kind(), OpenForReading), "");
 }
 
+TEST_P(DoorsTest, FilesAreNotSeenButBehindLandlockThatTheyAreThere) {
+  const bool is_landlock = GetParam() == 0 && LandlockVersion() >= 1;
+  EXPECT_EQ(Behind(Kind(), LookAtFiles), is_landlock ? "stat lstat statx access " : "");
+}
+
 TEST_P(DoorsTest, NothingCanBeChanged) {
   EXPECT_EQ(Behind(Kind(), [this] { return ChangeFiles(folder); }), "");
 }
@@ -255,6 +275,8 @@ TEST_P(DoorsTest, AmountsAreBounded) {
     beyond += Refused(getrlimit(RLIMIT_CPU, &limit) != 0 || limit.rlim_cur > PROCESSOR_SECONDS + 10,
                       "processor");
     beyond += RefreshProcessorTime() ? "" : "no-refresh ";
+    limit = {RLIM_INFINITY, RLIM_INFINITY};
+    beyond += Refused(setrlimit(RLIMIT_CPU, &limit) == 0, "more-processor");
     return beyond;
   });
   EXPECT_EQ(told, "");

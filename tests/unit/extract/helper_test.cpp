@@ -61,6 +61,9 @@ TEST_F(HelperTest, ItStandsBehindItsDoors) {
   EXPECT_EQ(StatusLine(helper, "CapEff"), "0000000000000000");
   EXPECT_EQ(StatusLine(helper, "CapPrm"), "0000000000000000");
   EXPECT_EQ(StatusLine(helper, "CapBnd"), "0000000000000000");
+  std::string score;
+  std::ifstream("/proc/" + std::to_string(helper) + "/oom_score_adj") >> score;
+  EXPECT_EQ(score, "1000");
   if (geteuid() == 0) {
     EXPECT_EQ(StatusLine(helper, "Uid"), "65534\t65534\t65534\t65534");
     EXPECT_EQ(StatusLine(helper, "Groups"), " ");

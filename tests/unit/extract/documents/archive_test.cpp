@@ -3,6 +3,7 @@
 #include <archive_entry.h>
 
 #include "extract/nested.h"
+#include "tests/unit/extract/documents/compound.h"
 #include "tests/unit/extract/documents/fixture.h"
 #include "tests/unit/extract/documents/packing.h"
 
@@ -27,10 +28,57 @@ const Case CASES[] = {
     {"a.tar.zst", {ARCHIVE_FORMAT_TAR_PAX_RESTRICTED, ARCHIVE_FILTER_ZSTD, "", ""}},
     {"a.tar.lz4", {ARCHIVE_FORMAT_TAR_PAX_RESTRICTED, ARCHIVE_FILTER_LZ4, "", ""}},
     {"a.tar.lz", {ARCHIVE_FORMAT_TAR_PAX_RESTRICTED, ARCHIVE_FILTER_LZIP, "", ""}},
+    {"a.tar.lzma", {ARCHIVE_FORMAT_TAR_PAX_RESTRICTED, ARCHIVE_FILTER_LZMA, "", ""}},
     {"a.tar.Z", {ARCHIVE_FORMAT_TAR_PAX_RESTRICTED, ARCHIVE_FILTER_COMPRESS, "", ""}},
     {"a.7z", {ARCHIVE_FORMAT_7ZIP, ARCHIVE_FILTER_NONE, "", ""}},
     {"a.iso", {ARCHIVE_FORMAT_ISO9660, ARCHIVE_FILTER_NONE, "", ""}},
 };
+
+std::string FromHex(std::string_view digits) {
+  std::string bytes;
+  for (size_t at = 0; at + 1 < digits.size(); at += 2) {
+    bytes += static_cast<char>(std::stoi(std::string(digits.substr(at, 2)), nullptr, 16));
+  }
+  return bytes;
+}
+
+// Made by an archiver: one file, password "secret", names encrypted as well.
+const std::string CLOSED_7Z = FromHex(
+    "377abcaf271c0004bbbdd21480000000000000002e00000000000000f0eddfe0afe4c9ac4323ef377281da972cfbf0"
+    "725930ba2cd56bb12033cb3257a1186d03816058db98fde6a50c75dc232b351bc79a5128c0cd9d7cde8179bc92931d"
+    "13c7a4e52dcb4ff0287ed764af252c3ef1580cdc0c54b15ac553f33f75776ae03451173caf9e103cf87c6be72d9342"
+    "92498dfc40db20a059d76714e8511b652d535917061001097000070b0100012406f1070112530f4a1c54130520c449"
+    "7eebdce031ae8f770c620a0199c5b23e0000");
+
+uint32_t Crc32(std::string_view bytes) {
+  uint32_t crc = ~0U;
+  for (const char byte : bytes) {
+    crc ^= static_cast<uint8_t>(byte);
+    for (int bit = 0; bit < 8; ++bit) {
+      crc = crc >> 1 ^ ((crc & 1) != 0 ? 0xEDB88320U : 0U);
+    }
+  }
+  return ~crc;
+}
+
+std::string RarBlock(const std::string& head) {
+  return Le16(Crc32(head) & 0xFFFF) + head;
+}
+
+// Members as they are; `flags` of the whole.
+std::string Rar(const std::vector<Member>& members, uint32_t flags = 0) {
+  std::string rar = std::string("Rar!\x1A\x07\0", 7) +
+                    RarBlock('\x73' + Le16(flags) + Le16(13) + std::string(6, '\0'));
+  for (const Member& member : members) {
+    const auto size = static_cast<uint32_t>(member.bytes.size());
+    const auto name_size = static_cast<uint32_t>(member.name.size());
+    rar += RarBlock('\x74' + Le16(0x8000) + Le16(32 + name_size) + Le32(size) + Le32(size) + '\3' +
+                    Le32(Crc32(member.bytes)) + Le32(0x58000000) + '\x14' + '\x30' +
+                    Le16(name_size) + Le32(0x81A4) + member.name) +
+           member.bytes;
+  }
+  return rar + RarBlock('\x7B' + Le16(0x4000) + Le16(7));
+}
 
 class ArchiveFormatTest : public testing::TestWithParam<Case> {};
 
@@ -129,6 +177,39 @@ TEST(ArchiveTest, AnEncryptedArchiveKeepsItsNames) {
   EXPECT_EQ(reading.content.text, "");
 }
 
+TEST(ArchiveTest, EncryptedNamesAreSaidToBe) {
+  EXPECT_EQ(ReadBytes(ReadArchive, "a.7z", CLOSED_7Z).why, "encrypted");
+  EXPECT_EQ(ReadBytes(ReadArchive, "a.rar", Rar({{"a.txt", "words"}}, 0x80)).why, "encrypted");
+}
+
+TEST(ArchiveTest, MembersOfARarAreFound) {
+  const std::string rar = Rar({{"notes\\first.txt", "the red harbour"}, {"b.md", "a green gate"}});
+  const Reading reading = ReadBytes(ReadArchive, "a.rar", rar);
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.Text(ContentField::MEMBERS), "notes/first.txt\nb.md");
+  EXPECT_EQ(reading.content.text, "the red harbour a green gate");
+  ExpectSurvivesDamage(ReadArchive, "a.rar", rar);
+}
+
+TEST(ArchiveTest, NamesInAnotherCharsetAreGuessed) {
+  const struct {
+    const char* charset;
+    const char* names[2];
+  } rows[] = {{"CP437", {"Gr\u00fc\u00dfe.txt", "M\u00e4rz.txt"}},
+              {"CP1252", {"Gr\u00fc\u00dfe.txt", "\u00c9t\u00e9.txt"}},
+              {"CP932", {"\u65e5\u672c\u8a9e\u306e\u6587\u66f8.txt", "\u30c6\u30b9\u30c8.txt"}},
+              {"GBK", {"\u8ba1\u5212\u62a5\u544a.txt", "\u8fd9\u662f\u4e2d\u6587.txt"}}};
+  for (const auto& row : rows) {
+    const Reading reading = ReadBytes(ReadArchive, "a.zip",
+                                      Packed({ARCHIVE_FORMAT_ZIP, ARCHIVE_FILTER_NONE,
+                                              "zip:hdrcharset=" + std::string(row.charset), ""},
+                                             {{row.names[0], "x"}, {row.names[1], "y"}}));
+    EXPECT_EQ(reading.Text(ContentField::MEMBERS), std::string(row.names[0]) + "\n" + row.names[1])
+        << row.charset;
+  }
+}
+
 TEST(ArchiveTest, ArchivesInArchivesAreReadToTheirDepth) {
   EXPECT_EQ(ReadBytes(ReadArchive, "a.zip", Nested(Allowance::MAX_DEPTH)).content.text, "kernel");
   const Reading deeper = ReadBytes(ReadArchive, "a.zip", Nested(Allowance::MAX_DEPTH + 1));
@@ -143,9 +224,10 @@ TEST(ArchiveTest, MembersFieldsAreNotTheArchives) {
 }
 
 TEST(ArchiveTest, ABadMemberDoesNotHideItsNeighbours) {
-  const Reading reading =
-      ReadBytes(ReadArchive, "a.zip",
-                Zipped({{"a.pdf", "no such thing"}, {"b.zip", "PK"}, {"c.txt", "survivor"}}));
+  const Reading reading = ReadBytes(ReadArchive, "a.zip",
+                                    Zipped({{"a.pdf", "%PDF-1.4 no such thing"},
+                                            {"b.zip", std::string("PK\3\4", 4)},
+                                            {"c.txt", "survivor"}}));
 
   EXPECT_TRUE(reading.is_good) << reading.why;
   EXPECT_EQ(reading.content.text, "survivor");

@@ -54,13 +54,29 @@ std::string PptRecord(uint32_t instance_version, uint32_t type, const std::strin
   return Le16(instance_version) + Le16(type) + Le32(static_cast<uint32_t>(bytes.size())) + bytes;
 }
 
+std::string PageFoot() {
+  return PptRecord(15, 0xFD9, PptRecord(0x20, 0xFBA, Wide(u"foot")));
+}
+
+// In what later versions add; strings of other uses around it.
+std::string Comment() {
+  const std::string comment =
+      PptRecord(15, 0x2EE0,
+                PptRecord(0, 0xFBA, Wide(u"Speaker")) + PptRecord(0x10, 0xFBA, Wide(u"louder")) +
+                    PptRecord(0x20, 0xFBA, Wide(u"S")));
+  return PptRecord(
+      15, 0x1388,
+      PptRecord(15, 0x138A,
+                PptRecord(0, 0xFBA, Wide(u"___PPT10")) + PptRecord(0, 0x138B, comment)));
+}
+
 // One slide that was saved twice, and a master.
 std::string Ppt(uint32_t token = 0xE391C05F) {
   const std::string old_slide = PptRecord(15, 0x3EE, PptRecord(0, 0xFA8, "deleted words"));
   const std::string slide = PptRecord(
       15, 0x3EE,
       PptRecord(15, 0x40C, PptRecord(15, 0xF00D, PptRecord(0, 0xFA0, Wide(u"\u8ba1\u5212")))) +
-          PptRecord(0, 0xFA8, "caf\xe9"));
+          PptRecord(0, 0xFA8, "caf\xe9") + PageFoot() + Comment());
   const std::string master = PptRecord(15, 0x3F8, PptRecord(0, 0xFA8, "click to edit"));
   std::string stream = old_slide;
   const auto directory1 = static_cast<uint32_t>(stream.size());
@@ -127,10 +143,12 @@ TEST(OldOfficeTest, StringsAndNumbersOfAWorkbookAreFound) {
                     Record(0xBD, Le32(0) + Le16(0) + Le32(7 << 2 | 2) + Le16(0) + Le32(8 << 2 | 2) +
                                      Le16(1)) +
                     Record(0x06, CELL + std::string("\0\0\0\0\0\0\xff\xff", 8)) +
-                    Record(0x207, Narrow("computed"))));
+                    Record(0x207, Narrow("computed")) + Record(0x14, "") +
+                    Record(0x15, Narrow("&LTide &P&R&\"Arial\"&12tables"))));
 
   ASSERT_TRUE(reading.is_good) << reading.why;
-  EXPECT_EQ(reading.content.text, "Sheet quay harb\u00f6urs third label 42.5 12.34 7 8 computed");
+  EXPECT_EQ(reading.content.text,
+            "Sheet quay harb\u00f6urs third label 42.5 12.34 7 8 computed Tide tables");
   EXPECT_EQ(reading.Text(ContentField::TITLE), "Dues");
   EXPECT_EQ(reading.Text(ContentField::AUTHOR), "Clerk");
 }
@@ -139,7 +157,7 @@ TEST(OldOfficeTest, OfSlidesTheLastSavedTextIsFoundMastersAreNot) {
   const Reading reading = ReadBytes(ReadOldOffice, "a.ppt", Ppt());
 
   ASSERT_TRUE(reading.is_good) << reading.why;
-  EXPECT_EQ(reading.content.text, "\u8ba1\u5212 caf\u00e9");
+  EXPECT_EQ(reading.content.text, "\u8ba1\u5212 caf\u00e9 foot Speaker louder");
   EXPECT_EQ(reading.Text(ContentField::TITLE), "Talk");
 }
 

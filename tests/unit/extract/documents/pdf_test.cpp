@@ -105,13 +105,22 @@ TEST(PdfTest, WhatIsNoPdfIsSaidInWords) {
 }
 
 TEST(PdfTest, AClaimOfEndlessPagesEnds) {
-  const Reading reading =
-      ReadBytes(ReadPdf, "a.pdf",
-                PdfOf({"<< /Type /Catalog /Pages 2 0 R >>",
-                       "<< /Type /Pages /Kids [4 0 R] /Count 2000000000 >>", FONT, PageOf(5),
-                       Stream("BT /F 12 Tf (alone) Tj ET"), INFO}));
+  const auto claiming = [](const std::string& count) {
+    return PdfOf({"<< /Type /Catalog /Pages 2 0 R >>",
+                  "<< /Type /Pages /Kids [4 0 R] /Count " + count + " >>", FONT, PageOf(5),
+                  Stream("BT /F 12 Tf 20 300 Td (alone) Tj ET"), INFO});
+  };
+  // More than there are objects: the library believes nothing of it.
+  const Reading endless = ReadBytes(ReadPdf, "a.pdf", claiming("2000000000"));
+  EXPECT_EQ(endless.why, "damaged");
+  EXPECT_EQ(endless.Text(ContentField::TITLE), "Harbour dues");
+  EXPECT_EQ(endless.Number(ContentField::PAGES), std::nullopt);
+  EXPECT_EQ(endless.content.text, "");
 
-  EXPECT_EQ(reading.is_good, reading.why.empty());
+  const Reading more = ReadBytes(ReadPdf, "a.pdf", claiming("5"));
+  EXPECT_TRUE(more.is_good) << more.why;
+  EXPECT_EQ(more.content.text, "alone");
+  EXPECT_EQ(more.Number(ContentField::PAGES), 5);
 }
 
 TEST(PdfTest, PagesThatHoldThemselvesEnd) {

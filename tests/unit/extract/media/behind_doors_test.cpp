@@ -27,6 +27,8 @@ TEST(BehindDoorsTest, FilmIsReadAsInTheOpen) {
 
 TEST(BehindDoorsTest, PicturesAreReadAsInTheOpen) {
   ExpectAllSame(PictureSamples());
+  ExpectAllSame(CommentedSamples());
+  ExpectAllSame({NotedLensSample()});
 }
 
 }  // namespace

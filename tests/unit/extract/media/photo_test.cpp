@@ -116,6 +116,18 @@ TEST(PhotoReaderTest, ACommentIsReadInItsCharset) {
   EXPECT_EQ(ReadTiff({}, {comment}, {}).Text(ContentField::CAPTION), "Прив");
 }
 
+TEST(PhotoReaderTest, ACommentOfTheFileIsACaption) {
+  for (const Sample& sample : CommentedSamples()) {
+    const Found found = Read(ReadPhoto, sample);
+    EXPECT_EQ(found.Text(ContentField::CAPTION), "Grüße") << sample.name;
+    EXPECT_EQ(found.Number(ContentField::WIDTH), 64) << sample.name;
+  }
+}
+
+TEST(PhotoReaderTest, ALensInTheMakersOwnNotesHasItsName) {
+  EXPECT_EQ(Read(ReadPhoto, NotedLensSample()).Text(ContentField::LENS), "Canon EF 50mm f/1.8");
+}
+
 TEST(PhotoReaderTest, TextsOfWindowsAreFound) {
   const Found found = ReadTiff({TiffBytesEntry(0x9c9b, Hex("5400f600 0000")),
                                 TiffBytesEntry(0x9c9e, Hex("41003b003dd800de 0000"))},

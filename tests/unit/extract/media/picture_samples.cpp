@@ -12,6 +12,15 @@ namespace {
 
 const char* const CAPTION = "Grüße vom Berg";
 
+std::string Written(Exiv2::Image& image) {
+  image.writeMetadata();
+  Exiv2::BasicIo& written = image.io();
+  written.open();
+  std::string bytes(written.size(), '\0');
+  written.read(reinterpret_cast<Exiv2::byte*>(bytes.data()), static_cast<long>(bytes.size()));
+  return bytes;
+}
+
 // Adds all three sorts of metadata.
 std::string Described(const std::string& plain) {
   Exiv2::XmpParser::initialize();
@@ -34,12 +43,7 @@ std::string Described(const std::string& plain) {
     keyword->read(word);
     image->iptcData().add(Exiv2::IptcKey("Iptc.Application2.Keywords"), keyword.get());
   }
-  image->writeMetadata();
-  Exiv2::BasicIo& written = image->io();
-  written.open();
-  std::string bytes(written.size(), '\0');
-  written.read(reinterpret_cast<Exiv2::byte*>(bytes.data()), static_cast<long>(bytes.size()));
-  return bytes;
+  return Written(*image);
 }
 
 // As cameras write it: its metadata come directly behind its beginning.
@@ -140,6 +144,23 @@ Sample WebpSample() {
   const uint64_t size = 63 | 47U << 14;
   const std::string picture = "\x2f" + Little(size, 4) + std::string(40, '\x21');
   return {"p.webp", Described(RiffChunk("RIFF", "WEBP" + RiffChunk("VP8L", picture)))};
+}
+
+std::vector<Sample> CommentedSamples() {
+  const std::string comment = "Grüße";
+  const std::string piece = Little(comment.size(), 1) + comment + Hex("00");
+  return {{"c.jpg", PlainJpeg().insert(2, Hex("fffe") + Big(comment.size() + 2, 2) + comment)},
+          {"c.gif", GifSample().bytes.insert(13, Hex("21f9 04 00000000 00 21fe") + piece)}};
+}
+
+Sample NotedLensSample() {
+  const std::string plain = PlainJpeg();
+  Exiv2::Image::AutoPtr image = Exiv2::ImageFactory::open(
+      reinterpret_cast<const Exiv2::byte*>(plain.data()), static_cast<long>(plain.size()));
+  image->exifData()["Exif.Image.Make"] = "Canon";
+  image->exifData()["Exif.Image.Model"] = "Canon EOS 10D";
+  image->exifData()["Exif.CanonCs.LensType"] = uint16_t{1};
+  return {"lens.jpg", Written(*image)};
 }
 
 Sample GifSample() {

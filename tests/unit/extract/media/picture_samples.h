@@ -37,6 +37,11 @@ Sample GifSample();
 Sample BmpSample();
 std::string PlainJpeg();
 
+// With a comment of the file, "Grüße", and nothing else.
+std::vector<Sample> CommentedSamples();
+// Of a Canon that wrote its lens down as number 1 in its own notes.
+Sample NotedLensSample();
+
 std::vector<Sample> PictureSamples();
 
 }  // namespace fileindexd

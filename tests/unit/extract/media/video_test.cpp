@@ -3,6 +3,7 @@
 
 #include <cstdlib>
 
+#include "tests/unit/extract/media/bytes.h"
 #include "tests/unit/extract/media/film_samples.h"
 #include "tests/unit/extract/media/reading.h"
 #include "tests/unit/extract/media/sound_samples.h"
@@ -65,6 +66,23 @@ INSTANTIATE_TEST_SUITE_P(Formats, VideoTest,
                                          Film{FlvSample(), "Sorenson Spark", false, false},
                                          Film{OgvSample(), "Theora, Vorbis", true, false}),
                          FormatName);
+
+// Of a camera whose clock was never set.
+TEST(VideoReaderTest, TheBeginOfACalendarIsNoDate) {
+  constexpr int64_t FROM_1904 = 2082844800;
+  const std::string created = Big(static_cast<uint64_t>(FILM_RECORDED + FROM_1904), 4);
+  for (const int64_t clock : {int64_t{0}, FROM_1904}) {
+    Sample sample = Mp4Sample();
+    for (size_t at = 0; (at = sample.bytes.find(created, at)) != std::string::npos;) {
+      sample.bytes.replace(at, created.size(), Big(static_cast<uint64_t>(clock), 4));
+    }
+    const Found found = Read(ReadVideo, sample);
+    EXPECT_TRUE(found.is_read) << found.why;
+    for (const NumberField& field : found.content.numbers) {
+      EXPECT_NE(field.field, ContentField::RECORDED) << clock << ": " << field.number;
+    }
+  }
+}
 
 TEST(VideoReaderTest, AnMp4WithSoundAloneIsMusicWithItsTags) {
   const Found found = Read(ReadVideo, {"a.mp4", M4aSample().bytes});
