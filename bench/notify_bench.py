@@ -6,18 +6,16 @@
 Sizes are divided by DIVISOR. Data lies below FILEINDEXD_BENCH_DIR.
 """
 
-import ctypes
 import os
-import select
 import shutil
 import signal
-import socket
-import sqlite3
 import statistics
 import subprocess
 import sys
 import tempfile
 import time
+
+from machine import Log, Machine, row, wait
 
 DIVISOR = int(sys.argv[1])
 BIN = sys.argv[2]
@@ -26,102 +24,6 @@ ROUNDS = max(200 // DIVISOR, 20)
 FILES = max(10_000 // DIVISOR, 500)
 BURST = max(54_000 // DIVISOR, 2_000)
 IN_A_FOLDER = 500
-LIMIT = 300.0
-
-libc = ctypes.CDLL(None, use_errno=True)
-
-
-def row(name, ours, reference, target, unit=1e3, text="ms"):
-    ratio = f"{ours / reference:.3f}" if reference else ""
-    shown = f"{reference * unit:.2f} {text}" if reference else ""
-    print(f"{name:<52} {ours * unit:>9.2f} {text} {shown:>12} {ratio:>8} {target:>8}", flush=True)
-
-
-class Log:
-    """Somebody has to read /dev/log, or syslog() waits."""
-
-    def __init__(self):
-        self.socket = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
-        self.socket.bind("/dev/log")
-        pid = os.fork()
-        if pid == 0:
-            while True:
-                self.socket.recv(65536)
-
-
-class Machine:
-    def __init__(self, folder):
-        self.state = f"{folder}/state"
-        self.root = f"{folder}/share"
-        self.spare = f"{folder}/spare"
-        for path in (self.root, self.spare):
-            os.makedirs(path)
-        self.env = {**os.environ, "FILEINDEXD_STATE_DIR": self.state}
-        self.notifier = None
-        self.queries = None
-        self.index = f"{self.state}/shares/bench/index"
-        self.queue = f"{self.state}/shares/bench/TALO@file_index_queue"
-        self.ctl("share", "add", "bench", self.root)
-        self.ctl("folder", "add", self.root)
-
-    def ctl(self, *arguments):
-        return subprocess.run(
-            [f"{BIN}/fileindexctl", *arguments], env=self.env, check=True, capture_output=True
-        ).stdout
-
-    def start_daemon(self):
-        subprocess.run([f"{BIN}/fileindexd"], env=self.env, check=True)
-        self.wait(lambda: os.path.exists("/run/fileindexd.pid"), "/run")
-
-    def daemon_pid(self):
-        with open("/run/fileindexd.pid", encoding="ascii") as file:
-            return int(file.read())
-
-    def stop_daemon(self):
-        pid = self.daemon_pid()
-        os.kill(pid, signal.SIGTERM)
-        self.wait(lambda: not os.path.exists("/run/fileindexd.pid"), "/run")
-
-    def start_notifier(self):
-        self.notifier = subprocess.Popen(
-            [f"{BIN}/fileindex-notifyd", "--syslog"], env=self.env
-        )
-        self.wait(lambda: os.path.exists("/run/fileindex-notifyd.pid"), "/run")
-
-    def stop_notifier(self):
-        self.notifier.send_signal(signal.SIGTERM)
-        self.notifier.wait()
-
-    def sync(self):
-        self.ctl("search", "--wait", "--timeout", "300", "--count", "x")
-
-    def wait(self, condition, folder):
-        """Until the condition holds; looked at after each change in the folder."""
-        deadline = time.monotonic() + LIMIT
-        fd = libc.inotify_init1(0o2000000)
-        libc.inotify_add_watch(fd, folder.encode(), 0xFFE)
-        try:
-            while not condition():
-                if not select.select([fd], [], [], deadline - time.monotonic())[0]:
-                    raise TimeoutError(folder)
-                os.read(fd, 65536)
-        finally:
-            os.close(fd)
-
-    def count(self, pattern):
-        """Entries whose path matches; a fresh look, as every search is."""
-        if self.queries is None:
-            self.queries = sqlite3.connect(f"file:{self.index}/entries.db?mode=ro", uri=True)
-        low = pattern.encode()
-        return self.queries.execute(
-            "SELECT count(*) FROM entries WHERE path > ? AND path < ?", (low, low + b"\xff")
-        ).fetchone()[0]
-
-    def found(self, path):
-        return self.count(path[:-1]) > 0
-
-    def await_count(self, pattern, count):
-        self.wait(lambda: self.count(pattern) == count, self.index)
 
 
 def make_files(folder, count, name="file"):
@@ -142,13 +44,9 @@ def one_new_file(machine):
         with open(path, "wb") as file:
             file.write(b"x")
         began = time.monotonic()
-        machine.wait(lambda path=path: machine.found(path), machine.index)
+        wait(lambda path=path: machine.found(path), machine.index)
         times.append(time.monotonic() - began)
-        # The daemon is to be idle again.
-        machine.wait(
-            lambda: not os.path.exists(machine.queue) and not os.path.exists(machine.queue + ".tmp"),
-            os.path.dirname(machine.queue),
-        )
+        machine.await_quiet()
     peer = tracker(machine)
     for name, share in (("median", 0.5), ("95th percentile", 0.95)):
         ours, reference = (sorted(each)[int(len(each) * share)] for each in (times, peer or [0]))
@@ -163,7 +61,7 @@ def tracker(machine):
     os.makedirs(folder)
     script = os.path.join(os.path.dirname(os.path.abspath(__file__)), "tracker_peer.py")
     told = subprocess.run(
-        ["dbus-run-session", sys.executable, script, folder, str(ROUNDS)],
+        ["dbus-run-session", sys.executable, script, folder, "names", str(ROUNDS)],
         check=True, stdout=subprocess.PIPE, stderr=subprocess.DEVNULL,
     ).stdout
     shutil.rmtree(folder)
@@ -187,7 +85,7 @@ def unpacked(machine):
     began = time.monotonic()
     machine.ctl("folder", "add", f"{machine.spare}/other")
     queue = f"{index}/TALO@file_index_queue"
-    machine.wait(
+    wait(
         lambda: not os.path.exists(queue) and not os.path.exists(queue + ".tmp"), index
     )
     reference = time.monotonic() - began
@@ -204,7 +102,7 @@ def renamed(machine):
     for _ in range(3):
         began = time.monotonic()
         os.rename(old, new)
-        machine.wait(
+        wait(
             lambda new=new, old=old: machine.count(f"{new}/") == entries
             and machine.count(f"{old}/") == 0,
             machine.index,
@@ -217,7 +115,7 @@ def renamed(machine):
         began = time.monotonic()
         os.rename(old, new)
         machine.ctl("event", "bench", "256", new, "--path-old", old)
-        machine.wait(
+        wait(
             lambda new=new, old=old: machine.count(f"{new}/") == entries
             and machine.count(f"{old}/") == 0,
             machine.index,
@@ -403,7 +301,8 @@ def at_rest(machine):
 def main():
     log = Log()
     with tempfile.TemporaryDirectory(dir=os.environ["FILEINDEXD_BENCH_DIR"]) as folder:
-        machine = Machine(folder)
+        machine = Machine(folder, BIN)
+        machine.ctl("folder", "add", machine.root)
         machine.start_daemon()
         machine.start_notifier()
         machine.sync()

@@ -7,7 +7,7 @@ function(add_unit_test name)
   cmake_parse_arguments(arg "" "TIMEOUT" "LIBS;SOURCES;LABELS" ${ARGN})
   add_executable(${name} ${arg_SOURCES})
   target_link_libraries(${name} PRIVATE project_flags ${arg_LIBS} GTest::gtest_main GTest::gmock)
-  set_target_properties(${name} PROPERTIES
+  set_target_properties(${name} PROPERTIES IS_TEST ON
     RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/tests-bin")
   add_test(NAME ${name} COMMAND ${name} --gtest_brief=1)
   if(NOT arg_TIMEOUT)

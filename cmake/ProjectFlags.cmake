@@ -19,9 +19,13 @@ target_compile_options(project_flags INTERFACE
   "-fmacro-prefix-map=${PROJECT_SOURCE_DIR}/=")
 target_link_libraries(project_flags INTERFACE Threads::Threads)
 
+# Tests are compiled far more often than they run.
+target_compile_options(project_flags INTERFACE $<$<BOOL:$<TARGET_PROPERTY:IS_TEST>>:-O0>)
+
 if(FILEINDEXD_SANITIZE)
   target_compile_options(project_flags INTERFACE
-    "-fsanitize=${FILEINDEXD_SANITIZE}" -fno-sanitize-recover=all -fno-omit-frame-pointer -g -O1)
+    "-fsanitize=${FILEINDEXD_SANITIZE}" -fno-sanitize-recover=all -fno-omit-frame-pointer -g
+    $<$<NOT:$<BOOL:$<TARGET_PROPERTY:IS_TEST>>>:-O1>)
   target_link_options(project_flags INTERFACE "-fsanitize=${FILEINDEXD_SANITIZE}")
 endif()
 if(FILEINDEXD_FUZZ)

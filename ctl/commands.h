@@ -28,6 +28,11 @@ struct Arguments {
   std::optional<std::string> limit;
   std::optional<std::string> offset;
   std::optional<std::string> timeout;
+  std::optional<std::string> sort;
+  std::optional<std::string> question;  // of info
+  std::optional<std::string> by;
+  std::optional<std::string> largest;
+  std::optional<std::string> growth;
   std::optional<std::string> language;
   std::optional<bool> document;
   std::optional<bool> audio;
@@ -43,6 +48,9 @@ struct Arguments {
   bool follow = false;
   bool wait = false;
   bool retry = false;
+  bool reverse = false;
+  bool terms = false;
+  bool duplicates = false;
 };
 
 using Command = int (*)(const Arguments& arguments);
@@ -73,5 +81,6 @@ int Dump(const Arguments& arguments);
 int Verify(const Arguments& arguments);
 int Failed(const Arguments& arguments);
 int Info(const Arguments& arguments);
+int Stats(const Arguments& arguments);
 
 }  // namespace fileindexd

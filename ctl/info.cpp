@@ -6,6 +6,7 @@
 #include "ctl/commands.h"
 #include "ctl/content_kinds.h"
 #include "ctl/info_facts.h"
+#include "ctl/info_question.h"
 #include "ctl/output.h"
 #include "ctl/root_problem.h"
 #include "state/layout.h"
@@ -223,18 +224,46 @@ void PutFacts(const PathFacts& facts) {
   }
 }
 
+void PutLines(const FactLines& lines) {
+  for (const auto& [name, text] : lines) {
+    PutFact(name, text);
+  }
+}
+
 }  // namespace
 
 int Info(const Arguments& arguments) {
+  const int code = arguments.question ? CheckQuestion(*arguments.question) : EXIT_DONE;
+  if (code != EXIT_DONE) {
+    return code;
+  }
   Session session;
   PathFacts facts;
   if (!session.Open() || !FindFacts(session, arguments.path, facts)) {
     return EXIT_FAILED;
   }
+  QuestionFacts question;
+  if (arguments.question) {
+    ExplainPath(*arguments.question, facts, question);
+  }
+
   if (arguments.json) {
-    (void)PutJson(FactsObject(facts));
-  } else {
-    PutFacts(facts);
+    Json::Value object = FactsObject(facts);
+    if (arguments.question) {
+      object["query"] = QuestionObject(question);
+    }
+    if (arguments.terms) {
+      object["terms"] = TermsList(facts.content);
+    }
+    (void)PutJson(object);
+    return EXIT_DONE;
+  }
+  PutFacts(facts);
+  if (arguments.question) {
+    PutLines(QuestionLines(question));
+  }
+  if (arguments.terms) {
+    PutLines(TermLines(facts.content));
   }
   return EXIT_DONE;
 }

@@ -113,6 +113,13 @@ EntryContent ContentOf(const std::string& share, const Entry& entry) {
   ContentsReader reader;
   content.is_known = reader.Open(share) == IndexError::NONE &&
                      reader.Find(entry, content.content, content.state, content.reason);
+  if (content.is_known) {
+    ContentReading reading;
+    (void)reader.FindReading(entry, reading);  // shown as none
+    content.extractor = reading.extractor;
+    content.tries = reading.tries;
+    content.language = reader.Language();
+  }
   return content;
 }
 
@@ -123,6 +130,8 @@ Json::Value ContentObject(const EntryContent& content) {
   Json::Value object(Json::objectValue);
   object["state"] = content.state;
   object["reason"] = content.reason;
+  object["extractor"] = static_cast<Json::Int64>(content.extractor);
+  object["tries"] = static_cast<Json::Int64>(content.tries);
   object["kind"] = KindText(content.content.kind);
   object["text_bytes"] = static_cast<Json::UInt64>(content.content.text.size());
   object["cut"] = content.content.is_cut;
@@ -145,6 +154,12 @@ std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent
   std::vector<std::pair<std::string, std::string>> lines;
   lines.emplace_back("state",
                      content.state + (content.reason.empty() ? "" : ": " + content.reason));
+  if (content.extractor != 0) {
+    lines.emplace_back("read by", "version " + std::to_string(content.extractor));
+  }
+  if (content.tries != 0) {
+    lines.emplace_back("tries", std::to_string(content.tries));
+  }
   if (content.state == "waiting") {
     return lines;
   }

@@ -18,6 +18,9 @@ struct EntryContent {
   std::string state;   // "waiting", "done", "failed"
   std::string reason;  // of a failure
   Content content;
+  int64_t extractor = 0;  // version of the readers that read it last; 0: none did
+  int64_t tries = 0;      // that ended with the death of the reader
+  std::string language;   // whose word forms are found together
 };
 
 // Not known: nothing was read of it yet, or its content is not wanted, or cannot be read.

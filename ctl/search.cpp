@@ -2,8 +2,6 @@
 // search.
 #include "index/search.h"
 
-#include <unistd.h>
-
 #include <algorithm>
 #include <chrono>
 #include <cstdint>
@@ -11,8 +9,11 @@
 #include <optional>
 
 #include "ctl/commands.h"
+#include "ctl/hit_output.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
+#include "ctl/terminal/cells.h"
+#include "ctl/terminal/screen.h"
 #include "ctl/values.h"
 #include "ctl/wait.h"
 #include "state/layout.h"
@@ -88,76 +89,12 @@ bool ReadSeconds(const Arguments& arguments, std::chrono::seconds& patience) {
   return true;
 }
 
-Json::Value HitObject(const Hit& hit) {
-  Json::Value object(Json::objectValue);
-  object["share"] = ToUtf8(hit.share);
-  SetPath(object, hit.entry.path);
-  object["kind"] = KindText(hit.entry.kind);
-  object["size"] = static_cast<Json::Int64>(hit.entry.size);
-  object["mtime"] = static_cast<Json::Int64>(WholeSeconds(hit.entry.mtime));
-  object["score"] = hit.score;
-  object["snippet"] = hit.snippet.text;
-  return object;
-}
-
-// "4.0K": three figures at most, and a unit of 1024s.
-std::string ShortSize(int64_t bytes) {
-  constexpr char UNITS[] = "BKMGTPE";
-  auto size = static_cast<double>(bytes);
-  size_t unit = 0;
-  while (size >= 1024 && unit + 2 < sizeof(UNITS)) {
-    size /= 1024;
-    ++unit;
-  }
-
-  char text[32];
-  (void)snprintf(text, sizeof(text), unit > 0 && size < 10 ? "%.1f%c" : "%.0f%c", size,
-                 UNITS[unit]);
-  return text;
-}
-
-// Below its hit, the question's words bright.
-void PutSnippet(const Snippet& snippet) {
-  constexpr const char* BRIGHT = "\x1b[1m";
-  constexpr const char* PLAIN = "\x1b[0m";
-  std::string line = "    ";
-  size_t at = 0;
-  for (const Snippet::Mark& mark : snippet.marks) {
-    line += Printable(snippet.text.substr(at, mark.start - at)) + BRIGHT +
-            Printable(snippet.text.substr(mark.start, mark.end - mark.start)) + PLAIN;
-    at = mark.end;
-  }
-  (void)PutLine(line + Printable(snippet.text.substr(at)));
-}
-
-// For people: columns, and nothing in a name that would move the cursor.
-void PutColumns(const std::vector<Hit>& hits) {
-  constexpr size_t WIDEST = 100;
-  std::vector<std::string> names;
-  size_t width = 0;
-  for (const Hit& hit : hits) {
-    names.push_back(Printable(hit.entry.path));
-    width = std::max(width, std::min(names.back().size(), WIDEST));
-  }
-
-  for (size_t index = 0; index < hits.size(); ++index) {
-    const Entry& entry = hits[index].entry;
-    std::string line = names[index];
-    line.resize(std::max(width, line.size()), ' ');
-    const bool is_folder = entry.kind == Kind::FOLDER;
-    const std::string size = is_folder ? "-" : ShortSize(entry.size);
-    line += "  " + std::string(size.size() < 6 ? 6 - size.size() : 0, ' ') + size;
-    line += "  " + (is_folder ? "-" : LocalTime(WholeSeconds(entry.mtime)));
-    (void)PutLine(line);
-    if (!hits[index].snippet.text.empty()) {
-      PutSnippet(hits[index].snippet);
+void PutHits(const std::vector<Hit>& hits, const Arguments& arguments,
+             const std::optional<Screen>& screen) {
+  if (screen.has_value()) {
+    for (const std::string& line : HitLines(hits, *screen)) {
+      (void)PutLine(line);
     }
-  }
-}
-
-void PutHits(const std::vector<Hit>& hits, const Arguments& arguments) {
-  if (!arguments.json && !arguments.nul_ended && isatty(STDOUT_FILENO) == 1) {
-    PutColumns(hits);
     return;
   }
 
@@ -167,6 +104,36 @@ void PutHits(const std::vector<Hit>& hits, const Arguments& arguments) {
     if (!put) {
       return;
     }
+  }
+}
+
+// Where hits would stand for people; for programs beside them.
+void PutSuggestion(const std::string& suggestion, bool on_screen) {
+  const std::string line = "Did you mean: " + ShowCells(CellsOf(suggestion), false);
+  if (on_screen) {
+    (void)PutLine(line);
+  } else {
+    (void)fprintf(stderr, "%s\n", line.c_str());  // nowhere left to tell of a failure
+  }
+}
+
+SortBy SortOf(const std::optional<std::string>& given) {
+  if (!given) {
+    return SortBy::SCORE;
+  }
+  return *given == "name" ? SortBy::NAME : *given == "size" ? SortBy::SIZE : SortBy::MODIFIED;
+}
+
+void PutAnswer(const Answer& answer, const Arguments& arguments) {
+  const bool for_people = !arguments.json && !arguments.nul_ended && !arguments.count;
+  const std::optional<Screen> screen = for_people ? FindScreen() : std::nullopt;
+  if (arguments.count) {
+    (void)PutLine(std::to_string(answer.total));
+  } else {
+    PutHits(answer.hits, arguments, screen);
+  }
+  if (answer.total == 0 && !answer.suggestion.empty()) {
+    PutSuggestion(answer.suggestion, screen.has_value());
   }
 }
 
@@ -184,6 +151,9 @@ int Search(const Arguments& arguments) {
   if (arguments.kind) {
     question.kind = KindFromText(*arguments.kind);
   }
+  question.sort = SortOf(arguments.sort);
+  question.reverse = arguments.reverse;
+  question.count_all = arguments.count;
 
   Session session;
   if (!session.Open() || !ChooseShares(session, arguments, question)) {
@@ -199,19 +169,13 @@ int Search(const Arguments& arguments) {
   std::erase_if(question.shares,
                 [](const std::string& share) { return IsDirectoryGone(IndexPath(share)); });
 
-  question.count_all = arguments.count;
-
   Answer answer;
   std::string error;
   if (!Ask(question, answer, error)) {
     return Fail(EXIT_USAGE, "search: %s: %s", arguments.query.c_str(), error.c_str());
   }
 
-  if (arguments.count) {
-    (void)PutLine(std::to_string(answer.total));
-  } else {
-    PutHits(answer.hits, arguments);
-  }
+  PutAnswer(answer, arguments);
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());
   }

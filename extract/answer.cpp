@@ -13,7 +13,6 @@ namespace {
 
 constexpr size_t LENGTH_SIZE = 4;
 constexpr size_t RECORD_HEAD = 5;
-constexpr size_t TEXT_FIELDS = 18;
 constexpr size_t SMALL_RECORDS = 1024;  // numbers, kind and the like, generously
 
 template <typename Number>

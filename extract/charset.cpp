@@ -1,10 +1,12 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/charset.h"
 
+#include <iconv.h>
 #include <uchardet/uchardet.h>
 
 #include <algorithm>
 #include <memory>
+#include <utility>
 
 #include "extract/characters.h"
 
@@ -15,6 +17,9 @@ namespace {
 // What one byte more or less than usual does not make binary.
 constexpr size_t STRAY_CONTROLS = 2;
 constexpr size_t TEXT_BYTES_OF_A_CONTROL = 50;
+
+// By chance, two bytes of another charset are a sequence of UTF-8 far less often.
+constexpr size_t GOOD_OF_A_BAD = 10;
 
 constexpr const char* LIKELIEST = "WINDOWS-1252";
 
@@ -77,15 +82,20 @@ bool HasShifts(std::string_view bytes) {
   return bytes.find("\x1B$") != std::string_view::npos;
 }
 
-bool CouldBeUtf8(std::string_view bytes) {
+bool IsMostlyUtf8(std::string_view bytes) {
+  size_t good = 0;
+  size_t bad = 0;
   while (!bytes.empty()) {
     const Character character = FirstCharacter(bytes);
-    if (character.code == 0 && bytes[0] != '\0') {
-      return character.is_cut;
+    if (character.is_cut) {
+      break;
     }
+    const bool is_bad = character.code == 0 && bytes[0] != '\0';
+    bad += is_bad ? 1 : 0;
+    good += !is_bad && character.length > 1 ? 1 : 0;
     bytes.remove_prefix(character.length);
   }
-  return true;
+  return bad * GOOD_OF_A_BAD <= good;
 }
 
 std::string GuessCharset(std::string_view bytes) {
@@ -97,6 +107,46 @@ std::string GuessCharset(std::string_view bytes) {
   uchardet_data_end(detector.get());
   const std::string found = uchardet_get_charset(detector.get());
   return found.empty() || found == "ASCII" || found == "UTF-8" ? LIKELIEST : found;
+}
+
+std::string MeantCharset(std::string_view label) {
+  // As the web's standard for encodings maps its labels; but of ASCII, bytes beyond it tell more.
+  constexpr std::pair<std::string_view, const char*> MEANT[] = {
+      {"ISO-8859-1", "CP1252"},  {"ISO8859-1", "CP1252"},
+      {"ISO_8859-1", "CP1252"},  {"LATIN1", "CP1252"},
+      {"L1", "CP1252"},          {"CP819", "CP1252"},
+      {"US-ASCII", ""},          {"ASCII", ""},
+      {"ANSI_X3.4-1968", ""},    {"ISO-8859-9", "CP1254"},
+      {"LATIN5", "CP1254"},      {"ISO-8859-11", "CP874"},
+      {"TIS-620", "CP874"},      {"GB2312", "GB18030"},
+      {"GB_2312-80", "GB18030"}, {"GBK", "GB18030"},
+      {"X-GBK", "GB18030"},      {"EUC-CN", "GB18030"},
+      {"CP936", "GB18030"},      {"SHIFT_JIS", "CP932"},
+      {"SHIFT-JIS", "CP932"},    {"SJIS", "CP932"},
+      {"X-SJIS", "CP932"},       {"MS_KANJI", "CP932"},
+      {"EUC-KR", "CP949"},       {"KS_C_5601-1987", "CP949"},
+      {"KSC5601", "CP949"},      {"KS_C_5601", "CP949"},
+      {"UTF8", "UTF-8"},         {"UNICODE-1-1-UTF-8", "UTF-8"}};
+  std::string name;
+  for (const char letter : label) {
+    name += letter >= 'a' && letter <= 'z' ? static_cast<char>(letter - 'a' + 'A') : letter;
+  }
+  for (const auto& [known, meant] : MEANT) {
+    if (name == known) {
+      return meant;
+    }
+  }
+  return name;
+}
+
+void KeepCommonCharsets() {
+  for (const char* charset :
+       {"ISO-8859-1", "ISO-8859-2", "ISO-8859-5",  "ISO-8859-7", "ISO-8859-15", "CP1250", "CP1251",
+        "CP1252",     "CP1253",     "CP1254",      "CP437",      "CP850",       "KOI8-R", "CP932",
+        "SHIFT_JIS",  "EUC-JP",     "ISO-2022-JP", "GB18030",    "CP874",       "BIG5",   "EUC-KR",
+        "CP949",      "UTF-7",      "UTF-16",      "UTF-32"}) {
+    (void)iconv_open("UTF-8", charset);  // never closed: the table stays as long as it is open
+  }
 }
 
 }  // namespace fileindexd

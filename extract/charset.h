@@ -21,9 +21,18 @@ const char* WideCharset(std::string_view bytes);
 bool IsAscii(std::string_view bytes);
 // Sequences that change the meaning of the seven-bit bytes behind them.
 bool HasShifts(std::string_view bytes);
-// The last character may be cut.
-bool CouldBeUtf8(std::string_view bytes);
+// Nearly all characters beyond ASCII are sequences of UTF-8: a bad byte among many good ones does
+// not make it another charset. The last character may be cut.
+bool IsMostlyUtf8(std::string_view bytes);
 // Of bytes that are no UTF-8; never empty.
 std::string GuessCharset(std::string_view bytes);
+// What texts under a charset's name are really written in: often a larger one, and readers of mail
+// and pages have always taken it for that. In upper case; empty for ASCII,
+// which tells nothing of bytes beyond it.
+std::string MeantCharset(std::string_view label);
+
+// Has the C library hold its tables of the charsets in common use, for when it can open no file any
+// more.
+void KeepCommonCharsets();
 
 }  // namespace fileindexd

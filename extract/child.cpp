@@ -11,6 +11,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <system_error>
 
 #include "extract/sanitized.h"
@@ -167,6 +168,15 @@ void Kill(const Child& child) {
   if (child.IsThere()) {
     (void)kill(child.pid, SIGKILL);  // not reaped yet, so the number is its own
   }
+}
+
+std::chrono::nanoseconds ProcessorTime(const Child& child) {
+  clockid_t clock = 0;
+  timespec time = {};
+  if (clock_getcpuclockid(child.pid, &clock) != 0 || clock_gettime(clock, &time) != 0) {
+    return std::chrono::nanoseconds(0);
+  }
+  return std::chrono::seconds(time.tv_sec) + std::chrono::nanoseconds(time.tv_nsec);
 }
 
 std::string StatusText(int status) {

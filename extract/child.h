@@ -4,6 +4,7 @@
 
 #include <sys/types.h>
 
+#include <chrono>
 #include <optional>
 #include <string>
 #include <vector>
@@ -44,6 +45,9 @@ bool StartChild(const std::string& program, std::vector<std::string> arguments,
 // child that somebody else has reaped counts as ended with 0.
 std::optional<int> Reap(Child& child);
 void Kill(const Child& child);
+
+// Of a child that is there, since its start; 0 where the kernel does not tell.
+std::chrono::nanoseconds ProcessorTime(const Child& child);
 
 // "SIGSEGV", "code 3".
 std::string StatusText(int status);

@@ -4,7 +4,9 @@
 #include <magic.h>
 #include <unistd.h>
 
+#include <exception>
 #include <memory>
+#include <new>
 #include <string>
 #include <vector>
 
@@ -109,7 +111,16 @@ bool Read(Format format, const Document& document, ContentSink& sink, std::strin
   }
 
   sink.SetKind(reading.kind);
-  const bool is_read = reading.read(document, sink, why);
+  bool is_read = false;
+  try {
+    is_read = reading.read(document, sink, why);
+  } catch (const std::bad_alloc&) {
+    throw;
+  } catch (const std::exception& error) {
+    why = error.what();  // what was found before stays
+    why = why.empty() ? "cannot be read" : why;
+    sink.has_thrown = true;
+  }
   if (!sink.converter.empty() && (document.depth > 0 || !Around().has_files)) {
     if (document.depth == 0) {
       why = "left out: this kernel cannot confine " + sink.converter;
@@ -118,6 +129,13 @@ bool Read(Format format, const Document& document, ContentSink& sink, std::strin
     return is_read && document.depth > 0;
   }
   return is_read;
+}
+
+// A package that is damaged or closed is an archive all the same; read as one, what was found of
+// the document would be lost.
+bool IsStillPackage(Format named, Format seen, const Content& found, const std::string& fault) {
+  return (named == Format::OFFICE_ZIP || named == Format::EPUB) && seen == Format::ARCHIVE &&
+         (fault == "encrypted" || !found.text.empty() || !found.texts.empty());
 }
 
 }  // namespace
@@ -159,11 +177,12 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
     sink = std::move(tried);
     return true;
   }
+  sink.has_thrown = sink.has_thrown || tried.has_thrown;
   const Format seen = FormatOfContent(document);
   if (seen == Format::NONE && named == Format::TEXT) {
     return true;  // many endings of source code name something else elsewhere
   }
-  if (seen == Format::NONE || seen == named) {
+  if (seen == Format::NONE || seen == named || IsStillPackage(named, seen, tried.content, fault)) {
     sink = std::move(tried);
     why = fault;
     return false;

@@ -4,11 +4,13 @@
 #include <iconv.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <system_error>
 #include <vector>
 
 #include "extract/charset.h"
+#include "extract/nested.h"
 
 namespace fileindexd {
 
@@ -29,6 +31,7 @@ class Iconv {
 
   bool Open(const std::string& charset) {
     handle = iconv_open("UTF-8", charset.c_str());
+    unit = charset.starts_with("UTF-32") ? 4 : charset.starts_with("UTF-16") ? 2 : 1;
     return IsOpen();
   }
   bool IsOpen() const { return handle != NONE; }
@@ -50,9 +53,11 @@ class Iconv {
         break;
       }
       if (failure == EILSEQ) {
+        // A whole unit, or every letter behind it would be another one.
+        const size_t wrong = std::min(unit, left);
         text += ' ';
-        ++from;
-        --left;
+        from += wrong;
+        left -= wrong;
       }
     }
     pending.assign(from, left);
@@ -62,6 +67,7 @@ class Iconv {
  private:
   inline static const iconv_t NONE = reinterpret_cast<iconv_t>(-1);  // NOLINT: as iconv has it
   iconv_t handle = NONE;
+  size_t unit = 1;  // bytes of the smallest piece of a character
   std::string pending;
 };
 
@@ -83,7 +89,7 @@ class Decoding {
       return false;
     }
     if (!is_settled && !IsAscii(bytes)) {
-      Settle(CouldBeUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
+      Settle(IsMostlyUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
       Settle("WINDOWS-1252");  // where that is one which the C library does not know
     } else if (!is_settled && HasShifts(bytes)) {
       Settle(GuessCharset(bytes));
@@ -98,8 +104,12 @@ class Decoding {
     if (charset.empty() || is_settled) {
       return;
     }
-    is_settled = charset == "UTF-8" || converter.Open(charset);
-    is_wide = charset.starts_with("UTF-16") || charset.starts_with("UTF-32");
+    const std::string meant = MeantCharset(charset);
+    if (meant.empty()) {
+      return;
+    }
+    is_settled = meant == "UTF-8" || converter.Open(meant);
+    is_wide = meant.starts_with("UTF-16") || meant.starts_with("UTF-32");
   }
 
   Iconv converter;
@@ -112,9 +122,11 @@ class Decoding {
 
 bool DecodeText(const Document& document, const CharsetFinder& declared, const TextTaker& take,
                 std::string& why) {
+  const Allowance allowance;
   Decoding decoding;
   std::vector<char> chunk(CHUNK);
-  for (off_t at = 0;;) {
+  // A file may be of any length without a word in it: blanks fill no text.
+  for (off_t at = 0; !allowance.IsSpent();) {
     const ssize_t length = pread(document.file, chunk.data(), chunk.size(), at);
     if (length < 0) {
       why = std::generic_category().message(errno);
@@ -134,6 +146,7 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
     }
     at += length;
   }
+  return true;
 }
 
 }  // namespace fileindexd

@@ -11,7 +11,6 @@ add_library(extract_documents STATIC
   mail.cpp
   mail_parts.cpp
   memory_file.cpp
-  nested.cpp
   odf_words.cpp
   office_words.cpp
   office_zip.cpp

@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/doors.h"
 
-#include <grp.h>
-#include <pwd.h>
 #include <sys/prctl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -14,6 +12,7 @@
 #include "base/capabilities.h"
 #include "base/landlock.h"
 #include "extract/limits.h"
+#include "extract/nobody.h"
 #include "extract/own_root.h"
 #include "extract/run_time_files.h"
 #include "extract/system_calls.h"
@@ -21,8 +20,6 @@
 namespace fileindexd {
 
 namespace {
-
-constexpr id_t NOBODY = 65534;
 
 bool Failed(const std::string& what, std::string& error) {
   error = what + ": " + std::generic_category().message(errno);
@@ -43,24 +40,6 @@ bool Limit(const LandlockRules& rules, const RunTimeFiles& files, std::string& e
   return true;
 }
 
-// The superuser becomes nobody. In a user namespace that does not know that user (EINVAL) it stays
-// what it is there, without any capability.
-bool LeaveUser(std::string& error) {
-  if (geteuid() != 0) {
-    return true;
-  }
-  if (setgroups(0, nullptr) != 0 && errno != EPERM) {  // user namespaces may forbid it
-    return Failed("groups", error);
-  }
-  if (setresgid(NOBODY, NOBODY, NOBODY) != 0 && errno != EINVAL) {
-    return Failed("group", error);
-  }
-  if (setresuid(NOBODY, NOBODY, NOBODY) != 0 && errno != EINVAL) {
-    return Failed("user", error);
-  }
-  return true;
-}
-
 }  // namespace
 
 bool CloseDoors(Doors& doors, std::string& error) {
@@ -74,6 +53,9 @@ bool CloseDoors(Doors& doors, std::string& error) {
                        !Limit(rules, files, error))) {
     return error.empty() ? Failed("Landlock", error) : false;
   }
+  if (!BoundCapabilities(0)) {  // takes none of those that it has now
+    return Failed("capabilities", error);
+  }
   std::string fault;
   const bool has_own_root = !has_landlock && doors.has_namespaces && EnterOwnRoot(files, fault);
   doors.can_open_files = has_landlock || has_own_root;
@@ -83,7 +65,7 @@ bool CloseDoors(Doors& doors, std::string& error) {
   }
 
   (void)umask(S_IRWXG | S_IRWXO);
-  if (!BoundCapabilities(0)) {
+  if (!BoundCapabilities(0)) {  // a user namespace of its own began with all of them
     return Failed("capabilities", error);
   }
   if (!LeaveUser(error)) {

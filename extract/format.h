@@ -42,6 +42,8 @@ class ContentSink {
   static constexpr size_t MAX_FIELD = 64 * 1024;
 
   Content content;
+  // A library was left by an exception, and may have left something behind.
+  bool has_thrown = false;
   // Not empty: the text of this file is best read by that program (see converters.h).
   std::string converter;
 

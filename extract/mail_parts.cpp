@@ -3,7 +3,9 @@
 
 #include <array>
 #include <string>
+#include <utility>
 
+#include "extract/charset.h"
 #include "extract/gobject.h"
 #include "extract/memory_file.h"
 
@@ -19,15 +21,20 @@ bool IsType(GMimeObject* object, const char* type, const char* subtype) {
   return content_type != nullptr && g_mime_content_type_is_type(content_type, type, subtype) != 0;
 }
 
+// Empty where nobody looked at the text.
 std::string CharsetOf(GMimePart* part) {
-  const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
-  return charset != nullptr ? charset : "";
+  const char* label = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
+  const std::string charset = label != nullptr ? MeantCharset(label) : "";
+  return charset == "UNKNOWN-8BIT" ? "" : charset;
 }
 
-// What is said of text without a charset, or of text that nobody looked at, need not be true.
-bool IsTelling(const std::string& charset) {
-  return !charset.empty() && g_ascii_strcasecmp(charset.c_str(), "us-ascii") != 0 &&
-         g_ascii_strcasecmp(charset.c_str(), "unknown-8bit") != 0;
+// Of the file that is attached; empty: none.
+std::string NameOf(GMimeObject* object) {
+  const char* name = g_mime_object_get_content_disposition_parameter(object, "filename");
+  if (name == nullptr) {
+    name = g_mime_object_get_content_type_parameter(object, "name");
+  }
+  return name != nullptr ? name : "";
 }
 
 // Appends a part's decoded bytes, from `charset` (empty: as they are) to UTF-8, up to the bound of
@@ -105,6 +112,7 @@ void MailParts::TakeObject(GMimeObject* object, int level) {
   } else if (GMIME_IS_MULTIPART(object)) {
     TakeMultipart(GMIME_MULTIPART(object), level);
   } else if (GMIME_IS_MESSAGE_PART(object)) {
+    sink.Set(ContentField::ATTACHMENTS, NameOf(object));
     GMimeMessage* message = g_mime_message_part_get_message(GMIME_MESSAGE_PART(object));
     if (message != nullptr) {
       TakeInnerMessage(message, level);
@@ -114,39 +122,44 @@ void MailParts::TakeObject(GMimeObject* object, int level) {
   }
 }
 
-// Of alternatives the plain text is enough; where it is empty the others are read.
+// Of alternatives the plain text is enough, but for what is attached to the others; where it is
+// empty they are read.
 void MailParts::TakeMultipart(GMimeMultipart* multipart, int level) {
   const int count = g_mime_multipart_get_count(multipart);
   const size_t before = sink.content.text.size();
+  const bool had_body = has_body;
+  int plain = -1;
   if (IsType(GMIME_OBJECT(multipart), "multipart", "alternative")) {
-    for (int i = 0; i < count; ++i) {
+    for (int i = 0; i < count && plain < 0; ++i) {
       GMimeObject* object = g_mime_multipart_get_part(multipart, i);
       if (IsType(object, "text", "plain")) {
+        plain = i;
         TakeObject(object, level + 1);
-        break;
       }
     }
   }
-  if (sink.content.text.size() > before) {
-    return;
-  }
+  has_body = had_body || sink.content.text.size() > before;
   for (int i = 0; i < count; ++i) {
-    TakeObject(g_mime_multipart_get_part(multipart, i), level + 1);
+    if (i != plain) {
+      TakeObject(g_mime_multipart_get_part(multipart, i), level + 1);
+    }
   }
+  has_body = had_body;
 }
 
 void MailParts::TakeInnerMessage(GMimeMessage* message, int level) {
+  const bool had_body = std::exchange(has_body, false);
   AddHeaderText(message, sink);
   GMimeObject* body = g_mime_message_get_mime_part(message);
   if (body != nullptr) {
     TakeObject(body, level + 1);
   }
+  has_body = had_body;
 }
 
 void MailParts::TakePart(GMimePart* part) {
   GMimeObject* object = GMIME_OBJECT(part);
-  const char* file_name = g_mime_part_get_filename(part);
-  const std::string name = file_name != nullptr ? file_name : "";
+  const std::string name = NameOf(object);
   const char* disposition = g_mime_object_get_disposition(object);
   const bool is_attached =
       (disposition != nullptr && g_ascii_strcasecmp(disposition, "attachment") == 0) ||
@@ -156,7 +169,9 @@ void MailParts::TakePart(GMimePart* part) {
     return;
   }
   if (IsType(object, "text", "*") && !is_attached) {
-    AddBody(part);
+    if (!has_body) {
+      AddBody(part);
+    }
   } else if (is_attached && document.depth < Allowance::MAX_DEPTH && allowance.TakeMember()) {
     AddAttachment(part, name);
   }
@@ -168,7 +183,7 @@ void MailParts::AddBody(GMimePart* part) {
   const FormatReader reader =
       IsType(GMIME_OBJECT(part), "text", "html") ? ReadHtml : FormatReader{ReadText};
   MemoryFile text;
-  if (IsTelling(charset)) {
+  if (!charset.empty()) {
     if (!text.Open() || !text.Append(UTF8_MARK)) {
       return;
     }

@@ -31,6 +31,7 @@ class MailParts {
   ContentSink& sink;
   Allowance allowance;
   int parts = 0;
+  bool has_body = false;  // of these alternatives one is read: of the rest what is attached counts
 };
 
 // One line for each header that is there: from, to, subject.

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // fileindex-extract: the closed helper. Started by the content service alone.
+#include <malloc.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -16,8 +17,10 @@
 #include <string_view>
 #include <system_error>
 
+#include "base/landlock.h"
 #include "base/scoped_fd.h"
 #include "extract/answer.h"
+#include "extract/charset.h"
 #include "extract/child.h"
 #include "extract/choice.h"
 #include "extract/converters.h"
@@ -32,6 +35,8 @@ namespace fileindexd {
 namespace {
 
 constexpr const char* PROGRAM = "fileindex-extract";
+// In use after a file: a helper that holds more is replaced.
+constexpr size_t KEPT_MEMORY = size_t{256} << 20;
 
 int Complain(const std::string& error, int code) {
   (void)fprintf(stderr, "%s: %s\n", PROGRAM, error.c_str());
@@ -74,7 +79,8 @@ std::optional<JobOrder> ReceiveJob(ScopedFd& file) {
 }
 
 // Memory that runs out ends the helper: what is left of it is not to be trusted with the next file.
-void ReadFile(const Document& document, size_t text_cap, Answer& answer) {
+// So does what an exception may have left behind, but after the answer. True if all is well.
+bool ReadFile(const Document& document, size_t text_cap, Answer& answer) {
   ContentSink sink(text_cap);
   try {
     answer.has_failed = !ReadDocument(document, sink, answer.reason);
@@ -83,11 +89,20 @@ void ReadFile(const Document& document, size_t text_cap, Answer& answer) {
   } catch (const std::exception& error) {
     answer.has_failed = true;
     answer.reason = error.what();
+    sink.has_thrown = true;
   }
   answer.content = std::move(sink.content);
   answer.converter = std::move(sink.converter);
+  return !sink.has_thrown;
 }
 
+// What libraries still hold after a file is lost to the next ones.
+bool HoldsLittle() {
+  const auto info = mallinfo2();
+  return info.uordblks + info.hblkhd <= KEPT_MEMORY;
+}
+
+// False when this was its last file.
 bool Answered(const JobOrder& job, int file) {
   struct stat info = {};
   Answer answer;
@@ -98,9 +113,9 @@ bool Answered(const JobOrder& job, int file) {
   }
 
   const uint64_t sample = SampleFile(file, info.st_size);
-  ReadFile({file, job.name, info.st_size, 0}, job.text_cap, answer);
+  const bool is_well = ReadFile({file, job.name, info.st_size, 0}, job.text_cap, answer);
   answer.content.sample = sample;
-  return SendAll(EncodeAnswer(answer));
+  return SendAll(EncodeAnswer(answer)) && is_well && HoldsLittle();
 }
 
 int Serve(int parent) {
@@ -109,6 +124,9 @@ int Serve(int parent) {
   (void)setlocale(LC_ALL, "C.UTF-8");
   if (!LoadMagic(error)) {
     return Complain(error, EXIT_DOORS);
+  }
+  if (LandlockVersion() < 1) {  // then perhaps no file can be opened later
+    KeepCommonCharsets();
   }
   Doors doors;
   doors.parent = parent;

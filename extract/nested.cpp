@@ -53,8 +53,8 @@ void ReadNestedText(FormatReader reader, const Document& document, ContentSink& 
     sink.AddText("\n");
     (void)reader(document, sink, why);  // half a member is better than none, and nobody asks why
     sink.AddText("\n");
-  } catch (const std::exception&) {
-    why.clear();  // one member's failure is its own
+  } catch (const std::exception&) {  // no memory either: one member's failure is its own
+    sink.has_thrown = true;
   }
   sink.content.kind = kind;
   sink.content.texts = std::move(texts);

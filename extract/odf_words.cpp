@@ -68,11 +68,15 @@ class OdfWords {
       sink.AddText("\n");
     } else if (part.name == "annotation" || part.name == "note") {
       sink.AddText("\n");  // stands within a paragraph, belongs to none of its words
+      is_annotation = begins && part.name == "annotation";
+    } else if (is_annotation && (part.name == "creator" || part.name.starts_with("date"))) {
+      sink.AddText("\n");
     }
   }
 
  private:
   ContentSink& sink;
+  bool is_annotation = false;
   int paragraphs = 0;  // a frame in a paragraph holds paragraphs again
 };
 

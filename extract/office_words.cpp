@@ -19,8 +19,40 @@ bool IsLeftOut(std::string_view name) {
 }
 
 bool IsGap(std::string_view name) {
-  constexpr std::array<std::string_view, 6> NAMES{"tab", "br", "cr", "p", "tc", "si"};
+  constexpr std::array<std::string_view, 8> NAMES{"tab", "br", "cr",      "p",
+                                                  "tc",  "si", "comment", "cm"};
   return std::find(NAMES.begin(), NAMES.end(), name) != NAMES.end();
+}
+
+// Of the heads and feet of a sheet's pages.
+bool IsPageEdge(std::string_view name) {
+  return name.ends_with("Header") || name.ends_with("Footer");
+}
+
+// Their text is mixed with marks: &L, &C and &R begin a third of the line, &"font", &12 and &K with
+// six digits change the look, && is the letter itself, and others stand for a number or a name.
+std::string WithoutMarks(std::string_view line) {
+  std::string words;
+  for (size_t at = 0; at < line.size(); ++at) {
+    if (line[at] != '&') {
+      words += line[at];
+      continue;
+    }
+    const char mark = ++at < line.size() ? line[at] : '&';
+    if (mark == '&') {
+      words += mark;
+    } else if (mark == '"') {
+      at = std::min(line.find('"', at + 1), line.size());
+    } else if (mark >= '0' && mark <= '9') {
+      at = std::min(line.find_first_not_of("0123456789", at), line.size()) - 1;
+    } else if (mark == 'K') {
+      at += 6;
+    } else {
+      constexpr std::string_view LOOKS = "BIUESXYOH";  // within a word, too
+      words += LOOKS.find(mark) == std::string_view::npos ? " " : "";
+    }
+  }
+  return words;
 }
 
 }  // namespace
@@ -57,6 +89,7 @@ void AddOoxmlWords(XmlPart& part, ContentSink& sink) {
       part.Skip();
     } else if (part.name == "t" || part.name == "text") {
       is_text = part.node == XmlPart::Node::BEGIN;
+      sink.AddText(part.name == "text" && !is_text ? "\n" : "");
     } else if (part.name == "noBreakHyphen" && part.node == XmlPart::Node::BEGIN) {
       sink.AddText("-");
     } else if (part.node == XmlPart::Node::END && IsGap(part.name)) {
@@ -85,6 +118,8 @@ void AddSheetWords(XmlPart& part, ContentSink& sink) {
       is_text = begins && is_wanted;
     } else if (begins && part.name == "rPh") {
       part.Skip();
+    } else if (begins && IsPageEdge(part.name)) {
+      sink.AddText(WithoutMarks(TextOfElement(part)) + "\n");
     }
   }
 }

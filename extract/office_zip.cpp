@@ -66,14 +66,25 @@ class OfficeZip {
   OfficeZip(const Document& read_document, ContentSink& text_sink)
       : document(read_document), sink(text_sink) {}
 
+  // Tables come last: their words stand in a part behind them, and a table of numbers alone may be
+  // more than the text takes.
   bool Read(std::string& why) {
+    const Allowance allowance;
     Unpacker zip;
     if (!zip.Open(document, Unpacker::Formats::ZIP, why)) {
       return false;
     }
     for (int i = 0; i < MAX_PARTS && zip.Next(); ++i) {
-      ReadPart(zip);
+      if (IsTable(zip.name)) {
+        ++tables;
+      } else {
+        ReadPart(zip);
+      }
     }
+    if (tables > 0 && !sink.IsFull()) {
+      ReadTables();
+    }
+    parts += tables;
     if (is_encrypted) {
       why = "encrypted";
     } else if (parts == 0) {
@@ -85,6 +96,22 @@ class OfficeZip {
   }
 
  private:
+  static bool IsTable(std::string_view name) { return ReaderOf(name) == AddSheetWords; }
+
+  void ReadTables() {
+    Unpacker zip;
+    std::string fault;
+    if (!zip.Open(document, Unpacker::Formats::ZIP, fault)) {
+      return;
+    }
+    for (int left = tables; left > 0 && !sink.IsFull() && zip.Next();) {
+      if (IsTable(zip.name)) {
+        ReadPart(zip);
+        --left;
+      }
+    }
+  }
+
   void ReadPart(Unpacker& zip) {
     const PartReader reader = ReaderOf(zip.name);
     const bool is_manifest = zip.name == "META-INF/manifest.xml";
@@ -96,7 +123,7 @@ class OfficeZip {
       is_encrypted = IsOdfEncrypted(part) || is_encrypted;
       return;
     }
-    ++parts;
+    parts += IsTable(zip.name) ? 0 : 1;
     reader(part, sink);
     sink.AddText("\n");
     is_damaged = is_damaged || part.is_damaged;
@@ -106,6 +133,7 @@ class OfficeZip {
   const Document& document;
   ContentSink& sink;
   int parts = 0;
+  int tables = 0;
   bool is_damaged = false;
   bool is_encrypted = false;
 };

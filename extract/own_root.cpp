@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <sys/syscall.h>
@@ -14,6 +15,7 @@
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "extract/nobody.h"
 
 namespace fileindexd {
 
@@ -82,10 +84,30 @@ bool Show(const std::string& path) {
                MS_REMOUNT | MS_BIND | MS_RDONLY | FIXED | FlagsOf(path), nullptr) == 0;
 }
 
-bool EnterNamespace() {
-  const int user = geteuid() == 0 ? 0 : CLONE_NEWUSER;
-  return unshare(CLONE_NEWNS | user) == 0 &&
-         mount(nullptr, "/", nullptr, MS_PRIVATE | MS_REC, nullptr) == 0;
+bool Write(const char* path, const std::string& text) {
+  const ScopedFd file(open(path, O_WRONLY | O_CLOEXEC));
+  return file.fd >= 0 &&
+         write(file.fd, text.data(), text.size()) == static_cast<ssize_t>(text.size());
+}
+
+// In a user namespace it stays who it is: who has no number there can make no file.
+bool EnterUserNamespace() {
+  const std::string user = std::to_string(geteuid());
+  const std::string group = std::to_string(getegid());
+  // Who has become another user does not own what the kernel shows of it, but for this.
+  return prctl(PR_SET_DUMPABLE, 1, 0, 0, 0) == 0 && unshare(CLONE_NEWUSER | CLONE_NEWNS) == 0 &&
+         Write("/proc/self/uid_map", user + " " + user + " 1") &&
+         Write("/proc/self/setgroups", "deny") &&
+         Write("/proc/self/gid_map", group + " " + group + " 1");
+}
+
+// The superuser may lack the right to mount: then it has it where everybody else has.
+bool EnterNamespace(std::string& error) {
+  const bool is_superuser = geteuid() == 0;
+  if (!(is_superuser && unshare(CLONE_NEWNS) == 0) && !(LeaveUser(error) && EnterUserNamespace())) {
+    return false;
+  }
+  return mount(nullptr, "/", nullptr, MS_PRIVATE | MS_REC, nullptr) == 0;
 }
 
 // The old root is put over the new one and taken off again: no folder for it is needed.
@@ -99,7 +121,7 @@ bool Enter() {
 
 bool EnterOwnRoot(const RunTimeFiles& files, std::string& error) {
   (void)umask(S_IWGRP | S_IWOTH);  // whoever the process becomes goes through its folders
-  if (!EnterNamespace()) {
+  if (!EnterNamespace(error)) {
     return Failed("mount namespace", error);
   }
   if (mount("none", SITE, "tmpfs", FIXED, "mode=755,size=1m") != 0) {

@@ -9,9 +9,10 @@
 namespace fileindexd {
 
 // Moves the process, in a mount namespace of its own, into a root folder in memory in which those
-// files alone appear, at their paths and not to be changed. Takes the superuser's rights, or a
-// kernel that gives user namespaces to everybody. False, and `error` then says why, on failure:
-// the process may then stand in a namespace of its own, but sees what it saw.
+// files alone appear, at their paths and not to be changed. Takes the right to mount, or a
+// kernel that gives user namespaces to everybody: the superuser becomes nobody for that. False, and
+// `error` then says why, on failure: the process may then stand in a namespace of its own, but sees
+// what it saw.
 bool EnterOwnRoot(const RunTimeFiles& files, std::string& error);
 
 }  // namespace fileindexd

@@ -105,13 +105,18 @@ int TypeOf(const Mapping& mapping) {
 }
 
 bool ReadPicture(int type, const Mapping& mapping, ContentSink& sink, std::string& why) {
-  Exiv2::Image::AutoPtr image = Exiv2::ImageFactory::open(
-      static_cast<const Exiv2::byte*>(mapping.bytes), static_cast<long>(mapping.size));
+  Exiv2::Image::AutoPtr image;
   bool is_whole = true;
   try {
+    image = Exiv2::ImageFactory::open(static_cast<const Exiv2::byte*>(mapping.bytes),
+                                      static_cast<long>(mapping.size));
     image->readMetadata();
   } catch (const std::exception&) {
     is_whole = false;  // What was read before is there.
+  }
+  if (image.get() == nullptr) {
+    why = "damaged";
+    return false;
   }
   try {
     if (type == Exiv2::ImageType::bmff) {

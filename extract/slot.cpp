@@ -3,12 +3,10 @@
 
 #include <fcntl.h>
 #include <sys/mman.h>
-#include <sys/socket.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <system_error>
 
 #include "extract/converters.h"
@@ -23,13 +21,15 @@ using Result = ExtractOutcome::Result;
 
 // Libraries leak a little with each file.
 constexpr unsigned JOBS_OF_A_HELPER = 500;
-// A process that ends closes its socket a moment before it is seen to have ended.
-constexpr std::chrono::seconds GRACE(2);
 // A busy host starts processes slowly; the document's own time begins when the helper has it.
 constexpr std::chrono::seconds TO_BEGIN(60);
 // Who ends before it has begun, or is killed by somebody, tells nothing about the file. Killed
 // again and again at the same one, as by a host short of memory, it may be that file's doing.
 constexpr int LOST_HELPERS = 3;
+// Whose helper got less than this part of the deadline as processor time is begun again. A few
+// times only: a helper that waits for something that never comes gets none either.
+constexpr int USED_PART = 4;
+constexpr int STARVED_TIMES = 2;
 
 std::string ErrorText() {
   return std::generic_category().message(errno);
@@ -59,9 +59,14 @@ std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now
   current.id = job.id;
   current.name = std::move(job.name);
   current.file.Swap(job.file);
-  deadline = now + std::max<Clock::duration>(options.deadline, TO_BEGIN);
   lost_helpers = 0;
+  AllowTime(now);
   return Begin();
+}
+
+void Slot::AllowTime(Clock::time_point now) {
+  deadline = now + std::max<Clock::duration>(options.deadline, TO_BEGIN);
+  is_timed = false;
 }
 
 std::optional<ExtractOutcome> Slot::Begin() {
@@ -73,69 +78,6 @@ std::optional<ExtractOutcome> Slot::Begin() {
     return End(Result::LOST, error);
   }
   return std::nullopt;
-}
-
-bool Slot::Hand(int file, const std::string& name, std::string& error) {
-  const bool is_old = helper.IsThere();
-  if (!is_old && !Start(error)) {
-    return false;
-  }
-  has_begun = false;
-  if (Send(file, name)) {
-    return true;
-  }
-
-  const bool is_gone = errno == EPIPE;
-  if (is_gone && !is_old) {
-    return true;  // its end will be judged
-  }
-  error = "helper: " + ErrorText();
-  DropHelper();
-  // One that ended while it had nothing to do has nothing to do with this file.
-  return is_gone && Hand(file, name, error);
-}
-
-bool Slot::Start(std::string& error) {
-  int ends[2] = {-1, -1};
-  if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
-    error = "socket: " + ErrorText();
-    return false;
-  }
-
-  ScopedFd ours(ends[0]);
-  const ScopedFd theirs(ends[1]);
-  if (!StartChild(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
-    return false;
-  }
-  socket.Swap(ours);
-  received.clear();
-  is_ready = false;
-  closing = false;
-  jobs_done = 0;
-  return true;
-}
-
-// The message is small and the socket empty: it goes as a whole or not at all. False with errno.
-bool Slot::Send(int file, const std::string& name) {
-  if (lseek(file, 0, SEEK_SET) != 0) {
-    return false;
-  }
-
-  std::string frame = EncodeJob({static_cast<uint32_t>(options.text_cap), name});
-  iovec bytes = {frame.data(), frame.size()};
-  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  cmsghdr* head = CMSG_FIRSTHDR(&message);
-  head->cmsg_level = SOL_SOCKET;
-  head->cmsg_type = SCM_RIGHTS;
-  head->cmsg_len = CMSG_LEN(sizeof(int));
-  memcpy(CMSG_DATA(head), &file, sizeof(file));
-  return sendmsg(socket.fd, &message, MSG_DONTWAIT | MSG_NOSIGNAL) ==
-         static_cast<ssize_t>(frame.size());
 }
 
 std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
@@ -161,29 +103,15 @@ std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
     }
   }
   if (!outcome && HasJob() && now >= deadline) {
-    outcome = Overdue();
+    outcome = Overdue(now);
   }
   return outcome;
 }
 
-void Slot::Receive(Clock::time_point now) {
-  char buffer[64 * 1024];
-  const size_t most = MaxFrame(options.text_cap) + 1;
-  while (!closing && socket.fd >= 0 && received.size() < most) {
-    const ssize_t length = recv(socket.fd, buffer, sizeof(buffer), MSG_DONTWAIT);
-    if (length < 0 && (errno == EAGAIN || errno == EINTR)) {
-      return;
-    }
-    if (length <= 0) {
-      closing = true;
-      grace = now + GRACE;
-      return;
-    }
-    received.append(buffer, static_cast<size_t>(length));
-  }
-}
-
 std::optional<ExtractOutcome> Slot::TakeFrames() {
+  if (!received.empty() && stage != Stage::READING && stage != Stage::READING_RESULT) {
+    return Nonsense("it was not asked anything");
+  }
   while (true) {
     const size_t size = FrameSize(received);
     if (size > MaxFrame(options.text_cap)) {
@@ -221,8 +149,10 @@ std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
         return Nonsense("it begins what it was not asked for");
       }
       has_begun = true;
-      if (stage == Stage::READING) {
+      used_before = ProcessorTime(helper);
+      if (!is_timed) {  // once for a document, however many helpers begin it
         deadline = Clock::now() + options.deadline;
+        is_timed = true;
       }
       return std::nullopt;
     case Answer::Sort::ANSWER:
@@ -323,13 +253,28 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
   if ((!has_begun || IsKilledFromOutside(status)) && ++lost_helpers <= LOST_HELPERS) {
     return stage == Stage::READING ? Begin() : BeginResult();
   }
+  if (!has_begun) {  // it has not seen the file: whatever ends it, the file does not
+    return End(Result::LOST, "the helper ended before it began, with " + StatusText(status));
+  }
   if (status == EXIT_MEMORY << 8) {
     return End(Result::KILLED, "needs more memory than is allowed");
   }
   return End(Result::KILLED, "the helper ended with " + StatusText(status));
 }
 
-std::optional<ExtractOutcome> Slot::Overdue() {
+// On a host that is busy with other things a document may not have had the time that has passed.
+bool Slot::IsStarved() const {
+  return stage == Stage::READING && has_begun && helper.IsThere() &&
+         ProcessorTime(helper) - used_before < options.deadline / USED_PART;
+}
+
+std::optional<ExtractOutcome> Slot::Overdue(Clock::time_point now) {
+  if (IsStarved() && ++lost_helpers <= STARVED_TIMES) {
+    DropHelper();
+    AllowTime(now);
+    return Begin();
+  }
+
   const long long limit = options.deadline.count();
   const std::string took = limit % 1000 == 0
                                ? "took longer than " + std::to_string(limit / 1000) + " s"
@@ -349,7 +294,7 @@ std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
   if (!HasJob()) {
     return std::nullopt;
   }
-  return End(Result::KILLED, "the helper talked nonsense: " + what);
+  return End(has_begun ? Result::KILLED : Result::LOST, "the helper talked nonsense: " + what);
 }
 
 ExtractOutcome Slot::End(Result how, const std::string& reason) {
@@ -375,32 +320,10 @@ ExtractOutcome Slot::End(Result how, const std::string& reason) {
   return outcome;
 }
 
-void Slot::DropHelper() {
-  Kill(helper);
-  if (helper.IsThere()) {
-    dying.emplace_back().Swap(helper);
-  }
-  socket.Close();
-  received.clear();
-  closing = false;
-}
-
 void Slot::Clear() {
   DropHelper();
   if (HasJob()) {
     (void)End(Result::LOST, "");
-  }
-}
-
-void Slot::AddPolled(std::vector<pollfd>& polled) const {
-  if (helper.IsThere()) {
-    polled.push_back({helper.pid_fd.fd, POLLIN, 0});
-    if (!closing) {
-      polled.push_back({socket.fd, POLLIN, 0});
-    }
-  }
-  if (converter.IsThere()) {
-    polled.push_back({converter.pid_fd.fd, POLLIN, 0});
   }
 }
 

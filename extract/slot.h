@@ -50,6 +50,8 @@ class Slot {
   bool Send(int file, const std::string& name);
   // To a helper that is there or is started.
   bool Hand(int file, const std::string& name, std::string& error);
+  // The job's time starts anew when a helper begins it.
+  void AllowTime(Clock::time_point now);
   // Begins the job, or begins it again.
   std::optional<ExtractOutcome> Begin();
   void Receive(Clock::time_point now);
@@ -60,7 +62,8 @@ class Slot {
   std::optional<ExtractOutcome> StartConverter(const std::string& name);
   std::optional<ExtractOutcome> AwaitConverter();
   std::optional<ExtractOutcome> BeginResult();
-  std::optional<ExtractOutcome> Overdue();
+  bool IsStarved() const;
+  std::optional<ExtractOutcome> Overdue(Clock::time_point now);
   std::optional<ExtractOutcome> Nonsense(const std::string& what);
   ExtractOutcome End(ExtractOutcome::Result result, const std::string& reason);
   void DropHelper();
@@ -80,9 +83,11 @@ class Slot {
   Stage stage = Stage::IDLE;
   ExtractJob current;
   Clock::time_point deadline;
-  bool has_begun = false;  // the helper has it
-  int lost_helpers = 0;    // at this job, by no fault of its own
-  Content found;           // by the first reading
+  bool is_timed = false;                    // `deadline` counts from when a helper began it
+  bool has_begun = false;                   // the helper has it
+  std::chrono::nanoseconds used_before{0};  // the helper's processor time, when it had begun
+  int lost_helpers = 0;                     // at this job, by no fault of its own
+  Content found;                            // by the first reading
   Child converter;
   std::string converter_name;
   std::string converter_fault;

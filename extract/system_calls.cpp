@@ -10,6 +10,8 @@
 #include <memory>
 #include <system_error>
 
+#include "extract/sanitized.h"
+
 namespace fileindexd {
 
 namespace {
@@ -18,9 +20,8 @@ namespace {
 constexpr const char* ALWAYS[] = {
     // its files, its socket, files in memory
     "read", "pread64", "readv", "preadv", "preadv2", "write", "pwrite64", "writev", "pwritev",
-    "lseek", "_llseek", "close", "dup", "dup2", "dup3", "fcntl", "fcntl64", "ftruncate",
-    "ftruncate64", "memfd_create", "recvmsg", "poll", "ppoll", "ppoll_time64", "fadvise64",
-    "fadvise64_64", "arm_fadvise64_64",
+    "lseek", "_llseek", "close", "dup", "dup2", "dup3", "ftruncate", "ftruncate64", "memfd_create",
+    "recvmsg", "poll", "ppoll", "ppoll_time64", "fadvise64", "fadvise64_64", "arm_fadvise64_64",
     // looking at files
     "fstat", "fstat64", "fstatfs", "fstatfs64", "getcwd",
     // memory
@@ -42,6 +43,10 @@ constexpr const char* BY_PATH[] = {"stat",      "stat64",     "lstat",     "lsta
                                    "fstatat64", "newfstatat", "statx",     "statfs",
                                    "statfs64",  "access",     "faccessat", "faccessat2",
                                    "readlink",  "readlinkat", "getdents",  "getdents64"};
+
+// About a descriptor of its own. Not its mode, locks, seals, owner: those of a file that it was
+// handed are the service's, too, and an owner is sent signals.
+constexpr scmp_datum_t FILE_COMMANDS[] = {F_GETFD, F_SETFD, F_GETFL, F_DUPFD, F_DUPFD_CLOEXEC};
 
 // Any of these bits writes, or makes a file.
 constexpr scmp_datum_t WRITING = O_WRONLY | O_RDWR | O_CREAT | O_TRUNC | (O_TMPFILE & ~O_DIRECTORY);
@@ -87,6 +92,10 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
   for (const char* name : ALWAYS) {
     filter.Allow(name);
   }
+  for (const scmp_datum_t command : FILE_COMMANDS) {
+    filter.Allow("fcntl", SCMP_A1(SCMP_CMP_EQ, command));
+    filter.Allow("fcntl64", SCMP_A1(SCMP_CMP_EQ, command));
+  }
   if (calls.can_open_files) {
     for (const char* name : BY_PATH) {
       filter.Allow(name);
@@ -105,6 +114,10 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
   filter.Allow("tgkill", SCMP_A0(SCMP_CMP_EQ, static_cast<scmp_datum_t>(getpid())));
   if (calls.can_execute) {
     filter.Allow("execve");
+  }
+  if (IS_SANITIZED) {  // looks with them whether memory can be read
+    filter.Allow("pipe");
+    filter.Allow("pipe2");
   }
   filter.Deny("clone3", ENOSYS);
   filter.Deny("openat2", ENOSYS);

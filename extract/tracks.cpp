@@ -6,8 +6,8 @@
 #include <algorithm>
 
 #include "extract/media_text.h"
-#include "extract/utf16.h"
 #include "extract/track_format.h"
+#include "extract/utf16.h"
 
 namespace fileindexd {
 

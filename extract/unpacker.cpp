@@ -86,9 +86,36 @@ bool Unpacker::Open(const Document& document, Formats formats, std::string& why)
   return true;
 }
 
+// Where passing a member over means unpacking it, the library would do that in one go, however long
+// it takes.
+bool Unpacker::PassOver() {
+  const int format = archive_format(packed);
+  const bool is_unpacked = archive_filter_count(packed) > 1 || size < 0 ||
+                           format == ARCHIVE_FORMAT_7ZIP || format == ARCHIVE_FORMAT_RAR_V5 ||
+                           format == ARCHIVE_FORMAT_CAB;
+  int code = is_unpacked && is_inside ? ARCHIVE_OK : ARCHIVE_EOF;
+  while (IsUsable(code)) {
+    const void* block = nullptr;
+    size_t length = 0;
+    la_int64_t offset = 0;  // what lies between blocks is a hole, and costs nothing
+    code = archive_read_data_block(packed, &block, &length, &offset);
+    if (IsUsable(code)) {
+      counted += static_cast<int64_t>(length);
+      if (!allowance.TakeBytes(static_cast<int64_t>(length)) || allowance.IsSpent()) {
+        return false;
+      }
+    }
+  }
+  is_inside = false;
+  return true;  // what cannot be unpacked may still be followed by what can
+}
+
 bool Unpacker::Next() {
   const Utf8Locale locale;
-  // A compressed stream is unpacked even where its members are only skipped.
+  if (!PassOver()) {
+    return false;
+  }
+  // A compressed stream is unpacked between its members' bytes, too.
   const int64_t unpacked = archive_filter_count(packed) > 1 ? archive_filter_bytes(packed, 0) : 0;
   const int64_t skipped = std::max<int64_t>(unpacked - counted, 0);
   counted += skipped;
@@ -107,6 +134,7 @@ bool Unpacker::Next() {
   size = archive_entry_size_is_set(entry) != 0 ? archive_entry_size(entry) : -1;
   is_file = archive_entry_filetype(entry) == AE_IFREG || archive_entry_filetype(entry) == 0;
   is_encrypted = archive_entry_is_encrypted(entry) != 0;
+  is_inside = true;
   is_bare = archive_format(packed) == ARCHIVE_FORMAT_RAW;
   // Any file at all passes for one that is not even compressed.
   is_damaged = is_bare && archive_filter_count(packed) == 1;
@@ -120,7 +148,7 @@ ssize_t Unpacker::Read(char* into, size_t count) {
     return -1;
   }
   counted += got;
-  return allowance.TakeBytes(got) ? got : -1;
+  return allowance.TakeBytes(got) && !allowance.IsSpent() ? got : -1;
 }
 
 bool Unpacker::ReadAll(size_t limit, std::string& bytes) {

@@ -52,10 +52,13 @@ class Unpacker {
 
  private:
   bool UseFormats(Formats formats);
+  // The rest of the current member. False where the allowance is spent.
+  bool PassOver();
 
   Allowance allowance;
   struct archive* packed = nullptr;
-  int64_t counted = 0;  // bytes that the allowance was asked for
+  bool is_inside = false;  // there is a current member, perhaps not read to its end
+  int64_t counted = 0;     // bytes that the allowance was asked for
 };
 
 }  // namespace fileindexd

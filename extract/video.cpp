@@ -13,6 +13,8 @@ namespace {
 constexpr std::string_view READ_ENDINGS =
     "mp4 m4v mp4v mov qt avi divx xvid mkv mk3d webm wmv asf flv f4v mpg mpeg mpe m1v m2v mpv "
     "mpv2 mp2v vob m2t m2ts mts tod 3gp 3gpp 3g2 3gp2 ogv ogm ogx";
+// TypeScript's as well: without a track, what is in such a file tells.
+constexpr std::string_view AMBIGUOUS_ENDINGS = "ts";
 
 }  // namespace
 
@@ -30,8 +32,8 @@ bool ReadVideo(const Document& document, ContentSink& sink, std::string& why) {
     PutTracks(*tracks, sink);
     return true;
   }
-  // "ts" is TypeScript's ending as well, so nothing is said of such a file.
-  if (!tracks && !HasEnding(document.name, READ_ENDINGS)) {
+  if (!tracks && !HasEnding(document.name, READ_ENDINGS) &&
+      !HasEnding(document.name, AMBIGUOUS_ENDINGS)) {
     return true;
   }
   why = document.size == 0 ? "empty" : tracks ? "damaged, no track in it" : "damaged, or no film";

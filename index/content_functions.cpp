@@ -2,14 +2,19 @@
 #include "index/content_functions.h"
 
 #include <algorithm>
+#include <climits>
 #include <cstring>
 #include <exception>
 
+#include "base/content.h"
 #include "index/fts5_api.h"
 
 namespace fileindexd {
 
 namespace {
+
+constexpr int TITLE_COLUMN = 0;
+constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELDS);
 
 void WordHits(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {
@@ -32,10 +37,43 @@ int CountPlaces(const Fts5ExtensionApi* api, Fts5Context* match, std::vector<Wor
     code = api->xInst(match, i, &word, &column, &offset);
     if (code == SQLITE_OK) {
       WordPlaces& place = places[static_cast<size_t>(word)];
-      (column == 0 ? place.title : column == 1 ? place.fields : place.text) += 1;
+      (column == TITLE_COLUMN  ? place.title
+       : column == TEXT_COLUMN ? place.text
+                               : place.fields) += 1;
     }
   }
   return code;
+}
+
+// The end of a name is the last phrase of the question.
+void NameRank(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
+              int /*count*/, sqlite3_value** /*arguments*/) {
+  int hits = 0;
+  int code = api->xInstCount(match, &hits);
+  const int last = api->xPhraseCount(match) - 1;
+  int end = 0;
+  int first = INT_MAX;
+  int covered = 0;
+  int before = -1;
+  for (int i = 0; i < hits && code == SQLITE_OK; ++i) {
+    int word = 0;
+    int column = 0;
+    int offset = 0;
+    code = api->xInst(match, i, &word, &column, &offset);
+    if (word == last) {
+      end = offset;
+    } else {
+      first = std::min(first, offset);
+      covered += offset > before ? api->xPhraseSize(match, word) : 0;  // each place once
+      before = offset;
+    }
+  }
+  if (code != SQLITE_OK) {
+    sqlite3_result_error_code(result, code);
+    return;
+  }
+  const int rank = covered >= end ? 3 : first != 0 ? 0 : covered + 1 == end ? 2 : 1;
+  sqlite3_result_double(result, rank + static_cast<double>(covered) / (end + 1));
 }
 
 void PutWordPlaces(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
@@ -56,15 +94,17 @@ void PutWordPlaces(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_cont
 
 }  // namespace
 
-int RegisterContentFunctions(sqlite3* db) {
+int RegisterQuestionFunctions(sqlite3* db) {
   fts5_api* api = Fts5Of(db);
   if (api == nullptr) {
     return SQLITE_NOMEM;
   }
-  const int code = api->xCreateFunction(api, "word_hits", nullptr, WordHits, nullptr);
-  return code == SQLITE_OK
+  int code = api->xCreateFunction(api, "word_hits", nullptr, WordHits, nullptr);
+  code = code == SQLITE_OK
              ? api->xCreateFunction(api, "word_places", nullptr, PutWordPlaces, nullptr)
              : code;
+  return code == SQLITE_OK ? api->xCreateFunction(api, "name_rank", nullptr, NameRank, nullptr)
+                           : code;
 }
 
 std::vector<WordPlaces> ReadWordPlaces(std::string_view bytes, size_t words) {

@@ -1,8 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// What questions ask the full-text table of contents about a match.
+// What questions ask the full-text tables about a match.
 //
 //   word_hits(words)    how often the question's words stand there
 //   word_places(words)  for each word of the question, where: see ReadWordPlaces
+//   name_rank(names)    how well the words answer as a name, the last of them being NAME_END: about
+//                       what HitScore says
 #pragma once
 
 #include <sqlite3.h>
@@ -13,7 +15,7 @@
 
 namespace fileindexd {
 
-int RegisterContentFunctions(sqlite3* db);  // SQLite's code
+int RegisterQuestionFunctions(sqlite3* db);  // SQLite's code
 
 // How often one word stands in each column.
 struct WordPlaces {

@@ -67,19 +67,34 @@ bool AddNumber(ContentField field, const std::string& digits, Content& content) 
 
 }  // namespace
 
+size_t ContentWords::Length() const {
+  size_t length = text.size() + numbers.size();
+  for (const std::string_view field : fields) {
+    length += field.size();
+  }
+  return length;
+}
+
 ContentWords WordsOf(const Content& content) {
   ContentWords words;
   for (const TextField& field : content.texts) {
-    std::string& column = field.field == ContentField::TITLE ? words.title : words.fields;
-    column += (column.empty() ? "" : "\n") + field.text;
+    words.fields[static_cast<size_t>(field.field) - 1] = field.text;
   }
   for (const NumberField& number : content.numbers) {
     if (IsWord(number.field)) {
-      words.fields += (words.fields.empty() ? "" : "\n") + std::to_string(number.number);
+      words.numbers += (words.numbers.empty() ? "" : " ") + std::to_string(number.number);
     }
   }
   words.text = content.text;
   return words;
+}
+
+int64_t FieldBits(const Content& content) {
+  int64_t bits = 0;
+  for (const TextField& field : content.texts) {
+    bits |= int64_t{1} << static_cast<int>(field.field);
+  }
+  return bits;
 }
 
 std::string PackTexts(const Content& content) {

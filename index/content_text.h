@@ -8,6 +8,7 @@
 //   text     0(1) bytes, to the end
 #pragma once
 
+#include <array>
 #include <string>
 #include <string_view>
 
@@ -18,14 +19,17 @@ namespace fileindexd {
 // What goes into the columns of the full-text table. Depends on nothing but what is packed:
 // deleting gives the same words again.
 struct ContentWords {
-  std::string title;
-  std::string fields;
-  std::string_view text;  // the content's own
+  std::array<std::string_view, TEXT_FIELDS> fields;  // by number, from 1; the content's own
+  std::string_view text;
+  std::string numbers;  // those that people look for as words
 
-  bool IsEmpty() const { return title.empty() && fields.empty() && text.empty(); }
-  size_t Length() const { return title.size() + fields.size() + text.size(); }
+  size_t Length() const;
+  bool IsEmpty() const { return Length() == 0; }
 };
 ContentWords WordsOf(const Content& content);
+
+// A bit for each text field that is there: 1 << number.
+int64_t FieldBits(const Content& content);
 
 // Empty when there is no memory.
 std::string PackTexts(const Content& content);

@@ -15,7 +15,9 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int FIRST_NUMBER_COLUMN = 7;  // of FILE_OF_ENTRY
+constexpr int FIRST_NUMBER_COLUMN = 7;  // of FileOfEntrySql
+constexpr const char* FILE_OF_ENTRY =
+    " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
 
 // What the writer has counted, but for two: a failed file whose entry is gone would count until it
 // is swept, while nobody lists it; and what the daemon wrote waits, though it is not taken in yet.
@@ -50,8 +52,19 @@ const char* StateText(ContentState state) {
 std::string FileOfEntrySql() {
   return "SELECT state, reason, found_kind, is_cut, sample, text,"
          " (SELECT packed FROM contents.texts WHERE id = text), " +
-         std::string(NUMBER_COLUMNS) +
-         " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
+         std::string(NUMBER_COLUMNS) + FILE_OF_ENTRY;
+}
+
+// The row of the file that the entry shows now; false when there is none.
+bool StepTo(sqlite3* db, const std::string& sql, const Entry& entry, Statement& row) {
+  if (row.Prepare(db, sql.c_str()) != SQLITE_OK) {
+    return false;
+  }
+  row.BindInt(1, static_cast<int64_t>(entry.inode));
+  row.BindInt(2, entry.birth_time);
+  row.BindInt(3, entry.size);
+  row.BindInt(4, entry.mtime);
+  return row.Step() == SQLITE_ROW;
 }
 
 bool ReadContent(const Statement& row, Content& content) {
@@ -69,6 +82,17 @@ bool ReadContent(const Statement& row, Content& content) {
   return row.Int(5) == 0 || UnpackTexts(row.Bytes(6), content);
 }
 
+// The table of words comes a moment after the others, once its language is known.
+IndexError LookForWords(IndexDatabase& entries) {
+  Statement words;
+  int code = words.Prepare(entries.db, "SELECT 1 FROM contents.sqlite_master WHERE name = 'words'");
+  code = code == SQLITE_OK ? words.Step() : code;
+  if (code == SQLITE_ROW) {
+    return IndexError::NONE;
+  }
+  return code == SQLITE_DONE ? IndexError::PATH_NOT_FOUND : FromSqlite(code);
+}
+
 }  // namespace
 
 IndexError AttachContents(IndexDatabase& entries, const std::string& share_name) {
@@ -81,7 +105,7 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
   }
 
   int code = RegisterTextTokenizer(entries.db);
-  code = code == SQLITE_OK ? RegisterContentFunctions(entries.db) : code;
+  code = code == SQLITE_OK ? RegisterQuestionFunctions(entries.db) : code;
   Statement attach;
   code = code == SQLITE_OK ? attach.Prepare(entries.db, "ATTACH ?1 AS contents") : code;
   if (code != SQLITE_OK) {
@@ -90,11 +114,12 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
   const std::string file = ContentsPath(share_name) + "/" + CONTENTS_FORM.file;
   attach.BindText(1, file);
   code = attach.Run();
-  if (code == SQLITE_OK) {
-    int persist = 1;
-    sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
+  if (code != SQLITE_OK) {
+    return FromSqlite(code);
   }
-  return FromSqlite(code);
+  int persist = 1;
+  sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
+  return LookForWords(entries);
 }
 
 IndexError ContentsReader::Open(const std::string& share_name) {
@@ -157,21 +182,34 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
 bool ContentsReader::Find(const Entry& entry, Content& content, std::string& state,
                           std::string& reason) {
   Statement find;
-  if (find.Prepare(entries.db, FileOfEntrySql().c_str()) != SQLITE_OK) {
-    return false;
-  }
-  find.BindInt(1, static_cast<int64_t>(entry.inode));
-  find.BindInt(2, entry.birth_time);
-  find.BindInt(3, entry.size);
-  find.BindInt(4, entry.mtime);
   Content read;
-  if (!entry.content_wanted || find.Step() != SQLITE_ROW || !ReadContent(find, read)) {
+  if (!entry.content_wanted || !StepTo(entries.db, FileOfEntrySql(), entry, find) ||
+      !ReadContent(find, read)) {
     return false;
   }
   content = std::move(read);
   state = StateText(static_cast<ContentState>(find.Int(0)));
   reason = find.Bytes(1);
   return true;
+}
+
+bool ContentsReader::FindReading(const Entry& entry, ContentReading& reading) {
+  Statement find;
+  if (!entry.content_wanted ||
+      !StepTo(entries.db, std::string("SELECT extractor, tries") + FILE_OF_ENTRY, entry, find)) {
+    return false;
+  }
+  reading = {find.Int(0), find.Int(1)};
+  return true;
+}
+
+std::string ContentsReader::Language() {
+  Statement read;
+  const bool found =
+      read.Prepare(entries.db, "SELECT language FROM contents.meta WHERE id = 1") == SQLITE_OK &&
+      read.Step() == SQLITE_ROW;
+  const std::string name = found ? LanguageName(read.Bytes(0)) : "";
+  return name.empty() ? NO_LANGUAGE : name;
 }
 
 }  // namespace fileindexd

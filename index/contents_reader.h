@@ -30,6 +30,11 @@ struct FailedContent {
   int64_t tries = 0;
 };
 
+struct ContentReading {
+  int64_t extractor = 0;  // version of the readers that read it last; 0: none did
+  int64_t tries = 0;      // that ended with the death of the reader
+};
+
 // Attaches the share's contents to its open entries as "contents", with all that questions need.
 // PATH_NOT_FOUND: nothing was read out of the share's files yet. The entries stay usable whatever
 // comes.
@@ -45,6 +50,10 @@ class ContentsReader {
   // The content that stands for the entry: state in words ("waiting", "done", "failed"), and the
   // reason of a failure. False when there is none, or reading failed.
   bool Find(const Entry& entry, Content& content, std::string& state, std::string& reason);
+  // How it was read. False as above.
+  bool FindReading(const Entry& entry, ContentReading& reading);
+  // Whose word forms its words were cut to; NO_LANGUAGE where that is not to be had.
+  std::string Language();
 
   IndexDatabase entries;  // with the contents attached as "contents"
 };

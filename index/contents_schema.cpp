@@ -33,6 +33,7 @@ CREATE TABLE files(
   reason TEXT NOT NULL DEFAULT '',
   is_cut INTEGER NOT NULL DEFAULT 0,
   sample INTEGER NOT NULL DEFAULT 0,
+  fields INTEGER NOT NULL DEFAULT 0,
   pages INTEGER, created INTEGER, sent INTEGER, taken INTEGER, recorded INTEGER, year INTEGER,
   track INTEGER, duration INTEGER, bit_rate INTEGER, width INTEGER, height INTEGER,
   latitude INTEGER, longitude INTEGER, rating INTEGER,
@@ -42,6 +43,7 @@ CREATE INDEX files_failed ON files(id) WHERE state >= 2;
 CREATE INDEX files_begun ON files(id) WHERE begun <> 0;
 CREATE INDEX files_unreferred ON files(unreferred_since) WHERE unreferred_since <> 0;
 CREATE INDEX files_by_text ON files(text, inode, birth_time, size, mtime) WHERE text <> 0;
+CREATE INDEX files_by_sample ON files(sample, size) WHERE sample <> 0;
 CREATE TABLE texts(id INTEGER PRIMARY KEY, packed BLOB NOT NULL);
 CREATE TABLE counts(
   kind INTEGER PRIMARY KEY,
@@ -81,12 +83,16 @@ const char* const NUMBER_COLUMNS =
     "pages, created, sent, taken, recorded, year, track, duration, bit_rate, width, height, "
     "latitude, longitude, rating";
 
+const char* const WORD_COLUMNS =
+    "title, author, subject, description, keywords, sender, receivers, attachments, members, "
+    "artist, album, album_artist, genre, composer, codecs, camera, lens, caption, text, numbers";
+
 // The hash that collects words before they are written as a segment holds 8 MiB: fewer segments
 // to merge, which is what most of the time goes into.
 std::string WordsSchema(const std::string& language) {
   return "DROP TABLE IF EXISTS words;"
-         "CREATE VIRTUAL TABLE words USING fts5(title, fields, text, content='', columnsize=0,"
-         " tokenize='" +
+         "CREATE VIRTUAL TABLE words USING fts5(" +
+         std::string(WORD_COLUMNS) + ", content='', columnsize=0, tokenize='" +
          std::string(TEXT_TOKENIZER) + " " + language +
          "');"
          "INSERT INTO words(words, rank) VALUES('automerge', 16);"

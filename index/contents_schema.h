@@ -25,11 +25,13 @@
 //                       waits
 //     text              rowid in `texts` and `words`; 0: there is none
 //     length            bytes of its words
+//     fields            a bit for each text field that it has: 1 << number
 //     pages … rating    the number fields; NULL: not known
 //   texts     the text fields and the text, packed (see content_text.h). Rowids ascend in the order
 //             of reading: the full-text table collects changes in memory only while they do
-//   words     the same by words: title, other fields, text. No stored copy, so deleting needs what
-//             was inserted. Made by the writer, as the share's language is among its arguments
+//   words     the same by words: a column for each text field, and the text. No stored copy, so
+//             deleting needs what was inserted. Made by the writer, as the share's language is
+//             among its arguments
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
 //             failed
 //   rate      for each second with commits of the last minute: how many files were done
@@ -68,6 +70,8 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;
+// The columns of `words`: those of the text fields in their order, the text, and numbers as words.
+extern const char* const WORD_COLUMNS;
 
 // Makes the words anew, empty, for that language (one of IsLanguage).
 std::string WordsSchema(const std::string& language);

@@ -105,6 +105,7 @@ class ContentsTable {
   int WriteCounts(int64_t now);
   void Count(const ContentFile& file, int64_t number);
   int ReadFiles(Statement& statement, std::vector<ContentFile>& files);
+  static int RunWords(Statement& statement, int64_t text, const ContentWords& words);
   int AddWords(int64_t text, const ContentWords& words);
   int RemoveWords();
   int RemoveWordsOf(int64_t text);

@@ -14,10 +14,10 @@ constexpr size_t REWORD_ROW = 500;  // a text is not free, however short
 constexpr size_t NUMBERS = 14;
 
 std::string SetContentSql() {
-  std::string sql = "UPDATE files SET is_cut = ?2, sample = ?3, (" + std::string(NUMBER_COLUMNS);
-  sql += ") = (?4";
+  std::string sql = "UPDATE files SET is_cut = ?2, sample = ?3, fields = ?4, (" +
+                    std::string(NUMBER_COLUMNS) + ") = (?5";
   for (size_t i = 1; i < NUMBERS; ++i) {
-    sql += ", ?" + std::to_string(i + 4);
+    sql += ", ?" + std::to_string(i + 5);
   }
   return sql + ") WHERE id = ?1";
 }
@@ -43,13 +43,16 @@ int ContentsTable::PrepareTexts() {
 }
 
 int ContentsTable::PrepareWords() {
-  const int code = insert_words.Prepare(
-      handle, "INSERT INTO words(rowid, title, fields, text) VALUES(?1, ?2, ?3, ?4)");
-  return code != SQLITE_OK
-             ? code
-             : remove_words.Prepare(handle,
-                                    "INSERT INTO words(words, rowid, title, fields, text) "
-                                    "VALUES('delete', ?1, ?2, ?3, ?4)");
+  std::string values = "?1";
+  for (size_t i = 0; i <= TEXT_FIELDS + 1; ++i) {
+    values += ", ?" + std::to_string(i + 2);
+  }
+  const std::string columns = std::string("rowid, ") + WORD_COLUMNS + ") VALUES(";
+  const std::string insert_sql = "INSERT INTO words(" + columns + values + ")";
+  const std::string remove_sql =
+      "INSERT INTO words(words, " + columns + "'delete', " + values + ")";
+  const int code = insert_words.Prepare(handle, insert_sql.c_str());
+  return code == SQLITE_OK ? remove_words.Prepare(handle, remove_sql.c_str()) : code;
 }
 
 int ContentsTable::MakeWords(const std::string& language, const std::string& version) {
@@ -78,11 +81,12 @@ int ContentsTable::SetContent(const ContentFile& before, const Content& content,
   set_content.BindInt(1, before.id);
   set_content.BindInt(2, content.is_cut ? 1 : 0);
   set_content.BindInt(3, static_cast<int64_t>(content.sample));
+  set_content.BindInt(4, FieldBits(content));
   for (size_t i = 0; i < NUMBERS; ++i) {
-    sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 4);
+    sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 5);
   }
   for (const NumberField& field : content.numbers) {
-    set_content.BindInt(4 + static_cast<int>(field.field) - static_cast<int>(FIRST_NUMBER_FIELD),
+    set_content.BindInt(5 + static_cast<int>(field.field) - static_cast<int>(FIRST_NUMBER_FIELD),
                         field.number);
   }
   code = set_content.Run();
@@ -114,12 +118,27 @@ int ContentsTable::RemoveContent(ContentFile& file) {
   return Begin();
 }
 
+// An empty column is NULL: the tokenizer is not even called.
+int ContentsTable::RunWords(Statement& statement, int64_t text, const ContentWords& words) {
+  statement.BindInt(1, text);
+  int column = 2;
+  const auto bind = [&](std::string_view value) {
+    if (value.empty()) {
+      sqlite3_bind_null(statement.handle, column++);
+    } else {
+      statement.BindText(column++, value);
+    }
+  };
+  for (const std::string_view field : words.fields) {
+    bind(field);
+  }
+  bind(words.text);
+  bind(words.numbers);
+  return statement.Run();
+}
+
 int ContentsTable::AddWords(int64_t text, const ContentWords& words) {
-  insert_words.BindInt(1, text);
-  insert_words.BindText(2, words.title);
-  insert_words.BindText(3, words.fields);
-  insert_words.BindText(4, words.text);
-  return insert_words.Run();
+  return RunWords(insert_words, text, words);
 }
 
 int ContentsTable::RemoveWords() {
@@ -144,12 +163,7 @@ int ContentsTable::RemoveWordsOf(int64_t text) {
 
   code = SQLITE_OK;
   if (text <= meta.reworded || text > meta.reword_end) {
-    const ContentWords words = WordsOf(content);
-    remove_words.BindInt(1, text);
-    remove_words.BindText(2, words.title);
-    remove_words.BindText(3, words.fields);
-    remove_words.BindText(4, words.text);
-    code = remove_words.Run();
+    code = RunWords(remove_words, text, WordsOf(content));
   }
   remove_text.BindInt(1, text);
   return code == SQLITE_OK ? remove_text.Run() : code;

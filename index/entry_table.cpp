@@ -275,8 +275,7 @@ int EntryTable::Insert(const Entry& entry) {
 
   ++entries;
   const int64_t id = sqlite3_last_insert_rowid(handle);
-  code = RunText(insert_name, id, entry.path);
-  return code == SQLITE_OK ? RunText(insert_part, id, entry.path) : code;
+  return RunTexts(insert_name, insert_part, id, entry.path);
 }
 
 int EntryTable::Update(const Entry& entry, bool reread) {
@@ -296,8 +295,7 @@ int EntryTable::Remove(const Entry& entry) {
 
   --entries;
   ++removed;
-  code = RunText(remove_name, entry.id, entry.path);
-  return code == SQLITE_OK ? RunText(remove_part, entry.id, entry.path) : code;
+  return RunTexts(remove_name, remove_part, entry.id, entry.path);
 }
 
 int EntryTable::RemoveAll(std::vector<const Entry*> leaving) {
@@ -310,11 +308,20 @@ int EntryTable::RemoveAll(std::vector<const Entry*> leaving) {
   return code;
 }
 
-int EntryTable::RunText(Statement& statement, int64_t id, const std::string& path) {
+int EntryTable::RunTexts(Statement& name, Statement& part, int64_t id, const std::string& path) {
   const std::string text = ToUtf8(LastComponent(path));
-  statement.BindInt(1, id);
-  statement.BindText(2, text);
-  return statement.Run();
+  const std::string words = NameRow(folder, text);
+  name.BindInt(1, id);
+  name.BindText(2, words);
+  const int code = name.Run();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+
+  const std::string folded = folder.Parts(text);
+  part.BindInt(1, id);
+  part.BindText(2, folded);
+  return part.Run();
 }
 
 }  // namespace fileindexd

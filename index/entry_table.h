@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "index/entry.h"
+#include "index/name_text.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -68,13 +69,14 @@ class EntryTable {
   int64_t NextStamp();
   void BindAttributes(Statement& statement, int column, const Entry& entry, bool reread);
   static int CollectPaths(Statement& statement, std::vector<std::string>& paths);
-  int RunText(Statement& statement, int64_t id, const std::string& path);
+  int RunTexts(Statement& name, Statement& part, int64_t id, const std::string& path);
   int GiveBackPages();
 
   Statement begin, commit, read_meta, write_meta, free_pages, give_back;
   Statement find, next, row, below, slice, twins, other_paths;
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
+  NameFolder folder;
   int64_t removed = 0;       // rows since room was last given back, the same
   int64_t last_written = 0;  // of all rows there ever were, the same
 };

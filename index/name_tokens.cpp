@@ -12,6 +12,13 @@ int Collect(void* context, int /*flags*/, const char* token, int size, int /*sta
   return SQLITE_OK;
 }
 
+int CollectPlaces(void* context, int /*flags*/, const char* token, int size, int start, int end) {
+  static_cast<std::vector<NameTokenizer::Place>*>(context)->push_back(
+      {std::string(token, static_cast<size_t>(size)), static_cast<size_t>(start),
+       static_cast<size_t>(end)});
+  return SQLITE_OK;
+}
+
 }  // namespace
 
 NameTokenizer::~NameTokenizer() {
@@ -43,6 +50,13 @@ std::vector<std::string> NameTokenizer::Tokens(std::string_view text) const {
   (void)functions.xTokenize(tokenizer, &tokens, FTS5_TOKENIZE_QUERY, text.data(),
                             static_cast<int>(text.size()), Collect);
   return tokens;
+}
+
+std::vector<NameTokenizer::Place> NameTokenizer::Places(std::string_view text) const {
+  std::vector<Place> places;
+  (void)functions.xTokenize(tokenizer, &places, FTS5_TOKENIZE_QUERY, text.data(),
+                            static_cast<int>(text.size()), CollectPlaces);
+  return places;
 }
 
 }  // namespace fileindexd

@@ -20,6 +20,12 @@ class NameTokenizer {
   bool Open();  // false when memory ran out
   // Lower case, without accents. `text` is valid UTF-8.
   std::vector<std::string> Tokens(std::string_view text) const;
+  struct Place {
+    std::string token;
+    size_t start = 0;  // bytes of the text
+    size_t end = 0;
+  };
+  std::vector<Place> Places(std::string_view text) const;
 
  private:
   sqlite3* db = nullptr;

@@ -2,6 +2,7 @@
 #include "index/reader.h"
 
 #include "index/entry_table.h"
+#include "index/read_transaction.h"
 #include "index/schema.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
@@ -9,20 +10,6 @@
 namespace fileindexd {
 
 namespace {
-
-// Two statements that read the same state. Closing it needs no disk, so its result does not count.
-class ReadTransaction {
- public:
-  explicit ReadTransaction(sqlite3* opened) : db(opened) {
-    code = sqlite3_exec(db, "BEGIN", nullptr, nullptr, nullptr);
-  }
-  ReadTransaction(const ReadTransaction&) = delete;
-  ReadTransaction& operator=(const ReadTransaction&) = delete;
-  ~ReadTransaction() { (void)sqlite3_exec(db, "COMMIT", nullptr, nullptr, nullptr); }
-
-  sqlite3* db;
-  int code;
-};
 
 // False when reading failed. `going` is false once `visit` wanted no more.
 bool VisitAll(Statement& statement, const std::function<bool(const Entry&)>& visit, bool& going) {

@@ -5,13 +5,15 @@
 
 namespace fileindexd {
 
-static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 3,
+static_assert(ENTRIES_APPLICATION == 1179209285 && ENTRIES_VERSION == 4,
               "numbers in the text below");
 
 // The full-text tables merge sixteen segments into one, a few pages at each commit: an entry is
 // then written anew only each time the index has grown sixteen times larger, and an entry more
 // costs about the same in an index of any size. Only well beyond that is a level merged at once,
 // which in a large index would hold one commit up for a second.
+// Entries by time are kept by weeks, and by size only the large ones: an index of a million exact
+// values is written all over at each commit, and costs as much as all the rest.
 const char* const ENTRIES_SCHEMA = R"sql(
 CREATE TABLE entries(
   id INTEGER PRIMARY KEY,
@@ -32,6 +34,8 @@ CREATE TABLE entries(
   reread INTEGER NOT NULL);
 CREATE INDEX entries_by_inode ON entries(inode);
 CREATE INDEX entries_wanted ON entries(written, content_wanted) WHERE content_wanted <> 0;
+CREATE INDEX entries_by_week ON entries(mtime / 604800000000000) WHERE mtime <> 0;
+CREATE INDEX entries_large ON entries(size) WHERE size >= 1048576;
 CREATE VIRTUAL TABLE names USING fts5(
   name, content='', columnsize=0, tokenize='unicode61 remove_diacritics 2');
 CREATE VIRTUAL TABLE parts USING fts5(
@@ -49,7 +53,7 @@ INSERT INTO names(names, rank) VALUES('crisismerge', 64);
 INSERT INTO parts(parts, rank) VALUES('automerge', 16);
 INSERT INTO parts(parts, rank) VALUES('crisismerge', 64);
 PRAGMA application_id = 1179209285;
-PRAGMA user_version = 3;
+PRAGMA user_version = 4;
 )sql";
 
 const DatabaseForm ENTRIES_FORM = {

@@ -19,12 +19,11 @@
 //     written         nanoseconds since the epoch: when this row was last written. Each write has a
 //                     greater number than all before it, even if the clock steps back
 //     reread          the `written` of the last add that found the same thing with other
-//     attributes:
-//                     its bytes may differ from those that were there before, even if size and
-//                     mtime do not; 0: none
-//   names        words of the last path component, made valid UTF-8; no stored copy, so deleting
+//                     attributes: its bytes may differ from those that were there before, even if
+//                     size and mtime do not; 0: none
+//   names        words of the last path component as NameRow gives them; no stored copy, so deleting
 //                needs the text that was inserted
-//   parts        the same text by trigrams, for substrings
+//   parts        the folded name by trigrams, for substrings
 //   meta         one row: number of rows in `entries`, when the last commit was made (seconds), how
 //                many rows were removed since room was last given back, the greatest `written`, and
 //                a random number that tells this database from the one that was there before it
@@ -39,7 +38,7 @@ namespace fileindexd {
 
 constexpr const char* ENTRIES_FILE = "entries.db";
 constexpr int64_t ENTRIES_APPLICATION = 0x46494e45;
-constexpr int64_t ENTRIES_VERSION = 3;
+constexpr int64_t ENTRIES_VERSION = 4;
 
 // Makes the tables in an empty database, and sets both numbers.
 extern const char* const ENTRIES_SCHEMA;

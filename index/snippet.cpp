@@ -2,12 +2,13 @@
 #include "index/snippet.h"
 
 #include <algorithm>
+#include <optional>
 #include <set>
 #include <string_view>
 #include <utility>
 
 #include "base/content.h"
-#include "index/question_words.h"
+#include "index/query.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -32,16 +33,34 @@ struct Place {
 };
 
 // Of a word with several tokens each one counts: where one stands, the others do.
-std::vector<Wanted> TokensOf(const QuestionWords& words, TextCutter& cutter) {
+std::vector<Wanted> TokensOf(const std::vector<const QueryNode*>& words, TextCutter& cutter) {
   std::vector<Wanted> tokens;
-  for (size_t word = 0; word < words.Count(); ++word) {
-    const bool is_beginning = IsBeginning(words.Text(word));
-    cutter.Cut(words.Text(word), true, [&](std::string_view token, size_t, size_t) {
+  for (size_t word = 0; word < words.size(); ++word) {
+    const std::string& text = words[word]->text;
+    const bool is_beginning = words[word]->is_beginning || IsBeginning(text);
+    cutter.Cut(text, true, [&](std::string_view token, size_t, size_t) {
       tokens.push_back({std::string(token), is_beginning, word});
       return true;
     });
   }
   return tokens;
+}
+
+// Those that are looked for in that field; none: in the text.
+std::vector<Wanted> WantedIn(std::optional<ContentField> field,
+                             const std::vector<const QueryNode*>& words,
+                             const std::vector<Wanted>& tokens) {
+  std::vector<Wanted> wanted;
+  for (const Wanted& token : tokens) {
+    const QueryNode& word = *words[token.word];
+    const bool counts = word.scope == Scope::ANY ||
+                        (word.scope == Scope::TEXT && !field.has_value()) ||
+                        (word.scope == Scope::FIELD && field == word.field);
+    if (counts) {
+      wanted.push_back(token);
+    }
+  }
+  return wanted;
 }
 
 std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& tokens,
@@ -122,16 +141,19 @@ Snippet Around(std::string_view text, const std::vector<Place>& places) {
 
 }  // namespace
 
-Snippet MakeSnippet(const Content& content, const QuestionWords& words, TextCutter& cutter) {
+Snippet MakeSnippet(const Content& content, const std::vector<const QueryNode*>& words,
+                    TextCutter& cutter) {
   const std::vector<Wanted> tokens = TokensOf(words, cutter);
-  std::vector<std::string_view> texts = {std::string_view(content.text).substr(0, MOST_TEXT)};
-  for (const TextField& field : content.texts) {
-    texts.emplace_back(field.text);
+  const std::string_view text = std::string_view(content.text).substr(0, MOST_TEXT);
+  const std::vector<Place> in_text = PlacesIn(text, WantedIn({}, words, tokens), cutter);
+  if (!in_text.empty()) {
+    return Around(text, in_text);
   }
-  for (const std::string_view text : texts) {
-    const std::vector<Place> places = PlacesIn(text, tokens, cutter);
-    if (!places.empty()) {
-      return Around(text, places);
+  for (const TextField& field : content.texts) {
+    const std::vector<Place> in_field =
+        PlacesIn(field.text, WantedIn(field.field, words, tokens), cutter);
+    if (!in_field.empty()) {
+      return Around(field.text, in_field);
     }
   }
   return {};

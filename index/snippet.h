@@ -8,7 +8,7 @@
 namespace fileindexd {
 
 struct Content;
-class QuestionWords;
+struct QueryNode;
 class TextCutter;
 
 struct Snippet {
@@ -22,6 +22,8 @@ struct Snippet {
 
 // Of the text, or of a field if none of the words stands in the text. Where many stand close
 // together, of those. Looks at the first part of a long text only.
-Snippet MakeSnippet(const Content& content, const QuestionWords& words, TextCutter& cutter);
+// `words`: nodes that are words; those that are looked for in one field count in that field alone.
+Snippet MakeSnippet(const Content& content, const std::vector<const QueryNode*>& words,
+                    TextCutter& cutter);
 
 }  // namespace fileindexd

@@ -18,7 +18,7 @@ using std::chrono::milliseconds;
 using std::chrono::seconds;
 
 // A database is written in many small pieces: between two readings of the events some gather.
-constexpr milliseconds BETWEEN_READINGS(20);
+constexpr milliseconds BETWEEN_READINGS(2);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
 constexpr milliseconds RELOAD_AGAIN(500);
 constexpr milliseconds RELOAD_FAILED(1000);
@@ -164,6 +164,12 @@ void ContentLoop::Listen(Time now) {
     const auto found = shares.find(name);
     if (found != shares.end()) {
       found->second.contents.EntriesChanged();
+    }
+  }
+  for (const std::string& name : std::exchange(hints.closed, {})) {
+    const auto found = shares.find(name);
+    if (found != shares.end()) {
+      found->second.contents.EntriesClosed();
     }
   }
 }

@@ -20,14 +20,18 @@ using std::chrono::seconds;
 // Rows of one slice: some milliseconds.
 constexpr size_t TAKE_IN_ROWS = 1000;
 constexpr size_t SWEEP_ROWS = 500;
-// A busy daemon commits many times a second: one look serves them all.
-constexpr milliseconds BETWEEN_LOOKS(100);
+// A busy daemon commits many times a second, and some of its commits take long: looks become rarer,
+// from one to the next, until it closes the entries.
+constexpr milliseconds SHORTEST_BETWEEN_LOOKS(2);
+constexpr milliseconds LONGEST_BETWEEN_LOOKS(100);
 // What is written into a database's log is told of at once, and counts only when the disk has it.
 // A slow disk may take its time.
 constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000),
                                         milliseconds(30000), milliseconds(120000)};
 constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
 constexpr milliseconds COMMIT_AGE(400);
+// What is still being read after that time is slow, and what was read beside it does not wait.
+constexpr milliseconds LULL(20);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
 constexpr seconds SHORTEST_REST(1);
@@ -63,6 +67,15 @@ void ShareContents::EntriesChanged() {
   has_news = true;
   later_looks = 0;
   is_missing = false;
+}
+
+// Nothing is opened for it, or our own closing would keep us awake for ever.
+void ShareContents::EntriesClosed() {
+  if (writer.IsOpen()) {
+    has_news = true;
+    between_looks = milliseconds(0);
+    next_take_in = std::min(next_take_in, taken_in + SHORTEST_BETWEEN_LOOKS);
+  }
 }
 
 void ShareContents::LookAtAll() {
@@ -169,7 +182,9 @@ bool ShareContents::TakeIn(Time now) {
   has_news = more;
   if (!more) {
     is_sweeping = true;
-    next_take_in = now + BETWEEN_LOOKS;
+    taken_in = now;
+    between_looks = std::clamp(2 * between_looks, SHORTEST_BETWEEN_LOOKS, LONGEST_BETWEEN_LOOKS);
+    next_take_in = now + between_looks;
     LookLater(now);
   }
   return true;
@@ -197,11 +212,18 @@ bool ShareContents::ReleasePatient(Time now) {
   return true;
 }
 
-bool ShareContents::Flows() const {
-  return has_news || Sweeps() || may_have_jobs || !ready.empty() || !running.empty();
+// With nothing more to come, at once: somebody may be waiting for it.
+Time ShareContents::CommitDue() const {
+  if (!first_change) {
+    return Time();
+  }
+  const Time latest = *first_change + COMMIT_AGE;
+  if (has_news || Sweeps() || may_have_jobs || !ready.empty()) {
+    return latest;
+  }
+  return running.empty() ? Time() : std::min(latest, last_end + LULL);
 }
 
-// With nothing more to come, at once: somebody may be waiting for it.
 bool ShareContents::CommitIfDue(Time now) {
   if (!writer.HasChanges()) {
     first_change.reset();
@@ -209,7 +231,7 @@ bool ShareContents::CommitIfDue(Time now) {
   }
 
   first_change = first_change.value_or(now);
-  if (Flows() && writer.PendingBytes() < enough_pending && now - *first_change < COMMIT_AGE) {
+  if (writer.PendingBytes() < enough_pending && now < CommitDue()) {
     return true;
   }
   return Commit();
@@ -281,7 +303,7 @@ Time ShareContents::Due() const {
     due = std::min(due, patient.begin()->first);
   }
   if (writer.HasChanges()) {
-    due = std::min(due, first_change && Flows() ? *first_change + COMMIT_AGE : Time());
+    due = std::min(due, CommitDue());
   }
   return std::min(due, IsIdle() ? idle_since + CLOSE_AFTER : Time::max());
 }

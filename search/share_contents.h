@@ -39,6 +39,8 @@ class ShareContents {
   // What is known of the share from outside, as it is now.
   void Set(const Share& current, const ShareStatus& status);
   void EntriesChanged();
+  // Whoever wrote to them is done with it: what EntriesChanged told of can be seen now.
+  void EntriesClosed();
   // All entries are looked at again.
   void LookAtAll();
   // The databases' files came or went: what is open may be of no use.
@@ -88,8 +90,8 @@ class ShareContents {
   bool IsResting(Time now) const { return now < rest_until; }
   bool CanWork(Time now) const;
   bool IsIdle() const;
-  bool Flows() const;
   bool Sweeps() const { return is_sweeping && !is_reindexing; }
+  Time CommitDue() const;
   void Open(Time now);
   bool TakeIn(Time now);
   void LookLater(Time now);
@@ -123,11 +125,14 @@ class ShareContents {
   bool retried = false;
   bool may_have_jobs = false;
   Time next_take_in;
-  Time later_look = Time::max();  // for what was told of before it could be seen
-  size_t later_looks = 0;         // since the last news
+  Time taken_in;                               // the last time
+  std::chrono::milliseconds between_looks{0};  // that find nothing
+  Time later_look = Time::max();               // for what was told of before it could be seen
+  size_t later_looks = 0;                      // since the last news
   Time next_full_look = Time::max();
   Time idle_since;
   std::optional<Time> first_change;  // that is not committed
+  Time last_end;                     // of a file that was given out
 
   Time rest_until;
   std::chrono::seconds rest{0};  // the last one; 0: all was well since

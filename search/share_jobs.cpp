@@ -161,6 +161,7 @@ void ShareContents::End(ExtractOutcome&& outcome, Time now) {
   const int64_t file = found->second.file;
   const bool is_still = IsStill(found->second.open.fd, found->second.identity);
   running.erase(found);
+  last_end = now;
 
   bool good = false;
   if (outcome.result == ExtractOutcome::Result::LOST || !is_still) {

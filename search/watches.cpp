@@ -19,9 +19,10 @@ namespace {
 
 constexpr uint32_t CAME_OR_WENT =
     IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_DELETE_SELF | IN_MOVE_SELF;
-// Only writing counts: closing does not, because readers open a database's files for writing too,
-// and our own look would wake us again.
+// Writing is told of before the commit can be seen. Closing is told of after it, but readers, we
+// among them, open a database's files for writing too: it only hastens a look.
 constexpr uint32_t CHANGED = CAME_OR_WENT | IN_MODIFY;
+constexpr uint32_t CHANGED_OR_CLOSED = CHANGED | IN_CLOSE_WRITE;
 
 constexpr uint32_t WENT = IN_DELETE | IN_MOVED_FROM;
 
@@ -72,7 +73,9 @@ void Watches::Set(const Settings& settings) {
 
 void Watches::Add(const std::string& path, const Target& target, std::map<int, Target>& kept) {
   const bool is_given = target.place == Target::ROOT || target.place == Target::RUN;
-  const uint32_t wanted = is_given || target.place == Target::INDEX ? CHANGED : CAME_OR_WENT;
+  const uint32_t wanted = target.place == Target::INDEX ? CHANGED_OR_CLOSED
+                          : is_given                    ? CHANGED
+                                                        : CAME_OR_WENT;
   // The state root, and the folder of pid files, may be named by a link.
   const uint32_t mask = wanted | IN_ONLYDIR | (is_given ? 0U : IN_DONT_FOLLOW);
   const int watch = inotify_add_watch(inotify.fd, path.c_str(), mask);
@@ -146,6 +149,10 @@ void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hi
     case Target::INDEX:
       if (name == "entries.db" && (mask & CAME_OR_WENT) != 0) {
         hints.remade.insert(target.share);
+      } else if ((mask & IN_CLOSE_WRITE) != 0) {
+        if (name == "entries.db-wal") {
+          hints.closed.insert(target.share);
+        }
       } else if (IsDatabaseFile(name, "entries.db")) {
         hints.shares.insert(target.share);
       }

@@ -22,10 +22,11 @@ namespace fileindexd {
 // What events have told since the last look.
 struct Hints {
   bool everything = false;       // shares, folders, flags, the pause or the daemon may be others
-  std::set<std::string> shares;  // a commit, by the share's name
+  std::set<std::string> shares;  // a commit that has begun at least, by the share's name
+  std::set<std::string> closed;  // somebody has closed the entries, as the daemon does after each
   std::set<std::string> remade;  // a database came or went, by the share's name
 
-  bool Any() const { return everything || !shares.empty() || !remade.empty(); }
+  bool Any() const { return everything || !shares.empty() || !closed.empty() || !remade.empty(); }
 };
 
 class Watches {

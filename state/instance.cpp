@@ -2,6 +2,7 @@
 #include "state/instance.h"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/file.h>
 #include <unistd.h>
 
@@ -12,6 +13,18 @@
 #include "state/pid_file.h"
 
 namespace fileindexd {
+
+namespace {
+
+constexpr int LOCK_WAIT_MS = 2000;
+constexpr int LOCK_NAP_MS = 5;
+
+// 0, or what was wrong.
+int Lock(int fd) {
+  return flock(fd, LOCK_EX | LOCK_NB) == 0 ? 0 : errno;
+}
+
+}  // namespace
 
 Instance::Instance(std::string name, std::string pids, std::string locks)
     : program(std::move(name)), pid_file(std::move(pids)), lock_file(std::move(locks)) {}
@@ -29,9 +42,18 @@ bool Instance::Claim(std::string& error) {
     return false;
   }
 
-  if (flock(opened.fd, LOCK_EX | LOCK_NB) != 0) {
-    error = errno == EWOULDBLOCK ? "another instance runs"
-                                 : lock_file + ": " + std::generic_category().message(errno);
+  // One that was killed can leave the lock, for a moment, to a child that it was about to make a
+  // helper of; and one that starts has not announced itself yet.
+  int failure = Lock(opened.fd);
+  for (int waited_ms = 0;
+       failure == EWOULDBLOCK && waited_ms < LOCK_WAIT_MS && AliveByPidFile(pid_file, program) <= 0;
+       waited_ms += LOCK_NAP_MS) {
+    (void)poll(nullptr, 0, LOCK_NAP_MS);
+    failure = Lock(opened.fd);
+  }
+  if (failure != 0) {
+    error = failure == EWOULDBLOCK ? "another instance runs"
+                                   : lock_file + ": " + std::generic_category().message(failure);
     return false;
   }
 

@@ -1,14 +1,18 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// The input is a question and, after a NUL, the name of one more entry. Whatever a user asks, the
-// full-text tables are not asked what they take for an error.
+// The input is a question and, after a NUL, the name of one more entry. Whatever a user asks, it is
+// understood or refused with a reason, and the full-text tables are not asked what they take for an
+// error. Counting finds as many as looking.
 #include <memory>
 #include <string>
 
 #include "fuzz/target.h"
+#include "index/asked.h"
+#include "index/content_functions.h"
 #include "index/database.h"
 #include "index/entry_table.h"
-#include "index/question_words.h"
+#include "index/hit_display.h"
 #include "index/search.h"
+#include "index/share_run.h"
 #include "scripted/temp_folder.h"
 #include "state/layout.h"
 
@@ -33,6 +37,7 @@ class Index {
     std::string error;
     Require(MakeShareFolder("s", error), error.c_str());
     Require(database.OpenForWriting(IndexPath("s"), true) == IndexError::NONE, "an index");
+    Require(RegisterQuestionFunctions(database.db) == SQLITE_OK, "functions");
     Require(table.Prepare(database.db) == SQLITE_OK, "its tables");
     Require(table.Begin() == SQLITE_OK, "a transaction");
     for (const char* name :
@@ -40,51 +45,57 @@ class Index {
       Require(table.Insert(EntryAt("/s", name)) == SQLITE_OK, "an entry");
     }
     Require(table.Commit(1) == SQLITE_OK, "a commit");
-    Require(
-        names.Prepare(database.db, "SELECT rowid FROM names WHERE names MATCH ?1") == SQLITE_OK &&
-            parts.Prepare(database.db, "SELECT rowid FROM parts WHERE parts MATCH ?1") == SQLITE_OK,
-        "statements");
+    Require(marker.Open(), "a tokenizer");
   }
 
   void Ask(const std::string& text, const std::string& name) {
-    QuestionWords words;
+    Question question;
+    question.text = text;
+    Asked asked;
     std::string error;
-    if (!words.Read(text, error)) {
-      Require(!error.empty(), "a refusal has a reason");
+    if (!asked.Read(question, error)) {
+      Require(!error.empty() && error.find('\n') == std::string::npos, "a reason in one line");
       return;
     }
 
     Require(table.Begin() == SQLITE_OK, "a transaction");
     const Entry entry = EntryAt("/s/fuzz", name);
     Require(table.Insert(entry) == SQLITE_OK, "a name of any bytes");
-    Match(names, words.NamesQuery());
-    Match(parts, words.PartsQuery());
-    (void)words.HoldsSigns(ToUtf8(LastComponent(entry.path)));
-    const double score = words.Score(entry);
-    Require(score >= 0 && score < 10, "a score in its range");
+    Run(question, asked);
+    size_t before = 0;
+    for (const Snippet::Mark& mark : MarksInPath(asked, entry.path, marker)) {
+      Require(mark.start >= before && mark.start < mark.end && mark.end <= entry.path.size(),
+              "marks lie in the path, in order");
+      before = mark.end;
+    }
     table.Rollback();
-    if (asked++ % EVERY == 0) {
-      AskAll(text);
+    if (asked_before++ % EVERY == 0) {
+      AskAll(question);
     }
   }
 
  private:
-  static void Match(Statement& statement, const std::string& query) {
-    if (query.empty()) {
-      return;
+  void Run(const Question& question, const Asked& asked) {
+    BestHits best(10, {});
+    uint64_t total = 0;
+    ShareRun run(database.db, false, question, asked, "s");
+    Require(run.Run(best, total) == SQLITE_OK, "no error");
+    best.Cut();
+    Require(best.hits.size() <= total, "hits are counted");
+    for (const Hit& hit : best.hits) {
+      Require(hit.score >= 0 && hit.score < 10, "a score in its range");
     }
-    statement.BindText(1, query);
-    int code = statement.Step();
-    while (code == SQLITE_ROW) {
-      code = statement.Step();
-    }
-    Require(code == SQLITE_DONE, ("no error in: " + query).c_str());
-    statement.Reset();
+
+    Question counted = question;
+    counted.limit = 0;
+    BestHits none(0, {});
+    uint64_t again = 0;
+    ShareRun count(database.db, false, counted, asked, "s");
+    Require(count.Run(none, again) == SQLITE_OK, "no error");
+    Require(again == total, "counting finds as many as looking");
   }
 
-  static void AskAll(const std::string& text) {
-    Question question;
-    question.text = text;
+  static void AskAll(Question question) {
     question.shares = {"s"};
     Answer answer;
     std::string error;
@@ -96,8 +107,8 @@ class Index {
   scripted::TempFolder folder;
   IndexDatabase database;
   EntryTable table;
-  Statement names, parts;
-  unsigned asked = 0;
+  NameMarker marker;
+  unsigned asked_before = 0;
 };
 
 }  // namespace

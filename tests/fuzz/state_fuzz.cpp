@@ -84,11 +84,11 @@ class Tables {
       paths.push_back(line.substr(1));
       return;
     }
-    const char* sql = kind == 's'   ? "INSERT OR IGNORE INTO share VALUES(?1, ?2, ?3)"
-                      : kind == 'f' ? "INSERT OR IGNORE INTO folder VALUES(?1, ?2, ?3, ?4, ?5, ?6)"
-                      : kind == 't'
-                          ? "INSERT OR IGNORE INTO status VALUES(?1, ?2, ?3, ?4, ?5, ?6, 0)"
-                          : nullptr;
+    const char* sql =
+        kind == 's'   ? "INSERT OR IGNORE INTO share VALUES(?1, ?2, ?3, COALESCE(?4, 'english'))"
+        : kind == 'f' ? "INSERT OR IGNORE INTO folder VALUES(?1, ?2, ?3, ?4, ?5, ?6)"
+        : kind == 't' ? "INSERT OR IGNORE INTO status VALUES(?1, ?2, ?3, ?4, ?5, ?6, 0, 0)"
+                      : nullptr;
     if (sql == nullptr) {
       return;
     }

@@ -5,6 +5,7 @@ import os
 import re
 
 from harness import main, namespace
+from harness.awaiting import await_in_folder
 from harness.filesystems import CREATE, REINDEX, FilesystemTest
 
 FILES = 3000
@@ -100,6 +101,15 @@ class FullShareTest(FilesystemTest):
         self.await_drained("alpha")
         self.check()
 
+    def await_no_space(self):
+        """The flag is set just after the line."""
+
+        def is_set():
+            (share,) = self.ctl("status", "--json").json()["shares"]
+            return share["no_space"]
+
+        self.assertTrue(await_in_folder(f"{namespace.STATE}/state.db", is_set))
+
     def test_full_share_stops_and_goes_on(self):
         self.make_files(self.root, "a.txt")
         self.add_share()
@@ -112,8 +122,7 @@ class FullShareTest(FilesystemTest):
         self.append("alpha", {"event": CREATE, "path": f"{self.root}/b.txt"})
 
         self.await_line("Share[alpha] is running out space", after)
-        (share,) = self.ctl("status", "--json").json()["shares"]
-        self.assertIs(share["no_space"], True)
+        self.await_no_space()
         os.unlink(filler)
         self.make_files(self.root, "c.txt")
         self.event(CREATE, "c.txt")

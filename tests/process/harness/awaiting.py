@@ -10,6 +10,7 @@ LIMIT = 60.0  # seconds; far beyond what anything takes that works
 
 IN_ANY = 0x00000FFE  # all changes of a folder and of what is in it, but reading
 IN_CHANGE = 0x00000FC2  # the same without opening and closing: what a look itself does not raise
+IN_CLOSE = 0x00000018
 IN_CLOEXEC = 0o2000000
 
 _libc = ctypes.CDLL(None, use_errno=True)
@@ -24,11 +25,12 @@ def _deepest_folder(path):
 class FolderWatch:
     """Tells when something happens in a folder. Watch first, then look, then wait."""
 
-    def __init__(self, folder, mask=IN_ANY):
+    def __init__(self, *folders, mask=IN_ANY):
         self.fd = _libc.inotify_init1(IN_CLOEXEC)
-        if self.fd < 0 or _libc.inotify_add_watch(self.fd, os.fsencode(folder), mask) < 0:
-            error = ctypes.get_errno()
-            raise OSError(error, os.strerror(error), folder)
+        for folder in folders:
+            if _libc.inotify_add_watch(self.fd, os.fsencode(folder), mask) < 0:
+                error = ctypes.get_errno()
+                raise OSError(error, os.strerror(error), folder)
 
     def wait(self, seconds):
         """False when nothing happened in that time."""
@@ -52,7 +54,7 @@ def await_in_folder(path, condition, limit=LIMIT, mask=IN_ANY):
     deadline = time.monotonic() + limit
     while True:
         folder = _deepest_folder(os.path.dirname(path))
-        with FolderWatch(folder, mask) as watch:
+        with FolderWatch(folder, mask=mask) as watch:
             while folder == _deepest_folder(os.path.dirname(path)):
                 if condition():
                     return True

@@ -1,12 +1,15 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Shares on real file systems: ext4 and btrfs on loop devices, tmpfs."""
 
+import contextlib
+import errno
 import os
 import subprocess
 import sys
+import time
 
 from harness import namespace
-from harness.awaiting import LIMIT
+from harness.awaiting import IN_CLOSE, LIMIT, FolderWatch
 from harness.checks import IndexTest
 
 IMAGE_SIZE = {"ext4": 512 << 20, "btrfs": 512 << 20, "xfs": 512 << 20}
@@ -32,6 +35,34 @@ def run(*command):
         list(map(os.fsencode, command)), capture_output=True, check=False, timeout=LIMIT
     )
     assert done.returncode == 0, f"{command}: {done.stderr!r}"
+
+
+def _is_mounted_somewhere(folder):
+    mounted = f" {folder} ".encode()
+    for process in filter(str.isdigit, os.listdir("/proc")):
+        with contextlib.suppress(OSError), open(f"/proc/{process}/mountinfo", "rb") as mounts:
+            if mounted in mounts.read():
+                return True
+    return False
+
+
+def unmount(folder):
+    """Once nothing there is open: the content service may be reading a document.
+
+    A reader's helper that has just begun holds copies of all mounts, until it has a root of its
+    own; nothing tells of the end of that.
+    """
+    deadline = time.monotonic() + LIMIT
+    with FolderWatch(*(path for path, _, _ in os.walk(folder)), mask=IN_CLOSE) as watch:
+        while True:
+            try:
+                namespace.unmount(folder)
+                break
+            except OSError as error:
+                if error.errno != errno.EBUSY or not watch.wait(deadline - time.monotonic()):
+                    raise
+    while _is_mounted_somewhere(folder) and time.monotonic() < deadline:
+        time.sleep(0.01)
 
 
 def make_image(kind, name):
@@ -69,7 +100,7 @@ class FilesystemTest(IndexTest):
             namespace.mount("tmpfs", self.disk, "tmpfs")
 
     def unmount_disk(self):
-        run("umount", self.disk)
+        unmount(self.disk)
 
     def add_share(self, *folders, flags=()):
         self.ctl("share", "add", "alpha", self.root)

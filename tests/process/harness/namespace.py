@@ -65,7 +65,7 @@ def _make_dev():
     devices = {}
     for entry in os.scandir("/dev"):
         mode = entry.stat(follow_symlinks=False).st_mode
-        if stat.S_ISCHR(mode) or stat.S_ISBLK(mode):
+        if entry.name != "ptmx" and (stat.S_ISCHR(mode) or stat.S_ISBLK(mode)):
             devices[entry.name] = os.open(entry.path, os.O_PATH)
 
     mount("tmpfs", "/dev", "tmpfs", options="mode=0755")
@@ -82,6 +82,9 @@ def _make_dev():
         if os.geteuid() == 0 and "loop-control" in devices and not os.path.exists(path):
             os.mknod(path, stat.S_IFBLK | 0o600, os.makedev(LOOP_MAJOR, number))
     os.symlink("/proc/self/fd", "/dev/fd")
+    os.mkdir("/dev/pts")
+    mount("devpts", "/dev/pts", "devpts", options="newinstance,ptmxmode=0666")
+    os.symlink("pts/ptmx", "/dev/ptmx")
 
 
 def fresh_world(state_size="256m"):

@@ -5,7 +5,7 @@ import os
 import shutil
 
 from harness import namespace
-from harness.filesystems import FilesystemTest, run
+from harness.filesystems import FilesystemTest, run, unmount
 from harness.watching import WatchedTest
 
 
@@ -34,7 +34,7 @@ class SubvolumeTest(WatchedDiskTest):
     def mount_disk(self):
         run("mount", "-o", "loop", self.image, self.disk)
         run("btrfs", "subvolume", "create", f"{self.disk}/volume")
-        run("umount", self.disk)
+        unmount(self.disk)
         run("mount", "-o", "loop,subvol=volume", self.image, self.disk)
 
 
@@ -59,7 +59,7 @@ class BoundTest(WatchedDiskTest):
         hidden = f"{namespace.RUN}/bound"
         os.mkdir(hidden)
         namespace.mount(f"{self.disk}/inside", hidden, flags=namespace.MS_BIND)
-        run("umount", self.disk)
+        unmount(self.disk)
         namespace.mount(hidden, self.disk, flags=namespace.MS_BIND)
 
 

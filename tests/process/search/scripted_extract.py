@@ -20,7 +20,7 @@ import struct
 FOLDER = os.path.dirname(os.path.abspath(__file__))
 SOCKET = 3
 VERSION = 1
-TEXT, KIND, SAMPLE, FAILED, READY = 128, 130, 131, 133, 134
+TEXT, KIND, SAMPLE, FAILED, BEGUN, READY = 128, 130, 131, 133, 134, 135
 DOCUMENT = 1
 
 
@@ -74,6 +74,7 @@ def serve():
         file, name = receive(connection)
         if file is None:
             return
+        connection.sendall(frame(record(BEGUN, b"")))
         note(name)
         connection.sendall(read(file, name))
         os.close(file)

@@ -137,6 +137,26 @@ std::string Reach() {
   return done;
 }
 
+std::string Handle(int file) {
+  std::string done;
+  flock lock = {};
+  lock.l_type = F_RDLCK;
+  done += Refused(fcntl(file, F_SETFL, O_NONBLOCK) == 0, "mode");
+  done += Refused(fcntl(file, F_SETLK, &lock) == 0, "lock");
+  done += Refused(fcntl(file, F_OFD_SETLK, &lock) == 0, "lock");
+  done += Refused(fcntl(file, F_SETOWN, getppid()) == 0, "owner");
+  done += Refused(fcntl(file, F_SETSIG, SIGTERM) == 0, "signal");
+  done += Refused(fcntl(file, F_SETLEASE, F_RDLCK) == 0, "lease");
+  done += Refused(fcntl(file, F_NOTIFY, DN_MODIFY) == 0, "notify");
+  done += Refused(fcntl(file, F_SETPIPE_SZ, 1 << 20) >= 0, "pipe");
+  const int memory = memfd_create("test", MFD_CLOEXEC | MFD_ALLOW_SEALING);
+  done += Refused(fcntl(memory, F_ADD_SEALS, F_SEAL_WRITE) == 0, "seal");
+  // The C library's streams look at these.
+  done += fcntl(file, F_GETFL) >= 0 && fcntl(file, F_GETFD) >= 0 ? "" : "no-look ";
+  done += fcntl(file, F_DUPFD_CLOEXEC, 0) >= 0 ? "" : "no-copy ";
+  return done;
+}
+
 class DoorsTest : public ::testing::TestWithParam<int> {
  public:
   // 0: as this kernel has them; 1: without Landlock; 2: without namespaces too.
@@ -186,6 +206,11 @@ TEST_P(DoorsTest, NothingCanBeStarted) {
 
 TEST_P(DoorsTest, NobodyElseCanBeReached) {
   EXPECT_EQ(Behind(Kind(), Reach), "");
+}
+
+TEST_P(DoorsTest, NothingIsSetOnAFileThatWasHandedOver) {
+  const ScopedFd file(open((folder + "/file").c_str(), O_RDWR | O_CLOEXEC));
+  EXPECT_EQ(Behind(Kind(), [&] { return Handle(file.fd); }), "");
 }
 
 TEST_P(DoorsTest, WhatWasOpenBeforeIsRead) {

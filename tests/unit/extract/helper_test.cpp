@@ -135,6 +135,8 @@ TEST_F(HelperTest, ContentTellsWhereTheNameDoesNot) {
       {"README", "some plain words\n", "some plain words"},
       {"page", "<!DOCTYPE html><html><body><p>A pa<b>ge</b></body></html>", "A page"},
       {"drawing.pdf", "just a few words of text\n", "just a few words of text"},
+      {"main.ts", "import quay from 'sea';\nexport const tide = 1;\n",
+       "import quay from 'sea'; export const tide = 1;"},
       {"old.xml", "this is no markup\n", "this is no markup"},
       {"letter.txt", "{\\rtf1\\ansi\\pard Dear Sir\\par}", "{\\rtf1\\ansi\\pard Dear Sir\\par}"},
   };

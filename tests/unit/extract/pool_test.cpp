@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/pool.h"
 
+#include <sys/wait.h>
+
 #include <csignal>
 #include <cstdlib>
 #include <thread>
@@ -81,6 +83,24 @@ TEST_F(PoolTest, ADocumentHasItsDeadline) {
   EXPECT_EQ(Told(Run("half")), "killed: took longer than 300 ms");
 }
 
+TEST_F(PoolTest, ADocumentThatGotNoProcessorTimeIsBegunAgain) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  EXPECT_EQ(Told(Run("starve", "")), "done");
+}
+
+TEST_F(PoolTest, AnIdleHelperThatSaysAnythingIsReplaced) {
+  const ExtractOutcome outcome = Run("more");
+  EXPECT_EQ(Told(outcome), "done");
+  const pid_t helper = std::stoi(outcome.content.text);
+  int status = 0;
+  ASSERT_EQ(waitpid(helper, &status, WUNTRACED), helper);
+  ASSERT_TRUE(WIFSTOPPED(status));
+  ASSERT_EQ(kill(helper, SIGCONT), 0);
+  Wait(std::chrono::steady_clock::now() + LIMIT);
+  EXPECT_TRUE(pool->Work().empty());
+  EXPECT_NE(std::stoi(Run("pid").content.text), helper);
+}
+
 TEST_F(PoolTest, ASlowDocumentHoldsNobodyUp) {
   OpenWith(2, PoolFixture::LIMIT);
   Submit(1, "loop");
@@ -108,6 +128,11 @@ TEST_F(PoolTest, AnIdleHelperThatIsGoneIsReplacedUnseen) {
 TEST_F(PoolTest, AHelperThatEndsBeforeItBeginsIsNotTheFilesFault) {
   EXPECT_EQ(Told(Run("text a")), "done");
   EXPECT_EQ(Told(Run("refuse")), "done");
+}
+
+TEST_F(PoolTest, AFileThatNoHelperHasBegunIsNeverToBlame) {
+  EXPECT_EQ(Told(Run("never")), "lost: the helper ended before it began, with code 5");
+  EXPECT_EQ(Told(Run("text next")), "done");
 }
 
 TEST_F(PoolTest, ManyJobsAtOnceAllEnd) {

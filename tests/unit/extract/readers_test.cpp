@@ -119,6 +119,33 @@ TEST(TextTest, ACharsetIsToldByTheFirstPieceThatTells) {
   EXPECT_TRUE(found.content.text == plain + " " + FRENCH);
 }
 
+TEST(TextTest, AWrongUnitCostsItsLetterAlone) {
+  using std::string_view_literals::operator""sv;
+  // The second half of a pair where a letter should be.
+  EXPECT_EQ(Read(ReadText,
+                 "\xFF\xFE"
+                 "a\0"
+                 "\x00\xDC"
+                 "b\0c\0"sv)
+                .content.text,
+            "a bc");
+  EXPECT_EQ(Read(ReadText,
+                 "\0\0\xFE\xFF"
+                 "\0\0\0a"
+                 "\0\x7F\0\0"
+                 "\0\0\0b"sv)
+                .content.text,
+            "a b");
+}
+
+TEST(TextTest, ABadByteDoesNotMakeItAnotherCharset) {
+  const std::string text = JAPANESE;
+  EXPECT_EQ(Read(ReadText, text + "\xE9 " + text).content.text, text + " " + text);
+  // Much of Latin text is ASCII, and a pair of its letters may look like UTF-8.
+  const std::string french = InCharset("WINDOWS-1252", FRENCH);
+  EXPECT_EQ(Read(ReadText, french + " \xC3\xA9").content.text, std::string(FRENCH) + " Ã©");
+}
+
 TEST(TextTest, BinaryDataIsRefused) {
   std::string noise;
   uint32_t state = 1;
@@ -179,6 +206,24 @@ TEST(HtmlTest, ThePagesCharsetIsBelieved) {
     const Found found =
         Read(ReadHtml, std::string(declared) + "<p>" + InCharset("KOI8-R", RUSSIAN));
     EXPECT_EQ(found.content.text, RUSSIAN) << declared;
+  }
+}
+
+TEST(HtmlTest, CharsetsAreWhatPeopleMeanByTheirNames) {
+  const struct {
+    const char* label;
+    const char* charset;
+    const char* text;
+  } rows[] = {{"iso-8859-1", "WINDOWS-1252", "“quay” €5"},
+              {"Latin1", "WINDOWS-1252", "“quay” €5"},
+              {"gb2312", "GB18030", "朱镕基 €"},
+              {"shift_jis", "CP932", "①東京 ～"},
+              {"euc-kr", "CP949", "똠방각하"},
+              {"us-ascii", "UTF-8", "quay – Größe"}};
+  for (const auto& row : rows) {
+    const std::string page = std::string("<meta charset=") + row.label + "><p>";
+    EXPECT_EQ(Read(ReadHtml, page + InCharset(row.charset, row.text)).content.text, row.text)
+        << row.label;
   }
 }
 

@@ -4,10 +4,13 @@
 //   text WORDS     answers with these words          field TITLE    with a title and no text
 //   fail REASON    says that it cannot be read       convert NAME   asks for a converter
 //   crash, loop, exit, memory, close, grow, nonsense, twice, half, last  misbehaves
+//   starve         waits for ever, as long as the file is empty; adds a byte to it
+//   more           answers, and when that was taken says another word
 //   killed         is killed from outside, as long as the file is empty; adds a byte to it
 //   pid            answers with its process number   count          how many jobs it has had
 //   state          answers with what it was started with
 //   refuse         ends before it begins, if it had a job before
+//   never          ends before it begins
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/socket.h>
@@ -117,6 +120,12 @@ void Misbehave(const std::string& verb, int file) {
   } else if (verb == "last") {
     Say(EncodeAnswer(Words("said and gone")));
     _exit(0);
+  } else if (verb == "starve") {
+    struct stat info = {};
+    if (fstat(file, &info) == 0 && info.st_size == 0) {
+      (void)!write(file, "x", 1);
+      pause();
+    }
   } else if (verb == "killed") {
     struct stat info = {};
     // The file's own descriptor is shared: how far it stands tells how often this was tried.
@@ -140,7 +149,7 @@ void Do(const std::string& verb, const std::string& rest, int file, int count) {
     answer.content.texts = {{ContentField::TITLE, "kept"}};
     answer.content.text.clear();
     answer.converter = rest;
-  } else if (verb == "pid") {
+  } else if (verb == "pid" || verb == "more") {
     answer.content.text = std::to_string(getpid());
   } else if (verb == "count") {
     answer.content.text = std::to_string(count);
@@ -148,6 +157,10 @@ void Do(const std::string& verb, const std::string& rest, int file, int count) {
     answer.content.text = State();
   }
   Say(EncodeAnswer(answer));
+  if (verb == "more") {
+    (void)raise(SIGSTOP);  // until the test lets it go on
+    Say("x");
+  }
 }
 
 int Serve() {
@@ -169,7 +182,7 @@ int Serve() {
     }
     int file = -1;
     memcpy(&file, CMSG_DATA(head), sizeof(file));
-    if (job->name == "refuse" && count > 1) {
+    if (job->name == "never" || (job->name == "refuse" && count > 1)) {
       _exit(5);  // ends over it without having begun
     }
     Answer begun;

@@ -9,6 +9,7 @@
 
 #include "index/compare.h"
 #include "index/entry_table.h"
+#include "index/name_text.h"
 #include "index/reader.h"
 #include "index/schema.h"
 #include "index/search.h"
@@ -100,12 +101,16 @@ void World::ExpectWordsOfNames() {
   Statement parts;
   names.Prepare(fresh, "INSERT INTO names(rowid, name) VALUES(?1, ?2)");
   parts.Prepare(fresh, "INSERT INTO parts(rowid, name) VALUES(?1, ?2)");
+  NameFolder folder;
   uint64_t entries = 0;
   EXPECT_TRUE(reader.ForEach(root, [&](const Entry& entry) {
     const std::string text = ToUtf8(LastComponent(entry.path));
+    const std::string words = NameRow(folder, text);
+    const std::string folded = folder.Parts(text);
+    names.BindText(2, words);
+    parts.BindText(2, folded);
     for (Statement* insert : {&names, &parts}) {
       insert->BindInt(1, entry.id);
-      insert->BindText(2, text);
       EXPECT_EQ(insert->Run(), SQLITE_OK);
     }
     ++entries;

@@ -131,7 +131,7 @@ TEST_F(ContentSearchTest, SignsMustStandInTheName) {
   EXPECT_EQ(Hits("whale ++"), Names({"c++.txt"}));
 }
 
-TEST_F(ContentSearchTest, AnyQuestionIsAnswered) {
+TEST_F(ContentSearchTest, AnyQuestionIsAnsweredOrRefusedInOneLine) {
   Stored({{"a.txt", "near or and not a b \u4e2d\u6587"}});
   for (const char* text : {"\"",      "\"\" a",   "( a",      "name:x",  "a NEAR b",
                            "NEAR(",   "a OR",     "NOT",      "AND",     "^a",
@@ -141,7 +141,14 @@ TEST_F(ContentSearchTest, AnyQuestionIsAnswered) {
                            "\u00b2",  "\u3099",   "\u3099 a", "a\u0301", "_",
                            "_ a",     "__",       "a_",       "..",      "1.",
                            "\u00ad a"}) {
-    (void)Hits(text);
+    question.text = text;
+    question.shares = {"s"};
+    std::string error;
+    if (!Ask(question, answer, error)) {
+      EXPECT_FALSE(error.empty()) << text;
+      EXPECT_EQ(error.find('\n'), std::string::npos) << error;
+      continue;
+    }
     EXPECT_EQ(answer.failures, Names()) << text;
   }
   EXPECT_EQ(Hits("\u6587"), Names({"a.txt"}));

@@ -83,7 +83,8 @@ TEST_F(SearchTest, NoTextReachesTheQueryLanguage) {
   EXPECT_EQ(Hits("col:umn"), Names({"col:umn.txt"}));
   EXPECT_EQ(Hits("quote\"d"), Names({"quote\"d.txt"}));
   EXPECT_EQ(Hits("OR"), Names({"or and not.txt"}));
-  EXPECT_EQ(Hits("name:umn"), Names());
+  EXPECT_EQ(Hits("colour:umn"), Names());
+  EXPECT_EQ(Hits("\"near\" txt"), Names({"near.txt"}));
 }
 
 TEST_F(SearchTest, SenselessQuestionsAreRefused) {

@@ -126,6 +126,21 @@ TEST_F(ShareContentsTest, WhileWorkFlowsResultsAreCommittedAfterHalfASecondAtMos
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
 }
 
+TEST_F(ShareContentsTest, WhatWasReadBesideASlowFileDoesNotWaitForIt) {
+  AddFile(1);
+  AddFile(2);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 2U);
+  Quieten();
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+  Pass(milliseconds(50));
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+  EXPECT_EQ(Kept(2).state, ScriptedFile::State::WAITS);
+}
+
 TEST_F(ShareContentsTest, MuchTextIsCommittedAtOnce) {
   AddFile(1);
   AddFile(2);
@@ -362,6 +377,29 @@ TEST_F(ShareContentsTest, WhatIsToldOfBeforeItCountsIsSeenALittleLater) {
   Pass(seconds(2));
 
   EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, WhatIsClosedIsLookedAtAtOnce) {
+  Quieten();
+  contents.EntriesChanged();
+  Settle();
+  AddFile(1);
+
+  contents.EntriesClosed();
+  Pass(milliseconds(2));
+
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
+TEST_F(ShareContentsTest, NothingIsOpenedForAClosing) {
+  Quieten();
+  Pass(seconds(11));
+  ASSERT_EQ(Count("Close"), 1U);
+
+  contents.EntriesClosed();
+  Pass(seconds(11));
+
+  EXPECT_EQ(Count("Open"), 1U);
 }
 
 TEST_F(ShareContentsTest, AllIsLookedAtOnceADay) {

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <archive.h>
+#include <archive_entry.h>
 
 #include "extract/nested.h"
 #include "tests/unit/extract/documents/fixture.h"
@@ -32,6 +33,35 @@ const Case CASES[] = {
 };
 
 class ArchiveFormatTest : public testing::TestWithParam<Case> {};
+
+// One member of so many zeros, then another.
+std::string LongOnesFirst(const Packing& packing, int64_t zeros) {
+  std::string bytes(4 << 20, '\0');
+  size_t used = 0;
+  struct archive* made = archive_write_new();
+  EXPECT_EQ(archive_write_set_format(made, packing.format), ARCHIVE_OK);
+  EXPECT_EQ(archive_write_add_filter(made, packing.filter), ARCHIVE_OK);
+  EXPECT_EQ(archive_write_open_memory(made, bytes.data(), bytes.size(), &used), ARCHIVE_OK);
+  struct archive_entry* entry = archive_entry_new();
+  for (const auto& [name, size] :
+       {std::pair<const char*, int64_t>{"film.mp4", zeros}, {"after.txt", 0}}) {
+    archive_entry_clear(entry);
+    archive_entry_set_pathname(entry, name);
+    archive_entry_set_filetype(entry, AE_IFREG);
+    archive_entry_set_perm(entry, 0644);
+    archive_entry_set_size(entry, size);
+    EXPECT_EQ(archive_write_header(made, entry), ARCHIVE_OK);
+    const std::string block(1 << 20, '\0');
+    for (int64_t left = size; left > 0; left -= static_cast<int64_t>(block.size())) {
+      EXPECT_GT(archive_write_data(made, block.data(), block.size()), 0);
+    }
+  }
+  archive_entry_free(entry);
+  EXPECT_EQ(archive_write_close(made), ARCHIVE_OK);
+  archive_write_free(made);
+  bytes.resize(used);
+  return bytes;
+}
 
 std::string Nested(int depth) {
   std::string bytes = Zipped({{"core.txt", "kernel"}});
@@ -132,6 +162,20 @@ TEST(ArchiveTest, OnlySoManyMembersAreRead) {
   EXPECT_TRUE(reading.is_good) << reading.why;
   EXPECT_THAT(reading.content.text, testing::EndsWith(" w999"));
   EXPECT_THAT(reading.Text(ContentField::MEMBERS), testing::EndsWith("\n1000.txt"));
+}
+
+// Passing it over would take minutes where it is long enough.
+TEST(ArchiveTest, WhatHasToBeUnpackedToBePassedOverCounts) {
+  const Packing stream = {ARCHIVE_FORMAT_TAR_USTAR, ARCHIVE_FILTER_ZSTD, "", ""};
+  const int64_t bound = Allowance::MAX_BYTES;
+  const Reading beyond =
+      ReadBytes(ReadArchive, "a.tar.zst", LongOnesFirst(stream, bound + (8 << 20)));
+  EXPECT_TRUE(beyond.is_good) << beyond.why;
+  EXPECT_EQ(beyond.Text(ContentField::MEMBERS), "film.mp4");
+
+  const Reading within = ReadBytes(ReadArchive, "a.tar.zst", LongOnesFirst(stream, 8 << 20));
+  EXPECT_TRUE(within.is_good) << within.why;
+  EXPECT_EQ(within.Text(ContentField::MEMBERS), "film.mp4\nafter.txt");
 }
 
 // Blanks fill no text: 600 MiB of them in archives in one of a few KiB.

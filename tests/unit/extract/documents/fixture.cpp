@@ -5,6 +5,7 @@
 #include <random>
 
 #include "extract/memory_file.h"
+#include "tests/unit/extract/behind_doors.h"
 
 namespace fileindexd {
 
@@ -63,6 +64,7 @@ Reading ReadBytes(FormatReader reader, const std::string& name, const std::strin
 }
 
 void ExpectSurvivesDamage(FormatReader reader, const std::string& name, const std::string& bytes) {
+  ExpectSameBehindDoors(name, bytes);
   for (size_t tenth = 0; tenth < 10; ++tenth) {
     ExpectWithinBounds(reader, name, bytes.substr(0, bytes.size() * tenth / 10));
   }

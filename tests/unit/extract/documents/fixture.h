@@ -31,7 +31,7 @@ struct ReadingOptions {
 Reading ReadBytes(FormatReader reader, const std::string& name, const std::string& bytes,
                   const ReadingOptions& options = {});
 
-// Reads it truncated at every tenth, then with bits flipped, once for each seed
+// Has the helper read it as it is, then reads it truncated at every tenth, then with bits flipped, once for each seed
 // (FILEINDEXD_TEST_SCALE "long": 1,000 instead of 20). What comes out does not matter, but that it
 // is within its bounds.
 void ExpectSurvivesDamage(FormatReader reader, const std::string& name, const std::string& bytes);

@@ -78,6 +78,14 @@ TEST(MailTest, APageIsReadByTheCharsetOfItsHeader) {
   EXPECT_EQ(reading.content.text, "\u043f\u0440\u0438\u0432\u0435\u0442");
 }
 
+TEST(MailTest, ACharsetIsWhatPeopleMeanByItsName) {
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml",
+                      std::string(HEAD) + "Content-Type: text/plain; charset=ISO-8859-1\n\n"
+                                          "\x93quay\x94 \x80\n")
+                .content.text,
+            "\u201cquay\u201d \u20ac");
+}
+
 TEST(MailTest, TextWithoutACharsetIsGuessed) {
   EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", std::string(HEAD) + "\nna\u00efve \u8ba1\u5212\n")
                 .content.text,
@@ -92,6 +100,30 @@ TEST(MailTest, AMessageWithinAMessageIsRead) {
 
   EXPECT_EQ(reading.content.text, "deckhand@example.org inner inner words");
   EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Gr\u00fc\u00dfe\u8ba1\u5212");
+}
+
+TEST(MailTest, WhatIsAttachedToAnAlternativeIsFoundItsTextIsNotReadTwice) {
+  const Reading reading = ReadBytes(
+      ReadMessage, "a.eml",
+      HEAD + Multipart("alternative", {PLAIN, Multipart("mixed", {PAGE, Attached("notes.txt",
+                                                                                 "attached "
+                                                                                 "words")})}));
+
+  EXPECT_EQ(reading.content.text, "The lighthouse p\u0159ed attached words");
+  EXPECT_EQ(reading.Text(ContentField::ATTACHMENTS), "notes.txt");
+}
+
+TEST(MailTest, AnAttachedMessageHasItsName) {
+  const Reading reading =
+      ReadBytes(ReadMessage, "a.eml",
+                HEAD + Multipart("alternative", {PLAIN,
+                                                 "Content-Type: message/rfc822\n"
+                                                 "Content-Disposition: attachment; "
+                                                 "filename=\"tide.eml\"\n\n"
+                                                 "Subject: inner\n\ninner words\n"}));
+
+  EXPECT_EQ(reading.Text(ContentField::ATTACHMENTS), "tide.eml");
+  EXPECT_EQ(reading.content.text, "The lighthouse p\u0159ed inner inner words");
 }
 
 TEST(MailTest, AnEncryptedMessageKeepsItsHeaders) {

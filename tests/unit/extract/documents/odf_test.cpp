@@ -68,6 +68,17 @@ TEST(OdfTest, TheFlatFormIsReadAlike) {
   ExpectFields(reading);
 }
 
+TEST(OdfTest, TheWordsOfAnAnnotationAreWordsOfTheirOwn) {
+  const Reading reading = ReadBytes(
+      ReadOfficeZip, "a.fodt",
+      std::string("<?xml version=\"1.0\"?><office:document") + NAMES +
+          "><text:p>keep<office:annotation><dc:creator>First Hand</dc:creator>"
+          "<dc:date>2020-01-02</dc:date><text:p>why</text:p></office:annotation>er</text:p>"
+          "</office:document>");
+
+  EXPECT_EQ(reading.content.text, "keep First Hand 2020-01-02 why er");
+}
+
 TEST(OdfTest, FieldsAreFoundBehindTextThatIsTooLong) {
   const Reading reading = ReadBytes(ReadOfficeZip, "a.odt", Odt("<manifest/>"), {0, 8});
 

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/choice.h"
 #include "tests/unit/extract/documents/fixture.h"
 #include "tests/unit/extract/documents/packing.h"
 
@@ -118,8 +119,48 @@ TEST(OoxmlTest, StringsNumbersAndNamesOfSheetsAreFound) {
   const Reading reading = ReadBytes(ReadOfficeZip, "a.xlsx", Xlsx());
 
   ASSERT_TRUE(reading.is_good) << reading.why;
-  EXPECT_EQ(reading.content.text, "Dues 42.5 in place made sh ared");
+  EXPECT_EQ(reading.content.text, "Dues sh ared 42.5 in place made");
   EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Harbour");
+}
+
+TEST(OoxmlTest, ATableOfNumbersHidesNoWords) {
+  std::string rows;
+  for (int i = 0; i < 10'000; ++i) {
+    rows += "<row><c><v>" + std::to_string(i) + "</v></c></row>";
+  }
+  const Reading reading =
+      ReadBytes(ReadOfficeZip, "a.xlsx",
+                Zipped({{"xl/worksheets/sheet1.xml", "<worksheet>" + rows + "</worksheet>"},
+                        {"xl/sharedStrings.xml", "<sst><si><t>shared</t></si></sst>"}}),
+                {0, 1000});
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_TRUE(reading.content.is_cut);
+  EXPECT_THAT(reading.content.text, testing::StartsWith("shared 0 1 2 "));
+}
+
+TEST(OoxmlTest, HeadsAndFeetOfPagesAreFoundWithoutTheirMarks) {
+  const Reading reading = ReadBytes(
+      ReadOfficeZip, "a.xlsx",
+      Zipped({{"xl/worksheets/sheet1.xml",
+               "<worksheet><sheetData><row><c><v>1</v></c></row></sheetData><headerFooter>"
+               "<oddHeader>&amp;LTide&amp;C&amp;\"Arial,Bold\"&amp;14ta&amp;Bble&amp;K00FF00s"
+               "</oddHeader><oddFooter>&amp;RQuay &amp;&amp; Co&amp;P</oddFooter></headerFooter>"
+               "</worksheet>"}}));
+
+  EXPECT_EQ(reading.content.text, "1 Tide tables Quay & Co");
+}
+
+TEST(OoxmlTest, CommentsAreWordsOfTheirOwn) {
+  const Reading reading = ReadBytes(
+      ReadOfficeZip, "a.xlsx",
+      Zipped({{"xl/comments1.xml",
+               "<comments><commentList><comment><text><t>one</t></text></comment><comment><text>"
+               "<r><t>tw</t></r><r><t>o</t></r></text></comment></commentList></comments>"},
+              {"ppt/comments/comment1.xml",
+               "<cmLst><cm><text>three</text></cm><cm><text>four</text></cm></cmLst>"}}));
+
+  EXPECT_EQ(reading.content.text, "one two three four");
 }
 
 TEST(OoxmlTest, SlidesAndNotesAreFoundMastersAreNot) {
@@ -159,6 +200,20 @@ TEST(OoxmlTest, OfAPartThatBreaksOffTheBeginningIsKept) {
 
   EXPECT_EQ(reading.why, "damaged");
   EXPECT_THAT(reading.content.text, testing::StartsWith("half a"));
+}
+
+TEST(OoxmlTest, ADamagedDocumentIsNotReadAsAnArchive) {
+  std::string error;
+  ASSERT_TRUE(LoadMagic(error)) << error;
+  const Reading damaged =
+      ReadBytes(ReadDocument, "a.docx", Zipped({CORE, {"word/document.xml", "<d><p><t>half a"}}));
+  EXPECT_EQ(damaged.why, "damaged");
+  EXPECT_EQ(damaged.Text(ContentField::SUBJECT), "Harbour");
+  EXPECT_EQ(damaged.Text(ContentField::MEMBERS), "");
+
+  const Reading other = ReadBytes(ReadDocument, "a.docx", Zipped({{"a.txt", "words"}}));
+  EXPECT_TRUE(other.is_good) << other.why;
+  EXPECT_EQ(other.Text(ContentField::MEMBERS), "a.txt");
 }
 
 TEST(OoxmlTest, WhatIsNoDocumentIsSaidInWords) {

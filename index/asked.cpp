@@ -1,0 +1,166 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/asked.h"
+
+#include <ctime>
+#include <utility>
+
+#include "index/contents_schema.h"
+#include "index/name_text.h"
+#include "index/name_tokens.h"
+#include "index/search.h"
+#include "index/text_tokenizer.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+// Adds what the options say to what the text says.
+void AddOptions(const Question& question, size_t end, QueryNode& tree) {
+  std::vector<QueryNode> options;
+  if (question.kind.has_value()) {
+    QueryNode& kind = options.emplace_back();
+    kind.part = Part::KIND;
+    kind.numbers = {static_cast<int64_t>(*question.kind)};
+  }
+  if (!question.under.empty()) {
+    QueryNode& under = options.emplace_back();
+    under.part = Part::UNDER;
+    under.names = {question.under};
+  }
+  if (options.empty()) {
+    return;
+  }
+  if (tree.part != Part::AND) {
+    QueryNode all;
+    all.part = Part::AND;
+    all.end = end;
+    all.below.push_back(std::move(tree));
+    tree = std::move(all);
+  }
+  for (QueryNode& option : options) {
+    option.start = option.end = end;
+    tree.below.push_back(std::move(option));
+  }
+}
+
+std::string ColumnName(ContentField field) {
+  std::string_view columns = WORD_COLUMNS;
+  for (int i = 1; i < static_cast<int>(field); ++i) {
+    columns.remove_prefix(columns.find(", ") + 2);
+  }
+  return std::string(columns.substr(0, columns.find(',')));
+}
+
+void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& tokenizer,
+                NameFolder& folder, Asked& asked) {
+  for (const QueryNode& below : node.below) {
+    ReadLeaves(below, is_positive != (node.part == Part::NOT), tokenizer, folder, asked);
+  }
+  switch (node.part) {
+    case Part::WORD:
+    case Part::NAME_PATTERN:
+    case Part::EXACT_NAME:
+      break;
+    case Part::NEAR:
+    case Part::HAS:
+    case Part::CONTENT:
+    case Part::KIND:
+      asked.needs_contents = true;
+      return;
+    case Part::RANGE:
+      asked.needs_contents = asked.needs_contents || node.column == Column::FIELD;
+      return;
+    case Part::IS:
+      asked.needs_contents = asked.needs_contents || node.property == Property::DUPLICATE;
+      return;
+    default:
+      return;
+  }
+
+  WordLeaf& leaf = asked.leaves.emplace_back();
+  leaf.node = &node;
+  leaf.is_positive = is_positive;
+  if (node.part == Part::NAME_PATTERN) {
+    return;
+  }
+  if (node.scope == Scope::ANY || node.scope == Scope::NAME) {
+    const std::string words = folder.Words(node.text);
+    leaf.tokens = tokenizer.Tokens(words);
+    leaf.names_query = Quoted(words) + (node.is_beginning ? " *" : "");
+  }
+  if (node.part == Part::WORD) {
+    leaf.text_query = TextQueryOf(node);
+    asked.needs_contents = asked.needs_contents || node.scope != Scope::NAME;
+  }
+}
+
+}  // namespace
+
+bool Asked::Read(const Question& question, std::string& error) {
+  if (!question.under.empty() && NormalPath(question.under) != question.under) {
+    error = "not a plain absolute path: " + question.under;
+    return false;
+  }
+  text = ToUtf8(question.text);
+  QueryError wrong;
+  if (!ParseQuery(text, time(nullptr), tree, wrong)) {
+    error = wrong.Line(text);
+    return false;
+  }
+  NameTokenizer tokenizer;
+  if (!tokenizer.Open()) {
+    error = "out of memory";
+    return false;
+  }
+  AddOptions(question, text.size(), tree);
+  NameFolder folder;
+  ReadLeaves(tree, true, tokenizer, folder, *this);
+  return true;
+}
+
+const WordLeaf* Asked::LeafOf(const QueryNode& node) const {
+  for (const WordLeaf& leaf : leaves) {
+    if (leaf.node == &node) {
+      return &leaf;
+    }
+  }
+  return nullptr;
+}
+
+std::string TextQueryOf(const QueryNode& node) {
+  const std::string query =
+      TextQuery(node.is_beginning && !node.text.ends_with('*') ? node.text + "*" : node.text);
+  switch (node.scope) {
+    case Scope::ANY:
+      return query;
+    case Scope::TEXT:
+      return "{text} : " + query;
+    case Scope::FIELD:
+      return "{" + ColumnName(node.field) + "} : " + query;
+    case Scope::NAME:
+      break;
+  }
+  return "";
+}
+
+std::string Quoted(std::string_view text) {
+  std::string quoted = "\"";
+  for (const char c : text) {
+    quoted.append(c == '"' ? 2 : 1, c);
+  }
+  return quoted + '"';
+}
+
+std::vector<size_t> CharacterStarts(std::string_view text) {
+  std::vector<size_t> starts;
+  for (size_t i = 0; i < text.size(); ++i) {
+    if ((static_cast<unsigned char>(text[i]) & 0xc0) != 0x80) {
+      starts.push_back(i);
+    }
+  }
+  starts.push_back(text.size());
+  return starts;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,155 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/asked_share.h"
+
+#include <sys/stat.h>
+
+#include <exception>
+#include <new>
+#include <thread>
+#include <utility>
+
+#include "index/content_functions.h"
+#include "index/contents_reader.h"
+#include "index/text_tokenizer.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int TRIES = 6;
+constexpr int MOST_CONTENTS_TRIES = 2;
+constexpr int STEPS_BETWEEN_LOOKS = 20000;  // of SQLite's machine, at the clock
+
+// A database is made in some milliseconds, and until then there is none.
+// Of a share without a folder there will be none.
+constexpr int MAKING_TRIES = 20;
+constexpr std::chrono::milliseconds MAKING_PAUSE{10};
+
+int IsTooLate(void* deadline) {
+  const auto& end = *static_cast<const std::chrono::steady_clock::time_point*>(deadline);
+  return std::chrono::steady_clock::now() > end ? 1 : 0;
+}
+
+// The first read of each database decides which state of it is seen.
+int Begin(sqlite3* db, bool with_contents) {
+  const char* sql = with_contents ? "BEGIN; SELECT entries FROM main.meta WHERE id = 1; "
+                                    "SELECT last_text FROM contents.meta WHERE id = 1"
+                                  : "BEGIN; SELECT entries FROM main.meta WHERE id = 1";
+  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
+}
+
+}  // namespace
+
+void AskedShare::Fail(const std::string& what) {
+  failures.push_back("share " + name + ": " + what);
+}
+
+IndexError AskedShare::Open(bool with_contents) {
+  run.reset();
+  has_contents = false;
+  IndexError error = reader.Open(name);
+  for (int i = 0; i < MAKING_TRIES && error == IndexError::PATH_NOT_FOUND; ++i) {
+    struct stat status {};
+    if (stat(ShareFolder(name).c_str(), &status) != 0) {
+      return error;
+    }
+    std::this_thread::sleep_for(MAKING_PAUSE);  // nothing tells when it is there
+    error = reader.Open(name);
+  }
+  if (error != IndexError::NONE) {
+    return error;
+  }
+  contents_error = with_contents ? AttachContents(reader.database, name) : contents_error;
+  has_contents = with_contents && contents_error == IndexError::NONE;
+  if (!has_contents) {
+    const int registered = RegisterQuestionFunctions(reader.database.db);
+    if (registered != SQLITE_OK) {
+      return FromSqlite(registered);
+    }
+  }
+  sqlite3_progress_handler(reader.database.db, STEPS_BETWEEN_LOOKS, IsTooLate, &deadline);
+  return FromSqlite(Begin(reader.database.db, has_contents));
+}
+
+int AskedShare::RunOnce(const Question& question, const Asked& asked, const HitOrder& order,
+                        uint64_t wanted) {
+  BestHits best(wanted, order);
+  total = 0;
+  run = std::make_unique<ShareRun>(reader.database.db, has_contents, question, asked, name);
+  const int code = run->Run(best, total);
+  best.Cut();
+  hits = std::move(best.hits);
+  return code;
+}
+
+void AskedShare::Ask(const Question& question, const Asked& asked, const HitOrder& order,
+                     uint64_t wanted) {
+  try {
+    AskTries(question, asked, order, wanted);
+  } catch (const std::bad_alloc&) {
+    Fail(IndexErrorText(IndexError::NO_MEMORY));
+  } catch (const std::exception& failure) {
+    Fail(failure.what());
+  }
+}
+
+// What fails twice with contents is tried without them: what is wrong with them does not hide what
+// the names answer.
+void AskedShare::AskTries(const Question& question, const Asked& asked, const HitOrder& order,
+                          uint64_t wanted) {
+  deadline = std::chrono::steady_clock::now() + patience;
+  IndexError of_contents = IndexError::NONE;
+  int failed_with_contents = 0;
+  bool was_there = false;
+  for (int tries = 1;; ++tries) {
+    const bool with_contents = failed_with_contents < MOST_CONTENTS_TRIES;
+    IndexError error = Open(with_contents);
+    was_there = was_there || error == IndexError::NONE;
+    const int code =
+        error == IndexError::NONE ? RunOnce(question, asked, order, wanted) : SQLITE_OK;
+    if (error == IndexError::NONE && code == SQLITE_OK) {
+      of_contents = with_contents ? contents_error : of_contents;
+      if (of_contents != IndexError::NONE && of_contents != IndexError::PATH_NOT_FOUND) {
+        Fail(std::string("contents: ") + IndexErrorText(of_contents));
+      }
+      return;
+    }
+
+    hits.clear();
+    total = 0;
+    run.reset();
+    if ((code & 0xff) == SQLITE_INTERRUPT) {
+      Fail("no answer within " + std::to_string(patience.count()) + " seconds");
+      return;
+    }
+    if (error == IndexError::PATH_NOT_FOUND && was_there) {
+      return;  // the share was removed meanwhile: it holds nothing to find
+    }
+    error = error == IndexError::NONE ? FromSqlite(code) : error;
+    if (has_contents) {
+      ++failed_with_contents;
+      of_contents = error;
+    }
+    if (tries == TRIES || error == IndexError::PATH_NOT_FOUND) {
+      Fail(IndexErrorText(error));
+      return;
+    }
+    std::this_thread::sleep_for(MAKING_PAUSE);  // whoever replaces it is not done yet
+  }
+}
+
+void AskedShare::Complete(std::vector<Hit>& shown) {
+  std::unique_ptr<TextCutter> cutter;
+  for (Hit& hit : shown) {
+    if (hit.share != name || run == nullptr) {
+      continue;
+    }
+    if (cutter == nullptr) {
+      cutter = std::make_unique<TextCutter>(LanguageOf(reader.database.db, has_contents));
+    }
+    (void)run->Complete(hit, *cutter);
+  }
+}
+
+}  // namespace fileindexd

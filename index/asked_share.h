@@ -1,0 +1,52 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// One share while it is asked: its databases, open in one read transaction, and the run on them.
+#pragma once
+
+#include <chrono>
+#include <functional>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "index/reader.h"
+#include "index/share_run.h"
+
+namespace fileindexd {
+
+// A share that has not answered by then is given up.
+constexpr std::chrono::seconds MOST_ASKING{30};
+
+class AskedShare {
+ public:
+  explicit AskedShare(std::string share_name) : name(std::move(share_name)) {}
+
+  // Opens what there is and sees one state of it from then on. NONE, or why not.
+  IndexError Open(bool with_contents);
+
+  // Opens, and asks. A database that was replaced meanwhile, or is just being made, is opened anew.
+  // Never throws; what went wrong is in `failures`.
+  void Ask(const Question& question, const Asked& asked, const HitOrder& order, uint64_t wanted);
+
+  // For hits that are shown. What cannot be made is left out: the hit is one all the same.
+  void Complete(std::vector<Hit>& hits);
+
+  std::string name;
+  std::chrono::seconds patience = MOST_ASKING;
+  EntryReader reader;
+  bool has_contents = false;
+  IndexError contents_error = IndexError::NONE;
+  std::unique_ptr<ShareRun> run;  // goes before the connection
+  std::vector<Hit> hits;          // in order
+  uint64_t total = 0;
+  std::vector<std::string> failures;
+
+ private:
+  int RunOnce(const Question& question, const Asked& asked, const HitOrder& order, uint64_t wanted);
+  void AskTries(const Question& question, const Asked& asked, const HitOrder& order,
+                uint64_t wanted);
+  void Fail(const std::string& what);
+
+  std::chrono::steady_clock::time_point deadline = std::chrono::steady_clock::time_point::max();
+};
+
+}  // namespace fileindexd

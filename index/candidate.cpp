@@ -1,0 +1,130 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/candidate.h"
+
+#include "index/entry_table.h"
+#include "index/schema.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int FIRST_NUMBER_COLUMN = 7;
+
+FileFacts ReadFacts(const Statement& row) {
+  FileFacts facts;
+  facts.id = row.Int(0);
+  facts.state = static_cast<ContentState>(row.Int(1));
+  facts.found_kind = static_cast<Kind>(row.Int(2));
+  facts.text = row.Int(3);
+  facts.length = row.Int(4);
+  facts.sample = row.Int(5);
+  facts.fields = row.Int(6);
+  for (size_t i = 0; i < NUMBER_FIELDS; ++i) {
+    const int column = FIRST_NUMBER_COLUMN + static_cast<int>(i);
+    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
+      facts.numbers[i] = row.Int(column);
+    }
+  }
+  return facts;
+}
+
+int Done(int code) {
+  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+}  // namespace
+
+int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
+  int code = SQLITE_OK;
+  if (by_id.handle == nullptr) {
+    code = by_id.Prepare(db, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1");
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  by_id.BindInt(1, id);
+  code = by_id.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    candidate = Candidate();
+    ReadEntry(by_id, candidate.entry);
+  }
+  by_id.Reset();
+  return Done(code);
+}
+
+int CandidateRows::NeedFacts(Candidate& candidate) {
+  if (candidate.is_asked || !has_contents || !candidate.entry.content_wanted) {
+    candidate.is_asked = true;
+    return SQLITE_OK;
+  }
+  int code = SQLITE_OK;
+  if (facts.handle == nullptr) {
+    const std::string sql = "SELECT id, state, found_kind, text, length, sample, fields, " +
+                            std::string(NUMBER_COLUMNS) +
+                            " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND "
+                            "size = ?3 AND mtime = ?4";
+    code = facts.Prepare(db, sql.c_str());
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  facts.BindInt(1, static_cast<int64_t>(candidate.entry.inode));
+  facts.BindInt(2, candidate.entry.birth_time);
+  facts.BindInt(3, candidate.entry.size);
+  facts.BindInt(4, candidate.entry.mtime);
+  code = facts.Step();
+  if (code == SQLITE_ROW) {
+    candidate.facts = ReadFacts(facts);
+  }
+  facts.Reset();
+  candidate.is_asked = true;
+  return Done(code);
+}
+
+int CandidateRows::KindOf(Candidate& candidate, Kind& kind) {
+  kind = candidate.entry.kind;
+  if (kind != Kind::OTHER) {
+    return SQLITE_OK;
+  }
+  const int code = NeedFacts(candidate);
+  if (candidate.facts.has_value()) {
+    kind = candidate.facts->found_kind;
+  }
+  return code;
+}
+
+const std::string& CandidateRows::FoldedName(Candidate& candidate) {
+  if (candidate.folded.empty()) {
+    candidate.folded = folder.Parts(ToUtf8(LastComponent(candidate.entry.path)));
+  }
+  return candidate.folded;
+}
+
+int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
+  has = false;
+  if (!candidate.facts.has_value() || candidate.facts->sample == 0 || candidate.entry.size == 0) {
+    return SQLITE_OK;
+  }
+  int code = SQLITE_OK;
+  if (twin.handle == nullptr) {
+    code = twin.Prepare(db,
+                        "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
+                        "ON " FILEINDEX_SAME_FILE
+                        " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
+                        "AND files.id <> ?3 LIMIT 1");
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  twin.BindInt(1, candidate.facts->sample);
+  twin.BindInt(2, candidate.entry.size);
+  twin.BindInt(3, candidate.facts->id);
+  code = twin.Step();
+  has = code == SQLITE_ROW;
+  twin.Reset();
+  return Done(code);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,69 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Entries that may answer a question, and what is known of their content.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "base/content.h"
+#include "index/contents_schema.h"
+#include "index/entry.h"
+#include "index/name_text.h"
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+constexpr size_t NUMBER_FIELDS = 14;
+
+// A row of `files` that stands for an entry now.
+struct FileFacts {
+  int64_t id = 0;
+  ContentState state = ContentState::WAITING;
+  Kind found_kind = Kind::OTHER;
+  int64_t text = 0;  // rowid; 0: there is none
+  int64_t length = 0;
+  int64_t sample = 0;
+  int64_t fields = 0;  // bits
+  std::array<std::optional<int64_t>, NUMBER_FIELDS> numbers;
+
+  std::optional<int64_t> Number(ContentField field) const {
+    return numbers[static_cast<size_t>(field) - static_cast<size_t>(FIRST_NUMBER_FIELD)];
+  }
+};
+
+struct Candidate {
+  Entry entry;
+  bool is_asked = false;           // whether `facts` have been looked for
+  std::optional<FileFacts> facts;  // none: the content is not wanted, or not known yet
+  std::string folded;              // the name; empty: not made yet
+};
+
+// The rows of one share. Results are SQLite's codes.
+class CandidateRows {
+ public:
+  CandidateRows(sqlite3* entries, bool with_contents) : db(entries), has_contents(with_contents) {}
+
+  int Find(int64_t id, Candidate& candidate, bool& found);
+  int NeedFacts(Candidate& candidate);
+  // By name, or by what was found inside where the name tells nothing.
+  int KindOf(Candidate& candidate, Kind& kind);
+  const std::string& FoldedName(Candidate& candidate);
+  // Whether another file has the same bytes, as far as is known.
+  int HasTwin(const Candidate& candidate, bool& has);
+
+  sqlite3* db;
+  bool has_contents;
+
+ private:
+  NameFolder folder;
+  Statement by_id, facts, twin;
+};
+
+// Columns of an entry and of its file that are the same file, contents of it wanted.
+#define FILEINDEX_SAME_FILE                                                    \
+  "entries.inode = files.inode AND entries.birth_time = files.birth_time AND " \
+  "entries.size = files.size AND entries.mtime = files.mtime AND entries.content_wanted = 1"
+
+}  // namespace fileindexd

@@ -1,0 +1,163 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/hit_display.h"
+
+#include <algorithm>
+#include <string_view>
+
+#include "index/content_text.h"
+#include "index/entry_table.h"
+#include "index/text_tokenizer.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+// A name as questions see it, and where each of its bytes came from.
+struct SeenName {
+  std::string text;
+  std::vector<uint32_t> origins;
+};
+
+void AddMark(const SeenName& name, size_t start, size_t end, std::vector<Snippet::Mark>& marks) {
+  if (end > start && end < name.origins.size() && name.origins[end] > name.origins[start]) {
+    marks.push_back({name.origins[start], name.origins[end]});
+  }
+}
+
+// A beginning marks its own letters alone.
+void MarkWords(const WordLeaf& leaf, const SeenName& name,
+               const std::vector<NameTokenizer::Place>& places, std::vector<Snippet::Mark>& marks) {
+  const size_t count = leaf.tokens.size();
+  for (size_t at = 0; count > 0 && at + count <= places.size(); ++at) {
+    bool same = true;
+    for (size_t i = 0; i < count && same; ++i) {
+      const bool begins = leaf.node->is_beginning && i + 1 == count;
+      const std::string& word = places[at + i].token;
+      same = begins ? word.starts_with(leaf.tokens[i]) : word == leaf.tokens[i];
+    }
+    if (same) {
+      const NameTokenizer::Place& last = places[at + count - 1];
+      const size_t end = leaf.node->is_beginning
+                             ? std::min(last.start + leaf.tokens.back().size(), last.end)
+                             : last.end;
+      AddMark(name, places[at].start, end, marks);
+    }
+  }
+}
+
+void MarkPieces(const QueryNode& node, const SeenName& name, NameFolder& folder,
+                std::vector<Snippet::Mark>& marks) {
+  size_t at = 0;
+  for (size_t i = 0; i < node.pieces.size(); ++i) {
+    const std::string piece = folder.Parts(node.pieces[i]);
+    const bool is_last = i + 1 == node.pieces.size();
+    const size_t found = is_last && node.at_end && name.text.ends_with(piece)
+                             ? name.text.size() - piece.size()
+                             : name.text.find(piece, at);
+    if (found == std::string::npos || piece.empty() || (i == 0 && node.at_start && found != 0)) {
+      return;
+    }
+    AddMark(name, found, found + piece.size(), marks);
+    at = found + piece.size();
+  }
+}
+
+// Sorted, and those that meet made one.
+std::vector<Snippet::Mark> Joined(std::vector<Snippet::Mark> marks) {
+  std::sort(marks.begin(), marks.end(), [](const Snippet::Mark& a, const Snippet::Mark& b) {
+    return a.start != b.start ? a.start < b.start : a.end < b.end;
+  });
+  std::vector<Snippet::Mark> joined;
+  for (const Snippet::Mark& mark : marks) {
+    if (!joined.empty() && mark.start <= joined.back().end) {
+      joined.back().end = std::max(joined.back().end, mark.end);
+    } else {
+      joined.push_back(mark);
+    }
+  }
+  return joined;
+}
+
+}  // namespace
+
+bool NameMarker::Open() {
+  return tokenizer.Open();
+}
+
+std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& path,
+                                       NameMarker& marker) {
+  const std::string_view name = LastComponent(path);
+  if (!IsUtf8(name)) {
+    return {};  // places in what it was made into tell nothing of its bytes
+  }
+  SeenName words;
+  SeenName parts;
+  words.text = marker.folder.Words(name, &words.origins);
+  parts.text = marker.folder.Parts(name, &parts.origins);
+  const std::vector<NameTokenizer::Place> places = marker.tokenizer.Places(words.text);
+  std::vector<Snippet::Mark> marks;
+  for (const WordLeaf& leaf : asked.leaves) {
+    if (!leaf.is_positive) {
+      continue;
+    }
+    if (leaf.node->part == Part::EXACT_NAME) {
+      const bool is_whole = parts.text == marker.folder.Parts(leaf.node->text);
+      AddMark(parts, 0, is_whole ? parts.text.size() : 0, marks);
+    } else if (leaf.node->part == Part::NAME_PATTERN) {
+      MarkPieces(*leaf.node, parts, marker.folder, marks);
+    } else {
+      MarkWords(leaf, words, places, marks);
+    }
+  }
+  const size_t before = path.size() - name.size();
+  std::vector<Snippet::Mark> joined = Joined(std::move(marks));
+  for (Snippet::Mark& mark : joined) {
+    mark.start += before;
+    mark.end += before;
+  }
+  return joined;
+}
+
+int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, TextCutter& cutter,
+               Snippet& snippet) {
+  std::vector<const QueryNode*> words;
+  for (const WordLeaf& leaf : asked.leaves) {
+    if (leaf.is_positive && !leaf.text_query.empty()) {
+      words.push_back(leaf.node);
+    }
+  }
+  int code = rows.NeedFacts(candidate);
+  if (code != SQLITE_OK || words.empty() || !candidate.facts.has_value() ||
+      candidate.facts->text == 0) {
+    return code;
+  }
+  Statement read;
+  code = read.Prepare(rows.db, "SELECT packed FROM contents.texts WHERE id = ?1");
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  read.BindInt(1, candidate.facts->text);
+  code = read.Step();
+  if (code != SQLITE_ROW) {
+    return code == SQLITE_DONE ? SQLITE_OK : code;
+  }
+  Content content;
+  if (!UnpackTexts(read.Bytes(0), content)) {
+    return SQLITE_CORRUPT;
+  }
+  snippet = MakeSnippet(content, words, cutter);
+  return SQLITE_OK;
+}
+
+std::string LanguageOf(sqlite3* entries, bool has_contents) {
+  Statement read;
+  const bool found =
+      has_contents &&
+      read.Prepare(entries, "SELECT language FROM contents.meta WHERE id = 1") == SQLITE_OK &&
+      read.Step() == SQLITE_ROW;
+  const std::string name = found ? LanguageName(read.Bytes(0)) : "";
+  return name.empty() ? NO_LANGUAGE : name;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,37 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What shows why a hit is one: places in its path, and a line of its content.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "index/asked.h"
+#include "index/candidate.h"
+#include "index/name_tokens.h"
+#include "index/snippet.h"
+
+namespace fileindexd {
+
+class TextCutter;
+
+// What names are cut with. One thread.
+class NameMarker {
+ public:
+  bool Open();  // false when memory ran out
+
+  NameTokenizer tokenizer;
+  NameFolder folder;
+};
+
+// Bytes of the path, in its last component, that answer the question; in order, none in another.
+std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& path,
+                                       NameMarker& marker);
+
+// SQLite's code. No snippet where the content shows none of the words.
+int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, TextCutter& cutter,
+               Snippet& snippet);
+
+// Of the share's contents; NO_LANGUAGE where nothing tells.
+std::string LanguageOf(sqlite3* entries, bool has_contents);
+
+}  // namespace fileindexd

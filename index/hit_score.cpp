@@ -1,0 +1,209 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/hit_score.h"
+
+#include <algorithm>
+#include <cmath>
+#include <ctime>
+
+#include "index/content_functions.h"
+#include "index/entry_table.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr double FIRST_NAME_SCORE = 1;
+// Ranks of a name; what is covered of it adds less than one.
+constexpr double WHOLE_NAME = 3;
+constexpr double WHOLE_STEM = 2;  // but for the ending
+constexpr double AT_START = 1;
+
+struct Token {
+  std::string_view text;
+  bool is_beginning;
+
+  bool Fits(const std::string& word) const {
+    return is_beginning ? word.starts_with(text) : word == text;
+  }
+};
+
+std::string_view StemOf(std::string_view name) {
+  const size_t dot = name.rfind('.');
+  return dot == std::string_view::npos || dot == 0 ? name : name.substr(0, dot);
+}
+
+double Covered(const std::vector<std::string>& name, const std::vector<Token>& tokens) {
+  size_t covered = 0;
+  size_t all = 0;
+  for (const std::string& word : name) {
+    size_t best = 0;
+    for (const Token& token : tokens) {
+      best = token.Fits(word) ? std::max(best, token.text.size()) : best;
+    }
+    covered += best;
+    all += word.size();
+  }
+  return all == 0 ? 0 : static_cast<double>(covered) / static_cast<double>(all + 1);
+}
+
+bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& tokens) {
+  return std::equal(name.begin(), name.end(), tokens.begin(), tokens.end(),
+                    [](const std::string& word, const Token& token) { return word == token.text; });
+}
+
+// A long text holds a word more often by chance.
+double ScoreOfPlaces(const WordPlaces& found, double length) {
+  constexpr double USUAL_LENGTH = 8192;
+  const double hits = 4.0 * found.title + 2.0 * found.fields + found.text;
+  return hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
+}
+
+double Youth(const Entry& entry) {
+  const double years =
+      std::max(0.0, (static_cast<double>(time(nullptr)) - static_cast<double>(entry.mtime) / 1e9) /
+                        (365.0 * 86400));
+  return 0.9 + 0.1 / (1 + years);
+}
+
+}  // namespace
+
+HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of_check,
+                   const Asked& in_question)
+    : rows(of_rows), sets(of_sets), check(of_check), asked(in_question) {
+  for (const WordLeaf& leaf : asked.leaves) {
+    if (leaf.is_positive && !leaf.text_query.empty()) {
+      places_query += (places_query.empty() ? "(" : " OR (") + leaf.text_query + ")";
+      places.push_back(&leaf);
+    }
+  }
+}
+
+bool HitScore::Open() {
+  return tokenizer.Open();
+}
+
+// The parts that say what to find, as far as this entry has them.
+int HitScore::Find(Candidate& candidate, std::vector<Found>& found) {
+  for (const WordLeaf& leaf : asked.leaves) {
+    if (!leaf.is_positive) {
+      continue;
+    }
+    bool matches = false;
+    const bool in_name = leaf.node->part == Part::WORD && check.InName(*leaf.node, candidate);
+    const int code = in_name ? SQLITE_OK : check.Matches(*leaf.node, candidate, matches);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+    if (in_name || matches) {
+      found.push_back({&leaf, in_name || leaf.node->part != Part::WORD});
+    }
+  }
+  return SQLITE_OK;
+}
+
+int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
+  std::vector<Found> found;
+  const int code = Find(candidate, found);
+  score = 0;
+  text = 0;
+  if (code != SQLITE_OK || found.empty()) {
+    return code;
+  }
+  if (std::all_of(found.begin(), found.end(), [](const Found& part) { return part.in_name; })) {
+    score = FIRST_NAME_SCORE + NameScore(candidate, found);
+    return SQLITE_OK;
+  }
+  text = candidate.facts->text;
+  return ContentScore(candidate, found, score);
+}
+
+// Of pieces of names alone.
+double HitScore::PieceScore(Candidate& candidate, const std::vector<Found>& found) {
+  const std::string& name = rows.FoldedName(candidate);
+  size_t covered = 0;
+  double rank = 0;
+  for (const Found& part : found) {
+    if (part.leaf->node->part == Part::EXACT_NAME) {
+      return WHOLE_NAME;
+    }
+    for (const std::string& piece : part.leaf->node->pieces) {
+      const std::string folded = folder.Parts(piece);
+      covered += folded.size();
+      rank = std::max(rank, name == folded ? WHOLE_NAME : name.starts_with(folded) ? AT_START : 0);
+    }
+  }
+  return rank +
+         static_cast<double>(std::min(covered, name.size())) / static_cast<double>(name.size() + 1);
+}
+
+double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found) {
+  std::vector<Token> tokens;
+  for (const Found& part : found) {
+    for (const std::string& token : part.leaf->tokens) {
+      tokens.push_back({token, false});
+    }
+    if (!part.leaf->tokens.empty()) {
+      tokens.back().is_beginning = part.leaf->node->is_beginning;
+    }
+  }
+  if (tokens.empty()) {
+    return PieceScore(candidate, found);
+  }
+
+  const std::string name = folder.Words(ToUtf8(LastComponent(candidate.entry.path)));
+  const std::vector<std::string> words = tokenizer.Tokens(name);
+  const double covered = Covered(words, tokens);
+  if (IsSame(words, tokens)) {
+    return WHOLE_NAME + covered;
+  }
+  const bool at_start =
+      words.size() >= tokens.size() &&
+      std::equal(tokens.begin(), tokens.end(), words.begin(),
+                 [](const Token& token, const std::string& word) { return token.Fits(word); });
+  if (!at_start) {
+    return covered;
+  }
+  const bool has_stem = candidate.entry.kind != Kind::FOLDER;
+  const bool is_stem = has_stem && IsSame(tokenizer.Tokens(StemOf(name)), tokens);
+  return (is_stem ? WHOLE_STEM : AT_START) + covered;
+}
+
+int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score) {
+  if (full_scores_left == 0) {
+    const auto hits = static_cast<double>(sets.Hits(candidate.facts->text));
+    score = 0.5 * hits / (hits + 1);
+    return SQLITE_OK;
+  }
+  --full_scores_left;
+  int code = SQLITE_OK;
+  if (read_places.handle == nullptr) {
+    code = read_places.Prepare(rows.db,
+                               "SELECT word_places(words) FROM contents.words WHERE words MATCH ?1 "
+                               "AND rowid = ?2");
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  read_places.BindText(1, places_query);
+  read_places.BindInt(2, candidate.facts->text);
+  code = read_places.Step();
+  const std::vector<WordPlaces> counted = ReadWordPlaces(read_places.Bytes(0), places.size());
+  read_places.Reset();
+  if (code != SQLITE_ROW && code != SQLITE_DONE) {
+    return code;
+  }
+
+  double sum = 0;
+  for (const Found& part : found) {
+    const auto place = std::find(places.begin(), places.end(), part.leaf);
+    sum += part.in_name || place == places.end()
+               ? 1
+               : ScoreOfPlaces(counted[static_cast<size_t>(place - places.begin())],
+                               static_cast<double>(candidate.facts->length));
+  }
+  score = 0.5 + 0.5 * (sum / static_cast<double>(found.size())) * Youth(candidate.entry);
+  return SQLITE_OK;
+}
+
+}  // namespace fileindexd

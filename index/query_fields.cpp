@@ -1,0 +1,110 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/query_fields.h"
+
+#include <strings.h>
+
+namespace fileindexd {
+
+namespace {
+
+using F = QueryField;
+using C = ContentField;
+
+// The first name of a content's field is the one that is shown.
+constexpr NamedField FIELDS[] = {
+    {"name", F::NAME, {}},
+    {"text", F::TEXT, {}},
+    {"size", F::SIZE, {}},
+    {"modified", F::MODIFIED, {}},
+    {"added", F::ADDED, {}},
+    {"near", F::NEAR, {}},
+    {"kind", F::KIND, {}},
+    {"ext", F::EXT, {}},
+    {"owner", F::OWNER, {}},
+    {"under", F::UNDER, {}},
+    {"is", F::IS, {}},
+    {"has", F::HAS, {}},
+    {"content", F::CONTENT, {}},
+    {"title", F::TEXT_FIELD, C::TITLE},
+    {"author", F::TEXT_FIELD, C::AUTHOR},
+    {"subject", F::TEXT_FIELD, C::SUBJECT},
+    {"description", F::TEXT_FIELD, C::DESCRIPTION},
+    {"keywords", F::TEXT_FIELD, C::KEYWORDS},
+    {"keyword", F::TEXT_FIELD, C::KEYWORDS},
+    {"tag", F::TEXT_FIELD, C::KEYWORDS},
+    {"from", F::TEXT_FIELD, C::FROM},
+    {"to", F::TEXT_FIELD, C::TO},
+    {"attachment", F::TEXT_FIELD, C::ATTACHMENTS},
+    {"member", F::TEXT_FIELD, C::MEMBERS},
+    {"artist", F::TEXT_FIELD, C::ARTIST},
+    {"album", F::TEXT_FIELD, C::ALBUM},
+    {"albumartist", F::TEXT_FIELD, C::ALBUM_ARTIST},
+    {"genre", F::TEXT_FIELD, C::GENRE},
+    {"composer", F::TEXT_FIELD, C::COMPOSER},
+    {"codec", F::TEXT_FIELD, C::CODECS},
+    {"camera", F::TEXT_FIELD, C::CAMERA},
+    {"lens", F::TEXT_FIELD, C::LENS},
+    {"caption", F::TEXT_FIELD, C::CAPTION},
+    {"pages", F::NUMBER_FIELD, C::PAGES},
+    {"created", F::NUMBER_FIELD, C::CREATED},
+    {"sent", F::NUMBER_FIELD, C::SENT},
+    {"taken", F::NUMBER_FIELD, C::TAKEN},
+    {"recorded", F::NUMBER_FIELD, C::RECORDED},
+    {"year", F::NUMBER_FIELD, C::YEAR},
+    {"track", F::NUMBER_FIELD, C::TRACK},
+    {"duration", F::NUMBER_FIELD, C::DURATION},
+    {"bitrate", F::NUMBER_FIELD, C::BIT_RATE},
+    {"width", F::NUMBER_FIELD, C::WIDTH},
+    {"height", F::NUMBER_FIELD, C::HEIGHT},
+    {"rating", F::NUMBER_FIELD, C::RATING},
+};
+
+}  // namespace
+
+const NamedField* FindField(std::string_view name) {
+  for (const NamedField& field : FIELDS) {
+    if (std::string_view(field.name).size() == name.size() &&
+        strncasecmp(field.name, name.data(), name.size()) == 0) {
+      return &field;
+    }
+  }
+  return nullptr;
+}
+
+const char* FieldName(ContentField field) {
+  for (const NamedField& named : FIELDS) {
+    if ((named.field == F::TEXT_FIELD || named.field == F::NUMBER_FIELD) &&
+        named.content == field) {
+      return named.name;
+    }
+  }
+  return "";
+}
+
+ValueForm FormOf(Column column, ContentField field) {
+  switch (column) {
+    case Column::SIZE:
+      return ValueForm::BYTES;
+    case Column::MODIFIED:
+    case Column::ADDED:
+      return ValueForm::NANOSECONDS;
+    case Column::FIELD:
+      break;
+  }
+  switch (field) {
+    case C::CREATED:
+    case C::SENT:
+    case C::RECORDED:
+      return ValueForm::SECONDS;
+    case C::TAKEN:
+      return ValueForm::CAMERA_TIME;
+    case C::DURATION:
+      return ValueForm::DURATION;
+    case C::BIT_RATE:
+      return ValueForm::BITS;
+    default:
+      return ValueForm::NUMBER;
+  }
+}
+
+}  // namespace fileindexd

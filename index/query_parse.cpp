@@ -1,0 +1,332 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The language of questions:
+//
+//   question  = any
+//   any       = all { "OR" all }
+//   all       = part { [ "AND" ] part }
+//   part      = ( "-" | "NOT" ) part | "(" any ")" | field ":" value | words
+//   words     = '"' { character } '"' [ "*" ] | word
+//   word      = characters up to a blank, or up to a ")" that closes a group; "*" at its end:
+//               what begins with it
+//   value     = [ "=" ] words | pattern                of name
+//             | words                                  of text and of the text fields
+//             | range | circle                         see query_values.h
+//             | name { "," name }                      of kind, ext, owner
+//             | path | property | presence | stage     of under, is, has, content
+//   pattern   = word with "*" anywhere but at its end alone
+//
+// AND, OR and NOT count in capitals only; alone they are words. What stands before a colon and is
+// no field belongs to the word. A word without a letter or a digit ("++") is looked for as it
+// stands, in the name.
+#include <algorithm>
+#include <utility>
+
+#include "index/query.h"
+#include "index/query_parts.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t MOST_BYTES = 4096;
+constexpr size_t MOST_PARTS = 100;
+constexpr int MOST_DEPTH = 50;
+
+bool IsBlank(char c) {
+  return static_cast<unsigned char>(c) <= 0x20 || c == 0x7f;
+}
+
+class Parser {
+ public:
+  Parser(const std::string& question, time_t moment, QueryError& failure)
+      : text(question), now(moment), error(failure) {}
+
+  bool Run(QueryNode& query);
+
+ private:
+  bool ReadAny(QueryNode& node, int depth);
+  bool ReadAll(QueryNode& node, int depth);
+  bool ReadPart(QueryNode& node, int depth);
+  bool ReadGroup(QueryNode& node, int depth);
+  bool ReadNot(QueryNode& node, size_t length, int depth);
+  bool ReadLeaf(QueryNode& node);
+  bool ReadQuoted(Value& value);
+  void ReadBare(Value& value);
+  const NamedField* TakeField();
+
+  void SkipBlanks();
+  bool IsAt(std::string_view keyword) const;  // as a word of its own
+  bool IsNegation() const;
+  bool Fail(const std::string& what, size_t where);
+
+  const std::string& text;
+  time_t now;
+  QueryError& error;
+  size_t at = 0;
+  int open = 0;  // groups
+  size_t leaves = 0;
+};
+
+bool Parser::Fail(const std::string& what, size_t where) {
+  error = {what, where};
+  return false;
+}
+
+void Parser::SkipBlanks() {
+  while (at < text.size() && IsBlank(text[at])) {
+    ++at;
+  }
+}
+
+bool Parser::IsAt(std::string_view keyword) const {
+  const size_t end = at + keyword.size();
+  return text.compare(at, keyword.size(), keyword) == 0 &&
+         (end == text.size() || IsBlank(text[end]) || text[end] == '(' ||
+          (text[end] == ')' && open > 0));
+}
+
+// "-5" is no number: a minus in front always says what not to find. "--" and "- " say nothing.
+bool Parser::IsNegation() const {
+  return text[at] == '-' && at + 1 < text.size() && !IsBlank(text[at + 1]) && text[at + 1] != '-' &&
+         text[at + 1] != ')';
+}
+
+bool Parser::Run(QueryNode& query) {
+  if (text.size() > MOST_BYTES) {
+    return Fail("the question is too long", MOST_BYTES);
+  }
+  SkipBlanks();
+  if (at == text.size()) {
+    return Fail("nothing to search for", 0);
+  }
+
+  QueryNode read;
+  const std::string_view alone = std::string_view(text).substr(
+      at, text.find_last_not_of(std::string_view(" \t\n\r")) + 1 - at);
+  if (alone == "AND" || alone == "OR" || alone == "NOT") {
+    read.text = alone;
+    read.start = at;
+    read.end = at + alone.size();
+  } else if (!ReadAny(read, 0)) {
+    return false;
+  }
+  if (!IsPositive(read)) {
+    return Fail("this says only what not to find; add what to find, as in kind:document", 0);
+  }
+  query = std::move(read);
+  return true;
+}
+
+bool Parser::ReadAny(QueryNode& node, int depth) {
+  if (depth > MOST_DEPTH) {
+    return Fail("too many brackets inside each other", at);
+  }
+  QueryNode any;
+  any.part = Part::OR;
+  while (true) {
+    if (!ReadAll(any.below.emplace_back(), depth)) {
+      return false;
+    }
+    if (at == text.size() || !IsAt("OR")) {
+      break;
+    }
+    at += 2;
+  }
+  any.start = any.below.front().start;
+  any.end = any.below.back().end;
+  node = any.below.size() == 1 ? QueryNode(std::move(any.below.front())) : std::move(any);
+  return true;
+}
+
+bool Parser::ReadAll(QueryNode& node, int depth) {
+  QueryNode all;
+  all.part = Part::AND;
+  bool wants_more = true;
+  while (true) {
+    SkipBlanks();
+    const bool ends = at == text.size() || (text[at] == ')' && open > 0) || IsAt("OR");
+    if (ends && wants_more) {
+      return Fail(
+          "something is missing here (a word that is searched for stands in quotes: \"OR\")", at);
+    }
+    if (ends) {
+      break;
+    }
+    if (IsAt("AND")) {
+      if (wants_more) {
+        return Fail("AND stands between two things (the word stands in quotes: \"AND\")", at);
+      }
+      at += 3;
+      wants_more = true;
+      continue;
+    }
+    if (!ReadPart(all.below.emplace_back(), depth)) {
+      return false;
+    }
+    wants_more = false;
+  }
+  all.start = all.below.front().start;
+  all.end = all.below.back().end;
+  node = all.below.size() == 1 ? QueryNode(std::move(all.below.front())) : std::move(all);
+  return true;
+}
+
+bool Parser::ReadPart(QueryNode& node, int depth) {
+  if (text[at] == '(') {
+    return ReadGroup(node, depth);
+  }
+  if (text[at] == ')') {
+    return Fail("this bracket closes nothing", at);
+  }
+  if (IsAt("NOT")) {
+    return ReadNot(node, 3, depth);
+  }
+  return IsNegation() ? ReadNot(node, 1, depth) : ReadLeaf(node);
+}
+
+bool Parser::ReadGroup(QueryNode& node, int depth) {
+  const size_t start = at;
+  ++at;
+  ++open;
+  if (!ReadAny(node, depth + 1)) {
+    return false;
+  }
+  if (at == text.size()) {
+    return Fail("this bracket is never closed", start);
+  }
+  ++at;
+  --open;
+  return true;
+}
+
+bool Parser::ReadNot(QueryNode& node, size_t length, int depth) {
+  if (depth > MOST_DEPTH) {
+    return Fail("too many NOT inside each other", at);
+  }
+  QueryNode negation;
+  negation.part = Part::NOT;
+  negation.start = at;
+  at += length;
+  SkipBlanks();
+  if (at == text.size() || IsAt("OR") || IsAt("AND") || (text[at] == ')' && open > 0)) {
+    return Fail("NOT stands before something (the word stands in quotes: \"NOT\")", negation.start);
+  }
+  if (!ReadPart(negation.below.emplace_back(), depth + 1)) {
+    return false;
+  }
+  negation.end = negation.below.front().end;
+  node = std::move(negation);
+  return true;
+}
+
+// The field in front of a colon, if it is one.
+const NamedField* Parser::TakeField() {
+  size_t end = at;
+  while (end < text.size() &&
+         ((text[end] >= 'a' && text[end] <= 'z') || (text[end] >= 'A' && text[end] <= 'Z'))) {
+    ++end;
+  }
+  if (end == text.size() || text[end] != ':') {
+    return nullptr;
+  }
+  const NamedField* field = FindField(std::string_view(text).substr(at, end - at));
+  if (field != nullptr) {
+    at = end + 1;
+  }
+  return field;
+}
+
+bool Parser::ReadQuoted(Value& value) {
+  const size_t start = at;
+  const size_t end = text.find('"', at + 1);
+  if (end == std::string::npos) {
+    return Fail("this quote is never closed", start);
+  }
+  value.text = text.substr(at + 1, end - at - 1);
+  value.at = at + 1;
+  value.is_quoted = true;
+  at = end + 1;
+  value.has_star = at < text.size() && text[at] == '*';
+  at += value.has_star ? 1 : 0;
+  return true;
+}
+
+// A bracket that a word itself opened belongs to it: "copy(1).txt".
+void Parser::ReadBare(Value& value) {
+  value.at = at;
+  int inside = 0;
+  while (at < text.size() && !IsBlank(text[at])) {
+    inside += text[at] == '(' ? 1 : 0;
+    if (text[at] == ')' && --inside < 0) {
+      if (open > 0) {
+        break;
+      }
+      inside = 0;
+    }
+    ++at;
+  }
+  value.text = text.substr(value.at, at - value.at);
+}
+
+bool Parser::ReadLeaf(QueryNode& node) {
+  if (++leaves > MOST_PARTS) {
+    return Fail("too many words", at);
+  }
+  const size_t start = at;
+  const NamedField* field = TakeField();
+  Value value;
+  value.is_exact =
+      field != nullptr && field->field == QueryField::NAME && at < text.size() && text[at] == '=';
+  at += value.is_exact ? 1 : 0;
+  if (at < text.size() && text[at] == '"') {
+    if (!ReadQuoted(value)) {
+      return false;
+    }
+  } else {
+    ReadBare(value);
+  }
+  node.start = start;
+  node.end = at;
+  return field == nullptr ? FillWords(value, node, error)
+                          : FillField(*field, value, now, node, error);
+}
+
+}  // namespace
+
+bool IsPositive(const QueryNode& node) {
+  switch (node.part) {
+    case Part::AND:
+      return std::any_of(node.below.begin(), node.below.end(), IsPositive);
+    case Part::OR:
+      return std::all_of(node.below.begin(), node.below.end(), IsPositive);
+    case Part::NOT:
+      return false;
+    default:
+      return true;
+  }
+}
+
+std::string QueryError::Line(std::string_view question) const {
+  constexpr size_t SHOWN = 30;
+  std::string line = what;
+  if (at >= question.size()) {
+    return line + (question.empty() ? "" : " (at its end)");
+  }
+  size_t characters = 1;
+  for (size_t i = 0; i < at; ++i) {
+    characters += (static_cast<unsigned char>(question[i]) & 0xc0) != 0x80 ? 1 : 0;
+  }
+  size_t end = std::min(at + SHOWN, question.size());
+  while (end < question.size() && (static_cast<unsigned char>(question[end]) & 0xc0) == 0x80) {
+    ++end;
+  }
+  std::string shown(question.substr(at, end - at));
+  std::replace_if(shown.begin(), shown.end(), IsBlank, ' ');
+  return line + " (character " + std::to_string(characters) + ", at: " + shown + ")";
+}
+
+bool ParseQuery(const std::string& text, time_t now, QueryNode& query, QueryError& error) {
+  return Parser(text, now, error).Run(query);
+}
+
+}  // namespace fileindexd

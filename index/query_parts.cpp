@@ -1,0 +1,295 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/query_parts.h"
+
+#include <pwd.h>
+#include <strings.h>
+
+#include <algorithm>
+#include <charconv>
+#include <iterator>
+#include <optional>
+
+#include "index/kind.h"
+#include "index/query_values.h"
+#include "index/text_characters.h"
+#include "state/layout.h"
+
+namespace fileindexd {
+
+namespace {
+
+bool Fail(QueryError& error, const std::string& what, size_t at) {
+  error = {what, at};
+  return false;
+}
+
+// Whether the tables have words for it.
+bool HoldsWords(std::string_view text) {
+  CharacterTable characters;
+  for (size_t at = 0; at < text.size();) {
+    const Character character = CharacterAt(text, at);
+    const CharacterClass type = character.code < 0x80
+                                    ? ASCII_CLASSES[static_cast<size_t>(character.code)]
+                                    : characters.Of(character.code).type;
+    if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK &&
+        type != CharacterClass::JOINER) {
+      return true;
+    }
+    at += character.size;
+  }
+  return false;
+}
+
+std::vector<std::string> SplitAt(std::string_view text, char separator) {
+  std::vector<std::string> parts;
+  while (true) {
+    const size_t end = text.find(separator);
+    parts.emplace_back(text.substr(0, end));
+    if (end == std::string_view::npos) {
+      return parts;
+    }
+    text.remove_prefix(end + 1);
+  }
+}
+
+bool IsSame(std::string_view given, const char* name) {
+  return given.size() == std::string_view(name).size() &&
+         strncasecmp(given.data(), name, given.size()) == 0;
+}
+
+bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
+  if (value.text.find_first_not_of('*') == std::string::npos) {
+    return Fail(error, "'*' needs something to begin with, as in rep*", value.at);
+  }
+  node.part = Part::NAME_PATTERN;
+  node.pieces = {value.text};
+  return true;
+}
+
+// "*part*", "*.pdf", "a*b".
+bool FillPattern(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::NAME_PATTERN;
+  node.at_start = value.text.front() != '*';
+  node.at_end = value.text.back() != '*';
+  for (std::string& piece : SplitAt(value.text, '*')) {
+    if (!piece.empty()) {
+      node.pieces.push_back(std::move(piece));
+    }
+  }
+  return !node.pieces.empty() ||
+         Fail(error, "'*' alone stands for every name; add a part of it, as in name:*part*",
+              value.at);
+}
+
+bool FillName(const Value& value, QueryNode& node, QueryError& error) {
+  if (value.is_exact) {
+    node.part = Part::EXACT_NAME;
+    node.text = value.text;
+    return true;
+  }
+  const size_t star = value.is_quoted ? std::string::npos : value.text.find('*');
+  if (star != std::string::npos && star + 1 < value.text.size()) {
+    return FillPattern(value, node, error);
+  }
+  node.scope = Scope::NAME;
+  return FillWords(value, node, error);
+}
+
+bool FillRange(Column column, const Value& value, time_t now, QueryNode& node, QueryError& error) {
+  node.part = Part::RANGE;
+  node.column = column;
+  ValueRange range;
+  std::string what;
+  size_t at = 0;
+  if (!ParseRange(value.text, FormOf(column, node.field), now, range, what, at)) {
+    return Fail(error, what, value.at + at);
+  }
+  node.lowest = range.lowest;
+  node.highest = range.highest;
+  return true;
+}
+
+bool FillNear(const Value& value, QueryNode& node, QueryError& error) {
+  Circle circle;
+  std::string what;
+  if (!ParseCircle(value.text, circle, what)) {
+    return Fail(error, what, value.at);
+  }
+  node.part = Part::NEAR;
+  node.latitude = circle.latitude;
+  node.longitude = circle.longitude;
+  node.radius = circle.radius;
+  return true;
+}
+
+bool FillKind(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::KIND;
+  for (std::string& name : SplitAt(value.text, ',')) {
+    std::transform(name.begin(), name.end(), name.begin(),
+                   [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
+    const std::optional<Kind> kind = KindFromText(name);
+    if (!kind.has_value()) {
+      return Fail(error,
+                  "'" + name + "' is no kind: document, audio, video, photo, other or folder",
+                  value.at);
+    }
+    node.numbers.push_back(static_cast<int64_t>(*kind));
+  }
+  return true;
+}
+
+bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::EXT;
+  node.names = SplitAt(value.text, ',');
+  for (std::string& name : node.names) {
+    name.erase(0, name.starts_with('.') ? 1 : 0);
+    if (name.empty() || name.find('/') != std::string::npos) {
+      return Fail(error, "'" + value.text + "' is no ending of names like pdf or jpg,png",
+                  value.at);
+    }
+  }
+  return true;
+}
+
+std::optional<int64_t> UserNumber(const std::string& name) {
+  uint32_t number = 0;
+  const auto [end, failed] = std::from_chars(name.data(), name.data() + name.size(), number);
+  if (failed == std::errc() && end == name.data() + name.size()) {
+    return number;
+  }
+  passwd user{};
+  passwd* found = nullptr;
+  std::string room(16384, '\0');
+  (void)getpwnam_r(name.c_str(), &user, room.data(), room.size(), &found);  // failed: not found
+  return found == nullptr ? std::nullopt : std::optional<int64_t>(user.pw_uid);
+}
+
+bool FillOwner(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::OWNER;
+  for (const std::string& name : SplitAt(value.text, ',')) {
+    const std::optional<int64_t> user = UserNumber(name);
+    if (!user.has_value()) {
+      return Fail(error, "there is no user '" + name + "'", value.at);
+    }
+    node.numbers.push_back(*user);
+  }
+  return true;
+}
+
+bool FillUnder(const Value& value, QueryNode& node, QueryError& error) {
+  const std::optional<std::string> path = NormalPath(value.text);
+  if (!path.has_value()) {
+    return Fail(error, "'" + value.text + "' is not a plain absolute path", value.at);
+  }
+  node.part = Part::UNDER;
+  node.names = {*path};
+  return true;
+}
+
+bool FillIs(const Value& value, QueryNode& node, QueryError& error) {
+  constexpr const char* NAMES[] = {"file", "folder", "link", "empty", "hidden", "duplicate"};
+  const auto* const name = std::find_if(std::begin(NAMES), std::end(NAMES), [&](const char* known) {
+    return IsSame(value.text, known);
+  });
+  if (name == std::end(NAMES)) {
+    return Fail(error, "is: knows file, folder, link, empty, hidden and duplicate", value.at);
+  }
+  node.part = Part::IS;
+  node.property = static_cast<Property>(name - std::begin(NAMES));
+  return true;
+}
+
+bool FillHas(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::HAS;
+  if (IsSame(value.text, "text") || IsSame(value.text, "location")) {
+    node.presence = IsSame(value.text, "text") ? Presence::TEXT : Presence::LOCATION;
+    return true;
+  }
+  const NamedField* field = FindField(value.text);
+  if (field == nullptr ||
+      (field->field != QueryField::TEXT_FIELD && field->field != QueryField::NUMBER_FIELD)) {
+    return Fail(error, "has: knows text, location and the fields of contents, as in has:title",
+                value.at);
+  }
+  node.presence = Presence::FIELD;
+  node.field = field->content;
+  return true;
+}
+
+bool FillContent(const Value& value, QueryNode& node, QueryError& error) {
+  constexpr const char* NAMES[] = {"waiting", "done", "failed"};
+  const auto* const name = std::find_if(std::begin(NAMES), std::end(NAMES), [&](const char* known) {
+    return IsSame(value.text, known);
+  });
+  if (name == std::end(NAMES)) {
+    return Fail(error, "content: knows waiting, done and failed", value.at);
+  }
+  node.part = Part::CONTENT;
+  node.stage = static_cast<ContentStage>(name - std::begin(NAMES));
+  return true;
+}
+
+}  // namespace
+
+bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
+  if (!HoldsWords(value.text)) {
+    if (value.text.empty() && value.is_quoted) {
+      return Fail(error, "nothing stands between the quotes", value.at - 1);
+    }
+    if (node.scope == Scope::FIELD || node.scope == Scope::TEXT) {
+      return Fail(error, "'" + value.text + "' is no word", value.at);
+    }
+    return FillSign(value, node, error);
+  }
+  node.part = Part::WORD;
+  node.text = value.text;
+  node.is_phrase = value.is_quoted;
+  node.is_beginning = value.is_quoted ? value.has_star : value.text.ends_with('*');
+  return true;
+}
+
+bool FillField(const NamedField& field, const Value& value, time_t now, QueryNode& node,
+               QueryError& error) {
+  if (value.text.empty()) {
+    return Fail(error, std::string(field.name) + ": needs a value right behind the colon",
+                node.start);
+  }
+  node.field = field.content;
+  switch (field.field) {
+    case QueryField::NAME:
+      return FillName(value, node, error);
+    case QueryField::TEXT:
+      node.scope = Scope::TEXT;
+      return FillWords(value, node, error);
+    case QueryField::TEXT_FIELD:
+      node.scope = Scope::FIELD;
+      return FillWords(value, node, error);
+    case QueryField::NUMBER_FIELD:
+      return FillRange(Column::FIELD, value, now, node, error);
+    case QueryField::SIZE:
+      return FillRange(Column::SIZE, value, now, node, error);
+    case QueryField::MODIFIED:
+      return FillRange(Column::MODIFIED, value, now, node, error);
+    case QueryField::ADDED:
+      return FillRange(Column::ADDED, value, now, node, error);
+    case QueryField::NEAR:
+      return FillNear(value, node, error);
+    case QueryField::KIND:
+      return FillKind(value, node, error);
+    case QueryField::EXT:
+      return FillExt(value, node, error);
+    case QueryField::OWNER:
+      return FillOwner(value, node, error);
+    case QueryField::UNDER:
+      return FillUnder(value, node, error);
+    case QueryField::IS:
+      return FillIs(value, node, error);
+    case QueryField::HAS:
+      return FillHas(value, node, error);
+    case QueryField::CONTENT:
+      return FillContent(value, node, error);
+  }
+  return Fail(error, "no such field", node.start);
+}
+
+}  // namespace fileindexd

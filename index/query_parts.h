@@ -1,0 +1,30 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Single parts of a question: from what a user wrote to a node of the tree.
+#pragma once
+
+#include <ctime>
+#include <string>
+
+#include "index/query.h"
+#include "index/query_fields.h"
+
+namespace fileindexd {
+
+// What stands behind a field's colon, or alone.
+struct Value {
+  std::string text;  // without its quotes
+  size_t at = 0;     // byte of the question
+  bool is_quoted = false;
+  bool has_star = false;  // behind the quotes
+  bool is_exact = false;  // "=" in front
+};
+
+// Set all of the node but its place. False, and `error` says why.
+bool FillWords(const Value& value, QueryNode& node, QueryError& error);
+bool FillField(const NamedField& field, const Value& value, time_t now, QueryNode& node,
+               QueryError& error);
+
+// Whether the tree says what to find: not all of it is negated.
+bool IsPositive(const QueryNode& node);
+
+}  // namespace fileindexd

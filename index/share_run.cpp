@@ -1,0 +1,367 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/share_run.h"
+
+#include <algorithm>
+#include <cmath>
+#include <utility>
+
+#include "index/entry_table.h"
+#include "index/row_sql.h"
+#include "index/schema.h"
+#include "index/text_tokenizer.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t BLOCK = 1000;  // names that are looked at before it is asked if that is enough
+constexpr size_t SCORED_TEXTS = 300;     // the same of texts
+constexpr uint64_t MOST_RANKED = 50000;  // names whose words are all compared
+constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
+constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
+
+uint64_t WantedOf(const Question& question) {
+  constexpr uint64_t MOST = UINT64_MAX / 4;
+  return question.limit == 0 ? 0 : std::min(question.offset, MOST) + std::min(question.limit, MOST);
+}
+
+bool HasPositiveLeaf(const Asked& asked) {
+  return std::any_of(asked.leaves.begin(), asked.leaves.end(),
+                     [](const WordLeaf& leaf) { return leaf.is_positive; });
+}
+
+}  // namespace
+
+ShareRun::ShareRun(sqlite3* entries, bool with_contents, const Question& in_question,
+                   const Asked& as_asked, const std::string& in_share)
+    : question(in_question),
+      asked(as_asked),
+      share(in_share),
+      wanted(WantedOf(in_question)),
+      rows(entries, with_contents),
+      sets(entries, with_contents, as_asked),
+      check(rows, sets),
+      score(rows, sets, check, as_asked) {}
+
+int ShareRun::Run(BestHits& best, uint64_t& total) {
+  if (!score.Open() || !marker.Open()) {
+    return SQLITE_NOMEM;
+  }
+  int code = sets.Read();
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  upper = sets.Upper(asked.tree);
+  lower = sets.Lower(asked.tree);
+
+  bool is_enough = false;
+  const bool all_alike = IsScored() && !HasPositiveLeaf(asked);
+  const std::string ordered = OrderedSql(all_alike ? SortBy::MODIFIED : question.sort);
+  if (!question.count_all && !question.reverse && !ordered.empty() && wanted > 0 &&
+      (upper.everything || upper.Count() > FEW)) {
+    code = WalkInOrder(ordered, best, is_enough);
+  }
+  if (code == SQLITE_OK && !is_enough) {
+    answered = 0;
+    code = upper.everything ? WalkRows(best) : WalkNames(best);
+    const bool needs_texts = question.count_all || !IsScored() || answered_by_name < wanted;
+    if (code == SQLITE_OK && !upper.everything && needs_texts) {
+      code = WalkTexts(best);
+    }
+  }
+  total += answered;
+  return code;
+}
+
+int ShareRun::Answers(Candidate& candidate, bool& answers) {
+  answers = lower.Has(candidate.entry.id);
+  return answers ? SQLITE_OK : check.Matches(asked.tree, candidate, answers);
+}
+
+int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
+  ++answered;
+  if (wanted == 0) {
+    return SQLITE_OK;
+  }
+  Hit hit;
+  const int code = IsScored() ? score.Score(candidate, hit.score, hit.text) : SQLITE_OK;
+  if (hit.score >= 1) {
+    ++answered_by_name;
+    hit.score = std::min(hit.score, block.ceiling);
+    block.floor = std::min(block.floor, hit.score);
+  }
+  hit.share = share;
+  hit.entry = std::move(candidate.entry);
+  best.Add(std::move(hit));
+  return code;
+}
+
+int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
+  Candidate candidate;
+  candidate.entry = hit.entry;
+  int code = IsScored() ? SQLITE_OK : score.Score(candidate, hit.score, hit.text);
+  code = code == SQLITE_OK ? rows.KindOf(candidate, hit.entry.kind) : code;
+  hit.marks = MarksInPath(asked, hit.entry.path, marker);
+  return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;
+}
+
+// What the words of names say of their order, in the full-text table's language.
+std::string ShareRun::RankQuery(bool at_start) const {
+  std::string query;
+  for (const WordLeaf& leaf : asked.leaves) {
+    if (leaf.is_positive && !leaf.tokens.empty()) {
+      query +=
+          (query.empty() ? "(" : " OR ") + std::string(at_start ? "^ " : "") + leaf.names_query;
+    }
+  }
+  return query.empty() ? "" : query + ") AND " + Quoted(NAME_END);
+}
+
+// The best first, then the youngest rows. Of very many, those that begin with a word are enough.
+int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
+  const uint64_t count = upper.names.Count();
+  const std::string query =
+      count <= BLOCK || !IsScored() || wanted == 0 ? "" : RankQuery(count > MOST_RANKED);
+  if (query.empty()) {
+    ids = upper.names.Ids();
+    return SQLITE_OK;
+  }
+  Statement rank;
+  int code =
+      rank.Prepare(rows.db, "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1");
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  // Where all of them answer, those that are shown are enough.
+  const uint64_t kept = lower.Count() == count ? wanted + BLOCK : count;
+  using Ranked = std::pair<double, int64_t>;
+  std::vector<Ranked> heap;  // the worst on top
+  rank.BindText(1, query);
+  for (code = rank.Step(); code == SQLITE_ROW; code = rank.Step()) {
+    const Ranked one(-sqlite3_column_double(rank.handle, 1), -rank.Int(0));
+    if (!upper.names.Has(-one.second) || (heap.size() >= kept && heap.front() < one)) {
+      continue;
+    }
+    if (heap.size() >= kept) {
+      std::pop_heap(heap.begin(), heap.end());
+      heap.pop_back();
+    }
+    heap.push_back(one);
+    std::push_heap(heap.begin(), heap.end());
+  }
+  if (code != SQLITE_DONE) {
+    return code;
+  }
+  std::sort_heap(heap.begin(), heap.end());
+  IdSet ranked;
+  for (const Ranked& one : heap) {
+    ids.push_back(-one.second);
+    ranked.Add(-one.second);
+  }
+  rest = upper.names;
+  rest.Subtract(ranked);
+  return SQLITE_OK;
+}
+
+int ShareRun::WalkNames(BestHits& best) {
+  std::vector<int64_t> ids;
+  IdSet rest;
+  int code = NamesByRank(ids, rest);
+  Block block;
+  for (size_t i = 0; code == SQLITE_OK; ++i) {
+    if (i == ids.size()) {
+      const std::vector<int64_t> others = rest.Ids();
+      ids.insert(ids.end(), others.rbegin(), others.rend());
+      rest = IdSet();
+    }
+    if (i % BLOCK == 0 && (wanted == 0 || IsScored())) {
+      if (answered_by_name >= wanted) {
+        for (; i < ids.size(); ++i) {
+          rest.Add(ids[i]);
+        }
+        return CountNames(rest);
+      }
+      block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 1.0);
+    }
+    if (i == ids.size()) {
+      break;
+    }
+    Candidate candidate;
+    bool found = false;
+    bool answers = false;
+    code = rows.Find(ids[i], candidate, found);
+    if (code == SQLITE_OK && found) {
+      code = Answers(candidate, answers);
+    }
+    if (code == SQLITE_OK && answers) {
+      code = AddHit(candidate, best, block);
+    }
+  }
+  return code;
+}
+
+// None of them is among the best.
+int ShareRun::CountNames(IdSet& others) {
+  IdSet sure = others;
+  sure.Intersect(lower);
+  answered += sure.Count();
+  if (!question.count_all) {
+    return SQLITE_OK;
+  }
+  others.Subtract(sure);
+  const std::vector<int64_t> ids = others.Ids();
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < ids.size() && code == SQLITE_OK; ++i) {
+    Candidate candidate;
+    bool found = false;
+    bool answers = false;
+    code = rows.Find(ids[i], candidate, found);
+    if (code == SQLITE_OK && found) {
+      code = check.Matches(asked.tree, candidate, answers);
+    }
+    answered += answers ? 1 : 0;
+  }
+  return code;
+}
+
+std::vector<int64_t> ShareRun::TextsByHits() const {
+  std::vector<int64_t> texts = upper.texts.Ids();
+  std::stable_sort(texts.begin(), texts.end(),
+                   [this](int64_t a, int64_t b) { return sets.Hits(a) > sets.Hits(b); });
+  return texts;
+}
+
+// One entry after the other; the statement is reset behind the last.
+int ShareRun::NextEntryOf(int64_t text, Candidate& candidate, bool& found) {
+  int code = SQLITE_OK;
+  if (entries_of.handle == nullptr) {
+    code = entries_of.Prepare(rows.db, "SELECT " FILEINDEX_ENTRY_COLUMNS
+                                       " FROM contents.files AS files CROSS JOIN entries "
+                                       "ON " FILEINDEX_SAME_FILE
+                                       " WHERE files.text = ?1 AND files.text <> 0");
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  if (sqlite3_stmt_busy(entries_of.handle) == 0) {
+    entries_of.BindInt(1, text);
+  }
+  code = entries_of.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    candidate = Candidate();
+    ReadEntry(entries_of, candidate.entry);
+    return SQLITE_OK;
+  }
+  entries_of.Reset();
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int ShareRun::WalkTexts(BestHits& best) {
+  const std::vector<int64_t> texts = TextsByHits();
+  Block block;
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < texts.size() && code == SQLITE_OK; ++i) {
+    if (answered >= wanted && (wanted == 0 || (IsScored() && i >= SCORED_TEXTS))) {
+      return question.count_all ? CountTexts(texts, i) : SQLITE_OK;
+    }
+    Candidate candidate;
+    bool found = false;
+    for (code = NextEntryOf(texts[i], candidate, found); code == SQLITE_OK && found;
+         code = NextEntryOf(texts[i], candidate, found)) {
+      bool answers = false;
+      if (!upper.names.Has(candidate.entry.id)) {
+        code = check.Matches(asked.tree, candidate, answers);
+      }
+      if (code == SQLITE_OK && answers) {
+        code = AddHit(candidate, best, block);
+      }
+      if (code != SQLITE_OK) {
+        break;
+      }
+    }
+  }
+  return code;
+}
+
+int ShareRun::CountTexts(const std::vector<int64_t>& texts, size_t from) {
+  int code = SQLITE_OK;
+  for (size_t i = from; i < texts.size() && code == SQLITE_OK; ++i) {
+    Candidate candidate;
+    bool found = false;
+    for (code = NextEntryOf(texts[i], candidate, found); code == SQLITE_OK && found;
+         code = NextEntryOf(texts[i], candidate, found)) {
+      bool answers = false;
+      if (!upper.names.Has(candidate.entry.id)) {
+        code = check.Matches(asked.tree, candidate, answers);
+      }
+      answered += answers ? 1 : 0;
+      if (code != SQLITE_OK) {
+        break;
+      }
+    }
+  }
+  return code;
+}
+
+// All rows that the attributes leave.
+int ShareRun::WalkRows(BestHits& best) {
+  Statement read;
+  int code = read.Prepare(rows.db, RowsSql(asked.tree, rows.has_contents).c_str());
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  Block block;
+  for (code = read.Step(); code == SQLITE_ROW; code = read.Step()) {
+    Candidate candidate;
+    ReadEntry(read, candidate.entry);
+    bool answers = false;
+    int checked = check.Matches(asked.tree, candidate, answers);
+    if (checked == SQLITE_OK && answers) {
+      checked = AddHit(candidate, best, block);
+    }
+    if (checked != SQLITE_OK) {
+      return checked;
+    }
+  }
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+// From the top, until there is enough and what comes next stands lower. Rows of one key come in no
+// order.
+int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough) {
+  Statement read;
+  int code = read.Prepare(rows.db, sql.c_str());
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  BestHits found(wanted, best.order);
+  Block block;
+  int64_t last_key = 0;
+  uint64_t walked = 0;
+  for (code = read.Step(); code == SQLITE_ROW && walked < MOST_WALKED; code = read.Step()) {
+    const int64_t key = read.Int(ENTRY_COLUMN_COUNT);
+    if (answered >= wanted && key != last_key) {
+      is_enough = true;
+      break;
+    }
+    last_key = key;
+    ++walked;
+    Candidate candidate;
+    ReadEntry(read, candidate.entry);
+    bool answers = false;
+    int checked = Answers(candidate, answers);
+    if (checked == SQLITE_OK && answers) {
+      checked = AddHit(candidate, found, block);
+    }
+    if (checked != SQLITE_OK) {
+      return checked;
+    }
+  }
+  for (size_t i = 0; i < found.hits.size() && is_enough; ++i) {
+    best.Add(std::move(found.hits[i]));
+  }
+  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,72 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// One question, put to one share.
+//
+// DESIGN: the full-text tables give two sets (see WordSets): entries by their names, and texts.
+// What may answer is walked through, the rarest part of the question first: entries, then the
+// entries of texts; where the tables say nothing, all rows. Each is looked at once, by RowCheck.
+// What answers for sure by its name is only counted, and looked at when it can be among the best.
+// Which are the best is told in two steps: for all of them by what the tables count on their way,
+// and block by block from the top by the full score. No score of a block is above those of the
+// blocks before it, so a page shows the same whatever was asked for before.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "index/best_hits.h"
+#include "index/hit_display.h"
+#include "index/hit_score.h"
+
+namespace fileindexd {
+
+class ShareRun {
+ public:
+  // All outlive it.
+  ShareRun(sqlite3* entries, bool with_contents, const Question& in_question, const Asked& as_asked,
+           const std::string& in_share);
+
+  // Adds to `best` and to `total`. SQLite's code.
+  int Run(BestHits& best, uint64_t& total);
+  // Adds what only hits that are shown need. SQLite's code.
+  int Complete(Hit& hit, TextCutter& cutter);
+  const WordSets& Sets() const { return sets; }
+
+ private:
+  // Scores of names in the block at hand: none above, and the least.
+  struct Block {
+    double ceiling = 1e9;
+    double floor = 1e9;
+  };
+
+  int WalkNames(BestHits& best);
+  int CountNames(IdSet& others);
+  int WalkTexts(BestHits& best);
+  int CountTexts(const std::vector<int64_t>& texts, size_t from);
+  int WalkRows(BestHits& best);
+  int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
+  std::string RankQuery(bool at_start) const;
+  int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
+  std::vector<int64_t> TextsByHits() const;
+  int Answers(Candidate& candidate, bool& answers);
+  int AddHit(Candidate& candidate, BestHits& best, Block& block);
+  int NextEntryOf(int64_t text, Candidate& candidate, bool& found);
+  bool IsScored() const { return question.sort == SortBy::SCORE; }
+
+  const Question& question;
+  const Asked& asked;
+  std::string share;
+  uint64_t wanted = 0;
+  CandidateRows rows;
+  WordSets sets;
+  RowCheck check;
+  HitScore score;
+  NameMarker marker;
+  WordSet upper;
+  IdSet lower;
+  Statement entries_of;
+  uint64_t answered = 0;  // hits so far
+  uint64_t answered_by_name = 0;
+};
+
+}  // namespace fileindexd

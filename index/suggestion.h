@@ -1,0 +1,22 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// "Did you mean": a question without an answer, in words that the indexes have.
+#pragma once
+
+#include <deque>
+#include <string>
+
+#include "index/asked.h"
+#include "index/asked_share.h"
+
+namespace fileindexd {
+
+// The question's text with each word that no share knows changed into the nearest one that some
+// share does: one slip of the fingers away, or two in a longer word. Empty when there is none for
+// one of them, or nothing was to be changed. Looks at a bounded part of the vocabularies.
+std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares);
+
+// Insertions, deletions, changes and swaps of neighbours that lead from one to the other; more than
+// `most` come as most + 1. By characters of valid UTF-8.
+int EditDistance(const std::string& from, const std::string& to, int most);
+
+}  // namespace fileindexd

@@ -1,0 +1,273 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/word_sets.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "index/entry_table.h"
+#include "index/name_pattern.h"
+#include "index/name_text.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
+// As in the schema's indexes.
+constexpr int64_t LARGE = 1 << 20;
+constexpr int64_t WEEK = 604'800'000'000'000;
+
+}  // namespace
+
+int WordSets::Read() {
+  for (const WordLeaf& leaf : asked.leaves) {
+    const int code = ReadLeaf(leaf);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+  }
+  return ReadAttributes(asked.tree);
+}
+
+int WordSets::ReadAttributes(const QueryNode& node) {
+  int code = node.part == Part::EXT     ? ReadEndings(node)
+             : node.part == Part::UNDER ? ReadUnder(node)
+             : node.part == Part::RANGE ? ReadRange(node)
+                                        : SQLITE_OK;
+  for (size_t i = 0; i < node.below.size() && code == SQLITE_OK; ++i) {
+    code = ReadAttributes(node.below[i]);
+  }
+  return code;
+}
+
+int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, bool counts) {
+  Statement match;
+  int code = match.Prepare(db, sql);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  match.BindText(1, query);
+  for (code = match.Step(); code == SQLITE_ROW; code = match.Step()) {
+    const int64_t id = match.Int(0);
+    if (id < 0 || id > MOST_ROWS) {
+      return SQLITE_CORRUPT;
+    }
+    ids.Add(id);
+    if (counts) {
+      const auto at = static_cast<size_t>(id);
+      hits.resize(std::max(hits.size(), at < hits.size() ? at : at * 2 + 64));
+      hits[at] += static_cast<uint32_t>(match.Int(1));
+    }
+  }
+  return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int WordSets::ReadLeaf(const WordLeaf& leaf) {
+  WordSet& set = sets[leaf.node];
+  if (leaf.node->part == Part::NAME_PATTERN) {
+    set.is_sure = true;
+    return NamePattern(*leaf.node).Find(db, set.names);
+  }
+  set.is_sure = leaf.node->part == Part::WORD;
+  set.everything = !set.is_sure && leaf.tokens.empty();
+  int code = SQLITE_OK;
+  if (!leaf.names_query.empty() && !leaf.tokens.empty()) {
+    code =
+        Collect("SELECT rowid FROM names WHERE names MATCH ?1", leaf.names_query, set.names, false);
+  }
+  if (code == SQLITE_OK && has_contents && !leaf.text_query.empty()) {
+    code = Collect("SELECT rowid, word_hits(words) FROM contents.words WHERE words MATCH ?1",
+                   leaf.text_query, set.texts, leaf.is_positive);
+  }
+  return code;
+}
+
+// The ending of a name is its last word.
+int WordSets::ReadEndings(const QueryNode& node) {
+  NameFolder folder;
+  WordSet& set = sets[&node];
+  for (const std::string& ending : node.names) {
+    const std::string words = folder.Words(ending);
+    const bool has_word = std::any_of(words.begin(), words.end(), [](char c) {
+      return (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || static_cast<signed char>(c) < 0;
+    });
+    if (!has_word) {
+      set.everything = true;
+      return SQLITE_OK;
+    }
+    const int code = Collect("SELECT rowid FROM names WHERE names MATCH ?1",
+                             Quoted(words + " " + NAME_END), set.names, false);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+  }
+  return SQLITE_OK;
+}
+
+// Ids that an index alone gives. Of more than a bounded number nothing is known.
+int WordSets::ReadFew(Statement& statement, WordSet& set) {
+  constexpr int64_t MOST = 10000;
+  int64_t found = 0;
+  int code = statement.Step();
+  for (; code == SQLITE_ROW && found < MOST; code = statement.Step()) {
+    const int64_t id = statement.Int(0);
+    if (id < 0 || id > MOST_ROWS) {
+      return SQLITE_CORRUPT;
+    }
+    set.names.Add(id);
+    ++found;
+  }
+  if (code == SQLITE_ROW) {
+    set = unknown;
+  }
+  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+// What a small folder holds.
+int WordSets::ReadUnder(const QueryNode& node) {
+  const PathRange range(node.names.front());
+  Statement below;
+  const int code = below.Prepare(db,
+                                 "SELECT id FROM entries WHERE path = ?1 UNION ALL "
+                                 "SELECT id FROM entries WHERE path > ?2 AND path < ?3");
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  below.BindBlob(1, node.names.front());
+  below.BindBlob(2, range.first);
+  below.BindBlob(3, range.end);
+  WordSet& set = sets[&node];
+  set.is_sure = true;
+  return ReadFew(below, set);
+}
+
+// The large ones, and those of some weeks.
+int WordSets::ReadRange(const QueryNode& node) {
+  const bool by_size = node.column == Column::SIZE && node.lowest >= LARGE;
+  const bool by_week = node.column == Column::MODIFIED && node.lowest >= WEEK;
+  if (!by_size && !by_week) {
+    return SQLITE_OK;
+  }
+  Statement inside;
+  const int code = inside.Prepare(
+      db, by_size ? "SELECT id FROM entries INDEXED BY entries_large "
+                    "WHERE size >= 1048576 AND size >= ?1 AND size <= ?2"
+                  : "SELECT id FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND "
+                    "mtime / 604800000000000 >= ?1 AND mtime / 604800000000000 <= ?2");
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  inside.BindInt(1, by_size ? node.lowest : node.lowest / WEEK);
+  inside.BindInt(2, by_size ? node.highest : node.highest / WEEK);
+  WordSet& set = sets[&node];
+  set.is_sure = by_size;
+  return ReadFew(inside, set);
+}
+
+const WordSet& WordSets::Of(const QueryNode& leaf) const {
+  const auto found = sets.find(&leaf);
+  return found == sets.end() ? unknown : found->second;
+}
+
+// The rarest of what must be there; of those that names alone decide, what they have in common.
+WordSet WordSets::UpperOfAll(const QueryNode& node) const {
+  WordSet by_name = unknown;
+  WordSet by_text = unknown;
+  WordSet best = unknown;
+  for (const QueryNode& below : node.below) {
+    WordSet set = Upper(below);
+    if (set.everything) {
+      continue;
+    }
+    if (set.texts.IsEmpty()) {
+      if (!by_name.everything) {
+        set.names.Intersect(by_name.names);
+      }
+      by_name = std::move(set);
+    } else if (set.names.IsEmpty()) {
+      if (!by_text.everything) {
+        set.texts.Intersect(by_text.texts);
+      }
+      by_text = std::move(set);
+    } else if (best.everything || set.Count() < best.Count()) {
+      best = std::move(set);
+    }
+  }
+  if (!best.everything && !by_name.everything) {
+    best.names.Intersect(by_name.names);
+  }
+  for (WordSet* other : {&by_name, &by_text}) {
+    if (!other->everything && (best.everything || other->Count() < best.Count())) {
+      best = std::move(*other);
+    }
+  }
+  return best;
+}
+
+WordSet WordSets::Upper(const QueryNode& node) const {
+  switch (node.part) {
+    case Part::AND:
+      return UpperOfAll(node);
+    case Part::OR: {
+      WordSet any;
+      for (const QueryNode& below : node.below) {
+        const WordSet set = Upper(below);
+        any.names.Unite(set.names);
+        any.texts.Unite(set.texts);
+        any.everything = any.everything || set.everything;
+      }
+      return any;
+    }
+    case Part::NOT:
+      return unknown;
+    default:
+      return Of(node);
+  }
+}
+
+IdSet WordSets::Lower(const QueryNode& node) const {
+  IdSet sure;
+  switch (node.part) {
+    case Part::AND: {
+      bool is_first = true;
+      for (const QueryNode& below : node.below) {
+        if (below.part == Part::NOT) {
+          continue;
+        }
+        if (is_first) {
+          sure = Lower(below);
+        } else {
+          sure.Intersect(Lower(below));
+        }
+        is_first = false;
+      }
+      // What is excluded by names alone is excluded for sure.
+      for (const QueryNode& below : node.below) {
+        if (below.part == Part::NOT && !sure.IsEmpty()) {
+          const WordSet excluded = Upper(below.below.front());
+          if (excluded.everything || !excluded.texts.IsEmpty()) {
+            return {};
+          }
+          sure.Subtract(excluded.names);
+        }
+      }
+      return sure;
+    }
+    case Part::OR:
+      for (const QueryNode& below : node.below) {
+        sure.Unite(Lower(below));
+      }
+      return sure;
+    case Part::NOT:
+      return sure;
+    default:
+      return Of(node).is_sure ? Of(node).names : sure;
+  }
+}
+
+int64_t WordSets::Hits(int64_t text) const {
+  const auto at = static_cast<size_t>(text);
+  return at < hits.size() ? hits[at] : 0;
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,121 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+# Completion of fileindexctl for bash: commands, options, their values, names of shares.
+
+# The options of a command. What ends in '=' takes its value there.
+_fileindexctl_options() {
+  case $1 in
+    '' | share | folder | worker) echo '--help' ;;
+    'share list' | 'folder list') echo '--help --json' ;;
+    'share set') echo '--help --language' ;;
+    'folder add') echo '--help --document --audio --video --photo --all --exclude' ;;
+    'folder set') echo '--help --document= --audio= --video= --photo= --exclude --no-excludes' ;;
+    event) echo '--help --path-old --data' ;;
+    pause) echo '--help --until --for' ;;
+    status) echo '--help --follow --json' ;;
+    search) echo '--help --share --kind --under --sort --reverse --limit --offset --count --wait' \
+      '--timeout --json -0' ;;
+    info) echo '--help --terms --query --json' ;;
+    stats) echo '--help --share --by --largest --duplicates --growth --json' ;;
+    failed) echo '--help --retry --json' ;;
+    dump) echo '--help --json -0' ;;
+    verify) echo '--help --repair --json' ;;
+    *) echo '--help' ;;
+  esac
+}
+
+# What may stand at the place of a command's positional argument of that number: words, or one of
+# "@share", "@file", "@folder".
+_fileindexctl_positional() {
+  case "$1:$2" in
+    :1) echo 'share folder reindex event pause resume log-level worker status search info stats' \
+      'failed dump verify' ;;
+    share:1) echo 'add remove accept set list' ;;
+    folder:1) echo 'add set remove list' ;;
+    worker:1) echo 'drop revive' ;;
+    'share add:2' | 'folder add:1' | 'folder set:1' | 'folder remove:1') echo '@folder' ;;
+    'share remove:1' | 'share accept:1' | 'share set:1') echo '@share' ;;
+    'worker drop:1' | 'worker revive:1') echo '@share' ;;
+    event:1 | failed:1 | dump:1 | verify:1) echo '@share' ;;
+    reindex:1 | info:1 | event:3) echo '@file' ;;
+    log-level:1) echo 'debug error' ;;
+  esac
+}
+
+# What an option takes, in the same words; "-" for any text. Nothing: it takes none.
+_fileindexctl_value() {
+  case "$1:$2" in
+    *:--share) echo '@share' ;;
+    *:--kind) echo 'document audio video photo other folder' ;;
+    *:--sort) echo 'name size modified' ;;
+    *:--by) echo 'kind ext owner folder age' ;;
+    *:--under | *:--path-old) echo '@file' ;;
+    'folder set:--document' | 'folder set:--audio' | 'folder set:--video' | 'folder set:--photo')
+      echo 'on off' ;;
+    *:--language | *:--exclude | *:--data | *:--until | *:--for | *:--limit | *:--offset | \
+      *:--timeout | *:--query | *:--largest | *:--growth) echo '-' ;;
+  esac
+}
+
+# Fills COMPREPLY with what of `$1` (see above) begins with `$2`. `$3`: the program.
+_fileindexctl_reply() {
+  local name plain
+  case $1 in
+    '' | -) ;;
+    @share)
+      plain=${2//\\/}
+      plain=${plain#[\"\']}
+      while IFS=$'\t' read -r name _; do
+        [[ $name == "$plain"* ]] || continue
+        [[ $2 == [\"\']* ]] || printf -v name '%q' "$name"
+        COMPREPLY+=("$name")
+      done < <("$3" share list 2>/dev/null)
+      ;;
+    @file | @folder)
+      # Outside of a completion there is nothing to set.
+      compopt -o filenames 2>/dev/null
+      local kind=-f
+      [[ $1 == @folder ]] && kind=-d
+      mapfile -t COMPREPLY < <(compgen "$kind" -- "$2")
+      ;;
+    *) mapfile -t COMPREPLY < <(compgen -W "$1" -- "$2") ;;
+  esac
+}
+
+_fileindexctl() {
+  local current=${COMP_WORDS[COMP_CWORD]} previous='' command='' value count=0 at word
+  COMPREPLY=()
+  # "--option=value" comes in three words. Which command it is, and how many arguments it has so far.
+  for ((at = 1; at < COMP_CWORD; ++at)); do
+    word=${COMP_WORDS[at]}
+    if [[ $word == '=' ]]; then
+      continue
+    elif [[ -n $previous && -n $(_fileindexctl_value "$command" "$previous") ]]; then
+      previous=''
+      continue
+    fi
+    previous=$word
+    [[ $word == -* ]] && continue
+    case $command in
+      '') command=$word ;;
+      share | folder | worker) command+=" $word" ;;
+      *) ((++count)) ;;
+    esac
+  done
+  if [[ $current == '=' ]]; then
+    current=''
+  fi
+
+  value=$(_fileindexctl_value "$command" "$previous")
+  if [[ -n $value ]]; then
+    _fileindexctl_reply "$value" "$current" "${1:-fileindexctl}"
+  elif [[ $current == -* ]]; then
+    _fileindexctl_reply "$(_fileindexctl_options "$command")" "$current"
+    [[ ${#COMPREPLY[@]} -eq 1 && ${COMPREPLY[0]} == *= ]] && compopt -o nospace 2>/dev/null
+  else
+    _fileindexctl_reply "$(_fileindexctl_positional "$command" $((count + 1)))" "$current" \
+      "${1:-fileindexctl}"
+  fi
+  return 0
+}
+
+complete -F _fileindexctl fileindexctl

@@ -1,0 +1,223 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Completion of the command line in bash and zsh: what is offered, and that it is what there is."""
+
+import os
+import pty
+import re
+import select
+import shlex
+import shutil
+import subprocess
+import unittest
+
+from harness import IndexTest, main, namespace
+from harness.awaiting import LIMIT
+from harness.machine import environment, program
+
+FOLDER = os.path.join(os.path.dirname(__file__), "../../../packaging/completions")
+ZSH = os.path.realpath(FOLDER)
+BASH = os.path.realpath(f"{FOLDER}/fileindexctl.bash")
+
+COMMANDS = ["dump", "event", "failed", "folder", "info", "log-level", "pause", "reindex", "resume",
+            "search", "share", "stats", "status", "verify", "worker"]
+KINDS = ["audio", "document", "folder", "other", "photo", "video"]
+
+# Words behind the program's name, the last one being completed, and what is offered, sorted.
+OFFERED = [
+    (("",), COMMANDS),
+    (("s",), ["search", "share", "stats", "status"]),
+    (("nope",), []),
+    (("share", ""), ["accept", "add", "list", "remove", "set"]),
+    (("folder", "re"), ["remove"]),
+    (("worker", "drop", ""), ["alpha", "beta"]),
+    (("share", "remove", "b"), ["beta"]),
+    (("dump", ""), ["alpha", "beta"]),
+    (("dump", "-0", "al"), ["alpha"]),
+    (("verify", "alpha", ""), []),
+    (("search", "--share", ""), ["alpha", "beta"]),
+    (("search", "word", "--kind", ""), KINDS),
+    (("search", "--kind", "p"), ["photo"]),
+    (("search", "--sort", ""), ["modified", "name", "size"]),
+    (("search", "--limit", ""), []),
+    (("search", "--re"), ["--reverse"]),
+    (("search", "word", "--off"), ["--offset"]),
+    (("stats", "--by", ""), ["age", "ext", "folder", "kind", "owner"]),
+    (("stats", "--share", "be"), ["beta"]),
+    (("log-level", ""), ["debug", "error"]),
+    (("failed", "--retry", ""), ["alpha", "beta"]),
+]
+
+
+def commands(ctl, *group):
+    """All that there are, in their words, as help lists them."""
+    help_text = ctl(*group, "--help").out.decode()
+    listed = help_text.partition("\nCommands:\n")[2].partition("\n\n")[0]
+    return [tuple(re.split(r"\s{2,}", line.strip())[0].split()) for line in listed.splitlines()
+            if re.match(r"  \S", line)]
+
+
+class CompletionTest(IndexTest):
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share()
+        self.make_share("beta")
+
+
+class BashTest(CompletionTest):
+    def offered(self, *words, **more):
+        """What the function leaves in COMPREPLY, sorted."""
+        script = (
+            'source "$0"; program=$1; shift; COMP_WORDS=("$program" "$@"); COMP_CWORD=$#; '
+            '_fileindexctl "$program" "${@: -1}" "${COMP_WORDS[COMP_CWORD-1]}"; '
+            'printf "%s\\0" "${COMPREPLY[@]}"'
+        )
+        done = subprocess.run(
+            ["bash", "--norc", "-c", script, BASH, program("fileindexctl"), *words],
+            env=environment(**more),
+            capture_output=True,
+            check=True,
+            timeout=LIMIT,
+        )
+        self.assertEqual(done.stderr, b"")
+        replies = done.stdout.decode().split("\0")
+        return sorted(reply for reply in replies if reply)
+
+    def test_what_is_offered(self):
+        for words, wanted in OFFERED:
+            with self.subTest(words=words):
+                self.assertEqual(self.offered(*words), wanted)
+
+    def test_values_behind_an_equals_sign(self):
+        self.assertEqual(self.offered("search", "--kind", "="), KINDS)
+        self.assertEqual(self.offered("search", "--kind", "=", "v"), ["video"])
+        self.assertEqual(self.offered("search", "--kind", "=", "photo", "--so"), ["--sort"])
+        self.assertEqual(self.offered("folder", "set", "--document", "=", "o"), ["off", "on"])
+        self.assertEqual(self.offered("folder", "set", "--doc"), ["--document="])
+
+    def test_every_option_of_every_command_and_no_other(self):
+        found = commands(self.ctl)
+        self.assertGreater(len(found), 20)
+        for words in found:
+            with self.subTest(command=words):
+                listed = self.ctl(*words, "--help").out.decode().partition("\nOptions:\n")[2]
+                wanted = re.findall(r"^  (?:-h,)?(--[a-z-]+|-0)", listed, re.MULTILINE)
+                offered = [reply.rstrip("=") for reply in self.offered(*words, "-")]
+                self.assertEqual(offered, sorted(wanted))
+
+    def test_every_command(self):
+        for words in commands(self.ctl):
+            with self.subTest(command=words):
+                self.assertIn(words[-1], self.offered(*words))
+
+    def test_paths(self):
+        self.make_files(self.root, "one/two.txt", "one/three/")
+
+        self.assertEqual(self.offered("info", f"{self.root}/on"), [f"{self.root}/one"])
+        self.assertEqual(self.offered("reindex", f"{self.root}/one/t"),
+                         [f"{self.root}/one/three", f"{self.root}/one/two.txt"])
+        self.assertEqual(self.offered("folder", "add", f"{self.root}/one/t"),
+                         [f"{self.root}/one/three"])
+        self.assertEqual(self.offered("search", "--under", f"{self.root}/o"), [f"{self.root}/one"])
+
+    def test_names_of_shares_that_need_quotes(self):
+        self.make_share("my files")
+        self.make_share("a$b")
+
+        self.assertEqual(self.offered("dump", ""), ["a\\$b", "alpha", "beta", "my\\ files"])
+        self.assertEqual(self.offered("dump", "my\\ f"), ["my\\ files"])
+        self.assertEqual(self.offered("dump", "'my f"), ["my files"])
+
+    def test_without_a_state_no_share_is_offered(self):
+        broken = {"FILEINDEXD_STATE_DIR": f"{namespace.STATE}/state.db/none"}
+
+        self.assertEqual(self.offered("dump", "", **broken), [])
+        self.assertEqual(self.offered("dump", "-", **broken), ["--help", "--json", "-0"])
+
+
+# Sends what completion would offer down a pipe, and offers nothing.
+ZSH_SETUP = """
+PS1= PS2= ; unsetopt zle_bracketed_paste prompt_cr prompt_sp beep
+fpath=({folder} $fpath); autoload -Uz compinit; compinit -D -u
+compadd() {{
+  local -a given=("$@") found
+  if (( ${{given[(I)-[a-zA-Z]#[OAD]]}} )); then
+    builtin compadd "$@"; return
+  fi
+  builtin compadd -A found "$@"
+  (( $#found )) && print -rlu {pipe} -- $found
+  builtin compadd "$@"
+}}
+offer() {{ _main_complete; compstate[insert]=''; compstate[list]=''; print -u {pipe} END; }}
+setopt extended_glob; zle -C offer complete-word offer; bindkey -e; bindkey '^T' offer
+print -u {pipe} END
+"""
+
+
+@unittest.skipUnless(shutil.which("zsh"), "no zsh here")
+class ZshTest(CompletionTest):
+    def setUp(self):
+        super().setUp()
+        self.keyboard, terminal = pty.openpty()
+        self.pipe, theirs = os.pipe()
+        setup = f"{namespace.RUN}/setup.zsh"
+        with open(setup, "w", encoding="ascii") as file:
+            file.write(ZSH_SETUP.format(folder=shlex.quote(ZSH), pipe=theirs))
+        path = f"{os.path.dirname(program('fileindexctl'))}:{os.environ['PATH']}"
+        self.shell = subprocess.Popen(
+            ["zsh", "-f", "-i"],
+            env=environment(TERM="dumb", PATH=path),
+            stdin=terminal,
+            stdout=terminal,
+            stderr=terminal,
+            pass_fds=[theirs],
+            start_new_session=True,
+        )
+        os.close(terminal)
+        os.close(theirs)
+        self.addCleanup(self.end)
+        self.type(f"source {setup}\n")
+
+    def end(self):
+        self.shell.kill()
+        self.shell.wait(LIMIT)
+        os.close(self.keyboard)
+        os.close(self.pipe)
+
+    def type(self, text):
+        """What comes down the pipe up to its end; the screen is read and dropped meanwhile."""
+        os.write(self.keyboard, text.encode())
+        told, screen = b"", b""
+        while not told.endswith(b"END\n"):
+            ready, _, _ = select.select([self.keyboard, self.pipe], [], [], LIMIT)
+            self.assertTrue(ready, f"nothing comes: {told!r}, {screen!r}")
+            if self.keyboard in ready:
+                screen += os.read(self.keyboard, 4096)
+            if self.pipe in ready:
+                told += os.read(self.pipe, 4096)
+        return told.decode().splitlines()[:-1]
+
+    def offered(self, *words):
+        line = " ".join(["fileindexctl", *words])
+        return sorted(set(self.type(f"\x15{line}\x14")))
+
+    def test_what_is_offered(self):
+        for words, wanted in OFFERED:
+            if not wanted and not words[-1]:
+                continue  # it goes on to offer options, or files
+            with self.subTest(words=words):
+                self.assertEqual(self.offered(*words), wanted)
+
+    def test_every_option_of_every_command(self):
+        for words in commands(self.ctl):
+            with self.subTest(command=words):
+                listed = self.ctl(*words, "--help").out.decode().partition("\nOptions:\n")[2]
+                wanted = re.findall(r"^  (?:-h,)?(--[a-z-]+|-0)", listed, re.MULTILINE)
+                offered = [reply.rstrip("=") for reply in self.offered(*words, "-")]
+                self.assertEqual(offered, sorted(wanted))
+
+    def test_values_behind_an_equals_sign(self):
+        self.assertEqual(self.offered("folder", "set", "--document="), ["off", "on"])
+
+
+if __name__ == "__main__":
+    main()

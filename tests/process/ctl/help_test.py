@@ -1,0 +1,61 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""Help: all commands are listed, and each has an example that the command line takes."""
+
+import re
+import shlex
+
+from ctl.completion_test import commands
+from harness import IndexTest, main, namespace
+
+EXAMPLE = re.compile(r"\nExample:\n((?:  fileindexctl [^\n]+\n)+)\Z")
+
+
+class HelpTest(IndexTest):
+    def setUp(self):
+        super().setUp()
+        with open(f"{namespace.RUN}/file", "w", encoding="ascii"):
+            pass
+        # A state that cannot be: what the command line takes goes no further than that.
+        self.state = {"FILEINDEXD_STATE_DIR": f"{namespace.RUN}/file/state"}
+
+    def examples(self, *command):
+        """Arguments of each example in a command's help."""
+        text = self.ctl(*command, "--help").out.decode()
+        found = EXAMPLE.search(text)
+        self.assertIsNotNone(found, text)
+        return [shlex.split(line)[1:] for line in found[1].splitlines()]
+
+    def test_commands_are_listed(self):
+        found = commands(self.ctl)
+
+        for wanted in (("share", "add"), ("folder", "set"), ("search",), ("stats",), ("verify",)):
+            self.assertIn(wanted, found)
+        self.assertEqual(len(set(found)), len(found))
+        self.assertEqual(commands(self.ctl, "worker"), [("drop",), ("revive",)])
+
+    def test_each_command_has_an_example_that_is_accepted(self):
+        for command in commands(self.ctl):
+            for example in self.examples(*command):
+                with self.subTest(example=example):
+                    self.assertEqual(tuple(example[: len(command)]), command)
+                    result = self.try_ctl(*example, **self.state)
+                    self.assertIn(result.code, (0, 1, 3), result)
+
+    def test_what_is_no_option_is_refused_in_every_example(self):
+        for command in commands(self.ctl):
+            for example in self.examples(*command):
+                with self.subTest(example=example):
+                    self.ctl(*example, "--nope", code=2, **self.state)
+
+    def test_help_needs_no_state(self):
+        for command in commands(self.ctl):
+            self.assertNotEqual(self.ctl(*command, "--help", **self.state).out, b"")
+
+    def test_examples_differ_from_each_other(self):
+        found = [tuple(e) for command in commands(self.ctl) for e in self.examples(*command)]
+
+        self.assertEqual(len(set(found)), len(found))
+
+
+if __name__ == "__main__":
+    main()

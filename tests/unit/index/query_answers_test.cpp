@@ -1,0 +1,272 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Answers as a whole: pages, failures, suggestions, reasons, and what happens meanwhile.
+#include <atomic>
+#include <filesystem>
+#include <thread>
+
+#include "index/asked.h"
+#include "index/asked_share.h"
+#include "index/contents_schema.h"
+#include "index/entry_table.h"
+#include "index/suggestion.h"
+#include "state/layout.h"
+#include "tests/unit/index/question_fixture.h"
+
+namespace fileindexd {
+
+class QueryAnswersTest : public QuestionTest {
+ protected:
+  // Rows without files, in a share of their own.
+  static bool TryToFill(const std::string& share, const Names& names) {
+    std::string error;
+    IndexDatabase database;
+    EntryTable table;
+    bool done = MakeShareFolder(share, error) &&
+                database.OpenForWriting(IndexPath(share), true) == IndexError::NONE &&
+                table.Prepare(database.db) == SQLITE_OK && table.Begin() == SQLITE_OK;
+    for (size_t i = 0; i < names.size() && done; ++i) {
+      Entry entry;
+      entry.path = "/" + share + "/" + names[i];
+      entry.thing = Thing::FILE;
+      done = table.Insert(entry) == SQLITE_OK;
+    }
+    return done && table.Commit(1) == SQLITE_OK;
+  }
+  static void Fill(const std::string& share, const Names& names) {
+    ASSERT_TRUE(TryToFill(share, names));
+  }
+
+  Names Paths(const std::string& text) {
+    question.text = text;
+    std::string error;
+    EXPECT_TRUE(Ask(question, answer, error)) << error;
+    Names paths;
+    for (const Hit& hit : answer.hits) {
+      paths.push_back(hit.entry.path);
+    }
+    return paths;
+  }
+};
+
+TEST_F(QueryAnswersTest, SharesAreMergedInOneOrder) {
+  Fill("b", {"x one", "x", "y x"});
+  Fill("a", {"x two", "x", "x y"});
+  question.shares = {"b", "a"};
+
+  EXPECT_EQ(Paths("x").size(), 6U);
+  EXPECT_EQ(answer.total, 6U);
+  EXPECT_EQ(answer.hits[0].entry.path, "/a/x");
+  EXPECT_EQ(answer.hits[1].entry.path, "/b/x");
+  const Names all = Paths("x");
+  Names pages;
+  question.limit = 2;
+  for (question.offset = 0; question.offset < 6; question.offset += 2) {
+    const Names page = Paths("x");
+    pages.insert(pages.end(), page.begin(), page.end());
+  }
+  EXPECT_EQ(pages, all);
+}
+
+TEST_F(QueryAnswersTest, BrokenShareIsNamedAndTheOthersAnswer) {
+  Fill("a", {"x"});
+  Fill("b", {"x"});
+  WriteFile(IndexPath("b") + "/entries.db", std::string(9000, 'x'));
+  std::filesystem::remove(IndexPath("b") + "/entries.db-wal");
+  question.shares = {"a", "b", "none"};
+
+  EXPECT_EQ(Paths("x"), Names({"/a/x"}));
+  ASSERT_EQ(answer.failures.size(), 2U);
+  EXPECT_TRUE(answer.failures[0].starts_with("share b: ")) << answer.failures[0];
+  EXPECT_TRUE(answer.failures[1].starts_with("share none: ")) << answer.failures[1];
+}
+
+TEST_F(QueryAnswersTest, SlowShareIsGivenUp) {
+  Names names;
+  for (int i = 0; i < 20000; ++i) {
+    names.push_back("x " + std::to_string(i));
+  }
+  Fill("a", names);
+  question.text = "name:*x*";
+  Asked asked;
+  std::string error;
+  ASSERT_TRUE(asked.Read(question, error));
+  AskedShare share("a");
+  share.patience = std::chrono::seconds(-1);
+
+  share.Ask(question, asked, {}, 20);
+  EXPECT_EQ(share.failures, Names({"share a: no answer within -1 seconds"}));
+  EXPECT_TRUE(share.hits.empty());
+}
+
+TEST_F(QueryAnswersTest, ManyHitsKeepTheirPages) {
+  Names names;
+  for (int i = 0; i < 2500; ++i) {
+    names.push_back((i % 3 == 0 ? "whale " : "a whale ") + std::to_string(i));
+  }
+  names.emplace_back("old whale.txt");
+  names.emplace_back("whale.txt");
+  names.emplace_back("whale");
+  Fill("a", names);
+  question.shares = {"a"};
+  question.count_all = false;
+  question.limit = 5000;
+  const Names all = Paths("whale");
+  ASSERT_EQ(all.size(), names.size());
+  EXPECT_EQ(all[0], "/a/whale") << "though thousands hold the word";
+  EXPECT_EQ(all[1], "/a/whale.txt");
+  double before = 10;
+  for (const Hit& hit : answer.hits) {
+    EXPECT_LE(hit.score, before);
+    before = hit.score;
+  }
+
+  question.limit = 300;
+  Names pages;
+  for (question.offset = 0; question.offset < names.size(); question.offset += 300) {
+    const Names page = Paths("whale");
+    EXPECT_EQ(answer.total, names.size());
+    pages.insert(pages.end(), page.begin(), page.end());
+  }
+  EXPECT_EQ(pages, all);
+}
+
+TEST_F(QueryAnswersTest, SuggestionsAreWordsThatTheIndexHas) {
+  Store({{"holiday plans.txt", TextContent("the computer counts invoices")}});
+  Empty({"holy.txt", "\u6771\u4eac.txt"});
+
+  EXPECT_EQ(Suggested("holidya"), "holiday");
+  EXPECT_EQ(Suggested("holidys plans"), "holiday plans");
+  EXPECT_EQ(Suggested("ohliday"), "holiday");
+  EXPECT_EQ(Suggested("computr"), "computer") << "not the stem alone";
+  EXPECT_EQ(Suggested("invocies OR xyzzyx"), "");
+  EXPECT_EQ(Suggested("kind:document  invocies"), "kind:document  invoices");
+  EXPECT_EQ(Suggested("\"holidya\""), "");
+  EXPECT_EQ(Suggested("zzzzzz"), "");
+  EXPECT_EQ(Suggested("ho"), "");
+  EXPECT_EQ(Suggested("kind:audio holidya"), "") << "would find nothing either";
+  EXPECT_EQ(Suggested("kind:audio"), "");
+  EXPECT_EQ(Hits("holiday"), Names({"holiday plans.txt"}));
+  EXPECT_EQ(answer.suggestion, "");
+}
+
+TEST_F(QueryAnswersTest, DistanceCountsSlips) {
+  EXPECT_EQ(EditDistance("abc", "abc", 2), 0);
+  EXPECT_EQ(EditDistance("abc", "acb", 2), 1);
+  EXPECT_EQ(EditDistance("abc", "ab", 2), 1);
+  EXPECT_EQ(EditDistance("abc", "xbc", 2), 1);
+  EXPECT_EQ(EditDistance("abc", "abxc", 2), 1);
+  EXPECT_EQ(EditDistance("abcd", "badc", 2), 2);
+  EXPECT_EQ(EditDistance("abc", "xyz", 2), 3);
+  EXPECT_EQ(EditDistance("\u00fcb", "\u00e4b", 2), 1);
+  EXPECT_EQ(EditDistance("", "ab", 1), 2);
+  EXPECT_EQ(EditDistance("", "", 1), 0);
+}
+
+TEST_F(QueryAnswersTest, ReasonsTellWhyPartByPart) {
+  Content content = TextContent("call me ishmael");
+  content.texts = {{ContentField::AUTHOR, "Melville"}};
+  content.numbers = {{ContentField::PAGES, 300}};
+  Store({{"moby call.txt", content}});
+
+  EXPECT_EQ(Reasons("moby call.txt", "call whale OR pages:>100"),
+            Names({"call: name, text", "no whale: ", "pages:>100: 300"}));
+  EXPECT_TRUE(explanation.matches);
+  EXPECT_EQ(Reasons("moby call.txt", "melville -ishmael"),
+            Names({"melville: author", "no -ishmael: "}));
+  EXPECT_FALSE(explanation.matches);
+  EXPECT_EQ(Reasons("moby call.txt", "size:>1M kind:audio name:*oby*"),
+            Names({"no size:>1M: 13 bytes", "no kind:audio: document", "name:*oby*: name"}));
+  EXPECT_EQ(Reasons("moby call.txt", "duration:1m near:0,0,1km"),
+            Names({"no duration:1m: none", "no near:0,0,1km: none"}));
+  EXPECT_EQ(Reasons("none.txt", "a"), Names({"error: not in the index: " + At("none.txt")}));
+  EXPECT_EQ(Reasons("moby call.txt", "(")[0].substr(0, 6), "error:");
+}
+
+// Each commit leaves two of each number; a reader who saw half a commit would count an odd one.
+TEST_F(QueryAnswersTest, CommitsInBetweenAreSeenWholeOrNotAtAll) {
+  Fill("a", {"pair first", "pair second"});
+  std::atomic<bool> going = true;
+  std::thread writing([&going] {
+    for (int round = 0; round < 60; ++round) {
+      IndexDatabase database;
+      EntryTable table;
+      if (database.OpenForWriting(IndexPath("a"), false) != IndexError::NONE ||
+          table.Prepare(database.db) != SQLITE_OK || table.Begin() != SQLITE_OK) {
+        ADD_FAILURE() << "round " << round;
+        break;
+      }
+      for (const char* half : {"left ", "right "}) {
+        for (int i = 0; i < 30; ++i) {
+          Entry entry;
+          entry.path = "/a/pair " + std::string(half) + std::to_string(round * 30 + i);
+          entry.thing = Thing::FILE;
+          EXPECT_EQ(table.Insert(entry), SQLITE_OK);
+        }
+      }
+      EXPECT_EQ(table.Commit(1), SQLITE_OK);
+      (void)sqlite3_wal_checkpoint_v2(database.db, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr,
+                                      nullptr);  // readers may be in the way
+    }
+    going = false;
+  });
+  question.shares = {"a"};
+  question.limit = 5;
+  uint64_t last = 2;
+  while (going) {
+    for (const char* text : {"pair", "pair is:file", "name:*air*", "is:file -name:none"}) {
+      (void)Paths(text);
+      EXPECT_EQ(answer.failures, Names()) << text;
+      EXPECT_EQ(answer.total % 2, 0U) << text;
+      EXPECT_GE(answer.total, last) << text;
+      last = answer.total;
+    }
+  }
+  writing.join();
+  (void)Paths("pair");
+  EXPECT_EQ(answer.total, 2U + 60 * 60);
+}
+
+TEST_F(QueryAnswersTest, IndexesMadeAnewInBetweenAreNoFailure) {
+  Fill("a", {"pair first", "pair second"});
+  std::atomic<bool> going = true;
+  std::thread writing([&going] {
+    for (int round = 0; round < 25; ++round) {
+      // A reader that still opens the old one can spoil the making: the daemon tries again too.
+      bool made = false;
+      for (int tries = 0; tries < 100 && !made; ++tries) {
+        std::error_code left;  // a reader may have put its files there meanwhile
+        std::filesystem::remove_all(IndexPath("a"), left);
+        made = TryToFill("a", {"pair first", "pair second", "pair third", "pair fourth"});
+      }
+      EXPECT_TRUE(made);
+    }
+    going = false;
+  });
+  question.shares = {"a"};
+  while (going) {
+    (void)Paths("pair");
+    EXPECT_EQ(answer.failures, Names());
+    EXPECT_EQ(answer.total % 2, 0U);
+  }
+  writing.join();
+  EXPECT_EQ(Paths("pair").size(), 4U);
+}
+
+TEST_F(QueryAnswersTest, ShareThatLeavesInBetweenIsNoFailureOnceItWasOpen) {
+  Fill("a", {"pair first"});
+  question.text = "pair";
+  Asked asked;
+  std::string error;
+  ASSERT_TRUE(asked.Read(question, error));
+  AskedShare share("a");
+  ASSERT_EQ(share.Open(true), IndexError::NONE);
+  RemoveTree(ShareFolder("a"));
+
+  BestHits best(20, {});
+  uint64_t total = 0;
+  ShareRun run(share.reader.database.db, share.has_contents, question, asked, "a");
+  EXPECT_EQ(run.Run(best, total), SQLITE_OK);
+  EXPECT_EQ(total, 1U);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,119 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The manual's examples mean something, and what it says of them is so.
+#include <fstream>
+#include <set>
+
+#include "index/query.h"
+#include "tests/unit/index/question_fixture.h"
+
+namespace fileindexd {
+
+class QueryManualTest : public QuestionTest {
+ protected:
+  static Names Examples() {
+    std::ifstream manual(FILEINDEXD_QUERY_MANUAL);
+    Names examples;
+    bool inside = false;
+    for (std::string line; std::getline(manual, line);) {
+      if (line.starts_with("```")) {
+        inside = !inside;
+      } else if (inside) {
+        examples.push_back(line);
+      }
+    }
+    return examples;
+  }
+
+  // Something for each example.
+  void StoreAll() {
+    Content book = TextContent("the annual report of whales");
+    book.texts = {{ContentField::TITLE, "Moby Dick"}, {ContentField::AUTHOR, "Melville"}};
+    book.numbers = {{ContentField::PAGES, 300},
+                    {ContentField::CREATED, 1'690'000'000},
+                    {ContentField::SENT, time(nullptr) - 86400}};
+    book.sample = 5;
+    Content song = Tagged(ContentField::ARTIST, "x");
+    song.kind = Kind::AUDIO;
+    song.numbers = {{ContentField::DURATION, 200'000},
+                    {ContentField::YEAR, 1994},
+                    {ContentField::BIT_RATE, 320'000},
+                    {ContentField::TRACK, 1},
+                    {ContentField::RATING, 5}};
+    const auto photo = [](double latitude, double longitude) {
+      return Numbered({{ContentField::WIDTH, 4000},
+                       {ContentField::TAKEN, 1'704'412'900},
+                       {ContentField::RECORDED, 1'670'500'000},
+                       {ContentField::LATITUDE, static_cast<int64_t>(latitude * 1e7)},
+                       {ContentField::LONGITUDE, static_cast<int64_t>(longitude * 1e7)}},
+                      Kind::PHOTO);
+    };
+    Store({{"annual report 2024.pdf", book},
+           {"annual report copy.pdf", book},
+           {"report.pdf", book},
+           {"invoice 2024.txt", TextContent("paid")},
+           {"song.mp3", song},
+           {"img_2024.jpg", photo(52.5164, 13.3778)},
+           {"paris.png", photo(48.8585, 2.2946)},
+           {"film.mkv", Numbered({{ContentField::DURATION, 5'000'000}}, Kind::VIDEO)},
+           {"backup.tar.gz", Tagged(ContentField::MEMBERS, "a")},
+           {".hidden", TextContent("x")}});
+  }
+};
+
+TEST_F(QueryManualTest, EveryExampleIsUnderstood) {
+  const Names examples = Examples();
+  EXPECT_GT(examples.size(), 60U);
+  for (const std::string& example : examples) {
+    QueryNode query;
+    QueryError error;
+    EXPECT_TRUE(ParseQuery(example, time(nullptr), query, error))
+        << example << ": " << error.Line(example);
+  }
+}
+
+TEST_F(QueryManualTest, EveryExampleIsAnswered) {
+  StoreAll();
+  for (const std::string& example : Examples()) {
+    const Names hits = Hits(example);
+    EXPECT_FALSE(!hits.empty() && hits[0].starts_with("error")) << example << ": " << hits[0];
+  }
+}
+
+TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
+  StoreAll();
+  const std::map<std::string, Names> found = {
+      {"annual report", {"annual report 2024.pdf", "annual report copy.pdf", "report.pdf"}},
+      {"invoice OR receipt", {"invoice 2024.txt"}},
+      {"(invoice OR receipt) 2024 -(copy OR draft)", {"invoice 2024.txt"}},
+      {"title:\"moby dick\"", {"annual report 2024.pdf", "annual report copy.pdf", "report.pdf"}},
+      {"name:*port*", {"annual report 2024.pdf", "annual report copy.pdf", "report.pdf"}},
+      {"name:*.tar.gz", {"backup.tar.gz"}},
+      {"name:img*2024*", {"img_2024.jpg"}},
+      {"name:=report.pdf", {"report.pdf"}},
+      {"kind:photo,video", {"film.mkv", "img_2024.jpg", "paris.png"}},
+      {"is:hidden", {".hidden"}},
+      {"duration:3m..5m", {"song.mp3"}},
+      {"year:1990..1999", {"song.mp3"}},
+      {"bitrate:>=320K", {"song.mp3"}},
+      {"taken:2024-01-05", {"img_2024.jpg", "paris.png"}},
+      {"near:52.5163,13.3777,2km", {"img_2024.jpg"}},
+      {"near:48.8584,2.2945,500m", {"paris.png"}},
+      {"has:artist -has:album", {"song.mp3"}},
+  };
+  const Names examples = Examples();
+  const std::set<std::string> known(examples.begin(), examples.end());
+  for (const auto& [example, names] : found) {
+    EXPECT_TRUE(known.contains(example)) << example;
+    EXPECT_EQ(Sorted(example), names) << example;
+  }
+}
+
+TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
+  for (const char* text : {"-draft", "OR a"}) {
+    EXPECT_TRUE(Hits(text)[0].starts_with("error: ")) << text;
+  }
+  EXPECT_EQ(Hits("kind:document -draft"), Names());
+  EXPECT_EQ(Hits("12:30"), Names());
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,38 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Questions to one share whose files and contents a test makes up.
+#pragma once
+
+#include <map>
+#include <string>
+#include <vector>
+
+#include "index/search.h"
+#include "tests/unit/index/contents_fixture.h"
+
+namespace fileindexd {
+
+class QuestionTest : public ContentsTest {
+ protected:
+  // Files of the share's folder with these contents, read. `bytes`: what lies on the disk.
+  void Store(const std::map<std::string, Content>& files);
+  void StoreOne(const std::string& name, const Content& content, const std::string& bytes);
+  void Empty(const Names& names);  // added, nothing read
+
+  // Relative paths of the hits, in order; "error: " and the reason when it was refused.
+  Names Hits(const std::string& text);
+  Names Sorted(const std::string& text);  // the same, by name
+  std::string Suggested(const std::string& text);
+  // Bytes of the hits' names that are marked, joined by '|'.
+  std::string Marked(const std::string& text);
+  // "part: where" of each reason, "-part" where it does not match.
+  Names Reasons(const std::string& name, const std::string& text);
+
+  Question question;
+  Answer answer;
+  Explanation explanation;
+};
+
+Content Tagged(ContentField field, const std::string& text);
+Content Numbered(const std::vector<NumberField>& numbers, Kind kind = Kind::OTHER);
+
+}  // namespace fileindexd
