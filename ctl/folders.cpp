@@ -132,9 +132,9 @@ bool IsKeptOutWithout(const Settings& settings, const IndexedFolder& folder) {
 
 // The daemon's hands are off the share: what was known of its files goes.
 int DiscardIndex(Session& session, const std::string& share) {
-  const std::string targets[] = {QueuePath(share), DrainedPath(share), IndexPath(share),
-                                 DamagedIndexPath(share), ContentsPath(share),
-                                 DamagedContentsPath(share)};
+  const std::string targets[] = {QueuePath(share),    DrainedPath(share),
+                                 IndexPath(share),    DamagedIndexPath(share),
+                                 ContentsPath(share), DamagedContentsPath(share)};
   for (const std::string& target : targets) {
     std::error_code error;
     (void)std::filesystem::remove_all(target, error);

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "tests/unit/index/contents_fixture.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
+
 #include "index/contents_schema.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
@@ -76,6 +79,18 @@ void ContentsTest::File(const std::string& name, const std::string& bytes) {
   Add(name);
   Commit();
   TakeIn();
+}
+
+void ContentsTest::OldFile(const std::string& name, time_t mtime, const std::string& bytes) {
+  WriteFile(At(name), bytes);
+  SetTime(At(name), mtime);
+  Add(name);
+  Commit();
+}
+
+void ContentsTest::SetTime(const std::string& path, time_t mtime) {
+  const timespec times[2] = {{mtime, 0}, {mtime, 0}};
+  ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
 }
 
 void ContentsTest::Finish(const std::string& name, const std::string& text) {

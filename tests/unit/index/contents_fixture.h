@@ -2,6 +2,7 @@
 // A share "s" whose contents are all wanted, and a writer of them.
 #pragma once
 
+#include <ctime>
 #include <map>
 #include <memory>
 #include <string>
@@ -25,6 +26,9 @@ class ContentsTest : public IndexTest {
   ContentJob JobOf(const std::string& name);  // of what was handed out
   // Puts a file there, adds it to the entries, and takes it in.
   void File(const std::string& name, const std::string& bytes = "bytes");
+  // The same but for taking it in, old enough that nothing else has that time.
+  void OldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes");
+  static void SetTime(const std::string& path, time_t mtime);
   void Finish(const std::string& name, const std::string& text);
   // Hands out all that waits, and finishes each with its own name as its text.
   Names Read();
