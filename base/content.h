@@ -53,10 +53,10 @@ constexpr ContentField FIRST_NUMBER_FIELD = ContentField::PAGES;
 constexpr bool IsNumberField(ContentField field) {
   return field >= FIRST_NUMBER_FIELD;
 }
-constexpr size_t TEXT_FIELDS = 18;  // numbered from 1
+constexpr size_t TEXT_FIELD_COUNT = 18;  // numbered from 1
 // A field that this build knows.
 constexpr bool IsContentField(uint8_t number) {
-  return (number >= 1 && number <= TEXT_FIELDS) || (number >= 64 && number <= 77);
+  return (number >= 1 && number <= TEXT_FIELD_COUNT) || (number >= 64 && number <= 77);
 }
 
 struct TextField {

@@ -129,7 +129,7 @@ const WordLeaf* Asked::LeafOf(const QueryNode& node) const {
 }
 
 std::string TextQueryOf(const QueryNode& node) {
-  const std::string query =
+  std::string query =
       TextQuery(node.is_beginning && !node.text.ends_with('*') ? node.text + "*" : node.text);
   switch (node.scope) {
     case Scope::ANY:

@@ -14,7 +14,7 @@ namespace fileindexd {
 namespace {
 
 constexpr int TITLE_COLUMN = 0;
-constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELDS);
+constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
 
 void WordHits(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {

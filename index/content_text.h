@@ -19,7 +19,7 @@ namespace fileindexd {
 // What goes into the columns of the full-text table. Depends on nothing but what is packed:
 // deleting gives the same words again.
 struct ContentWords {
-  std::array<std::string_view, TEXT_FIELDS> fields;  // by number, from 1; the content's own
+  std::array<std::string_view, TEXT_FIELD_COUNT> fields;  // by number, from 1; the content's own
   std::string_view text;
   std::string numbers;  // those that people look for as words
 

@@ -44,7 +44,7 @@ int ContentsTable::PrepareTexts() {
 
 int ContentsTable::PrepareWords() {
   std::string values = "?1";
-  for (size_t i = 0; i <= TEXT_FIELDS + 1; ++i) {
+  for (size_t i = 0; i <= TEXT_FIELD_COUNT + 1; ++i) {
     values += ", ?" + std::to_string(i + 2);
   }
   const std::string columns = std::string("rowid, ") + WORD_COLUMNS + ") VALUES(";

@@ -134,9 +134,9 @@ class Explainer {
     Statement match;
     code = match.Prepare(share.reader.database.db,
                          "SELECT 1 FROM contents.words WHERE words MATCH ?1 AND rowid = ?2");
-    for (size_t number = 1; number <= TEXT_FIELDS + 1 && code == SQLITE_OK; ++number) {
+    for (size_t number = 1; number <= TEXT_FIELD_COUNT + 1 && code == SQLITE_OK; ++number) {
       QueryNode in_field = node;
-      in_field.scope = number > TEXT_FIELDS ? Scope::TEXT : Scope::FIELD;
+      in_field.scope = number > TEXT_FIELD_COUNT ? Scope::TEXT : Scope::FIELD;
       in_field.field = static_cast<ContentField>(number);
       const bool is_asked =
           node.scope == Scope::ANY || (node.scope == in_field.scope &&
@@ -150,7 +150,7 @@ class Explainer {
       code = match.Step();
       if (code == SQLITE_ROW) {
         where += where.empty() ? "" : ", ";
-        where += number > TEXT_FIELDS ? "text" : FieldName(in_field.field);
+        where += number > TEXT_FIELD_COUNT ? "text" : FieldName(in_field.field);
       }
       code = code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
       match.Reset();

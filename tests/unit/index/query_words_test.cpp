@@ -20,6 +20,9 @@ TEST_F(QueryWordsTest, OperatorsCombineNamesAndContents) {
   EXPECT_EQ(Sorted("whale shark OR name:blue nothing"), Names({"blue green.txt", "green.txt"}));
   EXPECT_EQ(Sorted("blue NOT NOT whale"), Names({"blue.txt"}));
   EXPECT_EQ(Sorted("shark -blue -whale"), Names({"red.txt"}));
+  EXPECT_EQ(Sorted("name:blue -name:green"), Names({"blue.txt"}));
+  EXPECT_EQ(Sorted("name:blue -name:*gre*"), Names({"blue.txt"}));
+  EXPECT_EQ(Sorted("name:txt -ext:txt"), Names());
 }
 
 TEST_F(QueryWordsTest, PhrasesStandInARow) {
