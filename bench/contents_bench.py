@@ -21,7 +21,7 @@ import time
 
 import contents_corpus
 import slow_document
-from machine import Log, Machine, look_until, row, wait
+from machine import Log, Machine, has_tracker, look_until, row, wait
 
 DIVISOR = int(sys.argv[1])
 PROGRAMS = sys.argv[2]
@@ -33,7 +33,6 @@ SLOW_SECONDS = 30 if DIVISOR < 10 else 3
 SHORT_REST = 0.001  # seconds between two looks
 LONG_REST = 0.05    # where a whole tree is waited for: looks take time from others
 MANUALS = contents_corpus.SUFFIXES["manual"]
-TRACKER = "/usr/libexec/tracker-miner-fs-3"
 TRACKER_EXTRACT = "/usr/libexec/tracker-extract-3"  # which the session's bus starts
 DONE = 1  # a file's state
 
@@ -200,7 +199,7 @@ def first_index(folder):
     peers = {"ours": lambda place: ours(place, tree, files), "pool": lambda place: pool(tree)}
     if shutil.which("recollindex"):
         peers["recoll"] = lambda place: recoll(place, tree, files)
-    if shutil.which("dbus-run-session") and os.path.exists(TRACKER):
+    if has_tracker(folder):
         peers["tracker"] = lambda place: tracker(place, tree, documents)
     results = {name: [] for name in peers}
     for number in range(ROUNDS):

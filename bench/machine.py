@@ -7,12 +7,14 @@ Where there are events to wait for, that is what is done.
 import ctypes
 import os
 import select
+import shutil
 import signal
 import socket
 import sqlite3
 import subprocess
 import time
 
+TRACKER = "/usr/libexec/tracker-miner-fs-3"
 LIMIT = 600.0
 
 libc = ctypes.CDLL(None, use_errno=True)
@@ -47,6 +49,15 @@ def look_until(condition, between):
         if time.monotonic() > deadline:
             raise TimeoutError
         time.sleep(between)
+
+
+def has_tracker(folder):
+    """Whether tracker-miner-fs is installed, and would look at that folder."""
+    return (
+        shutil.which("dbus-run-session") is not None
+        and os.path.exists(TRACKER)
+        and not os.path.realpath(folder).startswith("/tmp/")
+    )
 
 
 class Log:

@@ -15,7 +15,7 @@ import sys
 import tempfile
 import time
 
-from machine import Log, Machine, row, wait
+from machine import Log, Machine, has_tracker, row, wait
 
 DIVISOR = int(sys.argv[1])
 BIN = sys.argv[2]
@@ -54,8 +54,8 @@ def one_new_file(machine):
 
 
 def tracker(machine):
-    """The times of tracker-miner-fs for the same; none where it is not installed."""
-    if not shutil.which("dbus-run-session") or not os.path.exists("/usr/libexec/tracker-miner-fs-3"):
+    """The times of tracker-miner-fs for the same; none where it cannot tell any."""
+    if not has_tracker(machine.spare):
         return []
     folder = f"{machine.spare}/tracker"
     os.makedirs(folder)

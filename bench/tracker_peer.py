@@ -17,7 +17,7 @@ import sys
 import time
 from urllib.parse import quote
 
-from machine import look_until, wait
+from machine import TRACKER, look_until, wait
 
 FOLDER = os.path.realpath(sys.argv[1])
 HOME = f"{FOLDER}/home"
@@ -50,7 +50,7 @@ def miner(tree):
     ):
         subprocess.run(["gsettings", "set", SCHEMA, key, value], env=env, check=True)
     process = subprocess.Popen(
-        ["/usr/libexec/tracker-miner-fs-3"], env=env,
+        [TRACKER], env=env,
         stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL,
     )
     try:
