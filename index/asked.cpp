@@ -5,8 +5,7 @@
 #include <utility>
 
 #include "index/contents_schema.h"
-#include "index/name_text.h"
-#include "index/name_tokens.h"
+#include "index/name_marker.h"
 #include "index/search.h"
 #include "index/text_tokenizer.h"
 #include "state/layout.h"
@@ -87,7 +86,9 @@ void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& to
   if (node.scope == Scope::ANY || node.scope == Scope::NAME) {
     const std::string words = folder.Words(node.text);
     leaf.tokens = tokenizer.Tokens(words);
-    leaf.names_query = Quoted(words) + (node.is_beginning ? " *" : "");
+    leaf.names_query = node.part == Part::EXACT_NAME
+                           ? Quoted(words + " " + NAME_END)
+                           : Quoted(words) + (node.is_beginning ? " *" : "");
   }
   if (node.part == Part::WORD) {
     leaf.text_query = TextQueryOf(node);
@@ -97,7 +98,7 @@ void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& to
 
 }  // namespace
 
-bool Asked::Read(const Question& question, std::string& error) {
+bool Asked::Read(const Question& question, NameMarker& names, std::string& error) {
   if (!question.under.empty() && NormalPath(question.under) != question.under) {
     error = "not a plain absolute path: " + question.under;
     return false;
@@ -108,14 +109,12 @@ bool Asked::Read(const Question& question, std::string& error) {
     error = wrong.Line(text);
     return false;
   }
-  NameTokenizer tokenizer;
-  if (!tokenizer.Open()) {
+  if (!names.Open()) {
     error = "out of memory";
     return false;
   }
   AddOptions(question, text.size(), tree);
-  NameFolder folder;
-  ReadLeaves(tree, true, tokenizer, folder, *this);
+  ReadLeaves(tree, true, names.tokenizer, names.folder, *this);
   return true;
 }
 

@@ -12,6 +12,7 @@
 
 namespace fileindexd {
 
+class NameMarker;
 struct Question;
 
 // A leaf that is looked up by its words or by pieces of names.
@@ -32,7 +33,7 @@ class Asked {
   Asked& operator=(const Asked&) = delete;
 
   // False when the question makes no sense, and `error` then says why, in one line.
-  bool Read(const Question& question, std::string& error);
+  bool Read(const Question& question, NameMarker& names, std::string& error);
   const WordLeaf* LeafOf(const QueryNode& node) const;  // null: none
 
   std::string text;  // valid UTF-8

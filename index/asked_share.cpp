@@ -45,8 +45,35 @@ void AskedShare::Fail(const std::string& what) {
   failures.push_back("share " + name + ": " + what);
 }
 
+// A database that was made anew, or contents that have come since, are opened.
+bool AskedShare::IsInPlace() const {
+  int moved = 0;
+  return reader.database.IsOpen() && !reader.database.HasMoved() && has_contents &&
+         sqlite3_file_control(reader.database.db, "contents", SQLITE_FCNTL_HAS_MOVED, &moved) ==
+             SQLITE_OK &&
+         moved == 0;
+}
+
+void AskedShare::Release() {
+  run.reset();
+  hits.clear();
+  failures.clear();
+  total = 0;
+  if (reader.database.IsOpen() && sqlite3_get_autocommit(reader.database.db) == 0) {
+    (void)sqlite3_exec(reader.database.db, "ROLLBACK", nullptr, nullptr, nullptr);  // only read
+  }
+}
+
 IndexError AskedShare::Open(bool with_contents) {
   run.reset();
+  if (with_contents && IsInPlace() && sqlite3_get_autocommit(reader.database.db) != 0 &&
+      Begin(reader.database.db, true) == SQLITE_OK) {
+    return IndexError::NONE;
+  }
+  return OpenAnew(with_contents);
+}
+
+IndexError AskedShare::OpenAnew(bool with_contents) {
   has_contents = false;
   IndexError error = reader.Open(name);
   for (int i = 0; i < MAKING_TRIES && error == IndexError::PATH_NOT_FOUND; ++i) {
@@ -76,7 +103,7 @@ int AskedShare::RunOnce(const Question& question, const Asked& asked, const HitO
                         uint64_t wanted) {
   BestHits best(wanted, order);
   total = 0;
-  run = std::make_unique<ShareRun>(reader.database.db, has_contents, question, asked, name);
+  run = std::make_unique<ShareRun>(reader.database.db, has_contents, question, asked, name, names);
   const int code = run->Run(best, total);
   best.Cut();
   hits = std::move(best.hits);

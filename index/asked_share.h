@@ -20,8 +20,11 @@ class AskedShare {
  public:
   explicit AskedShare(std::string share_name) : name(std::move(share_name)) {}
 
-  // Opens what there is and sees one state of it from then on. NONE, or why not.
+  // Opens what there is, or stays with what is open and still in its place, and sees one state of
+  // it until Release. NONE, or why not.
   IndexError Open(bool with_contents);
+  // Lets go of that state, so that the writer's log can be cut; what is open stays.
+  void Release();
 
   // Opens, and asks. A database that was replaced meanwhile, or is just being made, is opened anew.
   // Never throws; what went wrong is in `failures`.
@@ -35,7 +38,7 @@ class AskedShare {
   EntryReader reader;
   bool has_contents = false;
   IndexError contents_error = IndexError::NONE;
-  std::unique_ptr<ShareRun> run;  // goes before the connection
+  std::unique_ptr<ShareRun> run;  // of the last question; goes before the connection
   std::vector<Hit> hits;          // in order
   uint64_t total = 0;
   std::vector<std::string> failures;
@@ -44,7 +47,11 @@ class AskedShare {
   int RunOnce(const Question& question, const Asked& asked, const HitOrder& order, uint64_t wanted);
   void AskTries(const Question& question, const Asked& asked, const HitOrder& order,
                 uint64_t wanted);
+  IndexError OpenAnew(bool with_contents);
+  bool IsInPlace() const;
   void Fail(const std::string& what);
+
+  NameMarker names;
 
   std::chrono::steady_clock::time_point deadline = std::chrono::steady_clock::time_point::max();
 };

@@ -7,6 +7,7 @@
 
 #include "index/asked_share.h"
 #include "index/kind.h"
+#include "index/name_marker.h"
 #include "index/query_fields.h"
 #include "index/row_check.h"
 #include "index/search.h"
@@ -57,7 +58,7 @@ class Explainer {
       : share(of_share),
         asked(in_question),
         rows(of_share.reader.database.db, of_share.has_contents),
-        sets(of_share.reader.database.db, of_share.has_contents, in_question),
+        sets(of_share.reader.database.db, of_share.has_contents, in_question, of_share.name),
         check(rows, sets) {}
 
   int Run(const Entry& entry, Explanation& explanation) {
@@ -198,7 +199,8 @@ IndexError ExplainIn(AskedShare& share, const Asked& asked, const std::string& p
 IndexError Explain(const Question& question, const std::string& path, Explanation& explanation,
                    std::string& error) {
   Asked asked;
-  if (!asked.Read(question, error)) {
+  NameMarker names;
+  if (!asked.Read(question, names, error)) {
     return IndexError::OTHER;
   }
   if (question.shares.empty()) {

@@ -81,10 +81,6 @@ std::vector<Snippet::Mark> Joined(std::vector<Snippet::Mark> marks) {
 
 }  // namespace
 
-bool NameMarker::Open() {
-  return tokenizer.Open();
-}
-
 std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& path,
                                        NameMarker& marker) {
   const std::string_view name = LastComponent(path);

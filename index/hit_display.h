@@ -7,21 +7,12 @@
 
 #include "index/asked.h"
 #include "index/candidate.h"
-#include "index/name_tokens.h"
+#include "index/name_marker.h"
 #include "index/snippet.h"
 
 namespace fileindexd {
 
 class TextCutter;
-
-// What names are cut with. One thread.
-class NameMarker {
- public:
-  bool Open();  // false when memory ran out
-
-  NameTokenizer tokenizer;
-  NameFolder folder;
-};
 
 // Bytes of the path, in its last component, that answer the question; in order, none in another.
 std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& path,

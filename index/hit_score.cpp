@@ -14,7 +14,9 @@ namespace fileindexd {
 namespace {
 
 constexpr double FIRST_NAME_SCORE = 1;
-// Ranks of a name; what is covered of it adds less than one.
+// Ranks of a name; what is covered of it, and how rare the words are, add less than one together.
+constexpr double COVER = 0.6;
+constexpr double RARITY = 0.39;
 constexpr double WHOLE_NAME = 3;
 constexpr double WHOLE_STEM = 2;  // but for the ending
 constexpr double AT_START = 1;
@@ -44,7 +46,7 @@ double Covered(const std::vector<std::string>& name, const std::vector<Token>& t
     covered += best;
     all += word.size();
   }
-  return all == 0 ? 0 : static_cast<double>(covered) / static_cast<double>(all + 1);
+  return all == 0 ? 0 : COVER * static_cast<double>(covered) / static_cast<double>(all + 1);
 }
 
 bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& tokens) {
@@ -52,25 +54,28 @@ bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& toke
                     [](const std::string& word, const Token& token) { return word == token.text; });
 }
 
-// A long text holds a word more often by chance.
+// Title above other fields above text. A long text holds a word more often by chance.
 double ScoreOfPlaces(const WordPlaces& found, double length) {
   constexpr double USUAL_LENGTH = 8192;
-  const double hits = 4.0 * found.title + 2.0 * found.fields + found.text;
-  return hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
+  const double hits = found.title + found.fields + found.text;
+  const double often = hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
+  return found.title > 0    ? 0.75 + 0.25 * often
+         : found.fields > 0 ? 0.5 + 0.25 * often
+                            : 0.5 * often;
 }
 
 double Youth(const Entry& entry) {
   const double years =
       std::max(0.0, (static_cast<double>(time(nullptr)) - static_cast<double>(entry.mtime) / 1e9) /
                         (365.0 * 86400));
-  return 0.9 + 0.1 / (1 + years);
+  return 0.98 + 0.02 / (1 + years);
 }
 
 }  // namespace
 
 HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of_check,
-                   const Asked& in_question)
-    : rows(of_rows), sets(of_sets), check(of_check), asked(in_question) {
+                   const Asked& in_question, NameMarker& of_names)
+    : rows(of_rows), sets(of_sets), check(of_check), asked(in_question), names(of_names) {
   for (const WordLeaf& leaf : asked.leaves) {
     if (leaf.is_positive && !leaf.text_query.empty()) {
       places_query += (places_query.empty() ? "(" : " OR (") + leaf.text_query + ")";
@@ -79,8 +84,9 @@ HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of
   }
 }
 
-bool HitScore::Open() {
-  return tokenizer.Open();
+// A rare word says more.
+double HitScore::WeightOf(const WordLeaf& leaf) const {
+  return 1 / std::log2(2 + static_cast<double>(sets.Of(*leaf.node).Count()));
 }
 
 // The parts that say what to find, as far as this entry has them.
@@ -110,8 +116,17 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
   if (code != SQLITE_OK || found.empty()) {
     return code;
   }
+  if (all_weights == 0) {
+    for (const WordLeaf& leaf : asked.leaves) {
+      all_weights += leaf.is_positive ? WeightOf(leaf) : 0;
+    }
+  }
   if (std::all_of(found.begin(), found.end(), [](const Found& part) { return part.in_name; })) {
-    score = FIRST_NAME_SCORE + NameScore(candidate, found);
+    double weights = 0;
+    for (const Found& part : found) {
+      weights += WeightOf(*part.leaf);
+    }
+    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weights / all_weights;
     return SQLITE_OK;
   }
   text = candidate.facts->text;
@@ -128,7 +143,7 @@ double HitScore::PieceScore(Candidate& candidate, const std::vector<Found>& foun
       return WHOLE_NAME;
     }
     for (const std::string& piece : part.leaf->node->pieces) {
-      const std::string folded = folder.Parts(piece);
+      const std::string folded = names.folder.Parts(piece);
       covered += folded.size();
       rank = std::max(rank, name == folded ? WHOLE_NAME : name.starts_with(folded) ? AT_START : 0);
     }
@@ -151,8 +166,8 @@ double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found
     return PieceScore(candidate, found);
   }
 
-  const std::string name = folder.Words(ToUtf8(LastComponent(candidate.entry.path)));
-  const std::vector<std::string> words = tokenizer.Tokens(name);
+  const std::string name = names.folder.Words(ToUtf8(LastComponent(candidate.entry.path)));
+  const std::vector<std::string> words = names.tokenizer.Tokens(name);
   const double covered = Covered(words, tokens);
   if (IsSame(words, tokens)) {
     return WHOLE_NAME + covered;
@@ -165,7 +180,7 @@ double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found
     return covered;
   }
   const bool has_stem = candidate.entry.kind != Kind::FOLDER;
-  const bool is_stem = has_stem && IsSame(tokenizer.Tokens(StemOf(name)), tokens);
+  const bool is_stem = has_stem && IsSame(names.tokenizer.Tokens(StemOf(name)), tokens);
   return (is_stem ? WHOLE_STEM : AT_START) + covered;
 }
 
@@ -197,12 +212,13 @@ int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found
   double sum = 0;
   for (const Found& part : found) {
     const auto place = std::find(places.begin(), places.end(), part.leaf);
-    sum += part.in_name || place == places.end()
-               ? 1
-               : ScoreOfPlaces(counted[static_cast<size_t>(place - places.begin())],
-                               static_cast<double>(candidate.facts->length));
+    sum += WeightOf(*part.leaf) *
+           (part.in_name || place == places.end()
+                ? 1
+                : ScoreOfPlaces(counted[static_cast<size_t>(place - places.begin())],
+                                static_cast<double>(candidate.facts->length)));
   }
-  score = 0.5 + 0.5 * (sum / static_cast<double>(found.size())) * Youth(candidate.entry);
+  score = 0.5 + 0.5 * (sum / all_weights) * Youth(candidate.entry);
   return SQLITE_OK;
 }
 

@@ -20,6 +20,8 @@ enum class Part : uint8_t {
   WORD,          // one word or several in a row
   NAME_PATTERN,  // of the whole name, with gaps
   EXACT_NAME,
+  PATH,     // pieces of the whole path, with gaps
+  SHARE,    // one of several
   RANGE,    // of a number that the entry or its content has
   NEAR,     // by where a photo was taken
   KIND,     // one of several
@@ -49,7 +51,7 @@ enum class Column : uint8_t {
 
 enum class Property : uint8_t { FILE, FOLDER, LINK, EMPTY, HIDDEN, DUPLICATE };
 enum class ContentStage : uint8_t { WAITING, DONE, FAILED };
-enum class Presence : uint8_t { TEXT, LOCATION, FIELD };
+enum class Presence : uint8_t { CONTENT, TEXT, LOCATION, FIELD };
 
 // Only the members of its part count.
 struct QueryNode {
@@ -64,7 +66,7 @@ struct QueryNode {
   bool is_phrase = false;
   bool is_beginning = false;                 // the last word may go on
   ContentField field = ContentField::TITLE;  // also of RANGE and HAS
-  // NAME_PATTERN: the pieces follow each other; not anchored: anything may stand there
+  // NAME_PATTERN, PATH: the pieces follow each other; not anchored: anything may stand there
   std::vector<std::string> pieces;
   bool at_start = false;
   bool at_end = false;
@@ -77,7 +79,7 @@ struct QueryNode {
   double longitude = 0;
   double radius = 0;  // metres
 
-  std::vector<std::string> names;  // EXT in lower case; UNDER: one normal path
+  std::vector<std::string> names;  // EXT, SHARE; UNDER: one normal path
   std::vector<int64_t> numbers;    // KIND, OWNER
   Property property = Property::FILE;
   ContentStage stage = ContentStage::DONE;

@@ -20,6 +20,8 @@ constexpr NamedField FIELDS[] = {
     {"near", F::NEAR, {}},
     {"kind", F::KIND, {}},
     {"ext", F::EXT, {}},
+    {"path", F::PATH, {}},
+    {"share", F::SHARE, {}},
     {"owner", F::OWNER, {}},
     {"under", F::UNDER, {}},
     {"is", F::IS, {}},

@@ -20,6 +20,8 @@ enum class QueryField : uint8_t {
   NEAR,
   KIND,
   EXT,
+  PATH,
+  SHARE,
   OWNER,
   UNDER,
   IS,

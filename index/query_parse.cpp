@@ -8,12 +8,14 @@
 //   words     = '"' { character } '"' [ "*" ] | word
 //   word      = characters up to a blank, or up to a ")" that closes a group; "*" at its end:
 //               what begins with it
-//   value     = [ "=" ] words | pattern                of name
+//   value     = word | pattern | '"' whole name '"'     of name
+//             | pattern                                of path
 //             | words                                  of text and of the text fields
 //             | range | circle                         see query_values.h
-//             | name { "," name }                      of kind, ext, owner
+//             | name { "," name }                      of kind, ext, owner, share
 //             | path | property | presence | stage     of under, is, has, content
-//   pattern   = word with "*" anywhere but at its end alone
+//   pattern   = word or quoted text, with "*" for anything; in name: anywhere but at a word's end
+//               alone
 //
 // AND, OR and NOT count in capitals only; alone they are words. What stands before a colon and is
 // no field belongs to the word. A word without a letter or a digit ("++") is looked for as it
@@ -275,9 +277,6 @@ bool Parser::ReadLeaf(QueryNode& node) {
   const size_t start = at;
   const NamedField* field = TakeField();
   Value value;
-  value.is_exact =
-      field != nullptr && field->field == QueryField::NAME && at < text.size() && text[at] == '=';
-  at += value.is_exact ? 1 : 0;
   if (at < text.size() && text[at] == '"') {
     if (!ReadQuoted(value)) {
       return false;

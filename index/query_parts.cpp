@@ -67,32 +67,40 @@ bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
 }
 
 // "*part*", "*.pdf", "a*b".
-bool FillPattern(const Value& value, QueryNode& node, QueryError& error) {
-  node.part = Part::NAME_PATTERN;
-  node.at_start = value.text.front() != '*';
-  node.at_end = value.text.back() != '*';
+bool FillPattern(const Value& value, Part part, QueryNode& node, QueryError& error) {
+  node.part = part;
   for (std::string& piece : SplitAt(value.text, '*')) {
     if (!piece.empty()) {
       node.pieces.push_back(std::move(piece));
     }
   }
   return !node.pieces.empty() ||
-         Fail(error, "'*' alone stands for every name; add a part of it, as in name:*part*",
-              value.at);
+         Fail(error, "'*' alone stands for everything; add a part, as in name:*part*", value.at);
 }
 
+// In quotes it is the whole name, but for what a '*' stands for.
 bool FillName(const Value& value, QueryNode& node, QueryError& error) {
-  if (value.is_exact) {
+  const size_t star = value.text.find('*');
+  const bool is_beginning = !value.is_quoted && star + 1 == value.text.size();
+  if ((star != std::string::npos && !is_beginning) || value.has_star) {
+    node.at_start = value.text.front() != '*';
+    node.at_end = value.text.back() != '*' && !value.has_star;
+    return FillPattern(value, Part::NAME_PATTERN, node, error);
+  }
+  if (value.is_quoted) {
     node.part = Part::EXACT_NAME;
     node.text = value.text;
     return true;
   }
-  const size_t star = value.is_quoted ? std::string::npos : value.text.find('*');
-  if (star != std::string::npos && star + 1 < value.text.size()) {
-    return FillPattern(value, node, error);
-  }
   node.scope = Scope::NAME;
   return FillWords(value, node, error);
+}
+
+bool FillShare(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::SHARE;
+  node.names = SplitAt(value.text, ',');
+  return std::all_of(node.names.begin(), node.names.end(), IsValidShareName) ||
+         Fail(error, "'" + value.text + "' is no name of a share", value.at);
 }
 
 bool FillRange(Column column, const Value& value, time_t now, QueryNode& node, QueryError& error) {
@@ -201,14 +209,19 @@ bool FillIs(const Value& value, QueryNode& node, QueryError& error) {
 
 bool FillHas(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::HAS;
-  if (IsSame(value.text, "text") || IsSame(value.text, "location")) {
-    node.presence = IsSame(value.text, "text") ? Presence::TEXT : Presence::LOCATION;
+  constexpr const char* NAMES[] = {"content", "text", "location"};
+  const auto* const name = std::find_if(std::begin(NAMES), std::end(NAMES), [&](const char* known) {
+    return IsSame(value.text, known);
+  });
+  if (name != std::end(NAMES)) {
+    node.presence = static_cast<Presence>(name - std::begin(NAMES));
     return true;
   }
   const NamedField* field = FindField(value.text);
   if (field == nullptr ||
       (field->field != QueryField::TEXT_FIELD && field->field != QueryField::NUMBER_FIELD)) {
-    return Fail(error, "has: knows text, location and the fields of contents, as in has:title",
+    return Fail(error,
+                "has: knows content, text, location and the fields of contents, as in has:title",
                 value.at);
   }
   node.presence = Presence::FIELD;
@@ -278,6 +291,10 @@ bool FillField(const NamedField& field, const Value& value, time_t now, QueryNod
       return FillKind(value, node, error);
     case QueryField::EXT:
       return FillExt(value, node, error);
+    case QueryField::PATH:
+      return FillPattern(value, Part::PATH, node, error);
+    case QueryField::SHARE:
+      return FillShare(value, node, error);
     case QueryField::OWNER:
       return FillOwner(value, node, error);
     case QueryField::UNDER:

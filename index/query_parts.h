@@ -16,7 +16,6 @@ struct Value {
   size_t at = 0;     // byte of the question
   bool is_quoted = false;
   bool has_star = false;  // behind the quotes
-  bool is_exact = false;  // "=" in front
 };
 
 // Set all of the node but its place. False, and `error` says why.

@@ -37,8 +37,8 @@ std::string RangeText(const QueryNode& node) {
   return column + "[" + Bound(node.lowest) + ".." + Bound(node.highest) + "]";
 }
 
-std::string PatternText(const QueryNode& node) {
-  std::string text = node.at_start ? "name:" : "name:*";
+std::string PatternText(const char* field, const QueryNode& node) {
+  std::string text = std::string(field) + (node.at_start ? "" : "*");
   for (size_t i = 0; i < node.pieces.size(); ++i) {
     text += (i == 0 ? "" : "*") + node.pieces[i];
   }
@@ -80,9 +80,13 @@ std::string QueryText(const QueryNode& node) {
     case Part::WORD:
       return WordText(node);
     case Part::NAME_PATTERN:
-      return PatternText(node);
+      return PatternText("name:", node);
     case Part::EXACT_NAME:
-      return "name:=" + node.text;
+      return "name:\"" + node.text + "\"";
+    case Part::PATH:
+      return PatternText("path:", node);
+    case Part::SHARE:
+      return ListText("share", node);
     case Part::RANGE:
       return RangeText(node);
     case Part::NEAR:
@@ -99,7 +103,8 @@ std::string QueryText(const QueryNode& node) {
     case Part::IS:
       return std::string("is:") + PROPERTIES[static_cast<size_t>(node.property)];
     case Part::HAS:
-      return node.presence == Presence::TEXT       ? "has:text"
+      return node.presence == Presence::CONTENT    ? "has:content"
+             : node.presence == Presence::TEXT     ? "has:text"
              : node.presence == Presence::LOCATION ? "has:location"
                                                    : std::string("has:") + FieldName(node.field);
     case Part::CONTENT:

@@ -115,6 +115,12 @@ int RowCheck::MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& mat
     case Part::EXT:
       matches = MatchesEnding(node, candidate);
       return SQLITE_OK;
+    case Part::PATH:
+      matches = MatchesPath(node, candidate);
+      return SQLITE_OK;
+    case Part::SHARE:
+      matches = sets.Of(node).everything;
+      return SQLITE_OK;
     case Part::OWNER:
       matches = among(entry.owner);
       return SQLITE_OK;
@@ -137,6 +143,11 @@ int RowCheck::MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& mat
       matches = MatchesContent(node, candidate);
       return SQLITE_OK;
   }
+}
+
+bool RowCheck::MatchesPath(const QueryNode& node, const Candidate& candidate) {
+  const NamePattern& pattern = paths.try_emplace(&node, node).first->second;
+  return pattern.Fits(folder.Parts(ToUtf8(candidate.entry.path)));
 }
 
 bool RowCheck::MatchesEnding(const QueryNode& node, Candidate& candidate) {
@@ -180,8 +191,11 @@ bool RowCheck::MatchesContent(const QueryNode& node, const Candidate& candidate)
   if (facts == nullptr) {
     return false;
   }
-  if (node.presence == Presence::TEXT) {
-    return facts->text != 0;
+  if (node.presence == Presence::CONTENT || node.presence == Presence::TEXT) {
+    const bool has_number =
+        std::any_of(facts->numbers.begin(), facts->numbers.end(),
+                    [](const std::optional<int64_t>& number) { return number.has_value(); });
+    return facts->text != 0 || (node.presence == Presence::CONTENT && has_number);
   }
   if (node.presence == Presence::LOCATION) {
     return facts->Number(ContentField::LATITUDE).has_value() &&

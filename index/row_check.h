@@ -2,8 +2,12 @@
 // Whether one entry answers a question, part by part.
 #pragma once
 
+#include <map>
+#include <optional>
+
 #include "index/asked.h"
 #include "index/candidate.h"
+#include "index/name_pattern.h"
 #include "index/word_sets.h"
 
 namespace fileindexd {
@@ -21,6 +25,7 @@ class RowCheck {
  private:
   int MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& matches);
   int MatchesGroup(const QueryNode& node, Candidate& candidate, bool& matches);
+  bool MatchesPath(const QueryNode& node, const Candidate& candidate);
   bool MatchesEnding(const QueryNode& node, Candidate& candidate);
   static bool MatchesProperty(Property property, const Entry& entry);
   static bool MatchesContent(const QueryNode& node, const Candidate& candidate);
@@ -29,6 +34,7 @@ class RowCheck {
   CandidateRows& rows;
   const WordSets& sets;
   NameFolder folder;
+  std::map<const QueryNode*, NamePattern> paths;
 };
 
 // What a range is of; none: the entry has no such number.

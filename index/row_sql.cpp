@@ -106,7 +106,8 @@ std::optional<std::string> OfFile(const QueryNode& node) {
     case Part::NEAR:
       return NearSql(node);
     case Part::HAS:
-      return node.presence == Presence::TEXT       ? " AND files.text <> 0"
+      return node.presence == Presence::CONTENT    ? " AND files.state <> 0"
+             : node.presence == Presence::TEXT     ? " AND files.text <> 0"
              : node.presence == Presence::LOCATION ? " AND files.latitude IS NOT NULL"
              : IsNumberField(node.field)
                  ? " AND " + ColumnOf(node.field) + " IS NOT NULL"

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/search.h"
 
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <deque>
 #include <iterator>
@@ -12,6 +14,7 @@
 #include "index/asked.h"
 #include "index/asked_share.h"
 #include "index/suggestion.h"
+#include "state/layout.h"
 
 namespace fileindexd {
 
@@ -40,8 +43,51 @@ void AskShares(const Question& question, const Asked& asked, const HitOrder& ord
   }
 }
 
+// Names of shares in a question that are none: null, or the first of them.
+const QueryNode* UnknownShare(const QueryNode& node, const std::vector<std::string>& shares) {
+  for (const std::string& share :
+       node.part == Part::SHARE ? node.names : std::vector<std::string>()) {
+    struct stat status {};
+    const bool is_asked = std::find(shares.begin(), shares.end(), share) != shares.end();
+    if (!is_asked && stat(ShareFolder(share).c_str(), &status) != 0) {
+      return &node;
+    }
+  }
+  for (const QueryNode& below : node.below) {
+    const QueryNode* unknown = UnknownShare(below, shares);
+    if (unknown != nullptr) {
+      return unknown;
+    }
+  }
+  return nullptr;
+}
+
+}  // namespace
+
+struct Asker::Impl {
+  std::deque<AskedShare> shares;
+  NameMarker names;
+  bool AskAll(const Question& question, Answer& answer, std::string& error);
+  bool HasHits(Question question, const std::string& text);
+  void Choose(const Question& question);
+};
+
+// Shares that are not asked this time are closed.
+void Asker::Impl::Choose(const Question& question) {
+  const std::set<std::string> wanted(question.shares.begin(), question.shares.end());
+  const bool same = std::equal(
+      shares.begin(), shares.end(), wanted.begin(), wanted.end(),
+      [](const AskedShare& share, const std::string& name) { return share.name == name; });
+  if (!same) {
+    shares.clear();
+    for (const std::string& share : wanted) {
+      shares.emplace_back(share);
+    }
+  }
+}
+
 // A suggestion that has no hit either is none.
-bool HasHits(Question question, const std::string& text) {
+bool Asker::Impl::HasHits(Question question, const std::string& text) {
   question.text = text;
   question.offset = 0;
   question.limit = 1;
@@ -49,14 +95,17 @@ bool HasHits(Question question, const std::string& text) {
   question.suggests = false;
   Answer answer;
   std::string error;
-  return Ask(question, answer, error) && !answer.hits.empty();
+  return AskAll(question, answer, error) && !answer.hits.empty();
 }
 
-}  // namespace
-
-bool Ask(const Question& question, Answer& answer, std::string& error) {
+bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& error) {
   Asked asked;
-  if (!asked.Read(question, error)) {
+  if (!asked.Read(question, names, error)) {
+    return false;
+  }
+  const QueryNode* unknown = UnknownShare(asked.tree, question.shares);
+  if (unknown != nullptr) {
+    error = QueryError{"there is no such share", unknown->start}.Line(asked.text);
     return false;
   }
 
@@ -64,11 +113,7 @@ bool Ask(const Question& question, Answer& answer, std::string& error) {
   const uint64_t limit = std::min(question.limit, MOST_HITS);
   const uint64_t wanted = limit == 0 ? 0 : offset + limit;
   const HitOrder order = {question.sort, question.reverse};
-  std::deque<AskedShare> shares;
-  for (const std::string& share :
-       std::set<std::string>(question.shares.begin(), question.shares.end())) {
-    shares.emplace_back(share);
-  }
+  Choose(question);
   if (!shares.empty()) {
     AskShares(question, asked, order, wanted, shares);
   }
@@ -89,13 +134,28 @@ bool Ask(const Question& question, Answer& answer, std::string& error) {
   for (AskedShare& share : shares) {
     share.Complete(made.hits);
   }
-  if (made.total == 0 && question.suggests) {
-    made.suggestion = Suggest(asked, shares);
-    made.suggestion =
-        !made.suggestion.empty() && HasHits(question, made.suggestion) ? made.suggestion : "";
+  const bool suggests = made.total == 0 && question.suggests;
+  std::string suggestion = suggests ? Suggest(asked, shares) : "";
+  for (AskedShare& share : shares) {
+    share.Release();
+  }
+  if (!suggestion.empty() && HasHits(question, suggestion)) {
+    made.suggestion = std::move(suggestion);
   }
   answer = std::move(made);
   return true;
+}
+
+Asker::Asker() : impl(std::make_unique<Impl>()) {}
+
+Asker::~Asker() = default;
+
+bool Asker::Ask(const Question& question, Answer& answer, std::string& error) {
+  return impl->AskAll(question, answer, error);
+}
+
+bool Ask(const Question& question, Answer& answer, std::string& error) {
+  return Asker().Ask(question, answer, error);
 }
 
 }  // namespace fileindexd

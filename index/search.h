@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -52,6 +53,21 @@ struct Answer {
 // are asked side by side, each in one state of it; one that does not answer within 30 seconds is
 // among the failures.
 bool Ask(const Question& question, Answer& answer, std::string& error);
+
+// The same, and the shares of the last question stay open for the next. One thread.
+class Asker {
+ public:
+  Asker();
+  ~Asker();
+  Asker(const Asker&) = delete;
+  Asker& operator=(const Asker&) = delete;
+
+  bool Ask(const Question& question, Answer& answer, std::string& error);
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl;
+};
 
 // One part of a question, in its own words, and whether an entry answers it.
 struct Reason {

@@ -14,7 +14,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t BLOCK = 1000;  // names that are looked at before it is asked if that is enough
+constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
 constexpr size_t SCORED_TEXTS = 300;     // the same of texts
 constexpr uint64_t MOST_RANKED = 50000;  // names whose words are all compared
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
@@ -33,18 +33,19 @@ bool HasPositiveLeaf(const Asked& asked) {
 }  // namespace
 
 ShareRun::ShareRun(sqlite3* entries, bool with_contents, const Question& in_question,
-                   const Asked& as_asked, const std::string& in_share)
+                   const Asked& as_asked, const std::string& in_share, NameMarker& of_names)
     : question(in_question),
       asked(as_asked),
       share(in_share),
       wanted(WantedOf(in_question)),
       rows(entries, with_contents),
-      sets(entries, with_contents, as_asked),
+      sets(entries, with_contents, as_asked, in_share),
       check(rows, sets),
-      score(rows, sets, check, as_asked) {}
+      names(of_names),
+      score(rows, sets, check, as_asked, of_names) {}
 
 int ShareRun::Run(BestHits& best, uint64_t& total) {
-  if (!score.Open() || !marker.Open()) {
+  if (!names.Open()) {
     return SQLITE_NOMEM;
   }
   int code = sets.Read();
@@ -101,7 +102,7 @@ int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
   candidate.entry = hit.entry;
   int code = IsScored() ? SQLITE_OK : score.Score(candidate, hit.score, hit.text);
   code = code == SQLITE_OK ? rows.KindOf(candidate, hit.entry.kind) : code;
-  hit.marks = MarksInPath(asked, hit.entry.path, marker);
+  hit.marks = MarksInPath(asked, hit.entry.path, names);
   return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;
 }
 
@@ -117,7 +118,8 @@ std::string ShareRun::RankQuery(bool at_start) const {
   return query.empty() ? "" : query + ") AND " + Quoted(NAME_END);
 }
 
-// The best first, then the youngest rows. Of very many, those that begin with a word are enough.
+// The best first, then the youngest rows. Of very many, those that begin with a word are compared,
+// the youngest of them.
 int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   const uint64_t count = upper.names.Count();
   const std::string query =
@@ -127,8 +129,9 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
     return SQLITE_OK;
   }
   Statement rank;
-  int code =
-      rank.Prepare(rows.db, "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1");
+  int code = rank.Prepare(rows.db,
+                          "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1 "
+                          "ORDER BY rowid DESC LIMIT 100000");
   if (code != SQLITE_OK) {
     return code;
   }

@@ -24,7 +24,7 @@ class ShareRun {
  public:
   // All outlive it.
   ShareRun(sqlite3* entries, bool with_contents, const Question& in_question, const Asked& as_asked,
-           const std::string& in_share);
+           const std::string& in_share, NameMarker& of_names);
 
   // Adds to `best` and to `total`. SQLite's code.
   int Run(BestHits& best, uint64_t& total);
@@ -60,8 +60,8 @@ class ShareRun {
   CandidateRows rows;
   WordSets sets;
   RowCheck check;
+  NameMarker& names;
   HitScore score;
-  NameMarker marker;
   WordSet upper;
   IdSet lower;
   Statement entries_of;

@@ -30,6 +30,11 @@ int WordSets::Read() {
 }
 
 int WordSets::ReadAttributes(const QueryNode& node) {
+  if (node.part == Part::SHARE) {
+    WordSet& set = sets[&node];
+    set.is_sure = true;  // all of this share, or nothing
+    set.everything = std::find(node.names.begin(), node.names.end(), share) != node.names.end();
+  }
   int code = node.part == Part::EXT     ? ReadEndings(node)
              : node.part == Part::UNDER ? ReadUnder(node)
              : node.part == Part::RANGE ? ReadRange(node)
@@ -231,7 +236,8 @@ IdSet WordSets::Lower(const QueryNode& node) const {
     case Part::AND: {
       bool is_first = true;
       for (const QueryNode& below : node.below) {
-        if (below.part == Part::NOT) {
+        const bool says_nothing = below.part == Part::SHARE && Of(below).everything;
+        if (below.part == Part::NOT || says_nothing) {
           continue;
         }
         if (is_first) {

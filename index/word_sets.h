@@ -6,6 +6,7 @@
 #pragma once
 
 #include <cstdint>
+#include <string>
 #include <unordered_map>
 #include <vector>
 
@@ -26,8 +27,9 @@ struct WordSet {
 
 class WordSets {
  public:
-  WordSets(sqlite3* entries, bool with_contents, const Asked& in_question)
-      : db(entries), has_contents(with_contents), asked(in_question) {}
+  WordSets(sqlite3* entries, bool with_contents, const Asked& in_question,
+           const std::string& of_share)
+      : db(entries), has_contents(with_contents), asked(in_question), share(of_share) {}
 
   int Read();  // SQLite's code
 
@@ -52,6 +54,7 @@ class WordSets {
   sqlite3* db;
   bool has_contents;
   const Asked& asked;
+  std::string share;
   std::unordered_map<const QueryNode*, WordSet> sets;
   WordSet unknown = {.names = {}, .texts = {}, .everything = true, .is_sure = false};
   std::vector<uint32_t> hits;  // by text

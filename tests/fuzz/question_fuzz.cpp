@@ -53,7 +53,7 @@ class Index {
     question.text = text;
     Asked asked;
     std::string error;
-    if (!asked.Read(question, error)) {
+    if (!asked.Read(question, marker, error)) {
       Require(!error.empty() && error.find('\n') == std::string::npos, "a reason in one line");
       return;
     }
@@ -78,7 +78,7 @@ class Index {
   void Run(const Question& question, const Asked& asked) {
     BestHits best(10, {});
     uint64_t total = 0;
-    ShareRun run(database.db, false, question, asked, "s");
+    ShareRun run(database.db, false, question, asked, "s", marker);
     Require(run.Run(best, total) == SQLITE_OK, "no error");
     best.Cut();
     Require(best.hits.size() <= total, "hits are counted");
@@ -90,7 +90,7 @@ class Index {
     counted.limit = 0;
     BestHits none(0, {});
     uint64_t again = 0;
-    ShareRun count(database.db, false, counted, asked, "s");
+    ShareRun count(database.db, false, counted, asked, "s", marker);
     Require(count.Run(none, again) == SQLITE_OK, "no error");
     Require(again == total, "counting finds as many as looking");
   }

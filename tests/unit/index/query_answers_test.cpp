@@ -8,6 +8,7 @@
 #include "index/asked_share.h"
 #include "index/contents_schema.h"
 #include "index/entry_table.h"
+#include "index/name_marker.h"
 #include "index/suggestion.h"
 #include "state/layout.h"
 #include "tests/unit/index/question_fixture.h"
@@ -88,8 +89,9 @@ TEST_F(QueryAnswersTest, SlowShareIsGivenUp) {
   Fill("a", names);
   question.text = "name:*x*";
   Asked asked;
+  NameMarker marker;
   std::string error;
-  ASSERT_TRUE(asked.Read(question, error));
+  ASSERT_TRUE(asked.Read(question, marker, error));
   AskedShare share("a");
   share.patience = std::chrono::seconds(-1);
 
@@ -128,6 +130,51 @@ TEST_F(QueryAnswersTest, ManyHitsKeepTheirPages) {
     pages.insert(pages.end(), page.begin(), page.end());
   }
   EXPECT_EQ(pages, all);
+}
+
+TEST_F(QueryAnswersTest, SharesThatStayOpenShowWhatIsCommittedAndWhatIsMadeAnew) {
+  Store({{"whale.txt", TextContent("sea")}});
+  Asker asker;
+  question.shares = {"s"};
+  question.text = "whale OR sea";
+  std::string error;
+  ASSERT_TRUE(asker.Ask(question, answer, error)) << error;
+  EXPECT_EQ(answer.total, 1U);
+
+  Store({{"other.txt", TextContent("whale")}});
+  ASSERT_TRUE(asker.Ask(question, answer, error)) << error;
+  EXPECT_EQ(answer.total, 2U);
+  EXPECT_EQ(answer.hits[0].snippet.text, "sea");
+
+  contents.reset();
+  RemoveTree(ContentsPath("s"));
+  ASSERT_TRUE(asker.Ask(question, answer, error)) << error;
+  EXPECT_EQ(answer.total, 1U);
+  EXPECT_EQ(answer.failures, Names());
+  question.text = "(";
+  EXPECT_FALSE(asker.Ask(question, answer, error));
+  question.text = "whale";
+  question.shares = {"s", "none"};
+  ASSERT_TRUE(asker.Ask(question, answer, error)) << error;
+  EXPECT_EQ(answer.total, 1U);
+  EXPECT_EQ(answer.failures.size(), 1U);
+}
+
+TEST_F(QueryAnswersTest, SharesAreNamedInQuestions) {
+  Fill("a", {"x one"});
+  Fill("b", {"x two"});
+  question.shares = {"a", "b"};
+
+  EXPECT_EQ(Paths("x share:b"), Names({"/b/x two"}));
+  EXPECT_EQ(answer.total, 1U);
+  EXPECT_EQ(Paths("x -share:b"), Names({"/a/x one"}));
+  EXPECT_EQ(Paths("x share:a,b").size(), 2U);
+  EXPECT_EQ(Paths("share:a"), Names({"/a/x one"}));
+  EXPECT_EQ(Paths("two OR share:a").size(), 2U);
+  question.text = "x share:c";
+  std::string error;
+  EXPECT_FALSE(Ask(question, answer, error));
+  EXPECT_EQ(error, "there is no such share (character 3, at: share:c)");
 }
 
 TEST_F(QueryAnswersTest, SuggestionsAreWordsThatTheIndexHas) {
@@ -256,15 +303,16 @@ TEST_F(QueryAnswersTest, ShareThatLeavesInBetweenIsNoFailureOnceItWasOpen) {
   Fill("a", {"pair first"});
   question.text = "pair";
   Asked asked;
+  NameMarker marker;
   std::string error;
-  ASSERT_TRUE(asked.Read(question, error));
+  ASSERT_TRUE(asked.Read(question, marker, error));
   AskedShare share("a");
   ASSERT_EQ(share.Open(true), IndexError::NONE);
   RemoveTree(ShareFolder("a"));
 
   BestHits best(20, {});
   uint64_t total = 0;
-  ShareRun run(share.reader.database.db, share.has_contents, question, asked, "a");
+  ShareRun run(share.reader.database.db, share.has_contents, question, asked, "a", marker);
   EXPECT_EQ(run.Run(best, total), SQLITE_OK);
   EXPECT_EQ(total, 1U);
 }

@@ -62,6 +62,9 @@ TEST_F(QueryAttributesTest, KindsEndingsPlacesAndProperties) {
   EXPECT_EQ(Sorted("kind:photo,document -is:hidden"), Names({"d!x/c.jpg", "d/a.JPG", "d/b.pdf"}));
   EXPECT_EQ(Sorted("under:" + At("d")), Names({"d", "d/a.JPG", "d/b.pdf", "d/full.bin", "d/link"}));
   EXPECT_EQ(Sorted("jpg under:" + At("d")), Names({"d/a.JPG"}));
+  EXPECT_EQ(Sorted("path:D/B"), Names({"d/b.pdf"}));
+  EXPECT_EQ(Sorted("path:share*x/*jpg"), Names({"d!x/c.jpg"}));
+  EXPECT_EQ(Sorted("jpg path:!x"), Names({"d!x/c.jpg"}));
   EXPECT_EQ(Sorted("is:hidden"), Names({".hidden.jpg"}));
   EXPECT_EQ(Sorted("is:link"), Names({"d/link"}));
   EXPECT_EQ(Sorted("is:file -is:empty"), Names({"d/full.bin"}));
@@ -89,6 +92,7 @@ TEST_F(QueryAttributesTest, NumbersOfContentsAreRanges) {
   EXPECT_EQ(Hits("has:track"), Names({"a.mp3"}));
   EXPECT_EQ(Hits("mp3 -has:track"), Names({"b.mp3"}));
   EXPECT_EQ(Hits("has:text"), Names({"d.txt"}));
+  EXPECT_EQ(Sorted("has:content"), Names({"a.mp3", "b.mp3", "c.jpg", "d.txt"}));
 }
 
 TEST_F(QueryAttributesTest, NearIsACircleOnTheGlobe) {

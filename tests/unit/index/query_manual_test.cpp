@@ -74,6 +74,9 @@ TEST_F(QueryManualTest, EveryExampleIsUnderstood) {
 TEST_F(QueryManualTest, EveryExampleIsAnswered) {
   StoreAll();
   for (const std::string& example : Examples()) {
+    if (example.starts_with("share:")) {
+      continue;  // there is none of that name here
+    }
     const Names hits = Hits(example);
     EXPECT_FALSE(!hits.empty() && hits[0].starts_with("error")) << example << ": " << hits[0];
   }
@@ -89,7 +92,7 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
       {"name:*port*", {"annual report 2024.pdf", "annual report copy.pdf", "report.pdf"}},
       {"name:*.tar.gz", {"backup.tar.gz"}},
       {"name:img*2024*", {"img_2024.jpg"}},
-      {"name:=report.pdf", {"report.pdf"}},
+      {"name:\"report.pdf\"", {"report.pdf"}},
       {"kind:photo,video", {"film.mkv", "img_2024.jpg", "paris.png"}},
       {"is:hidden", {".hidden"}},
       {"duration:3m..5m", {"song.mp3"}},

@@ -101,6 +101,11 @@ class Maker {
     text += beginning ? "*" : "";
     switch (Pick(9)) {
       case 0:
+        if (asked.size() > 1) {  // in quotes it would be the whole name
+          const std::string piece = asked[0] + " " + asked[1];
+          return {"name:\"*" + piece + "*\"",
+                  [=](const PlainFile& f) { return f.name.find(piece) != std::string::npos; }};
+        }
         return {"name:" + text,
                 [=](const PlainFile& f) { return HasRow(f.name, asked, beginning); }};
       case 1:
