@@ -110,7 +110,7 @@ std::string GuessCharset(std::string_view bytes) {
 }
 
 std::string GuessNamesCharset(std::string_view names) {
-  const std::string guess = MeantCharset(GuessCharset(names));
+  std::string guess = MeantCharset(GuessCharset(names));
   // Short names look like anything: letters of the East come in rows, Cyrillic ones as well, those
   // of the West one at a time.
   const std::string text = ToUtf8(names, guess);

@@ -121,7 +121,7 @@ bool Answered(const JobOrder& job, int file) {
 int Serve(int parent) {
   // libmagic's database and the locale are opened while they can be.
   std::string error;
-  (void)setlocale(LC_ALL, "C.UTF-8");
+  (void)setlocale(LC_ALL, "C.UTF-8");  // NOLINT(concurrency-mt-unsafe): one thread
   if (!LoadMagic(error)) {
     return Complain(error, EXIT_DOORS);
   }
