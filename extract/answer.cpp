@@ -201,7 +201,7 @@ std::string EncodeAnswer(const Answer& answer) {
 }
 
 size_t MaxFrame(size_t text_cap) {
-  return LENGTH_SIZE + TEXT_FIELDS * (RECORD_HEAD + ContentSink::MAX_FIELD) + RECORD_HEAD +
+  return LENGTH_SIZE + TEXT_FIELD_COUNT * (RECORD_HEAD + ContentSink::MAX_FIELD) + RECORD_HEAD +
          text_cap + 2 * MAX_REASON + SMALL_RECORDS;
 }
 
