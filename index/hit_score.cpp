@@ -85,8 +85,15 @@ HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of
 }
 
 // A rare word says more.
+void HitScore::Weigh() {
+  for (const WordLeaf& leaf : asked.leaves) {
+    weights.push_back(1 / std::log2(2 + static_cast<double>(sets.Of(*leaf.node).Count())));
+    all_weights += leaf.is_positive ? weights.back() : 0;
+  }
+}
+
 double HitScore::WeightOf(const WordLeaf& leaf) const {
-  return 1 / std::log2(2 + static_cast<double>(sets.Of(*leaf.node).Count()));
+  return weights[static_cast<size_t>(&leaf - asked.leaves.data())];
 }
 
 // The parts that say what to find, as far as this entry has them.
@@ -116,17 +123,15 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
   if (code != SQLITE_OK || found.empty()) {
     return code;
   }
-  if (all_weights == 0) {
-    for (const WordLeaf& leaf : asked.leaves) {
-      all_weights += leaf.is_positive ? WeightOf(leaf) : 0;
-    }
+  if (weights.empty()) {
+    Weigh();
   }
   if (std::all_of(found.begin(), found.end(), [](const Found& part) { return part.in_name; })) {
-    double weights = 0;
+    double weight = 0;
     for (const Found& part : found) {
-      weights += WeightOf(*part.leaf);
+      weight += WeightOf(*part.leaf);
     }
-    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weights / all_weights;
+    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / all_weights;
     return SQLITE_OK;
   }
   text = candidate.facts->text;

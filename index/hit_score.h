@@ -36,6 +36,7 @@ class HitScore {
     bool in_name;
   };
 
+  void Weigh();
   double WeightOf(const WordLeaf& leaf) const;
   int Find(Candidate& candidate, std::vector<Found>& found);
   double NameScore(Candidate& candidate, const std::vector<Found>& found);
@@ -47,7 +48,8 @@ class HitScore {
   RowCheck& check;
   const Asked& asked;
   NameMarker& names;
-  double all_weights = 0;               // set at the first score: the sets are read by then
+  std::vector<double> weights;          // of the leaves, in order; set at the first score
+  double all_weights = 0;               // of those that say what to find
   std::string places_query;             // of all leaves that are looked for in texts
   std::vector<const WordLeaf*> places;  // in its order
   uint64_t full_scores_left = MOST_FULL_SCORES;

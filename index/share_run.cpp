@@ -16,7 +16,6 @@ namespace {
 
 constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
 constexpr size_t SCORED_TEXTS = 300;     // the same of texts
-constexpr uint64_t MOST_RANKED = 50000;  // names whose words are all compared
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -106,63 +105,69 @@ int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
   return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;
 }
 
-// What the words of names say of their order, in the full-text table's language.
-std::string ShareRun::RankQuery(bool at_start) const {
+// Names that begin with one of the words, in the full-text table's language.
+std::string ShareRun::BeginningsQuery() const {
   std::string query;
   for (const WordLeaf& leaf : asked.leaves) {
     if (leaf.is_positive && !leaf.tokens.empty()) {
-      query +=
-          (query.empty() ? "(" : " OR ") + std::string(at_start ? "^ " : "") + leaf.names_query;
+      query += (query.empty() ? "^ " : " OR ^ ") + leaf.names_query;
     }
   }
-  return query.empty() ? "" : query + ") AND " + Quoted(NAME_END);
+  return query;
 }
 
-// The best first, then the youngest rows. Of very many, those that begin with a word are compared,
-// the youngest of them.
+// The best come first: those that begin with a word, as whole names do. Where they alone are many,
+// the youngest of them are compared by how many words they have; the rest comes as it is, the
+// youngest rows first.
 int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
-  const uint64_t count = upper.names.Count();
-  const std::string query =
-      count <= BLOCK || !IsScored() || wanted == 0 ? "" : RankQuery(count > MOST_RANKED);
-  if (query.empty()) {
-    ids = upper.names.Ids();
+  rest = upper.names;
+  const std::string query = BeginningsQuery();
+  if (upper.names.Count() <= BLOCK || !IsScored() || wanted == 0 || query.empty()) {
     return SQLITE_OK;
   }
-  Statement rank;
-  int code = rank.Prepare(rows.db,
-                          "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1 "
-                          "ORDER BY rowid DESC LIMIT 100000");
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  // Where all of them answer, those that are shown are enough.
-  const uint64_t kept = lower.Count() == count ? wanted + BLOCK : count;
-  using Ranked = std::pair<double, int64_t>;
-  std::vector<Ranked> heap;  // the worst on top
-  rank.BindText(1, query);
-  for (code = rank.Step(); code == SQLITE_ROW; code = rank.Step()) {
-    const Ranked one(-sqlite3_column_double(rank.handle, 1), -rank.Int(0));
-    if (!upper.names.Has(-one.second) || (heap.size() >= kept && heap.front() < one)) {
-      continue;
+  Statement begins;
+  int code = begins.Prepare(rows.db, "SELECT rowid FROM names WHERE names MATCH ?1");
+  begins.BindText(1, query);
+  IdSet first;
+  for (code = code == SQLITE_OK ? begins.Step() : code; code == SQLITE_ROW; code = begins.Step()) {
+    if (upper.names.Has(begins.Int(0))) {
+      first.Add(begins.Int(0));
     }
-    if (heap.size() >= kept) {
-      std::pop_heap(heap.begin(), heap.end());
-      heap.pop_back();
-    }
-    heap.push_back(one);
-    std::push_heap(heap.begin(), heap.end());
   }
   if (code != SQLITE_DONE) {
     return code;
   }
-  std::sort_heap(heap.begin(), heap.end());
-  IdSet ranked;
-  for (const Ranked& one : heap) {
-    ids.push_back(-one.second);
-    ranked.Add(-one.second);
+  if (first.Count() > BLOCK) {
+    return RankByLength("(" + query + ") AND " + Quoted(NAME_END), ids, rest);
   }
-  rest = upper.names;
-  rest.Subtract(ranked);
+  ids = first.Ids();
+  std::reverse(ids.begin(), ids.end());
+  rest.Subtract(first);
+  return SQLITE_OK;
+}
+
+int ShareRun::RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest) {
+  Statement rank;
+  int code = rank.Prepare(rows.db,
+                          "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1 "
+                          "ORDER BY rowid DESC LIMIT 100000");
+  rank.BindText(1, query);
+  std::vector<std::pair<double, int64_t>> ranked;
+  for (code = code == SQLITE_OK ? rank.Step() : code; code == SQLITE_ROW; code = rank.Step()) {
+    if (upper.names.Has(rank.Int(0))) {
+      ranked.emplace_back(-sqlite3_column_double(rank.handle, 1), -rank.Int(0));
+    }
+  }
+  if (code != SQLITE_DONE) {
+    return code;
+  }
+  std::sort(ranked.begin(), ranked.end());
+  IdSet chosen;
+  for (const auto& [below, id] : ranked) {
+    ids.push_back(-id);
+    chosen.Add(-id);
+  }
+  rest.Subtract(chosen);
   return SQLITE_OK;
 }
 

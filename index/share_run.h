@@ -45,7 +45,8 @@ class ShareRun {
   int CountTexts(const std::vector<int64_t>& texts, size_t from);
   int WalkRows(BestHits& best);
   int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
-  std::string RankQuery(bool at_start) const;
+  std::string BeginningsQuery() const;
+  int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
   int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
   std::vector<int64_t> TextsByHits() const;
   int Answers(Candidate& candidate, bool& answers);
