@@ -68,7 +68,7 @@ bool AddNumber(ContentField field, const std::string& digits, Content& content) 
 }  // namespace
 
 size_t ContentWords::Length() const {
-  size_t length = text.size() + numbers.size();
+  size_t length = text.size();
   for (const std::string_view field : fields) {
     length += field.size();
   }

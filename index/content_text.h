@@ -23,8 +23,8 @@ struct ContentWords {
   std::string_view text;
   std::string numbers;  // those that people look for as words
 
-  size_t Length() const;
-  bool IsEmpty() const { return Length() == 0; }
+  size_t Length() const;  // of all but the numbers
+  bool IsEmpty() const { return Length() == 0 && numbers.empty(); }
 };
 ContentWords WordsOf(const Content& content);
 

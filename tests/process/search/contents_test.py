@@ -31,6 +31,7 @@ class ContentsFollowTest(ScriptedTest):
         self.await_drained("alpha")
         self.write(f"{root}/last.txt", "afterwards")
         self.change(root, "last.txt")
+        self.await_drained("alpha")
         self.await_hits("afterwards", ["last.txt"])
         self.await_counts(waiting=0)
 
