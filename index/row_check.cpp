@@ -195,7 +195,7 @@ bool RowCheck::MatchesContent(const QueryNode& node, const Candidate& candidate)
     const bool has_number =
         std::any_of(facts->numbers.begin(), facts->numbers.end(),
                     [](const std::optional<int64_t>& number) { return number.has_value(); });
-    return facts->text != 0 || (node.presence == Presence::CONTENT && has_number);
+    return facts->length > 0 || (node.presence == Presence::CONTENT && has_number);
   }
   if (node.presence == Presence::LOCATION) {
     return facts->Number(ContentField::LATITUDE).has_value() &&
