@@ -48,8 +48,8 @@ void Submit(ExtractPool& pool, const std::filesystem::path& path, uint64_t id) {
 void Await(const ExtractPool& pool) {
   std::vector<pollfd> polled;
   pool.AddPolled(polled);
-  const auto left = std::chrono::ceil<std::chrono::milliseconds>(pool.Due() -
-                                                                 std::chrono::steady_clock::now());
+  const auto left =
+      std::chrono::ceil<std::chrono::milliseconds>(pool.Due() - std::chrono::steady_clock::now());
   const int64_t timeout = std::clamp<int64_t>(left.count(), 0, 60'000);
   (void)poll(polled.data(), polled.size(), static_cast<int>(timeout));  // Work looks anyway
 }

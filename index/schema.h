@@ -21,7 +21,8 @@
 //     reread          the `written` of the last add that found the same thing with other
 //                     attributes: its bytes may differ from those that were there before, even if
 //                     size and mtime do not; 0: none
-//   names        words of the last path component as NameRow gives them; no stored copy, so deleting
+//   names        words of the last path component as NameRow gives them; no stored copy, so
+//   deleting
 //                needs the text that was inserted
 //   parts        the folded name by trigrams, for substrings
 //   meta         one row: number of rows in `entries`, when the last commit was made (seconds), how
