@@ -7,7 +7,7 @@
 
 #include "extract/format.h"
 
-struct _GsfInfile;
+struct _GsfInfile;  // NOLINT(bugprone-reserved-identifier): as the library has it
 
 namespace fileindexd {
 

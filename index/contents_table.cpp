@@ -9,7 +9,6 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t FREE_PAGES_KEPT = 256;
-constexpr int64_t RATE_SECONDS = 60;
 
 #define FILE_COLUMNS                                                                \
   "id, inode, birth_time, size, mtime, ctime, kind, found_kind, state, extractor, " \
