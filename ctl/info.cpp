@@ -155,7 +155,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
   object["stored"] = ContentObject(facts.content);
   object["needs_reindex"] = NeedsReindex(facts);
-  object["root_problem"] = ProblemOfRoot(facts);
+  object["root_problem"] = ToUtf8(ProblemOfRoot(facts));
   object["index_problem"] = facts.index_problem;
   object["pending"] = PendingObject(facts.pending);
   return object;

@@ -95,6 +95,9 @@ double Degrees(int64_t number) {
 }
 
 std::string NumberText(const NumberField& field) {
+  if (field.field == ContentField::TAKEN) {
+    return TimeOf(field.number, gmtime_r);  // what the camera's clock said
+  }
   if (IsTime(field.field)) {
     return LocalTime(field.number);
   }

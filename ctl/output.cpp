@@ -155,16 +155,20 @@ std::string ToText(const Json::Value& value) {
   return text.str();
 }
 
-std::string LocalTime(int64_t seconds) {
+std::string TimeOf(int64_t seconds, std::tm* (*split)(const time_t*, std::tm*)) {
   const time_t time = static_cast<time_t>(seconds);
   std::tm parts = {};
   char text[64];
-  if (localtime_r(&time, &parts) == nullptr ||
+  if (split(&time, &parts) == nullptr ||
       strftime(text, sizeof(text), "%Y-%m-%d %H:%M:%S", &parts) == 0) {
     return std::to_string(seconds);
   }
 
   return text;
+}
+
+std::string LocalTime(int64_t seconds) {
+  return TimeOf(seconds, localtime_r);
 }
 
 int64_t WholeSeconds(int64_t nanoseconds) {

@@ -6,6 +6,7 @@
 #include <json/value.h>
 
 #include <cstdint>
+#include <ctime>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -45,6 +46,8 @@ std::string ToText(const Json::Value& value);
 
 // "2031-01-31 08:15:00", local.
 std::string LocalTime(int64_t seconds);
+// The same with localtime_r or gmtime_r.
+std::string TimeOf(int64_t seconds, std::tm* (*split)(const time_t*, std::tm*));
 
 // The whole seconds of a time in nanoseconds, rounded down.
 int64_t WholeSeconds(int64_t nanoseconds);

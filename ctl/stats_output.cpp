@@ -20,7 +20,8 @@ constexpr std::pair<GroupBy, const char*> GROUPINGS[] = {
 };
 
 constexpr const char* ALIKE_NOTE =
-    "probably alike: same size, same samples of beginning, middle and end; not compared in full";
+    "probably alike, among files whose content is looked at: same size, same samples of beginning, "
+    "middle and end; not compared in full";
 
 // The user's name, or the number where there is none. One thread.
 std::string UserName(const std::string& number) {

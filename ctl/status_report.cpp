@@ -84,7 +84,7 @@ Json::Value ShareObject(const ShareReport& report) {
   AddWatch(object, report.watch);
   object["progress"] = WorkObject(report.work ? report.work : report.comparison);
   if (!report.index_problem.empty()) {
-    object["index_problem"] = report.index_problem;
+    object["index_problem"] = ToUtf8(report.index_problem);
   }
 
   object["unwatched"] = report.unwatched;

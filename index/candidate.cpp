@@ -104,7 +104,8 @@ const std::string& CandidateRows::FoldedName(Candidate& candidate) {
 
 int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
   has = false;
-  if (!candidate.facts.has_value() || candidate.facts->sample == 0 || candidate.entry.size == 0) {
+  if (!candidate.facts.has_value() || candidate.facts->state != ContentState::DONE ||
+      candidate.facts->sample == 0 || candidate.entry.size == 0) {
     return SQLITE_OK;
   }
   int code = SQLITE_OK;
@@ -113,7 +114,7 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
                         "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
                         "ON " FILEINDEX_SAME_FILE
                         " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
-                        "AND files.id <> ?3 LIMIT 1");
+                        "AND files.id <> ?3 AND files.state = 1 LIMIT 1");
   }
   if (code != SQLITE_OK) {
     return code;

@@ -28,6 +28,7 @@ std::vector<ContentTerm> TermsOf(const Content& content, const std::string& lang
     count_words(field);
   }
   count_words(words.text);
+  count_words(words.numbers);
 
   std::vector<ContentTerm> terms;
   terms.reserve(counts.size());

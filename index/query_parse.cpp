@@ -97,6 +97,9 @@ bool Parser::Run(QueryNode& query) {
   if (text.size() > MOST_BYTES) {
     return Fail("the question is too long", MOST_BYTES);
   }
+  if (const size_t zero = text.find('\0'); zero != std::string_view::npos) {
+    return Fail("no name and no word holds this character", zero);
+  }
   SkipBlanks();
   if (at == text.size()) {
     return Fail("nothing to search for", 0);
@@ -308,6 +311,8 @@ bool IsPositive(const QueryNode& node) {
 std::string QueryError::Line(std::string_view question) const {
   constexpr size_t SHOWN = 30;
   std::string line = what;
+  std::replace_if(
+      line.begin(), line.end(), [](char c) { return static_cast<unsigned char>(c) < 0x20; }, ' ');
   if (at >= question.size()) {
     return line + (question.empty() ? "" : " (at its end)");
   }

@@ -140,12 +140,14 @@ std::optional<int64_t> DurationSeconds(std::string_view text) {
   return sum;
 }
 
-std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t now, bool utc) {
+std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool utc) {
+  tm local = Broken(moment, false);
+  const time_t now = utc ? timegm(&local) : moment;  // what a clock without zone shows
   if (text == "now") {
     return TimeSpan{now, now, false};
   }
   if (text == "today" || text == "yesterday") {
-    return Day(Broken(now, false), text == "today" ? 0 : -1, utc);
+    return Day(Broken(moment, false), text == "today" ? 0 : -1, utc);
   }
   if (text.starts_with('-')) {
     const std::optional<int64_t> ago = DurationSeconds(text.substr(1));

@@ -21,6 +21,6 @@ std::optional<int64_t> DurationSeconds(std::string_view text);
 
 // "today", "-7d", "2024", "2024-01", "2024-01-05", "2024-01-05T12:30". In local time, or in that of
 // a clock without a zone, which counts as UTC.
-std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t now, bool utc);
+std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool utc);
 
 }  // namespace fileindexd

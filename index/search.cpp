@@ -134,7 +134,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   for (AskedShare& share : shares) {
     share.Complete(made.hits);
   }
-  const bool suggests = made.total == 0 && question.suggests;
+  const bool suggests =
+      made.total == 0 && question.suggests && (question.limit > 0 || question.count_all);
   std::string suggestion = suggests ? Suggest(asked, shares) : "";
   for (AskedShare& share : shares) {
     share.Release();

@@ -64,7 +64,7 @@ int ShareRun::Run(BestHits& best, uint64_t& total) {
   if (code == SQLITE_OK && !is_enough) {
     answered = 0;
     code = upper.everything ? WalkRows(best) : WalkNames(best);
-    const bool needs_texts = question.count_all || !IsScored() || answered_by_name < wanted;
+    const bool needs_texts = question.count_all || !BestComeFirst() || answered_by_name < wanted;
     if (code == SQLITE_OK && !upper.everything && needs_texts) {
       code = WalkTexts(best);
     }
@@ -182,8 +182,8 @@ int ShareRun::WalkNames(BestHits& best) {
       ids.insert(ids.end(), others.rbegin(), others.rend());
       rest = IdSet();
     }
-    if (i % BLOCK == 0 && (wanted == 0 || IsScored())) {
-      if (answered_by_name >= wanted) {
+    if (i % BLOCK == 0) {
+      if (answered_by_name >= wanted && (wanted == 0 || BestComeFirst())) {
         for (; i < ids.size(); ++i) {
           rest.Add(ids[i]);
         }
@@ -270,7 +270,7 @@ int ShareRun::WalkTexts(BestHits& best) {
   Block block;
   int code = SQLITE_OK;
   for (size_t i = 0; i < texts.size() && code == SQLITE_OK; ++i) {
-    if (answered >= wanted && (wanted == 0 || (IsScored() && i >= SCORED_TEXTS))) {
+    if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i >= SCORED_TEXTS))) {
       return question.count_all ? CountTexts(texts, i) : SQLITE_OK;
     }
     Candidate candidate;

@@ -53,6 +53,8 @@ class ShareRun {
   int AddHit(Candidate& candidate, BestHits& best, Block& block);
   int NextEntryOf(int64_t text, Candidate& candidate, bool& found);
   bool IsScored() const { return question.sort == SortBy::SCORE; }
+  // Whoever walks by rank may stop once there are enough.
+  bool BestComeFirst() const { return IsScored() && !question.reverse; }
 
   const Question& question;
   const Asked& asked;

@@ -2,6 +2,7 @@
 #include "index/snippet.h"
 
 #include <algorithm>
+#include <map>
 #include <optional>
 #include <set>
 #include <string_view>
@@ -18,30 +19,41 @@ namespace {
 constexpr size_t WIDTH = 160;          // bytes
 constexpr size_t BEFORE = 40;          // of them before the first word
 constexpr size_t MOST_TEXT = 1 << 18;  // looked at
-constexpr size_t MOST_PLACES = 256;
+constexpr size_t MOST_PLACES = 256;    // of a word
 
 struct Wanted {
   std::string token;
   bool is_beginning;
   size_t word;
+  size_t number;  // of the token in the question: those in one place have the same
 };
 
 struct Place {
   size_t start;
   size_t end;
-  size_t word;
+  size_t number;
 };
 
-// Of a word with several tokens each one counts: where one stands, the others do.
+// Of a word with several tokens each one counts: where most of them stand together is best.
 std::vector<Wanted> TokensOf(const std::vector<const QueryNode*>& words, TextCutter& cutter) {
   std::vector<Wanted> tokens;
+  size_t number = 0;
   for (size_t word = 0; word < words.size(); ++word) {
     const std::string& text = words[word]->text;
-    const bool is_beginning = words[word]->is_beginning || IsBeginning(text);
-    cutter.Cut(text, true, [&](std::string_view token, size_t, size_t) {
-      tokens.push_back({std::string(token), is_beginning, word});
+    const size_t first = tokens.size();
+    size_t last_start = 0;
+    cutter.Cut(text, true, [&](std::string_view token, size_t start, size_t) {
+      number += tokens.size() > first && start != last_start ? 1 : 0;
+      last_start = start;
+      tokens.push_back({std::string(token), false, word, number});
       return true;
     });
+    if (words[word]->is_beginning || IsBeginning(text)) {
+      for (size_t i = first; i < tokens.size(); ++i) {
+        tokens[i].is_beginning = tokens[i].number == number;
+      }
+    }
+    ++number;
   }
   return tokens;
 }
@@ -66,16 +78,17 @@ std::vector<Wanted> WantedIn(std::optional<ContentField> field,
 std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& tokens,
                             TextCutter& cutter) {
   std::vector<Place> places;
+  std::map<size_t, size_t> counts;  // a common word does not hide a rare one
   cutter.Cut(text, false, [&](std::string_view token, size_t start, size_t end) {
     for (const Wanted& wanted : tokens) {
       const bool same =
           wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token;
       const bool known = !places.empty() && places.back().start == start;
-      if (same && !known) {
-        places.push_back({start, end, wanted.word});
+      if (same && !known && ++counts[wanted.number] <= MOST_PLACES) {
+        places.push_back({start, end, wanted.number});
       }
     }
-    return places.size() < MOST_PLACES;
+    return true;
   });
   return places;
 }
@@ -87,7 +100,7 @@ size_t BestOf(const std::vector<Place>& places) {
   for (size_t i = 0; i < places.size(); ++i) {
     std::set<size_t> shown;
     for (size_t j = i; j < places.size() && places[j].end < places[i].start + WIDTH - BEFORE; ++j) {
-      shown.insert(places[j].word);
+      shown.insert(places[j].number);
     }
     if (shown.size() > most) {
       most = shown.size();
@@ -144,7 +157,11 @@ Snippet Around(std::string_view text, const std::vector<Place>& places) {
 Snippet MakeSnippet(const Content& content, const std::vector<const QueryNode*>& words,
                     TextCutter& cutter) {
   const std::vector<Wanted> tokens = TokensOf(words, cutter);
-  const std::string_view text = std::string_view(content.text).substr(0, MOST_TEXT);
+  size_t looked_at = std::min(content.text.size(), MOST_TEXT);
+  while (IsInside(content.text, looked_at)) {
+    --looked_at;
+  }
+  const std::string_view text = std::string_view(content.text).substr(0, looked_at);
   const std::vector<Place> in_text = PlacesIn(text, WantedIn({}, words, tokens), cutter);
   if (!in_text.empty()) {
     return Around(text, in_text);

@@ -300,7 +300,7 @@ class DuplicatesTest(ContentsTest):
 
         lines = self.ctl("stats", "--duplicates").out.decode().splitlines()
 
-        self.assertRegex(lines[0], r"\A1 sets, 2 files, 10 bytes to spare; probably alike: .*")
+        self.assertRegex(lines[0], r"\A1 sets, 2 files, 10 bytes to spare; probably alike, among files .*")
         self.assertEqual(lines[1:], ["", f"10\t{self.roots[0]}/one.txt",
                                      f"10\t{self.roots[0]}/two.txt"])
 

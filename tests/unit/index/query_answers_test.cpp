@@ -49,6 +49,37 @@ class QueryAnswersTest : public QuestionTest {
   }
 };
 
+TEST_F(QueryAnswersTest, ReversedPagesBeginWithTheWorst) {
+  Names names;
+  for (int i = 0; i < 700; ++i) {
+    names.push_back((i % 7 == 0 ? "x " : "a x ") + std::to_string(i));
+  }
+  Fill("a", names);
+  question.shares = {"a"};
+  question.limit = 1000;
+  question.reverse = true;
+  const Names whole = Paths("x");
+  ASSERT_EQ(whole.size(), names.size());
+  ASSERT_TRUE(whole.front().starts_with("/a/a x")) << whole.front();
+  ASSERT_TRUE(whole.back().starts_with("/a/x")) << whole.back();
+
+  question.limit = 10;
+  for (const uint64_t offset : {0, 10, 350, 690}) {
+    question.offset = offset;
+    const auto first = whole.begin() + static_cast<std::ptrdiff_t>(offset);
+    EXPECT_EQ(Paths("x"), Names(first, first + 10)) << offset;
+  }
+}
+
+TEST_F(QueryAnswersTest, NoQuestionHoldsAZero) {
+  question.shares = {"a"};
+  question.text = std::string("\"a\0b\"", 5);
+  std::string error;
+
+  EXPECT_FALSE(Ask(question, answer, error));
+  EXPECT_NE(error.find("(character 3"), std::string::npos) << error;
+}
+
 TEST_F(QueryAnswersTest, SharesAreMergedInOneOrder) {
   Fill("b", {"x one", "x", "y x"});
   Fill("a", {"x two", "x", "x y"});
