@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """An index that was damaged, removed or replaced: it is noticed, told once, and made anew."""
 
+import errno
 import glob
 import os
 import re
@@ -24,7 +25,12 @@ SET_ASIDE = re.compile(r".*index damaged and (set aside|removed), path=.*")
 
 def remove(path):
     if os.path.isdir(path) and not os.path.islink(path):
-        shutil.rmtree(path)
+        while os.path.isdir(path):
+            try:
+                shutil.rmtree(path)
+            except OSError as error:  # the content service may be making a folder there
+                if error.errno != errno.ENOTEMPTY:
+                    raise
     elif os.path.lexists(path):
         os.unlink(path)
 
