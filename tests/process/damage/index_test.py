@@ -29,7 +29,7 @@ def remove(path):
             try:
                 shutil.rmtree(path)
             except OSError as error:  # the content service may be making a folder there
-                if error.errno != errno.ENOTEMPTY:
+                if error.errno not in (errno.ENOTEMPTY, errno.ENOENT):
                     raise
     elif os.path.lexists(path):
         os.unlink(path)
