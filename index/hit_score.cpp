@@ -64,10 +64,9 @@ double ScoreOfPlaces(const WordPlaces& found, double length) {
                             : 0.5 * often;
 }
 
-double Youth(const Entry& entry) {
+double Youth(const Entry& entry, double now) {
   const double years =
-      std::max(0.0, (static_cast<double>(time(nullptr)) - static_cast<double>(entry.mtime) / 1e9) /
-                        (365.0 * 86400));
+      std::max(0.0, (now - static_cast<double>(entry.mtime) / 1e9) / (365.0 * 86400));
   return 0.98 + 0.02 / (1 + years);
 }
 
@@ -75,7 +74,12 @@ double Youth(const Entry& entry) {
 
 HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of_check,
                    const Asked& in_question, NameMarker& of_names)
-    : rows(of_rows), sets(of_sets), check(of_check), asked(in_question), names(of_names) {
+    : rows(of_rows),
+      sets(of_sets),
+      check(of_check),
+      asked(in_question),
+      names(of_names),
+      now(static_cast<double>(time(nullptr))) {
   for (const WordLeaf& leaf : asked.leaves) {
     if (leaf.is_positive && !leaf.text_query.empty()) {
       places_query += (places_query.empty() ? "(" : " OR (") + leaf.text_query + ")";
@@ -115,6 +119,23 @@ int HitScore::Find(Candidate& candidate, std::vector<Found>& found) {
   return SQLITE_OK;
 }
 
+// Whether the entry would answer if its content held none of the words. It answers as a whole.
+bool HitScore::NameAnswers(const QueryNode& node, const std::vector<Found>& found) const {
+  const auto answers = [&](const QueryNode& below) { return NameAnswers(below, found); };
+  switch (node.part) {
+    case Part::AND:
+      return std::all_of(node.below.begin(), node.below.end(), answers);
+    case Part::OR:
+      return std::any_of(node.below.begin(), node.below.end(), answers);
+    case Part::WORD:
+      return std::any_of(found.begin(), found.end(), [&node](const Found& part) {
+        return part.in_name && part.leaf->node == &node;
+      });
+    default:
+      return true;
+  }
+}
+
 int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
   std::vector<Found> found;
   const int code = Find(candidate, found);
@@ -126,11 +147,13 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
   if (weights.empty()) {
     Weigh();
   }
-  if (std::all_of(found.begin(), found.end(), [](const Found& part) { return part.in_name; })) {
+  const auto in_name = [](const Found& part) { return part.in_name; };
+  if (std::any_of(found.begin(), found.end(), in_name) && NameAnswers(asked.tree, found)) {
     double weight = 0;
     for (const Found& part : found) {
       weight += WeightOf(*part.leaf);
     }
+    found.erase(std::stable_partition(found.begin(), found.end(), in_name), found.end());
     score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / all_weights;
     return SQLITE_OK;
   }
@@ -223,7 +246,7 @@ int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found
                 : ScoreOfPlaces(counted[static_cast<size_t>(place - places.begin())],
                                 static_cast<double>(candidate.facts->length)));
   }
-  score = 0.5 + 0.5 * (sum / all_weights) * Youth(candidate.entry);
+  score = 0.5 + 0.5 * (sum / all_weights) * Youth(candidate.entry, now);
   return SQLITE_OK;
 }
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // How well an entry answers the words of a question.
 //
-//   1 and more   all words that it answers stand in its name: the whole name above its stem, that
+//   1 and more   its name alone answers the words: the whole name above its stem, that
 //                above a beginning, that above the rest; then the share of the name that they are,
 //                and how many and how rare they are of those that were asked for
 //   0.5 to 1     some stand in its content alone: title above other fields above text, rare words
@@ -29,6 +29,8 @@ class HitScore {
 
   // Of an entry that answers. `text` is set where a content counted. SQLite's code.
   int Score(Candidate& candidate, double& score, int64_t& text);
+  // The next MOST_FULL_SCORES contents are looked at closely again.
+  void Refill() { full_scores_left = MOST_FULL_SCORES; }
 
  private:
   struct Found {
@@ -38,6 +40,7 @@ class HitScore {
 
   void Weigh();
   double WeightOf(const WordLeaf& leaf) const;
+  bool NameAnswers(const QueryNode& node, const std::vector<Found>& found) const;
   int Find(Candidate& candidate, std::vector<Found>& found);
   double NameScore(Candidate& candidate, const std::vector<Found>& found);
   double PieceScore(Candidate& candidate, const std::vector<Found>& found);
@@ -48,6 +51,7 @@ class HitScore {
   RowCheck& check;
   const Asked& asked;
   NameMarker& names;
+  const double now;                     // one moment for all, in seconds since the epoch
   std::vector<double> weights;          // of the leaves, in order; set at the first score
   double all_weights = 0;               // of those that say what to find
   std::string places_query;             // of all leaves that are looked for in texts

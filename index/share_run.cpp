@@ -85,8 +85,8 @@ int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
   }
   Hit hit;
   const int code = IsScored() ? score.Score(candidate, hit.score, hit.text) : SQLITE_OK;
-  if (hit.score >= 1) {
-    ++answered_by_name;
+  answered_by_name += hit.score >= 1 ? 1 : 0;
+  if (hit.score >= 1 || block.of_texts) {
     hit.score = std::min(hit.score, block.ceiling);
     block.floor = std::min(block.floor, hit.score);
   }
@@ -234,6 +234,7 @@ int ShareRun::CountNames(IdSet& others) {
 
 std::vector<int64_t> ShareRun::TextsByHits() const {
   std::vector<int64_t> texts = upper.texts.Ids();
+  std::reverse(texts.begin(), texts.end());  // among equals, what was read last
   std::stable_sort(texts.begin(), texts.end(),
                    [this](int64_t a, int64_t b) { return sets.Hits(a) > sets.Hits(b); });
   return texts;
@@ -268,10 +269,16 @@ int ShareRun::NextEntryOf(int64_t text, Candidate& candidate, bool& found) {
 int ShareRun::WalkTexts(BestHits& best) {
   const std::vector<int64_t> texts = TextsByHits();
   Block block;
+  block.of_texts = true;
+  score.Refill();
   int code = SQLITE_OK;
   for (size_t i = 0; i < texts.size() && code == SQLITE_OK; ++i) {
-    if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i >= SCORED_TEXTS))) {
-      return question.count_all ? CountTexts(texts, i) : SQLITE_OK;
+    // Only whole blocks, none above the one before: further pages change nothing in those before.
+    if (i % SCORED_TEXTS == 0) {
+      if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i > 0))) {
+        return question.count_all ? CountTexts(texts, i) : SQLITE_OK;
+      }
+      block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 0.0);
     }
     Candidate candidate;
     bool found = false;

@@ -37,6 +37,7 @@ class ShareRun {
   struct Block {
     double ceiling = 1e9;
     double floor = 1e9;
+    bool of_texts = false;
   };
 
   int WalkNames(BestHits& best);

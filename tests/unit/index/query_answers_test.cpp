@@ -71,6 +71,45 @@ TEST_F(QueryAnswersTest, ReversedPagesBeginWithTheWorst) {
   }
 }
 
+TEST_F(QueryAnswersTest, PagesOfContentsKeepTheirOrder) {
+  std::map<std::string, Content> files;
+  for (int i = 0; i < 650; ++i) {
+    Content content;
+    for (int times = 0; times <= i % 5; ++times) {
+      content.text += "whale ";
+    }
+    content.text += std::string(static_cast<size_t>(i % 11) * 40, '.') + " end";
+    if (i % 90 == 0) {
+      content.texts.push_back({ContentField::TITLE, "whale"});
+    }
+    files.emplace("f" + std::to_string(i), content);
+    if (files.size() == 65) {
+      Store(files);
+      files.clear();
+    }
+  }
+  question.count_all = false;
+  question.limit = 1000;
+  const Names whole = Hits("whale");
+  ASSERT_EQ(whole.size(), 650U);
+
+  question.limit = 50;
+  Names pages;
+  for (question.offset = 0; question.offset < 650; question.offset += 50) {
+    const Names page = Hits("whale");
+    pages.insert(pages.end(), page.begin(), page.end());
+  }
+  EXPECT_EQ(pages, whole);
+}
+
+TEST_F(QueryAnswersTest, ANameThatAnswersAloneStandsAboveOthersWhateverItsContentHolds) {
+  Content content;
+  content.text = "an invoice";
+  Store({{"budget.xlsx", content}, {"old draft budget copy.xlsx", {}}});
+
+  EXPECT_EQ(Hits("budget OR invoice"), Names({"budget.xlsx", "old draft budget copy.xlsx"}));
+}
+
 TEST_F(QueryAnswersTest, NoQuestionHoldsAZero) {
   question.shares = {"a"};
   question.text = std::string("\"a\0b\"", 5);
