@@ -266,6 +266,26 @@ int ShareRun::NextEntryOf(int64_t text, Candidate& candidate, bool& found) {
   return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
+// What answers through that text. By their names alone they were visited before.
+int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit) {
+  Candidate candidate;
+  bool found = false;
+  int code = NextEntryOf(text, candidate, found);
+  for (; code == SQLITE_OK && found; code = NextEntryOf(text, candidate, found)) {
+    bool answers = false;
+    if (!upper.names.Has(candidate.entry.id)) {
+      code = check.Matches(asked.tree, candidate, answers);
+    }
+    if (code == SQLITE_OK && answers) {
+      code = visit(candidate);
+    }
+    if (code != SQLITE_OK) {
+      break;
+    }
+  }
+  return code;
+}
+
 int ShareRun::WalkTexts(BestHits& best) {
   const std::vector<int64_t> texts = TextsByHits();
   Block block;
@@ -280,21 +300,8 @@ int ShareRun::WalkTexts(BestHits& best) {
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 0.0);
     }
-    Candidate candidate;
-    bool found = false;
-    for (code = NextEntryOf(texts[i], candidate, found); code == SQLITE_OK && found;
-         code = NextEntryOf(texts[i], candidate, found)) {
-      bool answers = false;
-      if (!upper.names.Has(candidate.entry.id)) {
-        code = check.Matches(asked.tree, candidate, answers);
-      }
-      if (code == SQLITE_OK && answers) {
-        code = AddHit(candidate, best, block);
-      }
-      if (code != SQLITE_OK) {
-        break;
-      }
-    }
+    code = VisitEntriesOf(texts[i],
+                          [&](Candidate& candidate) { return AddHit(candidate, best, block); });
   }
   return code;
 }
@@ -302,19 +309,10 @@ int ShareRun::WalkTexts(BestHits& best) {
 int ShareRun::CountTexts(const std::vector<int64_t>& texts, size_t from) {
   int code = SQLITE_OK;
   for (size_t i = from; i < texts.size() && code == SQLITE_OK; ++i) {
-    Candidate candidate;
-    bool found = false;
-    for (code = NextEntryOf(texts[i], candidate, found); code == SQLITE_OK && found;
-         code = NextEntryOf(texts[i], candidate, found)) {
-      bool answers = false;
-      if (!upper.names.Has(candidate.entry.id)) {
-        code = check.Matches(asked.tree, candidate, answers);
-      }
-      answered += answers ? 1 : 0;
-      if (code != SQLITE_OK) {
-        break;
-      }
-    }
+    code = VisitEntriesOf(texts[i], [this](Candidate&) {
+      ++answered;
+      return SQLITE_OK;
+    });
   }
   return code;
 }

@@ -11,6 +11,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -42,6 +43,7 @@ class ShareRun {
 
   int WalkNames(BestHits& best);
   int CountNames(IdSet& others);
+  int VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit);
   int WalkTexts(BestHits& best);
   int CountTexts(const std::vector<int64_t>& texts, size_t from);
   int WalkRows(BestHits& best);
