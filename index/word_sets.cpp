@@ -60,7 +60,9 @@ int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, boo
     ids.Add(id);
     if (counts) {
       const auto at = static_cast<size_t>(id);
-      hits.resize(std::max(hits.size(), at < hits.size() ? at : at * 2 + 64));
+      if (at >= hits.size()) {
+        hits.resize(at + 1);
+      }
       hits[at] += static_cast<uint32_t>(match.Int(1));
     }
   }

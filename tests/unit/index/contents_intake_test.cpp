@@ -19,7 +19,18 @@ constexpr int64_t DAY = 86400;
 
 }  // namespace
 
-class ContentsIntakeTest : public ContentsTest {};
+class ContentsIntakeTest : public ContentsTest {
+ protected:
+  // The kinds that the administrator wants from now on.
+  void Want(const ContentFlags& flags) {
+    ASSERT_TRUE(store->SetFolder(root, flags));
+    std::shared_ptr<const Settings> in_force;
+    ASSERT_TRUE(store->GetSettings(in_force));
+    contents->UseSettings(in_force);
+    contents->LookAtAll();
+    TakeIn();
+  }
+};
 
 TEST_F(ContentsIntakeTest, RenameMoveLinkAndRebuildCostNoReading) {
   File("a.txt");
@@ -269,56 +280,40 @@ TEST_F(ContentsIntakeTest, SwitchedOffKindIsDroppedThoughItsFileChangedBefore) {
 }
 
 TEST_F(ContentsIntakeTest, WhatIsFoundToBeOfAnUnwantedKindIsNotKept) {
-  const auto use = [this](const ContentFlags& flags) {
-    ASSERT_TRUE(store->SetFolder(root, flags));
-    std::shared_ptr<const Settings> in_force;
-    ASSERT_TRUE(store->GetSettings(in_force));
-    contents->UseSettings(in_force);
-    contents->LookAtAll();
-    TakeIn();
-  };
   File("plain");
-  use({false, true, true, true});
+  Want({false, true, true, true});
   ASSERT_EQ(Read(), Names({"plain"}));
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
   EXPECT_EQ(Number("SELECT found_kind FROM files"), 1);
   EXPECT_EQ(Jobs(), Names());
 
-  use({true, true, true, true});
+  Want({true, true, true, true});
   EXPECT_EQ(Read(), Names({"plain"}));
   EXPECT_EQ(Holding("plain"), 1);
-  use({true, false, false, false});
+  Want({true, false, false, false});
   EXPECT_EQ(Jobs(), Names());
 
-  use({false, true, true, true});
+  Want({false, true, true, true});
   EXPECT_EQ(Holding("plain"), 0);
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
   EXPECT_EQ(Jobs(), Names());
 }
 
 TEST_F(ContentsIntakeTest, PartOfAnUnwantedKindIsNotKeptEither) {
-  const auto use = [this](const ContentFlags& flags) {
-    ASSERT_TRUE(store->SetFolder(root, flags));
-    std::shared_ptr<const Settings> in_force;
-    ASSERT_TRUE(store->GetSettings(in_force));
-    contents->UseSettings(in_force);
-    contents->LookAtAll();
-    TakeIn();
-  };
   File("plain");
-  use({false, true, true, true});
+  Want({false, true, true, true});
   Jobs();
   ASSERT_TRUE(contents->Fail(JobOf("plain").file, "damaged", TextContent("half"), false));
   ASSERT_TRUE(contents->Commit());
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
 
-  use({true, true, true, true});
+  Want({true, true, true, true});
   ASSERT_EQ(Jobs(), Names({"plain"})) << "wanted by now";
   ASSERT_TRUE(contents->Fail(JobOf("plain").file, "damaged", TextContent("half"), false));
   ASSERT_TRUE(contents->Commit());
   EXPECT_EQ(Holding("half"), 1);
 
-  use({false, true, true, true});
+  Want({false, true, true, true});
   EXPECT_EQ(Holding("half"), 0);
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 0);
   EXPECT_EQ(Jobs(), Names());
