@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // failed: files whose content could not be read.
+#include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "index/contents_reader.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // folder list, and how flags are shown.
+#include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/content_kinds.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -3,10 +3,10 @@
 
 #include <algorithm>
 
+#include "base/utf8.h"
 #include "ctl/output.h"
 #include "ctl/terminal/cells.h"
 #include "ctl/terminal/figures.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

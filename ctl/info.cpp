@@ -3,13 +3,13 @@
 #include <cstdio>
 #include <utility>
 
+#include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/content_kinds.h"
 #include "ctl/info_facts.h"
 #include "ctl/info_question.h"
 #include "ctl/output.h"
 #include "ctl/root_problem.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/info_question.h"
 
+#include "base/utf8.h"
 #include "ctl/output.h"
 #include "index/content_terms.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

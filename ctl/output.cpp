@@ -16,7 +16,7 @@
 #include <memory>
 #include <sstream>
 
-#include "state/layout.h"
+#include "base/utf8.h"
 
 namespace fileindexd {
 

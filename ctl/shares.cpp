@@ -5,6 +5,7 @@
 #include <cstring>
 #include <filesystem>
 
+#include "base/utf8.h"
 #include "ctl/client.h"
 #include "ctl/commands.h"
 #include "ctl/output.h"

@@ -5,10 +5,10 @@
 
 #include <utility>
 
+#include "base/utf8.h"
 #include "ctl/output.h"
 #include "ctl/terminal/figures.h"
 #include "ctl/terminal/table.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

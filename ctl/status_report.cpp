@@ -5,9 +5,9 @@
 #include <algorithm>
 #include <cmath>
 
+#include "base/utf8.h"
 #include "ctl/output.h"
 #include "ctl/root_problem.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -6,8 +6,8 @@
 #include <exception>
 #include <memory>
 
+#include "base/utf8.h"
 #include "ctl/output.h"
-#include "state/layout.h"
 #include "state/notifier.h"
 
 namespace fileindexd {

@@ -4,6 +4,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/utf8.h"
 #include "extract/charset.h"
 #include "extract/format.h"
 #include "extract/media_text.h"

@@ -8,6 +8,7 @@
 #include <memory>
 #include <utility>
 
+#include "base/utf8.h"
 #include "extract/characters.h"
 
 namespace fileindexd {

@@ -2,6 +2,7 @@
 // Guessing the charset of bytes.
 #pragma once
 
+#include "base/utf8.h"
 #include <string>
 #include <string_view>
 

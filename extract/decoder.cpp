@@ -9,6 +9,7 @@
 #include <system_error>
 #include <vector>
 
+#include "base/utf8.h"
 #include "extract/charset.h"
 #include "extract/nested.h"
 

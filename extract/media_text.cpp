@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <chrono>
 
-#include "extract/characters.h"
+#include "base/utf8.h"
 #include "extract/utf16.h"
 
 namespace fileindexd {
@@ -94,17 +94,6 @@ size_t ReadAt(int file, int64_t offset, char* bytes, size_t size) {
     done += static_cast<size_t>(got);
   }
   return done;
-}
-
-bool IsUtf8(std::string_view bytes) {
-  while (!bytes.empty()) {
-    const Character character = FirstCharacter(bytes);
-    if (character.code == 0 && bytes[0] != '\0') {
-      return false;
-    }
-    bytes.remove_prefix(character.length);
-  }
-  return true;
 }
 
 std::string Utf8OfUtf16(std::string_view bytes) {

@@ -16,7 +16,6 @@ size_t ReadAt(int file, int64_t offset, char* bytes, size_t size);
 // Tags carry UTF-8 or, in older files, some charset of eight bits that nothing names. What is valid
 // UTF-8 stays; all else is taken for Windows' western charset, of which Latin-1 is a part.
 std::string Utf8Of(std::string_view bytes);
-bool IsUtf8(std::string_view bytes);
 
 // Of UTF-16 with the low byte first.
 std::string Utf8OfUtf16(std::string_view bytes);

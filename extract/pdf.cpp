@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <memory>
 
+#include "base/utf8.h"
 #include "extract/format.h"
 #include "extract/memory_file.h"
 #include "extract/nested.h"

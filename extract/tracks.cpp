@@ -5,6 +5,7 @@
 
 #include <algorithm>
 
+#include "base/utf8.h"
 #include "extract/media_text.h"
 #include "extract/track_format.h"
 #include "extract/utf16.h"

@@ -4,6 +4,7 @@
 #include <ctime>
 #include <utility>
 
+#include "base/utf8.h"
 #include "index/contents_schema.h"
 #include "index/name_marker.h"
 #include "index/search.h"

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/candidate.h"
 
+#include "base/utf8.h"
 #include "index/entry_table.h"
 #include "index/schema.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

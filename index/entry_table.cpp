@@ -5,8 +5,8 @@
 #include <ctime>
 #include <utility>
 
+#include "base/utf8.h"
 #include "index/schema.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

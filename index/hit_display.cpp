@@ -4,10 +4,10 @@
 #include <algorithm>
 #include <string_view>
 
+#include "base/utf8.h"
 #include "index/content_text.h"
 #include "index/entry_table.h"
 #include "index/text_tokenizer.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

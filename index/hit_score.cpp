@@ -5,9 +5,9 @@
 #include <cmath>
 #include <ctime>
 
+#include "base/utf8.h"
 #include "index/content_functions.h"
 #include "index/entry_table.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -5,9 +5,9 @@
 #include <array>
 #include <utility>
 
+#include "base/utf8.h"
 #include "index/asked.h"
 #include "index/entry_table.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -5,6 +5,7 @@
 #include <cmath>
 #include <numbers>
 
+#include "base/utf8.h"
 #include "index/entry_table.h"
 #include "state/layout.h"
 

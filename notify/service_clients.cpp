@@ -5,9 +5,9 @@
 
 #include <algorithm>
 
+#include "base/utf8.h"
 #include "notify/readiness.h"
 #include "notify/service.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 

@@ -46,8 +46,4 @@ std::optional<std::string> NormalPath(std::string_view path);
 // True when normal path `path` is `parent` or lies below it. "/" covers everything.
 bool Covers(std::string_view parent, std::string_view path);
 
-// The text with every byte that is not part of well-formed UTF-8 replaced by U+FFFD.
-std::string ToUtf8(std::string_view bytes);
-bool IsUtf8(std::string_view bytes);
-
 }  // namespace fileindexd

@@ -7,6 +7,7 @@
 #include <set>
 #include <tuple>
 
+#include "base/utf8.h"
 #include "index/compare.h"
 #include "index/entry_table.h"
 #include "index/name_text.h"

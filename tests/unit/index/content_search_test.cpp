@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <filesystem>
 
+#include "base/utf8.h"
 #include "index/contents_reader.h"
 #include "index/search.h"
 #include "state/layout.h"

@@ -4,9 +4,9 @@
 
 #include <memory>
 
+#include "base/utf8.h"
 #include "state/event_codes.h"
 #include "state/json_text.h"
-#include "state/layout.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include "state/layout.h"
+#include "base/utf8.h"
 
 namespace fileindexd {
 
