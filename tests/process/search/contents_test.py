@@ -74,7 +74,10 @@ class ContentsFollowTest(ScriptedTest):
 
         self.await_all_taken_in(root)
         self.assertEqual(self.hits("lighthouse"), ["one.txt"])
-        self.assertEqual([name for name in self.given() if name != "last.txt"], ["one.txt"])
+        # Which of the two names the walk met first is the file system's affair.
+        given = [name for name in self.given() if name != "last.txt"]
+        self.assertEqual(len(given), 1, given)
+        self.assertIn(given[0], ["one.txt", "twin.txt"])
 
     def test_a_rebuilt_index_costs_no_reading(self):
         root = self.make_documents(one="lighthouse")
