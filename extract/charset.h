@@ -2,9 +2,10 @@
 // Guessing the charset of bytes.
 #pragma once
 
-#include "base/utf8.h"
 #include <string>
 #include <string_view>
+
+#include "base/utf8.h"
 
 namespace fileindexd {
 
