@@ -182,7 +182,7 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
   }
   sink.has_thrown = sink.has_thrown || tried.has_thrown;
   const Format seen = FormatOfContent(document);
-  if (seen == Format::NONE && named == Format::TEXT) {
+  if (seen == Format::NONE && named == Format::TEXT && !fault.starts_with(CANNOT_READ)) {
     return true;  // many endings of source code name something else elsewhere
   }
   if (seen == Format::NONE || seen == named || IsStillPackage(named, seen, tried.content, fault)) {
