@@ -259,7 +259,7 @@ int UntilNextAsk(const Watches& watches, int timeout_ms) {
 }
 
 std::string Text(const StatusReport& report, bool json) {
-  return json ? ToText(ReportObject(report)) + "\n" : ReportText(report);
+  return json ? JsonLine(ReportObject(report)) : ReportText(report);
 }
 
 // What has to differ for another block.

@@ -164,7 +164,7 @@ Json::Value FactsObject(const PathFacts& facts) {
 void PutFact(const std::string& name, const std::string& text) {
   constexpr size_t WIDTH = 16;
   (void)PutLine(name + std::string(name.size() < WIDTH ? WIDTH - name.size() : 1, ' ') +
-                Printable(text));
+                ShownText(text));
 }
 
 std::string TimeText(int64_t nanoseconds) {

@@ -211,4 +211,20 @@ std::string ShowCells(const Cells& cells, bool has_colours) {
   return bright ? shown + PLAIN : shown;
 }
 
+std::string EscapedJson(std::string_view json) {
+  constexpr int32_t REPLACEMENT = 0xfffd;
+  std::string escaped;
+  for (size_t at = 0, bytes = 0; at < json.size(); at += bytes) {
+    const std::optional<int32_t> code = TakeCharacter(json.substr(at), bytes);
+    if (code.has_value() && !IsShownInDigits(*code)) {
+      escaped += json.substr(at, bytes);
+      continue;
+    }
+    char text[16];  // all of them are below 0x10000
+    (void)snprintf(text, sizeof text, "\\u%04x", static_cast<unsigned>(code.value_or(REPLACEMENT)));
+    escaped += text;
+  }
+  return escaped;
+}
+
 }  // namespace fileindexd

@@ -37,4 +37,7 @@ Cells CutAround(const Cells& cells, size_t columns);
 // Marked cells bright, if there are colours.
 std::string ShowCells(const Cells& cells, bool has_colours);
 
+// JSON text that means the same, with what would be shown in digits escaped.
+std::string EscapedJson(std::string_view json);
+
 }  // namespace fileindexd

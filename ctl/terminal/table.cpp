@@ -15,7 +15,7 @@ constexpr size_t GAP = 2;
 std::string PlainLine(const TableRow& row) {
   std::string line;
   for (const std::string& column : row) {
-    line += (line.empty() ? "" : "\t") + Printable(column);
+    line += (line.empty() ? "" : "\t") + OneLine(column);
   }
   return line;
 }

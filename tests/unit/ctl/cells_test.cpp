@@ -55,6 +55,12 @@ TEST(CellsTest, WhatWouldMoveTheCursorIsShownInDigits) {
             "a\\x1b[1mb\\x0a\\xff\\xc2\\x9b\\u202e");
 }
 
+TEST(EscapedJsonTest, MeansTheSameAndActsOnNothing) {
+  EXPECT_EQ(EscapedJson("{\"a\":\"gr\u00fc\u00df \\n\"}"), "{\"a\":\"gr\u00fc\u00df \\n\"}");
+  EXPECT_EQ(EscapedJson("\"\x7f\u009b\u202e\u2028\""), "\"\\u007f\\u009b\\u202e\\u2028\"");
+  EXPECT_EQ(EscapedJson("\"\xff\""), "\"\\ufffd\"");
+}
+
 TEST(CellsTest, MarksAreBrightWhereThereAreColours) {
   const Cells cells = CellsOf("one two", {{0, 3}, {4, 7}});
 
