@@ -41,7 +41,7 @@ ShareTotals SumOf(const std::vector<ShareTotals>& shares) {
     sum.files += share.files;
     sum.folders += share.folders;
     sum.links += share.links;
-    sum.bytes += share.bytes;
+    sum.bytes = AddedBytes(sum.bytes, share.bytes);
   }
   return sum;
 }

@@ -43,7 +43,7 @@ class Merge {
       sum.share = by_share ? share : "";
       sum.name = name;
       sum.entries += group.entries;
-      sum.bytes += group.bytes;
+      sum.bytes = AddedBytes(sum.bytes, group.bytes);
     }
     counts.groups.clear();
   }

@@ -97,7 +97,7 @@ void GroupCounts::Add(std::string_view name, const CountedEntry& entry) {
     group->second.name = key;
   }
   ++group->second.entries;
-  group->second.bytes += entry.is_further_name ? 0 : entry.size;
+  group->second.bytes = AddedBytes(group->second.bytes, entry.is_further_name ? 0 : entry.size);
 }
 
 // The index by inode alone tells which have several entries; only those are looked up.
@@ -194,7 +194,7 @@ void StatisticsScan::CountTotals(const CountedEntry& entry) {
     case Thing::NONE:
       break;
   }
-  totals.bytes += entry.is_further_name ? 0 : entry.size;
+  totals.bytes = AddedBytes(totals.bytes, entry.is_further_name ? 0 : entry.size);
 }
 
 void StatisticsScan::CountGroup(const CountedEntry& entry) {

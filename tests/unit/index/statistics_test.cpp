@@ -245,6 +245,32 @@ TEST_F(StatisticsTest, BytesOfAFileCountAtTheFirstOfItsPaths) {
   EXPECT_EQ(statistics.totals[0].files, 3u);
 }
 
+TEST_F(StatisticsTest, SumsStopWhereTheyWouldTurnAround) {
+  Put({Make("a.c", INT64_MAX, 1), Make("b.c", 1, 2), Make("c.c", INT64_MAX, 3)});
+  StatisticsWish wish = Wish();
+  wish.totals = true;
+  wish.by = GroupBy::EXTENSION;
+  wish.born_since = 0;
+  wish.shares.push_back(wish.shares[0]);
+
+  const Statistics statistics = Ask(wish);
+
+  EXPECT_EQ(statistics.totals[0].bytes, INT64_MAX);
+  EXPECT_EQ(RowsOf(statistics.groups), (Rows{{"c", 6, INT64_MAX}}));
+  EXPECT_EQ(RowsOf(statistics.born), (Rows{{root, 6, INT64_MAX}}));
+}
+
+TEST(BytesTest, StopAtTheirEnds) {
+  EXPECT_EQ(AddedBytes(1, 2), 3);
+  EXPECT_EQ(AddedBytes(INT64_MAX, 1), INT64_MAX);
+  EXPECT_EQ(AddedBytes(INT64_MIN, -1), INT64_MIN);
+  EXPECT_EQ(AddedBytes(INT64_MAX, -1), INT64_MAX - 1);
+  EXPECT_EQ(ManifoldBytes(3, 4), 12);
+  EXPECT_EQ(ManifoldBytes(INT64_MAX / 2, 3), INT64_MAX);
+  EXPECT_EQ(ManifoldBytes(-5, UINT64_MAX), INT64_MIN);
+  EXPECT_EQ((AlikeFiles{INT64_MAX / 2, 9, {}}).Spare(), INT64_MAX);
+}
+
 TEST_F(StatisticsTest, TwoFilesThatHadOneInodeInTurnAreTwo) {
   Entry later = Make("b", 100, 1);
   later.birth_time += 1;
