@@ -12,16 +12,6 @@ namespace fileindexd {
 
 namespace {
 
-bool IsGreater(const EntryGroup& a, const EntryGroup& b) {
-  if (a.bytes != b.bytes) {
-    return a.bytes > b.bytes;
-  }
-  if (a.entries != b.entries) {
-    return a.entries > b.entries;
-  }
-  return a.name != b.name ? a.name < b.name : a.share < b.share;
-}
-
 std::vector<EntryGroup> Sorted(std::unordered_map<std::string, EntryGroup>& groups) {
   std::vector<EntryGroup> list;
   list.reserve(groups.size());

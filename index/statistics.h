@@ -101,7 +101,8 @@ struct Statistics {
 };
 
 constexpr uint64_t MOST_LARGEST = 100000;
-constexpr size_t MOST_GROUPS = 50000;  // of one share: names beyond are counted as OTHER_NAMES
+// Of one share. Beyond, those with the most bytes are told, and the rest as OTHER_NAMES.
+constexpr size_t MOST_GROUPS = 50000;
 constexpr const char* OTHER_NAMES = "(others)";
 constexpr size_t MOST_SETS = 1000;
 constexpr size_t MOST_PLACES = 100;

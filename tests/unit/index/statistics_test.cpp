@@ -298,18 +298,60 @@ TEST_F(StatisticsTest, AShareThatCannotBeReadIsNamedAndTheOthersCounted) {
   EXPECT_EQ(statistics.totals[0].bytes, 100);
 }
 
-TEST(GroupCountsTest, NamesBeyondALimitCountTogether) {
+TEST(GroupCountsTest, NamesBeyondALimitCountTogetherAndTheGreatestStay) {
   GroupCounts counts;
   CountedEntry entry;
-  entry.size = 1;
-  for (size_t i = 0; i < MOST_GROUPS + 10; ++i) {
-    counts.Add("name" + std::to_string(i), entry);
-  }
-  counts.Add("name0", entry);
+  const auto add_all = [&] {
+    for (size_t i = 0; i < 3 * MOST_GROUPS; ++i) {
+      entry.size = static_cast<int64_t>(i);
+      counts.Add("name" + std::to_string(i), entry);
+    }
+    entry.size = 5;
+    counts.Add("name0", entry);
+  };
+
+  add_all();
+  ASSERT_TRUE(counts.Settle());
+  add_all();
 
   EXPECT_EQ(counts.groups.size(), MOST_GROUPS + 1);
-  EXPECT_EQ(counts.groups.at(OTHER_NAMES).entries, 10u);
-  EXPECT_EQ(counts.groups.at("name0").bytes, 2);
+  EXPECT_EQ(counts.groups.at(OTHER_NAMES).entries, 2 * MOST_GROUPS + 1);
+  EXPECT_FALSE(counts.groups.contains("name0"));
+  const int64_t last = 3 * int64_t{MOST_GROUPS} - 1;
+  EXPECT_EQ(counts.groups.at("name" + std::to_string(last)).bytes, last);
+}
+
+TEST(GroupCountsTest, FewNamesAreCountedOnce) {
+  GroupCounts counts;
+  CountedEntry entry;
+  entry.size = 7;
+  counts.Add("name", entry);
+
+  EXPECT_FALSE(counts.Settle());
+  EXPECT_EQ(counts.groups.at("name").bytes, 7);
+}
+
+TEST_F(StatisticsTest, OfVeryManyNamesTheLargestAreTold) {
+  std::vector<Entry> entries;
+  for (size_t i = 0; i < 2 * MOST_GROUPS + 10; ++i) {
+    const std::string name = "x.e" + std::to_string(i);
+    entries.push_back(Make(name, i == 2 * MOST_GROUPS + 5 ? 1000 : 1, i + 1));
+    entries.back().kind = Kind::OTHER;
+  }
+  entries.push_back(Make("y.e" + std::to_string(2 * MOST_GROUPS + 5), 5, entries.size() + 1));
+  Put(entries);
+  StatisticsWish wish = Wish();
+  wish.by = GroupBy::EXTENSION;
+  wish.totals = true;
+
+  const Statistics statistics = Ask(wish);
+
+  ASSERT_EQ(statistics.groups.size(), MOST_GROUPS + 1);
+  EXPECT_EQ(statistics.groups[0].name, OTHER_NAMES);
+  EXPECT_EQ(statistics.groups[0].entries, MOST_GROUPS + 10);
+  EXPECT_EQ(statistics.groups[1].name, "e" + std::to_string(2 * MOST_GROUPS + 5));
+  EXPECT_EQ(statistics.groups[1].bytes, 1005);
+  EXPECT_EQ(statistics.totals[0].files, 2 * MOST_GROUPS + 11);
 }
 
 TEST(ExtensionTest, IsWhatStandsBehindTheLastDot) {
