@@ -33,7 +33,7 @@ bool OpenShare::Open(bool with_contents, std::vector<std::string>& failures) {
   const auto fail = [&](const char* what, IndexError error) {
     failures.push_back("share " + share.name + ": " + what + IndexErrorText(error));
   };
-  const IndexError error = reader.Open(share.name);
+  const IndexError error = reader.OpenOnceMade(share.name);
   if (error != IndexError::NONE) {
     fail("", error);
     return false;
