@@ -124,9 +124,8 @@ SortBy SortOf(const std::optional<std::string>& given) {
   return *given == "name" ? SortBy::NAME : *given == "size" ? SortBy::SIZE : SortBy::MODIFIED;
 }
 
-void PutAnswer(const Answer& answer, const Arguments& arguments) {
-  const bool for_people = !arguments.json && !arguments.nul_ended && !arguments.count;
-  const std::optional<Screen> screen = for_people ? FindScreen() : std::nullopt;
+void PutAnswer(const Answer& answer, const Arguments& arguments,
+               const std::optional<Screen>& screen) {
   if (arguments.count) {
     (void)PutLine(std::to_string(answer.total));
   } else {
@@ -154,6 +153,9 @@ int Search(const Arguments& arguments) {
   question.sort = SortOf(arguments.sort);
   question.reverse = arguments.reverse;
   question.count_all = arguments.count;
+  const bool for_people = !arguments.json && !arguments.nul_ended && !arguments.count;
+  const std::optional<Screen> screen = for_people ? FindScreen() : std::nullopt;
+  question.shows = arguments.json || screen.has_value();
 
   Session session;
   if (!session.Open() || !ChooseShares(session, arguments, question)) {
@@ -175,7 +177,7 @@ int Search(const Arguments& arguments) {
     return Fail(EXIT_USAGE, "search: %s: %s", arguments.query.c_str(), error.c_str());
   }
 
-  PutAnswer(answer, arguments);
+  PutAnswer(answer, arguments, screen);
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());
   }

@@ -25,6 +25,19 @@ TEST_F(QueryWordsTest, OperatorsCombineNamesAndContents) {
   EXPECT_EQ(Sorted("name:txt -ext:txt"), Names());
 }
 
+TEST_F(QueryWordsTest, WhatIsNotShownIsNotLookedFor) {
+  Store({{"whale.txt", TextContent("a blue whale sings")}});
+  ASSERT_EQ(Hits("whale sings"), Names({"whale.txt"}));
+  EXPECT_EQ(answer.hits[0].snippet.text, "a blue whale sings");
+  EXPECT_EQ(answer.hits[0].marks.size(), 1u);
+
+  question.shows = false;
+
+  ASSERT_EQ(Hits("whale sings"), Names({"whale.txt"}));
+  EXPECT_EQ(answer.hits[0].snippet.text, "");
+  EXPECT_TRUE(answer.hits[0].marks.empty());
+}
+
 TEST_F(QueryWordsTest, PhrasesStandInARow) {
   Store({{"a.txt", TextContent("the old blue whale sings")},
          {"b.txt", TextContent("blue is the whale")},
