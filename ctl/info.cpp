@@ -154,6 +154,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   object["state"] = AgreementText(facts.agreement);
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
   object["stored"] = ContentObject(facts.content);
+  object["content_problem"] = facts.content.problem;
   object["needs_reindex"] = NeedsReindex(facts);
   object["root_problem"] = ToUtf8(ProblemOfRoot(facts));
   object["index_problem"] = facts.index_problem;
