@@ -123,10 +123,14 @@ struct Lines {
     return screen.has_value() ? ShortSize(bytes) : std::to_string(bytes);
   }
 
-  void AddTable(const TableRow& headings, const std::vector<TableRow>& rows) {
-    if (!lines.empty() && screen.has_value()) {
+  void PartFromLast() {
+    if (!lines.empty()) {
       lines.emplace_back();
     }
+  }
+
+  void AddTable(const TableRow& headings, const std::vector<TableRow>& rows) {
+    PartFromLast();
     for (std::string& line : TableLines(headings, rows, screen)) {
       lines.push_back(std::move(line));
     }
@@ -171,9 +175,7 @@ struct Lines {
   }
 
   void AddDuplicates(const Duplicates& duplicates) {
-    if (!lines.empty() && screen.has_value()) {
-      lines.emplace_back();
-    }
+    PartFromLast();
     lines.push_back(std::to_string(duplicates.set_count) + " sets, " +
                     std::to_string(duplicates.files) + " files, " + Bytes(duplicates.spare) +
                     (screen.has_value() ? "" : " bytes") + " to spare; " + ALIKE_NOTE);
