@@ -92,6 +92,10 @@ Json::Value LargestList(const std::vector<LargeFile>& largest) {
   return list;
 }
 
+uint64_t SetsLeftOut(const Duplicates& duplicates) {
+  return duplicates.set_count - duplicates.sets.size();
+}
+
 Json::Value DuplicatesObject(const Duplicates& duplicates) {
   Json::Value sets(Json::arrayValue);
   for (const AlikeFiles& alike : duplicates.sets) {
@@ -114,6 +118,7 @@ Json::Value DuplicatesObject(const Duplicates& duplicates) {
   object["files"] = static_cast<Json::UInt64>(duplicates.files);
   object["spare"] = static_cast<Json::Int64>(duplicates.spare);
   object["sets"] = sets;
+  object["sets_left_out"] = static_cast<Json::UInt64>(SetsLeftOut(duplicates));
   return object;
 }
 
@@ -176,9 +181,13 @@ struct Lines {
 
   void AddDuplicates(const Duplicates& duplicates) {
     PartFromLast();
-    lines.push_back(std::to_string(duplicates.set_count) + " sets, " +
-                    std::to_string(duplicates.files) + " files, " + Bytes(duplicates.spare) +
-                    (screen.has_value() ? "" : " bytes") + " to spare; " + ALIKE_NOTE);
+    std::string text = std::to_string(duplicates.set_count) + " sets, " +
+                       std::to_string(duplicates.files) + " files, " + Bytes(duplicates.spare) +
+                       (screen.has_value() ? "" : " bytes") + " to spare; ";
+    if (SetsLeftOut(duplicates) > 0) {
+      text += std::to_string(SetsLeftOut(duplicates)) + " sets with less to spare left out; ";
+    }
+    lines.push_back(text + ALIKE_NOTE);
     for (const AlikeFiles& alike : duplicates.sets) {
       std::vector<TableRow> rows;
       for (const AlikeFiles::Place& place : alike.places) {
@@ -189,7 +198,7 @@ struct Lines {
             {Bytes(alike.size), std::to_string(alike.files - alike.places.size()) + " more"});
       }
       lines.emplace_back();  // sets are parted by an empty line
-      for (std::string& line : TableLines({"", ""}, rows, screen)) {
+      for (std::string& line : TableLines({}, rows, screen)) {
         lines.push_back(std::move(line));
       }
     }

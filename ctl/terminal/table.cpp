@@ -26,6 +26,7 @@ std::vector<size_t> WidthsOf(const TableRow& headings, const std::vector<TableRo
     widths.push_back(heading.size());
   }
   for (const TableRow& row : rows) {
+    widths.resize(std::max(widths.size(), row.size()));
     for (size_t i = 0; i < row.size(); ++i) {
       widths[i] = std::max(widths[i], row[i].size());
     }
@@ -55,7 +56,9 @@ std::vector<std::string> TableLines(const TableRow& headings, const std::vector<
   }
 
   const std::vector<size_t> widths = WidthsOf(headings, rows);
-  lines.push_back(ScreenLine(headings, widths, screen->columns));
+  if (!headings.empty()) {
+    lines.push_back(ScreenLine(headings, widths, screen->columns));
+  }
   for (const TableRow& row : rows) {
     lines.push_back(ScreenLine(row, widths, screen->columns));
   }

@@ -8,6 +8,8 @@ namespace fileindexd {
 namespace {
 
 using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::StartsWith;
 
 class StatisticsLinesTest : public testing::Test {
  protected:
@@ -25,6 +27,24 @@ class StatisticsLinesTest : public testing::Test {
   StatisticsWish wish;
   Statistics statistics;
 };
+
+TEST_F(StatisticsLinesTest, SetsOfDuplicatesHaveNoHeading) {
+  AddDuplicates(0);
+
+  EXPECT_THAT(Lines(Screen{200, false}),
+              ElementsAre(StartsWith("1 sets, 2 files, 10B to spare; probably alike"), "",
+                          "10B  /s/a", "10B  /s/b"));
+  EXPECT_THAT(Lines(std::nullopt),
+              ElementsAre(StartsWith("1 sets, 2 files, 10 bytes to spare; probably alike"), "",
+                          "10\t/s/a", "10\t/s/b"));
+}
+
+TEST_F(StatisticsLinesTest, SetsThatAreLeftOutAreTold) {
+  AddDuplicates(7);
+
+  EXPECT_THAT(Lines(std::nullopt)[0], HasSubstr("to spare; 7 sets with less to spare left out; "));
+  EXPECT_EQ(StatisticsObject(wish, statistics)["duplicates"]["sets_left_out"].asUInt(), 7u);
+}
 
 TEST_F(StatisticsLinesTest, PartsAreSeparatedThroughAPipeToo) {
   wish.totals = true;
