@@ -7,6 +7,7 @@
 
 #include "base/utf8.h"
 #include "ctl/output.h"
+#include "ctl/terminal/cells.h"
 #include "ctl/terminal/figures.h"
 #include "ctl/terminal/table.h"
 
@@ -187,7 +188,11 @@ struct Lines {
     if (SetsLeftOut(duplicates) > 0) {
       text += std::to_string(SetsLeftOut(duplicates)) + " sets with less to spare left out; ";
     }
-    lines.push_back(text + ALIKE_NOTE);
+    text += ALIKE_NOTE;
+    for (std::string& line : screen.has_value() ? WrappedLines(text, screen->columns)
+                                                : std::vector<std::string>{text}) {
+      lines.push_back(std::move(line));
+    }
     for (const AlikeFiles& alike : duplicates.sets) {
       std::vector<TableRow> rows;
       for (const AlikeFiles::Place& place : alike.places) {

@@ -198,6 +198,30 @@ Cells CutAround(const Cells& cells, size_t columns) {
   return shown;
 }
 
+std::vector<std::string> WrappedLines(std::string_view text, size_t columns) {
+  const size_t room = columns > 1 ? columns - 1 : 1;
+  const Cells cells = CellsOf(text);
+  std::vector<std::string> lines;
+  for (size_t first = 0; first < cells.size();) {
+    size_t end = first + std::max<size_t>(Fitting(cells, first, room), 1);
+    if (end < cells.size() && cells[end].text != " ") {
+      size_t blank = end;
+      while (blank > first && cells[blank - 1].text != " ") {
+        --blank;
+      }
+      end = blank > first ? blank : end;
+    }
+    const auto at = [&cells](size_t i) { return cells.begin() + static_cast<std::ptrdiff_t>(i); };
+    std::string line = ShowCells({at(first), at(end)}, false);
+    line.erase(line.find_last_not_of(' ') + 1);
+    lines.push_back(std::move(line));
+    for (first = end; first < cells.size() && cells[first].text == " ";) {
+      ++first;
+    }
+  }
+  return lines;
+}
+
 std::string ShowCells(const Cells& cells, bool has_colours) {
   std::string shown;
   bool bright = false;

@@ -154,13 +154,15 @@ class CountsTest(StatsTest):
 
     def test_on_a_screen_bytes_are_short_and_nothing_is_too_wide(self):
         self.index(self.root, self.other)
-        command = [program("fileindexctl"), "stats", "--by", "folder", "--largest", "9"]
+        command = [program("fileindexctl"), "stats", "--by", "folder", "--largest", "9",
+                   "--duplicates"]
 
-        for columns in (10, 40, 80):
-            shown = Terminal(command, columns)
-            self.assertEqual((shown.code, shown.err), (0, b""))
-        for line in shown.lines():
-            self.assertLess(width(line), 80)
+        for columns in (2, 5, 10, 20, 31, 40, 80):
+            with self.subTest(columns=columns):
+                shown = Terminal(command, columns)
+                self.assertEqual((shown.code, shown.err), (0, b""))
+                for line in [*shown.lines(), *Terminal(command[:2], columns).lines()]:
+                    self.assertLess(width(line), columns, line)
         self.assertRegex(shown.lines()[0], r"\ABYTES  ENTRIES  FOLDER\Z")
         self.assertIn(f" 9.8K        2  {self.other}/a", shown.lines())
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/terminal/cells.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace fileindexd {
@@ -59,6 +60,16 @@ TEST(EscapedJsonTest, MeansTheSameAndActsOnNothing) {
   EXPECT_EQ(EscapedJson("{\"a\":\"gr\u00fc\u00df \\n\"}"), "{\"a\":\"gr\u00fc\u00df \\n\"}");
   EXPECT_EQ(EscapedJson("\"\x7f\u009b\u202e\u2028\""), "\"\\u007f\\u009b\\u202e\\u2028\"");
   EXPECT_EQ(EscapedJson("\"\xff\""), "\"\\ufffd\"");
+}
+
+TEST(WrappedLinesTest, PartsAtBlanks) {
+  using testing::ElementsAre;
+  EXPECT_THAT(WrappedLines("one two three", 20), ElementsAre("one two three"));
+  EXPECT_THAT(WrappedLines("one two three", 9), ElementsAre("one two", "three"));
+  EXPECT_THAT(WrappedLines("one two three", 8), ElementsAre("one two", "three"));
+  EXPECT_THAT(WrappedLines("one two three", 5), ElementsAre("one", "two", "thre", "e"));
+  EXPECT_THAT(WrappedLines("\u6771\u4eac", 1), ElementsAre("\u6771", "\u4eac"));
+  EXPECT_THAT(WrappedLines("", 9), ElementsAre());
 }
 
 TEST(CellsTest, MarksAreBrightWhereThereAreColours) {

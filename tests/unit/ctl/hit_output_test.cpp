@@ -109,5 +109,22 @@ TEST(TableTest, IsColumnsOnAScreenAndTabulatorsElsewhere) {
               ElementsAre("N  NAME", "1  a…ame"));
 }
 
+TEST(TableTest, OnANarrowScreenFiguresGoButTheFirst) {
+  const TableRow headings = {"BYTES", "FILES", "LINKS", "SHARE"};
+  const std::vector<TableRow> rows = {{"1.0K", "2", "3", "a long name of a share"}};
+
+  EXPECT_THAT(TableLines(headings, rows, Screen{34, false}),
+              ElementsAre("BYTES  FILES  LINKS  SHARE", " 1.0K      2      3  a l… a share"));
+  EXPECT_THAT(TableLines(headings, rows, Screen{33, false}),
+              ElementsAre("BYTES  FILES  SHARE", " 1.0K      2  a lon…e of a share"));
+  EXPECT_THAT(TableLines(headings, rows, Screen{14, false}),
+              ElementsAre("BYTES  SHARE", " 1.0K  a…hare"));
+  for (size_t columns = 1; columns < 60; ++columns) {
+    for (const std::string& line : TableLines(headings, rows, Screen{columns, false})) {
+      EXPECT_LE(ColumnsOf(CellsOf(line)), std::max<size_t>(columns - 1, 1)) << line;
+    }
+  }
+}
+
 }  // namespace
 }  // namespace fileindexd
