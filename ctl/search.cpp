@@ -92,8 +92,13 @@ bool ReadSeconds(const Arguments& arguments, std::chrono::seconds& patience) {
 void PutHits(const std::vector<Hit>& hits, const Arguments& arguments,
              const std::optional<Screen>& screen) {
   if (screen.has_value()) {
-    for (const std::string& line : HitLines(hits, *screen)) {
-      (void)PutLine(line);
+    const HitFormat format(hits, *screen);
+    for (const Hit& hit : hits) {
+      for (const std::string& line : format.Lines(hit)) {
+        if (!PutLine(line)) {
+          return;
+        }
+      }
     }
     return;
   }

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <malloc.h>
 
 #include "ctl/terminal/cells.h"
 #include "ctl/terminal/figures.h"
@@ -21,6 +22,17 @@ Hit FileAt(const std::string& path, int64_t size = 2048) {
   hit.entry.size = size;
   hit.entry.mtime = int64_t{1767225600} * 1'000'000'000;
   return hit;
+}
+
+std::vector<std::string> HitLines(const std::vector<Hit>& hits, const Screen& screen) {
+  const HitFormat format(hits, screen);
+  std::vector<std::string> lines;
+  for (const Hit& hit : hits) {
+    for (std::string& line : format.Lines(hit)) {
+      lines.push_back(std::move(line));
+    }
+  }
+  return lines;
 }
 
 class HitLinesTest : public testing::Test {
@@ -62,6 +74,16 @@ TEST_F(HitLinesTest, TheLastColumnOfTheScreenStaysFree) {
       EXPECT_LT(ColumnsOf(CellsOf(line)), columns);
     }
   }
+}
+
+TEST_F(HitLinesTest, ALongAnswerTakesNoMemoryBesideItsHits) {
+  const std::vector<Hit> hits(20000, FileAt("/s/" + std::string(60, 'x')));
+  const size_t before = mallinfo2().uordblks;
+
+  const HitFormat format(hits, {200, false});
+  EXPECT_EQ(format.Lines(hits.front()).size(), 1u);
+
+  EXPECT_LT(mallinfo2().uordblks, before + 100'000);
 }
 
 TEST_F(HitLinesTest, WideAndCombinedNamesStandInOneColumn) {
