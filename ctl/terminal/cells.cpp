@@ -45,6 +45,12 @@ std::string InDigits(int32_t code, std::string_view bytes) {
   return digits;
 }
 
+// Terminals may know characters that the library does not. Where pictures and ideographs are added.
+bool IsWideOnceAssigned(int32_t code) {
+  return (code >= 0x3400 && code <= 0x9fff) || (code >= 0xf900 && code <= 0xfaff) ||
+         (code >= 0x1f300 && code <= 0x1faff) || (code >= 0x20000 && code <= 0x3fffd);
+}
+
 // As terminals count them, where the library says something else: vowel signs that stand beside
 // their letter, Arabic signs that hold a number, and the parts of a Hangul syllable behind its
 // first.
@@ -56,6 +62,9 @@ size_t ColumnsOfCharacter(int32_t code) {
   }
   if (code >= 0x1160 && code <= 0x11ff) {
     return 0;
+  }
+  if (category == UTF8PROC_CATEGORY_CN) {
+    return IsWideOnceAssigned(code) ? 2 : 1;
   }
   return static_cast<size_t>(std::max(0, utf8proc_charwidth(code)));
 }

@@ -33,7 +33,9 @@ TEST(CellsTest, ColumnsAreThoseOfATerminal) {
       {"\u1112\u1161\u11ab", 2, 1},  // a Hangul syllable in parts
       {"\u0915\u093e", 2, 2},        // a vowel sign beside its letter
       {"\U0001f600", 2, 1},
-      {"a\u200db", 2, 2},  // a joiner takes no room
+      {"a\u200db", 2, 2},      // a joiner takes no room
+      {"a\u0378b", 3, 3},      // no character yet: it takes room all the same
+      {"a\U0001faffb", 4, 3},  // and more, where it will be a picture
       {"\t", 4, 1},
       {"\x7f\x1b", 8, 2},
       {"\u0085", 8, 1},  // a control character of two bytes
