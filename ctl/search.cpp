@@ -131,7 +131,11 @@ SortBy SortOf(const std::optional<std::string>& given) {
 
 void PutAnswer(const Answer& answer, const Arguments& arguments,
                const std::optional<Screen>& screen) {
-  if (arguments.count) {
+  if (arguments.count && arguments.json) {
+    Json::Value object(Json::objectValue);
+    object["count"] = static_cast<Json::UInt64>(answer.total);
+    (void)PutJson(object);
+  } else if (arguments.count) {
     (void)PutLine(std::to_string(answer.total));
   } else {
     PutHits(answer.hits, arguments, screen);

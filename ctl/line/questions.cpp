@@ -27,7 +27,8 @@ void AddSearch(Declarer& declare) {
   search->add_flag("--reverse", into.reverse, "The other way round");
   AddOption(search, "--limit", into.limit, "N", "At most so many hits; 20 if not given");
   AddOption(search, "--offset", into.offset, "N", "Leave out so many of the first");
-  search->add_flag("--count", into.count, "The number of hits alone");
+  search->add_flag("--count", into.count,
+                   "The number of hits alone, on a line; with --json as {\"count\":N}");
   CLI::Option* wait =
       search->add_flag("--wait", into.wait, "Once all that has happened to files is in the index");
   AddOption(search, "--timeout", into.timeout, "S", "Wait for S seconds at most; 60 if not given")
