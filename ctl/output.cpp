@@ -121,7 +121,7 @@ int FinishOutput(int code) {
   if (fflush(stdout) != 0) {
     Remember();
   }
-  if (output_error == 0) {
+  if (output_error == 0 || output_error == EPIPE) {
     return code;
   }
 

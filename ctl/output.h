@@ -31,7 +31,8 @@ bool Put(std::string_view bytes);
 bool PutLine(std::string_view bytes, char end = '\n');
 bool PutJson(const Json::Value& value);  // a JsonLine
 
-// Writes out what is buffered. `code`, or EXIT_FAILED with its line when anything was not written.
+// Writes out what is buffered. `code`, or EXIT_FAILED with its line when anything could not be
+// written. A reader that went away has all that it wanted: that is no failure.
 int FinishOutput(int code);
 
 // Sets `key` to the path; when it is not UTF-8, its bad bytes are replaced and `key`_hex holds all
