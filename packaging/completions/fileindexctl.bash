@@ -56,6 +56,11 @@ _fileindexctl_value() {
   esac
 }
 
+# Lines of `$1 share list`. Asked where there is no state, it would make one.
+_fileindexctl_shares() {
+  [[ -e ${FILEINDEXD_STATE_DIR:-/var/lib/fileindexd}/state.db ]] && "$1" share list 2>/dev/null
+}
+
 # Fills COMPREPLY with what of `$1` (see above) begins with `$2`. `$3`: the program.
 _fileindexctl_reply() {
   local name plain
@@ -68,7 +73,7 @@ _fileindexctl_reply() {
         [[ $name == "$plain"* ]] || continue
         [[ $2 == [\"\']* ]] || printf -v name '%q' "$name"
         COMPREPLY+=("$name")
-      done < <("$3" share list 2>/dev/null)
+      done < <(_fileindexctl_shares "$3")
       ;;
     @file | @folder)
       # Outside of a completion there is nothing to set.

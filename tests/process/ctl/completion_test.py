@@ -127,6 +127,13 @@ class BashTest(CompletionTest):
         self.assertEqual(self.offered("dump", "my\\ f"), ["my\\ files"])
         self.assertEqual(self.offered("dump", "'my f"), ["my files"])
 
+    def test_no_state_is_made(self):
+        nowhere = {"FILEINDEXD_STATE_DIR": f"{namespace.RUN}/nowhere"}
+
+        self.assertEqual(self.offered("dump", "", **nowhere), [])
+        self.assertEqual(self.offered("search", "--share", "a", **nowhere), [])
+        self.assertFalse(os.path.lexists(f"{namespace.RUN}/nowhere"))
+
     def test_without_a_state_no_share_is_offered(self):
         broken = {"FILEINDEXD_STATE_DIR": f"{namespace.STATE}/state.db/none"}
 
@@ -175,6 +182,7 @@ class ZshTest(CompletionTest):
         os.close(terminal)
         os.close(theirs)
         self.addCleanup(self.end)
+        self.theirs = theirs
         self.type(f"source {setup}\n")
 
     def end(self):
@@ -217,6 +225,13 @@ class ZshTest(CompletionTest):
 
     def test_values_behind_an_equals_sign(self):
         self.assertEqual(self.offered("folder", "set", "--document="), ["off", "on"])
+
+    def test_no_state_is_made(self):
+        nowhere = f"{namespace.RUN}/nowhere"
+        self.type(f"FILEINDEXD_STATE_DIR={nowhere}; print -u {self.theirs} END\n")
+
+        self.assertEqual(self.offered("worker", "drop", ""), [])
+        self.assertFalse(os.path.lexists(nowhere))
 
 
 if __name__ == "__main__":
