@@ -195,7 +195,13 @@ TEST_F(QueryWordsTest, MarksAreTheBytesThatAnswer) {
   EXPECT_EQ(Marked("name:*fe\u0301*ort*"), "f\u00e9|ort");
   EXPECT_EQ(Marked("name:*.pdf"), ".pdf");
   EXPECT_EQ(Marked("name:\"old cafe report.pdf\""), "Old Caf\u00e9 report.pdf");
-  EXPECT_EQ(Marked("report -blue OR ext:pdf"), "report");
+  EXPECT_EQ(Marked("report -blue OR ext:pdf"), "report|pdf");
+  EXPECT_EQ(Marked("ext:txt,PDF"), "pdf");
+  EXPECT_EQ(Marked("report -ext:txt"), "report");
+  EXPECT_EQ(Marked("ext:pdf name:*.pdf"), ".pdf");
+  EXPECT_EQ(Marked("path:share/old*rep"), "share/Old|rep");
+  EXPECT_EQ(Marked("path:CAF\u00c9"), "Caf\u00e9");
+  EXPECT_EQ(Marked("report OR path:*old*nothing*"), "report") << "only half of it is there";
 }
 
 }  // namespace fileindexd
