@@ -3,6 +3,7 @@
 
 import os
 import shutil
+import sqlite3
 import time
 
 from ctl.terminal import Terminal, width
@@ -143,6 +144,27 @@ class CountsTest(StatsTest):
                           for one in answer["folders"]], self.groups("folder", "--share", "alpha"))
         self.assertLessEqual(abs(answer["since"] - (time.time() - DAY)), 600)
         self.assertEqual(self.stats("--growth", "0s")["growth"]["folders"], [])
+
+    def test_growth_leaves_out_what_is_older(self):
+        self.index(self.root)
+        self.stop(self.daemon_pid())
+        database = sqlite3.connect(f"{namespace.STATE}/shares/alpha/index/entries.db")
+        old = int((time.time() - 3 * DAY) * 1e9)
+        for column, path in (("birth_time", "a/song.mp3"), ("birth_time", "c/three.txt"),
+                             ("first_seen", "a/one.pdf")):
+            database.execute(f"UPDATE entries SET {column} = ? WHERE path = ?",
+                             (old, os.fsencode(f"{self.root}/{path}")))
+        database.commit()
+        database.close()
+
+        def grown(duration):
+            folders = self.stats("--growth", duration)["growth"]["folders"]
+            return {one["path"]: (one["entries"], one["bytes"]) for one in folders}
+
+        root = self.root
+        self.assertEqual(grown("2d"), {f"{root}/a": (4, 1500), f"{root}/c": (1, 0),
+                                       root: (4, 50), f"{root}/empty": (1, 0)})
+        self.assertEqual(grown("4d")[f"{root}/a"], (5, 4500))
 
     def test_a_disk_that_is_gone_is_not_missed(self):
         self.index(self.root)
