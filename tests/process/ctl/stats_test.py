@@ -122,6 +122,13 @@ class CountsTest(StatsTest):
         self.assertEqual([one["path"] for one in self.stats("--largest", "2")["largest"]],
                          [f"{self.root}/a/Again.ogg", f"{self.root}/a/one.pdf"])
 
+    def test_a_file_with_names_in_two_shares_counts_in_each(self):
+        os.link(f"{self.root}/a/song.mp3", f"{self.other}/song.mp3")
+        self.index(self.root, self.other)
+
+        self.assertEqual(self.stats()["total"]["bytes"], 5250 + 10000 + 3000)
+        self.assertIn(b"counts in each, and so more than once", self.ctl("stats", "--help").out)
+
     def test_largest(self):
         self.index(self.root, self.other)
 
