@@ -11,7 +11,7 @@ namespace {
 
 bool PutEntry(const Entry& entry, const Arguments& arguments) {
   if (!arguments.json) {
-    return PutLine(entry.path, arguments.nul_ended ? '\0' : '\n');
+    return arguments.nul_ended ? PutLine(entry.path, '\0') : PutLine(ShownName(entry.path));
   }
 
   Json::Value object(Json::objectValue);

@@ -17,7 +17,7 @@ std::string TriesText(int64_t tries) {
 
 bool PutFailed(const Share& share, const FailedContent& failed, bool json, Json::Value& list) {
   if (!json) {
-    return PutLine(Printable(failed.path) + ": " + Printable(failed.reason) +
+    return PutLine(ShownText(failed.path) + ": " + ShownText(failed.reason) +
                    TriesText(failed.tries));
   }
 

@@ -45,9 +45,10 @@ int FolderList(const Arguments& arguments) {
       continue;
     }
 
-    std::string line = folder.share + "\t" + folder.path + "\t" + FlagsText(folder.wanted);
+    std::string line =
+        ShownName(folder.share) + "\t" + ShownName(folder.path) + "\t" + FlagsText(folder.wanted);
     for (const std::string& pattern : folder.excludes.patterns) {
-      line += "\texclude " + pattern;
+      line += "\texclude " + ShownName(pattern);
     }
     (void)PutLine(line + (gone ? "\tgone" : ""));
   }

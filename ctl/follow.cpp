@@ -223,6 +223,25 @@ std::string OnScreen(const std::string& text, bool first) {
   return screen + "\033[J";
 }
 
+// Has the terminal wrap lines again, whatever ended the command.
+class WrapGuard {
+ public:
+  explicit WrapGuard(bool on_screen) : is_needed(on_screen) {}
+  WrapGuard(const WrapGuard&) = delete;
+  WrapGuard& operator=(const WrapGuard&) = delete;
+  // As good as it gets: a terminal that stands still is not waited for.
+  ~WrapGuard() {
+    pollfd room = {STDOUT_FILENO, POLLOUT, 0};
+    if (is_needed && poll(&room, 1, 0) == 1 && room.revents == POLLOUT) {
+      constexpr std::string_view WRAP = "\033[?7h";
+      (void)!write(STDOUT_FILENO, WRAP.data(), WRAP.size());
+    }
+  }
+
+ private:
+  bool is_needed;
+};
+
 // Milliseconds until it may look different without anything happening; -1: it will not.
 int Timeout(const StatusReport& report) {
   const bool runs =
@@ -259,7 +278,7 @@ int UntilNextAsk(const Watches& watches, int timeout_ms) {
 }
 
 std::string Text(const StatusReport& report, bool json) {
-  return json ? ToText(ReportObject(report)) + "\n" : ReportText(report);
+  return json ? JsonLine(ReportObject(report)) : ReportText(report);
 }
 
 // What has to differ for another block.
@@ -281,6 +300,7 @@ int FollowStatus(Session& session, bool json) {
   }
 
   const bool in_place = follower.is_terminal && !json;
+  const WrapGuard wrap(in_place);
   std::string shown;
   int error = 0;
   Watches watches;
@@ -306,10 +326,6 @@ int FollowStatus(Session& session, bool json) {
     }
     const int timeout_ms = Timeout(report);
     event = follower.Wait(is_asked ? timeout_ms : UntilNextAsk(watches, timeout_ms));
-  }
-  if (in_place) {
-    int ignored = 0;
-    (void)follower.Write("\033[?7h", ignored);  // wraps again; as good as it gets
   }
   return error == 0 ? EXIT_DONE : Fail(EXIT_FAILED, "standard output: %s", strerror(error));
 }

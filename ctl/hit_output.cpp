@@ -86,23 +86,23 @@ Json::Value HitObject(const Hit& hit) {
   return object;
 }
 
-std::vector<std::string> HitLines(const std::vector<Hit>& hits, const Screen& screen) {
+HitFormat::HitFormat(const std::vector<Hit>& hits, const Screen& shown_on) : screen(shown_on) {
   const Layout layout(screen.columns);
-  std::vector<Cells> paths;
-  size_t widest = 0;
-  for (const Hit& hit : hits) {
-    paths.push_back(CutMiddle(CellsOf(hit.entry.path, hit.marks), layout.path));
-    widest = std::max(widest, ColumnsOf(paths.back()));
+  for (auto hit = hits.begin(); hit != hits.end() && widest < layout.path; ++hit) {
+    widest =
+        std::max(widest, ColumnsOf(CutMiddle(CellsOf(hit->entry.path, hit->marks), layout.path)));
   }
+}
 
-  std::vector<std::string> lines;
-  for (size_t i = 0; i < hits.size(); ++i) {
-    const std::string figures = Figures(hits[i].entry, layout);
-    const size_t blanks = figures.empty() ? 0 : widest - ColumnsOf(paths[i]);
-    lines.push_back(ShowCells(paths[i], screen.has_colours) + std::string(blanks, ' ') + figures);
-    if (!hits[i].snippet.text.empty()) {
-      lines.push_back(SnippetLine(hits[i].snippet, layout, screen.has_colours));
-    }
+std::vector<std::string> HitFormat::Lines(const Hit& hit) const {
+  const Layout layout(screen.columns);
+  const Cells path = CutMiddle(CellsOf(hit.entry.path, hit.marks), layout.path);
+  const std::string figures = Figures(hit.entry, layout);
+  const size_t blanks = figures.empty() ? 0 : widest - ColumnsOf(path);
+  std::vector<std::string> lines = {ShowCells(path, screen.has_colours) + std::string(blanks, ' ') +
+                                    figures};
+  if (!hit.snippet.text.empty()) {
+    lines.push_back(SnippetLine(hit.snippet, layout, screen.has_colours));
   }
   return lines;
 }

@@ -19,7 +19,18 @@ namespace fileindexd {
 
 Json::Value HitObject(const Hit& hit);
 
-// Lines for a screen, without their ends.
-std::vector<std::string> HitLines(const std::vector<Hit>& hits, const Screen& screen);
+// Hits on a screen, one by one: an answer may be long, and what a screen needs of a path is many
+// times its bytes.
+class HitFormat {
+ public:
+  // Figures stand behind the widest of the paths.
+  HitFormat(const std::vector<Hit>& hits, const Screen& shown_on);
+
+  std::vector<std::string> Lines(const Hit& hit) const;  // without their ends
+
+ private:
+  Screen screen;
+  size_t widest = 0;
+};
 
 }  // namespace fileindexd

@@ -154,6 +154,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   object["state"] = AgreementText(facts.agreement);
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
   object["stored"] = ContentObject(facts.content);
+  object["content_problem"] = facts.content.problem;
   object["needs_reindex"] = NeedsReindex(facts);
   object["root_problem"] = ToUtf8(ProblemOfRoot(facts));
   object["index_problem"] = facts.index_problem;
@@ -164,7 +165,7 @@ Json::Value FactsObject(const PathFacts& facts) {
 void PutFact(const std::string& name, const std::string& text) {
   constexpr size_t WIDTH = 16;
   (void)PutLine(name + std::string(name.size() < WIDTH ? WIDTH - name.size() : 1, ' ') +
-                Printable(text));
+                ShownText(text));
 }
 
 std::string TimeText(int64_t nanoseconds) {

@@ -114,15 +114,28 @@ std::string NumberText(const NumberField& field) {
 EntryContent ContentOf(const std::string& share, const Entry& entry) {
   EntryContent content;
   ContentsReader reader;
-  content.is_known = reader.Open(share) == IndexError::NONE &&
-                     reader.Find(entry, content.content, content.state, content.reason);
-  if (content.is_known) {
-    ContentReading reading;
-    (void)reader.FindReading(entry, reading);  // shown as none
-    content.extractor = reading.extractor;
-    content.tries = reading.tries;
-    content.language = reader.Language();
+  bool is_there = false;
+  IndexError error = reader.Open(share);
+  error = error == IndexError::NONE ? reader.LookFor(entry, is_there) : error;
+  if (error != IndexError::NONE && error != IndexError::PATH_NOT_FOUND) {
+    content.problem = IndexErrorText(error);
+    return content;
   }
+  content.is_known = true;
+  if (!is_there) {
+    content.state = "waiting";
+    return content;
+  }
+  if (!reader.Find(entry, content.content, content.state, content.reason)) {
+    content.is_known = false;
+    content.problem = "cannot be read";
+    return content;
+  }
+  ContentReading reading;
+  (void)reader.FindReading(entry, reading);  // shown as none
+  content.extractor = reading.extractor;
+  content.tries = reading.tries;
+  content.language = reader.Language();
   return content;
 }
 
@@ -151,6 +164,9 @@ Json::Value ContentObject(const EntryContent& content) {
 }
 
 std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content) {
+  if (!content.problem.empty()) {
+    return {{"problem", content.problem}};
+  }
   if (!content.is_known) {
     return {};
   }

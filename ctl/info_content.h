@@ -15,19 +15,20 @@ namespace fileindexd {
 
 struct EntryContent {
   bool is_known = false;
-  std::string state;   // "waiting", "done", "failed"
-  std::string reason;  // of a failure
+  std::string problem;  // why it cannot be read; empty: it can
+  std::string state;    // "waiting", "done", "failed"
+  std::string reason;   // of a failure
   Content content;
   int64_t extractor = 0;  // version of the readers that read it last; 0: none did
   int64_t tries = 0;      // that ended with the death of the reader
   std::string language;   // whose word forms are found together
 };
 
-// Not known: nothing was read of it yet, or its content is not wanted, or cannot be read.
+// Of an entry whose content is wanted. Known, unless it cannot be read.
 EntryContent ContentOf(const std::string& share, const Entry& entry);
 
 Json::Value ContentObject(const EntryContent& content);  // null when not known
-// Names and values for people: state first, then the fields.
+// Names and values for people: state first, then the fields; or the problem alone.
 std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content);
 
 }  // namespace fileindexd

@@ -17,6 +17,7 @@
 #include <sstream>
 
 #include "base/utf8.h"
+#include "ctl/terminal/cells.h"
 
 namespace fileindexd {
 
@@ -44,6 +45,11 @@ std::string Hex(std::string_view bytes) {
     hex += DIGITS[value & 0xf];
   }
   return hex;
+}
+
+bool IsTerminal() {
+  static const bool is_terminal = isatty(STDOUT_FILENO) == 1;
+  return is_terminal;
 }
 
 void Remember() {
@@ -75,7 +81,9 @@ int Fail(int code, const char* format, ...) {
   const int length = vasprintf(&text, format, arguments);
   va_end(arguments);
 
-  const std::string line = length < 0 ? "out of memory" : Printable(text);
+  const std::string line = length < 0                   ? "out of memory"
+                           : isatty(STDERR_FILENO) == 1 ? Printable(text)
+                                                        : OneLine(text);
   if (length >= 0) {
     free(text);
   }
@@ -105,7 +113,7 @@ bool PutLine(std::string_view bytes, char end) {
 }
 
 bool PutJson(const Json::Value& value) {
-  return PutLine(ToText(value));
+  return Put(JsonLine(value));
 }
 
 int FinishOutput(int code) {
@@ -113,7 +121,7 @@ int FinishOutput(int code) {
   if (fflush(stdout) != 0) {
     Remember();
   }
-  if (output_error == 0) {
+  if (output_error == 0 || output_error == EPIPE) {
     return code;
   }
 
@@ -155,6 +163,10 @@ std::string ToText(const Json::Value& value) {
   return text.str();
 }
 
+std::string JsonLine(const Json::Value& value) {
+  return (IsTerminal() ? EscapedJson(ToText(value)) : ToText(value)) + "\n";
+}
+
 std::string TimeOf(int64_t seconds, std::tm* (*split)(const time_t*, std::tm*)) {
   const time_t time = static_cast<time_t>(seconds);
   std::tm parts = {};
@@ -176,7 +188,7 @@ int64_t WholeSeconds(int64_t nanoseconds) {
   return nanoseconds / SECOND - (nanoseconds % SECOND < 0 ? 1 : 0);
 }
 
-std::string Printable(std::string_view text) {
+std::string OneLine(std::string_view text) {
   std::string line;
   for (const char byte : text) {
     const auto value = static_cast<unsigned char>(byte);
@@ -190,6 +202,18 @@ std::string Printable(std::string_view text) {
     line += shown;
   }
   return line;
+}
+
+std::string Printable(std::string_view text) {
+  return ShowCells(CellsOf(text), false);
+}
+
+std::string ShownName(std::string_view name) {
+  return IsTerminal() ? Printable(name) : std::string(name);
+}
+
+std::string ShownText(std::string_view text) {
+  return IsTerminal() ? Printable(text) : OneLine(text);
 }
 
 Progress::Progress(const std::string& text) {

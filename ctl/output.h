@@ -22,16 +22,17 @@ constexpr int EXIT_NO_DAEMON = 3;
 // database is opened under the number of standard output; a closed pipe comes as an error.
 void PrepareStreams();
 
-// Writes the line "fileindexctl: …" and returns `code`. Control characters are shown as "\xNN", so
-// that a file's name cannot break the line.
+// Writes the line "fileindexctl: …" and returns `code`. The text is Printable on a terminal,
+// OneLine elsewhere, so that a file's name cannot break the line.
 [[gnu::format(printf, 2, 3)]] int Fail(int code, const char* format, ...);
 
 // Each is false once writing has failed: the caller may stop then. FinishOutput tells of it.
 bool Put(std::string_view bytes);
 bool PutLine(std::string_view bytes, char end = '\n');
-bool PutJson(const Json::Value& value);  // on one line
+bool PutJson(const Json::Value& value);  // a JsonLine
 
-// Writes out what is buffered. `code`, or EXIT_FAILED with its line when anything was not written.
+// Writes out what is buffered. `code`, or EXIT_FAILED with its line when anything could not be
+// written. A reader that went away has all that it wanted: that is no failure.
 int FinishOutput(int code);
 
 // Sets `key` to the path; when it is not UTF-8, its bad bytes are replaced and `key`_hex holds all
@@ -44,6 +45,10 @@ void SetTexts(Json::Value& object, const std::vector<std::string>& texts, const 
 // Compact JSON text. Bytes that are not UTF-8 stay as they are.
 std::string ToText(const Json::Value& value);
 
+// The same with its line end, for standard output: on a terminal what that would act on is escaped,
+// so that it reads as the same value.
+std::string JsonLine(const Json::Value& value);
+
 // "2031-01-31 08:15:00", local.
 std::string LocalTime(int64_t seconds);
 // The same with localtime_r or gmtime_r.
@@ -52,8 +57,16 @@ std::string TimeOf(int64_t seconds, std::tm* (*split)(const time_t*, std::tm*));
 // The whole seconds of a time in nanoseconds, rounded down.
 int64_t WholeSeconds(int64_t nanoseconds);
 
-// The text with its control characters shown as "\xNN".
+// The text with its control characters shown as "\xNN"; all else byte for byte.
+std::string OneLine(std::string_view text);
+
+// The text with all that a terminal would act on, or cannot show, in digits (terminal/cells.h).
 std::string Printable(std::string_view text);
+
+// For standard output: Printable on a terminal. Elsewhere a name is what its bytes are, a text is
+// OneLine.
+std::string ShownName(std::string_view name);
+std::string ShownText(std::string_view text);
 
 // A word about long work, on standard error if that is a terminal. Gone when anything else is
 // written, or it is destroyed. One at a time.

@@ -14,7 +14,7 @@ bool IsRootEmptied(const Settings& settings, const Share& share, const ShareStat
 
 std::string RootProblem(const std::string& subject, const Share& share, RootState root,
                         bool emptied) {
-  const std::string accept = "fileindexctl share accept " + Printable(share.name);
+  const std::string accept = "fileindexctl share accept " + OneLine(share.name);
   switch (root) {
     case RootState::SOUND:
       return emptied ? subject + " is empty where it was not; if that is meant: " + accept : "";

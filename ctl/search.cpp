@@ -92,8 +92,13 @@ bool ReadSeconds(const Arguments& arguments, std::chrono::seconds& patience) {
 void PutHits(const std::vector<Hit>& hits, const Arguments& arguments,
              const std::optional<Screen>& screen) {
   if (screen.has_value()) {
-    for (const std::string& line : HitLines(hits, *screen)) {
-      (void)PutLine(line);
+    const HitFormat format(hits, *screen);
+    for (const Hit& hit : hits) {
+      for (const std::string& line : format.Lines(hit)) {
+        if (!PutLine(line)) {
+          return;
+        }
+      }
     }
     return;
   }
@@ -124,10 +129,13 @@ SortBy SortOf(const std::optional<std::string>& given) {
   return *given == "name" ? SortBy::NAME : *given == "size" ? SortBy::SIZE : SortBy::MODIFIED;
 }
 
-void PutAnswer(const Answer& answer, const Arguments& arguments) {
-  const bool for_people = !arguments.json && !arguments.nul_ended && !arguments.count;
-  const std::optional<Screen> screen = for_people ? FindScreen() : std::nullopt;
-  if (arguments.count) {
+void PutAnswer(const Answer& answer, const Arguments& arguments,
+               const std::optional<Screen>& screen) {
+  if (arguments.count && arguments.json) {
+    Json::Value object(Json::objectValue);
+    object["count"] = static_cast<Json::UInt64>(answer.total);
+    (void)PutJson(object);
+  } else if (arguments.count) {
     (void)PutLine(std::to_string(answer.total));
   } else {
     PutHits(answer.hits, arguments, screen);
@@ -154,6 +162,9 @@ int Search(const Arguments& arguments) {
   question.sort = SortOf(arguments.sort);
   question.reverse = arguments.reverse;
   question.count_all = arguments.count;
+  const bool for_people = !arguments.json && !arguments.nul_ended && !arguments.count;
+  const std::optional<Screen> screen = for_people ? FindScreen() : std::nullopt;
+  question.shows = arguments.json || screen.has_value();
 
   Session session;
   if (!session.Open() || !ChooseShares(session, arguments, question)) {
@@ -175,7 +186,7 @@ int Search(const Arguments& arguments) {
     return Fail(EXIT_USAGE, "search: %s: %s", arguments.query.c_str(), error.c_str());
   }
 
-  PutAnswer(answer, arguments);
+  PutAnswer(answer, arguments, screen);
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());
   }

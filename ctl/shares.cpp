@@ -255,7 +255,7 @@ int ShareList(const Arguments& arguments) {
   Json::Value list(Json::arrayValue);
   for (const Share& share : session.settings->shares) {
     if (!arguments.json) {
-      (void)PutLine(share.name + "\t" + share.path);
+      (void)PutLine(ShownName(share.name) + "\t" + ShownName(share.path));
       continue;
     }
 

@@ -7,6 +7,7 @@
 
 #include "base/utf8.h"
 #include "ctl/output.h"
+#include "ctl/terminal/cells.h"
 #include "ctl/terminal/figures.h"
 #include "ctl/terminal/table.h"
 
@@ -41,7 +42,7 @@ ShareTotals SumOf(const std::vector<ShareTotals>& shares) {
     sum.files += share.files;
     sum.folders += share.folders;
     sum.links += share.links;
-    sum.bytes += share.bytes;
+    sum.bytes = AddedBytes(sum.bytes, share.bytes);
   }
   return sum;
 }
@@ -92,6 +93,10 @@ Json::Value LargestList(const std::vector<LargeFile>& largest) {
   return list;
 }
 
+uint64_t SetsLeftOut(const Duplicates& duplicates) {
+  return duplicates.set_count - duplicates.sets.size();
+}
+
 Json::Value DuplicatesObject(const Duplicates& duplicates) {
   Json::Value sets(Json::arrayValue);
   for (const AlikeFiles& alike : duplicates.sets) {
@@ -114,6 +119,7 @@ Json::Value DuplicatesObject(const Duplicates& duplicates) {
   object["files"] = static_cast<Json::UInt64>(duplicates.files);
   object["spare"] = static_cast<Json::Int64>(duplicates.spare);
   object["sets"] = sets;
+  object["sets_left_out"] = static_cast<Json::UInt64>(SetsLeftOut(duplicates));
   return object;
 }
 
@@ -123,10 +129,14 @@ struct Lines {
     return screen.has_value() ? ShortSize(bytes) : std::to_string(bytes);
   }
 
-  void AddTable(const TableRow& headings, const std::vector<TableRow>& rows) {
-    if (!lines.empty() && screen.has_value()) {
+  void PartFromLast() {
+    if (!lines.empty()) {
       lines.emplace_back();
     }
+  }
+
+  void AddTable(const TableRow& headings, const std::vector<TableRow>& rows) {
+    PartFromLast();
     for (std::string& line : TableLines(headings, rows, screen)) {
       lines.push_back(std::move(line));
     }
@@ -171,12 +181,18 @@ struct Lines {
   }
 
   void AddDuplicates(const Duplicates& duplicates) {
-    if (!lines.empty() && screen.has_value()) {
-      lines.emplace_back();
+    PartFromLast();
+    std::string text = std::to_string(duplicates.set_count) + " sets, " +
+                       std::to_string(duplicates.files) + " files, " + Bytes(duplicates.spare) +
+                       (screen.has_value() ? "" : " bytes") + " to spare; ";
+    if (SetsLeftOut(duplicates) > 0) {
+      text += std::to_string(SetsLeftOut(duplicates)) + " sets with less to spare left out; ";
     }
-    lines.push_back(std::to_string(duplicates.set_count) + " sets, " +
-                    std::to_string(duplicates.files) + " files, " + Bytes(duplicates.spare) +
-                    (screen.has_value() ? "" : " bytes") + " to spare; " + ALIKE_NOTE);
+    text += ALIKE_NOTE;
+    for (std::string& line : screen.has_value() ? WrappedLines(text, screen->columns)
+                                                : std::vector<std::string>{text}) {
+      lines.push_back(std::move(line));
+    }
     for (const AlikeFiles& alike : duplicates.sets) {
       std::vector<TableRow> rows;
       for (const AlikeFiles::Place& place : alike.places) {
@@ -187,7 +203,7 @@ struct Lines {
             {Bytes(alike.size), std::to_string(alike.files - alike.places.size()) + " more"});
       }
       lines.emplace_back();  // sets are parted by an empty line
-      for (std::string& line : TableLines({"", ""}, rows, screen)) {
+      for (std::string& line : TableLines({}, rows, screen)) {
         lines.push_back(std::move(line));
       }
     }

@@ -27,7 +27,7 @@ void ReadIndex(ShareReport& report) {
     const bool comes = report.waiting > 0 || report.needs_reindex || report.work.has_value();
     if (report.has_folders && !comes) {
       report.index_problem =
-          "missing; to make it anew: fileindexctl reindex " + Printable(report.share.path);
+          "missing; to make it anew: fileindexctl reindex " + OneLine(report.share.path);
     }
     return;
   }

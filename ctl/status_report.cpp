@@ -129,13 +129,13 @@ std::string WorkLine(const ProgressRecord& work) {
 
 void AddLine(std::string& text, const std::string& label, const std::string& value) {
   constexpr size_t WIDTH = 15;
-  text += "  " + label + std::string(WIDTH - label.size(), ' ') + value + "\n";
+  text += "  " + label + std::string(WIDTH - label.size(), ' ') + ShownText(value) + "\n";
 }
 
 void AddShare(std::string& text, const ShareReport& report) {
   const int64_t last_commit = report.index.last_commit;
-  text += "share " + Printable(report.share.name) + "\n";
-  AddLine(text, "path", Printable(report.share.path));
+  text += "share " + ShownText(report.share.name) + "\n";
+  AddLine(text, "path", report.share.path);
   if (const std::string problem =
           RootProblem("its path", report.share, report.root, report.root_emptied);
       !problem.empty()) {
@@ -145,13 +145,13 @@ void AddShare(std::string& text, const ShareReport& report) {
     AddLine(text, "problem", "index: " + report.index_problem);
   }
   if (report.unwatched) {
-    const std::string name = Printable(report.share.name);
+    const std::string& name = report.share.name;
     AddLine(text, "problem",
             "the daemon does not watch its queue; to mend it: fileindexctl worker drop " + name +
                 ", then fileindexctl worker revive " + name);
   }
   for (const std::string& path : report.gone_folders) {
-    AddLine(text, "folder gone", Printable(path));
+    AddLine(text, "folder gone", path);
   }
   AddLine(text, "waiting lines", std::to_string(report.waiting));
   AddLine(text, "entries", std::to_string(report.index.entries));
@@ -198,7 +198,7 @@ std::string ReportText(const StatusReport& report) {
     text += "\npaused until " + LocalTime(*report.paused_until) + "\n";
   }
   if (!report.left_out.empty()) {
-    text += "not read on this host: " + Printable(report.left_out) + "\n";
+    text += "not read on this host: " + ShownText(report.left_out) + "\n";
   }
   for (const ShareReport& share : report.shares) {
     AddShare(text, share);

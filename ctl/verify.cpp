@@ -28,7 +28,7 @@ constexpr uint64_t PIECES_SHOWN = 20;  // after which a terminal is told how far
 
 bool PutDifference(Difference difference, const std::string& path, const Arguments& arguments) {
   if (!arguments.json) {
-    return PutLine(std::string(DifferenceText(difference)) + "\t" + path);
+    return PutLine(std::string(DifferenceText(difference)) + "\t" + ShownName(path));
   }
 
   Json::Value object(Json::objectValue);

@@ -242,7 +242,7 @@ std::string Waiter::Reason() const {
 int Waiter::TooLate() {
   std::string names;
   for (const Waiting& one : waiting) {
-    names += (names.empty() ? "" : ", ") + Printable(one.share.name);
+    names += (names.empty() ? "" : ", ") + OneLine(one.share.name);
   }
   return Fail(EXIT_FAILED, "search: --wait: not done within %lld s: %s %s: %s",
               static_cast<long long>(limit.count()), waiting.size() == 1 ? "share" : "shares",

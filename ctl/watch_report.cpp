@@ -73,7 +73,7 @@ Json::Value NumberOrNull(bool is_known, Number number) {
 
 std::string ComparedText(const ComparedReport& last) {
   const std::string text = LocalTime(last.ended);
-  return last.error ? text + ", not to its end: " + Printable(*last.error)
+  return last.error ? text + ", not to its end: " + OneLine(*last.error)
                     : text + ", differences: " + std::to_string(last.differences);
 }
 
@@ -140,7 +140,7 @@ std::vector<std::pair<std::string, std::string>> WatchLines(const WatchReport& w
     by += " at an interval";
   }
   if (!watch.problem.empty()) {
-    by += ": " + Printable(watch.problem);
+    by += ": " + OneLine(watch.problem);
   }
 
   std::vector<std::pair<std::string, std::string>> lines = {{"watched by", by}};

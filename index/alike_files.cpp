@@ -113,7 +113,7 @@ class SetCollector {
     if (set.files >= 2) {
       ++duplicates.set_count;
       duplicates.files += set.files;
-      duplicates.spare += set.Spare();
+      duplicates.spare = AddedBytes(duplicates.spare, set.Spare());
       Keep(std::move(set));
     }
     set = {};

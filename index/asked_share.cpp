@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/asked_share.h"
 
-#include <sys/stat.h>
-
 #include <exception>
 #include <new>
 #include <thread>
@@ -11,7 +9,6 @@
 #include "index/content_functions.h"
 #include "index/contents_reader.h"
 #include "index/text_tokenizer.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 
@@ -21,10 +18,7 @@ constexpr int TRIES = 6;
 constexpr int MOST_CONTENTS_TRIES = 2;
 constexpr int STEPS_BETWEEN_LOOKS = 20000;  // of SQLite's machine, at the clock
 
-// A database is made in some milliseconds, and until then there is none.
-// Of a share without a folder there will be none.
-constexpr int MAKING_TRIES = 20;
-constexpr std::chrono::milliseconds MAKING_PAUSE{10};
+constexpr std::chrono::milliseconds REPLACING_PAUSE{10};
 
 int IsTooLate(void* deadline) {
   const auto& end = *static_cast<const std::chrono::steady_clock::time_point*>(deadline);
@@ -75,15 +69,7 @@ IndexError AskedShare::Open(bool with_contents) {
 
 IndexError AskedShare::OpenAnew(bool with_contents) {
   has_contents = false;
-  IndexError error = reader.Open(name);
-  for (int i = 0; i < MAKING_TRIES && error == IndexError::PATH_NOT_FOUND; ++i) {
-    struct stat status {};
-    if (stat(ShareFolder(name).c_str(), &status) != 0) {
-      return error;
-    }
-    std::this_thread::sleep_for(MAKING_PAUSE);  // nothing tells when it is there
-    error = reader.Open(name);
-  }
+  const IndexError error = reader.OpenOnceMade(name);
   if (error != IndexError::NONE) {
     return error;
   }
@@ -162,7 +148,7 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
       Fail(IndexErrorText(error));
       return;
     }
-    std::this_thread::sleep_for(MAKING_PAUSE);  // whoever replaces it is not done yet
+    std::this_thread::sleep_for(REPLACING_PAUSE);  // whoever replaces it is not done yet
   }
 }
 

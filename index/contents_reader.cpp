@@ -55,16 +55,17 @@ std::string FileOfEntrySql() {
          std::string(NUMBER_COLUMNS) + FILE_OF_ENTRY;
 }
 
-// The row of the file that the entry shows now; false when there is none.
-bool StepTo(sqlite3* db, const std::string& sql, const Entry& entry, Statement& row) {
-  if (row.Prepare(db, sql.c_str()) != SQLITE_OK) {
-    return false;
+// The row of the file that the entry shows now: SQLITE_ROW, SQLITE_DONE when there is none.
+int StepTo(sqlite3* db, const std::string& sql, const Entry& entry, Statement& row) {
+  const int code = row.Prepare(db, sql.c_str());
+  if (code != SQLITE_OK) {
+    return code;
   }
   row.BindInt(1, static_cast<int64_t>(entry.inode));
   row.BindInt(2, entry.birth_time);
   row.BindInt(3, entry.size);
   row.BindInt(4, entry.mtime);
-  return row.Step() == SQLITE_ROW;
+  return row.Step();
 }
 
 bool ReadContent(const Statement& row, Content& content) {
@@ -179,11 +180,21 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
   return code == SQLITE_DONE;
 }
 
+IndexError ContentsReader::LookFor(const Entry& entry, bool& is_there) {
+  Statement find;
+  const int code = StepTo(entries.db, std::string("SELECT 1") + FILE_OF_ENTRY, entry, find);
+  if (code != SQLITE_ROW && code != SQLITE_DONE) {
+    return FromSqlite(code);
+  }
+  is_there = entry.content_wanted && code == SQLITE_ROW;
+  return IndexError::NONE;
+}
+
 bool ContentsReader::Find(const Entry& entry, Content& content, std::string& state,
                           std::string& reason) {
   Statement find;
   Content read;
-  if (!entry.content_wanted || !StepTo(entries.db, FileOfEntrySql(), entry, find) ||
+  if (!entry.content_wanted || StepTo(entries.db, FileOfEntrySql(), entry, find) != SQLITE_ROW ||
       !ReadContent(find, read)) {
     return false;
   }
@@ -196,7 +207,8 @@ bool ContentsReader::Find(const Entry& entry, Content& content, std::string& sta
 bool ContentsReader::FindReading(const Entry& entry, ContentReading& reading) {
   Statement find;
   if (!entry.content_wanted ||
-      !StepTo(entries.db, std::string("SELECT extractor, tries") + FILE_OF_ENTRY, entry, find)) {
+      StepTo(entries.db, std::string("SELECT extractor, tries") + FILE_OF_ENTRY, entry, find) !=
+          SQLITE_ROW) {
     return false;
   }
   reading = {find.Int(0), find.Int(1)};

@@ -47,6 +47,8 @@ class ContentsReader {
 
   bool Count(ContentCounts& counts);
   bool ForEachFailed(const std::function<bool(const FailedContent&)>& visit);
+  // Whether there is any for the entry. NONE, or why that cannot be told.
+  IndexError LookFor(const Entry& entry, bool& is_there);
   // The content that stands for the entry: state in words ("waiting", "done", "failed"), and the
   // reason of a failure. False when there is none, or reading failed.
   bool Find(const Entry& entry, Content& content, std::string& state, std::string& reason);

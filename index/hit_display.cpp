@@ -48,6 +48,7 @@ void MarkWords(const WordLeaf& leaf, const SeenName& name,
 
 void MarkPieces(const QueryNode& node, const SeenName& name, NameFolder& folder,
                 std::vector<Snippet::Mark>& marks) {
+  std::vector<Snippet::Mark> found_marks;
   size_t at = 0;
   for (size_t i = 0; i < node.pieces.size(); ++i) {
     const std::string piece = folder.Parts(node.pieces[i]);
@@ -58,8 +59,20 @@ void MarkPieces(const QueryNode& node, const SeenName& name, NameFolder& folder,
     if (found == std::string::npos || piece.empty() || (i == 0 && node.at_start && found != 0)) {
       return;
     }
-    AddMark(name, found, found + piece.size(), marks);
+    AddMark(name, found, found + piece.size(), found_marks);
     at = found + piece.size();
+  }
+  marks.insert(marks.end(), found_marks.begin(), found_marks.end());
+}
+
+// As RowCheck compares them; the dot is not marked.
+void MarkEnding(const QueryNode& node, const SeenName& name, NameFolder& folder,
+                std::vector<Snippet::Mark>& marks) {
+  for (const std::string& ending : node.names) {
+    const std::string tail = folder.Parts(ending);
+    if (name.text.size() > tail.size() + 1 && name.text.ends_with("." + tail)) {
+      AddMark(name, name.text.size() - tail.size(), name.text.size(), marks);
+    }
   }
 }
 
@@ -79,18 +92,41 @@ std::vector<Snippet::Mark> Joined(std::vector<Snippet::Mark> marks) {
   return joined;
 }
 
-}  // namespace
+SeenName PartsOf(std::string_view name, NameFolder& folder) {
+  SeenName parts;
+  parts.text = folder.Parts(name, &parts.origins);
+  return parts;
+}
 
-std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& path,
+// Parts of the question that are no leaves: they need no word.
+void MarkPathsAndEndings(const QueryNode& node, const Entry& entry, NameFolder& folder,
+                         std::vector<Snippet::Mark>& marks) {
+  const std::string_view name = LastComponent(entry.path);
+  if (node.part == Part::EXT && entry.kind != Kind::FOLDER && IsUtf8(name)) {
+    std::vector<Snippet::Mark> in_name;
+    MarkEnding(node, PartsOf(name, folder), folder, in_name);
+    const size_t before = entry.path.size() - name.size();
+    for (const Snippet::Mark& mark : in_name) {
+      marks.push_back({mark.start + before, mark.end + before});
+    }
+  } else if (node.part == Part::PATH && IsUtf8(entry.path)) {
+    MarkPieces(node, PartsOf(entry.path, folder), folder, marks);
+  } else if (node.part == Part::AND || node.part == Part::OR) {
+    for (const QueryNode& below : node.below) {
+      MarkPathsAndEndings(below, entry, folder, marks);
+    }
+  }
+}
+
+std::vector<Snippet::Mark> MarksInName(const Asked& asked, const std::string& path,
                                        NameMarker& marker) {
   const std::string_view name = LastComponent(path);
   if (!IsUtf8(name)) {
     return {};  // places in what it was made into tell nothing of its bytes
   }
   SeenName words;
-  SeenName parts;
   words.text = marker.folder.Words(name, &words.origins);
-  parts.text = marker.folder.Parts(name, &parts.origins);
+  const SeenName parts = PartsOf(name, marker.folder);
   const std::vector<NameTokenizer::Place> places = marker.tokenizer.Places(words.text);
   std::vector<Snippet::Mark> marks;
   for (const WordLeaf& leaf : asked.leaves) {
@@ -107,12 +143,19 @@ std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& pa
     }
   }
   const size_t before = path.size() - name.size();
-  std::vector<Snippet::Mark> joined = Joined(std::move(marks));
-  for (Snippet::Mark& mark : joined) {
+  for (Snippet::Mark& mark : marks) {
     mark.start += before;
     mark.end += before;
   }
-  return joined;
+  return marks;
+}
+
+}  // namespace
+
+std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const Entry& entry, NameMarker& marker) {
+  std::vector<Snippet::Mark> marks = MarksInName(asked, entry.path, marker);
+  MarkPathsAndEndings(asked.tree, entry, marker.folder, marks);
+  return Joined(std::move(marks));
 }
 
 int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, TextCutter& cutter,

@@ -14,9 +14,9 @@ namespace fileindexd {
 
 class TextCutter;
 
-// Bytes of the path, in its last component, that answer the question; in order, none in another.
-std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const std::string& path,
-                                       NameMarker& marker);
+// Bytes of the entry's path that answer the question; in order, none in another. Those of path: may
+// stand anywhere, all others in the last component.
+std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const Entry& entry, NameMarker& marker);
 
 // SQLite's code. No snippet where the content shows none of the words.
 int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, TextCutter& cutter,

@@ -1,6 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/reader.h"
 
+#include <sys/stat.h>
+
+#include <chrono>
+#include <thread>
+
 #include "index/entry_table.h"
 #include "index/read_transaction.h"
 #include "index/schema.h"
@@ -10,6 +15,9 @@
 namespace fileindexd {
 
 namespace {
+
+constexpr int MAKING_TRIES = 20;
+constexpr std::chrono::milliseconds MAKING_PAUSE{10};
 
 // False when reading failed. `going` is false once `visit` wanted no more.
 bool VisitAll(Statement& statement, const std::function<bool(const Entry&)>& visit, bool& going) {
@@ -29,6 +37,20 @@ bool VisitAll(Statement& statement, const std::function<bool(const Entry&)>& vis
 
 IndexError EntryReader::Open(const std::string& share_name) {
   return database.OpenForReading(IndexPath(share_name));
+}
+
+// Of a share without a folder there will be none.
+IndexError EntryReader::OpenOnceMade(const std::string& share_name) {
+  IndexError error = Open(share_name);
+  for (int i = 0; i < MAKING_TRIES && error == IndexError::PATH_NOT_FOUND; ++i) {
+    struct stat status {};
+    if (stat(ShareFolder(share_name).c_str(), &status) != 0) {
+      return error;
+    }
+    std::this_thread::sleep_for(MAKING_PAUSE);  // nothing tells when it is there
+    error = Open(share_name);
+  }
+  return error;
 }
 
 bool EntryReader::Summarise(Summary& summary) {

@@ -16,6 +16,9 @@ class EntryReader {
  public:
   // NONE, or why the index of that share cannot be read.
   IndexError Open(const std::string& share_name);
+  // The same. Where there is none it looks again for a fifth of a second: a database that is just
+  // being made, or put in another's place, is not there for some milliseconds.
+  IndexError OpenOnceMade(const std::string& share_name);
 
   struct Summary {
     uint64_t entries = 0;

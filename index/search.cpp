@@ -93,6 +93,7 @@ bool Asker::Impl::HasHits(Question question, const std::string& text) {
   question.limit = 1;
   question.count_all = false;
   question.suggests = false;
+  question.shows = false;
   Answer answer;
   std::string error;
   return AskAll(question, answer, error) && !answer.hits.empty();
@@ -132,7 +133,9 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   made.hits.assign(std::make_move_iterator(best.hits.begin() + skipped),
                    std::make_move_iterator(best.hits.end()));
   for (AskedShare& share : shares) {
-    share.Complete(made.hits);
+    if (question.shows) {
+      share.Complete(made.hits);
+    }
   }
   const bool suggests =
       made.total == 0 && question.suggests && (question.limit > 0 || question.count_all);

@@ -31,6 +31,7 @@ struct Question {
   bool reverse = false;
   bool count_all = true;  // false: of very many hits `total` may count only those looked at
   bool suggests = true;   // without any hit, a suggestion is looked for
+  bool shows = true;      // false: of hits only share, path and what their order needs are told
 };
 
 struct Hit {

@@ -101,7 +101,7 @@ int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
   candidate.entry = hit.entry;
   int code = IsScored() ? SQLITE_OK : score.Score(candidate, hit.score, hit.text);
   code = code == SQLITE_OK ? rows.KindOf(candidate, hit.entry.kind) : code;
-  hit.marks = MarksInPath(asked, hit.entry.path, names);
+  hit.marks = MarksInPath(asked, hit.entry, names);
   return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;
 }
 

@@ -12,16 +12,6 @@ namespace fileindexd {
 
 namespace {
 
-bool IsGreater(const EntryGroup& a, const EntryGroup& b) {
-  if (a.bytes != b.bytes) {
-    return a.bytes > b.bytes;
-  }
-  if (a.entries != b.entries) {
-    return a.entries > b.entries;
-  }
-  return a.name != b.name ? a.name < b.name : a.share < b.share;
-}
-
 std::vector<EntryGroup> Sorted(std::unordered_map<std::string, EntryGroup>& groups) {
   std::vector<EntryGroup> list;
   list.reserve(groups.size());
@@ -43,7 +33,7 @@ class Merge {
       sum.share = by_share ? share : "";
       sum.name = name;
       sum.entries += group.entries;
-      sum.bytes += group.bytes;
+      sum.bytes = AddedBytes(sum.bytes, group.bytes);
     }
     counts.groups.clear();
   }

@@ -16,6 +16,18 @@
 
 namespace fileindexd {
 
+// Bytes add up, and multiply, to INT64_MAX at most: a damaged index may hold any size.
+constexpr int64_t AddedBytes(int64_t a, int64_t b) {
+  int64_t sum = 0;
+  const bool fits = !__builtin_add_overflow(a, b, &sum);
+  return fits ? sum : b < 0 ? INT64_MIN : INT64_MAX;
+}
+constexpr int64_t ManifoldBytes(int64_t bytes, uint64_t times) {
+  int64_t product = 0;
+  const bool fits = !__builtin_mul_overflow(bytes, times, &product);
+  return fits ? product : bytes < 0 ? INT64_MIN : INT64_MAX;
+}
+
 enum class GroupBy : uint8_t {
   KIND,       // "document", …: as found inside where the name tells nothing
   EXTENSION,  // of files and links: "pdf", small letters; "" for none
@@ -67,7 +79,7 @@ struct AlikeFiles {
   uint64_t files = 0;         // different ones, at least two
   std::vector<Place> places;  // the first path of each, at most MOST_PLACES of them
 
-  int64_t Spare() const { return size * static_cast<int64_t>(files - 1); }  // bytes
+  int64_t Spare() const { return ManifoldBytes(size, files - 1); }  // bytes
 };
 
 struct Duplicates {
@@ -89,7 +101,8 @@ struct Statistics {
 };
 
 constexpr uint64_t MOST_LARGEST = 100000;
-constexpr size_t MOST_GROUPS = 50000;  // of one share: names beyond are counted as OTHER_NAMES
+// Of one share. Beyond, those with the most bytes are told, and the rest as OTHER_NAMES.
+constexpr size_t MOST_GROUPS = 50000;
 constexpr const char* OTHER_NAMES = "(others)";
 constexpr size_t MOST_SETS = 1000;
 constexpr size_t MOST_PLACES = 100;

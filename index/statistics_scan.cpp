@@ -33,7 +33,7 @@ bool OpenShare::Open(bool with_contents, std::vector<std::string>& failures) {
   const auto fail = [&](const char* what, IndexError error) {
     failures.push_back("share " + share.name + ": " + what + IndexErrorText(error));
   };
-  const IndexError error = reader.Open(share.name);
+  const IndexError error = reader.OpenOnceMade(share.name);
   if (error != IndexError::NONE) {
     fail("", error);
     return false;
@@ -79,6 +79,16 @@ const char* AgeName(int64_t mtime, int64_t now) {
   return found->name;
 }
 
+bool IsGreater(const EntryGroup& a, const EntryGroup& b) {
+  if (a.bytes != b.bytes) {
+    return a.bytes > b.bytes;
+  }
+  if (a.entries != b.entries) {
+    return a.entries > b.entries;
+  }
+  return a.name != b.name ? a.name < b.name : a.share < b.share;
+}
+
 bool IsLarger(const LargeFile& a, const LargeFile& b) {
   if (a.size != b.size) {
     return a.size > b.size;
@@ -90,14 +100,47 @@ void GroupCounts::Add(std::string_view name, const CountedEntry& entry) {
   key = name;
   auto group = groups.find(key);
   if (group == groups.end()) {
-    if (groups.size() >= MOST_GROUPS) {
+    if (is_settled) {
       key = OTHER_NAMES;
+    } else if (groups.size() >= 2 * MOST_GROUPS) {
+      KeepGreatest();
     }
     group = groups.try_emplace(key).first;
     group->second.name = key;
   }
   ++group->second.entries;
-  group->second.bytes += entry.is_further_name ? 0 : entry.size;
+  group->second.bytes = AddedBytes(group->second.bytes, entry.is_further_name ? 0 : entry.size);
+}
+
+void GroupCounts::KeepGreatest() {
+  std::vector<const EntryGroup*> order;
+  order.reserve(groups.size());
+  for (const auto& [name, group] : groups) {
+    order.push_back(&group);
+  }
+  const auto least = order.begin() + static_cast<std::ptrdiff_t>(MOST_GROUPS);
+  std::nth_element(order.begin(), least, order.end(),
+                   [](const EntryGroup* a, const EntryGroup* b) { return IsGreater(*a, *b); });
+  std::vector<std::string> gone;
+  for (auto group = least; group != order.end(); ++group) {
+    gone.push_back((*group)->name);
+  }
+  for (const std::string& name : gone) {
+    groups.erase(name);
+  }
+  was_cut = true;
+}
+
+bool GroupCounts::Settle() {
+  if (groups.size() > MOST_GROUPS) {
+    KeepGreatest();
+  }
+  is_settled = true;
+  for (auto& [name, group] : groups) {
+    group.entries = was_cut ? 0 : group.entries;
+    group.bytes = was_cut ? 0 : group.bytes;
+  }
+  return was_cut;
 }
 
 // The index by inode alone tells which have several entries; only those are looked up.
@@ -142,14 +185,22 @@ std::string StatisticsScan::EntriesSql() const {
 }
 
 int StatisticsScan::Run() {
-  Statement rows;
+  totals.share = open.share.name;
   int code = FindFurtherNames();
-  code = code == SQLITE_OK ? rows.Prepare(open.reader.database.db, EntriesSql().c_str()) : code;
+  code = code == SQLITE_OK ? Walk(&StatisticsScan::Count) : code;
+  counts_groups = groups.Settle();
+  counts_born = born.Settle();
+  return code == SQLITE_OK && (counts_groups || counts_born) ? Walk(&StatisticsScan::CountGroups)
+                                                             : code;
+}
+
+int StatisticsScan::Walk(void (StatisticsScan::*count)(const CountedEntry& entry)) {
+  Statement rows;
+  int code = rows.Prepare(open.reader.database.db, EntriesSql().c_str());
   if (code != SQLITE_OK) {
     return code;
   }
 
-  totals.share = open.share.name;
   auto further = further_names.begin();
   for (code = rows.Step(); code == SQLITE_ROW; code = rows.Step()) {
     const int64_t id = rows.Int(0);
@@ -162,20 +213,24 @@ int StatisticsScan::Run() {
                        .size = rows.Int(7)};
     entry.is_further_name = further != further_names.end() && *further == id;
     further += entry.is_further_name ? 1 : 0;
-    Count(entry);
+    (this->*count)(entry);
   }
   return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
 void StatisticsScan::Count(const CountedEntry& entry) {
   CountTotals(entry);
-  if (wish.by.has_value()) {
-    CountGroup(entry);
-  }
+  CountGroups(entry);
   if (wish.largest > 0 && entry.thing == Thing::FILE && !entry.is_further_name) {
     CountLarge(entry);
   }
-  if (wish.born_since.has_value() && entry.born >= *wish.born_since) {
+}
+
+void StatisticsScan::CountGroups(const CountedEntry& entry) {
+  if (counts_groups && wish.by.has_value()) {
+    CountGroup(entry);
+  }
+  if (counts_born && wish.born_since.has_value() && entry.born >= *wish.born_since) {
     born.Add(FolderOf(entry), entry);
   }
 }
@@ -194,7 +249,7 @@ void StatisticsScan::CountTotals(const CountedEntry& entry) {
     case Thing::NONE:
       break;
   }
-  totals.bytes += entry.is_further_name ? 0 : entry.size;
+  totals.bytes = AddedBytes(totals.bytes, entry.is_further_name ? 0 : entry.size);
 }
 
 void StatisticsScan::CountGroup(const CountedEntry& entry) {

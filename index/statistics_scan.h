@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// The numbers of one share: a walk through its entries in the order in which they lie on disk.
+// The numbers of one share: a walk through its entries in the order in which they lie on disk, and
+// another one where there are more names of groups than are kept.
 #pragma once
 
 #include <memory>
@@ -43,15 +44,22 @@ struct CountedEntry {
   bool is_further_name = false;  // of a file that counted already
 };
 
-// Groups by their names, a bounded number of them.
+// Groups by their names, at most twice MOST_GROUPS of them: of more, the lesser half goes. What has
+// gone may come again, so after that only a second count is right.
 class GroupCounts {
  public:
   void Add(std::string_view name, const CountedEntry& entry);
+  // Once all were added. True when all have to be added again, now to the greatest names alone.
+  bool Settle();
 
   std::unordered_map<std::string, EntryGroup> groups;
 
  private:
-  std::string key;  // kept for its memory
+  void KeepGreatest();
+
+  bool was_cut = false;
+  bool is_settled = false;  // no name comes any more
+  std::string key;          // kept for its memory
 };
 
 class StatisticsScan {
@@ -67,9 +75,11 @@ class StatisticsScan {
 
  private:
   int FindFurtherNames();
+  int Walk(void (StatisticsScan::*count)(const CountedEntry& entry));
   std::string EntriesSql() const;
   void Count(const CountedEntry& entry);
   void CountTotals(const CountedEntry& entry);
+  void CountGroups(const CountedEntry& entry);
   void CountGroup(const CountedEntry& entry);
   void CountLarge(const CountedEntry& entry);
   std::string_view FolderOf(const CountedEntry& entry) const;
@@ -77,6 +87,8 @@ class StatisticsScan {
   const StatisticsWish& wish;
   OpenShare& open;
   std::vector<int64_t> further_names;  // rowids, ascending
+  bool counts_groups = true;
+  bool counts_born = true;
 };
 
 // "pdf" of "a.PDF"; empty where there is none: no dot but at the front, or nothing like an ending
@@ -84,6 +96,8 @@ class StatisticsScan {
 std::string ExtensionOf(std::string_view path);
 const char* AgeName(int64_t mtime, int64_t now);  // nanoseconds
 
+// In the order in which they are told.
+bool IsGreater(const EntryGroup& a, const EntryGroup& b);
 bool IsLarger(const LargeFile& a, const LargeFile& b);
 
 }  // namespace fileindexd

@@ -27,12 +27,15 @@ void AddSearch(Declarer& declare) {
   search->add_flag("--reverse", into.reverse, "The other way round");
   AddOption(search, "--limit", into.limit, "N", "At most so many hits; 20 if not given");
   AddOption(search, "--offset", into.offset, "N", "Leave out so many of the first");
-  search->add_flag("--count", into.count, "The number of hits alone");
+  search->add_flag("--count", into.count,
+                   "The number of hits alone, on a line; with --json as {\"count\":N}");
   CLI::Option* wait =
       search->add_flag("--wait", into.wait, "Once all that has happened to files is in the index");
   AddOption(search, "--timeout", into.timeout, "S", "Wait for S seconds at most; 60 if not given")
       ->needs(wait);
-  CLI::Option* json = AddJson(search, into, "One JSON object a line; marks count in bytes");
+  CLI::Option* json = AddJson(
+      search, into,
+      "One JSON object a line; marks count bytes: of path_hex where that is given, else of path");
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")->excludes(json);
   search->footer(
       "Every word of QUERY must stand in a file's name or content. \"words in a row\", begin*,\n"
@@ -68,7 +71,9 @@ void AddStats(Declarer& declare) {
             "What was added since, by folder: 90s, 15m, 2h, 7d");
   AddJson(stats, into, "One JSON document");
   stats->footer(
-      "Each name of a file counts, its bytes count once: at the first of its paths.\n"
+      "Each name of a file counts, its bytes count once in a share: at the first of its paths\n"
+      "there. A file with names in several shares counts in each, and so more than once in the\n"
+      "line (all).\n"
       "ext and age (since the last change) are of files and links alone; folder is the one\n"
       "right below the share's. Alike are, of the files whose content is indexed, those of\n"
       "one size whose beginning, middle and end are the same: probably, as nothing is\n"

@@ -45,6 +45,12 @@ std::string InDigits(int32_t code, std::string_view bytes) {
   return digits;
 }
 
+// Terminals may know characters that the library does not. Where pictures and ideographs are added.
+bool IsWideOnceAssigned(int32_t code) {
+  return (code >= 0x3400 && code <= 0x9fff) || (code >= 0xf900 && code <= 0xfaff) ||
+         (code >= 0x1f300 && code <= 0x1faff) || (code >= 0x20000 && code <= 0x3fffd);
+}
+
 // As terminals count them, where the library says something else: vowel signs that stand beside
 // their letter, Arabic signs that hold a number, and the parts of a Hangul syllable behind its
 // first.
@@ -56,6 +62,9 @@ size_t ColumnsOfCharacter(int32_t code) {
   }
   if (code >= 0x1160 && code <= 0x11ff) {
     return 0;
+  }
+  if (category == UTF8PROC_CATEGORY_CN) {
+    return IsWideOnceAssigned(code) ? 2 : 1;
   }
   return static_cast<size_t>(std::max(0, utf8proc_charwidth(code)));
 }
@@ -198,6 +207,30 @@ Cells CutAround(const Cells& cells, size_t columns) {
   return shown;
 }
 
+std::vector<std::string> WrappedLines(std::string_view text, size_t columns) {
+  const size_t room = columns > 1 ? columns - 1 : 1;
+  const Cells cells = CellsOf(text);
+  std::vector<std::string> lines;
+  for (size_t first = 0; first < cells.size();) {
+    size_t end = first + std::max<size_t>(Fitting(cells, first, room), 1);
+    if (end < cells.size() && cells[end].text != " ") {
+      size_t blank = end;
+      while (blank > first && cells[blank - 1].text != " ") {
+        --blank;
+      }
+      end = blank > first ? blank : end;
+    }
+    const auto at = [&cells](size_t i) { return cells.begin() + static_cast<std::ptrdiff_t>(i); };
+    std::string line = ShowCells({at(first), at(end)}, false);
+    line.erase(line.find_last_not_of(' ') + 1);
+    lines.push_back(std::move(line));
+    for (first = end; first < cells.size() && cells[first].text == " ";) {
+      ++first;
+    }
+  }
+  return lines;
+}
+
 std::string ShowCells(const Cells& cells, bool has_colours) {
   std::string shown;
   bool bright = false;
@@ -209,6 +242,22 @@ std::string ShowCells(const Cells& cells, bool has_colours) {
     shown += cell.text;
   }
   return bright ? shown + PLAIN : shown;
+}
+
+std::string EscapedJson(std::string_view json) {
+  constexpr int32_t REPLACEMENT = 0xfffd;
+  std::string escaped;
+  for (size_t at = 0, bytes = 0; at < json.size(); at += bytes) {
+    const std::optional<int32_t> code = TakeCharacter(json.substr(at), bytes);
+    if (code.has_value() && !IsShownInDigits(*code)) {
+      escaped += json.substr(at, bytes);
+      continue;
+    }
+    char text[16];  // all of them are below 0x10000
+    (void)snprintf(text, sizeof text, "\\u%04x", static_cast<unsigned>(code.value_or(REPLACEMENT)));
+    escaped += text;
+  }
+  return escaped;
 }
 
 }  // namespace fileindexd

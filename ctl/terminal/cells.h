@@ -34,7 +34,13 @@ Cells CutMiddle(const Cells& cells, size_t columns);
 // At the end; also at the start where the first marked cells would not be seen otherwise.
 Cells CutAround(const Cells& cells, size_t columns);
 
+// The text in lines of less than that many columns, parted at blanks where that can be.
+std::vector<std::string> WrappedLines(std::string_view text, size_t columns);
+
 // Marked cells bright, if there are colours.
 std::string ShowCells(const Cells& cells, bool has_colours);
+
+// JSON text that means the same, with what would be shown in digits escaped.
+std::string EscapedJson(std::string_view json);
 
 }  // namespace fileindexd

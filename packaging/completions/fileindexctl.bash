@@ -56,6 +56,11 @@ _fileindexctl_value() {
   esac
 }
 
+# Lines of `$1 share list`. Asked where there is no state, it would make one.
+_fileindexctl_shares() {
+  [[ -e ${FILEINDEXD_STATE_DIR:-/var/lib/fileindexd}/state.db ]] && "$1" share list 2>/dev/null
+}
+
 # Fills COMPREPLY with what of `$1` (see above) begins with `$2`. `$3`: the program.
 _fileindexctl_reply() {
   local name plain
@@ -68,7 +73,7 @@ _fileindexctl_reply() {
         [[ $name == "$plain"* ]] || continue
         [[ $2 == [\"\']* ]] || printf -v name '%q' "$name"
         COMPREPLY+=("$name")
-      done < <("$3" share list 2>/dev/null)
+      done < <(_fileindexctl_shares "$3")
       ;;
     @file | @folder)
       # Outside of a completion there is nothing to set.
@@ -81,15 +86,30 @@ _fileindexctl_reply() {
   esac
 }
 
+# Fills `words` with the words of the line, up to the one being completed. The shell parts them at
+# ':' and '=' too; what no blank stands between is one.
+_fileindexctl_words() {
+  local rest=$COMP_LINE at blanks
+  for ((at = 0; at <= COMP_CWORD; ++at)); do
+    blanks=${rest%%[![:blank:]]*}
+    rest=${rest#"$blanks"}
+    if [[ -n $blanks || at -eq 0 ]]; then
+      words+=("${COMP_WORDS[at]}")
+    else
+      words[-1]+=${COMP_WORDS[at]}
+    fi
+    rest=${rest#"${COMP_WORDS[at]}"}
+  done
+}
+
 _fileindexctl() {
-  local current=${COMP_WORDS[COMP_CWORD]} previous='' command='' value count=0 at word
+  local words=() current previous='' command='' value count=0 word
   COMPREPLY=()
-  # "--option=value" comes in three words. Which command it is, and how many arguments it has so far.
-  for ((at = 1; at < COMP_CWORD; ++at)); do
-    word=${COMP_WORDS[at]}
-    if [[ $word == '=' ]]; then
-      continue
-    elif [[ -n $previous && -n $(_fileindexctl_value "$command" "$previous") ]]; then
+  _fileindexctl_words
+  current=${words[-1]}
+  # Which command it is, and how many arguments it has so far.
+  for word in "${words[@]:1:${#words[@]}-2}"; do
+    if [[ -n $previous && -n $(_fileindexctl_value "$command" "$previous") ]]; then
       previous=''
       continue
     fi
@@ -101,10 +121,11 @@ _fileindexctl() {
       *) ((++count)) ;;
     esac
   done
-  if [[ $current == '=' ]]; then
-    current=''
-  fi
 
+  if [[ $current == --*=* ]]; then
+    previous=${current%%=*}
+    current=${current#*=}
+  fi
   value=$(_fileindexctl_value "$command" "$previous")
   if [[ -n $value ]]; then
     _fileindexctl_reply "$value" "$current" "${1:-fileindexctl}"
@@ -115,6 +136,12 @@ _fileindexctl() {
     _fileindexctl_reply "$(_fileindexctl_positional "$command" $((count + 1)))" "$current" \
       "${1:-fileindexctl}"
   fi
+
+  # The shell replaces what stands behind the last ':' or '=' alone.
+  local last=${COMP_WORDS[COMP_CWORD]}
+  [[ $last == *[!:=]* ]] || last=''
+  local kept=${current%"$last"}
+  COMPREPLY=("${COMPREPLY[@]#"$kept"}")
   return 0
 }
 

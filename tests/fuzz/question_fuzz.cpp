@@ -63,7 +63,7 @@ class Index {
     Require(table.Insert(entry) == SQLITE_OK, "a name of any bytes");
     Run(question, asked);
     size_t before = 0;
-    for (const Snippet::Mark& mark : MarksInPath(asked, entry.path, marker)) {
+    for (const Snippet::Mark& mark : MarksInPath(asked, entry, marker)) {
       Require(mark.start >= before && mark.start < mark.end && mark.end <= entry.path.size(),
               "marks lie in the path, in order");
       before = mark.end;

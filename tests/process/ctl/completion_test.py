@@ -64,15 +64,23 @@ class CompletionTest(IndexTest):
 
 
 class BashTest(CompletionTest):
+    @staticmethod
+    def pieces(word):
+        """As the shell parts a word that is not in quotes."""
+        return [word] if word[:1] in ("", "'") else re.findall(r"[:=]+|[^:=]+", word)
+
     def offered(self, *words, **more):
         """What the function leaves in COMPREPLY, sorted."""
         script = (
-            'source "$0"; program=$1; shift; COMP_WORDS=("$program" "$@"); COMP_CWORD=$#; '
+            'source "$0"; program=$1; COMP_LINE="$program $2"; shift 2; '
+            'COMP_WORDS=("$program" "$@"); COMP_CWORD=$#; '
             '_fileindexctl "$program" "${@: -1}" "${COMP_WORDS[COMP_CWORD-1]}"; '
             'printf "%s\\0" "${COMPREPLY[@]}"'
         )
+        pieces = [piece for word in words for piece in self.pieces(word)]
         done = subprocess.run(
-            ["bash", "--norc", "-c", script, BASH, program("fileindexctl"), *words],
+            ["bash", "--norc", "-c", script, BASH, program("fileindexctl"), " ".join(words),
+             *pieces],
             env=environment(**more),
             capture_output=True,
             check=True,
@@ -88,10 +96,10 @@ class BashTest(CompletionTest):
                 self.assertEqual(self.offered(*words), wanted)
 
     def test_values_behind_an_equals_sign(self):
-        self.assertEqual(self.offered("search", "--kind", "="), KINDS)
-        self.assertEqual(self.offered("search", "--kind", "=", "v"), ["video"])
-        self.assertEqual(self.offered("search", "--kind", "=", "photo", "--so"), ["--sort"])
-        self.assertEqual(self.offered("folder", "set", "--document", "=", "o"), ["off", "on"])
+        self.assertEqual(self.offered("search", "--kind="), KINDS)
+        self.assertEqual(self.offered("search", "--kind=v"), ["video"])
+        self.assertEqual(self.offered("search", "--kind=photo", "--so"), ["--sort"])
+        self.assertEqual(self.offered("folder", "set", "--document=o"), ["off", "on"])
         self.assertEqual(self.offered("folder", "set", "--doc"), ["--document="])
 
     def test_every_option_of_every_command_and_no_other(self):
@@ -126,6 +134,29 @@ class BashTest(CompletionTest):
         self.assertEqual(self.offered("dump", ""), ["a\\$b", "alpha", "beta", "my\\ files"])
         self.assertEqual(self.offered("dump", "my\\ f"), ["my\\ files"])
         self.assertEqual(self.offered("dump", "'my f"), ["my files"])
+
+    def test_names_that_the_shell_parts(self):
+        for name in ("a:b", "a:c=d", "a::"):
+            self.make_share(name)
+        self.make_files(self.root, "x=1:2/y:z")
+
+        self.assertEqual(self.offered("dump", "a"), ["a::", "a:b", "a:c=d", "alpha"])
+        # The shell puts what is offered behind the last ':' or '='.
+        self.assertEqual(self.offered("dump", "a:"), [":", "b", "c=d"])
+        self.assertEqual(self.offered("dump", "a:c"), ["c=d"])
+        self.assertEqual(self.offered("dump", "a:c="), ["d"])
+        self.assertEqual(self.offered("search", "--share=a:b"), ["b"])
+        self.assertEqual(self.offered("search", "--share", "a:b", "--so"), ["--sort"])
+        self.assertEqual(self.offered("verify", "a:b", "--re"), ["--repair"])
+        self.assertEqual(self.offered("dump", "'a:c"), ["a:c=d"])
+        self.assertEqual(self.offered("info", f"{self.root}/x=1:2/y:"), ["z"])
+
+    def test_no_state_is_made(self):
+        nowhere = {"FILEINDEXD_STATE_DIR": f"{namespace.RUN}/nowhere"}
+
+        self.assertEqual(self.offered("dump", "", **nowhere), [])
+        self.assertEqual(self.offered("search", "--share", "a", **nowhere), [])
+        self.assertFalse(os.path.lexists(f"{namespace.RUN}/nowhere"))
 
     def test_without_a_state_no_share_is_offered(self):
         broken = {"FILEINDEXD_STATE_DIR": f"{namespace.STATE}/state.db/none"}
@@ -175,6 +206,7 @@ class ZshTest(CompletionTest):
         os.close(terminal)
         os.close(theirs)
         self.addCleanup(self.end)
+        self.theirs = theirs
         self.type(f"source {setup}\n")
 
     def end(self):
@@ -217,6 +249,13 @@ class ZshTest(CompletionTest):
 
     def test_values_behind_an_equals_sign(self):
         self.assertEqual(self.offered("folder", "set", "--document="), ["off", "on"])
+
+    def test_no_state_is_made(self):
+        nowhere = f"{namespace.RUN}/nowhere"
+        self.type(f"FILEINDEXD_STATE_DIR={nowhere}; print -u {self.theirs} END\n")
+
+        self.assertEqual(self.offered("worker", "drop", ""), [])
+        self.assertFalse(os.path.lexists(nowhere))
 
 
 if __name__ == "__main__":

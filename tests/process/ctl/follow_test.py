@@ -8,6 +8,7 @@ import pty
 import select
 import shutil
 import signal
+import sqlite3
 import subprocess
 import time
 
@@ -169,7 +170,7 @@ class FollowTest(IndexTest):
         self.assertEqual(blocks[-1], b"daemon does not run\npaused without end\n")
         self.assertNotIn(b"\033", follower.received)
 
-    def test_a_terminal_is_drawn_in_place(self):
+    def open_terminal(self):
         if not os.path.exists("/dev/pts"):
             os.mkdir("/dev/pts")
             namespace.mount("devpts", "/dev/pts", "devpts", options="newinstance,ptmxmode=0666")
@@ -179,6 +180,25 @@ class FollowTest(IndexTest):
         follower = Follower(stdout=slave)
         os.close(slave)
         follower.fd = master
+        self.addCleanup(os.close, master)
+        return follower
+
+    def test_a_terminal_wraps_lines_again_however_it_ends(self):
+        follower = self.open_terminal()
+        follower.await_shown(lambda received: b"\033[?7l" in received and b"not" in received)
+        with sqlite3.connect(f"{namespace.STATE}/state.db") as state:
+            for (table,) in state.execute("SELECT name FROM sqlite_master WHERE type = 'table'"
+                                          " AND name NOT LIKE 'sqlite%'").fetchall():
+                state.execute(f"ALTER TABLE {table} RENAME TO {table}_away")
+        state.close()
+
+        follower.await_shown(lambda received: received.endswith(b"\033[?7h"))
+        code, error = follower.finish()
+        self.assertEqual(code, 1)
+        self.assertRegex(error, rb"\Afileindexctl: [^\n]+\n\Z")
+
+    def test_a_terminal_is_drawn_in_place(self):
+        follower = self.open_terminal()
         follower.await_shown(lambda received: b"not paused" in received)
         self.ctl("pause")
         shown = follower.await_shown(
@@ -188,7 +208,7 @@ class FollowTest(IndexTest):
         self.assertIn(b"\033[2J\033[H", shown)
         self.assertIn(b"\033[H", shown.partition(b"not paused")[2])
         self.assertEqual(follower.stop(), (0, b""))
-        os.close(master)
+        follower.await_shown(lambda received: received.endswith(b"\033[?7h"))
 
 
 class ProgressTest(IndexTest):

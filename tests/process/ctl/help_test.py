@@ -5,6 +5,7 @@ import re
 import shlex
 
 from ctl.completion_test import commands
+from ctl.follow_test import Follower
 from harness import IndexTest, main, namespace
 
 EXAMPLE = re.compile(r"\nExample:\n((?:  fileindexctl [^\n]+\n)+)\Z")
@@ -40,6 +41,45 @@ class HelpTest(IndexTest):
                     self.assertEqual(tuple(example[: len(command)]), command)
                     result = self.try_ctl(*example, **self.state)
                     self.assertIn(result.code, (0, 1, 3), result)
+
+    def make_machine(self):
+        """The folders that the examples name, and a daemon."""
+        namespace.mount("tmpfs", "/srv", "tmpfs")
+        self.addCleanup(namespace.unmount, "/srv", namespace.MNT_DETACH)
+        for name in ("letters", "photos", "projects"):
+            self.make_files(f"/srv/{name}", "2024/", "old/", "annual report.txt", "new.jpg")
+        self.start()
+
+    def run_examples(self, command):
+        for example in self.examples(*command):
+            with self.subTest(example=example):
+                if "--follow" in example:
+                    follower = Follower(*example[2:])
+                    follower.await_shown(lambda received: b"share projects\n" in received)
+                    self.assertEqual(follower.stop(), (0, b""))
+                else:
+                    self.ctl(*example)
+
+    def test_on_a_machine_like_theirs_each_example_succeeds(self):
+        left = commands(self.ctl)
+        self.make_machine()
+        for command in (("share", "add"), ("folder", "add")):
+            self.run_examples(command)
+            for name in ("letters", "photos", "projects"):
+                if command == ("folder", "add"):
+                    self.ctl(*command, f"/srv/{name}/old")
+                elif name != "photos":
+                    self.ctl(*command, name, f"/srv/{name}")
+            left.remove(command)
+        left.remove(("share", "remove"))
+        self.await_drained("projects")
+
+        for command in left:
+            self.run_examples(command)
+        self.run_examples(("share", "remove"))
+
+        shares = self.ctl("share", "list", "--json").json()
+        self.assertEqual([share["name"] for share in shares], ["letters", "projects"])
 
     def test_what_is_no_option_is_refused_in_every_example(self):
         for command in commands(self.ctl):

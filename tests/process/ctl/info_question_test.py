@@ -1,6 +1,9 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """info --terms and --query: the words of a content, and why a question finds it or not."""
 
+import os
+import sqlite3
+
 from harness import main
 from search.library import ContentsTest
 
@@ -64,6 +67,48 @@ class ReadingTest(InfoQuestionTest):
         plain = self.ctl("info", self.path).out.decode()
         self.assertIn("content state", plain)
         self.assertRegex(plain, rf"content read by +version {stored['extractor']}\n")
+
+
+    def stop_all(self):
+        service = self.service_pid()
+        self.stop(self.daemon_pid())
+        self.await_exit(service)
+
+    def test_what_is_not_read_yet_waits(self):
+        self.stop_all()
+        with sqlite3.connect(self.contents()) as contents:
+            contents.execute("DELETE FROM files")
+        contents.close()
+
+        stored = self.ctl("info", self.path, "--json").json()["stored"]
+        self.assertEqual((stored["state"], stored["extractor"]), ("waiting", 0))
+        self.assertRegex(self.ctl("info", self.path).out, rb"\n  content state +waiting\n")
+        self.assertIsNone(self.ctl("info", self.root, "--json").json()["stored"])
+
+        for name in os.listdir(os.path.dirname(self.contents())):
+            os.unlink(f"{os.path.dirname(self.contents())}/{name}")
+        stored = self.ctl("info", self.path, "--json").json()["stored"]
+        self.assertEqual(stored["state"], "waiting")
+
+    def test_contents_that_cannot_be_read_are_named(self):
+        self.stop_all()
+        self.assertEqual(self.ctl("info", self.path, "--json").json()["content_problem"], "")
+        with sqlite3.connect(self.contents()) as contents:
+            contents.execute("UPDATE texts SET packed = x'00'")
+        contents.close()
+
+        self.check_problem("cannot be read")
+        for name in os.listdir(os.path.dirname(self.contents())):
+            os.unlink(f"{os.path.dirname(self.contents())}/{name}")
+        self.write(self.contents(), "no database at all")
+        self.check_problem(".")
+
+    def check_problem(self, pattern):
+        answer = self.ctl("info", self.path, "--json").json()
+        self.assertRegex(answer["content_problem"], pattern)
+        self.assertIsNone(answer["stored"])
+        self.assertRegex(self.ctl("info", self.path).out.decode(),
+                         rf"\n  content problem +{answer['content_problem']}\n")
 
 
 class QueryTest(InfoQuestionTest):

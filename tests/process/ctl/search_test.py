@@ -56,6 +56,12 @@ class SearchTest(IndexTest):
             self.hits("--under", f"{self.root}/office", "beach"), ["alpha/office/report beach.pdf"]
         )
 
+    def test_count_is_a_line_or_an_object(self):
+        self.assertEqual(self.ctl("search", "--count", "beach").out, b"5\n")
+        self.assertEqual(self.ctl("search", "--count", "--json", "beach").out, b'{"count":5}\n')
+        # NUL ends paths, and a number is none.
+        self.assertEqual(self.ctl("search", "--count", "-0", "beach").out, b"5\n")
+
     def test_limit_offset_and_count(self):
         everything = self.ctl("search", "beach").out.splitlines()
         self.assertEqual(len(everything), 5)

@@ -3,6 +3,7 @@
 
 import os
 import shutil
+import sqlite3
 import time
 
 from ctl.terminal import Terminal, width
@@ -121,6 +122,13 @@ class CountsTest(StatsTest):
         self.assertEqual([one["path"] for one in self.stats("--largest", "2")["largest"]],
                          [f"{self.root}/a/Again.ogg", f"{self.root}/a/one.pdf"])
 
+    def test_a_file_with_names_in_two_shares_counts_in_each(self):
+        os.link(f"{self.root}/a/song.mp3", f"{self.other}/song.mp3")
+        self.index(self.root, self.other)
+
+        self.assertEqual(self.stats()["total"]["bytes"], 5250 + 10000 + 3000)
+        self.assertIn(b"counts in each, and so more than once", self.ctl("stats", "--help").out)
+
     def test_largest(self):
         self.index(self.root, self.other)
 
@@ -144,6 +152,27 @@ class CountsTest(StatsTest):
         self.assertLessEqual(abs(answer["since"] - (time.time() - DAY)), 600)
         self.assertEqual(self.stats("--growth", "0s")["growth"]["folders"], [])
 
+    def test_growth_leaves_out_what_is_older(self):
+        self.index(self.root)
+        self.stop(self.daemon_pid())
+        database = sqlite3.connect(f"{namespace.STATE}/shares/alpha/index/entries.db")
+        old = int((time.time() - 3 * DAY) * 1e9)
+        for column, path in (("birth_time", "a/song.mp3"), ("birth_time", "c/three.txt"),
+                             ("first_seen", "a/one.pdf")):
+            database.execute(f"UPDATE entries SET {column} = ? WHERE path = ?",
+                             (old, os.fsencode(f"{self.root}/{path}")))
+        database.commit()
+        database.close()
+
+        def grown(duration):
+            folders = self.stats("--growth", duration)["growth"]["folders"]
+            return {one["path"]: (one["entries"], one["bytes"]) for one in folders}
+
+        root = self.root
+        self.assertEqual(grown("2d"), {f"{root}/a": (4, 1500), f"{root}/c": (1, 0),
+                                       root: (4, 50), f"{root}/empty": (1, 0)})
+        self.assertEqual(grown("4d")[f"{root}/a"], (5, 4500))
+
     def test_a_disk_that_is_gone_is_not_missed(self):
         self.index(self.root)
         before = self.stats("--by", "folder")
@@ -154,13 +183,15 @@ class CountsTest(StatsTest):
 
     def test_on_a_screen_bytes_are_short_and_nothing_is_too_wide(self):
         self.index(self.root, self.other)
-        command = [program("fileindexctl"), "stats", "--by", "folder", "--largest", "9"]
+        command = [program("fileindexctl"), "stats", "--by", "folder", "--largest", "9",
+                   "--duplicates"]
 
-        for columns in (10, 40, 80):
-            shown = Terminal(command, columns)
-            self.assertEqual((shown.code, shown.err), (0, b""))
-        for line in shown.lines():
-            self.assertLess(width(line), 80)
+        for columns in (2, 5, 10, 20, 31, 40, 80):
+            with self.subTest(columns=columns):
+                shown = Terminal(command, columns)
+                self.assertEqual((shown.code, shown.err), (0, b""))
+                for line in [*shown.lines(), *Terminal(command[:2], columns).lines()]:
+                    self.assertLess(width(line), columns, line)
         self.assertRegex(shown.lines()[0], r"\ABYTES  ENTRIES  FOLDER\Z")
         self.assertIn(f" 9.8K        2  {self.other}/a", shown.lines())
 

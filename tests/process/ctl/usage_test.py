@@ -109,6 +109,24 @@ class UsageTest(IndexTest):
         self.assertEqual(done.returncode, 1)
         self.assertRegex(done.stderr, rb"\Afileindexctl: [^\n]+\n\Z")
 
+    def test_a_reader_that_has_enough_is_no_failure(self):
+        self.make_share()
+        for arguments in (("share", "list"), ("share", "list", "--json"), ("status",),
+                          ("search", "--help"), ("folder", "list")):
+            with self.subTest(arguments=arguments):
+                read_end, write_end = os.pipe()
+                os.close(read_end)
+                done = subprocess.run(
+                    [program("fileindexctl"), *arguments],
+                    stdout=write_end,
+                    stderr=subprocess.PIPE,
+                    env=environment(),
+                    check=False,
+                    timeout=LIMIT,
+                )
+                os.close(write_end)
+                self.assertEqual((done.returncode, done.stderr), (0, b""))
+
     def test_state_folder_is_private(self):
         self.make_share()
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/terminal/cells.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace fileindexd {
@@ -32,7 +33,9 @@ TEST(CellsTest, ColumnsAreThoseOfATerminal) {
       {"\u1112\u1161\u11ab", 2, 1},  // a Hangul syllable in parts
       {"\u0915\u093e", 2, 2},        // a vowel sign beside its letter
       {"\U0001f600", 2, 1},
-      {"a\u200db", 2, 2},  // a joiner takes no room
+      {"a\u200db", 2, 2},      // a joiner takes no room
+      {"a\u0378b", 3, 3},      // no character yet: it takes room all the same
+      {"a\U0001faffb", 4, 3},  // and more, where it will be a picture
       {"\t", 4, 1},
       {"\x7f\x1b", 8, 2},
       {"\u0085", 8, 1},  // a control character of two bytes
@@ -53,6 +56,22 @@ TEST(CellsTest, ColumnsAreThoseOfATerminal) {
 TEST(CellsTest, WhatWouldMoveTheCursorIsShownInDigits) {
   EXPECT_EQ(ShowCells(CellsOf("a\x1b[1mb\n\xff\u009b\u202e"), true),
             "a\\x1b[1mb\\x0a\\xff\\xc2\\x9b\\u202e");
+}
+
+TEST(EscapedJsonTest, MeansTheSameAndActsOnNothing) {
+  EXPECT_EQ(EscapedJson("{\"a\":\"gr\u00fc\u00df \\n\"}"), "{\"a\":\"gr\u00fc\u00df \\n\"}");
+  EXPECT_EQ(EscapedJson("\"\x7f\u009b\u202e\u2028\""), "\"\\u007f\\u009b\\u202e\\u2028\"");
+  EXPECT_EQ(EscapedJson("\"\xff\""), "\"\\ufffd\"");
+}
+
+TEST(WrappedLinesTest, PartsAtBlanks) {
+  using testing::ElementsAre;
+  EXPECT_THAT(WrappedLines("one two three", 20), ElementsAre("one two three"));
+  EXPECT_THAT(WrappedLines("one two three", 9), ElementsAre("one two", "three"));
+  EXPECT_THAT(WrappedLines("one two three", 8), ElementsAre("one two", "three"));
+  EXPECT_THAT(WrappedLines("one two three", 5), ElementsAre("one", "two", "thre", "e"));
+  EXPECT_THAT(WrappedLines("\u6771\u4eac", 1), ElementsAre("\u6771", "\u4eac"));
+  EXPECT_THAT(WrappedLines("", 9), ElementsAre());
 }
 
 TEST(CellsTest, MarksAreBrightWhereThereAreColours) {

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <malloc.h>
 
 #include "ctl/terminal/cells.h"
 #include "ctl/terminal/figures.h"
@@ -21,6 +22,17 @@ Hit FileAt(const std::string& path, int64_t size = 2048) {
   hit.entry.size = size;
   hit.entry.mtime = int64_t{1767225600} * 1'000'000'000;
   return hit;
+}
+
+std::vector<std::string> HitLines(const std::vector<Hit>& hits, const Screen& screen) {
+  const HitFormat format(hits, screen);
+  std::vector<std::string> lines;
+  for (const Hit& hit : hits) {
+    for (std::string& line : format.Lines(hit)) {
+      lines.push_back(std::move(line));
+    }
+  }
+  return lines;
 }
 
 class HitLinesTest : public testing::Test {
@@ -62,6 +74,16 @@ TEST_F(HitLinesTest, TheLastColumnOfTheScreenStaysFree) {
       EXPECT_LT(ColumnsOf(CellsOf(line)), columns);
     }
   }
+}
+
+TEST_F(HitLinesTest, ALongAnswerTakesNoMemoryBesideItsHits) {
+  const std::vector<Hit> hits(20000, FileAt("/s/" + std::string(60, 'x')));
+  const size_t before = mallinfo2().uordblks;
+
+  const HitFormat format(hits, {200, false});
+  EXPECT_EQ(format.Lines(hits.front()).size(), 1u);
+
+  EXPECT_LT(mallinfo2().uordblks, before + 100'000);
 }
 
 TEST_F(HitLinesTest, WideAndCombinedNamesStandInOneColumn) {
@@ -107,6 +129,23 @@ TEST(TableTest, IsColumnsOnAScreenAndTabulatorsElsewhere) {
               ElementsAre("1\tname", "12345\ta\\x0ab"));
   EXPECT_THAT(TableLines({"N", "NAME"}, {{"1", "a long name"}}, Screen{9, false}),
               ElementsAre("N  NAME", "1  a…ame"));
+}
+
+TEST(TableTest, OnANarrowScreenFiguresGoButTheFirst) {
+  const TableRow headings = {"BYTES", "FILES", "LINKS", "SHARE"};
+  const std::vector<TableRow> rows = {{"1.0K", "2", "3", "a long name of a share"}};
+
+  EXPECT_THAT(TableLines(headings, rows, Screen{34, false}),
+              ElementsAre("BYTES  FILES  LINKS  SHARE", " 1.0K      2      3  a l… a share"));
+  EXPECT_THAT(TableLines(headings, rows, Screen{33, false}),
+              ElementsAre("BYTES  FILES  SHARE", " 1.0K      2  a lon…e of a share"));
+  EXPECT_THAT(TableLines(headings, rows, Screen{14, false}),
+              ElementsAre("BYTES  SHARE", " 1.0K  a…hare"));
+  for (size_t columns = 1; columns < 60; ++columns) {
+    for (const std::string& line : TableLines(headings, rows, Screen{columns, false})) {
+      EXPECT_LE(ColumnsOf(CellsOf(line)), std::max<size_t>(columns - 1, 1)) << line;
+    }
+  }
 }
 
 }  // namespace

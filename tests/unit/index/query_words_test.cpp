@@ -25,6 +25,19 @@ TEST_F(QueryWordsTest, OperatorsCombineNamesAndContents) {
   EXPECT_EQ(Sorted("name:txt -ext:txt"), Names());
 }
 
+TEST_F(QueryWordsTest, WhatIsNotShownIsNotLookedFor) {
+  Store({{"whale.txt", TextContent("a blue whale sings")}});
+  ASSERT_EQ(Hits("whale sings"), Names({"whale.txt"}));
+  EXPECT_EQ(answer.hits[0].snippet.text, "a blue whale sings");
+  EXPECT_EQ(answer.hits[0].marks.size(), 1u);
+
+  question.shows = false;
+
+  ASSERT_EQ(Hits("whale sings"), Names({"whale.txt"}));
+  EXPECT_EQ(answer.hits[0].snippet.text, "");
+  EXPECT_TRUE(answer.hits[0].marks.empty());
+}
+
 TEST_F(QueryWordsTest, PhrasesStandInARow) {
   Store({{"a.txt", TextContent("the old blue whale sings")},
          {"b.txt", TextContent("blue is the whale")},
@@ -182,7 +195,13 @@ TEST_F(QueryWordsTest, MarksAreTheBytesThatAnswer) {
   EXPECT_EQ(Marked("name:*fe\u0301*ort*"), "f\u00e9|ort");
   EXPECT_EQ(Marked("name:*.pdf"), ".pdf");
   EXPECT_EQ(Marked("name:\"old cafe report.pdf\""), "Old Caf\u00e9 report.pdf");
-  EXPECT_EQ(Marked("report -blue OR ext:pdf"), "report");
+  EXPECT_EQ(Marked("report -blue OR ext:pdf"), "report|pdf");
+  EXPECT_EQ(Marked("ext:txt,PDF"), "pdf");
+  EXPECT_EQ(Marked("report -ext:txt"), "report");
+  EXPECT_EQ(Marked("ext:pdf name:*.pdf"), ".pdf");
+  EXPECT_EQ(Marked("path:share/old*rep"), "share/Old|rep");
+  EXPECT_EQ(Marked("path:CAF\u00c9"), "Caf\u00e9");
+  EXPECT_EQ(Marked("report OR path:*old*nothing*"), "report") << "only half of it is there";
 }
 
 }  // namespace fileindexd

@@ -245,6 +245,21 @@ TEST_F(StatisticsTest, BytesOfAFileCountAtTheFirstOfItsPaths) {
   EXPECT_EQ(statistics.totals[0].files, 3u);
 }
 
+TEST_F(StatisticsTest, SumsStopWhereTheyWouldTurnAround) {
+  Put({Make("a.c", INT64_MAX, 1), Make("b.c", 1, 2), Make("c.c", INT64_MAX, 3)});
+  StatisticsWish wish = Wish();
+  wish.totals = true;
+  wish.by = GroupBy::EXTENSION;
+  wish.born_since = 0;
+  wish.shares.push_back(wish.shares[0]);
+
+  const Statistics statistics = Ask(wish);
+
+  EXPECT_EQ(statistics.totals[0].bytes, INT64_MAX);
+  EXPECT_EQ(RowsOf(statistics.groups), (Rows{{"c", 6, INT64_MAX}}));
+  EXPECT_EQ(RowsOf(statistics.born), (Rows{{root, 6, INT64_MAX}}));
+}
+
 TEST_F(StatisticsTest, TwoFilesThatHadOneInodeInTurnAreTwo) {
   Entry later = Make("b", 100, 1);
   later.birth_time += 1;
@@ -272,62 +287,27 @@ TEST_F(StatisticsTest, AShareThatCannotBeReadIsNamedAndTheOthersCounted) {
   EXPECT_EQ(statistics.totals[0].bytes, 100);
 }
 
-TEST(GroupCountsTest, NamesBeyondALimitCountTogether) {
-  GroupCounts counts;
-  CountedEntry entry;
-  entry.size = 1;
-  for (size_t i = 0; i < MOST_GROUPS + 10; ++i) {
-    counts.Add("name" + std::to_string(i), entry);
+TEST_F(StatisticsTest, OfVeryManyNamesTheLargestAreTold) {
+  std::vector<Entry> entries;
+  for (size_t i = 0; i < 2 * MOST_GROUPS + 10; ++i) {
+    const std::string name = "x.e" + std::to_string(i);
+    entries.push_back(Make(name, i == 2 * MOST_GROUPS + 5 ? 1000 : 1, i + 1));
+    entries.back().kind = Kind::OTHER;
   }
-  counts.Add("name0", entry);
+  entries.push_back(Make("y.e" + std::to_string(2 * MOST_GROUPS + 5), 5, entries.size() + 1));
+  Put(entries);
+  StatisticsWish wish = Wish();
+  wish.by = GroupBy::EXTENSION;
+  wish.totals = true;
 
-  EXPECT_EQ(counts.groups.size(), MOST_GROUPS + 1);
-  EXPECT_EQ(counts.groups.at(OTHER_NAMES).entries, 10u);
-  EXPECT_EQ(counts.groups.at("name0").bytes, 2);
-}
+  const Statistics statistics = Ask(wish);
 
-TEST(ExtensionTest, IsWhatStandsBehindTheLastDot) {
-  const std::pair<const char*, const char*> cases[] = {
-      {"/a.b/c.PDF", "pdf"},
-      {"/x.tar.gz", "gz"},
-      {"/x", ""},
-      {"/.hidden", ""},
-      {"/.hidden.txt", "txt"},
-      {"/x.", ""},
-      {"/a.b/c", ""},
-      {"/No. 5 is alive", ""},
-      {"/x.\xff", "\xff"},
-      {"/x.1234567890123456", "1234567890123456"},
-      {"/", ""},
-      {"/x.12345678901234567", ""},
-  };
-  for (const auto& [path, extension] : cases) {
-    EXPECT_EQ(ExtensionOf(path), extension) << path;
-  }
-}
-
-TEST(AgeTest, AClassHoldsItsLastMoment) {
-  const std::pair<int64_t, const char*> cases[] = {
-      {-1, "future"},
-      {INT64_MIN / 4, "future"},
-      {0, "day"},
-      {DAY, "day"},
-      {DAY + 1, "week"},
-      {7 * DAY, "week"},
-      {30 * DAY, "month"},
-      {91 * DAY, "quarter"},
-      {365 * DAY, "year"},
-      {730 * DAY, "2 years"},
-      {1826 * DAY, "5 years"},
-      {3652 * DAY, "10 years"},
-      {3652 * DAY + 1, "older"},
-      {INT64_MAX / 2, "older"},
-  };
-  for (const auto& [age, name] : cases) {
-    EXPECT_STREQ(AgeName(NOW - age, NOW), name) << age;
-  }
-  EXPECT_STREQ(AgeName(INT64_MIN, NOW), "older");
-  EXPECT_STREQ(AgeName(INT64_MAX, NOW), "future");
+  ASSERT_EQ(statistics.groups.size(), MOST_GROUPS + 1);
+  EXPECT_EQ(statistics.groups[0].name, OTHER_NAMES);
+  EXPECT_EQ(statistics.groups[0].entries, MOST_GROUPS + 10);
+  EXPECT_EQ(statistics.groups[1].name, "e" + std::to_string(2 * MOST_GROUPS + 5));
+  EXPECT_EQ(statistics.groups[1].bytes, 1005);
+  EXPECT_EQ(statistics.totals[0].files, 2 * MOST_GROUPS + 11);
 }
 
 }  // namespace

@@ -1,54 +1,17 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include "notify/gatherer.h"
-
+// Which lines changes become, and when they are due.
 #include <unistd.h>
 
-#include <fstream>
 #include <map>
-#include <utility>
 
 #include "base/event_codes.h"
-#include "state/event_codes.h"
-#include "tests/unit/notify/feed_fixture.h"
+#include "tests/unit/notify/gatherer_fixture.h"
 
 namespace fileindexd {
 namespace {
 
 using std::chrono::milliseconds;
 using std::chrono::seconds;
-using Texts = std::vector<std::string>;
-
-class GathererTest : public FeedTest {
- protected:
-  void Add(const Change& change) { gatherer.Add(settings, change, now); }
-
-  // "CREATE a", "RENAME a b": by path, with the indexed folder's own taken off.
-  Texts Due(bool everything = false) {
-    std::vector<QueueLine> lines;
-    gatherer.TakeDue(settings, now, everything, lines);
-    Texts texts;
-    for (const QueueLine& line : lines) {
-      std::string text = EventNames(line.event);
-      text = text.substr(text.rfind('_') + 1) + " ";
-      text += line.path_old.empty() ? "" : Name(line.path_old) + " ";
-      texts.push_back(text + Name(line.path));
-    }
-    return texts;
-  }
-  Texts All() { return Due(true); }
-  std::string Name(const std::string& path) const {
-    return path.starts_with(home + "/") ? path.substr(home.size() + 1) : path.substr(folder.size());
-  }
-
-  void MakeBusy() {
-    for (int i = 0; i < 20; ++i) {
-      Add(File(WRITTEN, "busy" + std::to_string(i)));
-    }
-    ASSERT_EQ(Due().size(), 20U);
-  }
-
-  Gatherer gatherer{"s"};
-};
 
 TEST_F(GathererTest, OneLineWithOneBitFitsWhatIsSeen) {
   Make("file");
@@ -210,85 +173,6 @@ TEST_F(GathererTest, AMebibyteOfPathsIsDueAtOnce) {
   EXPECT_EQ(gatherer.NextDue(), now + milliseconds(50));
 }
 
-TEST_F(GathererTest, RenameInsideIsOneLine) {
-  Make("new");
-  Add(File(CREATED, "old"));
-  Add(Rename("old", "new"));
-  Add(File(ATTRIBUTES, "new"));
-
-  EXPECT_EQ(Due(), Texts({"RENAME old new"}));
-}
-
-TEST_F(GathererTest, RenameInIsACreateAndOutADelete) {
-  Exclude("*.tmp");
-  Make("file");
-  MakeDirectory("dir");
-  Add({MOVED_TO, false, Path("file"), folder + "/other/file"});
-  Add({MOVED_TO, true, Path("dir"), Path("dir.tmp")});
-  Add({MOVED_TO, false, folder + "/other/out", Path("out")});
-  Add({MOVED_TO, false, Path("a.tmp"), Path("a")});
-
-  EXPECT_EQ(Due(), Texts({"DELETE a", "REINDEX dir", "CREATE file", "DELETE out"}));
-}
-
-TEST_F(GathererTest, RenamesGoOnFromEachOther) {
-  Make("c");
-  Add(Rename("a", "b"));
-  Add(Rename("b", "c"));
-
-  EXPECT_EQ(Due(), Texts({"DELETE b", "RENAME a c"}));
-}
-
-TEST_F(GathererTest, RenameThereAndBackIsALookAtBoth) {
-  MakeDirectory("a");
-  Add(Rename("a", "b", true));
-  Add(Rename("b", "a", true));
-
-  EXPECT_EQ(Due(), Texts({"REINDEX a", "DELETE b"}));
-}
-
-TEST_F(GathererTest, RenameBackOverAnotherRenameLosesNoPath) {
-  Make("o");
-  Add(Rename("o", "x"));
-  Add(Rename("q", "o"));
-  Add(Rename("x", "o"));
-
-  EXPECT_EQ(Due(), Texts({"CREATE o", "DELETE q", "DELETE x"}));
-}
-
-TEST_F(GathererTest, ASwapIsTwoRenames) {
-  Make("a");
-  Make("b");
-  Add(Rename("a", "t"));
-  Add(Rename("b", "a"));
-  Add(Rename("t", "b"));
-
-  EXPECT_EQ(Due(), Texts({"RENAME b a", "RENAME a b", "DELETE t"}));
-}
-
-TEST_F(GathererTest, TwoRenamesToOnePathLoseNoFormerOne) {
-  Make("p");
-  Add(Rename("a", "p"));
-  Add(Rename("b", "p"));
-
-  EXPECT_EQ(Due(), Texts({"DELETE a", "RENAME b p"}));
-}
-
-TEST_F(GathererTest, ATargetThatIsGoneAgainIsALookAtBoth) {
-  Make("old");
-  Add(Rename("old", "new"));
-  Add(File(DELETED, "new"));
-
-  EXPECT_EQ(Due(), Texts({"DELETE new", "CREATE old"}));
-}
-
-TEST_F(GathererTest, APipeRenamedOverAFileTakesItAway) {
-  ASSERT_EQ(mkfifo(Path("file").c_str(), 0600), 0);
-  Add(Rename("pipe", "file"));
-
-  EXPECT_EQ(Due(), Texts({"DELETE file", "DELETE pipe"}));
-}
-
 TEST_F(GathererTest, AChangeAboveIndexedFoldersIsOneOfEach) {
   settings.folders.clear();
   AddFolder(share + "/up/a");
@@ -306,17 +190,6 @@ TEST_F(GathererTest, AChangeAboveIndexedFoldersIsOneOfEach) {
   EXPECT_EQ(Due(), Texts({"REINDEX /share/up/a", "DELETE /share/up/b"}));
   Add({DELETED, true, share});
   EXPECT_EQ(Due().size(), 3U);
-}
-
-TEST_F(GathererTest, WhatIsGatheredBelowARenamedDirectoryIsLookedAtByItsOldName) {
-  MakeDirectory("new");
-  Make("new/file");
-  Add(File(CREATED, "old/file"));
-  Add(Rename("old", "new", true));
-  Add(File(WRITTEN, "new/file"));
-  now += milliseconds(50);
-
-  EXPECT_EQ(Due(), Texts({"RENAME old new", "WRITE new/file", "DELETE old/file"}));
 }
 
 TEST_F(GathererTest, AnyBytesAndLongPathsAreTaken) {
@@ -366,97 +239,6 @@ TEST_F(GathererTest, BytesCountWhatIsHeld) {
 
   EXPECT_EQ(gatherer.Bytes(), 0U);
   EXPECT_EQ(gatherer.Size(), 0U);
-}
-
-// "2 links: t1 t2": what was found of changed files, with an inode, or "gone: t1".
-class ChangedFileTest : public GathererTest {
- protected:
-  Change Changed(uint32_t what, const std::string& name, const std::string& target) const {
-    Change change = File(what, name);
-    change.target = target;
-    return change;
-  }
-  Texts Found() {
-    (void)All();
-    Texts found;
-    for (const ChangedFile& file : std::exchange(gatherer.changed, {})) {
-      std::string text = file.inode == 0 ? "gone:" : std::to_string(file.links) + " links:";
-      for (const std::string& target : file.targets) {
-        text += " " + target;
-      }
-      found.push_back(text);
-    }
-    return found;
-  }
-  void Link(const std::string& name, const std::string& other) const {
-    ASSERT_EQ(link(Path(name).c_str(), Path(other).c_str()), 0);
-  }
-};
-
-TEST_F(ChangedFileTest, OneThatWasChangedAndHasOtherNamesIsFound) {
-  Make("file");
-  Link("file", "other");
-  for (const uint32_t what : {MODIFIED | 0U, ATTRIBUTES | 0U, WRITTEN | 0U, CREATED | WRITTEN}) {
-    Add(Changed(what, "file", "t"));
-    EXPECT_EQ(Found(), Texts{"2 links: t"}) << what;
-    Add(File(what, "file"));  // the watch cannot tell
-    EXPECT_EQ(Found(), Texts{"2 links:"}) << what;
-  }
-}
-
-TEST_F(ChangedFileTest, OneWhoseNamesChangedAloneIsNot) {
-  Make("file");
-  Link("file", "other");
-  Add(File(CREATED, "file"));
-  Add(File(DELETED, "gone"));
-  Add(Rename("before", "other"));
-  EXPECT_EQ(Found(), Texts());
-}
-
-TEST_F(ChangedFileTest, OneOfASingleNameIsOnlyWhereItsHandleMayTellOfAnother) {
-  Make("file");
-  MakeDirectory("dir");
-  Add(File(WRITTEN, "file"));
-  Add(File(WRITTEN, "gone"));
-  Add(Directory(ATTRIBUTES, "dir"));
-  EXPECT_EQ(Found(), Texts());
-  Add(Changed(WRITTEN, "file", "t"));
-  Add(Changed(WRITTEN, "gone", "u"));
-  EXPECT_EQ(Found(), (Texts{"1 links: t", "gone: u"}));
-}
-
-TEST_F(ChangedFileTest, ItsHandleStaysWhenItsNameGoes) {
-  Make("new");
-  Add(Changed(WRITTEN, "removed", "t"));
-  Add(File(DELETED, "removed"));
-  EXPECT_EQ(Found(), Texts{"gone: t"});
-  Add(Changed(WRITTEN, "old", "t"));
-  Add(Rename("old", "new"));
-  EXPECT_EQ(Found(), Texts{"1 links: t"});
-  Add(Changed(WRITTEN, "old", "t"));
-  Add({MOVED_TO, false, folder + "/other/x", Path("old")});
-  EXPECT_EQ(Found(), Texts{"gone: t"});
-}
-
-TEST_F(ChangedFileTest, OneThingAfterTheOtherAtAPathIsEachFoundOnce) {
-  Make("file");
-  for (const char* target : {"a", "b", "a", "c", "d", "e", "f", "f"}) {
-    Add(Changed(MODIFIED, "file", target));
-  }
-  EXPECT_EQ(Found(), (Texts{"gone: a", "gone: b", "1 links: c d e f"}));
-  EXPECT_EQ(gatherer.Bytes(), 0U);
-}
-
-TEST_F(ChangedFileTest, HandlesCountIntoTheBytes) {
-  Add(File(MODIFIED, "a"));
-  const size_t before = gatherer.Bytes();
-  Add(Changed(MODIFIED, "a", std::string(30, 't')));
-  Add(Changed(MODIFIED, "a", std::string(30, 't')));
-  EXPECT_EQ(gatherer.Bytes(), before + 30);
-  Add(Rename("a", "b"));  // both paths are kept
-  EXPECT_EQ(gatherer.Bytes(), before + before + 30);
-  gatherer.Clear();
-  EXPECT_EQ(Found(), Texts());
 }
 
 }  // namespace

@@ -1,13 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include "search/share_contents.h"
-
-#include <gmock/gmock.h>
-
-#include <algorithm>
-#include <filesystem>
-
-#include "tests/unit/search/scripted.h"
-#include "tests/unit/state/fixture.h"
+// What is read out of files, and written down.
+#include "tests/unit/search/share_contents_fixture.h"
 
 namespace fileindexd {
 namespace {
@@ -17,85 +10,6 @@ using std::chrono::seconds;
 using testing::Contains;
 using testing::IsEmpty;
 using testing::Not;
-
-constexpr int64_t WALL = 1'900'000'000;
-
-class ShareContentsTest : public StateTest {
- protected:
-  ShareContentsTest() : root(folder + "/share"), contents({"a", root, ""}) {
-    ForgetScripted();
-    std::filesystem::create_directory(root);
-    std::filesystem::create_directory(state_root);
-  }
-
-  // A file of the share that the entries know.
-  std::string AddFile(int64_t row) {
-    std::string path = root + "/f" + std::to_string(row);
-    WriteFile(path, "text " + std::to_string(row));
-    AddEntry(row, path);
-    return path;
-  }
-  void AddEntry(int64_t row, const std::string& path) {
-    Scripted().entries[row].job.identity = IdentityOf(path);
-    Scripted().entries[row].job.paths = {path};
-  }
-
-  // Works until the share waits for something else than its next slice.
-  void Settle() {
-    for (int slices = 0; slices < 100 && contents.Due() <= now; ++slices) {
-      contents.Work(now, WALL);
-    }
-  }
-  void Pass(milliseconds time) {
-    now += time;
-    Settle();
-  }
-  // Second by second, with nothing to read.
-  void Wait(int seconds_long) {
-    for (int second = 0; second < seconds_long; ++second) {
-      Pass(seconds(1));
-      EXPECT_THAT(GiveOut(), IsEmpty());
-    }
-    Settle();
-  }
-  // Until what may have been told of too early would have been seen.
-  void Quieten() { Wait(180); }
-  // The rows that are given out.
-  std::vector<uint64_t> GiveOut(size_t most = 100) {
-    std::vector<uint64_t> ids;
-    while (ids.size() < most) {
-      ExtractJob job;
-      if (!contents.Next(now, last_id + 1, job)) {
-        break;
-      }
-      ids.push_back(++last_id);
-      names.push_back(job.name);
-    }
-    return ids;
-  }
-  void End(uint64_t id, ExtractOutcome::Result result, const std::string& text = "words") {
-    ExtractOutcome outcome;
-    outcome.id = id;
-    outcome.result = result;
-    outcome.content.text = text;
-    outcome.reason = "the reason";
-    contents.End(std::move(outcome), now);
-  }
-
-  size_t Count(const std::string& call) {
-    return static_cast<size_t>(std::count(Scripted().calls.begin(), Scripted().calls.end(), call));
-  }
-  ScriptedFile Kept(int64_t row) {
-    const auto found = Scripted().kept.find(row);
-    return found != Scripted().kept.end() ? found->second : ScriptedFile();
-  }
-
-  std::string root;
-  ShareContents contents;
-  Time now = Time(std::chrono::hours(1));
-  uint64_t last_id = 0;
-  std::vector<std::string> names;
-};
 
 TEST_F(ShareContentsTest, AFileIsReadAndWrittenDown) {
   AddFile(1);
@@ -289,16 +203,6 @@ TEST_F(ShareContentsTest, AFailureAtAnyCallLosesNothing) {
   }
 }
 
-TEST_F(ShareContentsTest, ItAsksAgainWhileMoreMayWait) {
-  AddFile(1);
-  Scripted().unseen = true;
-  Settle();
-  EXPECT_THAT(GiveOut(), IsEmpty());
-
-  EXPECT_TRUE(contents.MayHaveJobs(now));
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
 TEST_F(ShareContentsTest, AnEndMayLetAnotherFileGo) {
   AddFile(1);
   Settle();
@@ -309,134 +213,6 @@ TEST_F(ShareContentsTest, AnEndMayLetAnotherFileGo) {
   End(ids[0], ExtractOutcome::Result::DONE);
 
   EXPECT_TRUE(contents.MayHaveJobs(now));
-}
-
-TEST_F(ShareContentsTest, WithoutEntriesItWaitsForThem) {
-  AddFile(1);
-  Scripted().failing["Open"] = IndexError::PATH_NOT_FOUND;
-  Settle();
-  Pass(seconds(30));
-  EXPECT_EQ(Count("Open"), 1U);
-
-  Scripted().failing.clear();
-  contents.EntriesChanged();
-  Settle();
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
-TEST_F(ShareContentsTest, AMissingRootIsNotTakenForMissingFiles) {
-  AddFile(1);
-  Settle();
-  std::filesystem::rename(root, root + ".away");
-
-  EXPECT_THAT(GiveOut(), IsEmpty());
-  EXPECT_FALSE(contents.MayHaveJobs(now));  // rests
-  std::filesystem::rename(root + ".away", root);
-  Pass(seconds(100));
-
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
-TEST_F(ShareContentsTest, AShareLowOnSpaceGetsNoContents) {
-  AddFile(1);
-  Settle();
-  const auto ids = GiveOut();
-  ASSERT_EQ(ids.size(), 1U);
-
-  contents.Set(contents.share, {.no_space = true});
-  End(ids[0], ExtractOutcome::Result::DONE);
-  EXPECT_EQ(contents.Due(), Time::max());
-  EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
-
-  contents.Set(contents.share, {});
-  Settle();
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
-TEST_F(ShareContentsTest, AWishToRetryIsFulfilledOnce) {
-  AddFile(1);
-  Scripted().kept = Scripted().entries;
-  Scripted().kept[1].state = ScriptedFile::State::FAILED;
-  Settle();
-  EXPECT_THAT(GiveOut(), IsEmpty());
-  EXPECT_FALSE(contents.TakeRetried());
-
-  contents.Set(contents.share, {.retry_contents = true});
-  Settle();
-
-  EXPECT_TRUE(contents.TakeRetried());
-  EXPECT_FALSE(contents.TakeRetried());
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
-TEST_F(ShareContentsTest, WhatIsToldOfBeforeItCountsIsSeenALittleLater) {
-  Settle();
-  contents.EntriesChanged();
-  Pass(milliseconds(200));
-  AddFile(1);  // the commit's end, which nothing tells of
-
-  Pass(seconds(2));
-
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
-TEST_F(ShareContentsTest, WhatIsClosedIsLookedAtAtOnce) {
-  Quieten();
-  contents.EntriesChanged();
-  Settle();
-  AddFile(1);
-
-  contents.EntriesClosed();
-  Pass(milliseconds(2));
-
-  EXPECT_EQ(GiveOut().size(), 1U);
-}
-
-TEST_F(ShareContentsTest, NothingIsOpenedForAClosing) {
-  Quieten();
-  const size_t opened = Count("Open");
-  ASSERT_EQ(Count("Close"), opened);
-
-  contents.EntriesClosed();
-  Quieten();
-
-  EXPECT_EQ(Count("Open"), opened);
-}
-
-TEST_F(ShareContentsTest, AllIsLookedAtOnceADay) {
-  Quieten();
-  EXPECT_EQ(Count("LookAtAll"), 1U);
-  Pass(std::chrono::hours(23));
-  EXPECT_EQ(Count("LookAtAll"), 1U);
-
-  Pass(std::chrono::hours(2));
-
-  EXPECT_EQ(Count("LookAtAll"), 2U);
-}
-
-TEST_F(ShareContentsTest, WithNothingToDoItClosesAndSleeps) {
-  Settle();
-  EXPECT_THAT(GiveOut(), IsEmpty());
-  Wait(20);
-  EXPECT_EQ(Count("Close"), 1U);  // though it looks once more later
-  Quieten();
-
-  EXPECT_GT(contents.Due() - now, std::chrono::hours(20));
-  const size_t opened = Count("Open");
-  contents.EntriesChanged();
-  Settle();
-  EXPECT_GT(Count("Open"), opened);
-  EXPECT_EQ(Count("LookAtAll"), 1U);
-}
-
-TEST_F(ShareContentsTest, ACommitThatTheDiskTakesLongForIsSeen) {
-  Settle();
-  Wait(20);
-  AddFile(1);  // the commit's end, which nothing tells of
-
-  Pass(seconds(20));
-
-  EXPECT_EQ(GiveOut().size(), 1U);
 }
 
 TEST_F(ShareContentsTest, NothingIsSweptWhileTheEntriesAreMadeAnew) {
