@@ -3,12 +3,19 @@
 #
 # Whole programs, not single cases, are ctest's entries: starting a process for each of a thousand
 # cases would cost more than the cases do.
+#
+# THREADS says that the program has more than one of them: the others have nothing to show to the
+# thread sanitizer, and are built for it by name alone.
 function(add_unit_test name)
-  cmake_parse_arguments(arg "" "TIMEOUT" "LIBS;SOURCES;LABELS" ${ARGN})
+  cmake_parse_arguments(arg "THREADS" "TIMEOUT" "LIBS;SOURCES;LABELS" ${ARGN})
   add_executable(${name} ${arg_SOURCES})
   target_link_libraries(${name} PRIVATE project_flags ${arg_LIBS} GTest::gtest_main GTest::gmock)
   set_target_properties(${name} PROPERTIES IS_TEST ON
     RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/tests-bin")
+  if(FILEINDEXD_SANITIZE STREQUAL "thread" AND NOT arg_THREADS)
+    set_target_properties(${name} PROPERTIES EXCLUDE_FROM_ALL ON)
+    return()
+  endif()
   add_test(NAME ${name} COMMAND ${name} --gtest_brief=1)
   if(NOT arg_TIMEOUT)
     set(arg_TIMEOUT 1200)  # a test that hangs; no time decides another
@@ -17,4 +24,12 @@ function(add_unit_test name)
     set(arg_LABELS unit)
   endif()
   set_tests_properties(${name} PROPERTIES TIMEOUT ${arg_TIMEOUT} LABELS "${arg_LABELS}")
+endfunction()
+
+# add_test_library(NAME LIBS lib… SOURCES file…): what several of these programs have in common.
+function(add_test_library name)
+  cmake_parse_arguments(arg "" "" "LIBS;SOURCES" ${ARGN})
+  add_library(${name} STATIC ${arg_SOURCES})
+  target_link_libraries(${name} PUBLIC ${arg_LIBS} GTest::gtest PRIVATE project_flags)
+  set_target_properties(${name} PROPERTIES IS_TEST ON)
 endfunction()

@@ -332,8 +332,9 @@ std::vector<Request> Server::Serve() {
   bool may_take_in = false;
   for (int i = 0; i < count; ++i) {
     const epoll_event& event = events.at(static_cast<size_t>(i));
-    const auto found = impl->clients.find(event.data.u64);
-    if (event.data.u64 < FIRST_CLIENT) {
+    const uint64_t id = event.data.u64;  // a copy: the structure is packed
+    const auto found = impl->clients.find(id);
+    if (id < FIRST_CLIENT) {
       may_take_in = true;
     } else if (found != impl->clients.end()) {
       Client& client = found->second;
