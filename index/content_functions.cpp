@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <cmath>
 #include <cstring>
 #include <exception>
 
@@ -16,12 +17,26 @@ namespace {
 constexpr int TITLE_COLUMN = 0;
 constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
 
-void WordHits(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
+void CountIn(WordPlaces& place, int column) {
+  (column == TITLE_COLUMN ? place.title : column == TEXT_COLUMN ? place.text : place.fields) += 1;
+}
+
+// The length is not known without another look.
+void WordMark(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {
+  WordPlaces places;
   int hits = 0;
-  const int code = api->xInstCount(match, &hits);
+  int code = api->xInstCount(match, &hits);
+  for (int i = 0; i < hits && code == SQLITE_OK; ++i) {
+    int word = 0;
+    int column = 0;
+    int offset = 0;
+    code = api->xInst(match, i, &word, &column, &offset);
+    CountIn(places, column);
+  }
   if (code == SQLITE_OK) {
-    sqlite3_result_int(result, hits);
+    const double mark = std::ceil(MOST_WORD_MARK * PlacesScore(places, USUAL_LENGTH));
+    sqlite3_result_int(result, static_cast<int>(mark));
   } else {
     sqlite3_result_error_code(result, code);
   }
@@ -36,10 +51,7 @@ int CountPlaces(const Fts5ExtensionApi* api, Fts5Context* match, std::vector<Wor
     int offset = 0;
     code = api->xInst(match, i, &word, &column, &offset);
     if (code == SQLITE_OK) {
-      WordPlaces& place = places[static_cast<size_t>(word)];
-      (column == TITLE_COLUMN  ? place.title
-       : column == TEXT_COLUMN ? place.text
-                               : place.fields) += 1;
+      CountIn(places[static_cast<size_t>(word)], column);
     }
   }
   return code;
@@ -99,12 +111,20 @@ int RegisterQuestionFunctions(sqlite3* db) {
   if (api == nullptr) {
     return SQLITE_NOMEM;
   }
-  int code = api->xCreateFunction(api, "word_hits", nullptr, WordHits, nullptr);
+  int code = api->xCreateFunction(api, "word_mark", nullptr, WordMark, nullptr);
   code = code == SQLITE_OK
              ? api->xCreateFunction(api, "word_places", nullptr, PutWordPlaces, nullptr)
              : code;
   return code == SQLITE_OK ? api->xCreateFunction(api, "name_rank", nullptr, NameRank, nullptr)
                            : code;
+}
+
+double PlacesScore(const WordPlaces& found, double length) {
+  const double hits = found.title + found.fields + found.text;
+  const double often = hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
+  return found.title > 0    ? 0.75 + 0.25 * often
+         : found.fields > 0 ? 0.5 + 0.25 * often
+                            : 0.5 * often;
 }
 
 std::vector<WordPlaces> ReadWordPlaces(std::string_view bytes, size_t words) {

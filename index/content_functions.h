@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What questions ask the full-text tables about a match.
 //
-//   word_hits(words)    how often the question's words stand there
+//   word_mark(words)    how well the question's words are answered there, of MOST_WORD_MARK: see
+//                       PlacesScore
 //   word_places(words)  for each word of the question, where: see ReadWordPlaces
 //   name_rank(names)    how well the words answer as a name, the last of them being NAME_END: about
 //                       what HitScore says
@@ -25,5 +26,11 @@ struct WordPlaces {
 };
 // All zero for words that are not among them.
 std::vector<WordPlaces> ReadWordPlaces(std::string_view bytes, size_t words);
+
+constexpr int MOST_WORD_MARK = 255;
+constexpr double USUAL_LENGTH = 8192;
+// 0 to 1: title above other fields above text, often above once. A long text holds a word more
+// often by chance.
+double PlacesScore(const WordPlaces& found, double length);
 
 }  // namespace fileindexd

@@ -54,16 +54,6 @@ bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& toke
                     [](const std::string& word, const Token& token) { return word == token.text; });
 }
 
-// Title above other fields above text. A long text holds a word more often by chance.
-double ScoreOfPlaces(const WordPlaces& found, double length) {
-  constexpr double USUAL_LENGTH = 8192;
-  const double hits = found.title + found.fields + found.text;
-  const double often = hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
-  return found.title > 0    ? 0.75 + 0.25 * often
-         : found.fields > 0 ? 0.5 + 0.25 * often
-                            : 0.5 * often;
-}
-
 double Youth(const Entry& entry, double now) {
   const double years =
       std::max(0.0, (now - static_cast<double>(entry.mtime) / 1e9) / (365.0 * 86400));
@@ -81,23 +71,20 @@ HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of
       names(of_names),
       now(static_cast<double>(time(nullptr))) {
   for (const WordLeaf& leaf : asked.leaves) {
-    if (leaf.is_positive && !leaf.text_query.empty()) {
+    if (leaf.is_positive && !leaf.text_query.empty() && !leaf.is_beginning) {
       places_query += (places_query.empty() ? "(" : " OR (") + leaf.text_query + ")";
       places.push_back(&leaf);
     }
   }
 }
 
-// A rare word says more.
-void HitScore::Weigh() {
-  for (const WordLeaf& leaf : asked.leaves) {
-    weights.push_back(1 / std::log2(2 + static_cast<double>(sets.Of(*leaf.node).Count())));
-    all_weights += leaf.is_positive ? weights.back() : 0;
+double HitScore::AllWeights() {
+  if (all_weights == 0) {
+    for (const WordLeaf& leaf : asked.leaves) {
+      all_weights += leaf.is_positive ? sets.WeightOf(leaf) : 0;
+    }
   }
-}
-
-double HitScore::WeightOf(const WordLeaf& leaf) const {
-  return weights[static_cast<size_t>(&leaf - asked.leaves.data())];
+  return all_weights;
 }
 
 // The parts that say what to find, as far as this entry has them.
@@ -144,17 +131,14 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
   if (code != SQLITE_OK || found.empty()) {
     return code;
   }
-  if (weights.empty()) {
-    Weigh();
-  }
   const auto in_name = [](const Found& part) { return part.in_name; };
   if (std::any_of(found.begin(), found.end(), in_name) && NameAnswers(asked.tree, found)) {
     double weight = 0;
     for (const Found& part : found) {
-      weight += WeightOf(*part.leaf);
+      weight += sets.WeightOf(*part.leaf);
     }
     found.erase(std::stable_partition(found.begin(), found.end(), in_name), found.end());
-    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / all_weights;
+    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / AllWeights();
     return SQLITE_OK;
   }
   text = candidate.facts->text;
@@ -212,15 +196,25 @@ double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found
   return (is_stem ? WHOLE_STEM : AT_START) + covered;
 }
 
-int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score) {
-  if (full_scores_left == 0) {
-    const auto hits = static_cast<double>(sets.Hits(candidate.facts->text));
-    score = 0.5 * hits / (hits + 1);
-    return SQLITE_OK;
+// What counts tell: their places are put together from those of many words each time that they are
+// asked for, and are not.
+double HitScore::BeginningsScore(const Candidate& candidate,
+                                 const std::vector<Found>& found) const {
+  double most = 0;
+  double in_names = 0;
+  for (const Found& part : found) {
+    if (part.leaf->is_beginning) {
+      most += sets.WeightOf(*part.leaf);
+      in_names += part.in_name ? sets.WeightOf(*part.leaf) : 0;
+    }
   }
-  --full_scores_left;
+  return std::min(most, in_names + sets.PromiseOfBeginnings(candidate.facts->text));
+}
+
+int HitScore::WordsScore(Candidate& candidate, const std::vector<Found>& found, double& sum) {
   int code = SQLITE_OK;
-  if (read_places.handle == nullptr) {
+  std::vector<WordPlaces> counted(places.size());
+  if (read_places.handle == nullptr && !places.empty()) {
     code = read_places.Prepare(rows.db,
                                "SELECT word_places(words) FROM contents.words WHERE words MATCH ?1 "
                                "AND rowid = ?2");
@@ -228,26 +222,41 @@ int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found
   if (code != SQLITE_OK) {
     return code;
   }
-  read_places.BindText(1, places_query);
-  read_places.BindInt(2, candidate.facts->text);
-  code = read_places.Step();
-  const std::vector<WordPlaces> counted = ReadWordPlaces(read_places.Bytes(0), places.size());
-  read_places.Reset();
-  if (code != SQLITE_ROW && code != SQLITE_DONE) {
-    return code;
+  if (!places.empty()) {
+    read_places.BindText(1, places_query);
+    read_places.BindInt(2, candidate.facts->text);
+    code = read_places.Step();
+    counted = ReadWordPlaces(read_places.Bytes(0), places.size());
+    read_places.Reset();
+    if (code != SQLITE_ROW && code != SQLITE_DONE) {
+      return code;
+    }
   }
 
-  double sum = 0;
   for (const Found& part : found) {
     const auto place = std::find(places.begin(), places.end(), part.leaf);
-    sum += WeightOf(*part.leaf) *
+    if (part.leaf->is_beginning) {
+      continue;
+    }
+    sum += sets.WeightOf(*part.leaf) *
            (part.in_name || place == places.end()
                 ? 1
-                : ScoreOfPlaces(counted[static_cast<size_t>(place - places.begin())],
-                                static_cast<double>(candidate.facts->length)));
+                : PlacesScore(counted[static_cast<size_t>(place - places.begin())],
+                              static_cast<double>(candidate.facts->length)));
   }
-  score = 0.5 + 0.5 * (sum / all_weights) * Youth(candidate.entry, now);
   return SQLITE_OK;
+}
+
+int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score) {
+  if (full_scores_left == 0) {
+    score = 0.5 * std::min(1.0, sets.Promise(candidate.facts->text) / AllWeights());
+    return SQLITE_OK;
+  }
+  --full_scores_left;
+  double sum = BeginningsScore(candidate, found);
+  const int code = WordsScore(candidate, found, sum);
+  score = 0.5 + 0.5 * (sum / AllWeights()) * Youth(candidate.entry, now);
+  return code;
 }
 
 }  // namespace fileindexd

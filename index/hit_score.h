@@ -38,12 +38,13 @@ class HitScore {
     bool in_name;
   };
 
-  void Weigh();
-  double WeightOf(const WordLeaf& leaf) const;
+  double AllWeights();
   bool NameAnswers(const QueryNode& node, const std::vector<Found>& found) const;
   int Find(Candidate& candidate, std::vector<Found>& found);
   double NameScore(Candidate& candidate, const std::vector<Found>& found);
   double PieceScore(Candidate& candidate, const std::vector<Found>& found);
+  double BeginningsScore(const Candidate& candidate, const std::vector<Found>& found) const;
+  int WordsScore(Candidate& candidate, const std::vector<Found>& found, double& sum);
   int ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score);
 
   CandidateRows& rows;
@@ -52,9 +53,8 @@ class HitScore {
   const Asked& asked;
   NameMarker& names;
   const double now;                     // one moment for all, in seconds since the epoch
-  std::vector<double> weights;          // of the leaves, in order; set at the first score
-  double all_weights = 0;               // of those that say what to find
-  std::string places_query;             // of all leaves that are looked for in texts
+  double all_weights = 0;               // of those that say what to find; 0: not added up yet
+  std::string places_query;             // of all such leaves in texts that are no beginnings
   std::vector<const WordLeaf*> places;  // in its order
   uint64_t full_scores_left = MOST_FULL_SCORES;
   Statement read_places;

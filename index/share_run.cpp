@@ -232,11 +232,11 @@ int ShareRun::CountNames(IdSet& others) {
   return code;
 }
 
-std::vector<int64_t> ShareRun::TextsByHits() const {
+std::vector<int64_t> ShareRun::TextsByPromise() const {
   std::vector<int64_t> texts = upper.texts.Ids();
   std::reverse(texts.begin(), texts.end());  // among equals, what was read last
   std::stable_sort(texts.begin(), texts.end(),
-                   [this](int64_t a, int64_t b) { return sets.Hits(a) > sets.Hits(b); });
+                   [this](int64_t a, int64_t b) { return sets.Promise(a) > sets.Promise(b); });
   return texts;
 }
 
@@ -287,7 +287,7 @@ int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& ca
 }
 
 int ShareRun::WalkTexts(BestHits& best) {
-  const std::vector<int64_t> texts = TextsByHits();
+  const std::vector<int64_t> texts = TextsByPromise();
   Block block;
   block.of_texts = true;
   score.Refill();

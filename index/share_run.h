@@ -51,7 +51,7 @@ class ShareRun {
   std::string BeginningsQuery() const;
   int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
   int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
-  std::vector<int64_t> TextsByHits() const;
+  std::vector<int64_t> TextsByPromise() const;
   int Answers(Candidate& candidate, bool& answers);
   int AddHit(Candidate& candidate, BestHits& best, Block& block);
   int NextEntryOf(int64_t text, Candidate& candidate, bool& found);

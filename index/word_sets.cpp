@@ -2,8 +2,10 @@
 #include "index/word_sets.h"
 
 #include <algorithm>
+#include <cmath>
 #include <utility>
 
+#include "index/content_functions.h"
 #include "index/entry_table.h"
 #include "index/name_pattern.h"
 #include "index/name_text.h"
@@ -12,7 +14,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
 // As in the schema's indexes.
 constexpr int64_t LARGE = 1 << 20;
 constexpr int64_t WEEK = 604'800'000'000'000;
@@ -45,7 +46,7 @@ int WordSets::ReadAttributes(const QueryNode& node) {
   return code;
 }
 
-int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, bool counts) {
+int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marks) {
   Statement match;
   int code = match.Prepare(db, sql);
   if (code != SQLITE_OK) {
@@ -58,12 +59,8 @@ int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, boo
       return SQLITE_CORRUPT;
     }
     ids.Add(id);
-    if (counts) {
-      const auto at = static_cast<size_t>(id);
-      if (at >= hits.size()) {
-        hits.resize(at + 1);
-      }
-      hits[at] += static_cast<uint32_t>(match.Int(1));
+    if (marks != nullptr) {
+      marks->Add(id, static_cast<uint32_t>(match.Int(1)));
     }
   }
   return code == SQLITE_DONE ? SQLITE_OK : code;
@@ -79,12 +76,16 @@ int WordSets::ReadLeaf(const WordLeaf& leaf) {
   set.everything = !set.is_sure && leaf.tokens.empty();
   int code = SQLITE_OK;
   if (!leaf.names_query.empty() && !leaf.tokens.empty()) {
-    code =
-        Collect("SELECT rowid FROM names WHERE names MATCH ?1", leaf.names_query, set.names, false);
+    code = Collect("SELECT rowid FROM names WHERE names MATCH ?1", leaf.names_query, set.names,
+                   nullptr);
   }
   if (code == SQLITE_OK && has_contents && !leaf.text_query.empty()) {
-    code = Collect("SELECT rowid, word_hits(words) FROM contents.words WHERE words MATCH ?1",
-                   leaf.text_query, set.texts, leaf.is_positive);
+    TextMarks marks;
+    code = Collect(leaf.is_positive
+                       ? "SELECT rowid, word_mark(words) FROM contents.words WHERE words MATCH ?1"
+                       : "SELECT rowid FROM contents.words WHERE words MATCH ?1",
+                   leaf.text_query, set.texts, leaf.is_positive ? &marks : nullptr);
+    (leaf.is_beginning ? of_beginnings : of_words).AddAll(marks, WeightOf(leaf) / Unit());
   }
   return code;
 }
@@ -103,7 +104,7 @@ int WordSets::ReadEndings(const QueryNode& node) {
       return SQLITE_OK;
     }
     const int code = Collect("SELECT rowid FROM names WHERE names MATCH ?1",
-                             Quoted(words + " " + NAME_END), set.names, false);
+                             Quoted(words + " " + NAME_END), set.names, nullptr);
     if (code != SQLITE_OK) {
       return code;
     }
@@ -273,9 +274,21 @@ IdSet WordSets::Lower(const QueryNode& node) const {
   }
 }
 
-int64_t WordSets::Hits(int64_t text) const {
-  const auto at = static_cast<size_t>(text);
-  return at < hits.size() ? hits[at] : 0;
+double WordSets::WeightOf(const WordLeaf& leaf) const {
+  return 1 / std::log2(2 + static_cast<double>(Of(*leaf.node).Count()));
+}
+
+// What one mark of a leaf that weighs 1 is worth, so that all of them together have room.
+double WordSets::Unit() const {
+  return static_cast<double>(asked.leaves.size()) * MOST_WORD_MARK / TextMarks::MOST;
+}
+
+double WordSets::PromiseOfBeginnings(int64_t text) const {
+  return of_beginnings.Of(text) * Unit() / MOST_WORD_MARK;
+}
+
+double WordSets::Promise(int64_t text) const {
+  return of_words.Of(text) * Unit() / MOST_WORD_MARK + PromiseOfBeginnings(text);
 }
 
 }  // namespace fileindexd

@@ -12,6 +12,7 @@
 
 #include "index/asked.h"
 #include "index/id_set.h"
+#include "index/text_marks.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -38,8 +39,13 @@ class WordSets {
   WordSet Upper(const QueryNode& node) const;
   // All of it answers.
   IdSet Lower(const QueryNode& node) const;
-  // How often the question's words stand in a text.
-  int64_t Hits(int64_t text) const;
+  // A rare word says more. 0 to 1.
+  double WeightOf(const WordLeaf& leaf) const;
+  // About how well a text answers the words that say what to find, each by its weight, as far as
+  // counts tell it. 0 and more; the same scale as that of weights.
+  double Promise(int64_t text) const;
+  // The same, of those words alone that are beginnings.
+  double PromiseOfBeginnings(int64_t text) const;
 
  private:
   int ReadLeaf(const WordLeaf& leaf);
@@ -48,8 +54,9 @@ class WordSets {
   int ReadUnder(const QueryNode& node);
   int ReadRange(const QueryNode& node);
   int ReadFew(Statement& statement, WordSet& set);
-  int Collect(const char* sql, const std::string& query, IdSet& ids, bool counts);
+  int Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marks);
   WordSet UpperOfAll(const QueryNode& node) const;
+  double Unit() const;
 
   sqlite3* db;
   bool has_contents;
@@ -57,7 +64,7 @@ class WordSets {
   std::string share;
   std::unordered_map<const QueryNode*, WordSet> sets;
   WordSet unknown = {.names = {}, .texts = {}, .everything = true, .is_sure = false};
-  std::vector<uint32_t> hits;  // by text
+  TextMarks of_words, of_beginnings;  // of leaves that say what to find, in units of Unit
 };
 
 }  // namespace fileindexd
