@@ -93,7 +93,6 @@ void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& to
   }
   if (node.part == Part::WORD) {
     leaf.text_query = TextQueryOf(node);
-    leaf.is_beginning = leaf.text_query.ends_with('*');
     asked.needs_contents = asked.needs_contents || node.scope != Scope::NAME;
   }
 }

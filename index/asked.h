@@ -24,7 +24,6 @@ struct WordLeaf {
   // it is not looked for there.
   std::string names_query;
   std::string text_query;
-  bool is_beginning = false;  // in texts: many words, whose places are put together at each look
 };
 
 class Asked {

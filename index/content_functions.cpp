@@ -3,12 +3,10 @@
 
 #include <algorithm>
 #include <climits>
-#include <cmath>
-#include <cstring>
-#include <exception>
 
 #include "base/content.h"
 #include "index/fts5_api.h"
+#include "index/text_marks.h"
 
 namespace fileindexd {
 
@@ -17,44 +15,25 @@ namespace {
 constexpr int TITLE_COLUMN = 0;
 constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
 
-void CountIn(WordPlaces& place, int column) {
-  (column == TITLE_COLUMN ? place.title : column == TEXT_COLUMN ? place.text : place.fields) += 1;
-}
-
-// The length is not known without another look.
 void WordMark(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {
-  WordPlaces places;
   int hits = 0;
   int code = api->xInstCount(match, &hits);
-  for (int i = 0; i < hits && code == SQLITE_OK; ++i) {
+  auto where = TextMark::TEXT;
+  for (int i = 0; i < hits && code == SQLITE_OK && where != TextMark::TITLE; ++i) {
     int word = 0;
     int column = 0;
     int offset = 0;
     code = api->xInst(match, i, &word, &column, &offset);
-    CountIn(places, column);
+    where = column == TITLE_COLUMN  ? TextMark::TITLE
+            : column == TEXT_COLUMN ? where
+                                    : TextMark::FIELDS;
   }
   if (code == SQLITE_OK) {
-    const double mark = std::ceil(MOST_WORD_MARK * PlacesScore(places, USUAL_LENGTH));
-    sqlite3_result_int(result, static_cast<int>(mark));
+    sqlite3_result_int(result, TextMark::Of(where, static_cast<uint32_t>(hits)));
   } else {
     sqlite3_result_error_code(result, code);
   }
-}
-
-int CountPlaces(const Fts5ExtensionApi* api, Fts5Context* match, std::vector<WordPlaces>& places) {
-  int hits = 0;
-  int code = api->xInstCount(match, &hits);
-  for (int i = 0; i < hits && code == SQLITE_OK; ++i) {
-    int word = 0;
-    int column = 0;
-    int offset = 0;
-    code = api->xInst(match, i, &word, &column, &offset);
-    if (code == SQLITE_OK) {
-      CountIn(places[static_cast<size_t>(word)], column);
-    }
-  }
-  return code;
 }
 
 // The end of a name is the last phrase of the question.
@@ -88,22 +67,6 @@ void NameRank(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* 
   sqlite3_result_double(result, rank + static_cast<double>(covered) / (end + 1));
 }
 
-void PutWordPlaces(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
-                   int /*count*/, sqlite3_value** /*arguments*/) {
-  try {
-    std::vector<WordPlaces> places(static_cast<size_t>(api->xPhraseCount(match)));
-    const int code = CountPlaces(api, match, places);
-    if (code == SQLITE_OK) {
-      sqlite3_result_blob64(result, places.data(), places.size() * sizeof(WordPlaces),
-                            SQLITE_TRANSIENT);
-    } else {
-      sqlite3_result_error_code(result, code);
-    }
-  } catch (const std::exception&) {
-    sqlite3_result_error_nomem(result);
-  }
-}
-
 }  // namespace
 
 int RegisterQuestionFunctions(sqlite3* db) {
@@ -111,26 +74,9 @@ int RegisterQuestionFunctions(sqlite3* db) {
   if (api == nullptr) {
     return SQLITE_NOMEM;
   }
-  int code = api->xCreateFunction(api, "word_mark", nullptr, WordMark, nullptr);
-  code = code == SQLITE_OK
-             ? api->xCreateFunction(api, "word_places", nullptr, PutWordPlaces, nullptr)
-             : code;
+  const int code = api->xCreateFunction(api, "word_mark", nullptr, WordMark, nullptr);
   return code == SQLITE_OK ? api->xCreateFunction(api, "name_rank", nullptr, NameRank, nullptr)
                            : code;
-}
-
-double PlacesScore(const WordPlaces& found, double length) {
-  const double hits = found.title + found.fields + found.text;
-  const double often = hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
-  return found.title > 0    ? 0.75 + 0.25 * often
-         : found.fields > 0 ? 0.5 + 0.25 * often
-                            : 0.5 * often;
-}
-
-std::vector<WordPlaces> ReadWordPlaces(std::string_view bytes, size_t words) {
-  std::vector<WordPlaces> places(words);
-  memcpy(places.data(), bytes.data(), std::min(bytes.size(), words * sizeof(WordPlaces)));
-  return places;
 }
 
 }  // namespace fileindexd

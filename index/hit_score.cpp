@@ -6,7 +6,6 @@
 #include <ctime>
 
 #include "base/utf8.h"
-#include "index/content_functions.h"
 #include "index/entry_table.h"
 
 namespace fileindexd {
@@ -69,14 +68,7 @@ HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of
       check(of_check),
       asked(in_question),
       names(of_names),
-      now(static_cast<double>(time(nullptr))) {
-  for (const WordLeaf& leaf : asked.leaves) {
-    if (leaf.is_positive && !leaf.text_query.empty() && !leaf.is_beginning) {
-      places_query += (places_query.empty() ? "(" : " OR (") + leaf.text_query + ")";
-      places.push_back(&leaf);
-    }
-  }
-}
+      now(static_cast<double>(time(nullptr))) {}
 
 double HitScore::AllWeights() {
   if (all_weights == 0) {
@@ -142,7 +134,8 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
     return SQLITE_OK;
   }
   text = candidate.facts->text;
-  return ContentScore(candidate, found, score);
+  score = ContentScore(candidate, found);
+  return SQLITE_OK;
 }
 
 // Of pieces of names alone.
@@ -196,67 +189,16 @@ double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found
   return (is_stem ? WHOLE_STEM : AT_START) + covered;
 }
 
-// What counts tell: their places are put together from those of many words each time that they are
-// asked for, and are not.
-double HitScore::BeginningsScore(const Candidate& candidate,
-                                 const std::vector<Found>& found) const {
-  double most = 0;
-  double in_names = 0;
+double HitScore::ContentScore(const Candidate& candidate, const std::vector<Found>& found) {
+  const FileFacts& facts = *candidate.facts;
+  double sum = 0;
   for (const Found& part : found) {
-    if (part.leaf->is_beginning) {
-      most += sets.WeightOf(*part.leaf);
-      in_names += part.in_name ? sets.WeightOf(*part.leaf) : 0;
-    }
+    sum += sets.WeightOf(*part.leaf) * (part.in_name
+                                            ? 1
+                                            : TextMark::Score(sets.MarkOf(*part.leaf, facts.text),
+                                                              static_cast<double>(facts.length)));
   }
-  return std::min(most, in_names + sets.PromiseOfBeginnings(candidate.facts->text));
-}
-
-int HitScore::WordsScore(Candidate& candidate, const std::vector<Found>& found, double& sum) {
-  int code = SQLITE_OK;
-  std::vector<WordPlaces> counted(places.size());
-  if (read_places.handle == nullptr && !places.empty()) {
-    code = read_places.Prepare(rows.db,
-                               "SELECT word_places(words) FROM contents.words WHERE words MATCH ?1 "
-                               "AND rowid = ?2");
-  }
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  if (!places.empty()) {
-    read_places.BindText(1, places_query);
-    read_places.BindInt(2, candidate.facts->text);
-    code = read_places.Step();
-    counted = ReadWordPlaces(read_places.Bytes(0), places.size());
-    read_places.Reset();
-    if (code != SQLITE_ROW && code != SQLITE_DONE) {
-      return code;
-    }
-  }
-
-  for (const Found& part : found) {
-    const auto place = std::find(places.begin(), places.end(), part.leaf);
-    if (part.leaf->is_beginning) {
-      continue;
-    }
-    sum += sets.WeightOf(*part.leaf) *
-           (part.in_name || place == places.end()
-                ? 1
-                : PlacesScore(counted[static_cast<size_t>(place - places.begin())],
-                              static_cast<double>(candidate.facts->length)));
-  }
-  return SQLITE_OK;
-}
-
-int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score) {
-  if (full_scores_left == 0) {
-    score = 0.5 * std::min(1.0, sets.Promise(candidate.facts->text) / AllWeights());
-    return SQLITE_OK;
-  }
-  --full_scores_left;
-  double sum = BeginningsScore(candidate, found);
-  const int code = WordsScore(candidate, found, sum);
-  score = 0.5 + 0.5 * (sum / AllWeights()) * Youth(candidate.entry, now);
-  return code;
+  return 0.5 + 0.5 * (sum / AllWeights()) * Youth(candidate.entry, now);
 }
 
 }  // namespace fileindexd

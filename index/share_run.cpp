@@ -8,14 +8,14 @@
 #include "index/entry_table.h"
 #include "index/row_sql.h"
 #include "index/schema.h"
-#include "index/text_tokenizer.h"
+#include "index/text_order.h"
 
 namespace fileindexd {
 
 namespace {
 
 constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
-constexpr size_t SCORED_TEXTS = 300;     // the same of texts
+constexpr size_t SCORED_TEXTS = 100;     // the same of texts
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -232,46 +232,12 @@ int ShareRun::CountNames(IdSet& others) {
   return code;
 }
 
-std::vector<int64_t> ShareRun::TextsByPromise() const {
-  std::vector<int64_t> texts = upper.texts.Ids();
-  std::reverse(texts.begin(), texts.end());  // among equals, what was read last
-  std::stable_sort(texts.begin(), texts.end(),
-                   [this](int64_t a, int64_t b) { return sets.Promise(a) > sets.Promise(b); });
-  return texts;
-}
-
-// One entry after the other; the statement is reset behind the last.
-int ShareRun::NextEntryOf(int64_t text, Candidate& candidate, bool& found) {
-  int code = SQLITE_OK;
-  if (entries_of.handle == nullptr) {
-    code = entries_of.Prepare(rows.db, "SELECT " FILEINDEX_ENTRY_COLUMNS
-                                       " FROM contents.files AS files CROSS JOIN entries "
-                                       "ON " FILEINDEX_SAME_FILE
-                                       " WHERE files.text = ?1 AND files.text <> 0");
-  }
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  if (sqlite3_stmt_busy(entries_of.handle) == 0) {
-    entries_of.BindInt(1, text);
-  }
-  code = entries_of.Step();
-  found = code == SQLITE_ROW;
-  if (found) {
-    candidate = Candidate();
-    ReadEntry(entries_of, candidate.entry);
-    return SQLITE_OK;
-  }
-  entries_of.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
-}
-
 // What answers through that text. By their names alone they were visited before.
 int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit) {
   Candidate candidate;
   bool found = false;
-  int code = NextEntryOf(text, candidate, found);
-  for (; code == SQLITE_OK && found; code = NextEntryOf(text, candidate, found)) {
+  int code = rows.NextOfText(text, candidate, found);
+  for (; code == SQLITE_OK && found; code = rows.NextOfText(text, candidate, found)) {
     bool answers = false;
     if (!upper.names.Has(candidate.entry.id)) {
       code = check.Matches(asked.tree, candidate, answers);
@@ -287,32 +253,38 @@ int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& ca
 }
 
 int ShareRun::WalkTexts(BestHits& best) {
-  const std::vector<int64_t> texts = TextsByPromise();
+  TextOrder order(upper.texts, sets);
   Block block;
   block.of_texts = true;
-  score.Refill();
   int code = SQLITE_OK;
-  for (size_t i = 0; i < texts.size() && code == SQLITE_OK; ++i) {
+  for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.
     if (i % SCORED_TEXTS == 0) {
       if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i > 0))) {
-        return question.count_all ? CountTexts(texts, i) : SQLITE_OK;
+        return question.count_all ? CountTexts(order) : SQLITE_OK;
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 0.0);
     }
-    code = VisitEntriesOf(texts[i],
-                          [&](Candidate& candidate) { return AddHit(candidate, best, block); });
+    const int64_t text = order.Next();
+    if (text < 0) {
+      break;
+    }
+    code =
+        VisitEntriesOf(text, [&](Candidate& candidate) { return AddHit(candidate, best, block); });
   }
   return code;
 }
 
-int ShareRun::CountTexts(const std::vector<int64_t>& texts, size_t from) {
+int ShareRun::CountTexts(const TextOrder& order) {
   int code = SQLITE_OK;
-  for (size_t i = from; i < texts.size() && code == SQLITE_OK; ++i) {
-    code = VisitEntriesOf(texts[i], [this](Candidate&) {
-      ++answered;
-      return SQLITE_OK;
-    });
+  for (int64_t text = upper.texts.Next(-1); text >= 0 && code == SQLITE_OK;
+       text = upper.texts.Next(text)) {
+    if (!order.WasGiven(text)) {
+      code = VisitEntriesOf(text, [this](Candidate&) {
+        ++answered;
+        return SQLITE_OK;
+      });
+    }
   }
   return code;
 }

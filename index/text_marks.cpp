@@ -2,11 +2,29 @@
 #include "index/text_marks.h"
 
 #include <algorithm>
-#include <cmath>
 
 namespace fileindexd {
 
-void TextMarks::Add(int64_t text, uint32_t mark) {
+uint16_t TextMark::Of(Where where, uint32_t hits) {
+  return static_cast<uint16_t>(uint32_t{where} << 14 | std::min(hits, MOST_HITS));
+}
+
+double TextMark::Score(uint16_t mark, double length) {
+  const double hits = mark & MOST_HITS;
+  const double often = hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
+  switch (mark >> 14) {
+    case TITLE:
+      return 0.75 + 0.25 * often;
+    case FIELDS:
+      return 0.5 + 0.25 * often;
+    case TEXT:
+      return 0.5 * often;
+    default:
+      return 0;
+  }
+}
+
+void TextMarks::Set(int64_t text, uint16_t mark) {
   const auto at = static_cast<size_t>(text);
   const size_t number = at / CHUNK_TEXTS;
   if (number >= places.size()) {
@@ -16,23 +34,7 @@ void TextMarks::Add(int64_t text, uint32_t mark) {
     chunks.emplace_back();
     places[number] = static_cast<uint32_t>(chunks.size());
   }
-  uint16_t& sum = chunks[places[number] - 1][at % CHUNK_TEXTS];
-  sum = static_cast<uint16_t>(std::min<uint64_t>(MOST, uint64_t{sum} + mark));
-}
-
-void TextMarks::AddAll(const TextMarks& others, double factor) {
-  for (size_t number = 0; number < others.places.size(); ++number) {
-    if (others.places[number] == 0) {
-      continue;
-    }
-    const Chunk& chunk = others.chunks[others.places[number] - 1];
-    for (size_t i = 0; i < CHUNK_TEXTS; ++i) {
-      if (chunk[i] != 0) {
-        const double mark = std::min<double>(MOST, std::ceil(chunk[i] * factor));
-        Add(static_cast<int64_t>(number * CHUNK_TEXTS + i), static_cast<uint32_t>(mark));
-      }
-    }
-  }
+  chunks[places[number] - 1][at % CHUNK_TEXTS] = mark;
 }
 
 uint16_t TextMarks::Of(int64_t text) const {

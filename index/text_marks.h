@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// A small number for each of some texts, in chunks that are there only where some have one. A
-// million neighbours take 2 MB; a few take 2 KB each at most, however large their rowids are.
+// How a part of a question stands in each of some texts, in two bytes, in chunks that are there
+// only where some have one. A million neighbours take 2 MB; a few take 2 KB each at most, however
+// large their rowids are.
 #pragma once
 
 #include <array>
@@ -10,15 +11,23 @@
 
 namespace fileindexd {
 
+// How often, and where it says most: that above how often. 0: not at all.
+struct TextMark {
+  static constexpr uint32_t MOST_HITS = (1 << 14) - 1;
+  enum Where : uint8_t { TEXT = 1, FIELDS = 2, TITLE = 3 };
+
+  static uint16_t Of(Where where, uint32_t hits);
+  // 0 to 1: title above other fields above text, often above once. A long text holds a word more
+  // often by chance.
+  static double Score(uint16_t mark, double length);
+};
+
+constexpr double USUAL_LENGTH = 8192;  // of a text whose length is not known
+
 class TextMarks {
  public:
-  static constexpr uint16_t MOST = UINT16_MAX;
-
-  // Adds, up to MOST. `text`: 0 to MOST_ROWS.
-  void Add(int64_t text, uint32_t mark);
-  // Each of the others multiplied; what was more than nothing stays so.
-  void AddAll(const TextMarks& others, double factor);
-  uint16_t Of(int64_t text) const;  // 0: none
+  void Set(int64_t text, uint16_t mark);  // `text`: 0 to MOST_ROWS
+  uint16_t Of(int64_t text) const;        // 0: none
 
  private:
   static constexpr size_t CHUNK_TEXTS = 1024;

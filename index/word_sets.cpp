@@ -5,7 +5,6 @@
 #include <cmath>
 #include <utility>
 
-#include "index/content_functions.h"
 #include "index/entry_table.h"
 #include "index/name_pattern.h"
 #include "index/name_text.h"
@@ -14,13 +13,22 @@ namespace fileindexd {
 
 namespace {
 
+// Parts of a question that are marked. Each may take two bytes for every text there is; of those
+// beyond only counts that they are there.
+constexpr size_t MOST_MARKED = 8;
 // As in the schema's indexes.
 constexpr int64_t LARGE = 1 << 20;
 constexpr int64_t WEEK = 604'800'000'000'000;
 
+double Rarity(uint64_t answers) {
+  return 1 / std::log2(2 + static_cast<double>(answers));
+}
+
 }  // namespace
 
 int WordSets::Read() {
+  weights.resize(asked.leaves.size());
+  marks.resize(asked.leaves.size());
   for (const WordLeaf& leaf : asked.leaves) {
     const int code = ReadLeaf(leaf);
     if (code != SQLITE_OK) {
@@ -46,7 +54,7 @@ int WordSets::ReadAttributes(const QueryNode& node) {
   return code;
 }
 
-int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marks) {
+int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marked) {
   Statement match;
   int code = match.Prepare(db, sql);
   if (code != SQLITE_OK) {
@@ -59,8 +67,8 @@ int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, Tex
       return SQLITE_CORRUPT;
     }
     ids.Add(id);
-    if (marks != nullptr) {
-      marks->Add(id, static_cast<uint32_t>(match.Int(1)));
+    if (marked != nullptr) {
+      marked->Set(id, static_cast<uint16_t>(match.Int(1)));
     }
   }
   return code == SQLITE_DONE ? SQLITE_OK : code;
@@ -70,7 +78,9 @@ int WordSets::ReadLeaf(const WordLeaf& leaf) {
   WordSet& set = sets[leaf.node];
   if (leaf.node->part == Part::NAME_PATTERN) {
     set.is_sure = true;
-    return NamePattern(*leaf.node).Find(db, set.names);
+    const int code = NamePattern(*leaf.node).Find(db, set.names);
+    weights[NumberOf(leaf)] = Rarity(set.Count());
+    return code;
   }
   set.is_sure = leaf.node->part == Part::WORD;
   set.everything = !set.is_sure && leaf.tokens.empty();
@@ -80,13 +90,14 @@ int WordSets::ReadLeaf(const WordLeaf& leaf) {
                    nullptr);
   }
   if (code == SQLITE_OK && has_contents && !leaf.text_query.empty()) {
-    TextMarks marks;
-    code = Collect(leaf.is_positive
+    const bool is_marked = leaf.is_positive && marked_leaves < MOST_MARKED;
+    marked_leaves += is_marked ? 1 : 0;
+    code = Collect(is_marked
                        ? "SELECT rowid, word_mark(words) FROM contents.words WHERE words MATCH ?1"
                        : "SELECT rowid FROM contents.words WHERE words MATCH ?1",
-                   leaf.text_query, set.texts, leaf.is_positive ? &marks : nullptr);
-    (leaf.is_beginning ? of_beginnings : of_words).AddAll(marks, WeightOf(leaf) / Unit());
+                   leaf.text_query, set.texts, is_marked ? &marks[NumberOf(leaf)] : nullptr);
   }
+  weights[NumberOf(leaf)] = Rarity(set.Count());
   return code;
 }
 
@@ -274,21 +285,18 @@ IdSet WordSets::Lower(const QueryNode& node) const {
   }
 }
 
-double WordSets::WeightOf(const WordLeaf& leaf) const {
-  return 1 / std::log2(2 + static_cast<double>(Of(*leaf.node).Count()));
-}
-
-// What one mark of a leaf that weighs 1 is worth, so that all of them together have room.
-double WordSets::Unit() const {
-  return static_cast<double>(asked.leaves.size()) * MOST_WORD_MARK / TextMarks::MOST;
-}
-
-double WordSets::PromiseOfBeginnings(int64_t text) const {
-  return of_beginnings.Of(text) * Unit() / MOST_WORD_MARK;
+uint16_t WordSets::MarkOf(const WordLeaf& leaf, int64_t text) const {
+  const uint16_t mark = marks[NumberOf(leaf)].Of(text);
+  return mark != 0 || !Of(*leaf.node).texts.Has(text) ? mark : TextMark::Of(TextMark::TEXT, 1);
 }
 
 double WordSets::Promise(int64_t text) const {
-  return of_words.Of(text) * Unit() / MOST_WORD_MARK + PromiseOfBeginnings(text);
+  double promise = 0;
+  for (const WordLeaf& leaf : asked.leaves) {
+    promise +=
+        leaf.is_positive ? WeightOf(leaf) * TextMark::Score(MarkOf(leaf, text), USUAL_LENGTH) : 0;
+  }
+  return promise;
 }
 
 }  // namespace fileindexd

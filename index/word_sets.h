@@ -40,12 +40,11 @@ class WordSets {
   // All of it answers.
   IdSet Lower(const QueryNode& node) const;
   // A rare word says more. 0 to 1.
-  double WeightOf(const WordLeaf& leaf) const;
-  // About how well a text answers the words that say what to find, each by its weight, as far as
-  // counts tell it. 0 and more; the same scale as that of weights.
+  double WeightOf(const WordLeaf& leaf) const { return weights[NumberOf(leaf)]; }
+  // How a leaf that says what to find stands in a text.
+  uint16_t MarkOf(const WordLeaf& leaf, int64_t text) const;
+  // About how well a text answers all of them, by their weights.
   double Promise(int64_t text) const;
-  // The same, of those words alone that are beginnings.
-  double PromiseOfBeginnings(int64_t text) const;
 
  private:
   int ReadLeaf(const WordLeaf& leaf);
@@ -54,9 +53,11 @@ class WordSets {
   int ReadUnder(const QueryNode& node);
   int ReadRange(const QueryNode& node);
   int ReadFew(Statement& statement, WordSet& set);
-  int Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marks);
+  int Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marked);
   WordSet UpperOfAll(const QueryNode& node) const;
-  double Unit() const;
+  size_t NumberOf(const WordLeaf& leaf) const {
+    return static_cast<size_t>(&leaf - asked.leaves.data());
+  }
 
   sqlite3* db;
   bool has_contents;
@@ -64,7 +65,10 @@ class WordSets {
   std::string share;
   std::unordered_map<const QueryNode*, WordSet> sets;
   WordSet unknown = {.names = {}, .texts = {}, .everything = true, .is_sure = false};
-  TextMarks of_words, of_beginnings;  // of leaves that say what to find, in units of Unit
+  // Of the leaves, by number.
+  std::vector<double> weights;
+  std::vector<TextMarks> marks;  // of the first few that say what to find
+  size_t marked_leaves = 0;
 };
 
 }  // namespace fileindexd

@@ -89,25 +89,27 @@ TEST(IdSetTest, JoinsAsSetsOfNumbersDo) {
   }
 }
 
-TEST(TextMarksTest, AddUpToTheMost) {
+TEST(TextMarksTest, EachTextHasItsOwn) {
   TextMarks marks;
-  marks.Add(7, 200);
-  marks.Add(7, 55);
-  marks.Add(MOST_ROWS, 1);
-  EXPECT_EQ(marks.Of(7), 255);
+  marks.Set(7, 200);
+  marks.Set(MOST_ROWS, 1);
+  EXPECT_EQ(marks.Of(7), 200);
   EXPECT_EQ(marks.Of(MOST_ROWS), 1);
   EXPECT_EQ(marks.Of(8), 0);
   EXPECT_EQ(marks.Of(MOST_ROWS - 1), 0);
+}
 
-  TextMarks sum;
-  sum.Add(7, 10);
-  sum.AddAll(marks, 2.5);
-  EXPECT_EQ(sum.Of(7), 10 + 638);
-  EXPECT_EQ(sum.Of(MOST_ROWS), 3);
-  sum.AddAll(marks, 0.001);
-  EXPECT_EQ(sum.Of(MOST_ROWS), 4) << "what stands somewhere is more than nothing";
-  sum.AddAll(marks, 1e9);
-  EXPECT_EQ(sum.Of(7), TextMarks::MOST);
+TEST(TextMarksTest, WhereItStandsCountsMoreThanHowOften) {
+  const auto score = [](TextMark::Where where, uint32_t hits, double length) {
+    return TextMark::Score(TextMark::Of(where, hits), length);
+  };
+  EXPECT_EQ(TextMark::Score(0, USUAL_LENGTH), 0);
+  EXPECT_GT(score(TextMark::TEXT, 1, 1e9), 0);
+  EXPECT_GT(score(TextMark::TEXT, 2, USUAL_LENGTH), score(TextMark::TEXT, 1, USUAL_LENGTH));
+  EXPECT_GT(score(TextMark::TEXT, 1, 100), score(TextMark::TEXT, 1, USUAL_LENGTH));
+  EXPECT_GT(score(TextMark::FIELDS, 1, 1e9), score(TextMark::TEXT, 1'000'000, 1));
+  EXPECT_GT(score(TextMark::TITLE, 1, 1e9), score(TextMark::FIELDS, 1'000'000, 1));
+  EXPECT_LE(score(TextMark::TITLE, 1'000'000, 0), 1);
 }
 
 }  // namespace fileindexd
