@@ -53,6 +53,12 @@ bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& toke
                     [](const std::string& word, const Token& token) { return word == token.text; });
 }
 
+// Scores of one day are the same: a page goes on where the one before ended, though time passes.
+double EndOfDay(time_t moment) {
+  constexpr time_t DAY = 86400;
+  return static_cast<double>((moment / DAY + 1) * DAY);
+}
+
 double Youth(const Entry& entry, double now) {
   const double years =
       std::max(0.0, (now - static_cast<double>(entry.mtime) / 1e9) / (365.0 * 86400));
@@ -68,7 +74,7 @@ HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of
       check(of_check),
       asked(in_question),
       names(of_names),
-      now(static_cast<double>(time(nullptr))) {}
+      now(EndOfDay(time(nullptr))) {}
 
 double HitScore::AllWeights() {
   if (all_weights == 0) {
