@@ -15,22 +15,28 @@ namespace {
 constexpr int TITLE_COLUMN = 0;
 constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
 
+// Only its first phrase counts: what stands behind it says where to look.
 void WordMark(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {
-  int hits = 0;
-  int code = api->xInstCount(match, &hits);
+  int all = 0;
+  int code = api->xInstCount(match, &all);
+  uint32_t hits = 0;
   auto where = TextMark::TEXT;
-  for (int i = 0; i < hits && code == SQLITE_OK && where != TextMark::TITLE; ++i) {
+  for (int i = 0; i < all && code == SQLITE_OK; ++i) {
     int word = 0;
     int column = 0;
     int offset = 0;
     code = api->xInst(match, i, &word, &column, &offset);
-    where = column == TITLE_COLUMN  ? TextMark::TITLE
-            : column == TEXT_COLUMN ? where
-                                    : TextMark::FIELDS;
+    if (word != 0) {
+      continue;
+    }
+    ++hits;
+    where = column == TITLE_COLUMN                              ? TextMark::TITLE
+            : column == TEXT_COLUMN || where == TextMark::TITLE ? where
+                                                                : TextMark::FIELDS;
   }
   if (code == SQLITE_OK) {
-    sqlite3_result_int(result, TextMark::Of(where, static_cast<uint32_t>(hits)));
+    sqlite3_result_int(result, TextMark::Of(where, hits));
   } else {
     sqlite3_result_error_code(result, code);
   }

@@ -92,8 +92,10 @@ int HitScore::Find(Candidate& candidate, std::vector<Found>& found) {
       continue;
     }
     bool matches = false;
-    const bool in_name = leaf.node->part == Part::WORD && check.InName(*leaf.node, candidate);
-    const int code = in_name ? SQLITE_OK : check.Matches(*leaf.node, candidate, matches);
+    bool in_name = false;
+    int code =
+        leaf.node->part == Part::WORD ? check.InName(*leaf.node, candidate, in_name) : SQLITE_OK;
+    code = code == SQLITE_OK && !in_name ? check.Matches(*leaf.node, candidate, matches) : code;
     if (code != SQLITE_OK) {
       return code;
     }

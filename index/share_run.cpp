@@ -116,13 +116,25 @@ std::string ShareRun::BeginningsQuery() const {
   return query;
 }
 
+// Where the words stand in many more names than can answer, looking at those is less than reading
+// which of all names begin so.
+bool ShareRun::AreAllLookedAt() const {
+  constexpr double NAMES_OF_ONE = 64;  // are read while one row is looked at
+  double held = 0;
+  for (const WordLeaf& leaf : asked.leaves) {
+    held += leaf.is_positive ? sets.CountOf(leaf) : 0;
+  }
+  return static_cast<double>(upper.names.Count()) * NAMES_OF_ONE < held;
+}
+
 // The best come first: those that begin with a word, as whole names do. Where they alone are many,
 // the youngest of them are compared by how many words they have; the rest comes as it is, the
 // youngest rows first.
 int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   rest = upper.names;
   const std::string query = BeginningsQuery();
-  if (upper.names.Count() <= BLOCK || !IsScored() || wanted == 0 || query.empty()) {
+  if (upper.names.Count() <= BLOCK || AreAllLookedAt() || !IsScored() || wanted == 0 ||
+      query.empty()) {
     return SQLITE_OK;
   }
   Statement begins;
@@ -174,6 +186,7 @@ int ShareRun::RankByLength(const std::string& query, std::vector<int64_t>& ids, 
 int ShareRun::WalkNames(BestHits& best) {
   std::vector<int64_t> ids;
   IdSet rest;
+  const size_t block_size = AreAllLookedAt() ? SIZE_MAX : BLOCK;
   int code = NamesByRank(ids, rest);
   Block block;
   for (size_t i = 0; code == SQLITE_OK; ++i) {
@@ -182,7 +195,7 @@ int ShareRun::WalkNames(BestHits& best) {
       ids.insert(ids.end(), others.rbegin(), others.rend());
       rest = IdSet();
     }
-    if (i % BLOCK == 0) {
+    if (i % block_size == 0) {
       if (answered_by_name >= wanted && (wanted == 0 || BestComeFirst())) {
         for (; i < ids.size(); ++i) {
           rest.Add(ids[i]);

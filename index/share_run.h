@@ -50,6 +50,7 @@ class ShareRun {
   int WalkRows(BestHits& best);
   int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
   std::string BeginningsQuery() const;
+  bool AreAllLookedAt() const;
   int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
   int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
   int Answers(Candidate& candidate, bool& answers);

@@ -2,7 +2,6 @@
 #include "index/word_sets.h"
 
 #include <algorithm>
-#include <cmath>
 #include <utility>
 
 #include "index/entry_table.h"
@@ -13,30 +12,26 @@ namespace fileindexd {
 
 namespace {
 
-// Parts of a question that are marked. Each may take two bytes for every text there is; of those
-// beyond only counts that they are there.
-constexpr size_t MOST_MARKED = 8;
 // As in the schema's indexes.
 constexpr int64_t LARGE = 1 << 20;
 constexpr int64_t WEEK = 604'800'000'000'000;
 
-double Rarity(uint64_t answers) {
-  return 1 / std::log2(2 + static_cast<double>(answers));
+// SQLITE_OK at the end, SQLITE_ROW where there are more than `most`.
+int ReadIds(Statement& rows, int64_t most, IdSet& ids) {
+  int64_t found = 0;
+  int code = rows.Step();
+  for (; code == SQLITE_ROW && found < most; code = rows.Step()) {
+    const int64_t id = rows.Int(0);
+    if (id < 0 || id > MOST_ROWS) {
+      return SQLITE_CORRUPT;
+    }
+    ids.Add(id);
+    ++found;
+  }
+  return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
 }  // namespace
-
-int WordSets::Read() {
-  weights.resize(asked.leaves.size());
-  marks.resize(asked.leaves.size());
-  for (const WordLeaf& leaf : asked.leaves) {
-    const int code = ReadLeaf(leaf);
-    if (code != SQLITE_OK) {
-      return code;
-    }
-  }
-  return ReadAttributes(asked.tree);
-}
 
 int WordSets::ReadAttributes(const QueryNode& node) {
   if (node.part == Part::SHARE) {
@@ -54,53 +49,6 @@ int WordSets::ReadAttributes(const QueryNode& node) {
   return code;
 }
 
-int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, TextMarks* marked) {
-  Statement match;
-  int code = match.Prepare(db, sql);
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  match.BindText(1, query);
-  for (code = match.Step(); code == SQLITE_ROW; code = match.Step()) {
-    const int64_t id = match.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
-      return SQLITE_CORRUPT;
-    }
-    ids.Add(id);
-    if (marked != nullptr) {
-      marked->Set(id, static_cast<uint16_t>(match.Int(1)));
-    }
-  }
-  return code == SQLITE_DONE ? SQLITE_OK : code;
-}
-
-int WordSets::ReadLeaf(const WordLeaf& leaf) {
-  WordSet& set = sets[leaf.node];
-  if (leaf.node->part == Part::NAME_PATTERN) {
-    set.is_sure = true;
-    const int code = NamePattern(*leaf.node).Find(db, set.names);
-    weights[NumberOf(leaf)] = Rarity(set.Count());
-    return code;
-  }
-  set.is_sure = leaf.node->part == Part::WORD;
-  set.everything = !set.is_sure && leaf.tokens.empty();
-  int code = SQLITE_OK;
-  if (!leaf.names_query.empty() && !leaf.tokens.empty()) {
-    code = Collect("SELECT rowid FROM names WHERE names MATCH ?1", leaf.names_query, set.names,
-                   nullptr);
-  }
-  if (code == SQLITE_OK && has_contents && !leaf.text_query.empty()) {
-    const bool is_marked = leaf.is_positive && marked_leaves < MOST_MARKED;
-    marked_leaves += is_marked ? 1 : 0;
-    code = Collect(is_marked
-                       ? "SELECT rowid, word_mark(words) FROM contents.words WHERE words MATCH ?1"
-                       : "SELECT rowid FROM contents.words WHERE words MATCH ?1",
-                   leaf.text_query, set.texts, is_marked ? &marks[NumberOf(leaf)] : nullptr);
-  }
-  weights[NumberOf(leaf)] = Rarity(set.Count());
-  return code;
-}
-
 // The ending of a name is its last word.
 int WordSets::ReadEndings(const QueryNode& node) {
   NameFolder folder;
@@ -114,8 +62,11 @@ int WordSets::ReadEndings(const QueryNode& node) {
       set.everything = true;
       return SQLITE_OK;
     }
-    const int code = Collect("SELECT rowid FROM names WHERE names MATCH ?1",
-                             Quoted(words + " " + NAME_END), set.names, nullptr);
+    Statement match;
+    int code = match.Prepare(db, "SELECT rowid FROM names WHERE names MATCH ?1");
+    const std::string query = Quoted(words + " " + NAME_END);
+    match.BindText(1, query);
+    code = code == SQLITE_OK ? ReadIds(match, INT64_MAX, set.names) : code;
     if (code != SQLITE_OK) {
       return code;
     }
@@ -126,20 +77,12 @@ int WordSets::ReadEndings(const QueryNode& node) {
 // Ids that an index alone gives. Of more than a bounded number nothing is known.
 int WordSets::ReadFew(Statement& statement, WordSet& set) {
   constexpr int64_t MOST = 10000;
-  int64_t found = 0;
-  int code = statement.Step();
-  for (; code == SQLITE_ROW && found < MOST; code = statement.Step()) {
-    const int64_t id = statement.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
-      return SQLITE_CORRUPT;
-    }
-    set.names.Add(id);
-    ++found;
-  }
+  int code = ReadIds(statement, MOST, set.names);
   if (code == SQLITE_ROW) {
     set = unknown;
+    code = SQLITE_OK;
   }
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  return code;
 }
 
 // What a small folder holds.
@@ -240,7 +183,7 @@ WordSet WordSets::Upper(const QueryNode& node) const {
     case Part::NOT:
       return unknown;
     default:
-      return Of(node);
+      return Of(node).asks_names || Of(node).asks_texts ? unknown : Of(node);
   }
 }
 
