@@ -37,6 +37,14 @@ bool IdSet::Has(int64_t id) const {
   return chunk != nullptr && ((*chunk)[at % CHUNK_IDS / 64] >> (at % 64) & 1) != 0;
 }
 
+void IdSet::Remove(int64_t id) {
+  if (Has(id)) {
+    const auto at = static_cast<size_t>(id);
+    chunks[places[at / CHUNK_IDS] - 1][at % CHUNK_IDS / 64] &= ~(uint64_t{1} << (at % 64));
+    --count;
+  }
+}
+
 void IdSet::Recount() {
   count = 0;
   for (const Chunk& chunk : chunks) {
@@ -92,6 +100,26 @@ int64_t IdSet::Next(int64_t id) const {
       const uint64_t word = (*chunk)[i] & (i == start / 64 ? ~uint64_t{0} << (start % 64) : ~0ULL);
       if (word != 0) {
         return static_cast<int64_t>(number * CHUNK_IDS + i * 64) + std::countr_zero(word);
+      }
+    }
+  }
+  return -1;
+}
+
+int64_t IdSet::Previous(int64_t id) const {
+  const auto most = static_cast<int64_t>(places.size() * CHUNK_IDS);
+  const int64_t last = std::min(id, most) - 1;
+  for (int64_t number = last / static_cast<int64_t>(CHUNK_IDS); last >= 0 && number >= 0;
+       --number) {
+    const auto at = static_cast<size_t>(number);
+    const Chunk* chunk = ChunkAt(at);
+    const bool is_first = at == static_cast<size_t>(last) / CHUNK_IDS;
+    const size_t start = is_first ? static_cast<size_t>(last) % CHUNK_IDS : CHUNK_IDS - 1;
+    for (size_t i = start / 64 + 1; chunk != nullptr && i-- > 0;) {
+      const uint64_t mask = i == start / 64 ? ~uint64_t{0} >> (63 - start % 64) : ~uint64_t{0};
+      const uint64_t word = (*chunk)[i] & mask;
+      if (word != 0) {
+        return static_cast<int64_t>(at * CHUNK_IDS + i * 64) + 63 - std::countl_zero(word);
       }
     }
   }

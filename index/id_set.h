@@ -15,6 +15,7 @@ constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
 class IdSet {
  public:
   void Add(int64_t id);  // 0 to MOST_ROWS
+  void Remove(int64_t id);
   bool Has(int64_t id) const;
   void Unite(const IdSet& other);
   void Intersect(const IdSet& other);
@@ -25,6 +26,8 @@ class IdSet {
   std::vector<int64_t> Ids() const;  // ascending
   // The least that is greater than `id`; -1: none.
   int64_t Next(int64_t id) const;
+  // The greatest that is less than `id`; -1: none.
+  int64_t Previous(int64_t id) const;
 
  private:
   static constexpr size_t CHUNK_WORDS = 64;

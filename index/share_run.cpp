@@ -141,12 +141,13 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   int code = begins.Prepare(rows.db, "SELECT rowid FROM names WHERE names MATCH ?1");
   begins.BindText(1, query);
   IdSet first;
-  for (code = code == SQLITE_OK ? begins.Step() : code; code == SQLITE_ROW; code = begins.Step()) {
+  code = code == SQLITE_OK ? begins.Step() : code;
+  for (; code == SQLITE_ROW && first.Count() <= BLOCK; code = begins.Step()) {
     if (upper.names.Has(begins.Int(0))) {
       first.Add(begins.Int(0));
     }
   }
-  if (code != SQLITE_DONE) {
+  if (code != SQLITE_DONE && code != SQLITE_ROW) {
     return code;
   }
   if (first.Count() > BLOCK) {
@@ -189,12 +190,8 @@ int ShareRun::WalkNames(BestHits& best) {
   const size_t block_size = AreAllLookedAt() ? SIZE_MAX : BLOCK;
   int code = NamesByRank(ids, rest);
   Block block;
+  int64_t last = INT64_MAX;  // that was taken of the rest: downwards, the youngest rows first
   for (size_t i = 0; code == SQLITE_OK; ++i) {
-    if (i == ids.size()) {
-      const std::vector<int64_t> others = rest.Ids();
-      ids.insert(ids.end(), others.rbegin(), others.rend());
-      rest = IdSet();
-    }
     if (i % block_size == 0) {
       if (answered_by_name >= wanted && (wanted == 0 || BestComeFirst())) {
         for (; i < ids.size(); ++i) {
@@ -204,13 +201,17 @@ int ShareRun::WalkNames(BestHits& best) {
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 1.0);
     }
-    if (i == ids.size()) {
+    const bool is_ranked = i < ids.size();
+    last = is_ranked ? last : rest.Previous(last);
+    const int64_t id = is_ranked ? ids[i] : last;
+    if (id < 0) {
       break;
     }
+    rest.Remove(id);
     Candidate candidate;
     bool found = false;
     bool answers = false;
-    code = rows.Find(ids[i], candidate, found);
+    code = rows.Find(id, candidate, found);
     if (code == SQLITE_OK && found) {
       code = Answers(candidate, answers);
     }
@@ -230,13 +231,12 @@ int ShareRun::CountNames(IdSet& others) {
     return SQLITE_OK;
   }
   others.Subtract(sure);
-  const std::vector<int64_t> ids = others.Ids();
   int code = SQLITE_OK;
-  for (size_t i = 0; i < ids.size() && code == SQLITE_OK; ++i) {
+  for (int64_t id = others.Next(-1); id >= 0 && code == SQLITE_OK; id = others.Next(id)) {
     Candidate candidate;
     bool found = false;
     bool answers = false;
-    code = rows.Find(ids[i], candidate, found);
+    code = rows.Find(id, candidate, found);
     if (code == SQLITE_OK && found) {
       code = check.Matches(asked.tree, candidate, answers);
     }

@@ -55,6 +55,25 @@ TEST(IdSetTest, NextIsTheLeastOfThoseBehind) {
   EXPECT_EQ(set.Next(1'000'000), -1);
 }
 
+TEST(IdSetTest, PreviousIsTheGreatestOfThoseInFront) {
+  IdSet set = SetOf({0, 64, 4095, 20'000});
+
+  EXPECT_EQ(set.Previous(INT64_MAX), 20'000);
+  EXPECT_EQ(set.Previous(20'001), 20'000);
+  EXPECT_EQ(set.Previous(20'000), 4095);
+  EXPECT_EQ(set.Previous(4095), 64);
+  EXPECT_EQ(set.Previous(64), 0);
+  EXPECT_EQ(set.Previous(0), -1);
+  EXPECT_EQ(IdSet().Previous(INT64_MAX), -1);
+
+  set.Remove(4095);
+  set.Remove(4095);
+  set.Remove(7);
+  EXPECT_EQ(set.Ids(), Numbers({0, 64, 20'000}));
+  EXPECT_EQ(set.Count(), 3U);
+  EXPECT_EQ(set.Previous(20'000), 64);
+}
+
 TEST(IdSetTest, JoinsAsSetsOfNumbersDo) {
   std::mt19937 random(17);
   for (int round = 0; round < 50; ++round) {
