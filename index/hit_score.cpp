@@ -56,7 +56,8 @@ bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& toke
 // Scores of one day are the same: a page goes on where the one before ended, though time passes.
 double EndOfDay(time_t moment) {
   constexpr time_t DAY = 86400;
-  return static_cast<double>((moment / DAY + 1) * DAY);
+  const time_t end = (moment / DAY + 1) * DAY;
+  return static_cast<double>(end);
 }
 
 double Youth(const Entry& entry, double now) {
