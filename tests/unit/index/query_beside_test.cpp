@@ -34,6 +34,14 @@ struct Written {
   bool Has(const std::string& word) const { return name.contains(word) || text.contains(word); }
 };
 
+std::string Joined(const Names& parts) {
+  std::string text;
+  for (const std::string& part : parts) {
+    text += part;
+  }
+  return text;
+}
+
 }  // namespace
 
 class QueryBesideTest : public QuestionTest {
@@ -138,18 +146,20 @@ class QueryBesideTest : public QuestionTest {
 
 TEST_F(QueryBesideTest, EachPairOfWordsFindsWhatHasBoth) {
   size_t both = 0;
-  for (const auto& [first, often] : WORDS) {
-    for (const auto& [second, as_often] : WORDS) {
+  for (const auto& one : WORDS) {
+    for (const auto& other : WORDS) {
+      const std::string& first = one.first;
+      const std::string& second = other.first;
       const auto fits = [&](const Written& file) { return file.Has(first) && file.Has(second); };
-      EXPECT_EQ(Found(first + " " + second), Fitting(fits)) << first << " " << second;
+      EXPECT_EQ(Found(Joined({first, " ", second})), Fitting(fits)) << first << " " << second;
       const auto in_parts = [&](const Written& file) {
         return file.name.contains(first) && file.text.contains(second);
       };
-      EXPECT_EQ(Found("name:" + first + " text:" + second), Fitting(in_parts));
+      EXPECT_EQ(Found(Joined({"name:", first, " text:", second})), Fitting(in_parts));
       const auto without = [&](const Written& file) {
         return file.Has(first) && !file.Has(second);
       };
-      EXPECT_EQ(Found(first + " -" + second), Fitting(without)) << first << " -" << second;
+      EXPECT_EQ(Found(Joined({first, " -", second})), Fitting(without)) << first << " -" << second;
       both += Fitting(fits).size();
     }
   }
