@@ -9,19 +9,25 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int FIRST_NUMBER_COLUMN = 7;
+constexpr int FIRST_NUMBER = 7;  // of the columns of FactsColumns
 
-FileFacts ReadFacts(const Statement& row) {
+std::string FactsColumns() {
+  return "files.id, files.state, files.found_kind, files.text, files.length, files.sample, "
+         "files.fields, " +
+         std::string(NUMBER_COLUMNS);
+}
+
+FileFacts ReadFacts(const Statement& row, int first) {
   FileFacts facts;
-  facts.id = row.Int(0);
-  facts.state = static_cast<ContentState>(row.Int(1));
-  facts.found_kind = static_cast<Kind>(row.Int(2));
-  facts.text = row.Int(3);
-  facts.length = row.Int(4);
-  facts.sample = row.Int(5);
-  facts.fields = row.Int(6);
+  facts.id = row.Int(first);
+  facts.state = static_cast<ContentState>(row.Int(first + 1));
+  facts.found_kind = static_cast<Kind>(row.Int(first + 2));
+  facts.text = row.Int(first + 3);
+  facts.length = row.Int(first + 4);
+  facts.sample = row.Int(first + 5);
+  facts.fields = row.Int(first + 6);
   for (size_t i = 0; i < NUMBER_FIELDS; ++i) {
-    const int column = FIRST_NUMBER_COLUMN + static_cast<int>(i);
+    const int column = first + FIRST_NUMBER + static_cast<int>(i);
     if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
       facts.numbers[i] = row.Int(column);
     }
@@ -54,6 +60,33 @@ int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
   return Done(code);
 }
 
+int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
+  int code = SQLITE_OK;
+  if (of_text.handle == nullptr) {
+    const std::string sql = "SELECT " FILEINDEX_ENTRY_COLUMNS ", " + FactsColumns() +
+                            " FROM contents.files AS files CROSS JOIN entries "
+                            "ON " FILEINDEX_SAME_FILE " WHERE files.text = ?1 AND files.text <> 0";
+    code = of_text.Prepare(db, sql.c_str());
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  if (sqlite3_stmt_busy(of_text.handle) == 0) {
+    of_text.BindInt(1, text);
+  }
+  code = of_text.Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    candidate = Candidate();
+    ReadEntry(of_text, candidate.entry);
+    candidate.facts = ReadFacts(of_text, ENTRY_COLUMN_COUNT);
+    candidate.is_asked = true;
+    return SQLITE_OK;
+  }
+  of_text.Reset();
+  return Done(code);
+}
+
 int CandidateRows::NeedFacts(Candidate& candidate) {
   if (candidate.is_asked || !has_contents || !candidate.entry.content_wanted) {
     candidate.is_asked = true;
@@ -61,10 +94,9 @@ int CandidateRows::NeedFacts(Candidate& candidate) {
   }
   int code = SQLITE_OK;
   if (facts.handle == nullptr) {
-    const std::string sql = "SELECT id, state, found_kind, text, length, sample, fields, " +
-                            std::string(NUMBER_COLUMNS) +
-                            " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND "
-                            "size = ?3 AND mtime = ?4";
+    const std::string sql = "SELECT " + FactsColumns() +
+                            " FROM contents.files AS files WHERE inode = ?1 AND birth_time = ?2 "
+                            "AND size = ?3 AND mtime = ?4";
     code = facts.Prepare(db, sql.c_str());
   }
   if (code != SQLITE_OK) {
@@ -76,7 +108,7 @@ int CandidateRows::NeedFacts(Candidate& candidate) {
   facts.BindInt(4, candidate.entry.mtime);
   code = facts.Step();
   if (code == SQLITE_ROW) {
-    candidate.facts = ReadFacts(facts);
+    candidate.facts = ReadFacts(facts, 0);
   }
   facts.Reset();
   candidate.is_asked = true;

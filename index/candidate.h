@@ -46,6 +46,9 @@ class CandidateRows {
   CandidateRows(sqlite3* entries, bool with_contents) : db(entries), has_contents(with_contents) {}
 
   int Find(int64_t id, Candidate& candidate, bool& found);
+  // One after the other: entries whose content is that text, with their facts. `found` is false
+  // behind the last, and only then another text may follow.
+  int NextOfText(int64_t text, Candidate& candidate, bool& found);
   int NeedFacts(Candidate& candidate);
   // By name, or by what was found inside where the name tells nothing.
   int KindOf(Candidate& candidate, Kind& kind);
@@ -58,7 +61,7 @@ class CandidateRows {
 
  private:
   NameFolder folder;
-  Statement by_id, facts, twin;
+  Statement by_id, of_text, facts, twin;
 };
 
 // Columns of an entry and of its file that are the same file, contents of it wanted.

@@ -3,11 +3,10 @@
 
 #include <algorithm>
 #include <climits>
-#include <cstring>
-#include <exception>
 
 #include "base/content.h"
 #include "index/fts5_api.h"
+#include "index/text_marks.h"
 
 namespace fileindexd {
 
@@ -16,33 +15,31 @@ namespace {
 constexpr int TITLE_COLUMN = 0;
 constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
 
-void WordHits(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
+// Only its first phrase counts: what stands behind it says where to look.
+void WordMark(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {
-  int hits = 0;
-  const int code = api->xInstCount(match, &hits);
-  if (code == SQLITE_OK) {
-    sqlite3_result_int(result, hits);
-  } else {
-    sqlite3_result_error_code(result, code);
-  }
-}
-
-int CountPlaces(const Fts5ExtensionApi* api, Fts5Context* match, std::vector<WordPlaces>& places) {
-  int hits = 0;
-  int code = api->xInstCount(match, &hits);
-  for (int i = 0; i < hits && code == SQLITE_OK; ++i) {
+  int all = 0;
+  int code = api->xInstCount(match, &all);
+  uint32_t hits = 0;
+  auto where = TextMark::TEXT;
+  for (int i = 0; i < all && code == SQLITE_OK; ++i) {
     int word = 0;
     int column = 0;
     int offset = 0;
     code = api->xInst(match, i, &word, &column, &offset);
-    if (code == SQLITE_OK) {
-      WordPlaces& place = places[static_cast<size_t>(word)];
-      (column == TITLE_COLUMN  ? place.title
-       : column == TEXT_COLUMN ? place.text
-                               : place.fields) += 1;
+    if (word != 0) {
+      continue;
     }
+    ++hits;
+    where = column == TITLE_COLUMN                              ? TextMark::TITLE
+            : column == TEXT_COLUMN || where == TextMark::TITLE ? where
+                                                                : TextMark::FIELDS;
   }
-  return code;
+  if (code == SQLITE_OK) {
+    sqlite3_result_int(result, TextMark::Of(where, hits));
+  } else {
+    sqlite3_result_error_code(result, code);
+  }
 }
 
 // The end of a name is the last phrase of the question.
@@ -76,22 +73,6 @@ void NameRank(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* 
   sqlite3_result_double(result, rank + static_cast<double>(covered) / (end + 1));
 }
 
-void PutWordPlaces(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
-                   int /*count*/, sqlite3_value** /*arguments*/) {
-  try {
-    std::vector<WordPlaces> places(static_cast<size_t>(api->xPhraseCount(match)));
-    const int code = CountPlaces(api, match, places);
-    if (code == SQLITE_OK) {
-      sqlite3_result_blob64(result, places.data(), places.size() * sizeof(WordPlaces),
-                            SQLITE_TRANSIENT);
-    } else {
-      sqlite3_result_error_code(result, code);
-    }
-  } catch (const std::exception&) {
-    sqlite3_result_error_nomem(result);
-  }
-}
-
 }  // namespace
 
 int RegisterQuestionFunctions(sqlite3* db) {
@@ -99,18 +80,9 @@ int RegisterQuestionFunctions(sqlite3* db) {
   if (api == nullptr) {
     return SQLITE_NOMEM;
   }
-  int code = api->xCreateFunction(api, "word_hits", nullptr, WordHits, nullptr);
-  code = code == SQLITE_OK
-             ? api->xCreateFunction(api, "word_places", nullptr, PutWordPlaces, nullptr)
-             : code;
+  const int code = api->xCreateFunction(api, "word_mark", nullptr, WordMark, nullptr);
   return code == SQLITE_OK ? api->xCreateFunction(api, "name_rank", nullptr, NameRank, nullptr)
                            : code;
-}
-
-std::vector<WordPlaces> ReadWordPlaces(std::string_view bytes, size_t words) {
-  std::vector<WordPlaces> places(words);
-  memcpy(places.data(), bytes.data(), std::min(bytes.size(), words * sizeof(WordPlaces)));
-  return places;
 }
 
 }  // namespace fileindexd

@@ -64,7 +64,7 @@ class Explainer {
   int Run(const Entry& entry, Explanation& explanation) {
     Candidate candidate;
     candidate.entry = entry;
-    int code = sets.Read();
+    int code = sets.ReadAll();
     code = code == SQLITE_OK ? AddReasons(asked.tree, candidate, explanation) : code;
     return code == SQLITE_OK ? check.Matches(asked.tree, candidate, explanation.matches) : code;
   }
@@ -124,11 +124,11 @@ class Explainer {
 
   // The fields of its content that hold it, after the name.
   int WhereWord(const QueryNode& node, Candidate& candidate, std::string& where) {
-    if (check.InName(node, candidate)) {
-      where = "name";
-    }
+    bool in_name = false;
     bool in_text = false;
-    int code = check.InText(node, candidate, in_text);
+    int code = check.InName(node, candidate, in_name);
+    where = in_name ? "name" : where;
+    code = code == SQLITE_OK ? check.InText(node, candidate, in_text) : code;
     if (code != SQLITE_OK || !in_text) {
       return code;
     }

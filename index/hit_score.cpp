@@ -6,7 +6,6 @@
 #include <ctime>
 
 #include "base/utf8.h"
-#include "index/content_functions.h"
 #include "index/entry_table.h"
 
 namespace fileindexd {
@@ -54,14 +53,11 @@ bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& toke
                     [](const std::string& word, const Token& token) { return word == token.text; });
 }
 
-// Title above other fields above text. A long text holds a word more often by chance.
-double ScoreOfPlaces(const WordPlaces& found, double length) {
-  constexpr double USUAL_LENGTH = 8192;
-  const double hits = found.title + found.fields + found.text;
-  const double often = hits / (hits + 1.2 * (0.25 + 0.75 * std::min(length / USUAL_LENGTH, 8.0)));
-  return found.title > 0    ? 0.75 + 0.25 * often
-         : found.fields > 0 ? 0.5 + 0.25 * often
-                            : 0.5 * often;
+// Scores of one day are the same: a page goes on where the one before ended, though time passes.
+double EndOfDay(time_t moment) {
+  constexpr time_t DAY = 86400;
+  const time_t end = (moment / DAY + 1) * DAY;
+  return static_cast<double>(end);
 }
 
 double Youth(const Entry& entry, double now) {
@@ -79,25 +75,15 @@ HitScore::HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of
       check(of_check),
       asked(in_question),
       names(of_names),
-      now(static_cast<double>(time(nullptr))) {
-  for (const WordLeaf& leaf : asked.leaves) {
-    if (leaf.is_positive && !leaf.text_query.empty()) {
-      places_query += (places_query.empty() ? "(" : " OR (") + leaf.text_query + ")";
-      places.push_back(&leaf);
+      now(EndOfDay(time(nullptr))) {}
+
+double HitScore::AllWeights() {
+  if (all_weights == 0) {
+    for (const WordLeaf& leaf : asked.leaves) {
+      all_weights += leaf.is_positive ? sets.WeightOf(leaf) : 0;
     }
   }
-}
-
-// A rare word says more.
-void HitScore::Weigh() {
-  for (const WordLeaf& leaf : asked.leaves) {
-    weights.push_back(1 / std::log2(2 + static_cast<double>(sets.Of(*leaf.node).Count())));
-    all_weights += leaf.is_positive ? weights.back() : 0;
-  }
-}
-
-double HitScore::WeightOf(const WordLeaf& leaf) const {
-  return weights[static_cast<size_t>(&leaf - asked.leaves.data())];
+  return all_weights;
 }
 
 // The parts that say what to find, as far as this entry has them.
@@ -107,8 +93,10 @@ int HitScore::Find(Candidate& candidate, std::vector<Found>& found) {
       continue;
     }
     bool matches = false;
-    const bool in_name = leaf.node->part == Part::WORD && check.InName(*leaf.node, candidate);
-    const int code = in_name ? SQLITE_OK : check.Matches(*leaf.node, candidate, matches);
+    bool in_name = false;
+    int code =
+        leaf.node->part == Part::WORD ? check.InName(*leaf.node, candidate, in_name) : SQLITE_OK;
+    code = code == SQLITE_OK && !in_name ? check.Matches(*leaf.node, candidate, matches) : code;
     if (code != SQLITE_OK) {
       return code;
     }
@@ -144,21 +132,19 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
   if (code != SQLITE_OK || found.empty()) {
     return code;
   }
-  if (weights.empty()) {
-    Weigh();
-  }
   const auto in_name = [](const Found& part) { return part.in_name; };
   if (std::any_of(found.begin(), found.end(), in_name) && NameAnswers(asked.tree, found)) {
     double weight = 0;
     for (const Found& part : found) {
-      weight += WeightOf(*part.leaf);
+      weight += sets.WeightOf(*part.leaf);
     }
     found.erase(std::stable_partition(found.begin(), found.end(), in_name), found.end());
-    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / all_weights;
+    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / AllWeights();
     return SQLITE_OK;
   }
   text = candidate.facts->text;
-  return ContentScore(candidate, found, score);
+  score = ContentScore(candidate, found);
+  return SQLITE_OK;
 }
 
 // Of pieces of names alone.
@@ -212,42 +198,16 @@ double HitScore::NameScore(Candidate& candidate, const std::vector<Found>& found
   return (is_stem ? WHOLE_STEM : AT_START) + covered;
 }
 
-int HitScore::ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score) {
-  if (full_scores_left == 0) {
-    const auto hits = static_cast<double>(sets.Hits(candidate.facts->text));
-    score = 0.5 * hits / (hits + 1);
-    return SQLITE_OK;
-  }
-  --full_scores_left;
-  int code = SQLITE_OK;
-  if (read_places.handle == nullptr) {
-    code = read_places.Prepare(rows.db,
-                               "SELECT word_places(words) FROM contents.words WHERE words MATCH ?1 "
-                               "AND rowid = ?2");
-  }
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  read_places.BindText(1, places_query);
-  read_places.BindInt(2, candidate.facts->text);
-  code = read_places.Step();
-  const std::vector<WordPlaces> counted = ReadWordPlaces(read_places.Bytes(0), places.size());
-  read_places.Reset();
-  if (code != SQLITE_ROW && code != SQLITE_DONE) {
-    return code;
-  }
-
+double HitScore::ContentScore(const Candidate& candidate, const std::vector<Found>& found) {
+  const FileFacts& facts = *candidate.facts;
   double sum = 0;
   for (const Found& part : found) {
-    const auto place = std::find(places.begin(), places.end(), part.leaf);
-    sum += WeightOf(*part.leaf) *
-           (part.in_name || place == places.end()
-                ? 1
-                : ScoreOfPlaces(counted[static_cast<size_t>(place - places.begin())],
-                                static_cast<double>(candidate.facts->length)));
+    sum += sets.WeightOf(*part.leaf) * (part.in_name
+                                            ? 1
+                                            : TextMark::Score(sets.MarkOf(*part.leaf, facts.text),
+                                                              static_cast<double>(facts.length)));
   }
-  score = 0.5 + 0.5 * (sum / all_weights) * Youth(candidate.entry, now);
-  return SQLITE_OK;
+  return 0.5 + 0.5 * (sum / AllWeights()) * Youth(candidate.entry, now);
 }
 
 }  // namespace fileindexd

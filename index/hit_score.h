@@ -6,7 +6,6 @@
 //                and how many and how rare they are of those that were asked for
 //   0.5 to 1     some stand in its content alone: title above other fields above text, rare words
 //                above common ones, short texts above long ones, young ones a little above old ones
-//   below 0.5    the same, known from counts alone
 //   0            nothing was asked for but attributes
 #pragma once
 
@@ -19,9 +18,6 @@
 
 namespace fileindexd {
 
-// So many contents are looked at closely, the most promising first.
-constexpr uint64_t MOST_FULL_SCORES = 1000;
-
 class HitScore {
  public:
   HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of_check,
@@ -29,8 +25,6 @@ class HitScore {
 
   // Of an entry that answers. `text` is set where a content counted. SQLite's code.
   int Score(Candidate& candidate, double& score, int64_t& text);
-  // The next MOST_FULL_SCORES contents are looked at closely again.
-  void Refill() { full_scores_left = MOST_FULL_SCORES; }
 
  private:
   struct Found {
@@ -38,26 +32,20 @@ class HitScore {
     bool in_name;
   };
 
-  void Weigh();
-  double WeightOf(const WordLeaf& leaf) const;
+  double AllWeights();
   bool NameAnswers(const QueryNode& node, const std::vector<Found>& found) const;
   int Find(Candidate& candidate, std::vector<Found>& found);
   double NameScore(Candidate& candidate, const std::vector<Found>& found);
   double PieceScore(Candidate& candidate, const std::vector<Found>& found);
-  int ContentScore(Candidate& candidate, const std::vector<Found>& found, double& score);
+  double ContentScore(const Candidate& candidate, const std::vector<Found>& found);
 
   CandidateRows& rows;
   const WordSets& sets;
   RowCheck& check;
   const Asked& asked;
   NameMarker& names;
-  const double now;                     // one moment for all, in seconds since the epoch
-  std::vector<double> weights;          // of the leaves, in order; set at the first score
-  double all_weights = 0;               // of those that say what to find
-  std::string places_query;             // of all leaves that are looked for in texts
-  std::vector<const WordLeaf*> places;  // in its order
-  uint64_t full_scores_left = MOST_FULL_SCORES;
-  Statement read_places;
+  const double now;        // one moment for all, in seconds since the epoch
+  double all_weights = 0;  // of those that say what to find; 0: not added up yet
 };
 
 }  // namespace fileindexd

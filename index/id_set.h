@@ -1,27 +1,46 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// Rowids of one table: a bit each. A million take 125 KB, whatever is among them.
+// Rowids of one table: a bit each, in chunks that are there only where they hold some. A million
+// neighbours take 125 KB; a few take half a KB each at most, however large the numbers are.
 #pragma once
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <vector>
 
 namespace fileindexd {
 
+constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
+
 class IdSet {
  public:
-  void Add(int64_t id);  // not negative
+  void Add(int64_t id);  // 0 to MOST_ROWS
+  void Remove(int64_t id);
   bool Has(int64_t id) const;
   void Unite(const IdSet& other);
   void Intersect(const IdSet& other);
   void Subtract(const IdSet& other);
 
-  bool IsEmpty() const;
-  uint64_t Count() const;
+  bool IsEmpty() const { return Count() == 0; }
+  uint64_t Count() const { return count; }
   std::vector<int64_t> Ids() const;  // ascending
+  // The least that is greater than `id`; -1: none.
+  int64_t Next(int64_t id) const;
+  // The greatest that is less than `id`; -1: none.
+  int64_t Previous(int64_t id) const;
 
  private:
-  std::vector<uint64_t> words;
+  static constexpr size_t CHUNK_WORDS = 64;
+  static constexpr size_t CHUNK_IDS = CHUNK_WORDS * 64;
+  using Chunk = std::array<uint64_t, CHUNK_WORDS>;
+
+  const Chunk* ChunkAt(size_t number) const;
+  Chunk& MakeChunk(size_t number);
+  void Recount();
+
+  std::vector<uint32_t> places;  // by number of the chunk: its place, from 1; 0: holds none
+  std::vector<Chunk> chunks;
+  uint64_t count = 0;
 };
 
 }  // namespace fileindexd

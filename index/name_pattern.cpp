@@ -13,7 +13,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
 // Reading one row of eight costs as much as reading all in a row.
 constexpr uint64_t SPARSE = 8;
 

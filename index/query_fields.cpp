@@ -3,6 +3,11 @@
 
 #include <strings.h>
 
+#include <algorithm>
+#include <string>
+
+#include "index/suggestion.h"
+
 namespace fileindexd {
 
 namespace {
@@ -68,6 +73,21 @@ const NamedField* FindField(std::string_view name) {
     if (std::string_view(field.name).size() == name.size() &&
         strncasecmp(field.name, name.data(), name.size()) == 0) {
       return &field;
+    }
+  }
+  return nullptr;
+}
+
+const char* NearField(std::string_view name) {
+  constexpr size_t SHORTEST = 4;
+  std::string lower(name);
+  std::transform(lower.begin(), lower.end(), lower.begin(),
+                 [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
+  for (const NamedField& field : FIELDS) {
+    const std::string known = field.name;
+    if (std::max(known.size(), lower.size()) >= SHORTEST && known.size() + 1 >= SHORTEST &&
+        EditDistance(lower, known, 1) == 1) {
+      return field.name;
     }
   }
   return nullptr;

@@ -37,6 +37,9 @@ struct NamedField {
 
 // Letter case does not count. Null: no such field.
 const NamedField* FindField(std::string_view name);
+// A field's name that differs from `name` by one slip; null: none. Of names of two or three letters
+// nearly everything would.
+const char* NearField(std::string_view name);
 // The name that users know a text or number field by.
 const char* FieldName(ContentField field);
 

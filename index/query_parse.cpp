@@ -6,8 +6,8 @@
 //   all       = part { [ "AND" ] part }
 //   part      = ( "-" | "NOT" ) part | "(" any ")" | field ":" value | words
 //   words     = '"' { character } '"' [ "*" ] | word
-//   word      = characters up to a blank, or up to a ")" that closes a group; "*" at its end:
-//               what begins with it
+//   word      = characters up to a blank, or up to a ")" that closes a group; "*" at its end, and
+//               nowhere else: what begins with it. In quotes it says nothing
 //   value     = word | pattern | '"' whole name '"'     of name
 //             | pattern                                of path
 //             | words                                  of text and of the text fields
@@ -18,8 +18,8 @@
 //               alone
 //
 // AND, OR and NOT count in capitals only; alone they are words. What stands before a colon and is
-// no field belongs to the word. A word without a letter or a digit ("++") is looked for as it
-// stands, in the name.
+// no field belongs to the word, unless it can only be meant as one (IsMistakenField). A word
+// without a letter or a digit ("++") is looked for as it stands, in the name.
 #include <algorithm>
 #include <utility>
 
@@ -55,6 +55,8 @@ class Parser {
   bool ReadQuoted(Value& value);
   void ReadBare(Value& value);
   const NamedField* TakeField();
+  bool IsMistakenField(std::string& meant) const;
+  size_t NameEnd() const;
 
   void SkipBlanks();
   bool IsAt(std::string_view keyword) const;  // as a word of its own
@@ -224,13 +226,19 @@ bool Parser::ReadNot(QueryNode& node, size_t length, int depth) {
   return true;
 }
 
-// The field in front of a colon, if it is one.
-const NamedField* Parser::TakeField() {
+// Where the letters end that begin here.
+size_t Parser::NameEnd() const {
   size_t end = at;
   while (end < text.size() &&
          ((text[end] >= 'a' && text[end] <= 'z') || (text[end] >= 'A' && text[end] <= 'Z'))) {
     ++end;
   }
+  return end;
+}
+
+// The field in front of a colon, if it is one.
+const NamedField* Parser::TakeField() {
+  const size_t end = NameEnd();
   if (end == text.size() || text[end] != ':') {
     return nullptr;
   }
@@ -239,6 +247,19 @@ const NamedField* Parser::TakeField() {
     at = end + 1;
   }
   return field;
+}
+
+// What can only be meant for a field, and is none: a comparison or a quote behind a colon, or a
+// name that is one slip away from a field's. Words of names and texts hold colons too.
+bool Parser::IsMistakenField(std::string& meant) const {
+  const size_t end = NameEnd();
+  if (end == at || end + 1 >= text.size() || text[end] != ':' || IsBlank(text[end + 1])) {
+    return false;
+  }
+  const char* near = NearField(std::string_view(text).substr(at, end - at));
+  meant = near == nullptr ? "" : near;
+  const char first = text[end + 1];
+  return first == '<' || first == '>' || first == '"' || (near != nullptr && first != '/');
 }
 
 bool Parser::ReadQuoted(Value& value) {
@@ -279,6 +300,13 @@ bool Parser::ReadLeaf(QueryNode& node) {
   }
   const size_t start = at;
   const NamedField* field = TakeField();
+  std::string meant;
+  if (field == nullptr && IsMistakenField(meant)) {
+    const std::string name = text.substr(at, NameEnd() - at);
+    return Fail("there is no field '" + name + "'" + (meant.empty() ? "" : "; '" + meant + "'?") +
+                    " (a word with a colon stands in quotes)",
+                start);
+  }
   Value value;
   if (at < text.size() && text[at] == '"') {
     if (!ReadQuoted(value)) {

@@ -5,9 +5,11 @@
 #include <strings.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <charconv>
 #include <iterator>
 #include <optional>
+#include <system_error>
 
 #include "index/kind.h"
 #include "index/query_values.h"
@@ -62,7 +64,7 @@ bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
     return Fail(error, "'*' needs something to begin with, as in rep*", value.at);
   }
   node.part = Part::NAME_PATTERN;
-  node.pieces = {value.text};
+  node.pieces = {value.text.substr(0, value.text.find_last_not_of('*') + 1)};
   return true;
 }
 
@@ -159,23 +161,40 @@ bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
   return true;
 }
 
-std::optional<int64_t> UserNumber(const std::string& name) {
-  uint32_t number = 0;
-  const auto [end, failed] = std::from_chars(name.data(), name.data() + name.size(), number);
+// 0, or why it cannot be told. `number` is none when there is no such user.
+int UserNumber(const std::string& name, std::optional<int64_t>& number) {
+  uint32_t given = 0;
+  const auto [end, failed] = std::from_chars(name.data(), name.data() + name.size(), given);
   if (failed == std::errc() && end == name.data() + name.size()) {
-    return number;
+    number = given;
+    return 0;
   }
+  constexpr size_t MOST_ROOM = 1 << 20;
   passwd user{};
   passwd* found = nullptr;
   std::string room(16384, '\0');
-  (void)getpwnam_r(name.c_str(), &user, room.data(), room.size(), &found);  // failed: not found
-  return found == nullptr ? std::nullopt : std::optional<int64_t>(user.pw_uid);
+  int code = getpwnam_r(name.c_str(), &user, room.data(), room.size(), &found);
+  while (code == ERANGE && room.size() < MOST_ROOM) {
+    room.resize(room.size() * 4);
+    code = getpwnam_r(name.c_str(), &user, room.data(), room.size(), &found);
+  }
+  // Sources of users that do not know one say so in several ways.
+  const bool is_unknown = code == ENOENT || code == ESRCH || code == EBADF || code == EPERM;
+  number = found == nullptr ? std::nullopt : std::optional<int64_t>(user.pw_uid);
+  return is_unknown ? 0 : code;
 }
 
 bool FillOwner(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::OWNER;
   for (const std::string& name : SplitAt(value.text, ',')) {
-    const std::optional<int64_t> user = UserNumber(name);
+    std::optional<int64_t> user;
+    const int failed = UserNumber(name, user);
+    if (failed != 0) {
+      return Fail(error,
+                  "cannot look up the user '" + name +
+                      "': " + std::generic_category().message(failed) + "; a number needs none",
+                  value.at);
+    }
     if (!user.has_value()) {
       return Fail(error, "there is no user '" + name + "'", value.at);
     }
@@ -244,7 +263,14 @@ bool FillContent(const Value& value, QueryNode& node, QueryError& error) {
 
 }  // namespace
 
+// In quotes a star says nothing, nor is it part of any word.
 bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
+  const size_t end = value.text.find_last_not_of('*') + 1;
+  const size_t star = value.text.find('*');
+  if (!value.is_quoted && star < end) {
+    return Fail(error, "'*' stands at the end of a word; names with gaps are found by name:inv*ce",
+                value.at + star);
+  }
   if (!HoldsWords(value.text)) {
     if (value.text.empty() && value.is_quoted) {
       return Fail(error, "nothing stands between the quotes", value.at - 1);
@@ -255,7 +281,7 @@ bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
     return FillSign(value, node, error);
   }
   node.part = Part::WORD;
-  node.text = value.text;
+  node.text = value.is_quoted ? value.text.substr(0, end) : value.text;
   node.is_phrase = value.is_quoted;
   node.is_beginning = value.is_quoted ? value.has_star : value.text.ends_with('*');
   return true;
@@ -266,6 +292,12 @@ bool FillField(const NamedField& field, const Value& value, time_t now, QueryNod
   if (value.text.empty()) {
     return Fail(error, std::string(field.name) + ": needs a value right behind the colon",
                 node.start);
+  }
+  const bool has_words = field.field == QueryField::NAME || field.field == QueryField::PATH ||
+                         field.field == QueryField::TEXT || field.field == QueryField::TEXT_FIELD;
+  if (value.has_star && !has_words) {
+    return Fail(error, std::string(field.name) + ": takes no '*'",
+                value.at + value.text.size() + 1);
   }
   node.field = field.content;
   switch (field.field) {

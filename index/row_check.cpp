@@ -70,19 +70,46 @@ int RowCheck::MatchesGroup(const QueryNode& node, Candidate& candidate, bool& ma
   return SQLITE_OK;
 }
 
-bool RowCheck::InName(const QueryNode& word, const Candidate& candidate) const {
-  return sets.Of(word).names.Has(candidate.entry.id);
+int RowCheck::InName(const QueryNode& word, Candidate& candidate, bool& matches) {
+  const WordSet& set = sets.Of(word);
+  matches = set.names.Has(candidate.entry.id);
+  if (matches || !set.asks_names || sets.Rarest().names.Has(candidate.entry.id)) {
+    return SQLITE_OK;
+  }
+  const int code = rows.NeedFacts(candidate);
+  if (code != SQLITE_OK || !candidate.facts.has_value() ||
+      !sets.Rarest().texts.Has(candidate.facts->text)) {
+    return code;
+  }
+  return sets.AskName(word, candidate.entry.id, matches);
 }
 
 int RowCheck::InText(const QueryNode& word, Candidate& candidate, bool& matches) {
   const WordSet& set = sets.Of(word);
   matches = false;
-  if (set.texts.IsEmpty()) {
+  if (set.texts.IsEmpty() && !set.asks_texts) {
     return SQLITE_OK;
   }
   const int code = rows.NeedFacts(candidate);
-  matches = candidate.facts.has_value() && candidate.facts->text != 0 &&
-            set.texts.Has(candidate.facts->text);
+  if (code != SQLITE_OK || !candidate.facts.has_value() || candidate.facts->text == 0) {
+    return code;
+  }
+  const int64_t text = candidate.facts->text;
+  matches = set.texts.Has(text);
+  if (matches || !set.asks_texts || sets.Rarest().texts.Has(text) ||
+      !sets.Rarest().names.Has(candidate.entry.id)) {
+    return SQLITE_OK;
+  }
+  return sets.AskText(word, text, matches);
+}
+
+// What is known without asking first.
+int RowCheck::MatchesWord(const QueryNode& word, Candidate& candidate, bool& matches) {
+  matches = sets.Of(word).names.Has(candidate.entry.id);
+  int code = matches ? SQLITE_OK : InText(word, candidate, matches);
+  if (code == SQLITE_OK && !matches) {
+    code = InName(word, candidate, matches);
+  }
   return code;
 }
 
@@ -99,11 +126,9 @@ int RowCheck::MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& mat
   };
   switch (node.part) {
     case Part::WORD:
-      matches = InName(node, candidate);
-      return matches ? SQLITE_OK : InText(node, candidate, matches);
+      return MatchesWord(node, candidate, matches);
     case Part::NAME_PATTERN:
-      matches = InName(node, candidate);
-      return SQLITE_OK;
+      return InName(node, candidate, matches);
     case Part::EXACT_NAME:
       matches = rows.FoldedName(candidate) == folder.Parts(node.text);
       return SQLITE_OK;

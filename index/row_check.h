@@ -14,15 +14,16 @@ namespace fileindexd {
 
 class RowCheck {
  public:
-  RowCheck(CandidateRows& of_rows, const WordSets& of_sets) : rows(of_rows), sets(of_sets) {}
+  RowCheck(CandidateRows& of_rows, WordSets& of_sets) : rows(of_rows), sets(of_sets) {}
 
   // SQLite's code. What decides without another look at the tables is asked first.
   int Matches(const QueryNode& node, Candidate& candidate, bool& matches);
   // Of a WORD or a NAME_PATTERN.
-  bool InName(const QueryNode& word, const Candidate& candidate) const;
+  int InName(const QueryNode& word, Candidate& candidate, bool& matches);
   int InText(const QueryNode& word, Candidate& candidate, bool& matches);
 
  private:
+  int MatchesWord(const QueryNode& word, Candidate& candidate, bool& matches);
   int MatchesLeaf(const QueryNode& node, Candidate& candidate, bool& matches);
   int MatchesGroup(const QueryNode& node, Candidate& candidate, bool& matches);
   bool MatchesPath(const QueryNode& node, const Candidate& candidate);
@@ -32,7 +33,7 @@ class RowCheck {
   static bool MatchesRange(const QueryNode& node, const Candidate& candidate);
 
   CandidateRows& rows;
-  const WordSets& sets;
+  WordSets& sets;
   NameFolder folder;
   std::map<const QueryNode*, NamePattern> paths;
 };

@@ -13,6 +13,7 @@
 
 #include "index/asked.h"
 #include "index/asked_share.h"
+#include "index/entry_table.h"
 #include "index/suggestion.h"
 #include "state/layout.h"
 
@@ -55,6 +56,37 @@ const QueryNode* UnknownShare(const QueryNode& node, const std::vector<std::stri
   }
   for (const QueryNode& below : node.below) {
     const QueryNode* unknown = UnknownShare(below, shares);
+    if (unknown != nullptr) {
+      return unknown;
+    }
+  }
+  return nullptr;
+}
+
+bool HoldsAny(sqlite3* db, const std::string& path) {
+  const PathRange range(path);
+  Statement below;
+  if (below.Prepare(db,
+                    "SELECT 1 FROM entries WHERE path = ?1 OR (path > ?2 AND path < ?3) LIMIT 1") !=
+      SQLITE_OK) {
+    return true;  // not known
+  }
+  below.BindBlob(1, path);
+  below.BindBlob(2, range.first);
+  below.BindBlob(3, range.end);
+  return below.Step() != SQLITE_DONE;
+}
+
+// A folder in the question's text of which the shares know nothing: null, or the first of them.
+const QueryNode* UnknownFolder(const QueryNode& node, const std::deque<AskedShare>& shares) {
+  const bool is_written = node.part == Part::UNDER && node.end > node.start;
+  if (is_written && std::none_of(shares.begin(), shares.end(), [&](const AskedShare& share) {
+        return share.run == nullptr || HoldsAny(share.reader.database.db, node.names.front());
+      })) {
+    return &node;
+  }
+  for (size_t i = 0; i < node.below.size() && node.part != Part::NOT; ++i) {
+    const QueryNode* unknown = UnknownFolder(node.below[i], shares);
     if (unknown != nullptr) {
       return unknown;
     }
@@ -136,6 +168,17 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
     if (question.shows) {
       share.Complete(made.hits);
     }
+  }
+  const QueryNode* folder = made.total == 0 && made.failures.empty() && !shares.empty()
+                                ? UnknownFolder(asked.tree, shares)
+                                : nullptr;
+  if (folder != nullptr) {
+    for (AskedShare& share : shares) {
+      share.Release();
+    }
+    error =
+        QueryError{"the shares that are asked know no such folder", folder->start}.Line(asked.text);
+    return false;
   }
   const bool suggests =
       made.total == 0 && question.suggests && (question.limit > 0 || question.count_all);

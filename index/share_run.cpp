@@ -8,14 +8,14 @@
 #include "index/entry_table.h"
 #include "index/row_sql.h"
 #include "index/schema.h"
-#include "index/text_tokenizer.h"
+#include "index/text_order.h"
 
 namespace fileindexd {
 
 namespace {
 
 constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
-constexpr size_t SCORED_TEXTS = 300;     // the same of texts
+constexpr size_t SCORED_TEXTS = 100;     // the same of texts
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -116,25 +116,38 @@ std::string ShareRun::BeginningsQuery() const {
   return query;
 }
 
+// Where the words stand in many more names than can answer, looking at those is less than reading
+// which of all names begin so.
+bool ShareRun::AreAllLookedAt() const {
+  constexpr double NAMES_OF_ONE = 64;  // are read while one row is looked at
+  double held = 0;
+  for (const WordLeaf& leaf : asked.leaves) {
+    held += leaf.is_positive ? sets.CountOf(leaf) : 0;
+  }
+  return static_cast<double>(upper.names.Count()) * NAMES_OF_ONE < held;
+}
+
 // The best come first: those that begin with a word, as whole names do. Where they alone are many,
 // the youngest of them are compared by how many words they have; the rest comes as it is, the
 // youngest rows first.
 int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   rest = upper.names;
   const std::string query = BeginningsQuery();
-  if (upper.names.Count() <= BLOCK || !IsScored() || wanted == 0 || query.empty()) {
+  if (upper.names.Count() <= BLOCK || AreAllLookedAt() || !IsScored() || wanted == 0 ||
+      query.empty()) {
     return SQLITE_OK;
   }
   Statement begins;
   int code = begins.Prepare(rows.db, "SELECT rowid FROM names WHERE names MATCH ?1");
   begins.BindText(1, query);
   IdSet first;
-  for (code = code == SQLITE_OK ? begins.Step() : code; code == SQLITE_ROW; code = begins.Step()) {
+  code = code == SQLITE_OK ? begins.Step() : code;
+  for (; code == SQLITE_ROW && first.Count() <= BLOCK; code = begins.Step()) {
     if (upper.names.Has(begins.Int(0))) {
       first.Add(begins.Int(0));
     }
   }
-  if (code != SQLITE_DONE) {
+  if (code != SQLITE_DONE && code != SQLITE_ROW) {
     return code;
   }
   if (first.Count() > BLOCK) {
@@ -174,15 +187,12 @@ int ShareRun::RankByLength(const std::string& query, std::vector<int64_t>& ids, 
 int ShareRun::WalkNames(BestHits& best) {
   std::vector<int64_t> ids;
   IdSet rest;
+  const size_t block_size = AreAllLookedAt() ? SIZE_MAX : BLOCK;
   int code = NamesByRank(ids, rest);
   Block block;
+  int64_t last = INT64_MAX;  // that was taken of the rest: downwards, the youngest rows first
   for (size_t i = 0; code == SQLITE_OK; ++i) {
-    if (i == ids.size()) {
-      const std::vector<int64_t> others = rest.Ids();
-      ids.insert(ids.end(), others.rbegin(), others.rend());
-      rest = IdSet();
-    }
-    if (i % BLOCK == 0) {
+    if (i % block_size == 0) {
       if (answered_by_name >= wanted && (wanted == 0 || BestComeFirst())) {
         for (; i < ids.size(); ++i) {
           rest.Add(ids[i]);
@@ -191,13 +201,17 @@ int ShareRun::WalkNames(BestHits& best) {
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 1.0);
     }
-    if (i == ids.size()) {
+    const bool is_ranked = i < ids.size();
+    last = is_ranked ? last : rest.Previous(last);
+    const int64_t id = is_ranked ? ids[i] : last;
+    if (id < 0) {
       break;
     }
+    rest.Remove(id);
     Candidate candidate;
     bool found = false;
     bool answers = false;
-    code = rows.Find(ids[i], candidate, found);
+    code = rows.Find(id, candidate, found);
     if (code == SQLITE_OK && found) {
       code = Answers(candidate, answers);
     }
@@ -217,13 +231,12 @@ int ShareRun::CountNames(IdSet& others) {
     return SQLITE_OK;
   }
   others.Subtract(sure);
-  const std::vector<int64_t> ids = others.Ids();
   int code = SQLITE_OK;
-  for (size_t i = 0; i < ids.size() && code == SQLITE_OK; ++i) {
+  for (int64_t id = others.Next(-1); id >= 0 && code == SQLITE_OK; id = others.Next(id)) {
     Candidate candidate;
     bool found = false;
     bool answers = false;
-    code = rows.Find(ids[i], candidate, found);
+    code = rows.Find(id, candidate, found);
     if (code == SQLITE_OK && found) {
       code = check.Matches(asked.tree, candidate, answers);
     }
@@ -232,46 +245,12 @@ int ShareRun::CountNames(IdSet& others) {
   return code;
 }
 
-std::vector<int64_t> ShareRun::TextsByHits() const {
-  std::vector<int64_t> texts = upper.texts.Ids();
-  std::reverse(texts.begin(), texts.end());  // among equals, what was read last
-  std::stable_sort(texts.begin(), texts.end(),
-                   [this](int64_t a, int64_t b) { return sets.Hits(a) > sets.Hits(b); });
-  return texts;
-}
-
-// One entry after the other; the statement is reset behind the last.
-int ShareRun::NextEntryOf(int64_t text, Candidate& candidate, bool& found) {
-  int code = SQLITE_OK;
-  if (entries_of.handle == nullptr) {
-    code = entries_of.Prepare(rows.db, "SELECT " FILEINDEX_ENTRY_COLUMNS
-                                       " FROM contents.files AS files CROSS JOIN entries "
-                                       "ON " FILEINDEX_SAME_FILE
-                                       " WHERE files.text = ?1 AND files.text <> 0");
-  }
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  if (sqlite3_stmt_busy(entries_of.handle) == 0) {
-    entries_of.BindInt(1, text);
-  }
-  code = entries_of.Step();
-  found = code == SQLITE_ROW;
-  if (found) {
-    candidate = Candidate();
-    ReadEntry(entries_of, candidate.entry);
-    return SQLITE_OK;
-  }
-  entries_of.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
-}
-
 // What answers through that text. By their names alone they were visited before.
 int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit) {
   Candidate candidate;
   bool found = false;
-  int code = NextEntryOf(text, candidate, found);
-  for (; code == SQLITE_OK && found; code = NextEntryOf(text, candidate, found)) {
+  int code = rows.NextOfText(text, candidate, found);
+  for (; code == SQLITE_OK && found; code = rows.NextOfText(text, candidate, found)) {
     bool answers = false;
     if (!upper.names.Has(candidate.entry.id)) {
       code = check.Matches(asked.tree, candidate, answers);
@@ -287,32 +266,38 @@ int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& ca
 }
 
 int ShareRun::WalkTexts(BestHits& best) {
-  const std::vector<int64_t> texts = TextsByHits();
+  TextOrder order(upper.texts, sets);
   Block block;
   block.of_texts = true;
-  score.Refill();
   int code = SQLITE_OK;
-  for (size_t i = 0; i < texts.size() && code == SQLITE_OK; ++i) {
+  for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.
     if (i % SCORED_TEXTS == 0) {
       if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i > 0))) {
-        return question.count_all ? CountTexts(texts, i) : SQLITE_OK;
+        return question.count_all ? CountTexts(order) : SQLITE_OK;
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 0.0);
     }
-    code = VisitEntriesOf(texts[i],
-                          [&](Candidate& candidate) { return AddHit(candidate, best, block); });
+    const int64_t text = order.Next();
+    if (text < 0) {
+      break;
+    }
+    code =
+        VisitEntriesOf(text, [&](Candidate& candidate) { return AddHit(candidate, best, block); });
   }
   return code;
 }
 
-int ShareRun::CountTexts(const std::vector<int64_t>& texts, size_t from) {
+int ShareRun::CountTexts(const TextOrder& order) {
   int code = SQLITE_OK;
-  for (size_t i = from; i < texts.size() && code == SQLITE_OK; ++i) {
-    code = VisitEntriesOf(texts[i], [this](Candidate&) {
-      ++answered;
-      return SQLITE_OK;
-    });
+  for (int64_t text = upper.texts.Next(-1); text >= 0 && code == SQLITE_OK;
+       text = upper.texts.Next(text)) {
+    if (!order.WasGiven(text)) {
+      code = VisitEntriesOf(text, [this](Candidate&) {
+        ++answered;
+        return SQLITE_OK;
+      });
+    }
   }
   return code;
 }

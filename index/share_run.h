@@ -18,6 +18,7 @@
 #include "index/best_hits.h"
 #include "index/hit_display.h"
 #include "index/hit_score.h"
+#include "index/text_order.h"
 
 namespace fileindexd {
 
@@ -45,16 +46,15 @@ class ShareRun {
   int CountNames(IdSet& others);
   int VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit);
   int WalkTexts(BestHits& best);
-  int CountTexts(const std::vector<int64_t>& texts, size_t from);
+  int CountTexts(const TextOrder& order);
   int WalkRows(BestHits& best);
   int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
   std::string BeginningsQuery() const;
+  bool AreAllLookedAt() const;
   int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
   int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
-  std::vector<int64_t> TextsByHits() const;
   int Answers(Candidate& candidate, bool& answers);
   int AddHit(Candidate& candidate, BestHits& best, Block& block);
-  int NextEntryOf(int64_t text, Candidate& candidate, bool& found);
   bool IsScored() const { return question.sort == SortBy::SCORE; }
   // Whoever walks by rank may stop once there are enough.
   bool BestComeFirst() const { return IsScored() && !question.reverse; }
@@ -70,7 +70,6 @@ class ShareRun {
   HitScore score;
   WordSet upper;
   IdSet lower;
-  Statement entries_of;
   uint64_t answered = 0;  // hits so far
   uint64_t answered_by_name = 0;
 };

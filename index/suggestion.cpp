@@ -103,7 +103,7 @@ class Vocabulary {
 };
 
 bool IsKnown(const AskedShare& share, const WordLeaf& leaf) {
-  return share.run != nullptr && share.run->Sets().Of(*leaf.node).Count() > 0;
+  return share.run != nullptr && share.run->Sets().CountOf(leaf) > 0;
 }
 
 }  // namespace

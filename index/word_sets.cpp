@@ -12,22 +12,26 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
 // As in the schema's indexes.
 constexpr int64_t LARGE = 1 << 20;
 constexpr int64_t WEEK = 604'800'000'000'000;
 
-}  // namespace
-
-int WordSets::Read() {
-  for (const WordLeaf& leaf : asked.leaves) {
-    const int code = ReadLeaf(leaf);
-    if (code != SQLITE_OK) {
-      return code;
+// SQLITE_OK at the end, SQLITE_ROW where there are more than `most`.
+int ReadIds(Statement& rows, int64_t most, IdSet& ids) {
+  int64_t found = 0;
+  int code = rows.Step();
+  for (; code == SQLITE_ROW && found < most; code = rows.Step()) {
+    const int64_t id = rows.Int(0);
+    if (id < 0 || id > MOST_ROWS) {
+      return SQLITE_CORRUPT;
     }
+    ids.Add(id);
+    ++found;
   }
-  return ReadAttributes(asked.tree);
+  return code == SQLITE_DONE ? SQLITE_OK : code;
 }
+
+}  // namespace
 
 int WordSets::ReadAttributes(const QueryNode& node) {
   if (node.part == Part::SHARE) {
@@ -45,50 +49,6 @@ int WordSets::ReadAttributes(const QueryNode& node) {
   return code;
 }
 
-int WordSets::Collect(const char* sql, const std::string& query, IdSet& ids, bool counts) {
-  Statement match;
-  int code = match.Prepare(db, sql);
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  match.BindText(1, query);
-  for (code = match.Step(); code == SQLITE_ROW; code = match.Step()) {
-    const int64_t id = match.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
-      return SQLITE_CORRUPT;
-    }
-    ids.Add(id);
-    if (counts) {
-      const auto at = static_cast<size_t>(id);
-      if (at >= hits.size()) {
-        hits.resize(at + 1);
-      }
-      hits[at] += static_cast<uint32_t>(match.Int(1));
-    }
-  }
-  return code == SQLITE_DONE ? SQLITE_OK : code;
-}
-
-int WordSets::ReadLeaf(const WordLeaf& leaf) {
-  WordSet& set = sets[leaf.node];
-  if (leaf.node->part == Part::NAME_PATTERN) {
-    set.is_sure = true;
-    return NamePattern(*leaf.node).Find(db, set.names);
-  }
-  set.is_sure = leaf.node->part == Part::WORD;
-  set.everything = !set.is_sure && leaf.tokens.empty();
-  int code = SQLITE_OK;
-  if (!leaf.names_query.empty() && !leaf.tokens.empty()) {
-    code =
-        Collect("SELECT rowid FROM names WHERE names MATCH ?1", leaf.names_query, set.names, false);
-  }
-  if (code == SQLITE_OK && has_contents && !leaf.text_query.empty()) {
-    code = Collect("SELECT rowid, word_hits(words) FROM contents.words WHERE words MATCH ?1",
-                   leaf.text_query, set.texts, leaf.is_positive);
-  }
-  return code;
-}
-
 // The ending of a name is its last word.
 int WordSets::ReadEndings(const QueryNode& node) {
   NameFolder folder;
@@ -102,8 +62,11 @@ int WordSets::ReadEndings(const QueryNode& node) {
       set.everything = true;
       return SQLITE_OK;
     }
-    const int code = Collect("SELECT rowid FROM names WHERE names MATCH ?1",
-                             Quoted(words + " " + NAME_END), set.names, false);
+    Statement match;
+    int code = match.Prepare(db, "SELECT rowid FROM names WHERE names MATCH ?1");
+    const std::string query = Quoted(words + " " + NAME_END);
+    match.BindText(1, query);
+    code = code == SQLITE_OK ? ReadIds(match, INT64_MAX, set.names) : code;
     if (code != SQLITE_OK) {
       return code;
     }
@@ -114,20 +77,12 @@ int WordSets::ReadEndings(const QueryNode& node) {
 // Ids that an index alone gives. Of more than a bounded number nothing is known.
 int WordSets::ReadFew(Statement& statement, WordSet& set) {
   constexpr int64_t MOST = 10000;
-  int64_t found = 0;
-  int code = statement.Step();
-  for (; code == SQLITE_ROW && found < MOST; code = statement.Step()) {
-    const int64_t id = statement.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
-      return SQLITE_CORRUPT;
-    }
-    set.names.Add(id);
-    ++found;
-  }
+  int code = ReadIds(statement, MOST, set.names);
   if (code == SQLITE_ROW) {
     set = unknown;
+    code = SQLITE_OK;
   }
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  return code;
 }
 
 // What a small folder holds.
@@ -228,7 +183,7 @@ WordSet WordSets::Upper(const QueryNode& node) const {
     case Part::NOT:
       return unknown;
     default:
-      return Of(node);
+      return Of(node).asks_names || Of(node).asks_texts ? unknown : Of(node);
   }
 }
 
@@ -273,9 +228,18 @@ IdSet WordSets::Lower(const QueryNode& node) const {
   }
 }
 
-int64_t WordSets::Hits(int64_t text) const {
-  const auto at = static_cast<size_t>(text);
-  return at < hits.size() ? hits[at] : 0;
+uint16_t WordSets::MarkOf(const WordLeaf& leaf, int64_t text) const {
+  const uint16_t mark = marks[NumberOf(leaf)].Of(text);
+  return mark != 0 || !Of(*leaf.node).texts.Has(text) ? mark : TextMark::Of(TextMark::TEXT, 1);
+}
+
+double WordSets::Promise(int64_t text) const {
+  double promise = 0;
+  for (const WordLeaf& leaf : asked.leaves) {
+    promise +=
+        leaf.is_positive ? WeightOf(leaf) * TextMark::Score(MarkOf(leaf, text), USUAL_LENGTH) : 0;
+  }
+  return promise;
 }
 
 }  // namespace fileindexd

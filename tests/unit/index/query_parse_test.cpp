@@ -1,10 +1,33 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <dlfcn.h>
 #include <gtest/gtest.h>
+#include <pwd.h>
 
+#include <cerrno>
 #include <cstdlib>
 #include <string>
+#include <vector>
 
 #include "index/query.h"
+
+namespace {
+
+std::vector<int> fail_lookups;  // codes of the next look-ups of users
+
+}  // namespace
+
+// In the place of the C library's.
+extern "C" int getpwnam_r(const char* name, passwd* user, char* room, size_t size, passwd** found) {
+  if (!fail_lookups.empty()) {
+    const int code = fail_lookups.front();
+    fail_lookups.erase(fail_lookups.begin());
+    *found = nullptr;
+    return code;
+  }
+  using Function = int (*)(const char*, passwd*, char*, size_t, passwd**);
+  static const auto own = reinterpret_cast<Function>(dlsym(RTLD_NEXT, "getpwnam_r"));
+  return own(name, user, room, size, found);
+}
 
 namespace fileindexd {
 
@@ -53,8 +76,12 @@ TEST_F(QueryParseTest, WordsPhrasesAndBeginnings) {
       {"report", "report"},
       {"  annual \t report ", "(annual report)"},
       {"rep*", "rep*"},
-      {"re*port", "re*port"},
-      {"*port", "*port"},
+      {"rep**", "rep**"},
+      {"\"re*port\"", "\"re*port\""},
+      {"\"rep*\"", "\"rep\""},
+      {"\"rep*\"*", "\"rep\"*"},
+      {"text:\"rep*\"", "text:\"rep\""},
+      {"++*", "name:*++*"},
       {"\"annual report\"", "\"annual report\""},
       {"\"annual rep\"*", "\"annual rep\"*"},
       {"\"a b\"c", "(\"a b\" c)"},
@@ -120,6 +147,12 @@ TEST_F(QueryParseTest, FieldsAndTheirValues) {
       {"author:\"a b\"", "author:\"a b\""},
       {"tag:sea", "keywords:sea"},
       {"colour:red", "colour:red"},
+      {"C:\\x c:", "(C:\\x c:)"},
+      {"texts://x", "texts://x"},
+      {"sizes: 1", "(sizes: 1)"},
+      {"size1:2", "size1:2"},
+      {"x:y form:", "(x:y form:)"},
+      {"\"sise:>1G\"", "\"sise:>1G\""},
       {"kind:video,Audio", "kind:video,audio"},
       {"ext:.jpg,png", "ext:jpg,png"},
       {"owner:0,1000", "owner:0,1000"},
@@ -298,6 +331,62 @@ TEST_F(QueryParseTest, SenselessQuestionsSayWhere) {
       {"near:nan,0,1", "?5"},
       {std::string(5000, 'a'), "?4096"},
   });
+}
+
+TEST_F(QueryParseTest, StarsThatWouldFindNothingAreRefused) {
+  ExpectAll({
+      {"inv*ce", "?3"},
+      {"a *port", "?2"},
+      {"re*po*", "?2"},
+      {"+*+", "?1"},
+      {"text:re*port", "?7"},
+      {"author:*x", "?7"},
+      {"under:\"/a\"*", "?10"},
+      {"size:\"1M\"*", "?9"},
+      {"kind:\"video\"*", "?12"},
+      {"ext:\"pdf\"*", "?9"},
+      {"is:\"file\"*", "?9"},
+      {"year:\"2024\"*", "?11"},
+  });
+}
+
+TEST_F(QueryParseTest, WhatCanOnlyBeMeantForAFieldIsRefused) {
+  ExpectAll({
+      {"sise:>1G", "?0"},
+      {"a -sise:1G", "?3"},
+      {"(sise:1G)", "?1"},
+      {"SIZ:1M", "?0"},
+      {"autor:x", "?0"},
+      {"form:bob", "?0"},
+      {"tags:sea", "?0"},
+      {"foo:>3", "?0"},
+      {"foo:<=3", "?0"},
+      {"foo:\"a b\"", "?0"},
+  });
+  QueryNode query;
+  QueryError error;
+  ASSERT_FALSE(ParseQuery("a sise:>1G", NOW, query, error));
+  EXPECT_EQ(error.Line("a sise:>1G"),
+            "there is no field 'sise'; 'size'? (a word with a colon stands in quotes) "
+            "(character 3, at: sise:>1G)");
+}
+
+TEST_F(QueryParseTest, UsersThatCannotBeLookedUpAreNotUnknownOnes) {
+  QueryNode query;
+  QueryError error;
+  fail_lookups = {ERANGE, ERANGE};
+  EXPECT_EQ(Parsed("owner:root"), "owner:0") << "asked again with more room";
+  fail_lookups = {ENOENT};
+  EXPECT_FALSE(ParseQuery("owner:root", NOW, query, error));
+  EXPECT_EQ(error.what, "there is no user 'root'");
+  fail_lookups = {EIO};
+  EXPECT_FALSE(ParseQuery("owner:root", NOW, query, error));
+  EXPECT_EQ(error.what, "cannot look up the user 'root': Input/output error; a number needs none");
+  EXPECT_EQ(error.at, 6U);
+  fail_lookups = std::vector<int>(100, ERANGE);
+  EXPECT_FALSE(ParseQuery("owner:root", NOW, query, error));
+  EXPECT_TRUE(error.what.starts_with("cannot look up")) << error.what;
+  fail_lookups.clear();
 }
 
 TEST_F(QueryParseTest, WhatIsTooMuchIsRefused) {

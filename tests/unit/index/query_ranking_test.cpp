@@ -2,7 +2,11 @@
 // What people would call a good order, written down before it was measured.
 #include <algorithm>
 #include <cmath>
+#include <functional>
 
+#include "index/asked.h"
+#include "index/asked_share.h"
+#include "index/name_marker.h"
 #include "tests/unit/index/question_fixture.h"
 
 namespace fileindexd {
@@ -133,6 +137,82 @@ TEST_F(QueryRankingTest, TheVeryThingComesFirst) {
     const Names hits = Hits(text);
     ASSERT_FALSE(hits.empty()) << text;
     EXPECT_EQ(hits[0], name) << text;
+  }
+}
+
+class QueryManyTextsTest : public QuestionTest {
+ protected:
+  // More than are looked at closely.
+  void StoreMany(int number, const std::function<Content(int)>& content_of) {
+    std::map<std::string, Content> files;
+    for (int i = 0; i < number; ++i) {
+      files.emplace("f" + std::to_string(i), content_of(i));
+      if (files.size() == 80 || i + 1 == number) {
+        Store(files);
+        files.clear();
+      }
+    }
+  }
+
+  // Pages that a question reads, of both databases.
+  int64_t PagesRead(const std::string& text) {
+    question.text = text;
+    Asked asked;
+    NameMarker marker;
+    std::string error;
+    EXPECT_TRUE(asked.Read(question, marker, error)) << error;
+    AskedShare share("s");
+    share.Ask(question, asked, {}, 20);
+    EXPECT_EQ(share.failures, Names());
+    EXPECT_EQ(share.hits.size(), 20U) << text;
+    int read = 0;
+    int highest = 0;
+    (void)sqlite3_db_status(share.reader.database.db, SQLITE_DBSTATUS_CACHE_HIT, &read, &highest,
+                            0);
+    return read;
+  }
+};
+
+TEST_F(QueryManyTextsTest, BeginningsAreNotPutTogetherForEachHit) {
+  question.count_all = false;
+  StoreMany(400, [](int i) {
+    std::string text = "common";
+    for (int word = 0; word < 40; ++word) {
+      text += " inv" + std::to_string((i * 40 + word) * 7919) + " \u6771";
+      AppendUtf8(0x4e00 + i * 40 + word, text);
+    }
+    return TextContent(text);
+  });
+
+  const int64_t of_a_word = PagesRead("common");
+  EXPECT_LT(PagesRead("inv*"), of_a_word * 3 / 2);
+  EXPECT_LT(PagesRead("inv* common"), of_a_word * 3 / 2);
+  EXPECT_LT(PagesRead("\u6771"), of_a_word * 3 / 2);
+}
+
+TEST_F(QueryManyTextsTest, TitlesStandAboveWhatIsSaidOftenHoweverManySayIt) {
+  StoreMany(700, [](int i) {
+    return i == 0   ? Tagged(ContentField::TITLE, "whale")
+           : i == 1 ? Tagged(ContentField::AUTHOR, "whale")
+                    : TextContent("whale whale whale and whale");
+  });
+
+  for (const char* text : {"whale", "whal*", "whale OR none"}) {
+    const Names hits = Hits(text);
+    EXPECT_EQ(Names(hits.begin(), hits.begin() + 2), Names({"f0", "f1"})) << text;
+  }
+}
+
+TEST_F(QueryManyTextsTest, RareWordsCountMoreThanCommonOnesHoweverManyHoldThose) {
+  StoreMany(700, [](int i) {
+    return TextContent(i == 3   ? "one walrus"
+                       : i == 4 ? "one whale and one walrus"
+                                : "whale whale whale and whale");
+  });
+
+  for (const char* text : {"walrus OR whale", "walru* OR whale", "walrus OR whal*"}) {
+    const Names hits = Hits(text);
+    EXPECT_EQ(Names(hits.begin(), hits.begin() + 2), Names({"f4", "f3"})) << text;
   }
 }
 
