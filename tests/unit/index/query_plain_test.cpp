@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <iterator>
 
 #include "index/reader.h"
 #include "index/search.h"
@@ -22,6 +23,18 @@ bool IsLong() {
 }
 
 using Paths = std::vector<std::string>;
+
+// How many are in the first alone, and some of them. Both are sorted.
+std::string Few(const Paths& first, const Paths& second) {
+  Paths others;
+  std::set_difference(first.begin(), first.end(), second.begin(), second.end(),
+                      std::back_inserter(others));
+  std::string text = std::to_string(others.size());
+  for (size_t i = 0; i < others.size() && i < 3; ++i) {
+    text += "\n    " + others[i];
+  }
+  return text;
+}
 
 class QueryPlainTest : public testing::Test {
  protected:
@@ -64,7 +77,8 @@ class QueryPlainTest : public testing::Test {
     const Paths ordered = Ask(made.text);
     Paths found = ordered;
     std::sort(found.begin(), found.end());
-    ASSERT_EQ(found, expected) << made.text;
+    ASSERT_TRUE(found == expected) << made.text << "\n  too much: " << Few(found, expected)
+                                   << "\n  missing: " << Few(expected, found);
     ASSERT_EQ(answer.total, expected.size()) << made.text;
     if (question.sort != SortBy::SCORE) {
       CheckPage(made, ordered);
