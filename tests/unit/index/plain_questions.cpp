@@ -18,19 +18,20 @@ struct Limits {
   int64_t highest = INT64_MAX;
 };
 
-// `low` is not above `high`. A number stands for its unit, of which `unit` smaller ones make one.
+// `low` is not above `high`. What is stored is counted in a smaller unit, `unit` of which make one:
+// comparisons are exact, and a range holds all of its last one.
 Limits RangeOf(Chance& chance, int64_t low, int64_t high, const std::string& unit_name,
                int64_t unit) {
   const auto text = [&](int64_t number) { return std::to_string(number) + unit_name; };
   switch (chance.Below(6)) {
     case 0:
-      return {">" + text(low), (low + 1) * unit, INT64_MAX};
+      return {">" + text(low), low * unit + 1, INT64_MAX};
     case 1:
       return {">=" + text(low), low * unit, INT64_MAX};
     case 2:
       return {"<" + text(high), INT64_MIN, high * unit - 1};
     case 3:
-      return {"<=" + text(high), INT64_MIN, high * unit + unit - 1};
+      return {"<=" + text(high), INT64_MIN, high * unit};
     case 4:
       return {text(low) + "..", low * unit, INT64_MAX};
     default:
