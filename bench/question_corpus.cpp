@@ -214,8 +214,4 @@ uint64_t QuestionCorpus::NumberOfInode(uint64_t inode) const {
   return inode - FIRST_INODE;
 }
 
-uint64_t QuestionCorpus::NumberOf(const Entry& entry) const {
-  return NumberOfInode(entry.inode);
-}
-
 }  // namespace fileindexd

@@ -45,7 +45,6 @@ class QuestionCorpus {
   Entry EntryOf(uint64_t number) const;
   bool HasText(uint64_t number) const { return number % ENTRIES_FOR_A_TEXT == 0; }
   Content TextOf(uint64_t number) const;  // of one that has a text
-  uint64_t NumberOf(const Entry& entry) const;
   uint64_t NumberOfInode(uint64_t inode) const;
 
   static std::string Share(uint64_t share);          // its name
