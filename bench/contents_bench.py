@@ -20,6 +20,7 @@ import tempfile
 import time
 
 import contents_corpus
+import contents_questions
 import slow_document
 from machine import Log, Machine, has_tracker, look_until, row, wait
 
@@ -204,14 +205,30 @@ def first_index(folder):
     results = {name: [] for name in peers}
     for number in range(ROUNDS):
         for name, peer in peers.items():
-            place = f"{folder}/{name}{number}"
-            results[name].append(peer(place))
+            place = f"{folder}/{name}"
             shutil.rmtree(place, ignore_errors=True)
+            results[name].append(peer(place))
     print_first_index(
         {name: {what: statistics.median(one[what] for one in rounds) for what in rounds[0]}
          for name, rounds in results.items()}
     )
-    shutil.rmtree(tree)
+    if "recoll" in peers:
+        questions(folder)
+    for name in (*peers, "corpus"):
+        shutil.rmtree(f"{folder}/{name}", ignore_errors=True)
+
+
+def questions(folder):
+    """To the indexes that the last round left."""
+    tree = f"{folder}/one-document"
+    os.mkdir(tree)
+    write(f"{tree}/one.txt", contents_corpus.MARKER)
+    ours(f"{folder}/ours-start", tree, 1)
+    recoll(f"{folder}/recoll-start", tree, 1)
+    contents_questions.compare(
+        contents_questions.ours(PROGRAMS, f"{folder}/ours/state", f"{folder}/ours-start/state"),
+        contents_questions.recoll(f"{folder}/recoll", f"{folder}/recoll-start"),
+    )
 
 
 def print_first_index(medians):

@@ -24,6 +24,11 @@ double Median(std::vector<double> values) {
   return values[(values.size() - 1) / 2];
 }
 
+double Percentile95(std::vector<double> values) {
+  std::sort(values.begin(), values.end());
+  return values[(values.size() * 95 + 99) / 100 - 1];
+}
+
 uint64_t Scaled(uint64_t size, uint64_t divisor, uint64_t least) {
   return std::max(size / divisor, least);
 }

@@ -25,6 +25,9 @@ double TimeOf(const std::function<void()>& work);
 // The middle one; of an even number the lower of the two in the middle. Not of none.
 double Median(std::vector<double> values);
 
+// The one that 95 of 100 are not above. Not of none.
+double Percentile95(std::vector<double> values);
+
 // `size` divided by `divisor`, and never less than `least`.
 uint64_t Scaled(uint64_t size, uint64_t divisor, uint64_t least);
 

@@ -4,10 +4,12 @@
 // error. Counting finds as many as looking.
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "fuzz/target.h"
 #include "index/asked.h"
-#include "index/content_functions.h"
+#include "index/contents_reader.h"
+#include "index/contents_writer.h"
 #include "index/database.h"
 #include "index/entry_table.h"
 #include "index/hit_display.h"
@@ -23,11 +25,31 @@ namespace {
 // A question as a whole opens the index anew: a hundred times the cost of its parts.
 constexpr unsigned EVERY = 64;
 
-Entry EntryAt(const std::string& folder, const std::string& name) {
+Entry EntryAt(const std::string& folder, const std::string& name, uint64_t inode) {
   Entry entry;
   entry.path = folder + "/" + name;
   entry.thing = Thing::FILE;
+  entry.content_wanted = true;
+  entry.inode = inode;
+  entry.size = 4000;
+  entry.mtime = 1'704'412'900'000'000'000;
   return entry;
+}
+
+// Something in every field.
+Content Everything() {
+  Content content;
+  content.kind = Kind::PHOTO;
+  content.text = "a holiday at the beach, v1.2 of foo_bar; \u6771\u4eac and \u00dcbung";
+  content.sample = 7;
+  for (int field = 1; field <= static_cast<int>(TEXT_FIELD_COUNT); ++field) {
+    content.texts.push_back({static_cast<ContentField>(field), "field beach notes"});
+  }
+  for (auto field = static_cast<int>(FIRST_NUMBER_FIELD);
+       IsContentField(static_cast<uint8_t>(field)); ++field) {
+    content.numbers.push_back({static_cast<ContentField>(field), 5});
+  }
+  return content;
 }
 
 class Index {
@@ -37,14 +59,16 @@ class Index {
     std::string error;
     Require(MakeShareFolder("s", error), error.c_str());
     Require(database.OpenForWriting(IndexPath("s"), true) == IndexError::NONE, "an index");
-    Require(RegisterQuestionFunctions(database.db) == SQLITE_OK, "functions");
     Require(table.Prepare(database.db) == SQLITE_OK, "its tables");
     Require(table.Begin() == SQLITE_OK, "a transaction");
+    uint64_t inode = 0;
     for (const char* name :
          {"holiday beach.jpg", "C++ notes.txt", "a \"b\" AND (c) *.md", "--", "x"}) {
-      Require(table.Insert(EntryAt("/s", name)) == SQLITE_OK, "an entry");
+      Require(table.Insert(EntryAt("/s", name, ++inode)) == SQLITE_OK, "an entry");
     }
     Require(table.Commit(1) == SQLITE_OK, "a commit");
+    ReadContents();
+    Require(AttachContents(database, "s") == IndexError::NONE, "contents");
     Require(marker.Open(), "a tokenizer");
   }
 
@@ -59,7 +83,7 @@ class Index {
     }
 
     Require(table.Begin() == SQLITE_OK, "a transaction");
-    const Entry entry = EntryAt("/s/fuzz", name);
+    const Entry entry = EntryAt("/s/fuzz", name, 1);  // another name of a file that was read
     Require(table.Insert(entry) == SQLITE_OK, "a name of any bytes");
     Run(question, asked);
     size_t before = 0;
@@ -75,10 +99,25 @@ class Index {
   }
 
  private:
+  // Of the first two all; the third one failed, and the others wait.
+  static void ReadContents() {
+    ContentsWriter writer;
+    bool more = true;
+    std::vector<ContentJob> jobs;
+    Require(writer.Open({"s", "/s", "fs"}, 1) == IndexError::NONE, "contents");
+    Require(writer.TakeIn(100, more) && writer.NextJobs(100, jobs, more), "files that wait");
+    for (const ContentJob& job : jobs) {
+      Require(job.identity.inode > 2 || writer.Finish(job.file, Everything()), "a content");
+      Require(job.identity.inode != 3 || writer.Fail(job.file, "broken", Content(), false),
+              "a failure");
+    }
+    Require(writer.Commit(), "a commit");
+  }
+
   void Run(const Question& question, const Asked& asked) {
     BestHits best(10, {});
     uint64_t total = 0;
-    ShareRun run(database.db, false, question, asked, "s", marker);
+    ShareRun run(database.db, true, question, asked, "s", marker);
     Require(run.Run(best, total) == SQLITE_OK, "no error");
     best.Cut();
     Require(best.hits.size() <= total, "hits are counted");
@@ -90,7 +129,7 @@ class Index {
     counted.limit = 0;
     BestHits none(0, {});
     uint64_t again = 0;
-    ShareRun count(database.db, false, counted, asked, "s", marker);
+    ShareRun count(database.db, true, counted, asked, "s", marker);
     Require(count.Run(none, again) == SQLITE_OK, "no error");
     Require(again == total, "counting finds as many as looking");
   }
