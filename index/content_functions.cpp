@@ -6,15 +6,14 @@
 #include <cstring>
 #include <exception>
 
-#include "base/content.h"
+#include "index/contents_schema.h"
 #include "index/fts5_api.h"
 
 namespace fileindexd {
 
 namespace {
 
-constexpr int TITLE_COLUMN = 0;
-constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
+constexpr int TITLE_COLUMN = FIRST_FIELD_COLUMN;
 
 void WordHits(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,
               int /*count*/, sqlite3_value** /*arguments*/) {

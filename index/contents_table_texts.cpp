@@ -129,10 +129,10 @@ int ContentsTable::RunWords(Statement& statement, int64_t text, const ContentWor
       statement.BindText(column++, value);
     }
   };
+  bind(words.text);
   for (const std::string_view field : words.fields) {
     bind(field);
   }
-  bind(words.text);
   bind(words.numbers);
   return statement.Run();
 }

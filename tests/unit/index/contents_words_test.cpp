@@ -103,6 +103,28 @@ TEST_F(ContentsWordsTest, ContentsWithoutWordsAreDamaged) {
   EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
 }
 
+TEST_F(ContentsWordsTest, PlacesInATextTakeLessRoomThanThoseInAField) {
+  constexpr int WORDS = 2000;
+  std::string text;
+  for (int word = 0; word < WORDS; ++word) {
+    text += "w" + std::to_string(word) + " ";
+  }
+  File("field.pdf");
+  File("text.pdf");
+  Jobs();
+  Content titled;
+  titled.texts = {{ContentField::TITLE, text}};
+  const auto size = [this] { return Number("SELECT sum(length(block)) FROM words_data"); };
+  const int64_t none = size();
+  ASSERT_TRUE(contents->Finish(JobOf("field.pdf").file, titled));
+  ASSERT_TRUE(contents->Commit());
+  const int64_t field = size() - none;
+
+  Finish("text.pdf", text);
+
+  EXPECT_LE(size() - none - field, field - 2 * WORDS);
+}
+
 TEST_F(ContentsWordsTest, YearAndTrackAreWords) {
   File("a.mp3");
   File("b.mp3");
