@@ -62,8 +62,9 @@ CREATE TABLE meta(
   last_text INTEGER NOT NULL,
   reworded INTEGER NOT NULL,
   reword_end INTEGER NOT NULL,
-  words_version TEXT NOT NULL);
-INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '');
+  words_version TEXT NOT NULL,
+  merged INTEGER NOT NULL);
+INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '', 0);
 PRAGMA application_id = 1179206479;
 PRAGMA user_version = 3;
 )sql";

@@ -29,7 +29,8 @@
 //     pages … rating    the number fields; NULL: not known
 //   texts     the text fields and the text, packed (see content_text.h). Rowids ascend in the order
 //             of reading: the full-text table collects changes in memory only while they do
-//   words     the same by words: a column for the text, and one for each text field. No stored copy, so
+//   words     the same by words: a column for the text, and one for each text field. No stored
+//   copy, so
 //             deleting needs what was inserted. Made by the writer, as the share's language is
 //             among its arguments
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
@@ -39,8 +40,10 @@
 //             of the words, the version of the readers that what failed was tried with, the random
 //             number of the entries database that was followed and the greatest `written` seen in
 //             it, the last rowid in `texts`, and while the words are being made anew, up to which
-//             of them that is done (all, unless it is going on) and up to which it has to be, and
-//             the version of what cuts texts into words
+//             of them that is done (all, unless it is going on) and up to which it has to be, the
+//             version of what cuts texts into words, and the last rowid in `texts` when the words
+//             were merged
+//   old_words what `words` was, while it is taken away after words began to be made anew
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.

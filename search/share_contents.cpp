@@ -118,7 +118,7 @@ void ShareContents::Work(Time now, int64_t wall) {
   }
 
   const bool good =
-      Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now);
+      Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now) && Merge();
   if (!good) {
     RestForError(now);
     return;
@@ -246,9 +246,17 @@ bool ShareContents::Commit() {
   return true;
 }
 
+// Only when there is nothing else to do.
+bool ShareContents::Merge() {
+  if (!may_merge || !IsIdle()) {
+    return true;
+  }
+  return writer.Merge(may_merge) && Commit();
+}
+
 void ShareContents::CloseIfIdle(Time now) {
   const bool is_short = later_look != Time::max() && later_look - now < CLOSE_AFTER;
-  if (!IsIdle() || !patient.empty() || is_short) {
+  if (!IsIdle() || may_merge || !patient.empty() || is_short) {
     idle_since = now;
   } else if (now - idle_since >= CLOSE_AFTER) {
     const Time look = later_look;
@@ -286,7 +294,7 @@ Time ShareContents::Due() const {
     return Time::max();
   }
   Time due = next_full_look;
-  const bool has_work = Sweeps() || look_at_all || retry_wanted;
+  const bool has_work = Sweeps() || look_at_all || retry_wanted || (may_merge && IsIdle());
   if (!writer.IsOpen()) {
     due = is_missing ? due : has_news || has_work ? Time() : std::min(due, later_look);
     return std::max(due, rest_until);

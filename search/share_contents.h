@@ -97,6 +97,7 @@ class ShareContents {
   void LookLater(Time now);
   bool Sweep(int64_t wall);
   bool Retry();
+  bool Merge();
   bool ReleasePatient(Time now);
   bool CommitIfDue(Time now);
   bool Commit();
@@ -124,6 +125,7 @@ class ShareContents {
   bool retry_wanted = false;
   bool retried = false;
   bool may_have_jobs = false;
+  bool may_merge = true;  // words that are new since they were merged
   Time next_take_in;
   Time taken_in;                               // the last time
   std::chrono::milliseconds between_looks{0};  // that find nothing

@@ -186,6 +186,7 @@ void ShareContents::End(ExtractOutcome&& outcome, Time now) {
     return;
   }
   may_have_jobs = true;  // it may wait again, or another have waited for its end
+  may_merge = true;
 }
 
 }  // namespace fileindexd

@@ -31,6 +31,7 @@ struct ScriptedContents {
   std::vector<std::string> calls;
   std::map<std::string, IndexError> failing;  // by the call's name: it fails so, until removed
   size_t pending_bytes = 0;
+  int unmerged = 0;     // so many times Merge says that there is more
   bool unseen = false;  // the next NextJobs gives nothing, and says that there may be more
 };
 

@@ -455,6 +455,39 @@ TEST_F(ShareContentsTest, NothingIsSweptWhileTheEntriesAreMadeAnew) {
   EXPECT_GT(Count("Sweep"), 0U);
 }
 
+TEST_F(ShareContentsTest, WordsAreMergedWhenNothingElseIsToBeDone) {
+  Scripted().unmerged = 3;
+  AddFile(1);
+  Settle();
+  const std::vector<uint64_t> ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  Settle();
+  EXPECT_EQ(Count("Merge"), 0U);
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+  (void)GiveOut();  // there is nothing more
+  Settle();
+  EXPECT_EQ(Count("Merge"), 4U);
+  Wait(20);
+  EXPECT_EQ(Count("Merge"), 4U);
+}
+
+TEST_F(ShareContentsTest, WhatComesMeanwhileIsReadBeforeTheMergingGoesOn) {
+  Scripted().unmerged = 1000;
+  Settle();
+  (void)GiveOut();
+  contents.Work(now, WALL);
+  EXPECT_EQ(Count("Merge"), 1U);
+
+  AddFile(1);
+  contents.EntriesChanged();
+  Pass(milliseconds(2));
+  EXPECT_EQ(GiveOut().size(), 1U);
+  const size_t merged = Count("Merge");
+  Settle();
+  EXPECT_EQ(Count("Merge"), merged);
+}
+
 TEST_F(ShareContentsTest, QuickFilesAreGivenOutInLargerBatches) {
   for (int64_t row = 1; row <= 300; ++row) {
     AddFile(row);
