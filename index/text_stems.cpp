@@ -15,7 +15,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t SLOTS = 1 << 16;
+constexpr size_t SLOTS = 1 << 14;
 
 constexpr std::pair<std::string_view, std::string_view> CODES[] = {
     {"ar", "arabic"},     {"ca", "catalan"},  {"da", "danish"},     {"de", "german"},

@@ -78,7 +78,7 @@ class ShareContents {
   static constexpr size_t SMALLEST_BATCH = 4;
   static constexpr size_t LARGEST_BATCH = 64;
   // What they were found to hold is kept meanwhile.
-  static constexpr size_t MOST_LOOKING = 8;
+  static constexpr size_t MOST_LOOKING = 4;
 
  private:
   struct Ready {

@@ -52,6 +52,7 @@ bool WorkThrough(ContentsWriter& writer, const Share& share) {
       return false;
     }
     std::vector<int64_t> files;
+    files.reserve(jobs.size());
     for (const ContentJob& job : jobs) {
       files.push_back(job.file);
     }
