@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/characters.h"
 
+#include <algorithm>
+
 namespace fileindexd {
 
 namespace {
@@ -69,15 +71,21 @@ bool IsBlank(char32_t code) {
          (code >= 0xFFF9 && code <= 0xFFFD) || (code & 0xFFFEU) == 0xFFFE;
 }
 
+// Most bytes are plain ones, and of every text each is looked at.
 bool IsCleanText(std::string_view bytes) {
-  while (!bytes.empty()) {
+  const auto is_plain = [](char c) { return (c >= ' ' && c < 0x7F) || c == '\n'; };
+  while (true) {
+    bytes.remove_prefix(static_cast<size_t>(std::find_if_not(bytes.begin(), bytes.end(), is_plain) -
+                                            bytes.begin()));
+    if (bytes.empty()) {
+      return true;
+    }
     const Character character = FirstCharacter(bytes);
-    if (IsBlank(character.code) && bytes[0] != ' ' && bytes[0] != '\n') {
+    if (IsBlank(character.code)) {
       return false;
     }
     bytes.remove_prefix(character.length);
   }
-  return true;
 }
 
 std::string_view CutText(std::string_view text, size_t limit) {

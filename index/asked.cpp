@@ -46,7 +46,8 @@ void AddOptions(const Question& question, size_t end, QueryNode& tree) {
 
 std::string ColumnName(ContentField field) {
   std::string_view columns = WORD_COLUMNS;
-  for (int i = 1; i < static_cast<int>(field); ++i) {
+  const int number = FIRST_FIELD_COLUMN + static_cast<int>(field) - 1;
+  for (int i = 0; i < number; ++i) {
     columns.remove_prefix(columns.find(", ") + 2);
   }
   return std::string(columns.substr(0, columns.find(',')));

@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <climits>
 
-#include "base/content.h"
+#include "index/contents_schema.h"
 #include "index/fts5_api.h"
 #include "index/text_marks.h"
 
@@ -12,8 +12,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int TITLE_COLUMN = 0;
-constexpr auto TEXT_COLUMN = static_cast<int>(TEXT_FIELD_COUNT);
+constexpr int TITLE_COLUMN = FIRST_FIELD_COLUMN;
 
 // Only its first phrase counts: what stands behind it says where to look.
 void WordMark(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* result,

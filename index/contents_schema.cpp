@@ -5,7 +5,7 @@
 
 namespace fileindexd {
 
-static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 2,
+static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3,
               "numbers in the text below");
 
 namespace {
@@ -62,10 +62,11 @@ CREATE TABLE meta(
   last_text INTEGER NOT NULL,
   reworded INTEGER NOT NULL,
   reword_end INTEGER NOT NULL,
-  words_version TEXT NOT NULL);
-INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '');
+  words_version TEXT NOT NULL,
+  merged INTEGER NOT NULL);
+INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '', 0);
 PRAGMA application_id = 1179206479;
-PRAGMA user_version = 2;
+PRAGMA user_version = 3;
 )sql";
 
 }  // namespace
@@ -84,8 +85,8 @@ const char* const NUMBER_COLUMNS =
     "latitude, longitude, rating";
 
 const char* const WORD_COLUMNS =
-    "title, author, subject, description, keywords, sender, receivers, attachments, members, "
-    "artist, album, album_artist, genre, composer, codecs, camera, lens, caption, text, numbers";
+    "text, title, author, subject, description, keywords, sender, receivers, attachments, members, "
+    "artist, album, album_artist, genre, composer, codecs, camera, lens, caption, numbers";
 
 // The hash that collects words before they are written as a segment holds 8 MiB: fewer segments
 // to merge, which is what most of the time goes into.

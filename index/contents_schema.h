@@ -29,7 +29,8 @@
 //     pages … rating    the number fields; NULL: not known
 //   texts     the text fields and the text, packed (see content_text.h). Rowids ascend in the order
 //             of reading: the full-text table collects changes in memory only while they do
-//   words     the same by words: a column for each text field, and the text. No stored copy, so
+//   words     the same by words: a column for the text, and one for each text field. No stored
+//   copy, so
 //             deleting needs what was inserted. Made by the writer, as the share's language is
 //             among its arguments
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
@@ -39,8 +40,10 @@
 //             of the words, the version of the readers that what failed was tried with, the random
 //             number of the entries database that was followed and the greatest `written` seen in
 //             it, the last rowid in `texts`, and while the words are being made anew, up to which
-//             of them that is done (all, unless it is going on) and up to which it has to be, and
-//             the version of what cuts texts into words
+//             of them that is done (all, unless it is going on) and up to which it has to be, the
+//             version of what cuts texts into words, and the last rowid in `texts` when the words
+//             were merged
+//   old_words what `words` was, while it is taken away after words began to be made anew
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.
@@ -54,7 +57,7 @@
 namespace fileindexd {
 
 constexpr int64_t CONTENTS_APPLICATION = 0x4649434f;
-constexpr int64_t CONTENTS_VERSION = 2;
+constexpr int64_t CONTENTS_VERSION = 3;
 
 extern const DatabaseForm CONTENTS_FORM;
 
@@ -70,8 +73,12 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;
-// The columns of `words`: those of the text fields in their order, the text, and numbers as words.
+// The columns of `words`: the text, those of the text fields in their order, and numbers as words.
+// The text comes first: in each document's places of each word, the full-text table writes down all
+// columns but the first one.
 extern const char* const WORD_COLUMNS;
+constexpr int TEXT_COLUMN = 0;
+constexpr int FIRST_FIELD_COLUMN = 1;
 
 // Makes the words anew, empty, for that language (one of IsLanguage).
 std::string WordsSchema(const std::string& language);

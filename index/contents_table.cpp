@@ -79,7 +79,8 @@ int ContentsTable::Prepare(sqlite3* db) {
       {&write_meta,
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
        "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
-       "words_version = ?9 WHERE id = 1"},
+       "words_version = ?9, merged = ?10 WHERE id = 1"},
+      {&count_done, "SELECT coalesce(sum(done), 0) FROM counts"},
       {&write_counts,
        "UPDATE counts SET waiting = waiting + ?2, done = done + ?3, "
        "failed = failed + ?4 WHERE kind = ?1"},
@@ -103,10 +104,10 @@ int ContentsTable::Prepare(sqlite3* db) {
 
 int ContentsTable::ReadMeta() {
   Statement statement;
-  int code =
-      statement.Prepare(handle,
-                        "SELECT filesystem, language, extractor, entries_made, seen, "
-                        "last_text, reworded, reword_end, words_version FROM meta WHERE id = 1");
+  int code = statement.Prepare(
+      handle,
+      "SELECT filesystem, language, extractor, entries_made, seen, "
+      "last_text, reworded, reword_end, words_version, merged FROM meta WHERE id = 1");
   if (code == SQLITE_OK) {
     code = statement.Step();
   }
@@ -122,6 +123,7 @@ int ContentsTable::ReadMeta() {
   meta.reworded = statement.Int(6);
   meta.reword_end = statement.Int(7);
   meta.words_version = statement.Bytes(8);
+  meta.merged = statement.Int(9);
   return SQLITE_OK;
 }
 
@@ -140,6 +142,7 @@ int ContentsTable::WriteMeta() {
   write_meta.BindInt(7, meta.reworded);
   write_meta.BindInt(8, meta.reword_end);
   write_meta.BindText(9, meta.words_version);
+  write_meta.BindInt(10, meta.merged);
   return write_meta.Run();
 }
 
@@ -165,6 +168,12 @@ int ContentsTable::WriteCounts(int64_t now) {
   return code == SQLITE_OK ? write_rate.Run() : code;
 }
 
+bool ContentsTable::HasFreePages() {
+  const bool has = free_pages.Step() == SQLITE_ROW && free_pages.Int(0) > FREE_PAGES_KEPT;
+  free_pages.Reset();
+  return has;
+}
+
 int ContentsTable::Commit(int64_t now) {
   if (!changed) {
     return SQLITE_OK;
@@ -174,14 +183,13 @@ int ContentsTable::Commit(int64_t now) {
     code = code == SQLITE_OK ? (this->*step)() : code;
   }
   code = code == SQLITE_OK ? WriteCounts(now) : code;
-  if (code == SQLITE_OK && free_pages.Step() == SQLITE_ROW && free_pages.Int(0) > FREE_PAGES_KEPT) {
+  if (code == SQLITE_OK && HasFreePages()) {
     do {
       code = give_back.Step();
     } while (code == SQLITE_ROW);
     give_back.Reset();
     code = code == SQLITE_DONE ? SQLITE_OK : code;
   }
-  free_pages.Reset();
   code = code == SQLITE_OK ? Execute(handle, "COMMIT") : code;
   if (code == SQLITE_OK) {
     changed = false;

@@ -48,6 +48,7 @@ struct ContentsMeta {
   int64_t reworded = ALL_WORDS;
   int64_t reword_end = 0;
   std::string words_version;
+  int64_t merged = 0;
 };
 
 class ContentsTable {
@@ -83,8 +84,12 @@ class ContentsTable {
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 
-  // Makes words of stored texts, about a MiB. `more`: there are others.
+  // Makes words of stored texts, about a MiB, and takes away as many old ones. `more`: there are
+  // others.
   int Reword(bool& more);
+  // One step, bounded, towards words that stand in one piece, if so many are new that it is worth
+  // it; and then towards a file without free pages. `more`: call again, after a commit.
+  int MergeWords(bool& more);
 
   ContentsMeta meta;
   bool changed = false;      // since the last commit, `meta` included
@@ -101,6 +106,10 @@ class ContentsTable {
   };
 
   int PrepareTexts();
+  int HasTable(const char* name, bool& has);
+  int RemoveOldWords();
+  int IsWorthMerging(bool& is_worth);
+  bool HasFreePages();
   int WriteMeta();
   int WriteCounts(int64_t now);
   void Count(const ContentFile& file, int64_t number);
@@ -112,10 +121,12 @@ class ContentsTable {
 
   std::array<CountOfKind, 5> counted;  // since the last commit
   std::vector<int64_t> leaving;        // rowids in `texts`
+  bool has_old_words = false;
+  bool merging = false;
   Statement find, find_by_id, waiting, failed, left_begun, unreferred, slice;
   Statement insert, update, set_reason, set_content, remove;
   Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
-  Statement write_meta, write_counts, write_rate, cut_rate, free_pages, give_back;
+  Statement write_meta, write_counts, write_rate, cut_rate, free_pages, give_back, count_done;
 };
 
 }  // namespace fileindexd

@@ -9,8 +9,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t REWORD_BYTES = size_t{1} << 20;
-constexpr size_t REWORD_ROW = 500;  // a text is not free, however short
 constexpr size_t NUMBERS = 14;
 
 std::string SetContentSql() {
@@ -40,31 +38,6 @@ int ContentsTable::PrepareTexts() {
     }
   }
   return SQLITE_OK;
-}
-
-int ContentsTable::PrepareWords() {
-  std::string values = "?1";
-  for (size_t i = 0; i <= TEXT_FIELD_COUNT + 1; ++i) {
-    values += ", ?" + std::to_string(i + 2);
-  }
-  const std::string columns = std::string("rowid, ") + WORD_COLUMNS + ") VALUES(";
-  const std::string insert_sql = "INSERT INTO words(" + columns + values + ")";
-  const std::string remove_sql =
-      "INSERT INTO words(words, " + columns + "'delete', " + values + ")";
-  const int code = insert_words.Prepare(handle, insert_sql.c_str());
-  return code == SQLITE_OK ? remove_words.Prepare(handle, remove_sql.c_str()) : code;
-}
-
-int ContentsTable::MakeWords(const std::string& language, const std::string& version) {
-  int code = Begin();
-  if (code == SQLITE_OK) {
-    code = sqlite3_exec(handle, WordsSchema(language).c_str(), nullptr, nullptr, nullptr);
-  }
-  meta.language = language;
-  meta.words_version = version;
-  meta.reword_end = meta.last_text;
-  meta.reworded = meta.last_text == 0 ? ALL_WORDS : 0;
-  return code;
 }
 
 int ContentsTable::SetContent(const ContentFile& before, const Content& content,
@@ -129,10 +102,10 @@ int ContentsTable::RunWords(Statement& statement, int64_t text, const ContentWor
       statement.BindText(column++, value);
     }
   };
+  bind(words.text);
   for (const std::string_view field : words.fields) {
     bind(field);
   }
-  bind(words.text);
   bind(words.numbers);
   return statement.Run();
 }
@@ -167,37 +140,6 @@ int ContentsTable::RemoveWordsOf(int64_t text) {
   }
   remove_text.BindInt(1, text);
   return code == SQLITE_OK ? remove_text.Run() : code;
-}
-
-int ContentsTable::Reword(bool& more) {
-  more = meta.reworded != ALL_WORDS;
-  int code = more ? Begin() : SQLITE_OK;
-  if (code != SQLITE_OK || !more) {
-    return code;
-  }
-
-  next_texts.BindInt(1, meta.reworded);
-  next_texts.BindInt(2, meta.reword_end);
-  code = next_texts.Step();
-  more = code == SQLITE_ROW;
-  for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {
-    Content content;
-    const int64_t text = next_texts.Int(0);
-    if (!UnpackTexts(next_texts.Bytes(1), content)) {
-      code = SQLITE_CORRUPT;
-      break;
-    }
-    bytes += content.text.size() + REWORD_ROW;
-    pending_bytes += content.text.size();
-    code = AddWords(text, WordsOf(content));
-    meta.reworded = text;
-    code = code == SQLITE_OK ? next_texts.Step() : code;
-  }
-  next_texts.Reset();
-  if (!more && code == SQLITE_DONE) {
-    meta.reworded = ALL_WORDS;
-  }
-  return code == SQLITE_DONE || code == SQLITE_ROW ? SQLITE_OK : code;
 }
 
 }  // namespace fileindexd

@@ -80,6 +80,10 @@ class ContentsWriter {
   // those that no entry referred to for a day. `now`: seconds since the epoch.
   bool Sweep(int64_t now, size_t limit, bool& more);
 
+  // Where much is new, one step of some hundredths of a second towards smaller words: for when
+  // there is nothing else to do. `more`: call again, after a commit.
+  bool Merge(bool& more);
+
   bool HasChanges() const;
   // Text since the last commit. What is removed counts twice: that is done by the commit, at once.
   size_t PendingBytes() const;

@@ -51,17 +51,21 @@ struct ContentsWriter::Impl {
   int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
   int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
   int IsKept(const ContentFile& file, Kind found, bool& is_kept);
-  int Remove(const ContentFile& file);
   int DropUnwanted(const ContentFile& file);
   int TakeInAfter(int64_t& done, int64_t& left, bool& more);
   bool Sweep(int64_t now, size_t limit, bool& more);
   int SweepFile(const ContentFile& file, int64_t now);
 
-  // contents_writer.cpp
+  // contents_jobs.cpp
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
+  int Remove(const ContentFile& file);
+  // The row of a file that was handed out. `current`: its bytes are still those that are wanted.
+  int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
+
+  // contents_writer.cpp
   bool Finish(int64_t file, const Content& content);
   int Keep(const ContentFile& file, const Content& content, ContentFile& now);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
@@ -75,9 +79,6 @@ struct ContentsWriter::Impl {
     bool suspect = false;
   };
   Company Begun() const;
-
-  // The row of a file that was handed out. `current`: its bytes are still those that are wanted.
-  int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
   // Runs one operation. Memory that runs out undoes what a failure undoes.
   bool Guarded(const std::function<bool()>& step);

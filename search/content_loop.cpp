@@ -75,6 +75,11 @@ void ContentLoop::AddPolled(std::vector<pollfd>& polled, Time now) const {
   if (pool != nullptr) {
     pool->AddPolled(polled);
   }
+  if (works) {  // else nobody would take it
+    for (const auto& [name, followed] : shares) {
+      followed.contents.AddPolled(polled);
+    }
+  }
 }
 
 Time ContentLoop::Due(Time now) const {

@@ -2,17 +2,21 @@
 // The content service: follows what the daemon commits, has what is wanted read by the pool of
 // helpers, and writes it down.
 //
-// DESIGN. One thread, which never waits but in poll:
+// DESIGN. One thread, which never waits but in poll, and for disks of our own:
 //
 //   watches      hints: a commit, other settings, the pause, the daemon's pid file
 //   permission   the daemon's end, the end of a pause
 //   pool         helpers' answers
+//   shares       answers of their file systems
 //   deadlines    of documents, commits, rests
 //
 // A step takes in what was told, ends what the helpers ended, gives each share one slice, and hands
-// files to the helpers, one share after the other. All work is child processes' and SQLite's; a
-// thread would have nothing to do but wait. Without permission nothing is read and nothing written:
-// what runs is killed and taken back, and it goes on where it was.
+// files to the helpers, one share after the other. Reading is child processes' work, and what a
+// share's file system is asked, which may never answer, is a thread's of that share (see opener.h).
+// The rest is SQLite's, which takes one writer at a time, and cutting words, which takes a quarter
+// of that: with as many helpers as processors, another thread had no processor of its own. Without
+// permission nothing is read and nothing written: what runs is killed and taken back, and it goes
+// on where it was.
 #pragma once
 
 #include <poll.h>

@@ -55,10 +55,10 @@ Opening OpeningOfError(int error, std::string& reason) {
     case EPERM:
     case EFBIG:
     case EOVERFLOW:
-      reason = std::string("cannot be opened: ") + strerror(error);  // NOLINT: one thread
+      reason = std::string("cannot be opened: ") + strerrordesc_np(error);
       return Opening::REFUSED;
     default:
-      reason = strerror(error);  // NOLINT(concurrency-mt-unsafe): one thread
+      reason = strerrordesc_np(error);
       return Opening::LATER;
   }
 }

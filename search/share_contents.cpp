@@ -28,14 +28,11 @@ constexpr milliseconds LONGEST_BETWEEN_LOOKS(100);
 // A slow disk may take its time.
 constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000),
                                         milliseconds(30000), milliseconds(120000)};
-constexpr std::chrono::hours BETWEEN_FULL_LOOKS(24);
 constexpr milliseconds COMMIT_AGE(400);
 // What is still being read after that time is slow, and what was read beside it does not wait.
 constexpr milliseconds LULL(20);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
-constexpr seconds SHORTEST_REST(1);
-constexpr seconds LONGEST_REST(60);
 
 }  // namespace
 
@@ -94,10 +91,13 @@ bool ShareContents::CanWork(Time now) const {
 
 bool ShareContents::IsIdle() const {
   return !has_news && !look_at_all && !Sweeps() && !may_have_jobs && ready.empty() &&
-         running.empty() && !retry_wanted && !writer.HasChanges();
+         running.empty() && !opener.IsWaiting() && !retry_wanted && !writer.HasChanges();
 }
 
 void ShareContents::Work(Time now, int64_t wall) {
+  if (CanWork(now)) {
+    TakeAnswers(now);
+  }
   if (!CanWork(now)) {
     return;
   }
@@ -118,36 +118,12 @@ void ShareContents::Work(Time now, int64_t wall) {
   }
 
   const bool good =
-      Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now);
+      Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now) && Merge();
   if (!good) {
     RestForError(now);
     return;
   }
   CloseIfIdle(now);
-}
-
-void ShareContents::Open(Time now) {
-  if (!IsFit(now)) {
-    return;
-  }
-  const IndexError opened = writer.Open(share, EXTRACTOR_VERSION);
-  if (opened == IndexError::PATH_NOT_FOUND) {
-    is_missing = true;  // until the daemon has made them
-    has_news = false;
-    look_at_all = true;
-    return;
-  }
-  if (opened != IndexError::NONE) {
-    Rest(now, IndexErrorText(opened));
-    return;
-  }
-
-  idle_since = now;
-  next_take_in = now;
-  has_news = true;
-  if (next_full_look == Time::max()) {
-    next_full_look = now + BETWEEN_FULL_LOOKS;
-  }
 }
 
 bool ShareContents::Retry() {
@@ -218,7 +194,7 @@ Time ShareContents::CommitDue() const {
     return Time();
   }
   const Time latest = *first_change + COMMIT_AGE;
-  if (has_news || Sweeps() || may_have_jobs || !ready.empty()) {
+  if (has_news || Sweeps() || may_have_jobs || is_opening || !ready.empty()) {
     return latest;
   }
   return running.empty() ? Time() : std::min(latest, last_end + LULL);
@@ -246,9 +222,17 @@ bool ShareContents::Commit() {
   return true;
 }
 
+// Only when there is nothing else to do.
+bool ShareContents::Merge() {
+  if (!may_merge || !IsIdle()) {
+    return true;
+  }
+  return writer.Merge(may_merge) && Commit();
+}
+
 void ShareContents::CloseIfIdle(Time now) {
   const bool is_short = later_look != Time::max() && later_look - now < CLOSE_AFTER;
-  if (!IsIdle() || !patient.empty() || is_short) {
+  if (!IsIdle() || may_merge || !patient.empty() || is_short) {
     idle_since = now;
   } else if (now - idle_since >= CLOSE_AFTER) {
     const Time look = later_look;
@@ -262,6 +246,7 @@ void ShareContents::CloseIfIdle(Time now) {
 
 void ShareContents::Halt() {
   if (!writer.IsOpen()) {
+    DropQuestions();
     return;
   }
 
@@ -286,7 +271,10 @@ Time ShareContents::Due() const {
     return Time::max();
   }
   Time due = next_full_look;
-  const bool has_work = Sweeps() || look_at_all || retry_wanted;
+  const bool has_work = Sweeps() || look_at_all || retry_wanted || (may_merge && IsIdle());
+  if (is_asking_root && !root.has_value()) {
+    return opener.Deadline();
+  }
   if (!writer.IsOpen()) {
     due = is_missing ? due : has_news || has_work ? Time() : std::min(due, later_look);
     return std::max(due, rest_until);
@@ -298,7 +286,7 @@ Time ShareContents::Due() const {
   if (has_news) {
     due = std::min(due, next_take_in);
   }
-  due = std::min(due, later_look);
+  due = std::min({due, later_look, opener.Deadline()});
   if (!patient.empty()) {
     due = std::min(due, patient.begin()->first);
   }
@@ -306,77 +294,6 @@ Time ShareContents::Due() const {
     due = std::min(due, CommitDue());
   }
   return std::min(due, IsIdle() ? idle_since + CLOSE_AFTER : Time::max());
-}
-
-bool ShareContents::IsFit(Time now) {
-  // The entries need what little there is left.
-  if (!HasSpace(StateRoot(), false)) {
-    Rest(now, "little space is left on the disk of the index");
-    return false;
-  }
-  switch (LookAtRoot(share)) {
-    case RootState::SOUND:
-      return true;
-    case RootState::MISSING:
-      Rest(now, "its root is missing");
-      return false;
-    case RootState::FOREIGN:
-      Rest(now, "its root lies on another file system");
-      return false;
-    case RootState::UNKNOWN:
-      Rest(now, "its root does not answer");
-      return false;
-  }
-  return false;
-}
-
-void ShareContents::RestForError(Time now) {
-  // A database was taken away while it was open: the next opening tells which.
-  if (writer.Error() == IndexError::PATH_NOT_FOUND) {
-    Forget();
-    look_at_all = true;
-    has_news = true;
-    rest_until = now + SHORTEST_REST;
-    return;
-  }
-  Rest(now, IndexErrorText(writer.Error()));
-}
-
-// One line at the beginning of the first rest; the others are the same one that goes on.
-void ShareContents::Rest(Time now, const std::string& reason) {
-  if (!rest_told) {
-    ServiceLog("Share[%s] contents rest, reason=%s", share.name.c_str(), reason.c_str());
-    rest_told = true;
-  }
-  if (writer.HasChanges()) {
-    (void)writer.Commit();  // good if it still can be done: it would be read once more
-  }
-  Forget();
-  has_news = true;
-  rest = std::clamp(rest * 2, SHORTEST_REST, LONGEST_REST);
-  rest_until = now + rest;
-}
-
-void ShareContents::GoneOn() {
-  rest = seconds(0);
-  if (rest_told) {
-    ServiceLog("Share[%s] contents go on", share.name.c_str());
-    rest_told = false;
-  }
-}
-
-// What was given out is not waited for any more.
-void ShareContents::Forget() {
-  writer.Close();
-  ready.clear();
-  running.clear();
-  patient.clear();
-  patience.clear();
-  first_change.reset();
-  may_have_jobs = false;
-  is_sweeping = false;
-  has_news = false;
-  later_look = Time::max();
 }
 
 }  // namespace fileindexd

@@ -4,10 +4,14 @@
 //
 // Everything is done in slices of some milliseconds, so that many shares can be worked on in turn.
 // A share whose databases or whose root fail rests, for longer each time, and nobody else is held
-// up by it. What is given out is opened, looked at and on record before.
+// up by it. What is given out is opened, looked at and on record before. The share's own file
+// system is asked by way of an Opener alone: while there is no answer, this share waits, and then
+// rests.
 //
-// One thread. Times are passed in.
+// One thread, but for the Opener's. Times are passed in.
 #pragma once
+
+#include <poll.h>
 
 #include <chrono>
 #include <cstdint>
@@ -22,6 +26,8 @@
 #include "base/scoped_fd.h"
 #include "extract/pool.h"
 #include "index/contents_writer.h"
+#include "search/opener.h"
+#include "state/belonging.h"
 #include "state/settings.h"
 #include "state/store.h"
 
@@ -57,6 +63,8 @@ class ShareContents {
   // Takes back what was given out, and closes. For pauses: it goes on as it was.
   void Halt();
 
+  // What tells that an answer of the file system is there: Work wants to be called.
+  void AddPolled(std::vector<pollfd>& polled) const { opener.AddPolled(polled); }
   // When Work wants to be called; max() if nothing is to be done.
   Time Due() const;
   // True once after all that failed was made to wait again, and that is on disk.
@@ -69,6 +77,8 @@ class ShareContents {
 
   static constexpr size_t SMALLEST_BATCH = 4;
   static constexpr size_t LARGEST_BATCH = 64;
+  // What they were found to hold is kept meanwhile.
+  static constexpr size_t MOST_LOOKING = 4;
 
  private:
   struct Ready {
@@ -80,7 +90,11 @@ class ShareContents {
     int64_t file = 0;
     FileIdentity identity;
     ScopedFd open;  // the same open file, to be looked at afterwards
+    // It has ended so, and its file is being looked at.
+    std::optional<ExtractOutcome> outcome;
   };
+  // Files that are being opened.
+  struct Batch;
   // Of a file that was not what the index knows: it is looked at again later.
   struct Patience {
     std::chrono::seconds rest{0};
@@ -97,24 +111,37 @@ class ShareContents {
   void LookLater(Time now);
   bool Sweep(int64_t wall);
   bool Retry();
+  bool Merge();
   bool ReleasePatient(Time now);
   bool CommitIfDue(Time now);
   bool Commit();
   void CloseIfIdle(Time now);
 
   bool Refill(Time now);
-  void OpenJob(ContentJob&& job, Time now);
+  void TakeBatch(Batch& opened);
+  void TakeLook(uint64_t id, bool is_still);
   bool BeginTries();
   void BePatient(int64_t file, Time now);
   void AdaptBatch(Time now);
 
-  bool IsFit(Time now);  // rests if not
+  bool HasRoom(Time now);  // rests if not
+  bool IsSound(RootState root, Time now);
+  void Ask(Opener::Question question, Time now);
+  void TakeAnswers(Time now);
+  void DropQuestions();
   void Rest(Time now, const std::string& reason);
   void RestForError(Time now);
   void GoneOn();
   void Forget();
 
   ContentsWriter writer;
+  Opener opener;
+  bool is_asking_root = false;
+  std::optional<RootState> root;  // the answer, until it is used
+  bool is_opening = false;        // a batch
+  size_t looking = 0;             // at files that were read
+  Time answered;                  // the time, for answers
+  static constexpr std::chrono::hours BETWEEN_FULL_LOOKS{24};
   bool has_news = true;
   bool look_at_all = true;
   bool is_missing = false;  // there were no entries at the last opening
@@ -124,6 +151,7 @@ class ShareContents {
   bool retry_wanted = false;
   bool retried = false;
   bool may_have_jobs = false;
+  bool may_merge = true;  // words that are new since they were merged
   Time next_take_in;
   Time taken_in;                               // the last time
   std::chrono::milliseconds between_looks{0};  // that find nothing
@@ -137,7 +165,6 @@ class ShareContents {
   Time rest_until;
   std::chrono::seconds rest{0};  // the last one; 0: all was well since
   bool rest_told = false;
-  bool root_suspect = false;
 
   size_t batch = 0;
   Time refilled;

@@ -3,6 +3,7 @@
 #include <fcntl.h>
 
 #include <algorithm>
+#include <memory>
 #include <utility>
 
 #include "search/log.h"
@@ -29,9 +30,47 @@ constexpr size_t MOST_PATIENT = 4096;
 
 }  // namespace
 
+// By the first of its names under which it is there. Belongs to the opener's thread until it is
+// answered.
+struct ShareContents::Batch {
+  struct File {
+    ContentJob job;
+    ScopedFd file;
+    std::string path;
+    Opening opening = Opening::CHANGED;
+    std::string reason;
+  };
+
+  void Open() {
+    bool is_suspect = false;
+    for (File& one : files) {
+      Open(one);
+      is_suspect = is_suspect || one.opening == Opening::CHANGED || one.opening == Opening::LATER;
+    }
+    // Files that are not what the index knows: is it the share at all?
+    root = is_suspect ? LookAtRoot(share) : RootState::SOUND;
+  }
+  void Open(File& one) const {
+    for (const std::string& path : one.job.paths) {
+      const Opening opened = OpenFile(share, path, one.job.identity, one.file, one.reason);
+      if (opened == Opening::DONE) {
+        one.opening = opened;
+        one.path = path;
+        return;
+      }
+      // Of all its names, the one that promises most.
+      one.opening = std::max(one.opening, opened);
+    }
+  }
+
+  Share share;
+  std::deque<File> files;
+  RootState root = RootState::SOUND;
+};
+
 bool ShareContents::MayHaveJobs(Time now) const {
-  return writer.IsOpen() && CanWork(now) &&
-         (!ready.empty() || (may_have_jobs && patient.size() < MOST_PATIENT));
+  const bool may_open = may_have_jobs && !is_opening && patient.size() < MOST_PATIENT;
+  return writer.IsOpen() && CanWork(now) && looking < MOST_LOOKING && (!ready.empty() || may_open);
 }
 
 bool ShareContents::Next(Time now, uint64_t id, ExtractJob& job) {
@@ -53,9 +92,9 @@ bool ShareContents::Next(Time now, uint64_t id, ExtractJob& job) {
   return true;
 }
 
+// What comes of it is ready now, or later.
 bool ShareContents::Refill(Time now) {
-  if (!HasSpace(StateRoot(), false)) {
-    (void)IsFit(now);
+  if (!HasRoom(now)) {
     return false;
   }
   AdaptBatch(now);
@@ -65,22 +104,55 @@ bool ShareContents::Refill(Time now) {
     return false;
   }
 
-  root_suspect = false;
+  const auto asked = std::make_shared<Batch>();
+  asked->share = share;
   for (ContentJob& job : jobs) {
-    OpenJob(std::move(job), now);
-    if (!writer.IsOpen()) {
-      return false;
+    const auto known = patience.find(job.file);
+    if (known != patience.end() && now < known->second.until) {
+      patient.emplace(known->second.until, job.file);
+    } else {
+      asked->files.emplace_back().job = std::move(job);
     }
   }
-  // Files that are not what the index knows: is it the share at all?
-  if (root_suspect && !IsFit(now)) {
-    return false;
+  if (!asked->files.empty()) {
+    is_opening = true;
+    const auto open = [this, asked]() -> Opener::Answer {
+      asked->Open();
+      return [this, asked] { TakeBatch(*asked); };
+    };
+    Ask(open, now);
+  }
+  return !ready.empty();
+}
+
+void ShareContents::TakeBatch(Batch& opened) {
+  const Time now = answered;
+  is_opening = false;
+  if (!IsSound(opened.root, now)) {
+    return;
+  }
+  for (Batch::File& one : opened.files) {
+    if (one.opening == Opening::DONE) {
+      Ready& next = ready.emplace_back();
+      next.file.Swap(one.file);
+      next.name = one.path.substr(one.path.rfind('/') + 1);
+      next.job = std::move(one.job);
+    } else if (one.opening == Opening::REFUSED) {
+      if (!writer.Fail(one.job.file, one.reason, {}, false)) {
+        RestForError(now);
+        return;
+      }
+    } else {
+      if (one.opening == Opening::LATER) {
+        ServiceDebug("Share[%s] a file waits, reason=%s", share.name.c_str(), one.reason.c_str());
+      }
+      BePatient(one.job.file, now);
+      patient.emplace(patience[one.job.file].until, one.job.file);
+    }
   }
   if (!ready.empty() && !BeginTries()) {
     RestForError(now);
-    return false;
   }
-  return !ready.empty();
 }
 
 void ShareContents::AdaptBatch(Time now) {
@@ -92,43 +164,6 @@ void ShareContents::AdaptBatch(Time now) {
   }
   batch = std::clamp(batch, SMALLEST_BATCH, std::max(largest_batch, SMALLEST_BATCH));
   refilled = now;
-}
-
-// By the first of its names under which it is there.
-void ShareContents::OpenJob(ContentJob&& job, Time now) {
-  const auto known = patience.find(job.file);
-  if (known != patience.end() && now < known->second.until) {
-    patient.emplace(known->second.until, job.file);
-    return;
-  }
-
-  Opening outcome = Opening::CHANGED;
-  std::string reason;
-  for (const std::string& path : job.paths) {
-    ScopedFd file;
-    const Opening opened = OpenFile(share, path, job.identity, file, reason);
-    if (opened == Opening::DONE) {
-      Ready& next = ready.emplace_back();
-      next.file.Swap(file);
-      next.name = path.substr(path.rfind('/') + 1);
-      next.job = std::move(job);  // `path` with it
-      return;
-    }
-    outcome = std::max(outcome, opened);  // of all its names, the one that promises most
-  }
-
-  if (outcome == Opening::REFUSED) {
-    if (!writer.Fail(job.file, reason, {}, false)) {
-      RestForError(now);
-    }
-    return;
-  }
-  if (outcome == Opening::LATER) {
-    ServiceDebug("Share[%s] a file waits, reason=%s", share.name.c_str(), reason.c_str());
-  }
-  root_suspect = true;
-  BePatient(job.file, now);
-  patient.emplace(patience[job.file].until, job.file);
 }
 
 bool ShareContents::BeginTries() {
@@ -153,15 +188,38 @@ void ShareContents::BePatient(int64_t file, Time now) {
   patient_with.until = now + patient_with.rest;
 }
 
+// Another look at the file tells whether it is still what was to be read.
 void ShareContents::End(ExtractOutcome&& outcome, Time now) {
   const auto found = running.find(outcome.id);
   if (found == running.end()) {
     return;
   }
-  const int64_t file = found->second.file;
-  const bool is_still = IsStill(found->second.open.fd, found->second.identity);
-  running.erase(found);
   last_end = now;
+  const uint64_t id = outcome.id;
+  Running& ended = found->second;
+  ended.outcome = std::move(outcome);
+
+  const auto file = std::make_shared<ScopedFd>();
+  file->Swap(ended.open);
+  ++looking;
+  const auto look = [this, id, file, identity = ended.identity]() -> Opener::Answer {
+    const bool is_still = IsStill(file->fd, identity);
+    file->Close();
+    return [this, id, is_still] { TakeLook(id, is_still); };
+  };
+  Ask(look, now);
+}
+
+void ShareContents::TakeLook(uint64_t id, bool is_still) {
+  const auto found = running.find(id);
+  if (found == running.end()) {
+    return;  // what it belonged to was taken back
+  }
+  const Time now = answered;
+  --looking;
+  const int64_t file = found->second.file;
+  const ExtractOutcome outcome = std::move(*found->second.outcome);
+  running.erase(found);
 
   bool good = false;
   if (outcome.result == ExtractOutcome::Result::LOST || !is_still) {
@@ -186,6 +244,7 @@ void ShareContents::End(ExtractOutcome&& outcome, Time now) {
     return;
   }
   may_have_jobs = true;  // it may wait again, or another have waited for its end
+  may_merge = true;
 }
 
 }  // namespace fileindexd

@@ -38,6 +38,8 @@ class RandomKillsTest(ScriptedTest):
             self.added += 1
             self.write(f"{self.root}/f{self.added}.txt", f"lighthouse{self.added} everywhere")
         self.ctl("reindex", self.root)
+        # A line that comes between a Worker's last look and its end waits until somebody touches it.
+        self.await_taken("alpha")
 
     def test_kills(self):
         self.root = self.make_share(folders=())

@@ -5,6 +5,8 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <set>
+#include <string>
 
 #include "index/contents_writer.h"
 #include "state/layout.h"
@@ -359,6 +361,34 @@ TEST_F(ContentsIntakeTest, WhatComesBackWithinADayIsKept) {
 
   EXPECT_EQ(Jobs(), Names());
   EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
+}
+
+TEST_F(ContentsIntakeTest, ABacklogOfMoreThanOneSliceIsTakenInAndHandedOutOnce) {
+  constexpr size_t FILES = 1500;
+  constexpr size_t SLICE = 1000;
+  for (size_t file = 0; file < FILES; ++file) {
+    const std::string name = "f" + std::to_string(file) + ".txt";
+    WriteFile(At(name), "bytes");
+    Add(name);
+  }
+  Commit();
+  contents->LookAtAll();
+
+  int taken = 0;
+  for (bool more = true; more; ++taken) {
+    ASSERT_TRUE(contents->TakeIn(SLICE, more)) << IndexErrorText(contents->Error());
+  }
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_GE(taken, 2);
+  EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), static_cast<int64_t>(FILES));
+
+  std::set<std::string> seen;
+  for (more_jobs = true; more_jobs;) {
+    for (const std::string& name : Jobs(64)) {
+      EXPECT_TRUE(seen.insert(name).second) << name;
+    }
+  }
+  EXPECT_EQ(seen.size(), FILES);
 }
 
 TEST_F(ContentsIntakeTest, PassesThatWereUndoneBeginAnew) {

@@ -2,6 +2,7 @@
 // Words of contents: made anew from what is stored, and counted.
 #include <unistd.h>
 
+#include <algorithm>
 #include <ctime>
 
 #include "index/contents_reader.h"
@@ -101,6 +102,100 @@ TEST_F(ContentsWordsTest, ContentsWithoutWordsAreDamaged) {
 
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
   EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+}
+
+TEST_F(ContentsWordsTest, PlacesInATextTakeLessRoomThanThoseInAField) {
+  constexpr int WORDS = 2000;
+  std::string text;
+  for (int word = 0; word < WORDS; ++word) {
+    text += "w" + std::to_string(word) + " ";
+  }
+  File("field.pdf");
+  File("text.pdf");
+  Jobs();
+  Content titled;
+  titled.texts = {{ContentField::TITLE, text}};
+  const auto size = [this] { return Number("SELECT sum(length(block)) FROM words_data"); };
+  const int64_t none = size();
+  ASSERT_TRUE(contents->Finish(JobOf("field.pdf").file, titled));
+  ASSERT_TRUE(contents->Commit());
+  const int64_t field = size() - none;
+
+  Finish("text.pdf", text);
+
+  EXPECT_LE(size() - none - field, field - 2 * WORDS);
+}
+
+TEST_F(ContentsWordsTest, OldWordsAreTakenAwaySliceBySlice) {
+  std::string text;
+  for (int word = 0; text.size() < 900000; ++word) {
+    text += "w" + std::to_string(word * 7919) + " ";
+  }
+  for (const char* name : {"a.txt", "b.txt", "c.txt"}) {
+    File(name);
+    Jobs();
+    Finish(name, text + name);
+  }
+  ASSERT_TRUE(store->SetShareLanguage("s", "german")) << store->Error();
+
+  OpenContents();
+  int64_t left = Number("SELECT count(*) FROM old_words_data");
+  EXPECT_GT(left, 600);
+  bool more = true;
+  while (more) {
+    ASSERT_TRUE(contents->TakeIn(100, more)) << IndexErrorText(contents->Error());
+    ASSERT_TRUE(contents->Commit());
+    const int64_t now = Number("SELECT count(*) FROM sqlite_master WHERE name = 'old_words'") == 0
+                            ? 0
+                            : Number("SELECT count(*) FROM old_words_data");
+    EXPECT_GE(now, left - 512);
+    left = std::max<int64_t>(now, 10);
+  }
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name LIKE 'old_words%'"), 0);
+  EXPECT_EQ(Holding("txt"), 3);
+}
+
+TEST_F(ContentsWordsTest, ManyNewWordsAreMergedStepByStepIntoLessRoom) {
+  std::string text;
+  for (int word = 0; word < 600; ++word) {
+    text += "w" + std::to_string(word * 7919) + " ";
+  }
+  const auto pieces = [this] {
+    return Number("SELECT count(DISTINCT id >> 37) FROM words_data WHERE id > 10");
+  };
+  const auto used = [this] { return Number("SELECT sum(length(block)) FROM words_data"); };
+  bool more = true;
+  for (int file = 0; file < 300; ++file) {
+    const std::string name = "f" + std::to_string(file) + ".txt";
+    WriteFile(At(name), "bytes");
+    Add(name);
+    if (file == 250) {
+      ASSERT_TRUE(contents->Merge(more));
+      EXPECT_FALSE(more) << "too little is new";
+    }
+    if (file % 30 == 29) {
+      Commit();
+      TakeIn();
+      for (const std::string& one : Jobs()) {
+        ASSERT_TRUE(contents->Finish(JobOf(one).file, TextContent(text + one)));
+      }
+      ASSERT_TRUE(contents->Commit());
+    }
+  }
+  EXPECT_GT(pieces(), 5);
+  const int64_t before = used();
+
+  int steps = 0;
+  for (more = true; more; ++steps) {
+    ASSERT_TRUE(contents->Merge(more)) << IndexErrorText(contents->Error());
+    ASSERT_TRUE(contents->Commit());
+  }
+  EXPECT_GT(steps, 2);
+  EXPECT_EQ(pieces(), 1);
+  EXPECT_LT(used(), before);
+  EXPECT_LE(Number("SELECT freelist_count FROM pragma_freelist_count"), 256);
+  EXPECT_EQ(Holding("txt"), 300);
+  EXPECT_EQ(Number("SELECT merged = last_text FROM meta"), 1);
 }
 
 TEST_F(ContentsWordsTest, YearAndTrackAreWords) {

@@ -2,7 +2,8 @@
 // A contents database that a test fills and looks at, in the place of the real writer.
 //
 // What is written stands in `now` until a commit makes it `kept`; an opening begins with what was
-// kept. And a pool whose helpers do what the test says. One thread.
+// kept. And a pool whose helpers do what the test says, and openers that have no thread. One
+// thread.
 #pragma once
 
 #include <cstdint>
@@ -31,6 +32,7 @@ struct ScriptedContents {
   std::vector<std::string> calls;
   std::map<std::string, IndexError> failing;  // by the call's name: it fails so, until removed
   size_t pending_bytes = 0;
+  int unmerged = 0;     // so many times Merge says that there is more
   bool unseen = false;  // the next NextJobs gives nothing, and says that there may be more
 };
 
@@ -49,6 +51,9 @@ struct ScriptedPool {
   // The first job ends so.
   void End(ExtractOutcome::Result result, const std::string& text);
 };
+
+// Of all shares: what is asked is not answered. False in the beginning.
+bool& FilesystemHangs();
 
 // As the entries would have it.
 FileIdentity IdentityOf(const std::string& path);

@@ -170,6 +170,12 @@ bool ContentsWriter::Sweep(int64_t /*now*/, size_t /*limit*/, bool& more) {
   return impl->Call("Sweep");
 }
 
+bool ContentsWriter::Merge(bool& more) {
+  more = impl->contents->unmerged > 0;
+  impl->contents->unmerged -= more ? 1 : 0;
+  return impl->Call("Merge");
+}
+
 bool ContentsWriter::HasChanges() const {
   return impl->changed;
 }

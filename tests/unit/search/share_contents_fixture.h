@@ -27,6 +27,7 @@ class ShareContentsTest : public StateTest {
     std::filesystem::create_directory(root);
     std::filesystem::create_directory(state_root);
   }
+  ~ShareContentsTest() override { FilesystemHangs() = false; }
 
   // A file of the share that the entries know.
   std::string AddFile(int64_t row) {

@@ -231,6 +231,80 @@ TEST_F(ShareContentsTest, NothingIsSweptWhileTheEntriesAreMadeAnew) {
   EXPECT_GT(Count("Sweep"), 0U);
 }
 
+TEST_F(ShareContentsTest, WordsAreMergedWhenNothingElseIsToBeDone) {
+  Scripted().unmerged = 3;
+  AddFile(1);
+  Settle();
+  const std::vector<uint64_t> ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  Settle();
+  EXPECT_EQ(Count("Merge"), 0U);
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+  (void)GiveOut();  // there is nothing more
+  Settle();
+  EXPECT_EQ(Count("Merge"), 4U);
+  Wait(20);
+  EXPECT_EQ(Count("Merge"), 4U);
+}
+
+TEST_F(ShareContentsTest, WhatComesMeanwhileIsReadBeforeTheMergingGoesOn) {
+  Scripted().unmerged = 1000;
+  Settle();
+  (void)GiveOut();
+  contents.Work(now, WALL);
+  EXPECT_EQ(Count("Merge"), 1U);
+
+  AddFile(1);
+  contents.EntriesChanged();
+  Pass(milliseconds(2));
+  EXPECT_EQ(GiveOut().size(), 1U);
+  const size_t merged = Count("Merge");
+  Settle();
+  EXPECT_EQ(Count("Merge"), merged);
+}
+
+TEST_F(ShareContentsTest, AFileSystemThatDoesNotAnswerLetsItsShareRest) {
+  AddFile(1);
+  Settle();
+  FilesystemHangs() = true;
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_FALSE(contents.MayHaveJobs(now));
+
+  Pass(seconds(9));
+  EXPECT_EQ(Count("Close"), 0U);
+  Pass(seconds(1));
+  EXPECT_EQ(Count("Close"), 1U);
+  EXPECT_EQ(contents.Due(), now + seconds(1));
+  Pass(seconds(1));
+  EXPECT_EQ(Count("Open"), 1U) << "its root does not answer either";
+  FilesystemHangs() = false;
+  contents.Work(now, WALL);
+  Settle();
+  EXPECT_THAT(GiveOut(), Not(IsEmpty()));
+}
+
+TEST_F(ShareContentsTest, WhatWasReadWhenTheFileSystemHungIsReadAgain) {
+  AddFile(1);
+  Settle();
+  const std::vector<uint64_t> ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  FilesystemHangs() = true;
+  End(ids[0], ExtractOutcome::Result::DONE);
+  Settle();
+  EXPECT_EQ(Count("Finish"), 0U);
+
+  contents.Halt();
+  FilesystemHangs() = false;
+  Settle();
+  EXPECT_EQ(Kept(1).tries, 0);
+  const std::vector<uint64_t> again = GiveOut();
+  ASSERT_EQ(again.size(), 1U);
+  End(again[0], ExtractOutcome::Result::DONE);
+  Settle();
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+}
+
 TEST_F(ShareContentsTest, QuickFilesAreGivenOutInLargerBatches) {
   for (int64_t row = 1; row <= 300; ++row) {
     AddFile(row);

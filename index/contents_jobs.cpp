@@ -1,0 +1,146 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What waits is handed out, and taken back when it ended.
+#include <algorithm>
+
+#include "index/contents_writer_impl.h"
+
+namespace fileindexd {
+
+namespace {
+
+// What was in flight at so many deaths of the service is read alone: only so does another one tell
+// who it was.
+constexpr int64_t SUSPECT_DEATHS = 2;
+constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file any more
+constexpr int ROUNDS = 8;
+
+}  // namespace
+
+bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more) {
+  jobs.clear();
+  more = false;
+  if (!Ready() || !ReadyToFollow()) {
+    return false;
+  }
+
+  Company company = Begun();
+  bool dropped = true;
+  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit && !IsFull(); ++round) {
+    dropped = false;
+    std::vector<ContentFile> rows;
+    int code =
+        table->Waiting(static_cast<int64_t>(limit + out.size() + released.size()) + SLACK, rows);
+    // What was given back goes last: it may be given back again at once.
+    std::stable_partition(rows.begin(), rows.end(),
+                          [this](const ContentFile& file) { return !released.contains(file.id); });
+    for (size_t i = 0; i < rows.size() && code == SQLITE_OK && jobs.size() < limit; ++i) {
+      const bool is_suspect = rows[i].unended >= SUSPECT_DEATHS;
+      if (out.contains(rows[i].id) || company.suspect || (is_suspect && company.any)) {
+        continue;
+      }
+      code = Offer(rows[i], jobs, dropped);
+      company.any = company.any || !jobs.empty();
+      company.suspect = is_suspect && !jobs.empty();
+    }
+    if (code != SQLITE_OK) {
+      return Done(code);
+    }
+  }
+  more = dropped || jobs.size() >= limit;
+  return true;
+}
+
+ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
+  Company company;
+  for (const auto& [id, handed] : out) {
+    company.any = company.any || handed.is_begun;
+    company.suspect = company.suspect || (handed.is_begun && handed.is_suspect);
+  }
+  return company;
+}
+
+int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>& jobs,
+                                bool& dropped) {
+  ContentJob job;
+  int code = entries.Paths(file.identity, job.paths);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  if (!job.paths.empty()) {
+    job.file = file.id;
+    job.identity = file.identity;
+    job.kind = file.kind;
+    job.tries = file.tries + file.unended;
+    out[file.id] = {.identity = file.identity, .is_suspect = file.unended >= SUSPECT_DEATHS};
+    released.erase(file.id);
+    jobs.push_back(std::move(job));
+    return SQLITE_OK;
+  }
+
+  // No entry waits for it. Whatever stands for that file now is taken in anew.
+  dropped = true;
+  FollowedEntry latest;
+  bool found = false;
+  code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);
+  code = code == SQLITE_OK ? Remove(file) : code;
+  return code == SQLITE_OK && found ? TakeInEntry(latest) : code;
+}
+
+int ContentsWriter::Impl::Remove(const ContentFile& file) {
+  released.erase(file.id);
+  return table->Remove(file);
+}
+
+bool ContentsWriter::Impl::BeginTries(const std::vector<int64_t>& files) {
+  if (!Ready()) {
+    return false;
+  }
+  size_t in_flight = files.size();
+  for (const auto& [id, handed] : out) {
+    in_flight += handed.is_begun ? 1 : 0;
+  }
+  const int64_t begun = in_flight == 1 ? 1 : 2;
+
+  int code = SQLITE_OK;
+  if (begun == 2 && alone != 0) {
+    code = MarkBegun(alone, begun);
+  }
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK; ++i) {
+    code = MarkBegun(files[i], begun);
+    const auto handed = out.find(files[i]);
+    if (handed != out.end()) {
+      handed->second.is_begun = true;
+    }
+  }
+  alone = begun == 1 ? files.front() : 0;
+  return Done(code) && Commit();
+}
+
+int ContentsWriter::Impl::MarkBegun(int64_t id, int64_t begun) {
+  ContentFile file;
+  bool found = false;
+  const int code = table->FindById(id, file, found);
+  if (code != SQLITE_OK || !found) {
+    return code;
+  }
+  ContentFile marked = file;
+  marked.begun = begun;
+  return table->Update(file, marked);
+}
+
+int ContentsWriter::Impl::TakeBack(int64_t id, ContentFile& file, bool& found, bool& current) {
+  const auto handed = out.find(id);
+  found = false;
+  current = false;
+  if (handed == out.end()) {
+    return SQLITE_OK;
+  }
+  const HandedOut was = handed->second;
+  out.erase(handed);
+  alone = alone == id ? 0 : alone;
+  const int code = table->FindById(id, file, found);
+  current = found && was.identity == file.identity && !was.is_stale;
+  return code;
+}
+
+}  // namespace fileindexd
