@@ -264,29 +264,42 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
 
 // On a host that is busy with other things a document may not have had the time that has passed.
 bool Slot::IsStarved() const {
-  return stage == Stage::READING && has_begun && helper.IsThere() &&
-         ProcessorTime(helper) - used_before < options.deadline / USED_PART;
+  const auto little = options.deadline / USED_PART;
+  if (stage == Stage::CONVERTING) {
+    return converter.IsThere() && ProcessorTime(converter) < little;
+  }
+  return has_begun && helper.IsThere() && ProcessorTime(helper) - used_before < little;
+}
+
+std::optional<ExtractOutcome> Slot::BeginAgain(Clock::time_point now) {
+  if (stage == Stage::CONVERTING) {
+    DropConverter();
+    deadline = now + options.deadline;
+    return StartConverter(converter_name);
+  }
+  DropHelper();
+  AllowTime(now);
+  return stage == Stage::READING ? Begin() : BeginResult();
 }
 
 std::optional<ExtractOutcome> Slot::Overdue(Clock::time_point now) {
   if (IsStarved() && ++lost_helpers <= STARVED_TIMES) {
-    DropHelper();
-    AllowTime(now);
-    return Begin();
+    return BeginAgain(now);
   }
 
   const long long limit = options.deadline.count();
   const std::string took = limit % 1000 == 0
                                ? "took longer than " + std::to_string(limit / 1000) + " s"
                                : "took longer than " + std::to_string(limit) + " ms";
-  if (stage != Stage::CONVERTING) {
-    DropHelper();
-  }
-  if (stage != Stage::READING) {
+  if (stage == Stage::CONVERTING) {
     return End(Result::FAILED, converter_name + ": " + took);
   }
-  return has_begun ? End(Result::KILLED, took)
-                   : End(Result::LOST, options.program + ": does not start in time");
+  DropHelper();
+  if (!has_begun) {
+    return End(Result::LOST, options.program + ": does not start in time");
+  }
+  return stage == Stage::READING ? End(Result::KILLED, took)
+                                 : End(Result::FAILED, converter_name + ": " + took);
 }
 
 std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
@@ -295,6 +308,13 @@ std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
     return std::nullopt;
   }
   return End(has_begun ? Result::KILLED : Result::LOST, "the helper talked nonsense: " + what);
+}
+
+void Slot::DropConverter() {
+  Kill(converter);
+  if (converter.IsThere()) {
+    dying.emplace_back().Swap(converter);
+  }
 }
 
 ExtractOutcome Slot::End(Result how, const std::string& reason) {
@@ -306,10 +326,7 @@ ExtractOutcome Slot::End(Result how, const std::string& reason) {
     outcome.content = std::move(found);
   }
 
-  Kill(converter);
-  if (converter.IsThere()) {
-    dying.emplace_back().Swap(converter);
-  }
+  DropConverter();
   found = Content();
   result.Close();
   current.file.Close();

@@ -63,10 +63,13 @@ class Slot {
   std::optional<ExtractOutcome> AwaitConverter();
   std::optional<ExtractOutcome> BeginResult();
   bool IsStarved() const;
+  // The step at which its time was up.
+  std::optional<ExtractOutcome> BeginAgain(Clock::time_point now);
   std::optional<ExtractOutcome> Overdue(Clock::time_point now);
   std::optional<ExtractOutcome> Nonsense(const std::string& what);
   ExtractOutcome End(ExtractOutcome::Result result, const std::string& reason);
   void DropHelper();
+  void DropConverter();
 
   const PoolOptions& options;
   std::string& left_out;
