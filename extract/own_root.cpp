@@ -122,7 +122,7 @@ bool Enter() {
 bool EnterOwnRoot(const RunTimeFiles& files, std::string& error) {
   (void)umask(S_IWGRP | S_IWOTH);  // whoever the process becomes goes through its folders
   if (!EnterNamespace(error)) {
-    return Failed("mount namespace", error);
+    return error.empty() ? Failed("mount namespace", error) : false;
   }
   if (mount("none", SITE, "tmpfs", FIXED, "mode=755,size=1m") != 0) {
     return Failed(SITE, error);

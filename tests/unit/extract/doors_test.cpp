@@ -6,6 +6,7 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <linux/bpf.h>
+#include <seccomp.h>
 #include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
@@ -26,6 +27,7 @@
 #include "base/landlock.h"
 #include "base/scoped_fd.h"
 #include "extract/converters.h"
+#include "extract/own_root.h"
 #include "extract/sanitized.h"
 
 namespace fileindexd {
@@ -35,18 +37,15 @@ namespace {
 // Said after everything else: who has become another program, or has died, does not say it.
 constexpr char END_MARK = '.';
 
-// Everything here is tried by a process of its own, behind its doors, and told through a pipe.
-std::string Behind(Doors doors, const std::function<std::string()>& attempt) {
+// Everything here is tried by a process of its own, and told through a pipe.
+std::string InChild(const std::function<std::string()>& attempt) {
   int ends[2] = {-1, -1};
   EXPECT_EQ(pipe2(ends, O_CLOEXEC), 0);
   ScopedFd reading(ends[0]);
   ScopedFd writing(ends[1]);
-  doors.parent = getpid();
   const pid_t child = fork();
   if (child == 0) {
-    std::string error;
-    std::string told = CloseDoors(doors, error) ? attempt() : "not closed: " + error;
-    told += END_MARK;
+    const std::string told = attempt() + END_MARK;
     (void)!write(writing.fd, told.data(), told.size());
     _exit(0);
   }
@@ -64,6 +63,14 @@ std::string Behind(Doors doors, const std::function<std::string()>& attempt) {
   }
   told.pop_back();
   return status == 0 ? told : told + " ended with " + std::to_string(status);
+}
+
+std::string Behind(Doors doors, const std::function<std::string()>& attempt) {
+  doors.parent = getpid();
+  return InChild([&] {
+    std::string error;
+    return CloseDoors(doors, error) ? attempt() : "not closed: " + error;
+  });
 }
 
 // "" when it was refused.
@@ -357,6 +364,32 @@ TEST(ConverterDoorsTest, WithoutWallsThereIsNone) {
   doors.has_namespaces = false;
   EXPECT_TRUE(
       Behind(doors, [] { return std::string("closed"); }).starts_with("not closed: neither"));
+}
+
+bool Fail(const char* call, int number) {
+  const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_ALLOW);
+  const bool is_set = seccomp_rule_add(filter, SCMP_ACT_ERRNO(static_cast<uint32_t>(number)),
+                                       seccomp_syscall_resolve_name(call), 0) == 0 &&
+                      seccomp_load(filter) == 0;
+  seccomp_release(filter);
+  return is_set;
+}
+
+TEST(OwnRootTest, TheFirstThingInItsWayIsTold) {
+  if (geteuid() != 0) {
+    GTEST_SKIP() << "only the superuser becomes another user";
+  }
+  const auto enter = [](const char* also, int number) {
+    return InChild([&] {
+      if (!Fail("unshare", EPERM) || (also != nullptr && !Fail(also, number))) {
+        return std::string("no filter");
+      }
+      std::string error;
+      return EnterOwnRoot({}, error) ? "entered" : error;
+    });
+  };
+  EXPECT_EQ(enter(nullptr, 0), "mount namespace: Operation not permitted");
+  EXPECT_EQ(enter("setresuid", EAGAIN), "user: Resource temporarily unavailable");
 }
 
 }  // namespace
