@@ -291,6 +291,25 @@ TEST_P(DoorsTest, WhatWasOpenBeforeIsRead) {
             "words");
 }
 
+// By each of the ways that one C library or another has for it.
+TEST_P(DoorsTest, WhatWasOpenBeforeIsLookedAt) {
+  const ScopedFd file(open((folder + "/file").c_str(), O_RDONLY | O_CLOEXEC));
+  EXPECT_EQ(Behind(Kind(),
+                   [&] {
+                     struct stat info = {};
+                     struct statx more = {};
+                     std::string refused;
+                     refused += fstat(file.fd, &info) == 0 ? "" : "fstat ";
+                     refused += fstatat(file.fd, "", &info, AT_EMPTY_PATH) == 0 ? "" : "fstatat ";
+                     refused += statx(file.fd, "", AT_EMPTY_PATH, STATX_SIZE, &more) == 0 &&
+                                        more.stx_size == 5
+                                    ? ""
+                                    : "statx ";
+                     return refused;
+                   }),
+            "");
+}
+
 TEST_P(DoorsTest, TheRunTimeFilesOfLibrariesAreReadWhereWallsAreLeft) {
   const std::string told = Behind(Kind(), [] {
     DIR* maps = opendir("/usr/share/poppler");
