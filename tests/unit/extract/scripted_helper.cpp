@@ -158,7 +158,7 @@ void Misbehave(const std::string& verb, int file) {
     }
   } else if (verb == "killed") {
     struct stat info = {};
-    // The file's own descriptor is shared: how far it stands tells how often this was tried.
+    // Every helper is given the same file: what is in it tells that this was tried before.
     if (fstat(file, &info) == 0 && info.st_size == 0) {
       (void)!write(file, "x", 1);
       raise(SIGKILL);
