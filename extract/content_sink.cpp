@@ -48,7 +48,7 @@ std::string Cleaned(std::string_view bytes, size_t limit) {
   std::string clean;
   bool is_apart = false;
   while (!bytes.empty() && clean.size() < limit) {
-    const Character character = FirstCharacter(bytes);
+    const Utf8Character character = FirstCharacter(bytes);
     if (IsBlank(character.code)) {
       is_apart = !clean.empty();
     } else {
@@ -83,7 +83,7 @@ void ContentSink::AddText(std::string_view bytes) {
       continue;
     }
 
-    const Character character = FirstCharacter(bytes);
+    const Utf8Character character = FirstCharacter(bytes);
     if (character.is_cut) {
       pending = bytes;
       return;
