@@ -11,10 +11,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <system_error>
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "extract/error_text.h"
 #include "extract/nobody.h"
 
 namespace fileindexd {
@@ -25,11 +25,6 @@ namespace {
 constexpr const char* SITE = "/tmp";
 
 constexpr unsigned long FIXED = MS_NOSUID | MS_NODEV;
-
-bool Failed(const std::string& what, std::string& error) {
-  error = what + ": " + std::generic_category().message(errno);
-  return false;
-}
 
 bool MakeFolders(const std::string& path) {
   for (size_t slash = path.find('/', 1); slash != std::string::npos;

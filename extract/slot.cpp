@@ -7,9 +7,9 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <system_error>
 
 #include "extract/converters.h"
+#include "extract/error_text.h"
 #include "extract/format.h"
 #include "extract/helper_codes.h"
 
@@ -30,10 +30,6 @@ constexpr int LOST_HELPERS = 3;
 // times only: a helper that waits for something that never comes gets none either.
 constexpr int USED_PART = 4;
 constexpr int STARVED_TIMES = 2;
-
-std::string ErrorText() {
-  return std::generic_category().message(errno);
-}
 
 // The text of both, and of the fields those that only `converted` has.
 void Merge(Content& found, const Content& converted, size_t text_cap) {
@@ -93,7 +89,7 @@ std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
     if (status) {
       DropHelper();
       outcome = outcome ? std::move(outcome) : JudgeEnd(*status);
-    } else if (!outcome && closing && now >= grace) {
+    } else if (!outcome && is_closing && now >= grace) {
       if (has_begun) {
         outcome = Nonsense("it closed its connection");
       } else {
@@ -196,7 +192,7 @@ std::optional<ExtractOutcome> Slot::StartConverter(const std::string& name) {
   ScopedFd made(memfd_create("converted", MFD_CLOEXEC));
   std::string error;
   if (made.fd < 0 || lseek(current.file.fd, 0, SEEK_SET) != 0) {
-    return End(Result::LOST, name + ": " + ErrorText());
+    return End(Result::LOST, name + ": " + ErrorText(errno));
   }
   if (!StartChild(options.program, {CONVERT_MODE, name}, {current.file.fd, made.fd, -1}, converter,
                   error)) {
@@ -346,7 +342,7 @@ void Slot::Clear() {
 
 Slot::Clock::time_point Slot::Due() const {
   Clock::time_point due = HasJob() ? deadline : Clock::time_point::max();
-  return closing ? std::min(due, grace) : due;
+  return is_closing ? std::min(due, grace) : due;
 }
 
 }  // namespace fileindexd

@@ -8,8 +8,8 @@
 
 #include <cerrno>
 #include <memory>
-#include <system_error>
 
+#include "extract/error_text.h"
 #include "extract/sanitized.h"
 
 namespace fileindexd {
@@ -128,7 +128,7 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
 
   const int failure = filter.Load();
   if (failure != 0) {
-    error = "system calls: " + std::generic_category().message(-failure);
+    error = "system calls: " + ErrorText(-failure);
   }
   return failure == 0;
 }
