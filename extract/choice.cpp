@@ -10,6 +10,8 @@
 #include <string>
 #include <vector>
 
+#include "extract/memory_file.h"
+
 namespace fileindexd {
 
 namespace {
@@ -71,23 +73,8 @@ Surroundings& Around() {
   return surroundings;
 }
 
-std::string ReadHead(int file) {
-  std::string head(HEAD, '\0');
-  size_t filled = 0;
-  while (filled < head.size()) {
-    const ssize_t got =
-        pread(file, head.data() + filled, head.size() - filled, static_cast<off_t>(filled));
-    if (got <= 0) {
-      break;
-    }
-    filled += static_cast<size_t>(got);
-  }
-  head.resize(filled);
-  return head;
-}
-
 Format FormatOfContent(const Document& document) {
-  const std::string head = ReadHead(document.file);
+  const std::string head = FirstBytes(document, HEAD);
   if (head.empty() || Around().magic == nullptr) {
     return Format::NONE;
   }
