@@ -164,8 +164,11 @@ TEST(MailTest, PartsWithinPartsWithoutEndAreRead) {
     deep += "Content-Type: multipart/mixed; boundary=\"" + mark + "\"\n\n--" + mark + "\n";
   }
 
-  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", deep + "\ndeep\n").Text(ContentField::TO).substr(0, 4),
-            "Quay");
+  const Reading reading = ReadBytes(ReadMessage, "a.eml", deep + "\ndeep\n");
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.Text(ContentField::TO).substr(0, 4), "Quay");
+  EXPECT_EQ(reading.content.text, "deep");
 }
 
 TEST(MailTest, DamageIsSurvived) {
