@@ -167,7 +167,7 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
     return true;
   }
   const Format seen = FormatOfContent(document);
-  if (seen == Format::NONE && named == Format::TEXT) {
+  if (seen == Format::NONE && named == Format::TEXT && !fault.starts_with(CANNOT_READ)) {
     sink.ReturnTo(std::move(begin));
     return true;  // many endings of source code name something else elsewhere
   }

@@ -135,7 +135,7 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
   for (off_t at = 0; !allowance.IsSpent();) {
     const ssize_t length = pread(document.file, chunk.data(), chunk.size(), at);
     if (length < 0) {
-      why = ErrorText(errno);
+      why = CANNOT_READ + ErrorText(errno);
       return false;
     }
     if (length == 0) {

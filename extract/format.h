@@ -73,6 +73,9 @@ class ContentSink {
   std::string pending;    // begin of a character
 };
 
+// Begins the reason when it is the disk's fault and not the format's.
+constexpr const char* CANNOT_READ = "cannot be read: ";
+
 // False when the file cannot be read as that format, and `why` then says so in a few words for an
 // administrator ("damaged", "encrypted", "not a PDF file"). What was put into the sink before is
 // kept: half a document is better than none.

@@ -112,7 +112,12 @@ bool Answered(const JobOrder& job, int file) {
     return SendAll(EncodeAnswer(answer));
   }
 
-  const uint64_t sample = SampleFile(file, info.st_size);
+  uint64_t sample = 0;
+  if (!SampleFile(file, info.st_size, sample)) {  // not that there is nothing in it
+    answer.has_failed = true;
+    answer.reason = CANNOT_READ + std::generic_category().message(errno);
+    return SendAll(EncodeAnswer(answer));
+  }
   const bool is_well = ReadFile({file, job.name, info.st_size, 0}, job.text_cap, answer);
   answer.content.sample = sample;
   return SendAll(EncodeAnswer(answer)) && is_well && HoldsLittle();

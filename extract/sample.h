@@ -7,7 +7,8 @@
 namespace fileindexd {
 
 // XXH3 of the file's first, middle and last 64 KiB, of all of it where it is no longer than that,
-// and of its size. What cannot be read counts as not there.
-uint64_t SampleFile(int file, int64_t size);
+// and of its size. What is no longer there counts as not there. False, with errno, when something
+// cannot be read.
+bool SampleFile(int file, int64_t size, uint64_t& sample);
 
 }  // namespace fileindexd

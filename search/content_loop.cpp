@@ -174,12 +174,22 @@ void ContentLoop::Listen(Time now) {
   }
 }
 
-// False when something could not be read: it stays as it was.
+// False when something could not be read: it stays as it was. Told once, and that it is good again.
 bool ContentLoop::Reload() {
-  const bool is_good = permission.Look(*store);
+  std::string problem;
+  const bool is_good = ReadState(problem);
+  if (problem != state_problem) {
+    ServiceLog("%s", is_good ? "the state can be read again" : problem.c_str());
+    state_problem = problem;
+  }
+  return is_good;
+}
+
+bool ContentLoop::ReadState(std::string& problem) {
+  bool is_good = permission.Look(*store, problem);
   std::shared_ptr<const Settings> settings;
   if (!store->GetSettings(settings)) {
-    ServiceLog("%s", store->Error().c_str());
+    problem = store->Error();
     return false;
   }
 
@@ -188,7 +198,11 @@ bool ContentLoop::Reload() {
   for (const Share& share : settings->shares) {
     std::string folders = FoldersText(*settings, share.name);
     if (!folders.empty()) {
-      Follow(share, folders, settings);
+      // One that has just been removed is gone at the next look.
+      if (!Follow(share, folders, settings)) {
+        problem = store->Error();
+        is_good = false;
+      }
       current.emplace(share.name, std::move(folders));
     }
   }
@@ -202,11 +216,11 @@ bool ContentLoop::Reload() {
   return is_good;
 }
 
-void ContentLoop::Follow(const Share& share, const std::string& folders,
+bool ContentLoop::Follow(const Share& share, const std::string& folders,
                          const std::shared_ptr<const Settings>& settings) {
   ShareStatus status;
   if (!store->GetStatus(share.name, status)) {
-    return;  // it has just been removed
+    return false;
   }
 
   const auto [found, is_new] = shares.try_emplace(share.name, share);
@@ -219,6 +233,7 @@ void ContentLoop::Follow(const Share& share, const std::string& folders,
   followed.folders = folders;
   followed.contents.Use(settings);
   followed.contents.Set(share, status);
+  return true;
 }
 
 void ContentLoop::OpenPool(Time now) {

@@ -57,7 +57,8 @@ class ContentLoop {
 
   void Listen(Time now);
   bool Reload();
-  void Follow(const Share& share, const std::string& folders,
+  bool ReadState(std::string& problem);
+  bool Follow(const Share& share, const std::string& folders,
               const std::shared_ptr<const Settings>& settings);
   void OpenPool(Time now);
   void TellLeftOut();
@@ -75,7 +76,8 @@ class ContentLoop {
   std::unique_ptr<StateStore> store;
   std::map<std::string, Followed> shares;  // by name
 
-  bool works = false;  // had permission at the last step
+  std::string state_problem;  // as it was told; empty: the state can be read
+  bool works = false;         // had permission at the last step
   std::unique_ptr<ExtractPool> pool;
   Time pool_rest_until;
   std::chrono::seconds pool_rest{0};

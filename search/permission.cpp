@@ -7,9 +7,9 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstring>
 #include <ctime>
 
-#include "search/log.h"
 #include "state/daemon_socket.h"
 #include "state/pid_file.h"
 
@@ -28,55 +28,68 @@ bool IsReady(int fd) {
 
 }  // namespace
 
-bool Permission::Look(StateStore& store) {
-  LookAtDaemon();
+bool Permission::Look(StateStore& store, std::string& error) {
+  const bool is_good = LookAtDaemon(error);
 
   int64_t resume_time = 0;
   if (!store.GetPause(resume_time)) {
-    ServiceLog("%s", store.Error().c_str());
+    error = store.Error();
     resume.Close();  // what has come true once would be told of without end
     return false;
   }
   paused = resume_time == 0 || resume_time > time(nullptr);
-  AwaitResume(paused ? resume_time : 0);
-  return true;
+  return AwaitResume(paused ? resume_time : 0, error) && is_good;
 }
 
-void Permission::LookAtDaemon() {
-  const pid_t alive = std::max(AliveByPidFile(DAEMON_PID_FILE, DAEMON_PROGRAM), 0);
+bool Permission::LookAtDaemon(std::string& error) {
+  const pid_t alive = AliveByPidFile(DAEMON_PID_FILE, DAEMON_PROGRAM);
+  if (alive < 0) {
+    error = std::string("cannot read ") + DAEMON_PID_FILE + ", reason=" + strerror(errno);
+    if (IsReady(daemon_end.fd)) {  // its end would be told of without end
+      daemon = 0;
+      daemon_end.Close();
+    }
+    return false;
+  }
   if (alive == daemon && alive > 0 && !IsReady(daemon_end.fd)) {
-    return;
+    return true;
   }
 
   daemon = 0;
   daemon_end.Close();
   if (alive == 0) {
-    return;
+    return true;
   }
   ScopedFd end(OpenPidFd(alive));
+  if (end.fd < 0 && errno != ESRCH) {
+    error = std::string("cannot follow the daemon, reason=") + strerror(errno);
+    return false;
+  }
   // The number may have become another process's before it was opened.
   if (end.fd < 0 || AliveByPidFile(DAEMON_PID_FILE, DAEMON_PROGRAM) != alive || IsReady(end.fd)) {
-    return;
+    return true;
   }
   daemon = alive;
   daemon_end.Swap(end);
+  return true;
 }
 
 // By the wall clock, which is what the pause is kept in; that clock being set wakes as well.
-void Permission::AwaitResume(int64_t resume_time) {
+bool Permission::AwaitResume(int64_t resume_time, std::string& error) {
   resume.Close();
   if (resume_time <= 0) {
-    return;
+    return true;
   }
   ScopedFd timer(timerfd_create(CLOCK_REALTIME, TFD_CLOEXEC | TFD_NONBLOCK));
   itimerspec at = {};
   at.it_value.tv_sec = static_cast<time_t>(resume_time);
   constexpr int FLAGS = TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET;
   if (timer.fd < 0 || timerfd_settime(timer.fd, FLAGS, &at, nullptr) != 0) {
-    ServiceLog("cannot await the end of the pause, reason=%m");
-    return;
+    error = std::string("cannot await the end of the pause, reason=") + strerror(errno);
+    return false;
   }
   resume.Swap(timer);
+  return true;
 }
 
 void Permission::AddPolled(std::vector<pollfd>& polled) const {

@@ -8,6 +8,8 @@
 #include <poll.h>
 #include <sys/types.h>
 
+#include <cstdint>
+#include <string>
 #include <vector>
 
 #include "base/scoped_fd.h"
@@ -17,9 +19,9 @@ namespace fileindexd {
 
 class Permission {
  public:
-  // Looks at the pid file and at the store. What cannot be read stays as it was: false, and nobody
-  // tells when to look again.
-  bool Look(StateStore& store);
+  // Looks at the pid file and at the store. What cannot be read stays as it was: false, `error`
+  // says why, and nobody tells when to look again.
+  bool Look(StateStore& store, std::string& error);
   bool MayWork() const { return daemon_end.fd >= 0 && !paused; }
 
   void AddPolled(std::vector<pollfd>& polled) const;
@@ -27,8 +29,8 @@ class Permission {
   bool IsTold(const std::vector<pollfd>& polled) const;
 
  private:
-  void LookAtDaemon();
-  void AwaitResume(int64_t resume_time);
+  bool LookAtDaemon(std::string& error);
+  bool AwaitResume(int64_t resume_time, std::string& error);
 
   pid_t daemon = 0;
   ScopedFd daemon_end;  // of process `daemon`; none: it does not run

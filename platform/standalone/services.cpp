@@ -13,6 +13,7 @@
 #include <csignal>
 #include <string>
 #include <thread>
+#include <utility>
 
 #include "base/scoped_fd.h"
 #include "platform/log.h"
@@ -47,8 +48,9 @@ thread_local SystemError last_error;
 // same time one gets it. Never closed; the detached child inherits it.
 int pid_file_lock = -1;
 
-// The service that this process has started last: it may not have written its pid file yet.
-pid_t started_service = 0;
+// The service that this process has started last, which may not have written its pid file yet.
+// Never its number alone: that may be another process's by the time it is to be stopped.
+int started_service = -1;
 
 int Fail(const char* file, int line) {
   last_error = {errno, file, line};
@@ -134,6 +136,15 @@ std::string FindProgram(const std::string& name) {
   return {};
 }
 
+// The C library's own header declares these two without C linkage.
+int OpenPidFd(pid_t process) {
+  return static_cast<int>(syscall(SYS_pidfd_open, process, 0));
+}
+
+bool SendSignal(int pid_fd, int number) {
+  return syscall(SYS_pidfd_send_signal, pid_fd, number, nullptr, 0) == 0;
+}
+
 int StartService(const std::string& name) {
   if (AliveByPidFile(ServicePidFile(name), name) > 0) {
     return 0;
@@ -149,17 +160,8 @@ int StartService(const std::string& name) {
   if (process < 0) {
     return FI_FAIL();
   }
-  started_service = process;
+  ScopedFd(std::exchange(started_service, OpenPidFd(process))).Close();
   return 0;
-}
-
-// The C library's own header declares these two without C linkage.
-int OpenPidFd(pid_t process) {
-  return static_cast<int>(syscall(SYS_pidfd_open, process, 0));
-}
-
-bool SendSignal(int pid_fd, int number) {
-  return syscall(SYS_pidfd_send_signal, pid_fd, number, nullptr, 0) == 0;
 }
 
 // 1 when the process has ended within the time.
@@ -169,18 +171,20 @@ int AwaitExit(int pid_fd, int timeout_ms) {
 }
 
 int StopService(const std::string& name) {
-  pid_t process = AliveByPidFile(ServicePidFile(name), name);
-  if (process <= 0) {
-    process = started_service;
+  ScopedFd target(std::exchange(started_service, -1));
+  const pid_t process = AliveByPidFile(ServicePidFile(name), name);
+  if (process > 0) {
+    ScopedFd named(OpenPidFd(process));
+    if (named.fd < 0 && errno != ESRCH) {
+      return FI_FAIL();
+    }
+    // The number may have become another process's before it was opened.
+    if (AliveByPidFile(ServicePidFile(name), name) == process) {
+      target.Swap(named);
+    }
   }
-  started_service = 0;
-  if (process <= 0) {
-    return 0;
-  }
-
-  const ScopedFd target(OpenPidFd(process));
   if (target.fd < 0) {
-    return errno == ESRCH ? 0 : FI_FAIL();
+    return 0;
   }
   if (!SendSignal(target.fd, SIGTERM)) {
     return errno == ESRCH ? 0 : FI_FAIL();

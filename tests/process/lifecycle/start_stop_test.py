@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Starting and stopping: files, log lines in their order, the content service, exit status 0."""
 
+import ctypes
 import os
 import re
 import shutil
@@ -21,6 +22,41 @@ STARTED = [
     "Workers start to run ...",
     "Search daemon launched ...",
 ]
+
+
+CLONE3 = 435
+
+
+class CloneArguments(ctypes.Structure):
+    _fields_ = [
+        (name, ctypes.c_uint64)
+        for name in (
+            "flags",
+            "pidfd",
+            "child_tid",
+            "parent_tid",
+            "exit_signal",
+            "stack",
+            "stack_size",
+            "tls",
+            "set_tid",
+            "set_tid_size",
+        )
+    ]
+
+
+def start_as(pid):
+    """Runs a program that waits for its end under that number. False when it is not to be had."""
+    numbers = (ctypes.c_int32 * 1)(pid)
+    arguments = CloneArguments(
+        exit_signal=signal.SIGCHLD, set_tid=ctypes.addressof(numbers), set_tid_size=1
+    )
+    made = ctypes.CDLL(None).syscall(
+        CLONE3, ctypes.byref(arguments), ctypes.c_size_t(ctypes.sizeof(arguments))
+    )
+    if made == 0:
+        os.execv("/bin/sleep", ["sleep", "1000"])
+    return made == pid
 
 
 class StartStopTest(MachineTest):
@@ -110,6 +146,18 @@ class StartStopTest(MachineTest):
         self.await_line("Search daemon launched ...", after)
         self.assertEqual(self.command("resume"), 0)
         self.stop(self.daemon_pid())
+
+    def test_a_stranger_who_got_the_services_number_is_left_alone(self):
+        pid = self.start()
+        service = self.service_pid()
+        self.kill(service)
+        if not start_as(service):
+            self.skipTest(f"process {service} cannot be made")
+
+        self.stop(pid)
+
+        self.assertEqual(os.waitpid(service, os.WNOHANG), (0, 0))
+        self.kill(service)
 
     def test_share_with_a_folder_gets_one_worker_at_start(self):
         root = self.make_share(folders=("", "docs"), files=("docs/",))

@@ -129,6 +129,23 @@ TEST_F(HelperTest, WhatNoReaderIsForIsDoneWithoutContent) {
   }
 }
 
+TEST_F(HelperTest, WhatTheDiskDoesNotGiveIsAFailureAndHasNoSample) {
+  for (const char* name : {"a.txt", "a", "a.pdf", "a.mp3"}) {
+    const ScopedFd file = FileOf("words");
+    ScopedFd unreadable(open(("/proc/self/fd/" + std::to_string(file.fd)).c_str(), O_WRONLY));
+    ASSERT_GE(unreadable.fd, 0);
+    ExtractJob job;
+    job.id = 1;
+    job.name = name;
+    job.file.Swap(unreadable);
+    pool->Submit(std::move(job));
+
+    const ExtractOutcome outcome = std::move(Await(1)[1]);
+    EXPECT_EQ(Told(outcome), "failed: cannot be read: Bad file descriptor") << name;
+    EXPECT_EQ(outcome.content.sample, 0U);
+  }
+}
+
 TEST_F(HelperTest, ContentTellsWhereTheNameDoesNot) {
   const struct {
     const char* name;

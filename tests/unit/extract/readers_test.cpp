@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Text and markup, read in this process.
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <iconv.h>
 #include <sys/mman.h>
@@ -370,6 +371,20 @@ TEST(FormatTableTest, EveryFormatOfDocumentsIsToldByItsEnding) {
   for (const auto& row : rows) {
     EXPECT_EQ(static_cast<int>(FormatOfName(row.names)), static_cast<int>(row.format)) << row.names;
   }
+}
+
+// Beyond the parts that are sampled: of a name that may lie, this is no reason to keep quiet.
+TEST(ChoiceTest, ATextThatTheDiskDoesNotGiveIsNotTakenForSomethingElse) {
+  const int file = memfd_create("test", MFD_CLOEXEC);
+  ASSERT_EQ(write(file, "words", 5), 5);
+  const ScopedFd readable(file);
+  const ScopedFd unreadable(open(("/proc/self/fd/" + std::to_string(file)).c_str(), O_WRONLY));
+  ContentSink sink(1000);
+  std::string why;
+
+  EXPECT_FALSE(ReadDocument({unreadable.fd, "a.txt", 5, 0}, sink, why));
+
+  EXPECT_EQ(why, "cannot be read: Bad file descriptor");
 }
 
 }  // namespace

@@ -164,6 +164,25 @@ TEST_F(ContentLoopTest, TheEndOfTheDaemonStopsItInTheMiddle) {
   EXPECT_THAT(Running(), ElementsAre("a1"));
 }
 
+TEST_F(ContentLoopTest, APidFileThatCannotBeReadStopsNothingAndIsLookedAtAgain) {
+  StartDaemon();
+  AddShare("a", 1);
+  Settle();
+  ASSERT_THAT(Running(), ElementsAre("a1"));
+
+  std::filesystem::remove(DAEMON_PID_FILE);
+  std::filesystem::create_directory(DAEMON_PID_FILE);
+  Settle();
+  Pass(seconds(5));
+  EXPECT_THAT(Running(), ElementsAre("a1"));
+  EXPECT_EQ(Pool().aborts, 0U);
+  EXPECT_LE(loop->Due(now), now + seconds(1));
+
+  KillDaemon();
+  Await();
+  EXPECT_THAT(Running(), ElementsAre());
+}
+
 TEST_F(ContentLoopTest, APauseStopsItAndItsEndLetsItGoOn) {
   StartDaemon();
   AddShare("a", 1);
