@@ -7,65 +7,82 @@ namespace {
 
 constexpr const char* REPLACEMENT = "\xEF\xBF\xBD";  // U+FFFD
 
-// Bytes of the well-formed character that begins at `at`; 0 when none does. Overlong forms,
-// surrogates and what lies above U+10FFFF are not well-formed.
-size_t CharacterLength(std::string_view bytes, size_t at) {
-  const auto byte = [&](size_t i) { return static_cast<unsigned char>(bytes[i]); };
-  const unsigned char lead = byte(at);
-  if (lead < 0x80) {
-    return 1;
-  }
+unsigned Byte(std::string_view bytes, size_t at) {
+  return static_cast<unsigned char>(bytes[at]);
+}
 
-  size_t length = 0;
-  unsigned char low = 0x80;  // bounds of the second byte
-  unsigned char high = 0xBF;
-  if (lead >= 0xC2 && lead <= 0xDF) {
-    length = 2;
-  } else if (lead >= 0xE0 && lead <= 0xEF) {
-    length = 3;
-    low = lead == 0xE0 ? 0xA0 : low;
-    high = lead == 0xED ? 0x9F : high;
-  } else if (lead >= 0xF0 && lead <= 0xF4) {
-    length = 4;
-    low = lead == 0xF0 ? 0x90 : low;
-    high = lead == 0xF4 ? 0x8F : high;
+// What the second byte may be: narrower than the others where that keeps out a character in more
+// bytes than it needs, a half of a pair, and what lies beyond the last plane.
+bool IsSecond(unsigned first, unsigned second) {
+  switch (first) {
+    case 0xE0:
+      return second >= 0xA0 && second <= 0xBF;
+    case 0xED:
+      return second >= 0x80 && second <= 0x9F;
+    case 0xF0:
+      return second >= 0x90 && second <= 0xBF;
+    case 0xF4:
+      return second >= 0x80 && second <= 0x8F;
+    default:
+      return second >= 0x80 && second <= 0xBF;
   }
-  if (length == 0 || bytes.size() - at < length || byte(at + 1) < low || byte(at + 1) > high) {
-    return 0;
-  }
-  for (size_t i = at + 2; i < at + length; ++i) {
-    if (byte(i) < 0x80 || byte(i) > 0xBF) {
-      return 0;
-    }
-  }
-  return length;
+}
+
+// A zero is a character like any other.
+bool IsWrong(const Utf8Character& character, char first) {
+  return character.code == 0 && first != '\0';
 }
 
 }  // namespace
 
+Utf8Character FirstCharacter(std::string_view bytes) {
+  const unsigned first = Byte(bytes, 0);
+  if (first < 0x80) {
+    return {first, 1, false};
+  }
+  if (first < 0xC2 || first > 0xF4) {
+    return {};
+  }
+
+  const size_t length = first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
+  char32_t code = first & (0xFFU >> (length + 1));
+  for (size_t at = 1; at < length; ++at) {
+    if (at == bytes.size()) {
+      return {0, at, true};
+    }
+    const unsigned next = Byte(bytes, at);
+    if (at == 1 ? !IsSecond(first, next) : (next & 0xC0U) != 0x80) {
+      return {0, at, false};
+    }
+    code = code << 6 | (next & 0x3FU);
+  }
+  return {code, length, false};
+}
+
 std::string ToUtf8(std::string_view bytes) {
   std::string text;
   text.reserve(bytes.size());
-  for (size_t at = 0; at < bytes.size();) {
-    const size_t length = CharacterLength(bytes, at);
-    if (length == 0) {
-      text += REPLACEMENT;
-      ++at;
+  while (!bytes.empty()) {
+    const Utf8Character character = FirstCharacter(bytes);
+    if (IsWrong(character, bytes[0])) {
+      for (size_t at = 0; at < character.length; ++at) {
+        text += REPLACEMENT;
+      }
     } else {
-      text += bytes.substr(at, length);
-      at += length;
+      text += bytes.substr(0, character.length);
     }
+    bytes.remove_prefix(character.length);
   }
   return text;
 }
 
 bool IsUtf8(std::string_view bytes) {
-  for (size_t at = 0; at < bytes.size();) {
-    const size_t length = CharacterLength(bytes, at);
-    if (length == 0) {
+  while (!bytes.empty()) {
+    const Utf8Character character = FirstCharacter(bytes);
+    if (IsWrong(character, bytes[0])) {
       return false;
     }
-    at += length;
+    bytes.remove_prefix(character.length);
   }
   return true;
 }

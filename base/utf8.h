@@ -2,10 +2,21 @@
 // Bytes that may be UTF-8.
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <string_view>
 
 namespace fileindexd {
+
+struct Utf8Character {
+  char32_t code = 0;    // 0 where the bytes are no UTF-8
+  size_t length = 1;    // bytes, at least 1: of what is wrong, those that cannot begin another one
+  bool is_cut = false;  // right so far, and the bytes end within it
+};
+
+// The first character of `bytes`, which are not empty. Overlong forms, surrogates and what lies
+// above U+10FFFF are no UTF-8.
+Utf8Character FirstCharacter(std::string_view bytes);
 
 // The text with every byte that is not part of well-formed UTF-8 replaced by U+FFFD.
 std::string ToUtf8(std::string_view bytes);

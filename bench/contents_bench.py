@@ -238,8 +238,8 @@ def print_first_index(medians):
 
     against("first index with contents / recollindex", "recoll", "seconds", "0.2", 1, "s")
     against("processor time of it / recollindex", "recoll", "processor", "0.333", 1, "s")
-    against("the same / tracker-miner-fs, its last document", "tracker", "seconds", "0.5", 1, "s")
-    against("the same / reading and extracting alone", "pool", "seconds", "1.5", 1, "s")
+    against("first index with contents / tracker-miner-fs", "tracker", "seconds", "0.5", 1, "s")
+    against("first index with contents / reading, extracting", "pool", "seconds", "1.5", 1, "s")
     against("size with text / recollindex", "recoll", "size", "0.333", 1e-6, "MB")
     row("memory of the service, highest / 64 MB", medians["ours"]["memory"], 64e6, "1", 1e-6, "MB")
 

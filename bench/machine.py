@@ -30,11 +30,13 @@ def wait(condition, *folders):
     """Until the condition holds; looked at after each change in a folder."""
     deadline = time.monotonic() + LIMIT
     fd = libc.inotify_init1(0o2000000)
-    for folder in folders:
-        libc.inotify_add_watch(fd, folder.encode(), 0xFFE)
     try:
+        for folder in folders:
+            if libc.inotify_add_watch(fd, folder.encode(), 0xFFE) < 0:
+                raise OSError(ctypes.get_errno(), "inotify_add_watch", folder)
         while not condition():
-            if not select.select([fd], [], [], deadline - time.monotonic())[0]:
+            left = max(0.0, deadline - time.monotonic())
+            if not select.select([fd], [], [], left)[0]:
                 raise TimeoutError(folders)
             os.read(fd, 65536)
     finally:

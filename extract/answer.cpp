@@ -92,6 +92,11 @@ bool IsCleanWithin(std::string_view value, size_t limit) {
   return !value.empty() && value.size() <= limit && IsCleanText(value);
 }
 
+// Goes into lines of others' logs.
+bool IsReason(std::string_view value) {
+  return IsCleanWithin(value, MAX_REASON) && value.find('\n') == std::string_view::npos;
+}
+
 bool TakeField(uint8_t tag, std::string_view value, Content& content) {
   const auto field = static_cast<ContentField>(tag);
   if (!IsNumberField(field)) {
@@ -120,7 +125,7 @@ bool TakeReady(std::string_view value, Answer& answer) {
   }
   answer.sort = Answer::Sort::READY;
   answer.left_out = value.substr(1);
-  return answer.left_out.size() <= MAX_REASON && IsCleanText(answer.left_out);
+  return answer.left_out.empty() || IsReason(answer.left_out);
 }
 
 bool TakeRecord(uint8_t tag, std::string_view value, size_t text_cap, Answer& answer) {
@@ -142,11 +147,11 @@ bool TakeRecord(uint8_t tag, std::string_view value, size_t text_cap, Answer& an
       return true;
     case TAG_CONVERTER:
       answer.converter = value;
-      return IsCleanWithin(value, MAX_REASON);
+      return IsReason(value);
     case TAG_FAILED:
       answer.has_failed = true;
       answer.reason = value;
-      return IsCleanWithin(value, MAX_REASON);
+      return IsReason(value);
     case TAG_BEGUN:
       answer.sort = Answer::Sort::BEGUN;
       return value.empty();
@@ -197,7 +202,8 @@ std::string EncodeAnswer(const Answer& answer) {
   std::string frame;
   frame.reserve(LENGTH_SIZE + body.size());
   AppendNumber(frame, static_cast<uint32_t>(body.size()));
-  return frame + body;
+  frame += body;
+  return frame;
 }
 
 size_t MaxFrame(size_t text_cap) {

@@ -24,10 +24,12 @@
 //   CUT            empty: there was more text than the cap takes
 //   KIND           1 byte: a Kind, but no FOLDER
 //   SAMPLE         8 bytes
-//   CONVERTER      name of a program that reads the file's text better, 1 to MAX_REASON bytes
-//   FAILED         the file cannot be read, and why: clean, 1 to MAX_REASON bytes
+//   CONVERTER      name of a program that reads the file's text better: a clean line, 1 to
+//                  MAX_REASON bytes
+//   FAILED         the file cannot be read, and why: a clean line, 1 to MAX_REASON bytes
 //   BEGUN          empty
-//   READY          1 byte ANSWER_VERSION, and which formats are left out: clean, up to MAX_REASON
+//   READY          1 byte ANSWER_VERSION, and which formats are left out: a clean line, up to
+//                  MAX_REASON bytes
 //
 // Numbers are little-endian. The helper may have been taken over by a file: whoever receives from
 // it believes nothing that is not checked here.

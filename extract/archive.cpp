@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <algorithm>
-#include <array>
 #include <string>
 #include <string_view>
 
 #include "base/utf8.h"
 #include "extract/charset.h"
+#include "extract/decoder.h"
 #include "extract/format.h"
 #include "extract/media_text.h"
 #include "extract/memory_file.h"
@@ -25,20 +25,12 @@ std::string_view LastComponent(std::string_view path) {
   return path.substr(path.rfind('/') + 1);  // npos + 1 is 0
 }
 
-bool EndsWith(std::string_view name, std::string_view ending) {
-  return name.size() > ending.size() &&
-         std::equal(ending.begin(), ending.end(), name.end() - static_cast<long>(ending.size()),
-                    [](char a, char b) { return a == (b >= 'A' && b <= 'Z' ? b + 32 : b); });
-}
-
 // Members without words are not worth the unpacking: only text is wanted of them.
 bool IsWordless(std::string_view name) {
-  constexpr std::array ENDINGS{".jpg", ".jpeg", ".png", ".gif",  ".webp", ".heic",  ".tif", ".tiff",
-                               ".bmp", ".ico",  ".mp3", ".flac", ".ogg",  ".opus",  ".m4a", ".wav",
-                               ".mp4", ".mkv",  ".avi", ".mov",  ".webm", ".exe",   ".dll", ".so",
-                               ".o",   ".a",    ".ttf", ".otf",  ".woff", ".class", ".pyc"};
-  return std::any_of(ENDINGS.begin(), ENDINGS.end(),
-                     [name](const char* ending) { return EndsWith(name, ending); });
+  return HasEnding(
+      name,
+      "jpg jpeg png gif webp heic tif tiff bmp ico mp3 flac ogg opus m4a wav mp4 mkv avi "
+      "mov webm exe dll so o a ttf otf woff class pyc");
 }
 
 // "paper.pdf.gz" holds "paper.pdf".

@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "extract/media_text.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 

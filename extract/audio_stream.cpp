@@ -5,6 +5,7 @@
 #include <stdexcept>
 
 #include "extract/media_text.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 

@@ -15,52 +15,11 @@ unsigned Byte(std::string_view bytes, size_t at) {
   return static_cast<unsigned char>(bytes[at]);
 }
 
-// What the second byte may be: narrower than the others where that keeps out a character in more
-// bytes than it needs, a half of a pair, and what lies beyond the last plane.
-bool IsSecond(unsigned first, unsigned second) {
-  switch (first) {
-    case 0xE0:
-      return second >= 0xA0 && second <= 0xBF;
-    case 0xED:
-      return second >= 0x80 && second <= 0x9F;
-    case 0xF0:
-      return second >= 0x90 && second <= 0xBF;
-    case 0xF4:
-      return second >= 0x80 && second <= 0x8F;
-    default:
-      return second >= 0x80 && second <= 0xBF;
-  }
-}
-
 bool IsBetween(int64_t number, int64_t least, int64_t most) {
   return number >= least && number <= most;
 }
 
 }  // namespace
-
-Character FirstCharacter(std::string_view bytes) {
-  const unsigned first = Byte(bytes, 0);
-  if (first < 0x80) {
-    return {first, 1, false};
-  }
-  if (first < 0xC2 || first > 0xF4) {
-    return {};
-  }
-
-  const size_t length = first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
-  char32_t code = first & (0xFFU >> (length + 1));
-  for (size_t at = 1; at < length; ++at) {
-    if (at == bytes.size()) {
-      return {0, at, true};
-    }
-    const unsigned next = Byte(bytes, at);
-    if (at == 1 ? !IsSecond(first, next) : (next & 0xC0U) != 0x80) {
-      return {0, at, false};
-    }
-    code = code << 6 | (next & 0x3FU);
-  }
-  return {code, length, false};
-}
 
 bool IsBlank(char32_t code) {
   if (code < 0x1680) {
@@ -80,7 +39,7 @@ bool IsCleanText(std::string_view bytes) {
     if (bytes.empty()) {
       return true;
     }
-    const Character character = FirstCharacter(bytes);
+    const Utf8Character character = FirstCharacter(bytes);
     if (IsBlank(character.code)) {
       return false;
     }

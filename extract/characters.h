@@ -7,17 +7,10 @@
 #include <string_view>
 
 #include "base/content.h"
+#include "base/utf8.h"
 
 namespace fileindexd {
 
-struct Character {
-  char32_t code = 0;    // 0 where the bytes are no UTF-8
-  size_t length = 1;    // bytes, at least 1: of what is wrong, those that cannot begin another one
-  bool is_cut = false;  // right so far, and the bytes end within it
-};
-
-// The first character of `bytes`, which are not empty.
-Character FirstCharacter(std::string_view bytes);
 // Controls, spaces of every sort, and what no text holds: separates words, is none itself.
 bool IsBlank(char32_t code);
 // UTF-8 without blanks but the space and the line feed: what a ContentSink makes.

@@ -10,6 +10,7 @@
 
 #include "base/utf8.h"
 #include "extract/characters.h"
+#include "extract/decoder.h"
 
 namespace fileindexd {
 
@@ -87,7 +88,7 @@ bool IsMostlyUtf8(std::string_view bytes) {
   size_t good = 0;
   size_t bad = 0;
   while (!bytes.empty()) {
-    const Character character = FirstCharacter(bytes);
+    const Utf8Character character = FirstCharacter(bytes);
     if (character.is_cut) {
       break;
     }
@@ -119,7 +120,7 @@ std::string GuessNamesCharset(std::string_view names) {
   size_t in_rows = 0;
   bool was_high = false;
   for (std::string_view rest = text; !rest.empty();) {
-    const Character character = FirstCharacter(rest);
+    const Utf8Character character = FirstCharacter(rest);
     const bool is_high = character.code >= 0x370;
     high += is_high ? 1 : 0;
     in_rows += is_high && was_high ? 1 : 0;

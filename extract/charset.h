@@ -5,8 +5,6 @@
 #include <string>
 #include <string_view>
 
-#include "base/utf8.h"
-
 namespace fileindexd {
 
 struct ByteOrderMark {
@@ -36,8 +34,6 @@ std::string MeantCharset(std::string_view label);
 // Of names of files that are no UTF-8, put one after the other: those of an archive that does not
 // tell. Never empty.
 std::string GuessNamesCharset(std::string_view names);
-// From that charset; as they are where it is not known. What is wrong becomes a blank.
-std::string ToUtf8(std::string_view bytes, const std::string& charset);
 
 // Has the C library hold its tables of the charsets in common use, for when it can open no file any
 // more.

@@ -12,17 +12,13 @@
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
-#include <system_error>
 
+#include "extract/error_text.h"
 #include "extract/sanitized.h"
 
 namespace fileindexd {
 
 namespace {
-
-std::string ErrorText(int number) {
-  return std::generic_category().message(number);
-}
 
 // What posix_spawn takes, freed at the end of a scope. Every step's result is the first failure's.
 class SpawnPlan {

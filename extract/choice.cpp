@@ -10,6 +10,8 @@
 #include <string>
 #include <vector>
 
+#include "extract/memory_file.h"
+
 namespace fileindexd {
 
 namespace {
@@ -71,23 +73,8 @@ Surroundings& Around() {
   return surroundings;
 }
 
-std::string ReadHead(int file) {
-  std::string head(HEAD, '\0');
-  size_t filled = 0;
-  while (filled < head.size()) {
-    const ssize_t got =
-        pread(file, head.data() + filled, head.size() - filled, static_cast<off_t>(filled));
-    if (got <= 0) {
-      break;
-    }
-    filled += static_cast<size_t>(got);
-  }
-  head.resize(filled);
-  return head;
-}
-
 Format FormatOfContent(const Document& document) {
-  const std::string head = ReadHead(document.file);
+  const std::string head = FirstBytes(document, HEAD);
   if (head.empty() || Around().magic == nullptr) {
     return Format::NONE;
   }
@@ -133,9 +120,9 @@ bool Read(Format format, const Document& document, ContentSink& sink, std::strin
 
 // A package that is damaged or closed is an archive all the same; read as one, what was found of
 // the document would be lost.
-bool IsStillPackage(Format named, Format seen, const Content& found, const std::string& fault) {
+bool IsStillPackage(Format named, Format seen, bool has_found, const std::string& fault) {
   return (named == Format::OFFICE_ZIP || named == Format::EPUB) && seen == Format::ARCHIVE &&
-         (fault == "encrypted" || !found.text.empty() || !found.texts.empty());
+         (fault == "encrypted" || has_found);
 }
 
 }  // namespace
@@ -175,21 +162,22 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
 
   // A name may lie. Whose reader refuses the content, is judged by the content.
   std::string fault;
-  ContentSink tried = sink;
-  if (Read(named, document, tried, fault)) {
-    sink = std::move(tried);
+  ContentSink::Mark begin = sink.Here();
+  if (Read(named, document, sink, fault)) {
     return true;
   }
-  sink.has_thrown = sink.has_thrown || tried.has_thrown;
   const Format seen = FormatOfContent(document);
   if (seen == Format::NONE && named == Format::TEXT && !fault.starts_with(CANNOT_READ)) {
+    sink.ReturnTo(std::move(begin));
     return true;  // many endings of source code name something else elsewhere
   }
-  if (seen == Format::NONE || seen == named || IsStillPackage(named, seen, tried.content, fault)) {
-    sink = std::move(tried);
+  const bool has_found =
+      sink.content.text.size() > begin.text_size || sink.content.texts.size() > begin.texts.size();
+  if (seen == Format::NONE || seen == named || IsStillPackage(named, seen, has_found, fault)) {
     why = fault;
     return false;
   }
+  sink.ReturnTo(std::move(begin));
   return Read(seen, document, sink, why);
 }
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <algorithm>
 #include <cassert>
+#include <utility>
 
 #include "extract/characters.h"
 #include "extract/format.h"
@@ -47,7 +48,7 @@ std::string Cleaned(std::string_view bytes, size_t limit) {
   std::string clean;
   bool is_apart = false;
   while (!bytes.empty() && clean.size() < limit) {
-    const Character character = FirstCharacter(bytes);
+    const Utf8Character character = FirstCharacter(bytes);
     if (IsBlank(character.code)) {
       is_apart = !clean.empty();
     } else {
@@ -82,7 +83,7 @@ void ContentSink::AddText(std::string_view bytes) {
       continue;
     }
 
-    const Character character = FirstCharacter(bytes);
+    const Utf8Character character = FirstCharacter(bytes);
     if (character.is_cut) {
       pending = bytes;
       return;
@@ -116,6 +117,31 @@ void ContentSink::Append(std::string_view word) {
   if (blank != std::string::npos && text.size() - blank <= LONGEST_WORD) {
     text.resize(blank);
   }
+}
+
+ContentSink::Mark ContentSink::Here() const {
+  const size_t size = content.text.size();
+  return {content.kind,
+          content.texts,
+          content.numbers,
+          size,
+          content.text.substr(size - std::min(size, LONGEST_WORD)),
+          content.is_cut,
+          is_apart,
+          pending,
+          converter};
+}
+
+void ContentSink::ReturnTo(Mark&& mark) {
+  content.kind = mark.kind;
+  content.texts = std::move(mark.texts);
+  content.numbers = std::move(mark.numbers);
+  content.text.resize(mark.text_size - mark.text_end.size());
+  content.text += mark.text_end;
+  content.is_cut = mark.is_cut;
+  is_apart = mark.is_apart;
+  pending = std::move(mark.pending);
+  converter = std::move(mark.converter);
 }
 
 void ContentSink::Set(ContentField field, std::string_view text) {

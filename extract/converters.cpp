@@ -6,8 +6,8 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <system_error>
 
+#include "extract/error_text.h"
 #include "extract/run_time_files.h"
 
 namespace fileindexd {
@@ -44,7 +44,7 @@ void BecomeConverter(const Converter& converter, std::string& error) {
   arguments.push_back(nullptr);
   const std::string program = FindProgramFile(converter.name);
   (void)execve(program.c_str(), arguments.data(), environ);
-  error = std::string(converter.name) + ": " + std::generic_category().message(errno);
+  (void)Failed(converter.name, error);
 }
 
 }  // namespace fileindexd

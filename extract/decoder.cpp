@@ -6,11 +6,11 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <system_error>
 #include <vector>
 
 #include "base/utf8.h"
 #include "extract/charset.h"
+#include "extract/error_text.h"
 #include "extract/nested.h"
 
 namespace fileindexd {
@@ -135,7 +135,7 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
   for (off_t at = 0; !allowance.IsSpent();) {
     const ssize_t length = pread(document.file, chunk.data(), chunk.size(), at);
     if (length < 0) {
-      why = CANNOT_READ + std::generic_category().message(errno);
+      why = CANNOT_READ + ErrorText(errno);
       return false;
     }
     if (length == 0) {

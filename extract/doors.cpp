@@ -7,10 +7,10 @@
 
 #include <cerrno>
 #include <csignal>
-#include <system_error>
 
 #include "base/capabilities.h"
 #include "base/landlock.h"
+#include "extract/error_text.h"
 #include "extract/limits.h"
 #include "extract/nobody.h"
 #include "extract/own_root.h"
@@ -20,11 +20,6 @@
 namespace fileindexd {
 
 namespace {
-
-bool Failed(const std::string& what, std::string& error) {
-  error = what + ": " + std::generic_category().message(errno);
-  return false;
-}
 
 bool Limit(const LandlockRules& rules, const RunTimeFiles& files, std::string& error) {
   for (const std::string& path : files.readable) {

@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "base/content.h"
 
@@ -38,6 +39,23 @@ class ContentSink {
   void SetKind(Kind kind) { content.kind = kind; }
   // Nothing more is taken as text: a reader stops.
   bool IsFull() const { return content.is_cut; }
+
+  // Where it stands, to come back to when a reader was the wrong one. Costs what the fields hold,
+  // not the text.
+  struct Mark {
+    Kind kind = Kind::OTHER;
+    std::vector<TextField> texts;
+    std::vector<NumberField> numbers;
+    size_t text_size = 0;
+    std::string text_end;  // what cutting the word after it may take away
+    bool is_cut = false;
+    bool is_apart = false;
+    std::string pending;
+    std::string converter;
+  };
+  Mark Here() const;
+  // All that came since is forgotten, but that a library was left by an exception.
+  void ReturnTo(Mark&& mark);
 
   static constexpr size_t MAX_FIELD = 64 * 1024;
 

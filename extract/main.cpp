@@ -25,6 +25,7 @@
 #include "extract/choice.h"
 #include "extract/converters.h"
 #include "extract/doors.h"
+#include "extract/error_text.h"
 #include "extract/format.h"
 #include "extract/helper_codes.h"
 #include "extract/run_time_files.h"
@@ -115,7 +116,7 @@ bool Answered(const JobOrder& job, int file) {
   uint64_t sample = 0;
   if (!SampleFile(file, info.st_size, sample)) {  // not that there is nothing in it
     answer.has_failed = true;
-    answer.reason = CANNOT_READ + std::generic_category().message(errno);
+    answer.reason = CANNOT_READ + ErrorText(errno);
     return SendAll(EncodeAnswer(answer));
   }
   const bool is_well = ReadFile({file, job.name, info.st_size, 0}, job.text_cap, answer);

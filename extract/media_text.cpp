@@ -1,10 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/media_text.h"
 
-#include <unistd.h>
-
-#include <array>
-#include <cerrno>
 #include <chrono>
 
 #include "base/utf8.h"
@@ -14,19 +10,8 @@ namespace fileindexd {
 
 namespace {
 
-// Bytes 0x80 to 0x9f of Windows' western charset; 0 is none.
-constexpr std::array<uint16_t, 32> WESTERN = {
-    0x20ac, 0,      0x201a, 0x0192, 0x201e, 0x2026, 0x2020, 0x2021, 0x02c6, 0x2030, 0x0160,
-    0x2039, 0x0152, 0,      0x017d, 0,      0,      0x2018, 0x2019, 0x201c, 0x201d, 0x2022,
-    0x2013, 0x2014, 0x02dc, 0x2122, 0x0161, 0x203a, 0x0153, 0,      0x017e, 0x0178};
-
 bool IsDigit(char letter) {
   return letter >= '0' && letter <= '9';
-}
-
-uint32_t LittleUnit(std::string_view bytes, size_t at) {
-  return static_cast<uint32_t>(static_cast<unsigned char>(bytes[at]) |
-                               static_cast<unsigned char>(bytes[at + 1]) << 8);
 }
 
 // Takes exactly `digits` digits off the text's beginning.
@@ -81,48 +66,13 @@ bool TakeTime(std::string_view& text, int64_t& seconds) {
 
 }  // namespace
 
-size_t ReadAt(int file, int64_t offset, char* bytes, size_t size) {
-  size_t done = 0;
-  while (done < size) {
-    ssize_t got = pread(file, bytes + done, size - done, offset + static_cast<int64_t>(done));
-    if (got < 0 && errno == EINTR) {
-      continue;
-    }
-    if (got <= 0) {
-      break;
-    }
-    done += static_cast<size_t>(got);
-  }
-  return done;
-}
-
-std::string Utf8OfUtf16(std::string_view bytes) {
-  std::string text;
-  for (size_t i = 0; i + 1 < bytes.size(); i += 2) {
-    uint32_t unit = LittleUnit(bytes, i);
-    const bool is_high = unit >= 0xd800 && unit < 0xdc00;
-    if (is_high && i + 3 < bytes.size() && (LittleUnit(bytes, i + 2) & 0xfc00) == 0xdc00) {
-      unit = 0x10000 + ((unit - 0xd800) << 10) + (LittleUnit(bytes, i + 2) - 0xdc00);
-      i += 2;
-    } else if (unit >= 0xd800 && unit < 0xe000) {
-      unit = 0xfffd;
-    }
-    AppendUtf8(unit, text);
-  }
-  return text;
-}
-
 std::string Utf8Of(std::string_view bytes) {
   if (IsUtf8(bytes)) {
     return std::string(bytes);
   }
   std::string text;
   for (char letter : bytes) {
-    unsigned character = static_cast<unsigned char>(letter);
-    if (character >= 0x80 && character < 0xa0) {
-      character = WESTERN.at(character - 0x80);
-    }
-    AppendUtf8(character == 0 ? ' ' : character, text);
+    AppendUtf8(letter == '\0' ? ' ' : FromWestern(static_cast<uint8_t>(letter)), text);
   }
   return text;
 }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// What the readers of sound, film and pictures share: bytes of a file, texts and clocks in tags.
+// What the readers of sound, film and pictures share: texts and clocks in tags.
 #pragma once
 
 #include <cstdint>
@@ -9,16 +9,9 @@
 
 namespace fileindexd {
 
-// Up to `size` bytes from `offset`; fewer only at the file's end or when reading fails. Does not
-// move the descriptor's position.
-size_t ReadAt(int file, int64_t offset, char* bytes, size_t size);
-
 // Tags carry UTF-8 or, in older files, some charset of eight bits that nothing names. What is valid
 // UTF-8 stays; all else is taken for Windows' western charset, of which Latin-1 is a part.
 std::string Utf8Of(std::string_view bytes);
-
-// Of UTF-16 with the low byte first.
-std::string Utf8OfUtf16(std::string_view bytes);
 
 // Without blanks, line ends and zeros at both ends.
 std::string_view Trimmed(std::string_view text);

@@ -7,19 +7,9 @@
 #include <algorithm>
 #include <cerrno>
 
+#include "extract/read_at.h"
+
 namespace fileindexd {
-
-namespace {
-
-ssize_t ReadAt(int file, char* into, size_t count, off_t offset) {
-  ssize_t got = 0;
-  do {
-    got = pread(file, into, count, offset);
-  } while (got < 0 && errno == EINTR);
-  return got;
-}
-
-}  // namespace
 
 bool MemoryFile::Open() {
   ScopedFd made(memfd_create("member", MFD_CLOEXEC));
@@ -62,19 +52,20 @@ bool ReadWhole(const Document& document, int64_t limit, std::string& bytes, std:
     if (length == read_bytes.size()) {
       read_bytes.resize(length + STEP);
     }
-    const ssize_t got = ReadAt(document.file, read_bytes.data() + length,
-                               read_bytes.size() - length, static_cast<off_t>(length));
-    if (got < 0) {
+    const size_t room = read_bytes.size() - length;
+    const size_t got =
+        ReadAt(document.file, static_cast<int64_t>(length), read_bytes.data() + length, room);
+    if (got < room && errno != 0) {
       why = "cannot be read";
       return false;
     }
-    if (got == 0) {
-      break;
-    }
-    length += static_cast<size_t>(got);
+    length += got;
     if (static_cast<int64_t>(length) > limit) {
       why = "too big";
       return false;
+    }
+    if (got < room) {
+      break;
     }
   }
   if (length == 0) {
@@ -88,8 +79,7 @@ bool ReadWhole(const Document& document, int64_t limit, std::string& bytes, std:
 
 std::string FirstBytes(const Document& document, size_t count) {
   std::string bytes(count, '\0');
-  const ssize_t got = ReadAt(document.file, bytes.data(), count, 0);
-  bytes.resize(got > 0 ? static_cast<size_t>(got) : 0);
+  bytes.resize(ReadAt(document.file, 0, bytes.data(), count));
   return bytes;
 }
 

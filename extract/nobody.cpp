@@ -5,18 +5,14 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <system_error>
+
+#include "extract/error_text.h"
 
 namespace fileindexd {
 
 namespace {
 
 constexpr id_t NOBODY = 65534;
-
-bool Failed(const std::string& what, std::string& error) {
-  error = what + ": " + std::generic_category().message(errno);
-  return false;
-}
 
 }  // namespace
 

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/old_office.h"
 
-#include <array>
 #include <string>
 
 #include "extract/memory_file.h"
@@ -44,14 +43,6 @@ bool ReadStreams(const OleFile& ole, const Document& document, ContentSink& sink
 }
 
 }  // namespace
-
-uint16_t FromWestern(uint8_t byte) {
-  constexpr std::array<uint16_t, 32> HIGH{
-      0x20AC, 0x81,   0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021, 0x02C6, 0x2030, 0x0160,
-      0x2039, 0x0152, 0x8D,   0x017D, 0x8F,   0x90,   0x2018, 0x2019, 0x201C, 0x201D, 0x2022,
-      0x2013, 0x2014, 0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x9D,   0x017E, 0x0178};
-  return byte >= 0x80 && byte < 0xA0 ? HIGH[byte - 0x80U] : byte;
-}
 
 bool ReadOldOffice(const Document& document, ContentSink& sink, std::string& why) {
   sink.SetKind(Kind::DOCUMENT);

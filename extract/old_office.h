@@ -20,7 +20,4 @@ bool AddWorkbookText(std::string_view workbook, ContentSink& sink, std::string& 
 bool AddSlidesText(std::string_view slides, std::string_view current_user, ContentSink& sink,
                    std::string& why);
 
-// A byte of the Western code page that these formats shorten text with.
-uint16_t FromWestern(uint8_t byte);
-
 }  // namespace fileindexd

@@ -11,10 +11,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <system_error>
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "extract/error_text.h"
 #include "extract/nobody.h"
 
 namespace fileindexd {
@@ -25,11 +25,6 @@ namespace {
 constexpr const char* SITE = "/tmp";
 
 constexpr unsigned long FIXED = MS_NOSUID | MS_NODEV;
-
-bool Failed(const std::string& what, std::string& error) {
-  error = what + ": " + std::generic_category().message(errno);
-  return false;
-}
 
 bool MakeFolders(const std::string& path) {
   for (size_t slash = path.find('/', 1); slash != std::string::npos;
@@ -122,7 +117,7 @@ bool Enter() {
 bool EnterOwnRoot(const RunTimeFiles& files, std::string& error) {
   (void)umask(S_IWGRP | S_IWOTH);  // whoever the process becomes goes through its folders
   if (!EnterNamespace(error)) {
-    return Failed("mount namespace", error);
+    return error.empty() ? Failed("mount namespace", error) : false;
   }
   if (mount("none", SITE, "tmpfs", FIXED, "mode=755,size=1m") != 0) {
     return Failed(SITE, error);

@@ -11,6 +11,7 @@
 #include "extract/gif_comment.h"
 #include "extract/media_text.h"
 #include "extract/photo_fields.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 

@@ -10,6 +10,7 @@
 #include <exiv2/xmp_exiv2.hpp>
 
 #include "extract/media_text.h"
+#include "extract/utf16.h"
 
 namespace fileindexd {
 
@@ -105,7 +106,7 @@ std::string ExifWideText(const Exiv2::ExifData& exif, const char* key) {
   }
   std::string bytes(static_cast<size_t>(datum->size()), '\0');
   (void)datum->copy(reinterpret_cast<Exiv2::byte*>(bytes.data()), Exiv2::littleEndian);
-  const std::string text = Utf8OfUtf16(bytes);
+  const std::string text = Utf16ToUtf8(bytes);
   return std::string(Trimmed(text.substr(0, text.find('\0'))));
 }
 

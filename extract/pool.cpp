@@ -6,8 +6,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <list>
-#include <system_error>
 
+#include "extract/error_text.h"
 #include "extract/slot.h"
 
 namespace fileindexd {
@@ -50,7 +50,7 @@ struct ExtractPool::Impl {
 
 std::unique_ptr<ExtractPool> ExtractPool::Open(const PoolOptions& options, std::string& error) {
   if (access(options.program.c_str(), X_OK) != 0) {
-    error = options.program + ": " + std::generic_category().message(errno);
+    (void)Failed(options.program, error);
     return nullptr;
   }
 

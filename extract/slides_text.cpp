@@ -42,14 +42,19 @@ class SlidesText {
  public:
   SlidesText(std::string_view slides, ContentSink& text_sink) : bytes(slides), sink(text_sink) {}
 
-  // False where the last edit says that it is encrypted.
+  // False where the last edit says that it is encrypted. Edits that share a directory, which none
+  // do that were saved, may not have it read again and again: all directories together are no
+  // longer than the stream.
   bool FindObjects(uint32_t edit) {
-    for (int i = 0; i < MAX_EDITS && bytes.Word(edit + 2) == RECORD_EDIT; ++i) {
+    size_t left = bytes.Size();
+    for (int i = 0; i < MAX_EDITS && left > 0 && objects.size() < MAX_OBJECTS &&
+                    bytes.Word(edit + 2) == RECORD_EDIT;
+         ++i) {
       constexpr uint32_t LENGTH_WITH_KEY = 32;
       if (bytes.Long(edit + 4) >= LENGTH_WITH_KEY && bytes.Long(edit + 36) != 0) {
         return false;
       }
-      TakeDirectory(bytes.Long(edit + 20));
+      left -= std::min(left, TakeDirectory(bytes.Long(edit + 20), left));
       const uint32_t before = bytes.Long(edit + 16);
       if (before == 0 || before >= edit) {
         break;
@@ -77,13 +82,15 @@ class SlidesText {
   }
 
  private:
-  void TakeDirectory(size_t begin) {
+  // At most `limit` bytes; returns how many were taken.
+  size_t TakeDirectory(size_t begin, size_t limit) {
     if (bytes.Word(begin + 2) != RECORD_DIRECTORY) {
-      return;
+      return 0;
     }
-    const size_t end = std::min(bytes.Size(), begin + HEADER + bytes.Long(begin + 4));
+    const size_t length = std::min<size_t>(bytes.Long(begin + 4), limit);
+    const size_t end = std::min(bytes.Size(), begin + HEADER + length);
     size_t at = begin + HEADER;
-    while (at + 4 <= end) {
+    while (at + 4 <= end && objects.size() < MAX_OBJECTS) {
       const uint32_t first = bytes.Long(at) & 0xFFFFF;
       const uint32_t count = bytes.Long(at) >> 20;
       at += 4;
@@ -92,6 +99,7 @@ class SlidesText {
         at += 4;
       }
     }
+    return at - begin;
   }
 
   void AddRecords(size_t begin, size_t end, uint16_t around, int depth) {

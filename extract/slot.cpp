@@ -7,9 +7,9 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <system_error>
 
 #include "extract/converters.h"
+#include "extract/error_text.h"
 #include "extract/format.h"
 #include "extract/helper_codes.h"
 
@@ -30,10 +30,6 @@ constexpr int LOST_HELPERS = 3;
 // times only: a helper that waits for something that never comes gets none either.
 constexpr int USED_PART = 4;
 constexpr int STARVED_TIMES = 2;
-
-std::string ErrorText() {
-  return std::generic_category().message(errno);
-}
 
 // The text of both, and of the fields those that only `converted` has.
 void Merge(Content& found, const Content& converted, size_t text_cap) {
@@ -93,7 +89,7 @@ std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
     if (status) {
       DropHelper();
       outcome = outcome ? std::move(outcome) : JudgeEnd(*status);
-    } else if (!outcome && closing && now >= grace) {
+    } else if (!outcome && is_closing && now >= grace) {
       if (has_begun) {
         outcome = Nonsense("it closed its connection");
       } else {
@@ -196,7 +192,7 @@ std::optional<ExtractOutcome> Slot::StartConverter(const std::string& name) {
   ScopedFd made(memfd_create("converted", MFD_CLOEXEC));
   std::string error;
   if (made.fd < 0 || lseek(current.file.fd, 0, SEEK_SET) != 0) {
-    return End(Result::LOST, name + ": " + ErrorText());
+    return End(Result::LOST, name + ": " + ErrorText(errno));
   }
   if (!StartChild(options.program, {CONVERT_MODE, name}, {current.file.fd, made.fd, -1}, converter,
                   error)) {
@@ -264,29 +260,42 @@ std::optional<ExtractOutcome> Slot::JudgeEnd(int status) {
 
 // On a host that is busy with other things a document may not have had the time that has passed.
 bool Slot::IsStarved() const {
-  return stage == Stage::READING && has_begun && helper.IsThere() &&
-         ProcessorTime(helper) - used_before < options.deadline / USED_PART;
+  const auto little = options.deadline / USED_PART;
+  if (stage == Stage::CONVERTING) {
+    return converter.IsThere() && ProcessorTime(converter) < little;
+  }
+  return has_begun && helper.IsThere() && ProcessorTime(helper) - used_before < little;
+}
+
+std::optional<ExtractOutcome> Slot::BeginAgain(Clock::time_point now) {
+  if (stage == Stage::CONVERTING) {
+    DropConverter();
+    deadline = now + options.deadline;
+    return StartConverter(converter_name);
+  }
+  DropHelper();
+  AllowTime(now);
+  return stage == Stage::READING ? Begin() : BeginResult();
 }
 
 std::optional<ExtractOutcome> Slot::Overdue(Clock::time_point now) {
   if (IsStarved() && ++lost_helpers <= STARVED_TIMES) {
-    DropHelper();
-    AllowTime(now);
-    return Begin();
+    return BeginAgain(now);
   }
 
   const long long limit = options.deadline.count();
   const std::string took = limit % 1000 == 0
                                ? "took longer than " + std::to_string(limit / 1000) + " s"
                                : "took longer than " + std::to_string(limit) + " ms";
-  if (stage != Stage::CONVERTING) {
-    DropHelper();
-  }
-  if (stage != Stage::READING) {
+  if (stage == Stage::CONVERTING) {
     return End(Result::FAILED, converter_name + ": " + took);
   }
-  return has_begun ? End(Result::KILLED, took)
-                   : End(Result::LOST, options.program + ": does not start in time");
+  DropHelper();
+  if (!has_begun) {
+    return End(Result::LOST, options.program + ": does not start in time");
+  }
+  return stage == Stage::READING ? End(Result::KILLED, took)
+                                 : End(Result::FAILED, converter_name + ": " + took);
 }
 
 std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
@@ -295,6 +304,13 @@ std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
     return std::nullopt;
   }
   return End(has_begun ? Result::KILLED : Result::LOST, "the helper talked nonsense: " + what);
+}
+
+void Slot::DropConverter() {
+  Kill(converter);
+  if (converter.IsThere()) {
+    dying.emplace_back().Swap(converter);
+  }
 }
 
 ExtractOutcome Slot::End(Result how, const std::string& reason) {
@@ -306,10 +322,7 @@ ExtractOutcome Slot::End(Result how, const std::string& reason) {
     outcome.content = std::move(found);
   }
 
-  Kill(converter);
-  if (converter.IsThere()) {
-    dying.emplace_back().Swap(converter);
-  }
+  DropConverter();
   found = Content();
   result.Close();
   current.file.Close();
@@ -329,7 +342,7 @@ void Slot::Clear() {
 
 Slot::Clock::time_point Slot::Due() const {
   Clock::time_point due = HasJob() ? deadline : Clock::time_point::max();
-  return closing ? std::min(due, grace) : due;
+  return is_closing ? std::min(due, grace) : due;
 }
 
 }  // namespace fileindexd

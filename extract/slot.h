@@ -32,7 +32,7 @@ class Slot {
   Slot(const PoolOptions& pool_options, std::string& pool_left_out, std::list<Child>& pool_dying)
       : options(pool_options), left_out(pool_left_out), dying(pool_dying) {}
 
-  bool IsFree() const { return stage == Stage::IDLE && !closing; }
+  bool IsFree() const { return stage == Stage::IDLE && !is_closing; }
   bool HasJob() const { return stage != Stage::IDLE; }
   // Only while free. An outcome at once where no helper can be had.
   std::optional<ExtractOutcome> Give(ExtractJob&& job, Clock::time_point now);
@@ -47,8 +47,12 @@ class Slot {
   enum class Stage { IDLE, READING, CONVERTING, READING_RESULT };
 
   bool Start(std::string& error);
+  // The file, from its beginning, to the helper that is there. False, with errno, on failure:
+  // nothing has gone out.
   bool Send(int file, const std::string& name);
-  // To a helper that is there or is started.
+  // The same to a helper that is there or is started; it has not begun then. True also where a new
+  // one ended at once: how, is judged when its end is seen. False, and `error` then says why, where
+  // none can be had; there is none then.
   bool Hand(int file, const std::string& name, std::string& error);
   // The job's time starts anew when a helper begins it.
   void AllowTime(Clock::time_point now);
@@ -63,10 +67,13 @@ class Slot {
   std::optional<ExtractOutcome> AwaitConverter();
   std::optional<ExtractOutcome> BeginResult();
   bool IsStarved() const;
+  // The step at which its time was up.
+  std::optional<ExtractOutcome> BeginAgain(Clock::time_point now);
   std::optional<ExtractOutcome> Overdue(Clock::time_point now);
   std::optional<ExtractOutcome> Nonsense(const std::string& what);
   ExtractOutcome End(ExtractOutcome::Result result, const std::string& reason);
   void DropHelper();
+  void DropConverter();
 
   const PoolOptions& options;
   std::string& left_out;
@@ -76,7 +83,7 @@ class Slot {
   ScopedFd socket;
   std::string received;
   bool is_ready = false;    // its doors are closed
-  bool closing = false;     // its socket is closed, its end not seen yet
+  bool is_closing = false;  // its socket is closed, its end not seen yet
   Clock::time_point grace;  // until then
   unsigned jobs_done = 0;
 

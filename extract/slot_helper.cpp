@@ -5,8 +5,8 @@
 
 #include <cerrno>
 #include <cstring>
-#include <system_error>
 
+#include "extract/error_text.h"
 #include "extract/helper_codes.h"
 #include "extract/slot.h"
 
@@ -16,10 +16,6 @@ namespace {
 
 // A process that ends closes its socket a moment before it is seen to have ended.
 constexpr std::chrono::seconds GRACE(2);
-
-std::string ErrorText() {
-  return std::generic_category().message(errno);
-}
 
 }  // namespace
 
@@ -37,7 +33,7 @@ bool Slot::Hand(int file, const std::string& name, std::string& error) {
   if (is_gone && !is_old) {
     return true;  // its end will be judged
   }
-  error = "helper: " + ErrorText();
+  error = "helper: " + ErrorText(errno);
   DropHelper();
   // One that ended while it had nothing to do has nothing to do with this file.
   return is_gone && Hand(file, name, error);
@@ -46,7 +42,7 @@ bool Slot::Hand(int file, const std::string& name, std::string& error) {
 bool Slot::Start(std::string& error) {
   int ends[2] = {-1, -1};
   if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
-    error = "socket: " + ErrorText();
+    error = "socket: " + ErrorText(errno);
     return false;
   }
 
@@ -58,7 +54,7 @@ bool Slot::Start(std::string& error) {
   socket.Swap(ours);
   received.clear();
   is_ready = false;
-  closing = false;
+  is_closing = false;
   jobs_done = 0;
   return true;
 }
@@ -89,13 +85,13 @@ bool Slot::Send(int file, const std::string& name) {
 void Slot::Receive(Clock::time_point now) {
   char buffer[64 * 1024];
   const size_t most = MaxFrame(options.text_cap) + 1;
-  while (!closing && socket.fd >= 0 && received.size() < most) {
+  while (!is_closing && socket.fd >= 0 && received.size() < most) {
     const ssize_t length = recv(socket.fd, buffer, sizeof(buffer), MSG_DONTWAIT);
     if (length < 0 && (errno == EAGAIN || errno == EINTR)) {
       return;
     }
     if (length <= 0) {
-      closing = true;
+      is_closing = true;
       grace = now + GRACE;
       return;
     }
@@ -110,13 +106,13 @@ void Slot::DropHelper() {
   }
   socket.Close();
   received.clear();
-  closing = false;
+  is_closing = false;
 }
 
 void Slot::AddPolled(std::vector<pollfd>& polled) const {
   if (helper.IsThere()) {
     polled.push_back({helper.pid_fd.fd, POLLIN, 0});
-    if (!closing) {
+    if (!is_closing) {
       polled.push_back({socket.fd, POLLIN, 0});
     }
   }

@@ -8,8 +8,8 @@
 
 #include <cerrno>
 #include <memory>
-#include <system_error>
 
+#include "extract/error_text.h"
 #include "extract/sanitized.h"
 
 namespace fileindexd {
@@ -104,9 +104,11 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
     filter.Allow("openat", SCMP_A2(SCMP_CMP_MASKED_EQ, WRITING, 0));
     filter.Allow("open", SCMP_A1(SCMP_CMP_MASKED_EQ, WRITING, 0));
   } else {
-    // The C library looks at descriptors through this one, with this flag and an empty path. Other
-    // attributes can be asked for so, as behind Landlock: a filter cannot see the path.
+    // The C library looks at descriptors through one of these, with this flag and an empty path.
+    // Other attributes can be asked for so, as behind Landlock: a filter cannot see the path.
     filter.Allow("newfstatat", SCMP_A3(SCMP_CMP_MASKED_EQ, AT_EMPTY_PATH, AT_EMPTY_PATH));
+    filter.Allow("fstatat64", SCMP_A3(SCMP_CMP_MASKED_EQ, AT_EMPTY_PATH, AT_EMPTY_PATH));
+    filter.Allow("statx", SCMP_A2(SCMP_CMP_MASKED_EQ, AT_EMPTY_PATH, AT_EMPTY_PATH));
   }
   // Its own limits can be asked for; of them processor time alone is set anew, for each file.
   filter.Allow("prlimit64", SCMP_A0(SCMP_CMP_EQ, 0), SCMP_A2(SCMP_CMP_EQ, 0));
@@ -126,7 +128,7 @@ bool LimitSystemCalls(const SystemCalls& calls, std::string& error) {
 
   const int failure = filter.Load();
   if (failure != 0) {
-    error = "system calls: " + std::generic_category().message(-failure);
+    error = "system calls: " + ErrorText(-failure);
   }
   return failure == 0;
 }

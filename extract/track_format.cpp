@@ -4,6 +4,7 @@
 #include <string>
 
 #include "extract/media_text.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 

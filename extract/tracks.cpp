@@ -7,6 +7,7 @@
 
 #include "base/utf8.h"
 #include "extract/media_text.h"
+#include "extract/read_at.h"
 #include "extract/track_format.h"
 #include "extract/utf16.h"
 

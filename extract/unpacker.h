@@ -13,7 +13,6 @@
 #include "extract/nested.h"
 
 struct archive;
-struct archive_entry;
 
 namespace fileindexd {
 

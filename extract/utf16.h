@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// UTF-16 as file formats store it, to UTF-8.
+// UTF-16 as file formats store it, or shorten it to a byte a letter, to UTF-8.
 #pragma once
 
 #include <cstdint>
@@ -20,6 +20,10 @@ class Utf16Joiner {
  private:
   uint16_t high = 0;
 };
+
+// The letter of a byte in Windows' western code page, of which Latin-1 is a part; a control where
+// that has none.
+uint16_t FromWestern(uint8_t byte);
 
 // Little-endian bytes; an odd last byte is left out.
 std::string Utf16ToUtf8(std::string_view bytes);

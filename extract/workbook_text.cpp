@@ -8,6 +8,7 @@
 #include <charconv>
 #include <cmath>
 #include <cstring>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -41,7 +42,8 @@ enum RecordType : uint16_t {
 // The bytes of a record and of what continues it.
 class Pieces {
  public:
-  explicit Pieces(std::vector<std::string_view> views) : pieces(std::move(views)) {}
+  // The views outlive it.
+  explicit Pieces(std::span<const std::string_view> views) : pieces(views) {}
 
   bool IsAtEnd() { return !Settle(); }
 
@@ -98,7 +100,7 @@ class Pieces {
     return index < pieces.size();
   }
 
-  std::vector<std::string_view> pieces;
+  std::span<const std::string_view> pieces;
   size_t index = 0;
   size_t at = 0;
 };
@@ -138,10 +140,15 @@ class WorkbookText {
       why = "damaged";
       return false;
     }
+    // A record is four bytes at least: a look at the clock costs more than most of them.
+    constexpr unsigned RECORDS_PER_LOOK = 1000;
     size_t at = 0;
-    while (at + 4 <= bytes.Size() && !sink.IsFull() && !allowance.IsSpent()) {
+    for (unsigned record = 0; at + 4 <= bytes.Size() && !sink.IsFull(); ++record) {
+      if (record % RECORDS_PER_LOOK == 0 && allowance.IsSpent()) {
+        break;
+      }
       const uint16_t type = bytes.Word(at);
-      std::vector<std::string_view> views{TakePiece(at)};
+      views.assign(1, TakePiece(at));
       while (type != RECORD_CONTINUE && bytes.Word(at) == RECORD_CONTINUE) {
         views.push_back(TakePiece(at));
       }
@@ -149,7 +156,7 @@ class WorkbookText {
         why = "encrypted";
         return false;
       }
-      TakeRecord(type, views);
+      TakeRecord(type);
     }
     return true;
   }
@@ -190,25 +197,24 @@ class WorkbookText {
   }
 
   // A box of text or a note: its letters stand in the record's continuation.
-  void AddBox(std::vector<std::string_view> views) {
+  void AddBox() {
     const size_t letters = LittleEndian(views.front()).Word(10);
     if (views.size() > 1 && letters > 0) {
-      views.erase(views.begin());
-      Pieces pieces(std::move(views));
+      Pieces pieces(std::span<const std::string_view>(views).subspan(1));
       const bool is_wide = (pieces.Byte() & 1) != 0;
       Add(pieces.Letters(letters, is_wide));
     }
   }
 
-  void TakeRecord(uint16_t type, const std::vector<std::string_view>& views) {
+  void TakeRecord(uint16_t type) {
     const LittleEndian record(views.front());
     Pieces pieces(views);
     switch (type) {
       case RECORD_SST:
-        AddShared(std::move(pieces));
+        AddShared(pieces);
         break;
       case RECORD_TXO:
-        AddBox(views);
+        AddBox();
         break;
       case RECORD_BOUNDSHEET:
         pieces.Skip(6);
@@ -248,6 +254,7 @@ class WorkbookText {
 
   LittleEndian bytes;
   ContentSink& sink;
+  std::vector<std::string_view> views;  // the record's, and of what continues it
 };
 
 }  // namespace

@@ -9,12 +9,15 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
+#include "base/landlock.h"
 #include "extract/choice.h"
 #include "extract/format.h"
 #include "extract/memory_file.h"
 #include "extract/pool.h"
+#include "tests/unit/extract/namespaces.h"
 
 namespace fileindexd {
 
@@ -132,12 +135,18 @@ void ExpectSameBehindDoors(const std::string& name, const std::string& bytes) {
   const Document document = file.AsDocument(name, 0);
   const Found open = ReadInTheOpen(document);
   const bool uses_files = FormatOfName(name) == Format::PDF || !open.converter.empty();
+  static const bool has_own_roots = HasOwnRoots();
+  static const bool has_any_walls = has_own_roots || LandlockVersion() >= 1;
   for (const Walls& walls : WALLS) {
+    if (!has_own_roots && walls.program == std::string_view(WITHOUT_LANDLOCK)) {
+      continue;  // the same as no walls, on this host
+    }
+    const bool has_files = walls.has_files && has_any_walls;
     SCOPED_TRACE(testing::Message() << name << " behind " << walls.what);
     ExtractPool& pool = PoolOf(walls);
     const ExtractOutcome outcome = ReadByHelper(pool, document);
-    EXPECT_EQ(pool.LeftOut().empty(), walls.has_files) << pool.LeftOut();
-    if (uses_files && !walls.has_files) {
+    EXPECT_EQ(pool.LeftOut().empty(), has_files) << pool.LeftOut();
+    if (uses_files && !has_files) {
       EXPECT_EQ(outcome.result, ExtractOutcome::Result::FAILED);
       EXPECT_TRUE(outcome.reason.starts_with("left out: ")) << outcome.reason;
     } else {

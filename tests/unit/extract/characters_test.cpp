@@ -22,7 +22,7 @@ TEST(CharactersTest, WellFormedOnesHaveTheirCodeAndLength) {
               {"\xF0\x9F\x98\x80", 0x1F600, 4},
               {"\xF4\x8F\xBF\xBD", 0x10FFFD, 4}};
   for (const auto& row : rows) {
-    const Character character = FirstCharacter(row.bytes);
+    const Utf8Character character = FirstCharacter(row.bytes);
     EXPECT_EQ(character.code, row.code) << row.bytes;
     EXPECT_EQ(character.length, row.length) << row.bytes;
     EXPECT_FALSE(character.is_cut) << row.bytes;
@@ -49,7 +49,7 @@ TEST(CharactersTest, IllFormedOnesEndWhereAnotherCanBegin) {
               {"\xFF", 1, false},
               {"\xF0\x9F\x98", 3, true}};
   for (const auto& row : rows) {
-    const Character character = FirstCharacter(row.bytes);
+    const Utf8Character character = FirstCharacter(row.bytes);
     EXPECT_EQ(character.code, U'\0') << row.bytes;
     EXPECT_EQ(character.length, row.length) << row.bytes;
     EXPECT_EQ(character.is_cut, row.is_cut) << row.bytes;

@@ -72,6 +72,41 @@ TEST(ContentSinkTest, ItIsFullOnlyWhenSomethingWasLeftOut) {
   EXPECT_EQ(sink.content.text, "abc");
 }
 
+// Whatever was tried in between, it goes on as if it had not been.
+TEST(ContentSinkTest, WhatWasTriedInVainIsForgotten) {
+  for (const char* before :
+       {"", "one two", "one two ", "one tw\xC3", "one two three four five six"}) {
+    for (const char* tried :
+         {"", "o", " other words", "\xC3", "longer than the cap takes by far"}) {
+      ContentSink plain(24);
+      ContentSink sink(24);
+      for (ContentSink* each : {&plain, &sink}) {
+        each->SetKind(Kind::DOCUMENT);
+        each->Set(ContentField::KEYWORDS, "sea");
+        each->AddText(before);
+      }
+      ContentSink::Mark mark = sink.Here();
+      sink.SetKind(Kind::PHOTO);
+      sink.Set(ContentField::KEYWORDS, "side");
+      sink.Set(ContentField::TITLE, "a title");
+      sink.Set(ContentField::YEAR, 1970);
+      sink.AddText(tried);
+      sink.converter = "catdoc";
+      sink.ReturnTo(std::move(mark));
+      for (ContentSink* each : {&plain, &sink}) {
+        each->AddText("\xA9 end");
+      }
+      EXPECT_EQ(sink.content.text, plain.content.text) << before << "|" << tried;
+      EXPECT_EQ(sink.IsFull(), plain.IsFull()) << before << "|" << tried;
+      EXPECT_EQ(sink.content.kind, Kind::DOCUMENT);
+      EXPECT_EQ(TextOf(sink, ContentField::KEYWORDS), "sea");
+      EXPECT_EQ(sink.content.texts.size(), 1u);
+      EXPECT_TRUE(sink.content.numbers.empty());
+      EXPECT_EQ(sink.converter, "");
+    }
+  }
+}
+
 TEST(ContentSinkTest, TheFirstValueOfAFieldStays) {
   ContentSink sink(10);
   sink.Set(ContentField::TITLE, "  \n ");

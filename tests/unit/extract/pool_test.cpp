@@ -28,6 +28,25 @@ class PoolTest : public PoolFixture {
     options.deadline = deadline;
     OpenPool(options);
   }
+
+  // Until a process of the pool's has stopped itself.
+  static pid_t AwaitStop() {
+    int status = 0;
+    const pid_t child = waitpid(-1, &status, WUNTRACED);
+    EXPECT_TRUE(child > 0 && WIFSTOPPED(status)) << child << " " << status;
+    return child;
+  }
+
+  // Until a converter runs beside its helper.
+  void AwaitConverter() {
+    std::vector<pollfd> polled;
+    while (polled.size() < 3) {
+      Wait(pool->Due());
+      EXPECT_TRUE(pool->Work().empty());
+      polled.clear();
+      pool->AddPolled(polled);
+    }
+  }
 };
 
 TEST_F(PoolTest, AnAnswerComesBackUnderItsId) {
@@ -77,7 +96,19 @@ TEST_F(PoolTest, WhatIsSaidBeforeTheEndCounts) {
   EXPECT_EQ(Run("count").content.text, "1");
 }
 
-TEST_F(PoolTest, ADocumentHasItsDeadline) {
+TEST_F(PoolTest, ADocumentThatUsesItsTimeIsKilledAtTheFirstDeadline) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  Submit(1, "spin");
+  const pid_t helper = AwaitStop();
+  EXPECT_TRUE(pool->Work().empty());  // takes that it has begun
+  ASSERT_EQ(kill(helper, SIGCONT), 0);
+  ASSERT_EQ(AwaitStop(), helper);  // with more time used than it has
+  const auto ended = pool->Work();
+  ASSERT_EQ(ended.size(), 1u);
+  EXPECT_EQ(Told(ended[0]), "killed: took longer than 300 ms");
+}
+
+TEST_F(PoolTest, ADocumentThatWaitsForEverIsKilledInTheEnd) {
   OpenWith(1, std::chrono::milliseconds(300));
   EXPECT_EQ(Told(Run("loop")), "killed: took longer than 300 ms");
   EXPECT_EQ(Told(Run("half")), "killed: took longer than 300 ms");
@@ -214,6 +245,62 @@ TEST_F(PoolTest, AConverterThatMakesNothingLeavesTheFields) {
   EXPECT_EQ(Told(outcome), "failed: catdoc: code 9");
   ASSERT_EQ(outcome.content.texts.size(), 1u);
   EXPECT_EQ(outcome.content.texts[0].text, "kept");
+}
+
+TEST_F(PoolTest, WhatAConverterMakesIsReadAndHowItEndsIsTold) {
+  const struct {
+    const char* document;
+    const char* told;
+    const char* text;
+  } rows[] = {{"say text some words", "done", "some words"},
+              {"say fail no words", "failed: catdoc: no words", "no words"},
+              {"say never", "lost: the helper ended before it began, with code 5", ""},
+              {"say crash", "killed: the helper ended with SIGSEGV", ""},
+              {"part text some", "failed: catdoc: code 9", "some"},
+              {"doors", "lost: catdoc: the doors cannot be closed", ""},
+              {"program", "failed: catdoc: cannot be started", ""},
+              {"killed", "done", "late"},
+              {"kill", "failed: catdoc: SIGKILL", ""}};
+  for (const auto& row : rows) {
+    const ExtractOutcome outcome = Run("convert catdoc", row.document);
+    EXPECT_EQ(Told(outcome), row.told) << row.document;
+    EXPECT_EQ(outcome.content.text, row.text) << row.document;
+  }
+}
+
+TEST_F(PoolTest, AConverterThatUsesItsTimeIsKilledAtTheFirstDeadline) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  Submit(1, "convert catdoc", "spin");
+  AwaitConverter();
+  (void)AwaitStop();  // with more time used than the document has
+  const auto ended = pool->Work();
+  ASSERT_EQ(ended.size(), 1u);
+  EXPECT_EQ(Told(ended[0]), "failed: catdoc: took longer than 300 ms");
+  EXPECT_EQ(ended[0].content.texts.size(), 1u);
+  EXPECT_EQ(Told(Run("text next")), "done");
+}
+
+TEST_F(PoolTest, AConverterThatGotNoProcessorTimeIsStartedAgain) {
+  OpenWith(1, std::chrono::milliseconds(500));
+  const ExtractOutcome outcome = Run("convert catdoc", "starve");
+  EXPECT_EQ(Told(outcome), "done");
+  EXPECT_EQ(outcome.content.text, "late");
+}
+
+TEST_F(PoolTest, AConverterThatWaitsForEverFailsInTheEnd) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  EXPECT_EQ(Told(Run("convert catdoc", "slow")), "failed: catdoc: took longer than 300 ms");
+}
+
+TEST_F(PoolTest, WhatAConverterMadeHasItsDeadline) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  EXPECT_EQ(Told(Run("convert catdoc", "say loop")), "failed: catdoc: took longer than 300 ms");
+}
+
+TEST_F(PoolTest, WhatAConverterMadeAndNoHelperBeginsIsNotTheFilesFault) {
+  OpenWith(1, std::chrono::milliseconds(300));
+  EXPECT_EQ(Told(Run("convert catdoc", "say mute")),
+            std::string("lost: ") + SCRIPTED_HELPER + ": does not start in time");
 }
 
 }  // namespace

@@ -4,22 +4,34 @@
 //   text WORDS     answers with these words          field TITLE    with a title and no text
 //   fail REASON    says that it cannot be read       convert NAME   asks for a converter
 //   crash, loop, exit, memory, close, grow, nonsense, twice, half, last  misbehaves
-//   starve         waits for ever, as long as the file is empty; adds a byte to it
-//   more           answers, and when that was taken says another word
-//   killed         is killed from outside, as long as the file is empty; adds a byte to it
-//   pid            answers with its process number   count          how many jobs it has had
-//   state          answers with what it was started with
+//   spin           stops until it is let go on, uses more than 300 ms of processor time, stops
+//   again starve         waits for ever, as long as the file is empty; adds a byte to it more
+//   answers, and when that was taken says another word killed         is killed from outside, as
+//   long as the file is empty; adds a byte to it pid            answers with its process number
+//   count          how many jobs it has had state          answers with what it was started with
 //   refuse         ends before it begins, if it had a job before
-//   never          ends before it begins
+//   never          ends before it begins           mute           never begins
+//
+// What a converter has made holds such an order itself. As a converter it does what the document
+// says:
+//
+//   say ORDER      makes that                      part ORDER      makes that, and fails
+//   doors, program says what was in its way        slow            waits for ever
+//   spin           uses more than 300 ms of processor time, and stops
+//   kill           is killed from outside
+//   killed, starve is killed, or waits for ever, once: adds a letter to the document
+//   killed?, starve?  makes an order to answer with words
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <map>
 #include <string>
 
@@ -85,23 +97,41 @@ std::string State() {
   return state;
 }
 
+[[noreturn]] void WaitForEver() {
+  while (true) {
+    pause();
+  }
+}
+
+void UseTime() {
+  const clock_t end = clock() + 4 * (CLOCKS_PER_SEC / 10);
+  while (clock() < end) {
+  }
+}
+
+std::string ContentOf(int file) {
+  char bytes[256];
+  const ssize_t length = pread(file, bytes, sizeof(bytes), 0);
+  return {bytes, static_cast<size_t>(std::max<ssize_t>(length, 0))};
+}
+
 void Misbehave(const std::string& verb, int file) {
   if (verb == "crash") {
     signal(SIGSEGV, SIG_DFL);
     raise(SIGSEGV);
   } else if (verb == "loop") {
-    while (true) {
-      pause();
-    }
+    WaitForEver();
+  } else if (verb == "spin") {
+    (void)raise(SIGSTOP);
+    UseTime();
+    (void)raise(SIGSTOP);
   } else if (verb == "exit") {
     _exit(7);
   } else if (verb == "memory") {
     _exit(EXIT_MEMORY);
   } else if (verb == "close") {
     close(HELPER_SOCKET);
-    while (true) {
-      pause();
-    }
+    WaitForEver();
   } else if (verb == "grow") {
     const std::string chunk(64 * 1024, 'x');
     Say("\xFF\xFF\xFF\x0F"s);
@@ -128,7 +158,7 @@ void Misbehave(const std::string& verb, int file) {
     }
   } else if (verb == "killed") {
     struct stat info = {};
-    // The file's own descriptor is shared: how far it stands tells how often this was tried.
+    // Every helper is given the same file: what is in it tells that this was tried before.
     if (fstat(file, &info) == 0 && info.st_size == 0) {
       (void)!write(file, "x", 1);
       raise(SIGKILL);
@@ -182,17 +212,51 @@ int Serve() {
     }
     int file = -1;
     memcpy(&file, CMSG_DATA(head), sizeof(file));
-    if (job->name == "never" || (job->name == "refuse" && count > 1)) {
+    const std::string order = job->name == "converted.txt" ? ContentOf(file) : job->name;
+    if (order == "never" || (order == "refuse" && count > 1)) {
       _exit(5);  // ends over it without having begun
+    }
+    if (order == "mute") {
+      WaitForEver();
     }
     Answer begun;
     begun.sort = Answer::Sort::BEGUN;
     Say(EncodeAnswer(begun));
-    const size_t blank = job->name.find(' ');
-    Do(job->name.substr(0, blank), blank == std::string::npos ? "" : job->name.substr(blank + 1),
-       file, count);
+    const size_t blank = order.find(' ');
+    Do(order.substr(0, blank), blank == std::string::npos ? "" : order.substr(blank + 1), file,
+       count);
     close(file);
   }
+}
+
+int Convert() {
+  const std::string order = ContentOf(STDIN_FILENO);
+  const std::string verb = order.substr(0, order.find(' '));
+  if (verb == "doors") {
+    return EXIT_DOORS;
+  }
+  if (verb == "program") {
+    return EXIT_PROGRAM;
+  }
+  if (verb == "spin") {
+    UseTime();
+    (void)raise(SIGSTOP);
+  }
+  if (verb == "killed" || verb == "starve") {
+    (void)!pwrite(STDIN_FILENO, "?", 1, static_cast<off_t>(order.size()));
+  }
+  if (verb == "kill" || verb == "killed") {
+    raise(SIGKILL);
+  }
+  if (verb == "slow" || verb == "starve") {
+    WaitForEver();
+  }
+
+  const bool is_late = verb == "killed?" || verb == "starve?";
+  const bool is_order = verb == "say" || verb == "part";
+  const std::string made = is_late ? "text late" : is_order ? order.substr(verb.size() + 1) : "";
+  (void)!write(STDOUT_FILENO, made.data(), made.size());
+  return is_late || verb == "say" ? 0 : 9;
 }
 
 }  // namespace
@@ -200,9 +264,8 @@ int Serve() {
 }  // namespace fileindexd
 
 int main(int argc, char** argv) {
-  // As a converter it has nothing to say, and takes its time about it where its name is "slow".
   if (argc > 2 && std::string(argv[1]) == fileindexd::CONVERT_MODE) {
-    return 9;
+    return fileindexd::Convert();
   }
   return fileindexd::Serve();
 }

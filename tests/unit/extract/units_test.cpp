@@ -10,6 +10,7 @@
 
 #include "base/capabilities.h"
 #include "pool_fixture.h"
+#include "tests/unit/extract/namespaces.h"
 
 namespace fileindexd {
 
@@ -91,17 +92,6 @@ TEST_F(UnitsTest, HelpersCloseTheirDoorsWithTheRightsOfTheUnits) {
     EXPECT_EQ(ReadWithin(HELPER, set, "a.rtf", "{\\rtf1\\ansi some words}"), "done: some words")
         << unit;
   }
-}
-
-// Whether everybody may have one here.
-bool HasUserNamespaces() {
-  const pid_t child = fork();
-  if (child == 0) {
-    _exit(setresuid(65534, 65534, 65534) == 0 && unshare(CLONE_NEWUSER) == 0 ? 0 : 1);
-  }
-  int status = 1;
-  EXPECT_EQ(waitpid(child, &status, 0), child);
-  return status == 0;
 }
 
 TEST_F(UnitsTest, WithoutLandlockTheyHaveAnOwnRootAllTheSame) {

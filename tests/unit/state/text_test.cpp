@@ -74,6 +74,9 @@ TEST(Utf8Test, WellFormedTextStaysAsItIs) {
     EXPECT_TRUE(IsUtf8(good)) << good;
     EXPECT_EQ(ToUtf8(good), good);
   }
+  const std::string with_zero("a\0b", 3);
+  EXPECT_TRUE(IsUtf8(with_zero));
+  EXPECT_EQ(ToUtf8(with_zero), with_zero);
 }
 
 TEST(Utf8Test, EachByteThatIsNotPartOfACharacterIsReplaced) {

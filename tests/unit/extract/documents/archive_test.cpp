@@ -233,6 +233,16 @@ TEST(ArchiveTest, ABadMemberDoesNotHideItsNeighbours) {
   EXPECT_EQ(reading.content.text, "survivor");
 }
 
+TEST(ArchiveTest, AMemberUnderAWrongNameIsReadAsWhatItIsWhateverCameBefore) {
+  const Reading reading = ReadBytes(ReadArchive, "a.zip",
+                                    Zipped({{"a.txt", "first"},
+                                            {"b.docx", Zipped({{"core.txt", "kernel"}})},
+                                            {"c.pdf", "<html><body><p>a page</p></body></html>"}}));
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.content.text, "first kernel a page");
+}
+
 TEST(ArchiveTest, OnlySoManyMembersAreRead) {
   std::vector<Member> members;
   for (int i = 0; i <= Allowance::MAX_MEMBERS; ++i) {

@@ -1,27 +1,23 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "tests/unit/extract/documents/fixture.h"
 
-#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cstdio>
-#include <cstdlib>
 #include <random>
 
 #include "extract/doors.h"
 #include "extract/memory_file.h"
 #include "extract/sanitized.h"
 #include "tests/unit/extract/behind_doors.h"
+#include "tests/unit/extract/file_bounds.h"
 
 namespace fileindexd {
 
 namespace {
 
 constexpr size_t SMALL_CAP = 64 * 1024;
-// Far more than a reader takes, of processor time, and far less than a document has.
-constexpr rlim_t SECONDS_OF_A_FILE = IS_SANITIZED ? 30 : 10;
 
 void ExpectWithinBounds(FormatReader reader, const std::string& name, const std::string& bytes) {
   Reading reading;
@@ -38,21 +34,6 @@ void ExpectWithinBounds(FormatReader reader, const std::string& name, const std:
   }
 }
 
-void Limit(__rlimit_resource resource, rlim_t most) {
-  rlimit limit = {};
-  EXPECT_EQ(getrlimit(resource, &limit), 0);
-  limit.rlim_cur = std::min(limit.rlim_max, most);
-  EXPECT_EQ(setrlimit(resource, &limit), 0);
-}
-
-// What goes on for longer ends the process.
-void AllowSeconds() {
-  rusage used = {};
-  EXPECT_EQ(getrusage(RUSAGE_SELF, &used), 0);
-  Limit(RLIMIT_CPU,
-        static_cast<rlim_t>(used.ru_utime.tv_sec + used.ru_stime.tv_sec + 1) + SECONDS_OF_A_FILE);
-}
-
 void ReadDamaged(FormatReader reader, const std::string& name, const std::string& bytes) {
   if (!IS_SANITIZED) {
     Limit(RLIMIT_AS, ADDRESS_SPACE);
@@ -61,9 +42,7 @@ void ReadDamaged(FormatReader reader, const std::string& name, const std::string
     AllowSeconds();
     ExpectWithinBounds(reader, name, bytes.substr(0, bytes.size() * tenth / 10));
   }
-  const char* scale = getenv("FILEINDEXD_TEST_SCALE");
-  const unsigned seeds = scale != nullptr && std::string(scale) == "long" ? 1000 : 20;
-  for (unsigned seed = 1; seed <= seeds; ++seed) {
+  for (unsigned seed = 1; seed <= DamageSeeds(); ++seed) {
     std::mt19937 random(seed);
     std::string damaged = bytes;
     const size_t flips = 1 + random() % 32;

@@ -200,6 +200,36 @@ TEST(OldOfficeTest, ChainsThatGoInCirclesEnd) {
           .is_good);
 }
 
+// Two texts, each in a directory of its own; the long one is named by so many edits.
+std::string PptOfEdits(int edits_of_long_one) {
+  std::string stream = PptRecord(0, 0xFA8, "near");
+  const auto far_at = static_cast<uint32_t>(stream.size());
+  stream += PptRecord(0, 0xFA8, "far");
+  const auto short_one = static_cast<uint32_t>(stream.size());
+  stream += PptRecord(0, 0x1772, Le32(0x105000) + Le32(far_at));
+  std::string entries = Le32(0xFFF00001);
+  for (int i = 0; i < 4095; ++i) {
+    entries += Le32(0);
+  }
+  const auto long_one = static_cast<uint32_t>(stream.size());
+  stream += PptRecord(0, 0x1772, entries);
+  uint32_t before = 0;
+  for (int edit = 0; edit <= edits_of_long_one; ++edit) {
+    const auto at = static_cast<uint32_t>(stream.size());
+    stream += PptRecord(0, 0xFF5,
+                        Le32(0) + Le32(0) + Le32(before) + Le32(edit == 0 ? short_one : long_one) +
+                            Le32(1) + Le32(2) + Le32(0));
+    before = at;
+  }
+  return Compound({{"PowerPoint Document", stream},
+                   {"Current User", PptRecord(0, 0xFF6, Le32(20) + Le32(0) + Le32(before))}});
+}
+
+TEST(OldOfficeTest, DirectoriesTogetherAreNoLongerThanTheStream) {
+  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.ppt", PptOfEdits(1)).content.text, "near far");
+  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.ppt", PptOfEdits(3)).content.text, "near");
+}
+
 TEST(OldOfficeTest, DamageIsSurvived) {
   ExpectSurvivesDamage(ReadOldOffice, "a.doc",
                        Doc("words \x13 CODE \x14 and\x15 more\r", u"wide\r"));

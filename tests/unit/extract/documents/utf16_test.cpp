@@ -18,6 +18,14 @@ TEST(Utf16Test, HalvesOfPairsAndHalvesOfUnitsAreLeftOut) {
             "ab");
 }
 
+TEST(Utf16Test, BytesOfTheWesternCodePageHaveTheirLetters) {
+  EXPECT_EQ(FromWestern(0x41), u'A');
+  EXPECT_EQ(FromWestern(0x80), u'\u20AC');
+  EXPECT_EQ(FromWestern(0x9F), u'\u0178');
+  EXPECT_EQ(FromWestern(0xE4), u'\u00E4');
+  EXPECT_EQ(FromWestern(0x81), 0x81);
+}
+
 TEST(Utf16Test, WhatIsNoCodePointIsReplaced) {
   std::string text;
   AppendUtf8(0x110000, text);

@@ -6,18 +6,17 @@
 // table names. What crashes is a failure.
 #include <gtest/gtest.h>
 #include <sys/mman.h>
-#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <csignal>
-#include <cstdlib>
 #include <functional>
 #include <random>
-#include <string_view>
+#include <string>
 
 #include "extract/characters.h"
+#include "tests/unit/extract/file_bounds.h"
 #include "tests/unit/extract/media/bytes.h"
 #include "tests/unit/extract/media/film_samples.h"
 #include "tests/unit/extract/media/picture_samples.h"
@@ -51,27 +50,11 @@ std::vector<Victim> Victims() {
   return victims;
 }
 
-unsigned Seeds() {
-  // NOLINTNEXTLINE(concurrency-mt-unsafe): nothing else runs
-  const char* scale = std::getenv("FILEINDEXD_TEST_SCALE");
-  return scale != nullptr && std::string_view(scale) == "long" ? 1000 : 20;
-}
-
 std::string FormatName(const testing::TestParamInfo<Victim>& info) {
   return "of_" + info.param.sample.name.substr(info.param.sample.name.rfind('.') + 1);
 }
 
-constexpr rlim_t SECONDS = 2;   // of processor time for one file
-constexpr size_t LATE_OF = 20;  // one of so many files may take more
-
-void AllowSeconds() {
-  rusage used = {};
-  ASSERT_EQ(getrusage(RUSAGE_SELF, &used), 0);
-  rlimit limit = {};
-  ASSERT_EQ(getrlimit(RLIMIT_CPU, &limit), 0);
-  limit.rlim_cur = static_cast<rlim_t>(used.ru_utime.tv_sec + used.ru_stime.tv_sec) + SECONDS;
-  ASSERT_EQ(setrlimit(RLIMIT_CPU, &limit), 0);
-}
+constexpr size_t LATE_OF = 20;  // one of so many files may take more than its time
 
 class HostileMediaTest : public testing::TestWithParam<Victim> {
  protected:
@@ -123,7 +106,7 @@ TEST_P(HostileMediaTest, CutAtEveryTenth) {
 }
 
 TEST_P(HostileMediaTest, WithBitsTurned) {
-  SurviveAll(Seeds(), [&](size_t seed) {
+  SurviveAll(DamageSeeds(), [&](size_t seed) {
     std::mt19937 random(static_cast<unsigned>(seed + 1));
     std::string bytes = GetParam().sample.bytes;
     const size_t turned = 1 + random() % 16;

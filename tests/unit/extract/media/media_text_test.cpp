@@ -44,7 +44,6 @@ TEST(MediaTextTest, TextIsMadeUtf8) {
                    "e"),
             "Grüße");
   EXPECT_EQ(Utf8Of("5 \x80"), "5 €");
-  EXPECT_EQ(Utf8OfUtf16(std::string_view("A\0\x3d\xd8\x00\xde\x00\xd8", 8)), "A😀\xef\xbf\xbd");
 }
 
 TEST(MediaTextTest, LeadingNumbersAreTaken) {
