@@ -154,7 +154,9 @@ class FullExt4AtTheStartTest(FullAtTheStart, FilesystemTest):
         image = f"{namespace.RUN}/state.image"
         with open(image, "wb") as file:
             file.truncate(16 << 20)
-        run("mkfs.ext4", "-q", "-F", "-m", "0", image)
+        # Blocks as large as a page: in smaller ones SQLite's shared memory gets only a part of its
+        # page, and whoever writes to another part of it on a full disk is killed.
+        run("mkfs.ext4", "-q", "-F", "-b", "4096", "-m", "0", image)
         os.mkdir(namespace.STATE, 0o700)
         run("mount", "-o", "loop", image, namespace.STATE)
 

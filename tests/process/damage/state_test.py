@@ -47,8 +47,8 @@ def make_full_folder(path):
 
 
 def make_pipe(path):
-    remove(path)
-    os.mkfifo(path)
+    os.mkfifo(f"{path}.pipe")
+    os.rename(f"{path}.pipe", path)  # programs make the file anew where it is missing
 
 
 def set_version(number):
