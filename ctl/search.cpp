@@ -70,6 +70,7 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
     if (named && reached) {
       question.shares.push_back(share.name);
     }
+    question.known.push_back(share.name);
   }
   return true;
 }

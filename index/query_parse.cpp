@@ -95,6 +95,14 @@ bool Parser::IsNegation() const {
          text[at + 1] != ')';
 }
 
+// Of what is not positive: the NOT that is alone.
+const QueryNode& FirstNegative(const QueryNode& node) {
+  if (node.part == Part::NOT) {
+    return node;
+  }
+  return FirstNegative(*std::find_if_not(node.below.begin(), node.below.end(), IsPositive));
+}
+
 bool Parser::Run(QueryNode& query) {
   if (text.size() > MOST_BYTES) {
     return Fail("the question is too long", MOST_BYTES);
@@ -118,7 +126,8 @@ bool Parser::Run(QueryNode& query) {
     return false;
   }
   if (!IsPositive(read)) {
-    return Fail("this says only what not to find; add what to find, as in kind:document", 0);
+    return Fail("this says only what not to find; add what to find, as in kind:document",
+                FirstNegative(read).start);
   }
   query = std::move(read);
   return true;

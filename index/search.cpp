@@ -45,17 +45,20 @@ void AskShares(const Question& question, const Asked& asked, const HitOrder& ord
 }
 
 // Names of shares in a question that are none: null, or the first of them.
-const QueryNode* UnknownShare(const QueryNode& node, const std::vector<std::string>& shares) {
+const QueryNode* UnknownShare(const QueryNode& node, const Question& question) {
+  const auto is_in = [](const std::vector<std::string>& names, const std::string& share) {
+    return std::find(names.begin(), names.end(), share) != names.end();
+  };
   for (const std::string& share :
        node.part == Part::SHARE ? node.names : std::vector<std::string>()) {
     struct stat status {};
-    const bool is_asked = std::find(shares.begin(), shares.end(), share) != shares.end();
-    if (!is_asked && stat(ShareFolder(share).c_str(), &status) != 0) {
+    if (!is_in(question.shares, share) && !is_in(question.known, share) &&
+        stat(ShareFolder(share).c_str(), &status) != 0) {
       return &node;
     }
   }
   for (const QueryNode& below : node.below) {
-    const QueryNode* unknown = UnknownShare(below, shares);
+    const QueryNode* unknown = UnknownShare(below, question);
     if (unknown != nullptr) {
       return unknown;
     }
@@ -136,7 +139,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   if (!asked.Read(question, names, error)) {
     return false;
   }
-  const QueryNode* unknown = UnknownShare(asked.tree, question.shares);
+  const QueryNode* unknown = UnknownShare(asked.tree, question);
   if (unknown != nullptr) {
     error = QueryError{"there is no such share", unknown->start}.Line(asked.text);
     return false;

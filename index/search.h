@@ -23,6 +23,7 @@ struct Question {
   std::optional<Kind> kind;
   std::string under;                // normal path, or empty: everywhere
   std::vector<std::string> shares;  // names to ask
+  std::vector<std::string> known;  // names that the text may say as well, though they are not asked
   uint64_t limit = 20;
   uint64_t offset = 0;
   // Names by their bytes, sizes and times the greatest first; equal scores the youngest first.

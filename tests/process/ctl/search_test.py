@@ -43,6 +43,14 @@ class SearchTest(IndexTest):
             ],
         )
 
+    def test_a_share_that_holds_nothing_yet_may_be_named(self):
+        os.mkdir(f"{namespace.DATA}/gamma")
+        self.ctl("share", "add", "gamma", f"{namespace.DATA}/gamma")
+
+        self.assertEqual(self.hits("share:gamma", "beach"), [])
+        self.assertEqual(self.hits("share:gamma,beta", "beach"), ["beta/beach.txt"])
+        self.ctl("search", "share:delta", "beach", code=2)
+
     def test_several_words_are_joined(self):
         self.assertEqual(self.hits("beach", "boys"), ["alpha/music/beach boys.mp3"])
         self.assertEqual(self.hits("beach boys"), ["alpha/music/beach boys.mp3"])

@@ -241,6 +241,9 @@ TEST_F(QueryAnswersTest, SharesAreNamedInQuestions) {
   EXPECT_EQ(Paths("x share:a,b").size(), 2U);
   EXPECT_EQ(Paths("share:a"), Names({"/a/x one"}));
   EXPECT_EQ(Paths("two OR share:a").size(), 2U);
+  question.known = {"a", "b", "new"};
+  EXPECT_EQ(Paths("x share:b,new"), Names({"/b/x two"}));
+  EXPECT_EQ(Paths("x share:new"), Names());
   question.text = "x share:c";
   std::string error;
   EXPECT_FALSE(Ask(question, answer, error));

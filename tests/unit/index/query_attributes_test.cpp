@@ -212,6 +212,9 @@ TEST_F(QueryAttributesTest, OptionsNarrowLikeParts) {
   EXPECT_EQ(Hits("a OR b"), Names({"d/a.jpg"}));
   EXPECT_EQ(Hits("-b"), Names({"error: this says only what not to find; add what to find, as in "
                                "kind:document (character 1, at: -b)"}));
+  EXPECT_EQ(Hits("a OR (b OR -c -d)"),
+            Names({"error: this says only what not to find; add what to find, as in kind:document "
+                   "(character 12, at: -c -d))"}));
 }
 
 }  // namespace fileindexd

@@ -247,7 +247,7 @@ TEST_F(QueryParseTest, SenselessQuestionsSayWhere) {
       {"-a", "?0"},
       {"-a -b", "?0"},
       {"NOT a", "?0"},
-      {"a OR -b", "?0"},
+      {"a OR -b", "?5"},
       {"-(a b)", "?0"},
       {"*", "?0"},
       {"a *", "?2"},
