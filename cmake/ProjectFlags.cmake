@@ -24,7 +24,7 @@ target_compile_options(project_flags INTERFACE $<$<BOOL:$<TARGET_PROPERTY:IS_TES
 
 if(FILEINDEXD_SANITIZE)
   target_compile_options(project_flags INTERFACE
-    "-fsanitize=${FILEINDEXD_SANITIZE}" -fno-sanitize-recover=all -fno-omit-frame-pointer -g
+    "-fsanitize=${FILEINDEXD_SANITIZE}" -fno-sanitize-recover=all -fno-omit-frame-pointer -g1
     $<$<NOT:$<BOOL:$<TARGET_PROPERTY:IS_TEST>>>:-O1>)
   target_link_options(project_flags INTERFACE "-fsanitize=${FILEINDEXD_SANITIZE}")
 endif()

@@ -136,6 +136,9 @@ EntryContent ContentOf(const std::string& share, const Entry& entry) {
   content.extractor = reading.extractor;
   content.tries = reading.tries;
   content.language = reader.Language();
+  if (content.state == "done" && content.extractor == 0) {
+    content.reason = "nothing is kept of a kind that is not wanted";
+  }
   return content;
 }
 

@@ -17,9 +17,9 @@ struct EntryContent {
   bool is_known = false;
   std::string problem;  // why it cannot be read; empty: it can
   std::string state;    // "waiting", "done", "failed"
-  std::string reason;   // of a failure
+  std::string reason;   // of a failure, or why nothing is kept of what was read
   Content content;
-  int64_t extractor = 0;  // version of the readers that read it last; 0: none did
+  int64_t extractor = 0;  // version of the readers of what is kept; 0: nothing is
   int64_t tries = 0;      // that ended with the death of the reader
   std::string language;   // whose word forms are found together
 };

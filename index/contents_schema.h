@@ -30,9 +30,8 @@
 //   texts     the text fields and the text, packed (see content_text.h). Rowids ascend in the order
 //             of reading: the full-text table collects changes in memory only while they do
 //   words     the same by words: a column for the text, and one for each text field. No stored
-//   copy, so
-//             deleting needs what was inserted. Made by the writer, as the share's language is
-//             among its arguments
+//             copy, so deleting needs what was inserted. Made by the writer, as the share's
+//             language is among its arguments
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
 //             failed
 //   rate      for each second with commits of the last minute: how many files were done

@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/search.h"
 
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <deque>
 #include <iterator>
@@ -15,7 +13,6 @@
 #include "index/asked_share.h"
 #include "index/entry_table.h"
 #include "index/suggestion.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 
@@ -51,9 +48,7 @@ const QueryNode* UnknownShare(const QueryNode& node, const Question& question) {
   };
   for (const std::string& share :
        node.part == Part::SHARE ? node.names : std::vector<std::string>()) {
-    struct stat status {};
-    if (!is_in(question.shares, share) && !is_in(question.known, share) &&
-        stat(ShareFolder(share).c_str(), &status) != 0) {
+    if (!is_in(question.shares, share) && !is_in(question.known, share)) {
       return &node;
     }
   }

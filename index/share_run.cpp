@@ -116,10 +116,14 @@ std::string ShareRun::BeginningsQuery() const {
   return query;
 }
 
-// Where the words stand in many more names than can answer, looking at those is less than reading
-// which of all names begin so.
+// Where the words stand in many more rows than there are names that can answer, looking at those is
+// less than reading which of all names begin so.
 bool ShareRun::AreAllLookedAt() const {
+  constexpr uint64_t MOST = 2000;      // of a word that is common in texts alone
   constexpr double NAMES_OF_ONE = 64;  // are read while one row is looked at
+  if (upper.names.Count() > MOST) {
+    return false;
+  }
   double held = 0;
   for (const WordLeaf& leaf : asked.leaves) {
     held += leaf.is_positive ? sets.CountOf(leaf) : 0;

@@ -222,9 +222,14 @@ bool ShareContents::Commit() {
   return true;
 }
 
-// Only when there is nothing else to do.
+// Only when there is nothing else to do, and not where the entries need the last room: then it
+// waits for the next texts.
 bool ShareContents::Merge() {
   if (!may_merge || !IsIdle()) {
+    return true;
+  }
+  if (!HasSpace(StateRoot(), false)) {
+    may_merge = false;
     return true;
   }
   return writer.Merge(may_merge) && Commit();

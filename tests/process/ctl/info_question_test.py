@@ -68,6 +68,21 @@ class ReadingTest(InfoQuestionTest):
         self.assertIn("content state", plain)
         self.assertRegex(plain, rf"content read by +version {stored['extractor']}\n")
 
+    def test_what_is_found_to_be_of_an_unwanted_kind_says_so(self):
+        path = f"{self.root}/plain"
+        self.write(path, "a text without an ending")
+        self.ctl("folder", "set", self.root, "--document=off", "--photo=on")
+        self.ctl("reindex", self.root)
+
+        def is_read():
+            stored = self.ctl("info", path, "--json").json().get("stored")
+            return stored is not None and stored["state"] == "done"
+
+        self.await_contents(is_read)
+        stored = self.ctl("info", path, "--json").json()["stored"]
+        self.assertEqual((stored["kind"], stored["extractor"]), ("document", 0))
+        self.assertEqual(stored["reason"], "nothing is kept of a kind that is not wanted")
+        self.assertIn(b"done: nothing is kept of a kind", self.ctl("info", path).out)
 
     def stop_all(self):
         service = self.service_pid()
