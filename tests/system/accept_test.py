@@ -30,6 +30,8 @@ class Accept(FilesystemTest):
         self.unmount_disk()
         copy = f"{namespace.RUN}/copy.image"
         shutil.copyfile(self.image, copy)
+        # Another number is given only to what was checked in no earlier second than it was mounted.
+        run("e2fsck", "-f", "-p", copy)
         run("tune2fs", "-f", "-U", "random", copy)
         self.image = copy
         self.mount_disk()

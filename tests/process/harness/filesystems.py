@@ -34,7 +34,7 @@ def run(*command):
     done = subprocess.run(
         list(map(os.fsencode, command)), capture_output=True, check=False, timeout=LIMIT
     )
-    assert done.returncode == 0, f"{command}: {done.stderr!r}"
+    assert done.returncode == 0, f"{command}: {done.stderr + done.stdout!r}"
 
 
 def _is_mounted_somewhere(folder):

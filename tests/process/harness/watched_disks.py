@@ -87,7 +87,8 @@ class FuseTest(WatchedDiskTest):
             self.skipTest("no FUSE here")
         behind = f"{namespace.DATA}/behind"
         os.mkdir(behind)
-        run("bindfs", behind, self.disk)
+        # The kernel may believe for a second what it knew of a file's other names.
+        run("bindfs", "-o", "attr_timeout=0", behind, self.disk)
 
     def tearDown(self):
         super().tearDown()
