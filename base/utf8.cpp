@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "base/utf8.h"
 
+#include <algorithm>
+
 namespace fileindexd {
 
 namespace {
@@ -28,43 +30,42 @@ bool IsSecond(unsigned first, unsigned second) {
   }
 }
 
-// A zero is a character like any other.
-bool IsWrong(const Utf8Character& character, char first) {
-  return character.code == 0 && first != '\0';
-}
-
 }  // namespace
 
 Utf8Character FirstCharacter(std::string_view bytes) {
   const unsigned first = Byte(bytes, 0);
   if (first < 0x80) {
-    return {first, 1, false};
+    return {.code = first};
   }
   if (first < 0xC2 || first > 0xF4) {
-    return {};
+    return {.is_wrong = true};
   }
 
   const size_t length = first < 0xE0 ? 2 : first < 0xF0 ? 3 : 4;
   char32_t code = first & (0xFFU >> (length + 1));
   for (size_t at = 1; at < length; ++at) {
     if (at == bytes.size()) {
-      return {0, at, true};
+      return {.length = at, .is_wrong = true, .is_cut = true};
     }
     const unsigned next = Byte(bytes, at);
     if (at == 1 ? !IsSecond(first, next) : (next & 0xC0U) != 0x80) {
-      return {0, at, false};
+      return {.length = at, .is_wrong = true};
     }
     code = code << 6 | (next & 0x3FU);
   }
-  return {code, length, false};
+  return {.code = code, .length = length};
 }
 
 std::string ToUtf8(std::string_view bytes) {
+  // As most names are.
+  if (std::all_of(bytes.begin(), bytes.end(), [](char c) { return (c & 0x80) == 0; })) {
+    return std::string(bytes);
+  }
   std::string text;
   text.reserve(bytes.size());
   while (!bytes.empty()) {
     const Utf8Character character = FirstCharacter(bytes);
-    if (IsWrong(character, bytes[0])) {
+    if (character.is_wrong) {
       for (size_t at = 0; at < character.length; ++at) {
         text += REPLACEMENT;
       }
@@ -79,12 +80,34 @@ std::string ToUtf8(std::string_view bytes) {
 bool IsUtf8(std::string_view bytes) {
   while (!bytes.empty()) {
     const Utf8Character character = FirstCharacter(bytes);
-    if (IsWrong(character, bytes[0])) {
+    if (character.is_wrong) {
       return false;
     }
     bytes.remove_prefix(character.length);
   }
   return true;
+}
+
+void AppendUtf8(char32_t code, std::string& text) {
+  if (code > 0x10FFFF || (code >= 0xD800 && code < 0xE000)) {
+    code = 0xFFFD;
+  }
+  if (code < 0x80) {
+    text += static_cast<char>(code);
+    return;
+  }
+  const auto tail = [&](int shift) { text += static_cast<char>(0x80 | ((code >> shift) & 0x3F)); };
+  if (code < 0x800) {
+    text += static_cast<char>(0xC0 | (code >> 6));
+  } else if (code < 0x10000) {
+    text += static_cast<char>(0xE0 | (code >> 12));
+    tail(6);
+  } else {
+    text += static_cast<char>(0xF0 | (code >> 18));
+    tail(12);
+    tail(6);
+  }
+  tail(0);
 }
 
 }  // namespace fileindexd

@@ -37,7 +37,8 @@ const DatabaseForm BARE_FORM = {
     .application = BARE_APPLICATION,
     .version = 1,
     .schema = BARE_SCHEMA,
-    .probe = "SELECT count(*) FROM entries WHERE id < 0",
+    .probe = "count(*)",
+    .probed = "entries WHERE id < 0",
     .prepare = RegisterTextTokenizer,
 };
 

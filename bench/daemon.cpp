@@ -98,6 +98,10 @@ Ended RunProgram(const std::vector<std::string>& arguments, const std::string& o
     Fail("cannot wait for " + arguments[0]);
   }
   ended.peak_memory = static_cast<uint64_t>(used.ru_maxrss);
+  for (const timeval& time : {used.ru_utime, used.ru_stime}) {
+    ended.processor_time +=
+        static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
+  }
   return ended;
 }
 
@@ -195,6 +199,15 @@ void DaemonUnderTest::WaitUntilQuiet(const std::string& share) {
 
 uint64_t DaemonUnderTest::PeakMemory() {
   return StatusNumber("VmHWM:");
+}
+
+double DaemonUnderTest::ProcessorTime() {
+  clockid_t clock{};
+  timespec used{};
+  if (clock_getcpuclockid(pid, &clock) != 0 || clock_gettime(clock, &used) != 0) {
+    FailWithLog("the daemon is gone");
+  }
+  return Seconds(used);
 }
 
 uint64_t DaemonUnderTest::StatusNumber(const std::string& key) {

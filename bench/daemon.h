@@ -16,8 +16,9 @@ namespace fileindexd {
 
 // A child that has ended.
 struct Ended {
-  int status = -1;           // as waitpid gives it
-  uint64_t peak_memory = 0;  // KiB
+  int status = -1;            // as waitpid gives it
+  uint64_t peak_memory = 0;   // KiB
+  double processor_time = 0;  // seconds
 };
 Ended RunProgram(const std::vector<std::string>& arguments, const std::string& output = "");
 
@@ -41,6 +42,8 @@ class DaemonUnderTest {
   void WaitUntilQuiet(const std::string& share);
   // Highest resident memory so far, KiB.
   uint64_t PeakMemory();
+  // Seconds of processor time so far, without that of its children.
+  double ProcessorTime();
 
   [[noreturn]] void FailWithLog(const std::string& what);
 

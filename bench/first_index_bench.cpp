@@ -28,7 +28,7 @@ constexpr uint64_t MEMORY_LIMIT = 64 * 1024;  // KiB
 constexpr const char* ENDINGS[] = {"txt", "odt", "pdf", "jpg", "mp3"};
 
 struct Measured {
-  std::vector<double> seconds;
+  std::vector<Cost> costs;
   std::vector<double> memory;  // KiB
   std::vector<double> size;    // KiB on the disk
 };
@@ -89,10 +89,12 @@ void MeasureDaemon(const std::string& folder, const std::string& tree, uint64_t 
   Settle();
   DaemonUnderTest daemon(folder);
   daemon.Control({"share", "add", "tree", tree});
-  measured.seconds.push_back(TimeOf([&] {
+  const double processor = daemon.ProcessorTime();
+  const double clock = TimeOf([&] {
     daemon.Control({"folder", "add", tree});
     daemon.WaitUntilQuiet("tree");
-  }));
+  });
+  measured.costs.push_back({clock, daemon.ProcessorTime() - processor});
   measured.memory.push_back(static_cast<double>(daemon.PeakMemory()));
 
   // With its log and the log's index.
@@ -111,7 +113,7 @@ void MeasureBare(const std::string& folder, const std::string& tree, uint64_t en
   Settle();
   MakeFolder(folder);
   uint64_t put = 0;
-  measured.seconds.push_back(TimeOf([&] { put = BareIndexOf(tree, folder); }));
+  measured.costs.push_back(CostOf([&] { put = BareIndexOf(tree, folder); }));
   if (put != entries) {
     Fail("the bare engine saw another tree");
   }
@@ -131,9 +133,10 @@ void MeasureOther(const std::string& folder, const std::string& tree, Measured& 
   config.close();
 
   Ended ended;
-  measured.seconds.push_back(TimeOf([&] {
+  const double clock = TimeOf([&] {
     ended = RunProgram({"recollindex", "-c", folder}, folder + "/output");
-  }));
+  });
+  measured.costs.push_back({clock, ended.processor_time});
   if (ended.status != 0) {
     Fail("recollindex failed, see " + folder + "/output");
   }
@@ -149,17 +152,17 @@ std::string MemoryText(double kib) {
 
 void Print(const Measured& ours, const Measured& bare, const Measured& other, uint64_t files) {
   const std::string what = "first index of " + std::to_string(files) + " files";
-  PrintTimes(what + " / bare engine", Median(ours.seconds), Median(bare.seconds), 1.5);
+  PrintCosts(what + " / bare engine", MedianCost(ours.costs), MedianCost(bare.costs), 1.5);
 
   const double memory = Median(ours.memory);
   PrintRow("resident memory meanwhile / 64 MiB", MemoryText(memory), MemoryText(MEMORY_LIMIT),
            memory / static_cast<double>(MEMORY_LIMIT), 1);
 
-  if (other.seconds.empty()) {
+  if (other.costs.empty()) {
     printf("recollindex is not installed: no comparison with it\n");
     return;
   }
-  PrintTimes(what + " / recollindex", Median(ours.seconds), Median(other.seconds), 1.0 / 8);
+  PrintCosts(what + " / recollindex", MedianCost(ours.costs), MedianCost(other.costs), 1.0 / 8);
   PrintRow("resident memory / recollindex", MemoryText(memory), MemoryText(Median(other.memory)),
            memory / Median(other.memory), 1);
   PrintRow("size of the index / recollindex", MemoryText(Median(ours.size)),

@@ -18,9 +18,11 @@ constexpr uint64_t FEW = 10000;
 constexpr uint64_t SIZES[] = {100000, 500000, 1000000, 2000000};
 constexpr int PORTIONS = 5;  // measured at each size, of FEW rows each
 
-// Seconds for one of the `rows` rows, each portion below a folder of its own.
-double PortionCost(const std::string& index, const std::string& under, uint64_t rows) {
-  return TimeOf([&] { PutMadeUpRows(index, under, rows); }) / static_cast<double>(rows);
+// Of one of the `rows` rows, each portion below a folder of its own.
+Cost PortionCost(const std::string& index, const std::string& under, uint64_t rows) {
+  const Cost cost = CostOf([&] { PutMadeUpRows(index, under, rows); });
+  const auto count = static_cast<double>(rows);
+  return {cost.clock / count, cost.processor / count};
 }
 
 }  // namespace
@@ -37,17 +39,17 @@ int main(int argc, char** argv) {
   uint64_t rows = 0;
   uint64_t portion = 0;
   const auto measure = [&] {
-    std::vector<double> costs;
+    std::vector<Cost> costs;
     for (int i = 0; i < PORTIONS; ++i) {
       costs.push_back(PortionCost(index, "/share/portion-" + std::to_string(portion++), few));
       rows += few;
     }
-    return Median(costs);
+    return MedianCost(costs);
   };
 
   PutMadeUpRows(index, "/share/start", few);
   rows += few;
-  const double first = measure();
+  const Cost first = measure();
   for (const uint64_t size : SIZES) {
     const uint64_t wanted = Scaled(size, divisor, 10 * few);
     if (wanted > rows + few * PORTIONS) {
@@ -55,7 +57,7 @@ int main(int argc, char** argv) {
       PutMadeUpRows(index, "/share/between-" + std::to_string(portion++), between);
       rows += between;
     }
-    PrintTimes(
+    PrintCosts(
         "one entry more at " + std::to_string(wanted) + " / at " + std::to_string(few) + " entries",
         measure(), first, 1.3);
   }

@@ -19,6 +19,29 @@ double TimeOf(const std::function<void()>& work) {
   return Now() - begin;
 }
 
+double Seconds(const timespec& time) {
+  return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) / 1e9;
+}
+
+Cost CostOf(const std::function<void()>& work) {
+  timespec begin{};
+  timespec end{};
+  (void)clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &begin);  // cannot fail for this clock
+  const double clock = TimeOf(work);
+  (void)clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &end);
+  return {clock, Seconds(end) - Seconds(begin)};
+}
+
+Cost MedianCost(const std::vector<Cost>& costs) {
+  std::vector<double> clock;
+  std::vector<double> processor;
+  for (const Cost& cost : costs) {
+    clock.push_back(cost.clock);
+    processor.push_back(cost.processor);
+  }
+  return {Median(clock), Median(processor)};
+}
+
 double Median(std::vector<double> values) {
   std::sort(values.begin(), values.end());
   return values[(values.size() - 1) / 2];
@@ -70,6 +93,11 @@ void PrintRow(const std::string& name, const std::string& ours, const std::strin
 
 void PrintTimes(const std::string& name, double ours, double reference, double target) {
   PrintRow(name, SecondsText(ours), SecondsText(reference), ours / reference, target);
+}
+
+void PrintCosts(const std::string& name, const Cost& ours, const Cost& reference, double target) {
+  PrintTimes(name, ours.clock, reference.clock, target);
+  PrintTimes("processor time of the same", ours.processor, reference.processor, target);
 }
 
 void Fail(const std::string& what) {

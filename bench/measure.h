@@ -8,6 +8,7 @@
 #pragma once
 
 #include <cstdint>
+#include <ctime>
 #include <functional>
 #include <string>
 #include <vector>
@@ -21,6 +22,18 @@ double Now();
 
 // Seconds that `work` takes.
 double TimeOf(const std::function<void()>& work);
+
+double Seconds(const timespec& time);
+
+// What a piece of work took, in seconds. What others do at the same time shows in the first alone.
+struct Cost {
+  double clock = 0;
+  double processor = 0;
+};
+
+// What `work` takes of this program's own processor time.
+Cost CostOf(const std::function<void()>& work);
+Cost MedianCost(const std::vector<Cost>& costs);
 
 // The middle one; of an even number the lower of the two in the middle. Not of none.
 double Median(std::vector<double> values);
@@ -42,6 +55,8 @@ void PrintRow(const std::string& name, const std::string& ours, const std::strin
               double ratio, double target);
 // A time against a time.
 void PrintTimes(const std::string& name, double ours, double reference, double target);
+// The same, and a row for the processor time.
+void PrintCosts(const std::string& name, const Cost& ours, const Cost& reference, double target);
 
 // Says on standard error what did not work, and ends the program with 1.
 [[noreturn]] void Fail(const std::string& what);

@@ -8,6 +8,7 @@
 
 #include <cstdio>
 #include <fstream>
+#include <optional>
 
 #include "base/event_codes.h"
 #include "bench/bare_index.h"
@@ -54,8 +55,8 @@ class FilledShare {
       Fail(error);
     }
     const double closed = Now();
-    Entry entry;
-    while (!reader.Find(path, entry)) {
+    std::optional<Entry> entry;
+    while (reader.Find(path, entry) != IndexError::NONE || !entry.has_value()) {
       if (Now() - closed > LIMIT) {
         daemon.FailWithLog("no entry for " + path);
       }

@@ -34,13 +34,14 @@ std::vector<std::filesystem::path> FilesBelow(const std::string& folder) {
 }
 
 void Submit(ExtractPool& pool, const std::filesystem::path& path, uint64_t id) {
-  ScopedFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
-  if (file.fd < 0) {
+  constexpr int FLAGS = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
+  auto file = std::make_shared<ScopedFd>(open(path.c_str(), FLAGS));
+  if (file->fd < 0) {
     Fail("cannot open " + path.string());
   }
   ExtractJob job;
   job.id = id;
-  job.file.Swap(file);
+  job.file = std::move(file);
   job.name = path.filename().string();
   pool.Submit(std::move(job));
 }

@@ -72,12 +72,12 @@ void Fill(OpTree& tree, uint64_t siblings) {
   tree.root->children.reserve(siblings + INSERTIONS);
 }
 
-struct Cost {
+struct TestCost {
   double seconds = 0;        // for each test
   uint64_t allocations = 0;  // of all insertions
 };
 
-Cost InsertionCost(uint64_t siblings) {
+TestCost InsertionCost(uint64_t siblings) {
   OpTree tree(FOLDER);
   Fill(tree, siblings);
   std::vector<std::string> paths;
@@ -142,7 +142,7 @@ int main(int argc, char** argv) {
   std::vector<double> reference;
   uint64_t of_tests = 0;
   for (int round = 0; round < ROUNDS; ++round) {
-    const Cost cost = InsertionCost(siblings);
+    const TestCost cost = InsertionCost(siblings);
     ours.push_back(cost.seconds);
     reference.push_back(ReferenceCost(siblings));
     // What an insertion beside a single sibling allocates, it allocates whatever their number.

@@ -65,16 +65,18 @@ void RemoveRows(BareEngine& engine, const std::string& path, Visit visit) {
   } while (rows.size() == SLICE);
 }
 
-double DaemonRenameTime(DaemonUnderTest& daemon, const std::string& from, const std::string& to,
-                        uint64_t files) {
+Cost DaemonRenameCost(DaemonUnderTest& daemon, const std::string& from, const std::string& to,
+                      uint64_t files) {
   std::filesystem::rename(from, to);
-  const double seconds = TimeOf([&] {
+  const double processor = daemon.ProcessorTime();
+  const double clock = TimeOf([&] {
     std::string error;
     if (!AppendToQueue("rename", {EventLine(QLIB_NOTIFY_RENAME, to, from)}, error)) {
       Fail(error);
     }
     daemon.WaitUntilQuiet("rename");
   });
+  const Cost cost = {clock, daemon.ProcessorTime() - processor};
 
   EntryReader reader;
   uint64_t there = 0;
@@ -86,12 +88,12 @@ double DaemonRenameTime(DaemonUnderTest& daemon, const std::string& from, const 
       there != files + 1 || !reader.ForEach(from, count) || there != files + 1) {
     daemon.FailWithLog("the renamed folder is not what the index holds");
   }
-  return seconds;
+  return cost;
 }
 
 // The rows of `from` go, those of `to` come, each looked at once.
-double BareRenameTime(BareEngine& engine, const std::string& from, const std::string& to) {
-  return TimeOf([&] {
+Cost BareRenameCost(BareEngine& engine, const std::string& from, const std::string& to) {
+  return CostOf([&] {
     std::vector<std::string> renamed;
     engine.Open();
     RemoveRows(engine, from,
@@ -114,20 +116,20 @@ void MeasureRename(const std::string& scratch, uint64_t files) {
   BareEngine bare(scratch + "/bare");
   bare.CommitAndClose();
 
-  std::vector<double> ours;
-  std::vector<double> reference;
+  std::vector<Cost> ours;
+  std::vector<Cost> reference;
   for (size_t round = 0; round < ROUNDS; ++round) {
     const std::string& from = names[round % 2];
     const std::string& to = names[1 - round % 2];
-    ours.push_back(DaemonRenameTime(daemon, from, to, files));
-    reference.push_back(BareRenameTime(bare, from, to));
+    ours.push_back(DaemonRenameCost(daemon, from, to, files));
+    reference.push_back(BareRenameCost(bare, from, to));
   }
-  PrintTimes("rename of a folder of " + std::to_string(files) + " files / bare engine",
-             Median(ours), Median(reference), 2);
+  PrintCosts("rename of a folder of " + std::to_string(files) + " files / bare engine",
+             MedianCost(ours), MedianCost(reference), 2);
 }
 
 struct Deletion {
-  double seconds = 0;
+  Cost cost;
   double longest = 0;  // between two slices
 };
 
@@ -139,7 +141,7 @@ Deletion WriterDeletion(StateStore& store, const std::string& gone) {
     deletion.longest = std::max(deletion.longest, now - last);
     last = now;
   };
-  deletion.seconds = TimeOf([&] {
+  deletion.cost = CostOf([&] {
     EntryWriter writer("delete", store, between);
     last = Now();
     const bool deleted = writer.Delete(gone, DeleteMode::ENTRY);
@@ -151,8 +153,8 @@ Deletion WriterDeletion(StateStore& store, const std::string& gone) {
   return deletion;
 }
 
-double BareDeletion(const std::string& index, const std::string& gone) {
-  return TimeOf([&] {
+Cost BareDeletion(const std::string& index, const std::string& gone) {
+  return CostOf([&] {
     BareEngine engine(index);
     RemoveRows(engine, gone, [](const Entry& /*row*/) {});
     engine.CommitAndClose();
@@ -170,15 +172,15 @@ void MeasureDeletion(const std::string& scratch, uint64_t rows) {
     Fail("cannot make a share");
   }
 
-  std::vector<double> ours;
+  std::vector<Cost> ours;
   std::vector<double> longest;
-  std::vector<double> reference;
+  std::vector<Cost> reference;
   for (int round = 0; round < ROUNDS; ++round) {
     std::filesystem::remove_all(IndexPath("delete"));
     std::filesystem::create_directories(ShareFolder("delete"));
     PutMadeUpRows(IndexPath("delete"), gone, rows);
     const Deletion deletion = WriterDeletion(*store, gone);
-    ours.push_back(deletion.seconds);
+    ours.push_back(deletion.cost);
     longest.push_back(deletion.longest);
 
     const std::string bare = scratch + "/bare-" + std::to_string(round);
@@ -187,7 +189,7 @@ void MeasureDeletion(const std::string& scratch, uint64_t rows) {
     std::filesystem::remove_all(bare);
   }
   const std::string what = "deletion of a subtree of " + std::to_string(rows) + " entries";
-  PrintTimes(what + " / bare", Median(ours), Median(reference), 1.5);
+  PrintCosts(what + " / bare", MedianCost(ours), MedianCost(reference), 1.5);
   PrintTimes("longest slice of it / 0.5 s", *std::max_element(longest.begin(), longest.end()),
              SLICE_LIMIT, 1);
 }

@@ -62,14 +62,16 @@ std::vector<std::string> InfoLine(const std::vector<std::string>& given) {
 Command ParseCommandLine(const std::vector<std::string>& given, Arguments& arguments, int& code) {
   Declarer declare(arguments);
   CLI::App& app = declare.app;
-  DeclareManagement(declare);
-  DeclareQuestions(declare);
-
   std::vector<std::string> line = given;
   const bool is_search = !given.empty() && given.front() == "search";
   if (is_search) {
+    DeclareSearch(declare);
     line = SearchLine(given, arguments.query);
-  } else if (!given.empty() && given.front() == "info") {
+  } else {
+    DeclareManagement(declare);
+    DeclareQuestions(declare);
+  }
+  if (!given.empty() && given.front() == "info") {
     line = InfoLine(given);
   }
 

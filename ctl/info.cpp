@@ -234,13 +234,17 @@ void PutLines(const FactLines& lines) {
 }  // namespace
 
 int Info(const Arguments& arguments) {
-  const int code = arguments.question ? CheckQuestion(*arguments.question) : EXIT_DONE;
+  Session session;
+  if (!session.Open()) {
+    return EXIT_FAILED;
+  }
+  const int code =
+      arguments.question ? CheckQuestion(*arguments.question, session.settings->shares) : EXIT_DONE;
   if (code != EXIT_DONE) {
     return code;
   }
-  Session session;
   PathFacts facts;
-  if (!session.Open() || !FindFacts(session, arguments.path, facts)) {
+  if (!FindFacts(session, arguments.path, facts)) {
     return EXIT_FAILED;
   }
   QuestionFacts question;

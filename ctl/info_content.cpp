@@ -4,81 +4,26 @@
 #include <cstdio>
 
 #include "ctl/output.h"
-#include "index/contents_reader.h"
 #include "index/kind.h"
+#include "index/query_fields.h"
 
 namespace fileindexd {
 
 namespace {
 
-const char* FieldName(ContentField field) {
+// As questions call it, so that what is shown may be asked for: but for positions, which near:
+// compares, and milliseconds.
+const char* ShownName(ContentField field) {
   switch (field) {
-    case ContentField::TITLE:
-      return "title";
-    case ContentField::AUTHOR:
-      return "author";
-    case ContentField::SUBJECT:
-      return "subject";
-    case ContentField::DESCRIPTION:
-      return "description";
-    case ContentField::KEYWORDS:
-      return "keywords";
-    case ContentField::FROM:
-      return "from";
-    case ContentField::TO:
-      return "to";
-    case ContentField::ATTACHMENTS:
-      return "attachments";
-    case ContentField::MEMBERS:
-      return "members";
-    case ContentField::ARTIST:
-      return "artist";
-    case ContentField::ALBUM:
-      return "album";
-    case ContentField::ALBUM_ARTIST:
-      return "album_artist";
-    case ContentField::GENRE:
-      return "genre";
-    case ContentField::COMPOSER:
-      return "composer";
-    case ContentField::CODECS:
-      return "codecs";
-    case ContentField::CAMERA:
-      return "camera";
-    case ContentField::LENS:
-      return "lens";
-    case ContentField::CAPTION:
-      return "caption";
-    case ContentField::PAGES:
-      return "pages";
-    case ContentField::CREATED:
-      return "created";
-    case ContentField::SENT:
-      return "sent";
-    case ContentField::TAKEN:
-      return "taken";
-    case ContentField::RECORDED:
-      return "recorded";
-    case ContentField::YEAR:
-      return "year";
-    case ContentField::TRACK:
-      return "track";
     case ContentField::DURATION:
       return "duration_ms";
-    case ContentField::BIT_RATE:
-      return "bit_rate";
-    case ContentField::WIDTH:
-      return "width";
-    case ContentField::HEIGHT:
-      return "height";
     case ContentField::LATITUDE:
       return "latitude";
     case ContentField::LONGITUDE:
       return "longitude";
-    case ContentField::RATING:
-      return "rating";
+    default:
+      return FieldName(field);
   }
-  return "";
 }
 
 bool IsTime(ContentField field) {
@@ -113,31 +58,17 @@ std::string NumberText(const NumberField& field) {
 
 EntryContent ContentOf(const std::string& share, const Entry& entry) {
   EntryContent content;
+  StoredContent& stored = content.stored;
   ContentsReader reader;
-  bool is_there = false;
   IndexError error = reader.Open(share);
-  error = error == IndexError::NONE ? reader.LookFor(entry, is_there) : error;
+  error = error == IndexError::NONE ? reader.Find(entry, stored) : error;
   if (error != IndexError::NONE && error != IndexError::PATH_NOT_FOUND) {
     content.problem = IndexErrorText(error);
     return content;
   }
   content.is_known = true;
-  if (!is_there) {
-    content.state = "waiting";
-    return content;
-  }
-  if (!reader.Find(entry, content.content, content.state, content.reason)) {
-    content.is_known = false;
-    content.problem = "cannot be read";
-    return content;
-  }
-  ContentReading reading;
-  (void)reader.FindReading(entry, reading);  // shown as none
-  content.extractor = reading.extractor;
-  content.tries = reading.tries;
-  content.language = reader.Language();
-  if (content.state == "done" && content.extractor == 0) {
-    content.reason = "nothing is kept of a kind that is not wanted";
+  if (stored.state == "done" && stored.extractor == 0) {
+    stored.reason = "nothing is kept of a kind that is not wanted";
   }
   return content;
 }
@@ -146,20 +77,21 @@ Json::Value ContentObject(const EntryContent& content) {
   if (!content.is_known) {
     return {};
   }
+  const StoredContent& stored = content.stored;
   Json::Value object(Json::objectValue);
-  object["state"] = content.state;
-  object["reason"] = content.reason;
-  object["extractor"] = static_cast<Json::Int64>(content.extractor);
-  object["tries"] = static_cast<Json::Int64>(content.tries);
-  object["kind"] = KindText(content.content.kind);
-  object["text_bytes"] = static_cast<Json::UInt64>(content.content.text.size());
-  object["cut"] = content.content.is_cut;
+  object["state"] = stored.state;
+  object["reason"] = stored.reason;
+  object["extractor"] = static_cast<Json::Int64>(stored.extractor);
+  object["tries"] = static_cast<Json::Int64>(stored.tries);
+  object["kind"] = KindText(stored.content.kind);
+  object["text_bytes"] = static_cast<Json::UInt64>(stored.content.text.size());
+  object["cut"] = stored.content.is_cut;
   Json::Value& fields = object["fields"] = Json::Value(Json::objectValue);
-  for (const TextField& field : content.content.texts) {
-    fields[FieldName(field.field)] = field.text;
+  for (const TextField& field : stored.content.texts) {
+    fields[ShownName(field.field)] = field.text;
   }
-  for (const NumberField& field : content.content.numbers) {
-    fields[FieldName(field.field)] = IsPosition(field.field)
+  for (const NumberField& field : stored.content.numbers) {
+    fields[ShownName(field.field)] = IsPosition(field.field)
                                          ? Json::Value(Degrees(field.number))
                                          : Json::Value(static_cast<Json::Int64>(field.number));
   }
@@ -173,27 +105,27 @@ std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent
   if (!content.is_known) {
     return {};
   }
+  const StoredContent& stored = content.stored;
   std::vector<std::pair<std::string, std::string>> lines;
-  lines.emplace_back("state",
-                     content.state + (content.reason.empty() ? "" : ": " + content.reason));
-  if (content.extractor != 0) {
-    lines.emplace_back("read by", "version " + std::to_string(content.extractor));
+  lines.emplace_back("state", stored.state + (stored.reason.empty() ? "" : ": " + stored.reason));
+  if (stored.extractor != 0) {
+    lines.emplace_back("read by", "version " + std::to_string(stored.extractor));
   }
-  if (content.tries != 0) {
-    lines.emplace_back("tries", std::to_string(content.tries));
+  if (stored.tries != 0) {
+    lines.emplace_back("tries", std::to_string(stored.tries));
   }
-  if (content.state == "waiting") {
+  if (stored.state == "waiting") {
     return lines;
   }
-  lines.emplace_back("kind", KindText(content.content.kind));
-  for (const TextField& field : content.content.texts) {
-    lines.emplace_back(FieldName(field.field), field.text);
+  lines.emplace_back("kind", KindText(stored.content.kind));
+  for (const TextField& field : stored.content.texts) {
+    lines.emplace_back(ShownName(field.field), field.text);
   }
-  for (const NumberField& field : content.content.numbers) {
-    lines.emplace_back(FieldName(field.field), NumberText(field));
+  for (const NumberField& field : stored.content.numbers) {
+    lines.emplace_back(ShownName(field.field), NumberText(field));
   }
-  lines.emplace_back("text", std::to_string(content.content.text.size()) + " bytes" +
-                                 (content.content.is_cut ? ", and there is more" : ""));
+  lines.emplace_back("text", std::to_string(stored.content.text.size()) + " bytes" +
+                                 (stored.content.is_cut ? ", and there is more" : ""));
   return lines;
 }
 

@@ -8,20 +8,15 @@
 #include <utility>
 #include <vector>
 
-#include "base/content.h"
+#include "index/contents_reader.h"
 #include "index/entry.h"
 
 namespace fileindexd {
 
 struct EntryContent {
   bool is_known = false;
-  std::string problem;  // why it cannot be read; empty: it can
-  std::string state;    // "waiting", "done", "failed"
-  std::string reason;   // of a failure, or why nothing is kept of what was read
-  Content content;
-  int64_t extractor = 0;  // version of the readers of what is kept; 0: nothing is
-  int64_t tries = 0;      // that ended with the death of the reader
-  std::string language;   // whose word forms are found together
+  std::string problem;   // why it cannot be read; empty: it can
+  StoredContent stored;  // a reason stands here also where nothing is kept of what was read
 };
 
 // Of an entry whose content is wanted. Known, unless it cannot be read.

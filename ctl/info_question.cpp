@@ -10,15 +10,19 @@ namespace fileindexd {
 namespace {
 
 std::vector<ContentTerm> Terms(const EntryContent& content) {
-  return content.is_known ? TermsOf(content.content, content.language) : std::vector<ContentTerm>();
+  return content.is_known ? TermsOf(content.stored.content, content.stored.language)
+                          : std::vector<ContentTerm>();
 }
 
 }  // namespace
 
-int CheckQuestion(const std::string& text) {
+int CheckQuestion(const std::string& text, const std::vector<Share>& shares) {
   Question question;
   question.text = text;
   question.limit = 0;
+  for (const Share& share : shares) {
+    question.known.push_back(share.name);
+  }
   Answer answer;  // of no share: only the question is looked at
   std::string error;
   if (!Ask(question, answer, error)) {

@@ -22,7 +22,7 @@ struct QuestionFacts {
 };
 
 // The exit code, its line written; the answer to a question that makes no sense is EXIT_USAGE.
-int CheckQuestion(const std::string& text);
+int CheckQuestion(const std::string& text, const std::vector<Share>& shares);
 void ExplainPath(const std::string& text, const PathFacts& facts, QuestionFacts& question);
 
 Json::Value QuestionObject(const QuestionFacts& question);

@@ -2,17 +2,18 @@
 // search.
 #include "index/search.h"
 
+#include <unistd.h>
+
 #include <algorithm>
 #include <chrono>
 #include <cstdint>
-#include <cstdio>
 #include <optional>
 
 #include "ctl/commands.h"
 #include "ctl/hit_output.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
-#include "ctl/terminal/cells.h"
+#include "ctl/search_notes.h"
 #include "ctl/terminal/screen.h"
 #include "ctl/values.h"
 #include "ctl/wait.h"
@@ -21,6 +22,8 @@
 namespace fileindexd {
 
 namespace {
+
+constexpr uint64_t USUAL_HITS = 20;
 
 bool ReadCount(const char* name, const std::optional<std::string>& given, uint64_t& count) {
   if (!given) {
@@ -35,6 +38,11 @@ bool ReadCount(const char* name, const std::optional<std::string>& given, uint64
 
   count = *number;
   return true;
+}
+
+bool ReadLimit(const std::optional<std::string>& given, uint64_t& limit) {
+  limit = given == "all" ? UINT64_MAX : USUAL_HITS;
+  return given == "all" || ReadCount("--limit", given, limit);
 }
 
 bool IsAboveShare(const Settings& settings, const std::string& path) {
@@ -113,16 +121,6 @@ void PutHits(const std::vector<Hit>& hits, const Arguments& arguments,
   }
 }
 
-// Where hits would stand for people; for programs beside them.
-void PutSuggestion(const std::string& suggestion, bool on_screen) {
-  const std::string line = "Did you mean: " + ShowCells(CellsOf(suggestion), false);
-  if (on_screen) {
-    (void)PutLine(line);
-  } else {
-    (void)fprintf(stderr, "%s\n", line.c_str());  // nowhere left to tell of a failure
-  }
-}
-
 SortBy SortOf(const std::optional<std::string>& given) {
   if (!given) {
     return SortBy::SCORE;
@@ -141,9 +139,6 @@ void PutAnswer(const Answer& answer, const Arguments& arguments,
   } else {
     PutHits(answer.hits, arguments, screen);
   }
-  if (answer.total == 0 && !answer.suggestion.empty()) {
-    PutSuggestion(answer.suggestion, screen.has_value());
-  }
 }
 
 }  // namespace
@@ -152,7 +147,7 @@ int Search(const Arguments& arguments) {
   Question question;
   question.text = arguments.query;
   std::chrono::seconds patience(60);
-  if (!ReadCount("--limit", arguments.limit, question.limit) ||
+  if (!ReadLimit(arguments.limit, question.limit) ||
       !ReadCount("--offset", arguments.offset, question.offset) ||
       !ReadSeconds(arguments, patience)) {
     return EXIT_USAGE;
@@ -166,9 +161,15 @@ int Search(const Arguments& arguments) {
   const bool for_people = !arguments.json && !arguments.nul_ended && !arguments.count;
   const std::optional<Screen> screen = for_people ? FindScreen() : std::nullopt;
   question.shows = arguments.json || screen.has_value();
+  // Where nobody has said how many hits and somebody looks on, it is told that there are more: one
+  // more is asked for to know it.
+  const bool tells_of_more =
+      !arguments.limit && !arguments.count && (screen.has_value() || isatty(STDERR_FILENO) == 1);
+  question.limit += tells_of_more ? 1 : 0;
 
   Session session;
-  if (!session.Open() || !ChooseShares(session, arguments, question)) {
+  const bool opened = arguments.wait ? session.Open() : session.OpenSettings();
+  if (!opened || !ChooseShares(session, arguments, question)) {
     return EXIT_FAILED;
   }
   if (arguments.wait) {
@@ -187,7 +188,15 @@ int Search(const Arguments& arguments) {
     return Fail(EXIT_USAGE, "search: %s: %s", arguments.query.c_str(), error.c_str());
   }
 
+  const bool has_more = tells_of_more && answer.hits.size() > USUAL_HITS;
+  answer.hits.resize(has_more ? USUAL_HITS : answer.hits.size());
   PutAnswer(answer, arguments, screen);
+  if (has_more) {
+    TellOfMore(USUAL_HITS, screen);
+  } else if (answer.total == 0 && answer.failures.empty() &&
+             (question.limit > 0 || question.count_all)) {
+    TellNothingFound(question, answer, screen);
+  }
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());
   }

@@ -32,10 +32,6 @@ std::string UserName(const std::string& number) {
   return user == nullptr ? number : user->pw_name;
 }
 
-bool IsOwner(const std::string& name) {
-  return name != OTHER_NAMES;
-}
-
 ShareTotals SumOf(const std::vector<ShareTotals>& shares) {
   ShareTotals sum;
   for (const ShareTotals& share : shares) {
@@ -60,8 +56,12 @@ Json::Value GroupObject(const EntryGroup& group, GroupBy by) {
   Json::Value object(Json::objectValue);
   if (by == GroupBy::FOLDER) {
     object["share"] = ToUtf8(group.share);
+  }
+  if (group.is_others) {
+    object["others"] = true;
+  } else if (by == GroupBy::FOLDER) {
     SetPath(object, group.name);
-  } else if (by == GroupBy::OWNER && IsOwner(group.name)) {
+  } else if (by == GroupBy::OWNER) {
     object["owner"] = static_cast<Json::UInt64>(std::stoul(group.name));
     SetPath(object, UserName(group.name), "name");
   } else {
@@ -161,7 +161,7 @@ struct Lines {
     std::vector<TableRow> rows;
     for (const EntryGroup& group : groups) {
       std::string name = group.name;
-      if (by == GroupBy::OWNER && IsOwner(name)) {
+      if (by == GroupBy::OWNER && !group.is_others) {
         name = UserName(name);
       } else if (by == GroupBy::EXTENSION && name.empty()) {
         name = "(none)";

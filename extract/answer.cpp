@@ -157,6 +157,10 @@ bool TakeRecord(uint8_t tag, std::string_view value, size_t text_cap, Answer& an
       return value.empty();
     case TAG_READY:
       return TakeReady(value, answer);
+    case TAG_UNREAD:
+      answer.sort = Answer::Sort::UNREAD;
+      answer.reason = value;
+      return IsReason(value);
     default:
       return IsContentField(tag) && TakeField(tag, value, content);
   }
@@ -193,6 +197,9 @@ std::string EncodeAnswer(const Answer& answer) {
     }
     case Answer::Sort::BEGUN:
       AppendRecord(body, TAG_BEGUN, "");
+      break;
+    case Answer::Sort::UNREAD:
+      AppendRecord(body, TAG_UNREAD, CleanReason(answer.reason));
       break;
     case Answer::Sort::ANSWER:
       AppendContent(body, answer);

@@ -2,12 +2,13 @@
 // What the service and its closed helper say to each other, over a stream socket.
 //
 //   service:  job*                    one at a time: the next after the answer
-//   helper:   ready (begun answer)*
+//   helper:   ready (begun (answer | unread))*
 //
 //   job     = length text-cap name    in one message, the file's descriptor with it
 //   ready   = length record           READY alone
 //   begun   = length record           BEGUN alone: it has the job, and whatever happens to it now
 //                                     may be the file's doing
+//   unread  = length record           UNREAD alone
 //   answer  = length record*          KIND and SAMPLE at least
 //   record  = tag size value
 //
@@ -30,6 +31,8 @@
 //   BEGUN          empty
 //   READY          1 byte ANSWER_VERSION, and which formats are left out: a clean line, up to
 //                  MAX_REASON bytes
+//   UNREAD         the disk did not give the file's bytes, which tells nothing about the file, and
+//                  why: a clean line, 1 to MAX_REASON bytes
 //
 // Numbers are little-endian. The helper may have been taken over by a file: whoever receives from
 // it believes nothing that is not checked here.
@@ -44,7 +47,7 @@
 
 namespace fileindexd {
 
-constexpr uint8_t ANSWER_VERSION = 1;
+constexpr uint8_t ANSWER_VERSION = 2;
 
 constexpr uint8_t TAG_TEXT = 128;
 constexpr uint8_t TAG_CUT = 129;
@@ -54,6 +57,7 @@ constexpr uint8_t TAG_CONVERTER = 132;
 constexpr uint8_t TAG_FAILED = 133;
 constexpr uint8_t TAG_BEGUN = 134;
 constexpr uint8_t TAG_READY = 135;
+constexpr uint8_t TAG_UNREAD = 136;
 
 constexpr size_t MAX_JOB_NAME = 4096;
 constexpr size_t MAX_REASON = 512;
@@ -64,10 +68,10 @@ struct JobOrder {
 };
 
 struct Answer {
-  enum class Sort { ANSWER, BEGUN, READY };
+  enum class Sort { ANSWER, BEGUN, READY, UNREAD };
 
   Sort sort = Sort::ANSWER;
-  std::string left_out;  // of READY; the rest is of ANSWER
+  std::string left_out;  // of READY; the rest is of ANSWER, the reason of UNREAD as well
   Content content;
   std::string converter;
   bool has_failed = false;

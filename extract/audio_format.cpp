@@ -52,7 +52,7 @@ constexpr EndingFormat BY_ENDING[] = {
 
 std::string HeadAt(const Document& document, int64_t offset) {
   std::string head(HEAD, '\0');
-  head.resize(ReadAt(document.file, offset, head.data(), head.size()));
+  head.resize(ReadAt(document, offset, head.data(), head.size()));
   return head;
 }
 

@@ -44,7 +44,7 @@ TagLib::ByteVector AudioStream::readBlock(unsigned long length) {
     return {};
   }
   TagLib::ByteVector bytes(static_cast<unsigned>(wanted));
-  size_t got = ReadAt(file, position, bytes.data(), static_cast<size_t>(wanted));
+  size_t got = ReadAt(document, position, bytes.data(), static_cast<size_t>(wanted));
   bytes.resize(static_cast<unsigned>(got));
   read_bytes += static_cast<int64_t>(got);
   position += static_cast<int64_t>(got);
@@ -67,7 +67,7 @@ bool AudioStream::Fill() {
   }
   block_start = std::max<int64_t>(position - BLOCK / 8, 0);
   block.resize(static_cast<size_t>(BLOCK + BLOCK / 8));
-  block.resize(ReadAt(file, block_start, block.data(), block.size()));
+  block.resize(ReadAt(document, block_start, block.data(), block.size()));
   read_bytes += static_cast<int64_t>(block.size());
   if (block_start + static_cast<int64_t>(block.size()) <= position) {
     block.clear();

@@ -7,6 +7,8 @@
 #include <cstdint>
 #include <string>
 
+#include "extract/format.h"
+
 namespace fileindexd {
 
 // The library opens by path and reads in tiny steps; this reads by descriptor and in blocks. A
@@ -14,7 +16,9 @@ namespace fileindexd {
 // bounded: beyond it the file seems to end.
 class AudioStream : public TagLib::IOStream {
  public:
-  explicit AudioStream(int opened_file, int64_t file_size) : file(opened_file), size(file_size) {}
+  // The document must outlive it.
+  explicit AudioStream(const Document& read_document)
+      : document(read_document), size(read_document.size) {}
 
   // The names are the library's.
   // NOLINTBEGIN(readability-identifier-naming)
@@ -38,7 +42,7 @@ class AudioStream : public TagLib::IOStream {
  private:
   bool Fill();
 
-  int file;      // not ours to close
+  const Document& document;
   int64_t size;  // bytes
   int64_t position = 0;
   int64_t read_bytes = 0;

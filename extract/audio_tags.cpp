@@ -155,7 +155,7 @@ void PutProperties(const TagLib::PropertyMap& properties, ContentSink& sink) {
 
 AudioTags PutAudioTags(const Document& document, ContentSink& sink) {
   SetUp();
-  AudioStream stream(document.file, document.size);
+  AudioStream stream(document);
   std::unique_ptr<TagLib::File> file = OpenAs(AudioFormatOf(document), &stream);
   AudioTags tags;
   if (file == nullptr || !file->isValid()) {

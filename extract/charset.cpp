@@ -92,7 +92,7 @@ bool IsMostlyUtf8(std::string_view bytes) {
     if (character.is_cut) {
       break;
     }
-    const bool is_bad = character.code == 0 && bytes[0] != '\0';
+    const bool is_bad = character.is_wrong;
     bad += is_bad ? 1 : 0;
     good += !is_bad && character.length > 1 ? 1 : 0;
     bytes.remove_prefix(character.length);

@@ -2,7 +2,6 @@
 #include "extract/choice.h"
 
 #include <magic.h>
-#include <unistd.h>
 
 #include <exception>
 #include <memory>
@@ -92,11 +91,6 @@ bool Read(Format format, const Document& document, ContentSink& sink, std::strin
     why = "left out: this kernel cannot confine its library";
     return false;
   }
-  if (lseek(document.file, 0, SEEK_SET) != 0) {
-    why = "cannot be read";
-    return false;
-  }
-
   sink.SetKind(reading.kind);
   bool is_read = false;
   try {
@@ -167,7 +161,7 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
     return true;
   }
   const Format seen = FormatOfContent(document);
-  if (seen == Format::NONE && named == Format::TEXT && !fault.starts_with(CANNOT_READ)) {
+  if (seen == Format::NONE && named == Format::TEXT) {
     sink.ReturnTo(std::move(begin));
     return true;  // many endings of source code name something else elsewhere
   }

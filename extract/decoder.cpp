@@ -2,7 +2,6 @@
 #include "extract/decoder.h"
 
 #include <iconv.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -10,8 +9,8 @@
 
 #include "base/utf8.h"
 #include "extract/charset.h"
-#include "extract/error_text.h"
 #include "extract/nested.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 
@@ -132,10 +131,10 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
   Decoding decoding;
   std::vector<char> chunk(CHUNK);
   // A file may be of any length without a word in it: blanks fill no text.
-  for (off_t at = 0; !allowance.IsSpent();) {
-    const ssize_t length = pread(document.file, chunk.data(), chunk.size(), at);
-    if (length < 0) {
-      why = CANNOT_READ + ErrorText(errno);
+  for (int64_t at = 0; !allowance.IsSpent();) {
+    const size_t length = ReadAt(document, at, chunk.data(), chunk.size());
+    if (length == 0 && errno != 0) {
+      why = "cannot be read";
       return false;
     }
     if (length == 0) {
@@ -143,14 +142,14 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
     }
 
     std::string text;
-    if (!decoding.Decode({chunk.data(), static_cast<size_t>(length)}, declared, text)) {
+    if (!decoding.Decode({chunk.data(), length}, declared, text)) {
       why = "not a text";
       return at > 0;
     }
     if (!take(text)) {
       return true;
     }
-    at += length;
+    at += static_cast<int64_t>(length);
   }
   return true;
 }

@@ -5,6 +5,7 @@ pkg_check_modules(EXTRACT_DOCUMENTS REQUIRED IMPORTED_TARGET
 
 add_library(extract_documents STATIC
   archive.cpp
+  document_stream.cpp
   epub.cpp
   gobject.cpp
   iso_date.cpp
@@ -28,5 +29,5 @@ target_link_libraries(extract_documents
   PUBLIC extract_answer extract_text PkgConfig::EXTRACT_DOCUMENTS
   PRIVATE extract_readers project_flags)
 check_headers(extract_documents
-  gobject.h iso_date.h little_endian.h mail_parts.h memory_file.h nested.h office_words.h
+  document_stream.h gobject.h iso_date.h little_endian.h mail_parts.h memory_file.h nested.h office_words.h
   old_office.h ole_file.h rtf_tokens.h unpacker.h utf16.h xml_part.h)

@@ -16,10 +16,13 @@
 namespace fileindexd {
 
 struct Document {
-  int file = -1;     // open for reading, at its beginning, seekable; not the reader's to close
+  int file = -1;     // open for reading, seekable; not the reader's to close
   std::string name;  // last component of its path, any bytes; a member's name in an archive
   int64_t size = 0;  // bytes
   int depth = 0;     // of archives and messages around it
+  // Gets the errno of the first of its reads that fails: the disk's fault, whatever the reader
+  // makes of it. Null: nobody asks, as for members, which lie in memory.
+  int* fault = nullptr;
 };
 
 // Takes what readers find, up to the bounds of an answer.
@@ -72,9 +75,6 @@ class ContentSink {
   bool is_apart = false;  // white space came since the last word
   std::string pending;    // begin of a character
 };
-
-// Begins the reason when it is the disk's fault and not the format's.
-constexpr const char* CANNOT_READ = "cannot be read: ";
 
 // False when the file cannot be read as that format, and `why` then says so in a few words for an
 // administrator ("damaged", "encrypted", "not a PDF file"). What was put into the sink before is

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <gmime/gmime.h>
 
+#include "extract/document_stream.h"
 #include "extract/format.h"
 #include "extract/gobject.h"
 #include "extract/mail_parts.h"
@@ -24,11 +25,11 @@ void StartLibrary() {
 
 // Parts' bytes are fetched from the file when they are wanted, so that a big attachment lies in no
 // memory before.
-GOwned<GMimeParser> ParserOf(const Document& document, GMimeFormat format) {
+GOwned<GMimeParser> ParserOf(const DocumentStream& file, int64_t size, GMimeFormat format) {
   StartLibrary();
-  const GOwned<GMimeStream> stream(g_mime_stream_fs_new(document.file));
-  g_mime_stream_fs_set_owner(GMIME_STREAM_FS(stream.get()), FALSE);
-  (void)g_mime_stream_reset(stream.get());
+  // Bounded: where the file ends is forgotten by the C library when a part is fetched.
+  const GOwned<GMimeStream> stream(g_mime_stream_file_new_with_bounds(file.stream, 0, size));
+  g_mime_stream_file_set_owner(GMIME_STREAM_FILE(stream.get()), FALSE);
   GOwned<GMimeParser> parser(g_mime_parser_new_with_stream(stream.get()));
   g_mime_parser_set_format(parser.get(), format);
   g_mime_parser_set_persist_stream(parser.get(), TRUE);
@@ -64,8 +65,13 @@ bool ReadMessage(const Document& document, ContentSink& sink, std::string& why) 
   sink.SetKind(Kind::DOCUMENT);
   const Allowance allowance;
   const bool is_marked = FirstBytes(document, 5) == MAILBOX_MARK;
+  const DocumentStream file(document);
+  if (file.HasFailed()) {
+    why = "cannot be read";
+    return false;
+  }
   const GOwned<GMimeParser> parser =
-      ParserOf(document, is_marked ? GMIME_FORMAT_MBOX : GMIME_FORMAT_MESSAGE);
+      ParserOf(file, document.size, is_marked ? GMIME_FORMAT_MBOX : GMIME_FORMAT_MESSAGE);
   const GOwned<GMimeMessage> message(g_mime_parser_construct_message(parser.get(), nullptr));
   if (!message || !HasHeaders(message.get())) {
     why = "not a message";
@@ -88,8 +94,14 @@ bool ReadMailbox(const Document& document, ContentSink& sink, std::string& why) 
     why = "not a mailbox";
     return false;
   }
-  const GOwned<GMimeParser> parser = ParserOf(document, GMIME_FORMAT_MBOX);
-  while (!sink.IsFull() && !allowance.IsSpent() && g_mime_parser_eos(parser.get()) == 0) {
+  const DocumentStream file(document);
+  if (file.HasFailed()) {
+    why = "cannot be read";
+    return false;
+  }
+  const GOwned<GMimeParser> parser = ParserOf(file, document.size, GMIME_FORMAT_MBOX);
+  while (!sink.IsFull() && !allowance.IsSpent() && !file.HasFailed() &&
+         g_mime_parser_eos(parser.get()) == 0) {
     const GOwned<GMimeMessage> message(g_mime_parser_construct_message(parser.get(), nullptr));
     if (!message) {
       why = "damaged";

@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <charconv>
 #include <clocale>
+#include <csignal>
 #include <cstdio>
 #include <cstring>
 #include <exception>
@@ -103,6 +104,13 @@ bool HoldsLittle() {
   return info.uordblks + info.hblkhd <= KEPT_MEMORY;
 }
 
+std::string UnreadFrame(int error) {
+  Answer unread;
+  unread.sort = Answer::Sort::UNREAD;
+  unread.reason = "cannot be read: " + ErrorText(error);
+  return EncodeAnswer(unread);
+}
+
 // False when this was its last file.
 bool Answered(const JobOrder& job, int file) {
   struct stat info = {};
@@ -113,15 +121,30 @@ bool Answered(const JobOrder& job, int file) {
     return SendAll(EncodeAnswer(answer));
   }
 
+  int fault = 0;
+  const Document document{file, job.name, info.st_size, 0, &fault};
   uint64_t sample = 0;
-  if (!SampleFile(file, info.st_size, sample)) {  // not that there is nothing in it
-    answer.has_failed = true;
-    answer.reason = CANNOT_READ + ErrorText(errno);
-    return SendAll(EncodeAnswer(answer));
-  }
-  const bool is_well = ReadFile({file, job.name, info.st_size, 0}, job.text_cap, answer);
+  const bool is_well = !SampleFile(document, sample) || ReadFile(document, job.text_cap, answer);
   answer.content.sample = sample;
-  return SendAll(EncodeAnswer(answer)) && is_well && HoldsLittle();
+  // Of what the disk did not give, no reader can tell the truth, even where it is content.
+  const bool is_sent = SendAll(fault != 0 ? UnreadFrame(fault) : EncodeAnswer(answer));
+  return is_sent && is_well && HoldsLittle();
+}
+
+// A page of a mapped file that cannot be had, as when reading fails.
+void TellUnreadPages() {
+  static const std::string frame = UnreadFrame(EIO);
+  struct sigaction action = {};
+  action.sa_flags = SA_SIGINFO;
+  action.sa_sigaction = [](int number, siginfo_t* info, void*) {
+    if (info->si_code != BUS_ADRERR) {  // a fault of the program's own
+      (void)signal(number, SIG_DFL);
+      return;
+    }
+    (void)SendAll(frame);
+    _exit(0);
+  };
+  (void)sigaction(SIGBUS, &action, nullptr);  // cannot fail with these
 }
 
 int Serve(int parent) {
@@ -140,6 +163,7 @@ int Serve(int parent) {
     return Complain(error, EXIT_DOORS);
   }
 
+  TellUnreadPages();
   Answer greeting;
   greeting.sort = Answer::Sort::READY;
   if (!doors.can_open_files) {

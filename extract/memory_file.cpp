@@ -34,7 +34,6 @@ bool MemoryFile::Append(std::string_view bytes) {
 }
 
 Document MemoryFile::AsDocument(const std::string& name, int depth) const {
-  (void)lseek(file.fd, 0, SEEK_SET);  // cannot fail: a file in memory is seekable
   return {file.fd, name, size, depth};
 }
 
@@ -54,7 +53,7 @@ bool ReadWhole(const Document& document, int64_t limit, std::string& bytes, std:
     }
     const size_t room = read_bytes.size() - length;
     const size_t got =
-        ReadAt(document.file, static_cast<int64_t>(length), read_bytes.data() + length, room);
+        ReadAt(document, static_cast<int64_t>(length), read_bytes.data() + length, room);
     if (got < room && errno != 0) {
       why = "cannot be read";
       return false;
@@ -79,7 +78,7 @@ bool ReadWhole(const Document& document, int64_t limit, std::string& bytes, std:
 
 std::string FirstBytes(const Document& document, size_t count) {
   std::string bytes(count, '\0');
-  bytes.resize(ReadAt(document.file, 0, bytes.data(), count));
+  bytes.resize(ReadAt(document, 0, bytes.data(), count));
   return bytes;
 }
 

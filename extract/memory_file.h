@@ -17,7 +17,7 @@ class MemoryFile {
   [[nodiscard]] bool Open();
   // False when the bytes do not fit into memory.
   [[nodiscard]] bool Append(std::string_view bytes);
-  // The file, at its beginning, as a reader takes it. Good as long as this object lives.
+  // The file as a reader takes it. Good as long as this object lives.
   Document AsDocument(const std::string& name, int depth) const;
 
   int64_t size = 0;
@@ -30,7 +30,7 @@ class MemoryFile {
 // `limit`, and `why` then says so.
 bool ReadWhole(const Document& document, int64_t limit, std::string& bytes, std::string& why);
 
-// The first bytes of a document, at most `count`, which is left at its beginning.
+// The first bytes of a document, at most `count`.
 std::string FirstBytes(const Document& document, size_t count);
 
 }  // namespace fileindexd

@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include <unistd.h>
-
+#include <cerrno>
 #include <string>
 #include <string_view>
 
@@ -8,6 +7,7 @@
 #include "extract/memory_file.h"
 #include "extract/nested.h"
 #include "extract/office_words.h"
+#include "extract/read_at.h"
 #include "extract/unpacker.h"
 #include "extract/xml_part.h"
 
@@ -141,8 +141,11 @@ class OfficeZip {
 // The form in one XML file that is not packed.
 bool ReadFlat(const Document& document, ContentSink& sink, std::string& why) {
   const Allowance allowance;
-  XmlPart part([&](char* into, size_t count) {
-    return allowance.IsSpent() ? -1 : read(document.file, into, count);
+  int64_t at = 0;
+  XmlPart part([&](char* into, size_t count) -> ssize_t {
+    const size_t got = allowance.IsSpent() ? 0 : ReadAt(document, at, into, count);
+    at += static_cast<int64_t>(got);
+    return got == 0 && (allowance.IsSpent() || errno != 0) ? -1 : static_cast<ssize_t>(got);
   });
   ReadOdfPart(part, sink);
   if (part.is_damaged) {

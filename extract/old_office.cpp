@@ -2,17 +2,29 @@
 #include "extract/old_office.h"
 
 #include <string>
+#include <vector>
 
 #include "extract/memory_file.h"
 #include "extract/ole_file.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 
 namespace {
 
+// A program does not tell what the disk did not give it: what can be had is settled here.
+void ReadThrough(const Document& document) {
+  std::vector<char> block(size_t{64} * 1024);
+  int64_t at = 0;
+  while (const size_t got = ReadAt(document, at, block.data(), block.size())) {
+    at += static_cast<int64_t>(got);
+  }
+}
+
 // A converter is given the document itself, which a member of an archive is not.
 bool LeaveTo(const char* converter, const Document& document, ContentSink& sink) {
   if (document.depth == 0) {
+    ReadThrough(document);
     sink.converter = converter;
   }
   return true;

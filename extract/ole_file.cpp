@@ -1,12 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/ole_file.h"
 
-#include <fcntl.h>
 #include <gsf/gsf.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cstdio>
 
 #include "extract/gobject.h"
 
@@ -65,19 +62,10 @@ OleFile::~OleFile() {
 
 bool OleFile::Open(const Document& document, std::string& why) {
   StartLibrary();
-  const int copy = fcntl(document.file, F_DUPFD_CLOEXEC, 0);
-  FILE* stream = copy >= 0 ? fdopen(copy, "rb") : nullptr;
-  if (stream == nullptr) {
-    if (copy >= 0) {
-      close(copy);
-    }
-    why = "cannot be read";
-    return false;
-  }
-  rewind(stream);
-  const GOwned<GsfInput> input(gsf_input_stdio_new_FILE("document", stream, FALSE));
+  file.emplace(document);
+  const GOwned<GsfInput> input(
+      file->stream == nullptr ? nullptr : gsf_input_stdio_new_FILE("document", file->stream, TRUE));
   if (!input) {
-    (void)fclose(stream);
     why = "cannot be read";
     return false;
   }

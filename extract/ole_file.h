@@ -3,8 +3,10 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 
+#include "extract/document_stream.h"
 #include "extract/format.h"
 
 struct _GsfInfile;  // NOLINT(bugprone-reserved-identifier): as the library has it
@@ -18,7 +20,7 @@ class OleFile {
   OleFile(const OleFile&) = delete;
   OleFile& operator=(const OleFile&) = delete;
 
-  // False, with `why`, where the document is no compound file.
+  // False, with `why`, where the document is no compound file. It must outlive this object.
   bool Open(const Document& document, std::string& why);
   bool Has(const char* stream) const;
   // The stream's bytes, up to MAX_STREAM of them, or up to where it is damaged; empty: there is
@@ -30,6 +32,7 @@ class OleFile {
   static constexpr size_t MAX_STREAM = 128 << 20;
 
  private:
+  std::optional<DocumentStream> file;
   _GsfInfile* infile = nullptr;  // NOLINT(bugprone-reserved-identifier): the library's own name
 };
 

@@ -37,19 +37,20 @@ constexpr int64_t MAX_PIXELS = 1 << 20;    // on a side
 constexpr size_t SMALLEST = 256;
 
 // A file's bytes, mapped: the library wants all of a raw file at once, and looks at few of its
-// pages. A file that is cut while it is read ends the helper by SIGBUS.
+// pages. A page that cannot be had, of a disk that
+// fails or a file that was cut meanwhile, ends the helper by SIGBUS (see main.cpp).
 class Mapping {
  public:
-  Mapping(int file, int64_t file_size) : size(static_cast<size_t>(file_size)) {
+  explicit Mapping(const Document& document) : size(static_cast<size_t>(document.size)) {
     if (size >= SMALLEST) {
-      bytes = mmap(nullptr, size, PROT_READ, MAP_PRIVATE, file, 0);
+      bytes = mmap(nullptr, size, PROT_READ, MAP_PRIVATE, document.file, 0);
       return;
     }
     const size_t filled = size;
     size = SMALLEST;
     bytes = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
     if (IsThere()) {
-      (void)ReadAt(file, 0, static_cast<char*>(bytes), filled);  // What is missing stays zero.
+      (void)ReadAt(document, 0, static_cast<char*>(bytes), filled);  // What is missing stays zero.
     }
   }
   ~Mapping() {
@@ -149,7 +150,7 @@ bool ReadPhoto(const Document& document, ContentSink& sink, std::string& why) {
     why = "empty";
     return false;
   }
-  const Mapping mapping(document.file, document.size);
+  const Mapping mapping(document);
   if (!mapping.IsThere()) {
     why = "too big to be mapped";
     return false;

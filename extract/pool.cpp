@@ -86,10 +86,7 @@ size_t ExtractPool::Running() const {
 }
 
 void ExtractPool::Submit(ExtractJob&& job) {
-  ExtractJob& taken = impl->waiting.emplace_back();
-  taken.id = job.id;
-  taken.name = std::move(job.name);
-  taken.file.Swap(job.file);
+  impl->waiting.push_back(std::move(job));
   impl->Assign(std::chrono::steady_clock::now());
 }
 

@@ -20,9 +20,9 @@
 namespace fileindexd {
 
 struct ExtractJob {
-  uint64_t id = 0;   // the caller's
-  ScopedFd file;     // open for reading, at its beginning
-  std::string name;  // last component of its path
+  uint64_t id = 0;                 // the caller's
+  std::shared_ptr<ScopedFd> file;  // open for reading; let go when the job has ended
+  std::string name;                // last component of its path
 };
 
 struct ExtractOutcome {
@@ -31,6 +31,7 @@ struct ExtractOutcome {
     FAILED,  // the file's fault: `reason`; `content` holds what was found before
     KILLED,  // the helper died over it: `reason`
     LOST,    // the host's fault (no process, no memory): try again later; `reason`
+    UNREAD,  // the disk's fault, which did not give the file's bytes: the same, but others go on
   };
   uint64_t id = 0;
   Result result = Result::LOST;
@@ -40,9 +41,13 @@ struct ExtractOutcome {
 
 struct PoolOptions {
   unsigned helpers = 1;
-  size_t text_cap = 1 << 20;                   // bytes of text kept of a document
-  std::chrono::milliseconds deadline{60'000};  // for one document, from when a helper has it
-  std::string program;                         // fileindex-extract's path
+  size_t text_cap = 1 << 20;  // bytes of text kept of a document
+  // For one document, from when a helper has it; then the helper is killed. One that got less than
+  // a quarter of it as processor time was held up by the host, or by the file's disk, and the
+  // document is begun again with a deadline of its own: twice at most, so that no document keeps a
+  // place among the helpers for longer than three deadlines.
+  std::chrono::milliseconds deadline{60'000};
+  std::string program;  // fileindex-extract's path
 };
 
 class ExtractPool {

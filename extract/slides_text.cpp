@@ -9,6 +9,7 @@
 #include <set>
 #include <string>
 
+#include "base/utf8.h"
 #include "extract/little_endian.h"
 #include "extract/nested.h"
 #include "extract/old_office.h"

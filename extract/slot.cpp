@@ -52,9 +52,7 @@ void Merge(Content& found, const Content& converted, size_t text_cap) {
 }  // namespace
 
 std::optional<ExtractOutcome> Slot::Give(ExtractJob&& job, Clock::time_point now) {
-  current.id = job.id;
-  current.name = std::move(job.name);
-  current.file.Swap(job.file);
+  current = std::move(job);
   lost_helpers = 0;
   AllowTime(now);
   return Begin();
@@ -70,7 +68,7 @@ std::optional<ExtractOutcome> Slot::Begin() {
   found = Content();
   converter_fault.clear();
   std::string error;
-  if (!Hand(current.file.fd, current.name, error)) {
+  if (!Hand(current.file->fd, current.name, error)) {
     return End(Result::LOST, error);
   }
   return std::nullopt;
@@ -152,6 +150,7 @@ std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
       }
       return std::nullopt;
     case Answer::Sort::ANSWER:
+    case Answer::Sort::UNREAD:
       if (!is_asked || !has_begun || !received.empty()) {
         return Nonsense("an answer that was not asked for");
       }
@@ -162,6 +161,9 @@ std::optional<ExtractOutcome> Slot::Take(Answer& answer) {
 
 std::optional<ExtractOutcome> Slot::TakeAnswer(Answer& answer) {
   ++jobs_done;
+  if (answer.sort == Answer::Sort::UNREAD) {
+    return End(Result::UNREAD, answer.reason);
+  }
   if (stage == Stage::READING_RESULT) {
     Merge(found, answer.content, options.text_cap);
     if (converter_fault.empty() && answer.has_failed) {
@@ -191,10 +193,10 @@ std::optional<ExtractOutcome> Slot::StartConverter(const std::string& name) {
   converter_name = name;
   ScopedFd made(memfd_create("converted", MFD_CLOEXEC));
   std::string error;
-  if (made.fd < 0 || lseek(current.file.fd, 0, SEEK_SET) != 0) {
+  if (made.fd < 0 || lseek(current.file->fd, 0, SEEK_SET) != 0) {
     return End(Result::LOST, name + ": " + ErrorText(errno));
   }
-  if (!StartChild(options.program, {CONVERT_MODE, name}, {current.file.fd, made.fd, -1}, converter,
+  if (!StartChild(options.program, {CONVERT_MODE, name}, {current.file->fd, made.fd, -1}, converter,
                   error)) {
     return End(Result::LOST, error);
   }
@@ -325,7 +327,7 @@ ExtractOutcome Slot::End(Result how, const std::string& reason) {
   DropConverter();
   found = Content();
   result.Close();
-  current.file.Close();
+  current.file.reset();
   stage = Stage::IDLE;
   if (jobs_done >= JOBS_OF_A_HELPER) {
     DropHelper();

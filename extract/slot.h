@@ -7,7 +7,9 @@
 //     +----------------+-------------------------------------+-----------------------+
 //
 // In each stage the helper may also die, be killed for its time, or talk nonsense: the slot is
-// empty then, and is filled again with the next job. One thread; nothing waits.
+// empty then, and is filled again with the next job. Where that was the host's doing (killed from
+// outside, ended before it began, no processor time) the same job is begun again, a few times. One
+// thread; nothing waits.
 #pragma once
 
 #include <poll.h>
@@ -66,7 +68,7 @@ class Slot {
   std::optional<ExtractOutcome> StartConverter(const std::string& name);
   std::optional<ExtractOutcome> AwaitConverter();
   std::optional<ExtractOutcome> BeginResult();
-  bool IsStarved() const;
+  bool IsStarved() const;  // see PoolOptions::deadline
   // The step at which its time was up.
   std::optional<ExtractOutcome> BeginAgain(Clock::time_point now);
   std::optional<ExtractOutcome> Overdue(Clock::time_point now);

@@ -65,7 +65,7 @@ bool IsTransportStream(std::string_view head, size_t step, size_t offset) {
 
 const char* TrackParserOf(const Document& document) {
   std::string bytes(HEAD, '\0');
-  bytes.resize(ReadAt(document.file, 0, bytes.data(), bytes.size()));
+  bytes.resize(ReadAt(document, 0, bytes.data(), bytes.size()));
   const std::string_view head = bytes;
   for (const Magic& magic : MAGICS) {
     if (head.size() > magic.offset && head.substr(magic.offset).starts_with(magic.bytes)) {

@@ -38,7 +38,7 @@ std::string Narrow(const std::wstring& wide) {
   std::string text;
   std::string bytes;
   for (wchar_t letter : wide) {
-    AppendUtf8(static_cast<uint32_t>(letter), text);
+    AppendUtf8(static_cast<char32_t>(letter), text);
     bytes += static_cast<char>(letter);
   }
   // The library takes the texts of some containers for Latin-1, which many writers fill with UTF-8.
@@ -55,7 +55,7 @@ void Feed(const Document& document, MediaInfo& parser) {
   int jumps = 0;
   (void)parser.Open_Buffer_Init(size, 0);  // A false answer is that to the first block as well.
   for (int blocks = 0; blocks < MAX_BLOCKS && read_bytes < MAX_READ; blocks++) {
-    const size_t got = ReadAt(document.file, offset, block.data(), block.size());
+    const size_t got = ReadAt(document, offset, block.data(), block.size());
     if (got == 0) {
       break;
     }

@@ -3,17 +3,18 @@
 
 #include <archive.h>
 #include <archive_entry.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <clocale>
+#include <cstdio>
+
+#include "extract/read_at.h"
 
 namespace fileindexd {
 
 namespace {
-
-constexpr size_t BLOCK = 64 * 1024;
 
 // Members' names are converted to the locale's charset; in the C locale every letter that is not
 // ASCII would be lost. The process's locale stays as it is.
@@ -73,13 +74,53 @@ bool Unpacker::UseFormats(Formats formats) {
   return true;
 }
 
+ssize_t Unpacker::ReadBlock(struct archive* packed, void* source, const void** block) {
+  auto& from = *static_cast<Source*>(source);
+  const size_t got = ReadAt(from.document, from.position, from.block.data(), BLOCK);
+  if (got == 0 && errno != 0) {
+    archive_set_error(packed, errno, "cannot be read");
+    return ARCHIVE_FATAL;
+  }
+  from.position += static_cast<int64_t>(got);
+  *block = from.block.data();
+  return static_cast<ssize_t>(got);
+}
+
+// By whole blocks, and never beyond the end.
+int64_t Unpacker::Skip(struct archive* /*packed*/, void* source, int64_t count) {
+  auto& from = *static_cast<Source*>(source);
+  constexpr auto STEP = static_cast<int64_t>(BLOCK);
+  const int64_t left = std::max<int64_t>(from.document.size - from.position, 0);
+  const int64_t skipped = std::min(count, left) / STEP * STEP;
+  from.position += skipped;
+  return skipped;
+}
+
+int64_t Unpacker::Seek(struct archive* /*packed*/, void* source, int64_t offset, int from_where) {
+  auto& from = *static_cast<Source*>(source);
+  const int64_t size = from.document.size;
+  const int64_t start = from_where == SEEK_SET ? 0 : from_where == SEEK_CUR ? from.position : size;
+  int64_t target = 0;
+  if (__builtin_add_overflow(start, offset, &target) || target < 0) {
+    return ARCHIVE_FATAL;
+  }
+  // Behind the end there is nothing, however far.
+  from.position = std::min(target, size);
+  return from.position;
+}
+
 bool Unpacker::Open(const Document& document, Formats formats, std::string& why) {
   packed = archive_read_new();
-  if (packed == nullptr || lseek(document.file, 0, SEEK_SET) != 0 || !UseFormats(formats)) {
-    why = "cannot be read";
+  if (packed == nullptr || !UseFormats(formats)) {
+    why = "cannot be unpacked";
     return false;
   }
-  if (archive_read_open_fd(packed, document.file, BLOCK) != ARCHIVE_OK) {
+  source.emplace(document);
+  (void)archive_read_set_callback_data(packed, &*source);  // these fail for no archive
+  (void)archive_read_set_read_callback(packed, ReadBlock);
+  (void)archive_read_set_skip_callback(packed, Skip);
+  (void)archive_read_set_seek_callback(packed, Seek);
+  if (archive_read_open1(packed) != ARCHIVE_OK) {
     why = formats == Formats::ZIP ? "not a ZIP file" : "not an archive";
     return false;
   }

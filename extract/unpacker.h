@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -51,11 +52,25 @@ class Unpacker {
   bool is_bare = false;    // no archive, one compressed file
 
  private:
+  // The document, as the library asks for it.
+  struct Source {
+    explicit Source(const Document& read_document) : document(read_document), block(BLOCK, '\0') {}
+    const Document& document;
+    int64_t position = 0;
+    std::string block;
+  };
+  static ssize_t ReadBlock(struct archive* packed, void* source, const void** block);
+  static int64_t Skip(struct archive* packed, void* source, int64_t count);
+  static int64_t Seek(struct archive* packed, void* source, int64_t offset, int from);
+
+  static constexpr size_t BLOCK = 64 * 1024;
+
   bool UseFormats(Formats formats);
   // The rest of the current member. False where the allowance is spent.
   bool PassOver();
 
   Allowance allowance;
+  std::optional<Source> source;
   struct archive* packed = nullptr;
   bool is_inside = false;  // there is a current member, perhaps not read to its end
   int64_t counted = 0;     // bytes that the allowance was asked for

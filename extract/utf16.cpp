@@ -3,6 +3,8 @@
 
 #include <array>
 
+#include "base/utf8.h"
+
 namespace fileindexd {
 
 uint16_t FromWestern(uint8_t byte) {
@@ -13,30 +15,6 @@ uint16_t FromWestern(uint8_t byte) {
   return byte >= 0x80 && byte < 0xA0 ? HIGH[byte - 0x80U] : byte;
 }
 
-void AppendUtf8(uint32_t code_point, std::string& text) {
-  if (code_point > 0x10FFFF || (code_point >= 0xD800 && code_point < 0xE000)) {
-    code_point = 0xFFFD;
-  }
-  if (code_point < 0x80) {
-    text += static_cast<char>(code_point);
-    return;
-  }
-  const auto tail = [&](int shift) {
-    text += static_cast<char>(0x80 | ((code_point >> shift) & 0x3F));
-  };
-  if (code_point < 0x800) {
-    text += static_cast<char>(0xC0 | (code_point >> 6));
-  } else if (code_point < 0x10000) {
-    text += static_cast<char>(0xE0 | (code_point >> 12));
-    tail(6);
-  } else {
-    text += static_cast<char>(0xF0 | (code_point >> 18));
-    tail(12);
-    tail(6);
-  }
-  tail(0);
-}
-
 void Utf16Joiner::Add(uint16_t unit, std::string& text) {
   if (unit >= 0xD800 && unit < 0xDC00) {
     high = unit;
@@ -44,7 +22,7 @@ void Utf16Joiner::Add(uint16_t unit, std::string& text) {
   }
   if (unit >= 0xDC00 && unit < 0xE000) {
     if (high != 0) {
-      AppendUtf8(0x10000 + ((uint32_t{high} - 0xD800) << 10) + (uint32_t{unit} - 0xDC00), text);
+      AppendUtf8(0x10000 + ((char32_t{high} - 0xD800) << 10) + (char32_t{unit} - 0xDC00), text);
     }
   } else {
     AppendUtf8(unit, text);

@@ -8,9 +8,6 @@
 
 namespace fileindexd {
 
-// Appends a code point; what is none becomes U+FFFD.
-void AppendUtf8(uint32_t code_point, std::string& text);
-
 // Takes code units one by one.
 class Utf16Joiner {
  public:

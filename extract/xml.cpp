@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <libxml/xmlreader.h>
-#include <unistd.h>
 
+#include <cerrno>
 #include <memory>
 #include <new>
 #include <optional>
 
 #include "extract/format.h"
+#include "extract/read_at.h"
 
 namespace fileindexd {
 
@@ -21,15 +22,15 @@ constexpr int OPTIONS =
 constexpr int DEEPEST_FIELD = 4;
 
 struct Source {
-  int file = -1;
-  off_t at = 0;
+  const Document& document;
+  int64_t at = 0;
 };
 
 int ReadSource(void* context, char* buffer, int length) {
   auto& source = *static_cast<Source*>(context);
-  const ssize_t got = pread(source.file, buffer, static_cast<size_t>(length), source.at);
-  source.at += got > 0 ? got : 0;
-  return static_cast<int>(got);
+  const size_t got = ReadAt(source.document, source.at, buffer, static_cast<size_t>(length));
+  source.at += static_cast<int64_t>(got);
+  return got == 0 && errno != 0 ? -1 : static_cast<int>(got);
 }
 
 std::string_view View(const xmlChar* text) {
@@ -141,7 +142,7 @@ class Walk {
 }  // namespace
 
 bool ReadXml(const Document& document, ContentSink& sink, std::string& why) {
-  Source source = {document.file, 0};
+  Source source = {document};
   const std::unique_ptr<xmlTextReader, decltype(&xmlFreeTextReader)> reader(
       xmlReaderForIO(ReadSource, nullptr, &source, nullptr, nullptr, OPTIONS), &xmlFreeTextReader);
   if (reader == nullptr) {

@@ -27,13 +27,14 @@ class SampleStream {
  public:
   explicit SampleStream(OpenShare& opened) : share(opened) {}
 
-  int Open() {
+  bool Open() {
     sqlite3* db = share.reader.database.db;
     Statement meta;
     code = meta.Prepare(db, "SELECT filesystem FROM contents.meta WHERE id = 1");
     code = code == SQLITE_OK ? meta.Step() : code;
     if (code != SQLITE_ROW) {
-      return code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+      code = code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+      return false;
     }
     filesystem = meta.Bytes(0);
     // State 1: done. An empty file is like any other one, and nobody wants to hear of it.
@@ -41,16 +42,20 @@ class SampleStream {
                         "SELECT size, sample, inode, birth_time, mtime FROM contents.files"
                         " WHERE state = 1 AND sample <> 0 AND size > 0"
                         " ORDER BY size DESC, sample, inode, birth_time");
-    return code == SQLITE_OK
+    code = code == SQLITE_OK
                ? path_of.Prepare(db,
                                  "SELECT path FROM entries WHERE inode = ?1 AND birth_time = ?2"
                                  " AND size = ?3 AND mtime = ?4 AND content_wanted = 1"
                                  " ORDER BY path LIMIT 1")
                : code;
+    return code == SQLITE_OK;
   }
 
   // False at the end, and after a failure.
   bool Next() {
+    if (HasFailed()) {
+      return false;
+    }
     code = rows.Step();
     if (code == SQLITE_ROW) {
       file = {rows.Int(0), rows.Int(1), rows.Int(2), rows.Int(3), rows.Int(4)};
@@ -58,21 +63,28 @@ class SampleStream {
     return code == SQLITE_ROW;
   }
 
-  // The first path of one of its files; empty where nothing is there any more.
+  // The first path of one of its files; empty where nothing is there any more, and after a failure.
   std::string PathOf(const Sampled& sampled) {
+    if (HasFailed()) {
+      return {};
+    }
     path_of.BindInt(1, sampled.inode);
     path_of.BindInt(2, sampled.birth_time);
     path_of.BindInt(3, sampled.size);
     path_of.BindInt(4, sampled.mtime);
-    std::string path = path_of.Step() == SQLITE_ROW ? path_of.Bytes(0) : std::string();
+    const int looked = path_of.Step();
+    std::string path = looked == SQLITE_ROW ? path_of.Bytes(0) : std::string();
+    code = looked == SQLITE_ROW || looked == SQLITE_DONE ? code : looked;
     path_of.Reset();
     return path;
   }
 
+  bool HasFailed() const { return code != SQLITE_OK && code != SQLITE_ROW && code != SQLITE_DONE; }
+
   OpenShare& share;
   std::string filesystem;
   Sampled file;
-  int code = SQLITE_OK;
+  int code = SQLITE_OK;  // the first failure stays
 
  private:
   Statement rows;
@@ -174,24 +186,14 @@ class SetCollector {
 
 void FindAlikeFiles(std::deque<OpenShare>& shares, Duplicates& duplicates,
                     std::vector<std::string>& failures) {
-  const auto fail = [&](const OpenShare& share, int code) {
-    failures.push_back("share " + share.share.name +
-                       ": contents: " + IndexErrorText(FromSqlite(code)));
-  };
   std::deque<SampleStream> streams;
   std::vector<SampleStream*> open;
   for (OpenShare& share : shares) {
-    if (!share.has_contents) {
-      continue;
-    }
-    SampleStream& stream = streams.emplace_back(share);
-    const int code = stream.Open();
-    if (code != SQLITE_OK) {
-      fail(share, code);
-    } else if (stream.Next()) {
-      open.push_back(&stream);
-    } else if (stream.code != SQLITE_DONE) {
-      fail(share, stream.code);
+    if (share.has_contents) {
+      SampleStream& stream = streams.emplace_back(share);
+      if (stream.Open() && stream.Next()) {
+        open.push_back(&stream);
+      }
     }
   }
 
@@ -206,15 +208,20 @@ void FindAlikeFiles(std::deque<OpenShare>& shares, Duplicates& duplicates,
     collector.Take(stream);
     if (stream.Next()) {
       std::push_heap(open.begin(), open.end(), comes_later);
-      continue;
+    } else {
+      open.pop_back();
     }
-    if (stream.code != SQLITE_DONE) {
-      fail(stream.share, stream.code);
-    }
-    open.pop_back();
   }
   collector.Finish();
   collector.Sort();
+
+  // Only now: a path may be asked for when its stream has come to its end.
+  for (const SampleStream& stream : streams) {
+    if (stream.HasFailed()) {
+      failures.push_back("share " + stream.share.share.name +
+                         ": contents: " + IndexErrorText(FromSqlite(stream.code)));
+    }
+  }
 }
 
 }  // namespace fileindexd

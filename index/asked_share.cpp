@@ -8,7 +8,6 @@
 
 #include "index/content_functions.h"
 #include "index/contents_reader.h"
-#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
@@ -25,12 +24,12 @@ int IsTooLate(void* deadline) {
   return std::chrono::steady_clock::now() > end ? 1 : 0;
 }
 
-// The first read of each database decides which state of it is seen.
-int Begin(sqlite3* db, bool with_contents) {
-  const char* sql = with_contents ? "BEGIN; SELECT entries FROM main.meta WHERE id = 1; "
-                                    "SELECT last_text FROM contents.meta WHERE id = 1"
-                                  : "BEGIN; SELECT entries FROM main.meta WHERE id = 1";
-  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
+// What it reads, if anything, does not count.
+int Execute(KeptStatements& statements, const char* sql) {
+  Statement* statement = nullptr;
+  int code = statements.Find(sql, statement);
+  code = code == SQLITE_OK ? statement->Run() : code;
+  return code == SQLITE_ROW ? SQLITE_OK : code;
 }
 
 }  // namespace
@@ -54,14 +53,15 @@ void AskedShare::Release() {
   failures.clear();
   total = 0;
   if (reader.database.IsOpen() && sqlite3_get_autocommit(reader.database.db) == 0) {
-    (void)sqlite3_exec(reader.database.db, "ROLLBACK", nullptr, nullptr, nullptr);  // only read
+    statements.Reset();
+    (void)Execute(statements, "ROLLBACK");  // only read
   }
 }
 
 IndexError AskedShare::Open(bool with_contents) {
   run.reset();
   if (with_contents && IsInPlace() && sqlite3_get_autocommit(reader.database.db) != 0 &&
-      Begin(reader.database.db, true) == SQLITE_OK) {
+      Begin() == SQLITE_OK) {
     return IndexError::NONE;
   }
   return OpenAnew(with_contents);
@@ -69,6 +69,7 @@ IndexError AskedShare::Open(bool with_contents) {
 
 IndexError AskedShare::OpenAnew(bool with_contents) {
   has_contents = false;
+  statements.Use(nullptr);
   const IndexError error = reader.OpenOnceMade(name);
   if (error != IndexError::NONE) {
     return error;
@@ -82,14 +83,25 @@ IndexError AskedShare::OpenAnew(bool with_contents) {
     }
   }
   sqlite3_progress_handler(reader.database.db, STEPS_BETWEEN_LOOKS, IsTooLate, &deadline);
-  return FromSqlite(Begin(reader.database.db, has_contents));
+  statements.Use(reader.database.db);
+  return FromSqlite(Begin());
+}
+
+// The first read of each database decides which state of it is seen.
+int AskedShare::Begin() {
+  int code = Execute(statements, "BEGIN");
+  code =
+      code == SQLITE_OK ? Execute(statements, "SELECT entries FROM main.meta WHERE id = 1") : code;
+  return code == SQLITE_OK && has_contents
+             ? Execute(statements, "SELECT last_text FROM contents.meta WHERE id = 1")
+             : code;
 }
 
 int AskedShare::RunOnce(const Question& question, const Asked& asked, const HitOrder& order,
                         uint64_t wanted) {
   BestHits best(wanted, order);
   total = 0;
-  run = std::make_unique<ShareRun>(reader.database.db, has_contents, question, asked, name, names);
+  run = std::make_unique<ShareRun>(statements, has_contents, question, asked, name, names);
   const int code = run->Run(best, total);
   best.Cut();
   hits = std::move(best.hits);
@@ -152,16 +164,21 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
   }
 }
 
-void AskedShare::Complete(std::vector<Hit>& shown) {
-  std::unique_ptr<TextCutter> cutter;
-  for (Hit& hit : shown) {
-    if (hit.share != name || run == nullptr) {
-      continue;
+void AskedShare::Complete(std::vector<Hit>& shown, CutterPool& cutters) {
+  if (run == nullptr) {
+    return;
+  }
+  try {
+    const std::string language = LanguageOf(statements, has_contents);
+    std::unique_ptr<TextCutter> cutter = cutters.Lend(language);
+    for (Hit& hit : shown) {
+      if (hit.share == name) {
+        (void)run->Complete(hit, *cutter);
+      }
     }
-    if (cutter == nullptr) {
-      cutter = std::make_unique<TextCutter>(LanguageOf(reader.database.db, has_contents));
-    }
-    (void)run->Complete(hit, *cutter);
+    cutters.TakeBack(language, std::move(cutter));
+  } catch (const std::exception&) {
+    // No memory: the rest is shown without.
   }
 }
 

@@ -8,6 +8,8 @@
 #include <string>
 #include <vector>
 
+#include "index/cutter_pool.h"
+#include "index/kept_statements.h"
 #include "index/reader.h"
 #include "index/share_run.h"
 
@@ -30,12 +32,14 @@ class AskedShare {
   // Never throws; what went wrong is in `failures`.
   void Ask(const Question& question, const Asked& asked, const HitOrder& order, uint64_t wanted);
 
-  // For hits that are shown. What cannot be made is left out: the hit is one all the same.
-  void Complete(std::vector<Hit>& hits);
+  // For hits that are shown; touches those of this share alone. What cannot be made is left out:
+  // the hit is one all the same. Never throws.
+  void Complete(std::vector<Hit>& hits, CutterPool& cutters);
 
   std::string name;
   std::chrono::seconds patience = MOST_ASKING;
   EntryReader reader;
+  KeptStatements statements;  // of its connection
   bool has_contents = false;
   IndexError contents_error = IndexError::NONE;
   std::unique_ptr<ShareRun> run;  // of the last question; goes before the connection
@@ -48,6 +52,7 @@ class AskedShare {
   void AskTries(const Question& question, const Asked& asked, const HitOrder& order,
                 uint64_t wanted);
   IndexError OpenAnew(bool with_contents);
+  int Begin();
   bool IsInPlace() const;
   void Fail(const std::string& what);
 

@@ -41,13 +41,14 @@ bool HitOrder::operator()(const Hit& a, const Hit& b) const {
   return a.entry.path != b.entry.path ? a.entry.path < b.entry.path : a.share < b.share;
 }
 
+// Hits are many and large: what stands behind as many as are wanted is not even moved.
 void BestHits::Add(Hit&& hit) {
-  constexpr uint64_t SLACK = 1024;
-  if (wanted == 0) {
+  constexpr uint64_t SLACK = 64;
+  if (wanted == 0 || (are_full && !order(hit, hits[wanted - 1]))) {
     return;
   }
   hits.push_back(std::move(hit));
-  if (hits.size() - std::min<uint64_t>(wanted, hits.size()) > wanted + SLACK) {
+  if (hits.size() > wanted && hits.size() - wanted > wanted + SLACK) {
     Cut();
   }
 }
@@ -56,6 +57,7 @@ void BestHits::Cut() {
   const auto kept = static_cast<std::ptrdiff_t>(std::min<uint64_t>(wanted, hits.size()));
   std::partial_sort(hits.begin(), hits.begin() + kept, hits.end(), order);
   hits.erase(hits.begin() + kept, hits.end());
+  are_full = hits.size() == wanted;
 }
 
 }  // namespace fileindexd

@@ -27,6 +27,9 @@ class BestHits {
   std::vector<Hit> hits;
   HitOrder order;
   uint64_t wanted;
+
+ private:
+  bool are_full = false;  // the first of `hits` are the best of all but those behind them, in order
 };
 
 }  // namespace fileindexd

@@ -43,74 +43,104 @@ int Done(int code) {
 
 int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
   int code = SQLITE_OK;
-  if (by_id.handle == nullptr) {
-    code = by_id.Prepare(db, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1");
+  if (by_id == nullptr) {
+    code = statements.Find("SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1", by_id);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  by_id.BindInt(1, id);
-  code = by_id.Step();
+  by_id->BindInt(1, id);
+  code = by_id->Step();
   found = code == SQLITE_ROW;
   if (found) {
     candidate = Candidate();
-    ReadEntry(by_id, candidate.entry);
+    ReadEntry(*by_id, candidate.entry);
   }
-  by_id.Reset();
+  by_id->Reset();
+  return Done(code);
+}
+
+int CandidateRows::FindShort(int64_t id, Candidate& candidate, bool& found) {
+  int code = SQLITE_OK;
+  if (short_by_id == nullptr) {
+    code = statements.Find("SELECT path, kind, mtime FROM entries WHERE id = ?1", short_by_id);
+  }
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  short_by_id->BindInt(1, id);
+  code = short_by_id->Step();
+  found = code == SQLITE_ROW;
+  if (found) {
+    candidate = Candidate();
+    candidate.is_whole = false;
+    candidate.entry.id = id;
+    candidate.entry.path = short_by_id->Bytes(0);
+    candidate.entry.kind = static_cast<Kind>(short_by_id->Int(1));
+    candidate.entry.mtime = short_by_id->Int(2);
+  }
+  short_by_id->Reset();
   return Done(code);
 }
 
 int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
   int code = SQLITE_OK;
-  if (of_text.handle == nullptr) {
+  if (of_text == nullptr) {
     const std::string sql = "SELECT " FILEINDEX_ENTRY_COLUMNS ", " + FactsColumns() +
                             " FROM contents.files AS files CROSS JOIN entries "
                             "ON " FILEINDEX_SAME_FILE " WHERE files.text = ?1 AND files.text <> 0";
-    code = of_text.Prepare(db, sql.c_str());
+    code = statements.Find(sql, of_text);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  if (sqlite3_stmt_busy(of_text.handle) == 0) {
-    of_text.BindInt(1, text);
+  if (sqlite3_stmt_busy(of_text->handle) == 0) {
+    of_text->BindInt(1, text);
   }
-  code = of_text.Step();
+  code = of_text->Step();
   found = code == SQLITE_ROW;
   if (found) {
     candidate = Candidate();
-    ReadEntry(of_text, candidate.entry);
-    candidate.facts = ReadFacts(of_text, ENTRY_COLUMN_COUNT);
+    ReadEntry(*of_text, candidate.entry);
+    candidate.facts = ReadFacts(*of_text, ENTRY_COLUMN_COUNT);
     candidate.is_asked = true;
     return SQLITE_OK;
   }
-  of_text.Reset();
+  of_text->Reset();
   return Done(code);
 }
 
 int CandidateRows::NeedFacts(Candidate& candidate) {
+  if (!candidate.is_whole) {
+    bool found = false;
+    const int code = Find(candidate.entry.id, candidate, found);
+    if (code != SQLITE_OK || !found) {
+      return code == SQLITE_OK ? SQLITE_CORRUPT : code;
+    }
+  }
   if (candidate.is_asked || !has_contents || !candidate.entry.content_wanted) {
     candidate.is_asked = true;
     return SQLITE_OK;
   }
   int code = SQLITE_OK;
-  if (facts.handle == nullptr) {
+  if (facts == nullptr) {
     const std::string sql = "SELECT " + FactsColumns() +
                             " FROM contents.files AS files WHERE inode = ?1 AND birth_time = ?2 "
                             "AND size = ?3 AND mtime = ?4";
-    code = facts.Prepare(db, sql.c_str());
+    code = statements.Find(sql, facts);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  facts.BindInt(1, static_cast<int64_t>(candidate.entry.inode));
-  facts.BindInt(2, candidate.entry.birth_time);
-  facts.BindInt(3, candidate.entry.size);
-  facts.BindInt(4, candidate.entry.mtime);
-  code = facts.Step();
+  facts->BindInt(1, static_cast<int64_t>(candidate.entry.inode));
+  facts->BindInt(2, candidate.entry.birth_time);
+  facts->BindInt(3, candidate.entry.size);
+  facts->BindInt(4, candidate.entry.mtime);
+  code = facts->Step();
   if (code == SQLITE_ROW) {
-    candidate.facts = ReadFacts(facts, 0);
+    candidate.facts = ReadFacts(*facts, 0);
   }
-  facts.Reset();
+  facts->Reset();
   candidate.is_asked = true;
   return Done(code);
 }
@@ -141,22 +171,23 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
     return SQLITE_OK;
   }
   int code = SQLITE_OK;
-  if (twin.handle == nullptr) {
-    code = twin.Prepare(db,
-                        "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
-                        "ON " FILEINDEX_SAME_FILE
-                        " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
-                        "AND files.id <> ?3 AND files.state = 1 LIMIT 1");
+  if (twin == nullptr) {
+    code = statements.Find(
+        "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
+        "ON " FILEINDEX_SAME_FILE
+        " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
+        "AND files.id <> ?3 AND files.state = 1 LIMIT 1",
+        twin);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  twin.BindInt(1, candidate.facts->sample);
-  twin.BindInt(2, candidate.entry.size);
-  twin.BindInt(3, candidate.facts->id);
-  code = twin.Step();
+  twin->BindInt(1, candidate.facts->sample);
+  twin->BindInt(2, candidate.entry.size);
+  twin->BindInt(3, candidate.facts->id);
+  code = twin->Step();
   has = code == SQLITE_ROW;
-  twin.Reset();
+  twin->Reset();
   return Done(code);
 }
 

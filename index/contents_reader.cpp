@@ -2,6 +2,7 @@
 #include "index/contents_reader.h"
 
 #include <ctime>
+#include <utility>
 #include <vector>
 
 #include "index/content_functions.h"
@@ -15,9 +16,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int FIRST_NUMBER_COLUMN = 7;  // of FileOfEntrySql
-constexpr const char* FILE_OF_ENTRY =
-    " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
+constexpr int FIRST_NUMBER_COLUMN = 10;  // of FileOfEntrySql
 
 // What the writer has counted, but for two: a failed file whose entry is gone would count until it
 // is swept, while nobody lists it; and what the daemon wrote waits, though it is not taken in yet.
@@ -51,21 +50,10 @@ const char* StateText(ContentState state) {
 
 std::string FileOfEntrySql() {
   return "SELECT state, reason, found_kind, is_cut, sample, text,"
-         " (SELECT packed FROM contents.texts WHERE id = text), " +
-         std::string(NUMBER_COLUMNS) + FILE_OF_ENTRY;
-}
-
-// The row of the file that the entry shows now: SQLITE_ROW, SQLITE_DONE when there is none.
-int StepTo(sqlite3* db, const std::string& sql, const Entry& entry, Statement& row) {
-  const int code = row.Prepare(db, sql.c_str());
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  row.BindInt(1, static_cast<int64_t>(entry.inode));
-  row.BindInt(2, entry.birth_time);
-  row.BindInt(3, entry.size);
-  row.BindInt(4, entry.mtime);
-  return row.Step();
+         " (SELECT packed FROM contents.texts WHERE id = text), extractor, tries,"
+         " (SELECT language FROM contents.meta WHERE id = 1), " +
+         std::string(NUMBER_COLUMNS) +
+         " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
 }
 
 bool ReadContent(const Statement& row, Content& content) {
@@ -97,30 +85,12 @@ IndexError LookForWords(IndexDatabase& entries) {
 }  // namespace
 
 IndexError AttachContents(IndexDatabase& entries, const std::string& share_name) {
-  {
-    IndexDatabase trial;  // looks at everything that can be wrong with the files
-    const IndexError error = trial.OpenForReading(ContentsPath(share_name), CONTENTS_FORM);
-    if (error != IndexError::NONE) {
-      return error;
-    }
+  const IndexError error = entries.Attach(ContentsPath(share_name), "contents", CONTENTS_FORM);
+  if (error != IndexError::NONE) {
+    return error;
   }
-
-  int code = RegisterTextTokenizer(entries.db);
-  code = code == SQLITE_OK ? RegisterQuestionFunctions(entries.db) : code;
-  Statement attach;
-  code = code == SQLITE_OK ? attach.Prepare(entries.db, "ATTACH ?1 AS contents") : code;
-  if (code != SQLITE_OK) {
-    return FromSqlite(code);
-  }
-  const std::string file = ContentsPath(share_name) + "/" + CONTENTS_FORM.file;
-  attach.BindText(1, file);
-  code = attach.Run();
-  if (code != SQLITE_OK) {
-    return FromSqlite(code);
-  }
-  int persist = 1;
-  sqlite3_file_control(entries.db, "contents", SQLITE_FCNTL_PERSIST_WAL, &persist);
-  return LookForWords(entries);
+  const int code = RegisterQuestionFunctions(entries.db);
+  return code == SQLITE_OK ? LookForWords(entries) : FromSqlite(code);
 }
 
 IndexError ContentsReader::Open(const std::string& share_name) {
@@ -180,48 +150,33 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
   return code == SQLITE_DONE;
 }
 
-IndexError ContentsReader::LookFor(const Entry& entry, bool& is_there) {
-  Statement find;
-  const int code = StepTo(entries.db, std::string("SELECT 1") + FILE_OF_ENTRY, entry, find);
-  if (code != SQLITE_ROW && code != SQLITE_DONE) {
+IndexError ContentsReader::Find(const Entry& entry, StoredContent& stored) {
+  StoredContent found;
+  Statement row;
+  int code = SQLITE_DONE;
+  if (entry.content_wanted) {
+    code = row.Prepare(entries.db, FileOfEntrySql().c_str());
+    row.BindInt(1, static_cast<int64_t>(entry.inode));
+    row.BindInt(2, entry.birth_time);
+    row.BindInt(3, entry.size);
+    row.BindInt(4, entry.mtime);
+    code = code == SQLITE_OK ? row.Step() : code;
+  }
+  if (code == SQLITE_ROW) {
+    if (!ReadContent(row, found.content)) {
+      return IndexError::DAMAGED;
+    }
+    found.state = StateText(static_cast<ContentState>(row.Int(0)));
+    found.reason = row.Bytes(1);
+    found.extractor = row.Int(7);
+    found.tries = row.Int(8);
+    const std::string language = LanguageName(row.Bytes(9));
+    found.language = language.empty() ? NO_LANGUAGE : language;
+  } else if (code != SQLITE_DONE) {
     return FromSqlite(code);
   }
-  is_there = entry.content_wanted && code == SQLITE_ROW;
+  stored = std::move(found);
   return IndexError::NONE;
-}
-
-bool ContentsReader::Find(const Entry& entry, Content& content, std::string& state,
-                          std::string& reason) {
-  Statement find;
-  Content read;
-  if (!entry.content_wanted || StepTo(entries.db, FileOfEntrySql(), entry, find) != SQLITE_ROW ||
-      !ReadContent(find, read)) {
-    return false;
-  }
-  content = std::move(read);
-  state = StateText(static_cast<ContentState>(find.Int(0)));
-  reason = find.Bytes(1);
-  return true;
-}
-
-bool ContentsReader::FindReading(const Entry& entry, ContentReading& reading) {
-  Statement find;
-  if (!entry.content_wanted ||
-      StepTo(entries.db, std::string("SELECT extractor, tries") + FILE_OF_ENTRY, entry, find) !=
-          SQLITE_ROW) {
-    return false;
-  }
-  reading = {find.Int(0), find.Int(1)};
-  return true;
-}
-
-std::string ContentsReader::Language() {
-  Statement read;
-  const bool found =
-      read.Prepare(entries.db, "SELECT language FROM contents.meta WHERE id = 1") == SQLITE_OK &&
-      read.Step() == SQLITE_ROW;
-  const std::string name = found ? LanguageName(read.Bytes(0)) : "";
-  return name.empty() ? NO_LANGUAGE : name;
 }
 
 }  // namespace fileindexd

@@ -30,9 +30,15 @@ struct FailedContent {
   int64_t tries = 0;
 };
 
-struct ContentReading {
+// What is stored for an entry. Waiting where nothing was read yet, or nothing is wanted.
+struct StoredContent {
+  std::string state = "waiting";  // or "done", "failed"
+  std::string reason;             // of a failure
+  Content content;
   int64_t extractor = 0;  // version of the readers that read it last; 0: none did
   int64_t tries = 0;      // that ended with the death of the reader
+  std::string language;   // whose word forms its words were cut to, NO_LANGUAGE for none; of what
+                          // is not waiting
 };
 
 // Attaches the share's contents to its open entries as "contents", with all that questions need.
@@ -47,15 +53,8 @@ class ContentsReader {
 
   bool Count(ContentCounts& counts);
   bool ForEachFailed(const std::function<bool(const FailedContent&)>& visit);
-  // Whether there is any for the entry. NONE, or why that cannot be told.
-  IndexError LookFor(const Entry& entry, bool& is_there);
-  // The content that stands for the entry: state in words ("waiting", "done", "failed"), and the
-  // reason of a failure. False when there is none, or reading failed.
-  bool Find(const Entry& entry, Content& content, std::string& state, std::string& reason);
-  // How it was read. False as above.
-  bool FindReading(const Entry& entry, ContentReading& reading);
-  // Whose word forms its words were cut to; NO_LANGUAGE where that is not to be had.
-  std::string Language();
+  // What stands for the entry: of one moment. NONE, or why that cannot be told.
+  IndexError Find(const Entry& entry, StoredContent& stored);
 
   IndexDatabase entries;  // with the contents attached as "contents"
 };

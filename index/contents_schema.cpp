@@ -76,7 +76,8 @@ const DatabaseForm CONTENTS_FORM = {
     .application = CONTENTS_APPLICATION,
     .version = CONTENTS_VERSION,
     .schema = CONTENTS_SCHEMA,
-    .probe = "SELECT last_text FROM meta WHERE id = 1",
+    .probe = "last_text",
+    .probed = "meta WHERE id = 1",
     .prepare = RegisterTextTokenizer,
 };
 

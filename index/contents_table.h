@@ -80,7 +80,7 @@ class ContentsTable {
   int SetReason(int64_t id, const std::string& reason);
   // In place of what was stored. Sets `text`, `length` and `found_kind` of `file`, which Update
   // then writes; `before` is the row as it stands.
-  int SetContent(const ContentFile& before, const Content& content, ContentFile& file);
+  int SetContent(const ContentFile& before, const PreparedContent& prepared, ContentFile& file);
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 

@@ -40,8 +40,9 @@ int ContentsTable::PrepareTexts() {
   return SQLITE_OK;
 }
 
-int ContentsTable::SetContent(const ContentFile& before, const Content& content,
+int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& prepared,
                               ContentFile& file) {
+  const Content& content = prepared.content;
   int code = Begin();
   if (code == SQLITE_OK && before.text != 0) {
     code = RemoveContent(file);
@@ -63,12 +64,21 @@ int ContentsTable::SetContent(const ContentFile& before, const Content& content,
                         field.number);
   }
   code = set_content.Run();
-  const ContentWords words = WordsOf(content);
+  ContentWords words = WordsOf(content);
   if (code != SQLITE_OK || words.IsEmpty()) {
     return code;
   }
 
-  const std::string packed = PackTexts(content);
+  file.length = static_cast<int64_t>(words.Length());
+  pending_bytes += words.Length();
+  if (!prepared.cut_text.empty() && prepared.language == meta.language) {
+    words.text = prepared.cut_text;
+  }
+  std::string made;
+  if (prepared.packed.empty()) {
+    made = PackTexts(content);
+  }
+  const std::string& packed = prepared.packed.empty() ? made : prepared.packed;
   if (packed.empty()) {
     return SQLITE_NOMEM;
   }
@@ -76,8 +86,6 @@ int ContentsTable::SetContent(const ContentFile& before, const Content& content,
   insert_text.BindInt(1, file.text);
   insert_text.BindBlob(2, packed);
   code = insert_text.Run();
-  file.length = static_cast<int64_t>(words.Length());
-  pending_bytes += words.Length();
   return code == SQLITE_OK ? AddWords(file.text, words) : code;
 }
 

@@ -58,8 +58,6 @@ int ContentsTable::MakeWords(const std::string& language, const std::string& ver
   code = code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
   if (code == SQLITE_OK && has_words && !has_old_words) {
     code = sqlite3_exec(handle, "ALTER TABLE words RENAME TO old_words", nullptr, nullptr, nullptr);
-    // Where the words are of a language that is not known any more.
-    code = code == SQLITE_ERROR ? SQLITE_OK : code;
   }
   if (code == SQLITE_OK) {
     code = sqlite3_exec(handle, WordsSchema(language).c_str(), nullptr, nullptr, nullptr);

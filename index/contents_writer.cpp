@@ -74,7 +74,7 @@ bool ContentsWriter::Impl::Done(int code) {
   return false;
 }
 
-bool ContentsWriter::Impl::Finish(int64_t id, const Content& content) {
+bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
   ContentFile file;
   bool found = false;
   bool current = false;
@@ -100,12 +100,17 @@ bool ContentsWriter::Impl::Finish(int64_t id, const Content& content) {
 }
 
 // What was found, if it turned out to be of a kind that is wanted.
-int ContentsWriter::Impl::Keep(const ContentFile& file, const Content& content, ContentFile& now) {
+int ContentsWriter::Impl::Keep(const ContentFile& file, const PreparedContent& content,
+                               ContentFile& now) {
+  const Kind kind = content.content.kind;
   bool is_kept = true;
-  const int code = IsKept(file, content.kind, is_kept);
+  const int code = IsKept(file, kind, is_kept);
   now.extractor = is_kept ? extractor : KEPT_OUT;
-  return code == SQLITE_OK ? table->SetContent(file, is_kept ? content : OfKind(content.kind), now)
-                           : code;
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  return is_kept ? table->SetContent(file, content, now)
+                 : table->SetContent(file, OfKind(kind), now);
 }
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
@@ -241,8 +246,8 @@ bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
   return impl->Guarded([&] { return impl->BeginTries(files); });
 }
 
-bool ContentsWriter::Finish(int64_t file, const Content& content) {
-  return impl->Guarded([&] { return impl->Finish(file, content); });
+bool ContentsWriter::Finish(int64_t file, const PreparedContent& found) {
+  return impl->Guarded([&] { return impl->Finish(file, found); });
 }
 
 bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& found,

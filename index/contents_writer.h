@@ -13,6 +13,7 @@
 
 #include "base/content.h"
 #include "index/database.h"
+#include "index/prepared_content.h"
 #include "state/settings.h"
 
 namespace fileindexd {
@@ -67,7 +68,7 @@ class ContentsWriter {
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   // On disk when it returns: what is about to be tried.
   bool BeginTries(const std::vector<int64_t>& files);
-  bool Finish(int64_t file, const Content& content);
+  bool Finish(int64_t file, const PreparedContent& found);
   // It cannot be read; what was found before the failure is kept. `killed`: the helper died; after
   // the second time the file is not handed out again until it or the extractor changes.
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);

@@ -66,8 +66,8 @@ struct ContentsWriter::Impl {
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
   // contents_writer.cpp
-  bool Finish(int64_t file, const Content& content);
-  int Keep(const ContentFile& file, const Content& content, ContentFile& now);
+  bool Finish(int64_t file, const PreparedContent& content);
+  int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Release(int64_t file);
   void LookAtAll();

@@ -75,8 +75,7 @@ IndexError ContentsWriter::Impl::SetUp() {
 
 // Makes it this share's, this language's and these readers' database.
 int ContentsWriter::Impl::Own() {
-  const std::string given = LanguageName(share.language);
-  const std::string language = given.empty() ? DEFAULT_LANGUAGE : given;
+  const std::string language = LanguageOfWords(share.language);
   const std::string version = WordsVersion(language);
   int code = SQLITE_OK;
   if (table->meta.filesystem != share.filesystem) {

@@ -177,7 +177,12 @@ IndexError Converger::Put(const std::string& path, const Look& look, const Conte
   }
   if (found) {
     error = Change(known, look, wanted, decide, outcome);
-    return outcome == Outcome::REPLACED ? NoteOtherPaths(path, look) : error;
+    if (error != IndexError::NONE || outcome != Outcome::REPLACED) {
+      return error;
+    }
+    Entry entry = EntryOf(path, look);
+    entry.id = known.id;
+    return NoteOtherPaths(entry, look);
   }
 
   outcome = has_below ? Outcome::NEW_ABOVE : Outcome::NEW;
@@ -185,7 +190,8 @@ IndexError Converger::Put(const std::string& path, const Look& look, const Conte
   entry.first_seen = Now();
   entry.content_wanted = entry.thing == Thing::FILE && IsContentWanted(entry.kind, wanted);
   error = Sql(table.Insert(entry));
-  return error == IndexError::NONE ? NoteOtherPaths(path, look) : error;
+  entry.id = table.inserted;
+  return error == IndexError::NONE ? NoteOtherPaths(entry, look) : error;
 }
 
 IndexError Converger::Change(const Entry& known, const Look& look, const ContentFlags& wanted,
@@ -242,13 +248,13 @@ IndexError Converger::RefreshTwins(const std::string& path, const Look& look, bo
 // or taken away changes the file's change time: paths that were seen with the present one are all
 // still there, and a first index asks nothing of them. (A file system without birth times counts
 // change times in whole seconds, which tell nothing.)
-IndexError Converger::NoteOtherPaths(const std::string& path, const Look& look) {
+IndexError Converger::NoteOtherPaths(const Entry& entry, const Look& look) {
   const bool has_links = look.thing != Thing::DIRECTORY && look.links > 1;
   if (has_links && look.links > MANY_LINKS) {
     return IndexError::NONE;
   }
   const bool changed = has_links && look.birth_time != 0;
-  return Sql(table.OtherPaths(EntryOf(path, look), changed, other_paths));
+  return Sql(table.OtherPaths(entry, changed, other_paths));
 }
 
 // In the transaction that added the new path: whatever order a rename's events come in, nothing is

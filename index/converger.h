@@ -52,7 +52,7 @@ class Converger {
                     const ContentFlags& decide, Outcome& outcome);
   IndexError RefreshTwins(const std::string& path, const Look& look, bool is_new);
 
-  IndexError NoteOtherPaths(const std::string& path, const Look& look);
+  IndexError NoteOtherPaths(const Entry& entry, const Look& look);
   IndexError SettleOtherPaths();
 
   using SliceStep = std::function<IndexError(const std::vector<Entry>& rows)>;
@@ -64,7 +64,8 @@ class Converger {
   IndexError NoteLinks(const Entry& removed);
   IndexError RemoveAt(const std::string& path, bool root_counts);
   IndexError RemoveBelow(const std::string& path, bool even_what_belongs);
-  IndexError RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs);
+  IndexError RemoveFromSlice(const std::string& path, const std::vector<Entry>& rows,
+                             bool even_what_belongs);
 
   bool IsLookedAt(const std::string& path) const;
 

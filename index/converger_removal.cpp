@@ -73,17 +73,19 @@ IndexError Converger::RemoveAt(const std::string& path, bool root_counts) {
 
 IndexError Converger::RemoveBelow(const std::string& path, bool even_what_belongs) {
   return ForEachSliceBelow(path, [&](const std::vector<Entry>& rows) {
-    return RemoveFromSlice(rows, even_what_belongs);
+    return RemoveFromSlice(path, rows, even_what_belongs);
   });
 }
 
-IndexError Converger::RemoveFromSlice(const std::vector<Entry>& rows, bool even_what_belongs) {
+// `rows`: some of those below `path`.
+IndexError Converger::RemoveFromSlice(const std::string& path, const std::vector<Entry>& rows,
+                                      bool even_what_belongs) {
+  // Nothing is below what is gone: one look tells of them all.
+  const bool all =
+      even_what_belongs || (!rows.empty() && LookAt(*settings, path).verdict == Verdict::GONE);
   std::vector<const Entry*> leaving;
   for (const Entry& known : rows) {
-    Verdict verdict = Verdict::GONE;
-    if (!even_what_belongs) {
-      verdict = LookAt(*settings, known.path).verdict;
-    }
+    const Verdict verdict = all ? Verdict::GONE : LookAt(*settings, known.path).verdict;
     if (verdict == Verdict::UNKNOWN) {
       return IndexError::IO;
     }

@@ -50,9 +50,9 @@ int Execute(sqlite3* db, const char* sql) {
   return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
 }
 
-int ReadNumber(sqlite3* db, const char* sql, int64_t& number) {
+int ReadNumber(sqlite3* db, const std::string& sql, int64_t& number) {
   Statement statement;
-  int code = statement.Prepare(db, sql);
+  int code = statement.Prepare(db, sql.c_str());
   if (code != SQLITE_OK) {
     return code;
   }
@@ -79,9 +79,9 @@ int OpenFile(const std::string& file, sqlite3*& db) {
   return code;
 }
 
-void KeepLog(sqlite3* db) {
+void KeepLog(sqlite3* db, const char* name) {
   int persist = 1;
-  sqlite3_file_control(db, "main", SQLITE_FCNTL_PERSIST_WAL, &persist);
+  sqlite3_file_control(db, name, SQLITE_FCNTL_PERSIST_WAL, &persist);
 }
 
 // SQLite would wait for ever in a pipe, and fails without end at a folder.
@@ -109,14 +109,14 @@ IndexError FindFile(const std::string& index_path, const std::string& file) {
                                                                           : IndexError::DAMAGED;
 }
 
-// Whether the open database is ours. Cheap: two numbers and the schema's text.
-IndexError CheckSchema(sqlite3* db, const DatabaseForm& form) {
+// Whether the open database of that name is ours. Cheap: two numbers and the schema's text.
+IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm& form) {
   int64_t application = 0;
   int64_t version = 0;
   int64_t answer = 0;
-  int code = ReadNumber(db, "PRAGMA application_id", application);
+  int code = ReadNumber(db, "PRAGMA " + name + ".application_id", application);
   if (code == SQLITE_OK) {
-    code = ReadNumber(db, "PRAGMA user_version", version);
+    code = ReadNumber(db, "PRAGMA " + name + ".user_version", version);
   }
   if (code != SQLITE_OK) {
     return FromSqlite(code);
@@ -125,7 +125,8 @@ IndexError CheckSchema(sqlite3* db, const DatabaseForm& form) {
     return IndexError::PATH_NOT_FOUND;
   }
 
-  code = ReadNumber(db, form.probe, answer);
+  code = ReadNumber(db, std::string("SELECT ") + form.probe + " FROM " + name + "." + form.probed,
+                    answer);
   // Our numbers without our tables: somebody's knife.
   return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }
@@ -140,8 +141,8 @@ IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
 
   IndexError error = FromSqlite(OpenFile(file, db));
   if (error == IndexError::NONE) {
-    KeepLog(db);
-    error = CheckSchema(db, form);
+    KeepLog(db, "main");
+    error = CheckSchema(db, "main", form);
   }
   if (error == IndexError::NONE && form.prepare != nullptr) {
     error = FromSqlite(form.prepare(db));
@@ -184,7 +185,7 @@ IndexError CreateDatabase(const std::string& index_path, const DatabaseForm& for
     }
   }
   if (code == SQLITE_OK) {
-    KeepLog(db);
+    KeepLog(db, "main");
   }
   sqlite3_close_v2(db);
   return FromSqlite(code);
@@ -279,6 +280,40 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
 IndexError IndexDatabase::OpenForReading(const std::string& index_path, const DatabaseForm& form) {
   Close();
   return OpenExisting(index_path, form, PRAGMAS_FOR_READING, db);
+}
+
+// What is wrong with it is found out by opening it alone, and only then: that costs as much again.
+IndexError IndexDatabase::Attach(const std::string& index_path, const char* name,
+                                 const DatabaseForm& form) {
+  const std::string file = index_path + "/" + form.file;
+  IndexError error = FindFile(index_path, file);
+  if (error == IndexError::NONE && form.prepare != nullptr) {
+    error = FromSqlite(form.prepare(db));
+  }
+  if (error != IndexError::NONE) {
+    return error;
+  }
+
+  Statement attach;
+  error = FromSqlite(attach.Prepare(db, (std::string("ATTACH ?1 AS ") + name).c_str()));
+  if (error == IndexError::NONE) {
+    attach.BindText(1, file);
+    error = FromSqlite(attach.Run());
+  }
+  if (error == IndexError::NONE) {
+    KeepLog(db, name);
+    // A cache's size holds for one file of a connection.
+    (void)Execute(db, (std::string("PRAGMA ") + name + ".cache_size = -8192").c_str());
+    error = CheckSchema(db, name, form);
+    if (error == IndexError::NONE) {
+      return error;
+    }
+    (void)Execute(db, (std::string("DETACH ") + name).c_str());  // nothing is under way in it
+  }
+
+  IndexDatabase alone;
+  const IndexError found = alone.OpenForReading(index_path, form);
+  return found == IndexError::NONE ? error : found;
 }
 
 void IndexDatabase::Close() {

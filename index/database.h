@@ -31,7 +31,8 @@ struct DatabaseForm {
   int64_t application;
   int64_t version;
   const char* schema;           // makes the tables in an empty database, and sets both numbers
-  const char* probe;            // an answer in one number that only our tables give
+  const char* probe;            // a number that only our tables give, and
+  const char* probed;           // the rows to ask for it
   int (*prepare)(sqlite3* db);  // what the tables need of a connection; null: nothing
 };
 
@@ -57,6 +58,9 @@ class IndexDatabase {
                             const DatabaseForm& form = ENTRIES_FORM);
   // For reading; never creates, moves or repairs anything.
   IndexError OpenForReading(const std::string& index_path, const DatabaseForm& form = ENTRIES_FORM);
+  // What OpenForReading would open, beside what is open here, under that name. Not within a
+  // transaction. Without success nothing is attached.
+  IndexError Attach(const std::string& index_path, const char* name, const DatabaseForm& form);
   void Close();
 
   bool IsOpen() const { return db != nullptr; }

@@ -76,7 +76,7 @@ int EntryTable::Prepare(sqlite3* db) {
        "SELECT path FROM entries WHERE inode = ?1 AND path <> ?2 AND (size <> ?3 OR mtime <> ?4 "
        "OR owner <> ?5 OR grp <> ?6 OR mode <> ?7)"},
       {&other_paths,
-       "SELECT path FROM entries WHERE inode = ?1 AND path <> ?2 "
+       "SELECT path FROM entries WHERE inode = ?1 AND id <> ?2 "
        "AND (birth_time = ?3 OR birth_time = 0 OR ?3 = 0) AND (?4 = 0 OR ctime <> ?5)"},
       {&insert,
        "INSERT INTO entries(path, thing, kind, content_wanted, inode, size, mtime, ctime, "
@@ -228,7 +228,7 @@ int EntryTable::CollectPaths(Statement& statement, std::vector<std::string>& pat
 
 int EntryTable::OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths) {
   other_paths.BindInt(1, static_cast<int64_t>(entry.inode));
-  other_paths.BindBlob(2, entry.path);
+  other_paths.BindInt(2, entry.id);
   other_paths.BindInt(3, entry.birth_time);
   other_paths.BindInt(4, changed ? 1 : 0);
   other_paths.BindInt(5, entry.ctime);
@@ -274,8 +274,8 @@ int EntryTable::Insert(const Entry& entry) {
   }
 
   ++entries;
-  const int64_t id = sqlite3_last_insert_rowid(handle);
-  return RunTexts(insert_name, insert_part, id, entry.path);
+  inserted = sqlite3_last_insert_rowid(handle);
+  return RunTexts(insert_name, insert_part, inserted, entry.path);
 }
 
 int EntryTable::Update(const Entry& entry, bool reread) {

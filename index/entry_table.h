@@ -48,8 +48,8 @@ class EntryTable {
             std::vector<Entry>& entries);
   // Other paths of the same inode whose attributes differ from those of `entry`.
   int StaleTwins(const Entry& entry, std::vector<std::string>& paths);
-  // Other paths of the same inode and birth time. `changed`: only those that were seen with another
-  // change time.
+  // Paths of other entries with the same inode and birth time; which one is another, `id` tells.
+  // `changed`: only those that were seen with another change time.
   int OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths);
 
   int Insert(const Entry& entry);  // `id` does not count
@@ -63,6 +63,7 @@ class EntryTable {
 
   uint64_t changes = 0;  // rows changed since Prepare
   int64_t entries = 0;   // rows, as this transaction sees them
+  int64_t inserted = 0;  // `id` of the row that Insert made last
   sqlite3* handle = nullptr;
 
  private:

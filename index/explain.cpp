@@ -3,6 +3,7 @@
 #include <cmath>
 #include <ctime>
 #include <exception>
+#include <optional>
 #include <utility>
 
 #include "index/asked_share.h"
@@ -17,29 +18,25 @@ namespace fileindexd {
 
 namespace {
 
-std::string TimeText(int64_t seconds) {
+// `split`: localtime_r or gmtime_r.
+std::string TimeText(int64_t seconds, tm* (*split)(const time_t*, tm*)) {
   const time_t time = seconds;
   tm broken{};
   char text[64];
-  const bool made = localtime_r(&time, &broken) != nullptr &&
+  const bool made = split(&time, &broken) != nullptr &&
                     strftime(text, sizeof(text), "%Y-%m-%d %H:%M:%S", &broken) > 0;
   return made ? text : std::to_string(seconds);
 }
 
 std::string NumberText(const QueryNode& node, int64_t number) {
+  constexpr int64_t SECOND = 1'000'000'000;
   switch (FormOf(node.column, node.field)) {
     case ValueForm::NANOSECONDS:
-      return TimeText(number / 1'000'000'000);
+      return TimeText(number / SECOND - (number % SECOND < 0 ? 1 : 0), localtime_r);
     case ValueForm::SECONDS:
-      return TimeText(number);
-    case ValueForm::CAMERA_TIME: {
-      const time_t time = number;
-      tm broken{};
-      char text[64];
-      const bool made = gmtime_r(&time, &broken) != nullptr &&
-                        strftime(text, sizeof(text), "%Y-%m-%d %H:%M:%S", &broken) > 0;
-      return made ? text : std::to_string(number);
-    }
+      return TimeText(number, localtime_r);
+    case ValueForm::CAMERA_TIME:
+      return TimeText(number, gmtime_r);  // what the camera's clock said
     case ValueForm::DURATION:
       return std::to_string(number / 1000) + " s";
     case ValueForm::BYTES:
@@ -57,8 +54,8 @@ class Explainer {
   Explainer(AskedShare& of_share, const Asked& in_question)
       : share(of_share),
         asked(in_question),
-        rows(of_share.reader.database.db, of_share.has_contents),
-        sets(of_share.reader.database.db, of_share.has_contents, in_question, of_share.name),
+        rows(of_share.statements, of_share.has_contents),
+        sets(of_share.statements, of_share.has_contents, in_question, of_share.name),
         check(rows, sets) {}
 
   int Run(const Entry& entry, Explanation& explanation) {
@@ -169,7 +166,7 @@ class Explainer {
 
 IndexError ExplainIn(AskedShare& share, const Asked& asked, const std::string& path,
                      Explanation& explanation, std::string& error) {
-  IndexError opened = share.Open(true);
+  const IndexError opened = share.Open(true);
   if (opened != IndexError::NONE) {
     error = IndexErrorText(opened);
     return opened;
@@ -179,13 +176,18 @@ IndexError ExplainIn(AskedShare& share, const Asked& asked, const std::string& p
     error = std::string("contents: ") + IndexErrorText(share.contents_error);
     return share.contents_error;
   }
-  Entry entry;
-  if (!share.reader.Find(path, entry)) {
+  std::optional<Entry> entry;
+  const IndexError found = share.reader.Find(path, entry);
+  if (found != IndexError::NONE) {
+    error = IndexErrorText(found);
+    return found;
+  }
+  if (!entry.has_value()) {
     error = "not in the index: " + path;
     return IndexError::PATH_NOT_FOUND;
   }
   Explanation made;
-  const int code = Explainer(share, asked).Run(entry, made);
+  const int code = Explainer(share, asked).Run(*entry, made);
   if (code != SQLITE_OK) {
     error = IndexErrorText(FromSqlite(code));
     return FromSqlite(code);

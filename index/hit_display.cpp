@@ -7,6 +7,7 @@
 #include "base/utf8.h"
 #include "index/content_text.h"
 #include "index/entry_table.h"
+#include "index/name_pattern.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -48,29 +49,20 @@ void MarkWords(const WordLeaf& leaf, const SeenName& name,
 
 void MarkPieces(const QueryNode& node, const SeenName& name, NameFolder& folder,
                 std::vector<Snippet::Mark>& marks) {
-  std::vector<Snippet::Mark> found_marks;
-  size_t at = 0;
-  for (size_t i = 0; i < node.pieces.size(); ++i) {
-    const std::string piece = folder.Parts(node.pieces[i]);
-    const bool is_last = i + 1 == node.pieces.size();
-    const size_t found = is_last && node.at_end && name.text.ends_with(piece)
-                             ? name.text.size() - piece.size()
-                             : name.text.find(piece, at);
-    if (found == std::string::npos || piece.empty() || (i == 0 && node.at_start && found != 0)) {
-      return;
+  std::vector<NamePieces::Place> places;
+  if (NamePieces(node, folder).Fits(name.text, &places)) {
+    for (const NamePieces::Place& place : places) {
+      AddMark(name, place.start, place.end, marks);
     }
-    AddMark(name, found, found + piece.size(), found_marks);
-    at = found + piece.size();
   }
-  marks.insert(marks.end(), found_marks.begin(), found_marks.end());
 }
 
-// As RowCheck compares them; the dot is not marked.
+// The dot is not marked.
 void MarkEnding(const QueryNode& node, const SeenName& name, NameFolder& folder,
                 std::vector<Snippet::Mark>& marks) {
   for (const std::string& ending : node.names) {
     const std::string tail = folder.Parts(ending);
-    if (name.text.size() > tail.size() + 1 && name.text.ends_with("." + tail)) {
+    if (HasEnding(name.text, tail)) {
       AddMark(name, name.text.size() - tail.size(), name.text.size(), marks);
     }
   }
@@ -171,31 +163,31 @@ int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, Te
       candidate.facts->text == 0) {
     return code;
   }
-  Statement read;
-  code = read.Prepare(rows.db, "SELECT packed FROM contents.texts WHERE id = ?1");
+  Statement* read = nullptr;
+  code = rows.statements.Find("SELECT packed FROM contents.texts WHERE id = ?1", read);
   if (code != SQLITE_OK) {
     return code;
   }
-  read.BindInt(1, candidate.facts->text);
-  code = read.Step();
+  read->BindInt(1, candidate.facts->text);
+  code = read->Step();
   if (code != SQLITE_ROW) {
     return code == SQLITE_DONE ? SQLITE_OK : code;
   }
   Content content;
-  if (!UnpackTexts(read.Bytes(0), content)) {
+  if (!UnpackTexts(read->Bytes(0), content)) {
     return SQLITE_CORRUPT;
   }
   snippet = MakeSnippet(content, words, cutter);
   return SQLITE_OK;
 }
 
-std::string LanguageOf(sqlite3* entries, bool has_contents) {
-  Statement read;
+std::string LanguageOf(KeptStatements& statements, bool has_contents) {
+  Statement* read = nullptr;
   const bool found =
       has_contents &&
-      read.Prepare(entries, "SELECT language FROM contents.meta WHERE id = 1") == SQLITE_OK &&
-      read.Step() == SQLITE_ROW;
-  const std::string name = found ? LanguageName(read.Bytes(0)) : "";
+      statements.Find("SELECT language FROM contents.meta WHERE id = 1", read) == SQLITE_OK &&
+      read->Step() == SQLITE_ROW;
+  const std::string name = found ? LanguageName(read->Bytes(0)) : "";
   return name.empty() ? NO_LANGUAGE : name;
 }
 

@@ -23,6 +23,6 @@ int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, Te
                Snippet& snippet);
 
 // Of the share's contents; NO_LANGUAGE where nothing tells.
-std::string LanguageOf(sqlite3* entries, bool has_contents);
+std::string LanguageOf(KeptStatements& statements, bool has_contents);
 
 }  // namespace fileindexd

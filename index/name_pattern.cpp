@@ -22,10 +22,9 @@ bool IsAscii(std::string_view text) {
 
 // Whether each character is a word to the table of names.
 bool IsPaired(const std::string& folded) {
-  CharacterTable characters;
   for (size_t at = 0; at < folded.size();) {
     const Character character = CharacterAt(folded, at);
-    if (character.code < 0x80 || characters.Of(character.code).type != CharacterClass::PAIRED) {
+    if (character.code < 0x80 || ClassOf(character.code) != CharacterClass::PAIRED) {
       return false;
     }
     at += character.size;
@@ -35,42 +34,52 @@ bool IsPaired(const std::string& folded) {
 
 }  // namespace
 
-NamePattern::NamePattern(const QueryNode& pattern)
+NamePieces::NamePieces(const QueryNode& pattern, NameFolder& folder)
     : at_start(pattern.at_start), at_end(pattern.at_end) {
   for (const std::string& piece : pattern.pieces) {
-    pieces.push_back(folder.Parts(piece));
-  }
-  const auto paired = std::find_if(pieces.begin(), pieces.end(), IsPaired);
-  if (paired != pieces.end()) {
-    words_query = Quoted(folder.Words(*paired));
+    folded.push_back(folder.Parts(piece));
   }
 }
 
 // The earliest place of each piece leaves most room for the next; an anchored last one stands at
 // the end.
-bool NamePattern::Fits(std::string_view folded) const {
+bool NamePieces::Fits(std::string_view name, std::vector<Place>* places) const {
   size_t at = 0;
-  for (size_t i = 0; i < pieces.size(); ++i) {
-    const std::string& piece = pieces[i];
-    const bool is_last = i + 1 == pieces.size();
+  for (size_t i = 0; i < folded.size(); ++i) {
+    const std::string& piece = folded[i];
+    const bool is_last = i + 1 == folded.size();
+    size_t start = 0;
     if (is_last && at_end) {
-      const size_t start = folded.size() - std::min(folded.size(), piece.size());
-      return start >= at && folded.ends_with(piece) && (i > 0 || !at_start || start == 0);
+      start = name.size() - std::min(name.size(), piece.size());
+      if (start < at || !name.ends_with(piece) || (i == 0 && at_start && start != 0)) {
+        return false;
+      }
+    } else {
+      start = i == 0 && at_start ? (name.starts_with(piece) ? 0 : std::string_view::npos)
+                                 : name.find(piece, at);
+      if (start == std::string_view::npos) {
+        return false;
+      }
     }
-    at = i == 0 && at_start ? (folded.starts_with(piece) ? 0 : std::string_view::npos)
-                            : folded.find(piece, at);
-    if (at == std::string_view::npos) {
-      return false;
+    at = start + piece.size();
+    if (places != nullptr) {
+      places->push_back({start, at});
     }
-    at += piece.size();
   }
   return true;
+}
+
+NamePattern::NamePattern(const QueryNode& pattern) : pieces(pattern, folder) {
+  const auto paired = std::find_if(pieces.folded.begin(), pieces.folded.end(), IsPaired);
+  if (paired != pieces.folded.end()) {
+    words_query = Quoted(folder.Words(*paired));
+  }
 }
 
 // Trigrams, all of which the names hold. Empty for shorter pieces.
 std::string NamePattern::PartsQuery() const {
   std::string query;
-  for (const std::string& piece : pieces) {
+  for (const std::string& piece : pieces.folded) {
     const std::vector<size_t> starts = CharacterStarts(piece);
     for (size_t i = 0; i + 3 < starts.size(); ++i) {
       query += (query.empty() ? "" : " AND ") +
@@ -100,8 +109,8 @@ int NamePattern::Find(sqlite3* db, IdSet& ids) {
     return code;
   }
   // One trigram is the piece itself.
-  const bool is_sure = pieces.size() == 1 && !at_start && !at_end && !parts.empty() &&
-                       CharacterStarts(pieces.front()).size() == 4;
+  const bool is_sure = pieces.folded.size() == 1 && !pieces.at_start && !pieces.at_end &&
+                       !parts.empty() && CharacterStarts(pieces.folded.front()).size() == 4;
   return is_sure ? SQLITE_OK : Keep(db, false, ids);
 }
 

@@ -13,12 +13,28 @@
 
 namespace fileindexd {
 
+// The pieces of one pattern, folded as the names are.
+struct NamePieces {
+  struct Place {
+    size_t start;
+    size_t end;
+  };
+
+  NamePieces(const QueryNode& pattern, NameFolder& folder);
+  // `places`, if asked for: where the pieces stand; good only of what fits.
+  bool Fits(std::string_view name, std::vector<Place>* places = nullptr) const;
+
+  std::vector<std::string> folded;
+  bool at_start;
+  bool at_end;
+};
+
 // One thread.
 class NamePattern {
  public:
   explicit NamePattern(const QueryNode& pattern);
 
-  bool Fits(std::string_view folded) const;  // of the folded name
+  bool Fits(std::string_view folded) const { return pieces.Fits(folded); }  // of the folded name
   // The entries whose names fit. SQLite's code.
   int Find(sqlite3* db, IdSet& ids);
 
@@ -29,10 +45,8 @@ class NamePattern {
   bool FitsName(std::string_view name);
 
   NameFolder folder;
-  std::vector<std::string> pieces;  // folded
-  std::string words_query;          // where trigrams are too long, and words are characters
-  bool at_start;
-  bool at_end;
+  NamePieces pieces;
+  std::string words_query;  // where trigrams are too long, and words are characters
 };
 
 }  // namespace fileindexd

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/name_text.h"
 
+#include "base/utf8.h"
+
 namespace fileindexd {
 
 namespace {
@@ -80,6 +82,11 @@ std::string NameFolder::Fold(std::string_view name, bool apart, std::vector<uint
     origins->push_back(static_cast<uint32_t>(name.size()));
   }
   return text;
+}
+
+bool HasEnding(std::string_view name, std::string_view ending) {
+  return name.size() > ending.size() + 1 && name.ends_with(ending) &&
+         name[name.size() - ending.size() - 1] == '.';
 }
 
 std::string NameRow(NameFolder& folder, std::string_view name) {

@@ -32,6 +32,9 @@ class NameFolder {
   std::optional<CharacterTable> characters;  // for what is not ASCII; large
 };
 
+// Whether that ending stands behind a dot, and something before it. Both as Parts gives them.
+bool HasEnding(std::string_view name, std::string_view ending);
+
 // What stands in the table `names`.
 std::string NameRow(NameFolder& folder, std::string_view name);
 

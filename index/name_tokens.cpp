@@ -46,7 +46,9 @@ bool NameTokenizer::Open() {
 }
 
 std::vector<std::string> NameTokenizer::Tokens(std::string_view text) const {
+  constexpr size_t USUAL = 8;
   std::vector<std::string> tokens;
+  tokens.reserve(USUAL);
   (void)functions.xTokenize(tokenizer, &tokens, FTS5_TOKENIZE_QUERY, text.data(),
                             static_cast<int>(text.size()), Collect);
   return tokens;

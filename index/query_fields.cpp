@@ -68,6 +68,10 @@ constexpr NamedField FIELDS[] = {
 
 }  // namespace
 
+bool TakesRange(QueryField field) {
+  return field == F::NUMBER_FIELD || field == F::SIZE || field == F::MODIFIED || field == F::ADDED;
+}
+
 const NamedField* FindField(std::string_view name) {
   for (const NamedField& field : FIELDS) {
     if (std::string_view(field.name).size() == name.size() &&
@@ -79,14 +83,14 @@ const NamedField* FindField(std::string_view name) {
 }
 
 const char* NearField(std::string_view name) {
-  constexpr size_t SHORTEST = 4;
+  if (name.size() < 2) {
+    return nullptr;  // "C:\\x" is a place
+  }
   std::string lower(name);
   std::transform(lower.begin(), lower.end(), lower.begin(),
                  [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
   for (const NamedField& field : FIELDS) {
-    const std::string known = field.name;
-    if (std::max(known.size(), lower.size()) >= SHORTEST && known.size() + 1 >= SHORTEST &&
-        EditDistance(lower, known, 1) == 1) {
+    if (EditDistance(lower, field.name, 1) == 1) {
       return field.name;
     }
   }

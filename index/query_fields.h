@@ -35,10 +35,12 @@ struct NamedField {
   ContentField content;  // of TEXT_FIELD and NUMBER_FIELD
 };
 
+// Whether its values are compared: numbers, sizes and times.
+bool TakesRange(QueryField field);
+
 // Letter case does not count. Null: no such field.
 const NamedField* FindField(std::string_view name);
-// A field's name that differs from `name` by one slip; null: none. Of names of two or three letters
-// nearly everything would.
+// A field's name that differs from `name`, of at least two letters, by one slip; null: none.
 const char* NearField(std::string_view name);
 // The name that users know a text or number field by.
 const char* FieldName(ContentField field);

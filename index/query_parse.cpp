@@ -55,6 +55,7 @@ class Parser {
   bool ReadQuoted(Value& value);
   void ReadBare(Value& value);
   const NamedField* TakeField();
+  bool LacksColon() const;
   bool IsMistakenField(std::string& meant) const;
   size_t NameEnd() const;
 
@@ -162,8 +163,11 @@ bool Parser::ReadAll(QueryNode& node, int depth) {
     SkipBlanks();
     const bool ends = at == text.size() || (text[at] == ')' && open > 0) || IsAt("OR");
     if (ends && wants_more) {
-      return Fail(
-          "something is missing here (a word that is searched for stands in quotes: \"OR\")", at);
+      return Fail(at == text.size() ? "something to find is missing here"
+                  : text[at] == ')' ? "something to find is missing in front of this bracket"
+                                    : "OR stands between two things (the word stands in quotes: "
+                                      "\"OR\")",
+                  at);
     }
     if (ends) {
       break;
@@ -216,7 +220,7 @@ bool Parser::ReadGroup(QueryNode& node, int depth) {
 }
 
 bool Parser::ReadNot(QueryNode& node, size_t length, int depth) {
-  if (depth > MOST_DEPTH) {
+  if (depth >= MOST_DEPTH) {
     return Fail("too many NOT inside each other", at);
   }
   QueryNode negation;
@@ -258,17 +262,32 @@ const NamedField* Parser::TakeField() {
   return field;
 }
 
+// "size>10M".
+bool Parser::LacksColon() const {
+  const size_t end = NameEnd();
+  if (end + 1 >= text.size() || (text[end] != '<' && text[end] != '>') || IsBlank(text[end + 1])) {
+    return false;
+  }
+  const NamedField* field = FindField(std::string_view(text).substr(at, end - at));
+  return field != nullptr && TakesRange(field->field);
+}
+
 // What can only be meant for a field, and is none: a comparison or a quote behind a colon, or a
-// name that is one slip away from a field's. Words of names and texts hold colons too.
+// name that is one slip away from a field's. Words of names and texts hold colons too: addresses
+// ("http://x") and names in programs ("fs::path").
 bool Parser::IsMistakenField(std::string& meant) const {
   const size_t end = NameEnd();
   if (end == at || end + 1 >= text.size() || text[end] != ':' || IsBlank(text[end + 1])) {
     return false;
   }
+  const std::string_view value = std::string_view(text).substr(end + 1);
+  if (value.starts_with("//") || value.starts_with(':')) {
+    return false;
+  }
   const char* near = NearField(std::string_view(text).substr(at, end - at));
   meant = near == nullptr ? "" : near;
-  const char first = text[end + 1];
-  return first == '<' || first == '>' || first == '"' || (near != nullptr && first != '/');
+  const char first = value.front();
+  return first == '<' || first == '>' || first == '"' || near != nullptr;
 }
 
 bool Parser::ReadQuoted(Value& value) {
@@ -309,9 +328,14 @@ bool Parser::ReadLeaf(QueryNode& node) {
   }
   const size_t start = at;
   const NamedField* field = TakeField();
+  const std::string name = text.substr(at, NameEnd() - at);
+  if (field == nullptr && LacksColon()) {
+    return Fail("a colon is missing behind '" + name + "' (a word with " + text[NameEnd()] +
+                    " stands in quotes)",
+                start);
+  }
   std::string meant;
   if (field == nullptr && IsMistakenField(meant)) {
-    const std::string name = text.substr(at, NameEnd() - at);
     return Fail("there is no field '" + name + "'" + (meant.empty() ? "" : "; '" + meant + "'?") +
                     " (a word with a colon stands in quotes)",
                 start);
@@ -343,27 +367,6 @@ bool IsPositive(const QueryNode& node) {
     default:
       return true;
   }
-}
-
-std::string QueryError::Line(std::string_view question) const {
-  constexpr size_t SHOWN = 30;
-  std::string line = what;
-  std::replace_if(
-      line.begin(), line.end(), [](char c) { return static_cast<unsigned char>(c) < 0x20; }, ' ');
-  if (at >= question.size()) {
-    return line + (question.empty() ? "" : " (at its end)");
-  }
-  size_t characters = 1;
-  for (size_t i = 0; i < at; ++i) {
-    characters += (static_cast<unsigned char>(question[i]) & 0xc0) != 0x80 ? 1 : 0;
-  }
-  size_t end = std::min(at + SHOWN, question.size());
-  while (end < question.size() && (static_cast<unsigned char>(question[end]) & 0xc0) == 0x80) {
-    ++end;
-  }
-  std::string shown(question.substr(at, end - at));
-  std::replace_if(shown.begin(), shown.end(), IsBlank, ' ');
-  return line + " (character " + std::to_string(characters) + ", at: " + shown + ")";
 }
 
 bool ParseQuery(const std::string& text, time_t now, QueryNode& query, QueryError& error) {

@@ -27,12 +27,11 @@ bool Fail(QueryError& error, const std::string& what, size_t at) {
 
 // Whether the tables have words for it.
 bool HoldsWords(std::string_view text) {
-  CharacterTable characters;
   for (size_t at = 0; at < text.size();) {
     const Character character = CharacterAt(text, at);
     const CharacterClass type = character.code < 0x80
                                     ? ASCII_CLASSES[static_cast<size_t>(character.code)]
-                                    : characters.Of(character.code).type;
+                                    : ClassOf(character.code);
     if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK &&
         type != CharacterClass::JOINER) {
       return true;
@@ -80,6 +79,12 @@ bool FillPattern(const Value& value, Part part, QueryNode& node, QueryError& err
          Fail(error, "'*' alone stands for everything; add a part, as in name:*part*", value.at);
 }
 
+bool HoldsNoSlash(const Value& value, QueryError& error) {
+  const size_t slash = value.text.find('/');
+  return slash == std::string::npos ||
+         Fail(error, "no name holds a '/'; path: looks in whole paths", value.at + slash);
+}
+
 // In quotes it is the whole name, but for what a '*' stands for.
 bool FillName(const Value& value, QueryNode& node, QueryError& error) {
   const size_t star = value.text.find('*');
@@ -87,9 +92,12 @@ bool FillName(const Value& value, QueryNode& node, QueryError& error) {
   if ((star != std::string::npos && !is_beginning) || value.has_star) {
     node.at_start = value.text.front() != '*';
     node.at_end = value.text.back() != '*' && !value.has_star;
-    return FillPattern(value, Part::NAME_PATTERN, node, error);
+    return HoldsNoSlash(value, error) && FillPattern(value, Part::NAME_PATTERN, node, error);
   }
   if (value.is_quoted) {
+    if (!HoldsNoSlash(value, error)) {
+      return false;
+    }
     node.part = Part::EXACT_NAME;
     node.text = value.text;
     return true;
@@ -153,6 +161,9 @@ bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
   node.names = SplitAt(value.text, ',');
   for (std::string& name : node.names) {
     name.erase(0, name.starts_with('.') ? 1 : 0);
+    if (name.find('*') != std::string::npos) {
+      return Fail(error, "ext: takes no '*'; names with gaps are found by name:*.jp*", value.at);
+    }
     if (name.empty() || name.find('/') != std::string::npos) {
       return Fail(error, "'" + value.text + "' is no ending of names like pdf or jpg,png",
                   value.at);

@@ -135,19 +135,21 @@ bool EntryReader::ForEachOfInode(uint64_t inode, const std::function<bool(const 
   return VisitAll(statement, visit, going);
 }
 
-bool EntryReader::Find(const std::string& path, Entry& entry) {
+IndexError EntryReader::Find(const std::string& path, std::optional<Entry>& entry) {
   Statement statement;
-  if (statement.Prepare(database.db, "SELECT " FILEINDEX_ENTRY_COLUMNS
-                                     " FROM entries WHERE path = ?1") != SQLITE_OK) {
-    return false;
+  int code = statement.Prepare(database.db,
+                               "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1");
+  statement.BindBlob(1, path);
+  code = code == SQLITE_OK ? statement.Step() : code;
+  if (code != SQLITE_ROW && code != SQLITE_DONE) {
+    return FromSqlite(code);
   }
 
-  statement.BindBlob(1, path);
-  if (statement.Step() != SQLITE_ROW) {
-    return false;
+  entry.reset();
+  if (code == SQLITE_ROW) {
+    ReadEntry(statement, entry.emplace());
   }
-  ReadEntry(statement, entry);
-  return true;
+  return IndexError::NONE;
 }
 
 bool EntryReader::CountBelow(const std::string& directory, uint64_t limit, uint64_t& below) {

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 
 #include "index/database.h"
@@ -36,8 +37,8 @@ class EntryReader {
   // it returns false. False when reading failed.
   bool ForEach(const std::string& under, const std::function<bool(const Entry&)>& visit);
 
-  // The entry at exactly that path. False when there is none, or reading failed.
-  bool Find(const std::string& path, Entry& entry);
+  // The entry at exactly that path, if there is one. NONE, or why that cannot be told.
+  IndexError Find(const std::string& path, std::optional<Entry>& entry);
 
   // Calls `visit` with each entry of that inode, in no order, until it returns false. False when
   // reading failed.

@@ -180,8 +180,7 @@ bool RowCheck::MatchesEnding(const QueryNode& node, Candidate& candidate) {
   const std::string& name = rows.FoldedName(candidate);
   return candidate.entry.kind != Kind::FOLDER &&
          std::any_of(node.names.begin(), node.names.end(), [&](const std::string& ending) {
-           const std::string tail = "." + folder.Parts(ending);
-           return name.size() > tail.size() && name.ends_with(tail);
+           return HasEnding(name, folder.Parts(ending));
          });
 }
 

@@ -61,7 +61,8 @@ const DatabaseForm ENTRIES_FORM = {
     .application = ENTRIES_APPLICATION,
     .version = ENTRIES_VERSION,
     .schema = ENTRIES_SCHEMA,
-    .probe = "SELECT entries FROM meta WHERE id = 1",
+    .probe = "entries",
+    .probed = "meta WHERE id = 1",
     .prepare = nullptr,
 };
 

@@ -5,13 +5,12 @@
 #include <deque>
 #include <iterator>
 #include <set>
-#include <system_error>
-#include <thread>
 #include <utility>
 
 #include "index/asked.h"
 #include "index/asked_share.h"
 #include "index/entry_table.h"
+#include "index/side_by_side.h"
 #include "index/suggestion.h"
 
 namespace fileindexd {
@@ -19,27 +18,6 @@ namespace fileindexd {
 namespace {
 
 constexpr uint64_t MOST_HITS = UINT64_MAX / 4;
-
-// Side by side: a slow share holds up no other. The last one is asked by this thread.
-void AskShares(const Question& question, const Asked& asked, const HitOrder& order, uint64_t wanted,
-               std::deque<AskedShare>& shares) {
-  std::vector<std::thread> threads;
-  for (AskedShare& share : shares) {
-    const auto ask = [&] { share.Ask(question, asked, order, wanted); };
-    if (&share == &shares.back()) {
-      ask();
-      break;
-    }
-    try {
-      threads.emplace_back(ask);
-    } catch (const std::system_error&) {
-      ask();  // no more threads: one after the other
-    }
-  }
-  for (std::thread& thread : threads) {
-    thread.join();
-  }
-}
 
 // Names of shares in a question that are none: null, or the first of them.
 const QueryNode* UnknownShare(const QueryNode& node, const Question& question) {
@@ -97,9 +75,12 @@ const QueryNode* UnknownFolder(const QueryNode& node, const std::deque<AskedShar
 struct Asker::Impl {
   std::deque<AskedShare> shares;
   NameMarker names;
+  CutterPool cutters;
+  SideBySide side_by_side;
   bool AskAll(const Question& question, Answer& answer, std::string& error);
   bool HasHits(Question question, const std::string& text);
   void Choose(const Question& question);
+  void Complete(std::vector<Hit>& hits);
 };
 
 // Shares that are not asked this time are closed.
@@ -114,6 +95,17 @@ void Asker::Impl::Choose(const Question& question) {
       shares.emplace_back(share);
     }
   }
+}
+
+void Asker::Impl::Complete(std::vector<Hit>& hits) {
+  std::vector<AskedShare*> shown;
+  for (AskedShare& share : shares) {
+    if (std::any_of(hits.begin(), hits.end(),
+                    [&](const Hit& hit) { return hit.share == share.name; })) {
+      shown.push_back(&share);
+    }
+  }
+  side_by_side.Run(shown.size(), [&](size_t i) { shown[i]->Complete(hits, cutters); });
 }
 
 // A suggestion that has no hit either is none.
@@ -145,9 +137,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   const uint64_t wanted = limit == 0 ? 0 : offset + limit;
   const HitOrder order = {question.sort, question.reverse};
   Choose(question);
-  if (!shares.empty()) {
-    AskShares(question, asked, order, wanted, shares);
-  }
+  // A slow share holds up no other.
+  side_by_side.Run(shares.size(), [&](size_t i) { shares[i].Ask(question, asked, order, wanted); });
 
   Answer made;
   BestHits best(wanted, order);
@@ -162,10 +153,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   const auto skipped = static_cast<std::ptrdiff_t>(std::min<uint64_t>(offset, best.hits.size()));
   made.hits.assign(std::make_move_iterator(best.hits.begin() + skipped),
                    std::make_move_iterator(best.hits.end()));
-  for (AskedShare& share : shares) {
-    if (question.shows) {
-      share.Complete(made.hits);
-    }
+  if (question.shows) {
+    Complete(made.hits);
   }
   const QueryNode* folder = made.total == 0 && made.failures.empty() && !shares.empty()
                                 ? UnknownFolder(asked.tree, shares)

@@ -31,14 +31,14 @@ bool HasPositiveLeaf(const Asked& asked) {
 
 }  // namespace
 
-ShareRun::ShareRun(sqlite3* entries, bool with_contents, const Question& in_question,
+ShareRun::ShareRun(KeptStatements& statements, bool with_contents, const Question& in_question,
                    const Asked& as_asked, const std::string& in_share, NameMarker& of_names)
     : question(in_question),
       asked(as_asked),
       share(in_share),
       wanted(WantedOf(in_question)),
-      rows(entries, with_contents),
-      sets(entries, with_contents, as_asked, in_share),
+      rows(statements, with_contents),
+      sets(statements, with_contents, as_asked, in_share),
       check(rows, sets),
       names(of_names),
       score(rows, sets, check, as_asked, of_names) {}
@@ -68,6 +68,7 @@ int ShareRun::Run(BestHits& best, uint64_t& total) {
     if (code == SQLITE_OK && !upper.everything && needs_texts) {
       code = WalkTexts(best);
     }
+    code = code == SQLITE_OK ? ReadWhole(best) : code;
   }
   total += answered;
   return code;
@@ -141,14 +142,16 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
       query.empty()) {
     return SQLITE_OK;
   }
-  Statement begins;
-  int code = begins.Prepare(rows.db, "SELECT rowid FROM names WHERE names MATCH ?1");
-  begins.BindText(1, query);
+  Statement* begins = nullptr;
+  int code = rows.statements.Find("SELECT rowid FROM names WHERE names MATCH ?1", begins);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  begins->BindText(1, query);
   IdSet first;
-  code = code == SQLITE_OK ? begins.Step() : code;
-  for (; code == SQLITE_ROW && first.Count() <= BLOCK; code = begins.Step()) {
-    if (upper.names.Has(begins.Int(0))) {
-      first.Add(begins.Int(0));
+  for (code = begins->Step(); code == SQLITE_ROW && first.Count() <= BLOCK; code = begins->Step()) {
+    if (upper.names.Has(begins->Int(0))) {
+      first.Add(begins->Int(0));
     }
   }
   if (code != SQLITE_DONE && code != SQLITE_ROW) {
@@ -164,15 +167,19 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
 }
 
 int ShareRun::RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest) {
-  Statement rank;
-  int code = rank.Prepare(rows.db,
-                          "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1 "
-                          "ORDER BY rowid DESC LIMIT 100000");
-  rank.BindText(1, query);
+  Statement* rank = nullptr;
+  int code = rows.statements.Find(
+      "SELECT rowid, name_rank(names) FROM names WHERE names MATCH ?1 "
+      "ORDER BY rowid DESC LIMIT 100000",
+      rank);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  rank->BindText(1, query);
   std::vector<std::pair<double, int64_t>> ranked;
-  for (code = code == SQLITE_OK ? rank.Step() : code; code == SQLITE_ROW; code = rank.Step()) {
-    if (upper.names.Has(rank.Int(0))) {
-      ranked.emplace_back(-sqlite3_column_double(rank.handle, 1), -rank.Int(0));
+  for (code = rank->Step(); code == SQLITE_ROW; code = rank->Step()) {
+    if (upper.names.Has(rank->Int(0))) {
+      ranked.emplace_back(-sqlite3_column_double(rank->handle, 1), -rank->Int(0));
     }
   }
   if (code != SQLITE_DONE) {
@@ -186,6 +193,28 @@ int ShareRun::RankByLength(const std::string& query, std::vector<int64_t>& ids, 
   }
   rest.Subtract(chosen);
   return SQLITE_OK;
+}
+
+// Of names that answer for sure and are many more than are wanted, the score needs little.
+bool ShareRun::IsShort(int64_t id) const {
+  return IsScored() && upper.names.Count() / 2 > wanted && lower.Has(id);
+}
+
+int ShareRun::ReadWhole(BestHits& best) {
+  best.Cut();
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < best.hits.size() && code == SQLITE_OK; ++i) {
+    Entry& entry = best.hits[i].entry;
+    Candidate candidate;
+    bool found = false;
+    if (IsShort(entry.id)) {
+      code = rows.Find(entry.id, candidate, found);
+      if (found) {
+        entry = std::move(candidate.entry);
+      }
+    }
+  }
+  return code;
 }
 
 int ShareRun::WalkNames(BestHits& best) {
@@ -215,7 +244,7 @@ int ShareRun::WalkNames(BestHits& best) {
     Candidate candidate;
     bool found = false;
     bool answers = false;
-    code = rows.Find(id, candidate, found);
+    code = IsShort(id) ? rows.FindShort(id, candidate, found) : rows.Find(id, candidate, found);
     if (code == SQLITE_OK && found) {
       code = Answers(candidate, answers);
     }
@@ -309,7 +338,7 @@ int ShareRun::CountTexts(const TextOrder& order) {
 // All rows that the attributes leave.
 int ShareRun::WalkRows(BestHits& best) {
   Statement read;
-  int code = read.Prepare(rows.db, RowsSql(asked.tree, rows.has_contents).c_str());
+  int code = read.Prepare(rows.statements.db, RowsSql(asked.tree, rows.has_contents).c_str());
   if (code != SQLITE_OK) {
     return code;
   }
@@ -332,8 +361,8 @@ int ShareRun::WalkRows(BestHits& best) {
 // From the top, until there is enough and what comes next stands lower. Rows of one key come in no
 // order.
 int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough) {
-  Statement read;
-  int code = read.Prepare(rows.db, sql.c_str());
+  Statement* read = nullptr;
+  int code = rows.statements.Find(sql, read);
   if (code != SQLITE_OK) {
     return code;
   }
@@ -341,8 +370,8 @@ int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enoug
   Block block;
   int64_t last_key = 0;
   uint64_t walked = 0;
-  for (code = read.Step(); code == SQLITE_ROW && walked < MOST_WALKED; code = read.Step()) {
-    const int64_t key = read.Int(ENTRY_COLUMN_COUNT);
+  for (code = read->Step(); code == SQLITE_ROW && walked < MOST_WALKED; code = read->Step()) {
+    const int64_t key = read->Int(ENTRY_COLUMN_COUNT);
     if (answered >= wanted && key != last_key) {
       is_enough = true;
       break;
@@ -350,7 +379,7 @@ int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enoug
     last_key = key;
     ++walked;
     Candidate candidate;
-    ReadEntry(read, candidate.entry);
+    ReadEntry(*read, candidate.entry);
     bool answers = false;
     int checked = Answers(candidate, answers);
     if (checked == SQLITE_OK && answers) {

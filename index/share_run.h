@@ -25,8 +25,8 @@ namespace fileindexd {
 class ShareRun {
  public:
   // All outlive it.
-  ShareRun(sqlite3* entries, bool with_contents, const Question& in_question, const Asked& as_asked,
-           const std::string& in_share, NameMarker& of_names);
+  ShareRun(KeptStatements& statements, bool with_contents, const Question& in_question,
+           const Asked& as_asked, const std::string& in_share, NameMarker& of_names);
 
   // Adds to `best` and to `total`. SQLite's code.
   int Run(BestHits& best, uint64_t& total);
@@ -55,6 +55,9 @@ class ShareRun {
   int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
   int Answers(Candidate& candidate, bool& answers);
   int AddHit(Candidate& candidate, BestHits& best, Block& block);
+  // Whether of a name only what its score needs is read, until it is known to be among the best.
+  bool IsShort(int64_t id) const;
+  int ReadWhole(BestHits& best);
   bool IsScored() const { return question.sort == SortBy::SCORE; }
   // Whoever walks by rank may stop once there are enough.
   bool BestComeFirst() const { return IsScored() && !question.reverse; }

@@ -75,17 +75,54 @@ std::vector<Wanted> WantedIn(std::optional<ContentField> field,
   return wanted;
 }
 
+// Whether all words that are looked for are shown from some place on: none shows more.
+class Completeness {
+ public:
+  explicit Completeness(const std::vector<Wanted>& tokens) {
+    for (const Wanted& token : tokens) {
+      last_starts[token.number] = NOWHERE;
+    }
+  }
+
+  void Add(const Place& place) {
+    last_starts[place.number] = place.start;
+    size_t first = place.start;
+    for (const auto& [number, start] : last_starts) {
+      first = start == NOWHERE || first == NOWHERE ? NOWHERE : std::min(first, start);
+    }
+    if (end == NOWHERE && first != NOWHERE && place.end < first + WIDTH - BEFORE) {
+      end = first + WIDTH;
+    }
+  }
+  // What stands there or behind is not shown.
+  bool IsBehind(size_t start) const { return start >= end; }
+
+ private:
+  static constexpr size_t NOWHERE = SIZE_MAX;
+  std::map<size_t, size_t> last_starts;  // by number
+  size_t end = NOWHERE;
+};
+
+// All, or as far as those behind do not count.
 std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& tokens,
                             TextCutter& cutter) {
   std::vector<Place> places;
+  if (tokens.empty()) {
+    return places;
+  }
+  Completeness shown(tokens);
   std::map<size_t, size_t> counts;  // a common word does not hide a rare one
   cutter.Cut(text, false, [&](std::string_view token, size_t start, size_t end) {
+    if (shown.IsBehind(start)) {
+      return false;
+    }
     for (const Wanted& wanted : tokens) {
       const bool same =
           wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token;
       const bool known = !places.empty() && places.back().start == start;
       if (same && !known && ++counts[wanted.number] <= MOST_PLACES) {
         places.push_back({start, end, wanted.number});
+        shown.Add(places.back());
       }
     }
     return true;

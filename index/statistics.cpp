@@ -31,7 +31,8 @@ class Merge {
       std::string key = before;
       EntryGroup& sum = sums[key.append(name)];
       sum.share = by_share ? share : "";
-      sum.name = name;
+      sum.name = group.name;
+      sum.is_others = group.is_others;
       sum.entries += group.entries;
       sum.bytes = AddedBytes(sum.bytes, group.bytes);
     }

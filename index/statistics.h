@@ -59,6 +59,7 @@ struct EntryGroup {
   std::string name;
   uint64_t entries = 0;
   int64_t bytes = 0;
+  bool is_others = false;  // of all that are not told by name; the name is OTHER_NAMES
 };
 
 struct LargeFile {

@@ -12,6 +12,7 @@ namespace fileindexd {
 
 namespace {
 
+constexpr const char* OTHERS_KEY = " ";  // no group has that name
 constexpr int64_t DAY = int64_t{24} * 60 * 60 * 1'000'000'000;
 
 // Without a copy; good until the next step.
@@ -101,12 +102,13 @@ void GroupCounts::Add(std::string_view name, const CountedEntry& entry) {
   auto group = groups.find(key);
   if (group == groups.end()) {
     if (is_settled) {
-      key = OTHER_NAMES;
+      key = OTHERS_KEY;
     } else if (groups.size() >= 2 * MOST_GROUPS) {
       KeepGreatest();
     }
     group = groups.try_emplace(key).first;
-    group->second.name = key;
+    group->second.is_others = is_settled;
+    group->second.name = is_settled ? OTHER_NAMES : key;
   }
   ++group->second.entries;
   group->second.bytes = AddedBytes(group->second.bytes, entry.is_further_name ? 0 : entry.size);

@@ -7,6 +7,8 @@
 #include <cstdlib>
 #include <memory>
 
+#include "base/utf8.h"
+
 namespace fileindexd {
 
 namespace {
@@ -48,36 +50,6 @@ bool IsIn(const Range (&ranges)[COUNT], int32_t code) {
   const auto* range = std::upper_bound(std::begin(ranges), std::end(ranges), code,
                                        [](int32_t c, const Range& r) { return c <= r.last; });
   return range != std::end(ranges) && code >= range->first;
-}
-
-CharacterClass ClassOf(int32_t code) {
-  if (IsIn(PAIRED, code)) {
-    return CharacterClass::PAIRED;
-  }
-  if (IsIn(ACCENTS, code)) {
-    return CharacterClass::MARK;
-  }
-  switch (utf8proc_category(code)) {
-    case UTF8PROC_CATEGORY_LU:
-    case UTF8PROC_CATEGORY_LT:
-      return CharacterClass::UPPER;
-    case UTF8PROC_CATEGORY_LL:
-    case UTF8PROC_CATEGORY_LM:
-    case UTF8PROC_CATEGORY_LO:
-    case UTF8PROC_CATEGORY_MN:
-    case UTF8PROC_CATEGORY_MC:
-    case UTF8PROC_CATEGORY_CO:
-      return CharacterClass::LETTER;
-    case UTF8PROC_CATEGORY_ND:
-    case UTF8PROC_CATEGORY_NL:
-    case UTF8PROC_CATEGORY_NO:
-      return CharacterClass::DIGIT;
-    case UTF8PROC_CATEGORY_CF:
-    case UTF8PROC_CATEGORY_ME:
-      return CharacterClass::MARK;
-    default:
-      return CharacterClass::SEPARATOR;
-  }
 }
 
 std::string Mapped(std::string_view text, int options) {
@@ -128,6 +100,36 @@ int32_t Voiced(int32_t kana, bool half) {
 
 const std::array<CharacterClass, 128> ASCII_CLASSES = AsciiClasses();
 
+CharacterClass ClassOf(int32_t code) {
+  if (IsIn(PAIRED, code)) {
+    return CharacterClass::PAIRED;
+  }
+  if (IsIn(ACCENTS, code)) {
+    return CharacterClass::MARK;
+  }
+  switch (utf8proc_category(code)) {
+    case UTF8PROC_CATEGORY_LU:
+    case UTF8PROC_CATEGORY_LT:
+      return CharacterClass::UPPER;
+    case UTF8PROC_CATEGORY_LL:
+    case UTF8PROC_CATEGORY_LM:
+    case UTF8PROC_CATEGORY_LO:
+    case UTF8PROC_CATEGORY_MN:
+    case UTF8PROC_CATEGORY_MC:
+    case UTF8PROC_CATEGORY_CO:
+      return CharacterClass::LETTER;
+    case UTF8PROC_CATEGORY_ND:
+    case UTF8PROC_CATEGORY_NL:
+    case UTF8PROC_CATEGORY_NO:
+      return CharacterClass::DIGIT;
+    case UTF8PROC_CATEGORY_CF:
+    case UTF8PROC_CATEGORY_ME:
+      return CharacterClass::MARK;
+    default:
+      return CharacterClass::SEPARATOR;
+  }
+}
+
 Character CharacterAt(std::string_view text, size_t at) {
   const auto* bytes = reinterpret_cast<const utf8proc_uint8_t*>(text.data() + at);
   if (*bytes < 0x80) {
@@ -137,13 +139,6 @@ Character CharacterAt(std::string_view text, size_t at) {
   const utf8proc_ssize_t size =
       utf8proc_iterate(bytes, static_cast<utf8proc_ssize_t>(text.size() - at), &code);
   return size > 0 ? Character{code, static_cast<size_t>(size)} : Character{0, 1};
-}
-
-void AppendUtf8(int32_t code, std::string& text) {
-  std::array<utf8proc_uint8_t, 4> bytes{};
-  const utf8proc_ssize_t size = utf8proc_encode_char(code, bytes.data());
-  text.append(reinterpret_cast<const char*>(bytes.data()),
-              size > 0 ? static_cast<size_t>(size) : 0);
 }
 
 int32_t Joined(int32_t first, int32_t second) {
@@ -178,7 +173,7 @@ std::string LowerComposed(std::string_view text) {
   return Mapped(text, UTF8PROC_COMPOSE | UTF8PROC_COMPAT | UTF8PROC_CASEFOLD);
 }
 
-CharacterTable::CharacterTable() : known(TABLE_SIZE) {}
+CharacterTable::CharacterTable() : known(MakeZeroed<Entry>(TABLE_SIZE)) {}
 
 const CharacterTable::Entry& CharacterTable::Of(int32_t code) {
   Entry& entry = code < TABLE_SIZE ? known[static_cast<size_t>(code)] : other;

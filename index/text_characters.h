@@ -6,7 +6,8 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
-#include <vector>
+
+#include "base/zeroed.h"
 
 namespace fileindexd {
 
@@ -27,7 +28,8 @@ struct Character {
 };
 Character CharacterAt(std::string_view text, size_t at);
 
-void AppendUtf8(int32_t code, std::string& text);
+// By itself: '_' is a separator here, and a joiner only in the table of ASCII.
+CharacterClass ClassOf(int32_t code);
 
 // Of ASCII, by byte.
 extern const std::array<CharacterClass, 128> ASCII_CLASSES;
@@ -56,8 +58,8 @@ class CharacterTable {
   int32_t Plain(int32_t code);
 
  private:
-  std::vector<Entry> known;  // of the alphabets, by code
-  Entry other;               // the last one beyond them
+  Zeroed<Entry> known;  // of the alphabets, by code
+  Entry other;          // the last one beyond them
 };
 
 // Without accents; of text in lower case.

@@ -43,7 +43,9 @@ Stems::Stems(const std::string& language) {
   }
   stemmer = sb_stemmer_new(language.c_str(), nullptr);
   is_good = stemmer != nullptr;
-  known.resize(is_good ? SLOTS : 0);
+  if (is_good) {
+    known = MakeZeroed<Known>(SLOTS);
+  }
 }
 
 Stems::~Stems() {
@@ -94,6 +96,11 @@ std::string LanguageName(std::string_view given) {
   }
   const std::vector<std::string> all = Languages();
   return std::binary_search(all.begin(), all.end(), name) ? name : "";
+}
+
+std::string LanguageOfWords(std::string_view given) {
+  const std::string name = LanguageName(given);
+  return name.empty() ? DEFAULT_LANGUAGE : name;
 }
 
 std::vector<std::string> Languages() {

@@ -6,6 +6,8 @@
 #include <string_view>
 #include <vector>
 
+#include "base/zeroed.h"
+
 struct sb_stemmer;
 
 namespace fileindexd {
@@ -34,7 +36,7 @@ class Stems {
 
   sb_stemmer* stemmer = nullptr;
   bool is_good = true;
-  std::vector<Known> known;
+  Zeroed<Known> known;  // none without a stemmer
 };
 
 }  // namespace fileindexd

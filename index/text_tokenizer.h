@@ -8,6 +8,10 @@
 // run alone, so that words are found without boundaries; one character is looked for as the
 // beginning of a pair. Identifiers (foo_bar, fooBar, v1.2) stand whole and in their parts, all in
 // one place. A question's words come whole, beside their stems.
+//
+// A document may be given to a table cut already, of the same words:
+//
+//   cut     CUT_MARK token…    tokens as in token_memory.h
 #pragma once
 
 #include <sqlite3.h>
@@ -23,6 +27,8 @@ namespace fileindexd {
 constexpr const char* TEXT_TOKENIZER = "fileindex";
 constexpr const char* DEFAULT_LANGUAGE = "english";
 constexpr const char* NO_LANGUAGE = "none";  // no stems
+// No text begins so: the first byte is in no UTF-8.
+constexpr std::string_view CUT_MARK = "\xff-cut";
 
 // Makes the tokenizer known to the connection: whoever reads or writes words needs it. SQLite's
 // code.
@@ -40,6 +46,8 @@ class TextCutter {
   // std::bad_alloc, and nothing else.
   using Visit = std::function<bool(std::string_view word, size_t start, size_t end)>;
   void Cut(std::string_view text, bool is_question, const Visit& visit);
+  // What may be given to a table of that language in place of the text.
+  std::string CutForTable(std::string_view text);
 
  private:
   struct Impl;
@@ -54,6 +62,8 @@ bool IsBeginning(std::string_view word);  // whether it matches beginnings
 
 // The name under which a language is kept ("en" and "English" are "english"); empty: not known.
 std::string LanguageName(std::string_view given);
+// That of a share's words, which may have been given none, or one that is not known any more.
+std::string LanguageOfWords(std::string_view given);
 std::vector<std::string> Languages();  // names, sorted, NO_LANGUAGE among them
 
 }  // namespace fileindexd

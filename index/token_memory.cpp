@@ -14,11 +14,15 @@ size_t TokenMemory::PlaceOf(std::string_view word) {
 }
 
 const std::string* TokenMemory::Find(std::string_view word) const {
+  if (slots.empty()) {
+    return nullptr;
+  }
   const Slot& slot = slots[PlaceOf(word)];
   return slot.word == word ? &slot.tokens : nullptr;
 }
 
 void TokenMemory::Remember(std::string_view word, const std::string& tokens) {
+  slots.resize(SLOTS);
   Slot& slot = slots[PlaceOf(word)];
   slot.word.clear();  // memory may run out in between
   slot.tokens = tokens;

@@ -5,17 +5,22 @@
 //   token   flags(1) length(1) bytes
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <string_view>
 #include <vector>
 
 namespace fileindexd {
 
+inline void AppendToken(std::string& tokens, int flags, std::string_view token) {
+  tokens += static_cast<char>(flags);
+  tokens += static_cast<char>(token.size());
+  tokens += token;
+}
+
 class TokenMemory {
  public:
   static constexpr size_t MOST_BYTES = 48;  // of a word that is kept
-
-  TokenMemory() : slots(SLOTS) {}
 
   // Null when that word is not remembered.
   const std::string* Find(std::string_view word) const;
@@ -30,7 +35,7 @@ class TokenMemory {
   };
   static size_t PlaceOf(std::string_view word);
 
-  std::vector<Slot> slots;
+  std::vector<Slot> slots;  // none before the first word
 };
 
 }  // namespace fileindexd

@@ -62,11 +62,14 @@ int WordSets::ReadEndings(const QueryNode& node) {
       set.everything = true;
       return SQLITE_OK;
     }
-    Statement match;
-    int code = match.Prepare(db, "SELECT rowid FROM names WHERE names MATCH ?1");
     const std::string query = Quoted(words + " " + NAME_END);
-    match.BindText(1, query);
-    code = code == SQLITE_OK ? ReadIds(match, INT64_MAX, set.names) : code;
+    Statement* match = nullptr;
+    int code = statements.Find("SELECT rowid FROM names WHERE names MATCH ?1", match);
+    if (code != SQLITE_OK) {
+      return code;
+    }
+    match->BindText(1, query);
+    code = ReadIds(*match, INT64_MAX, set.names);
     if (code != SQLITE_OK) {
       return code;
     }
@@ -88,19 +91,20 @@ int WordSets::ReadFew(Statement& statement, WordSet& set) {
 // What a small folder holds.
 int WordSets::ReadUnder(const QueryNode& node) {
   const PathRange range(node.names.front());
-  Statement below;
-  const int code = below.Prepare(db,
-                                 "SELECT id FROM entries WHERE path = ?1 UNION ALL "
-                                 "SELECT id FROM entries WHERE path > ?2 AND path < ?3");
+  Statement* below = nullptr;
+  const int code = statements.Find(
+      "SELECT id FROM entries WHERE path = ?1 UNION ALL "
+      "SELECT id FROM entries WHERE path > ?2 AND path < ?3",
+      below);
   if (code != SQLITE_OK) {
     return code;
   }
-  below.BindBlob(1, node.names.front());
-  below.BindBlob(2, range.first);
-  below.BindBlob(3, range.end);
+  below->BindBlob(1, node.names.front());
+  below->BindBlob(2, range.first);
+  below->BindBlob(3, range.end);
   WordSet& set = sets[&node];
   set.is_sure = true;
-  return ReadFew(below, set);
+  return ReadFew(*below, set);
 }
 
 // The large ones, and those of some weeks.
@@ -110,20 +114,21 @@ int WordSets::ReadRange(const QueryNode& node) {
   if (!by_size && !by_week) {
     return SQLITE_OK;
   }
-  Statement inside;
-  const int code = inside.Prepare(
-      db, by_size ? "SELECT id FROM entries INDEXED BY entries_large "
-                    "WHERE size >= 1048576 AND size >= ?1 AND size <= ?2"
-                  : "SELECT id FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND "
-                    "mtime / 604800000000000 >= ?1 AND mtime / 604800000000000 <= ?2");
+  Statement* inside = nullptr;
+  const int code = statements.Find(
+      by_size ? "SELECT id FROM entries INDEXED BY entries_large "
+                "WHERE size >= 1048576 AND size >= ?1 AND size <= ?2"
+              : "SELECT id FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND "
+                "mtime / 604800000000000 >= ?1 AND mtime / 604800000000000 <= ?2",
+      inside);
   if (code != SQLITE_OK) {
     return code;
   }
-  inside.BindInt(1, by_size ? node.lowest : node.lowest / WEEK);
-  inside.BindInt(2, by_size ? node.highest : node.highest / WEEK);
+  inside->BindInt(1, by_size ? node.lowest : node.lowest / WEEK);
+  inside->BindInt(2, by_size ? node.highest : node.highest / WEEK);
   WordSet& set = sets[&node];
   set.is_sure = by_size;
-  return ReadFew(inside, set);
+  return ReadFew(*inside, set);
 }
 
 const WordSet& WordSets::Of(const QueryNode& leaf) const {

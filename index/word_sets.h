@@ -12,8 +12,8 @@
 
 #include "index/asked.h"
 #include "index/id_set.h"
+#include "index/kept_statements.h"
 #include "index/text_marks.h"
-#include "state/sqlite.h"
 
 namespace fileindexd {
 
@@ -33,9 +33,12 @@ struct WordSet {
 
 class WordSets {
  public:
-  WordSets(sqlite3* entries, bool with_contents, const Asked& in_question,
+  WordSets(KeptStatements& in_statements, bool with_contents, const Asked& in_question,
            const std::string& of_share)
-      : db(entries), has_contents(with_contents), asked(in_question), share(of_share) {}
+      : statements(in_statements),
+        has_contents(with_contents),
+        asked(in_question),
+        share(of_share) {}
 
   // SQLite's codes. Where one word that must be there is rare, what the others have beside it is
   // left out; ReadAll leaves nothing out.
@@ -84,7 +87,7 @@ class WordSets {
     return static_cast<size_t>(&leaf - asked.leaves.data());
   }
 
-  sqlite3* db;
+  KeptStatements& statements;
   bool has_contents;
   const Asked& asked;
   std::string share;
@@ -96,7 +99,8 @@ class WordSets {
   std::vector<TextMarks> marks;  // of the first few that say what to find
   std::vector<bool> is_marked;
   const WordLeaf* rarest = nullptr;  // what all answers have, and few
-  Statement ask_name, ask_text;
+  Statement* ask_name = nullptr;     // null: not asked for yet
+  Statement* ask_text = nullptr;
 };
 
 }  // namespace fileindexd

@@ -74,19 +74,19 @@ int WordSets::CountFew(const WordLeaf& leaf, Table table, int64_t& found) {
     return SQLITE_OK;
   }
   const bool in_names = table == Table::NAMES;
-  Statement few;
-  int code = few.Prepare(
-      db,
+  Statement* few = nullptr;
+  int code = statements.Find(
       in_names
           ? "SELECT count(*) FROM (SELECT 1 FROM names WHERE names MATCH ?1 LIMIT ?2)"
-          : "SELECT count(*) FROM (SELECT 1 FROM contents.words WHERE words MATCH ?1 LIMIT ?2)");
+          : "SELECT count(*) FROM (SELECT 1 FROM contents.words WHERE words MATCH ?1 LIMIT ?2)",
+      few);
   if (code != SQLITE_OK) {
     return code;
   }
-  few.BindText(1, in_names ? leaf.names_query : leaf.text_query);
-  few.BindInt(2, FEW + 1);
-  code = few.Step();
-  found = code == SQLITE_ROW ? few.Int(0) : 0;
+  few->BindText(1, in_names ? leaf.names_query : leaf.text_query);
+  few->BindInt(2, FEW + 1);
+  code = few->Step();
+  found = code == SQLITE_ROW ? few->Int(0) : 0;
   return code == SQLITE_ROW ? SQLITE_OK : code;
 }
 
@@ -121,7 +121,7 @@ int WordSets::ReadLeaf(const WordLeaf& leaf) {
   int code = SQLITE_OK;
   set.is_sure = leaf.node->part != Part::EXACT_NAME;
   if (leaf.node->part == Part::NAME_PATTERN) {
-    code = NamePattern(*leaf.node).Find(db, set.names);
+    code = NamePattern(*leaf.node).Find(statements.db, set.names);
   } else {
     set.everything = !set.is_sure && leaf.tokens.empty();
     bool is_whole = false;
@@ -143,30 +143,31 @@ int WordSets::ReadTable(const WordLeaf& leaf, Table table, const std::string& be
   }
   const bool in_names = table == Table::NAMES;
   const bool marks_it = !in_names && is_marked[NumberOf(leaf)];
-  Statement match;
-  int code = match.Prepare(
-      db, in_names   ? "SELECT rowid FROM names WHERE names MATCH ?1"
-          : marks_it ? "SELECT rowid, word_mark(words) FROM contents.words WHERE words MATCH ?1"
-                     : "SELECT rowid FROM contents.words WHERE words MATCH ?1");
+  Statement* match = nullptr;
+  int code = statements.Find(
+      in_names   ? "SELECT rowid FROM names WHERE names MATCH ?1"
+      : marks_it ? "SELECT rowid, word_mark(words) FROM contents.words WHERE words MATCH ?1"
+                 : "SELECT rowid FROM contents.words WHERE words MATCH ?1",
+      match);
   if (code != SQLITE_OK) {
     return code;
   }
   const std::string& own = in_names ? leaf.names_query : leaf.text_query;
   const std::string query = beside.empty() ? own : "(" + own + ") AND (" + beside + ")";
-  match.BindText(1, query);
+  match->BindText(1, query);
   WordSet& set = sets[leaf.node];
   IdSet& ids = in_names ? set.names : set.texts;
   int64_t found = 0;
   int64_t id = 0;
-  for (code = match.Step(); code == SQLITE_ROW && found < most; code = match.Step()) {
-    id = match.Int(0);
+  for (code = match->Step(); code == SQLITE_ROW && found < most; code = match->Step()) {
+    id = match->Int(0);
     if (id < 0 || id > MOST_ROWS) {
       return SQLITE_CORRUPT;
     }
     ++found;
     ids.Add(id);
     if (marks_it) {
-      marks[NumberOf(leaf)].Set(id, static_cast<uint16_t>(match.Int(1)));
+      marks[NumberOf(leaf)].Set(id, static_cast<uint16_t>(match->Int(1)));
     }
   }
   is_whole = code == SQLITE_DONE;
@@ -182,11 +183,12 @@ int WordSets::ReadTable(const WordLeaf& leaf, Table table, const std::string& be
 }
 
 int WordSets::LastId(Table table, int64_t& last) {
-  Statement read;
-  int code = read.Prepare(db, table == Table::NAMES ? "SELECT max(id) FROM entries"
-                                                    : "SELECT last_text FROM contents.meta");
-  code = code == SQLITE_OK ? read.Step() : code;
-  last = code == SQLITE_ROW ? read.Int(0) : 0;
+  Statement* read = nullptr;
+  int code = statements.Find(
+      table == Table::NAMES ? "SELECT max(id) FROM entries" : "SELECT last_text FROM contents.meta",
+      read);
+  code = code == SQLITE_OK ? read->Step() : code;
+  last = code == SQLITE_ROW ? read->Int(0) : 0;
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
@@ -226,39 +228,40 @@ int WordSets::ReadTableBeside(const WordLeaf& leaf, Table table) {
 
 int WordSets::AskName(const QueryNode& leaf, int64_t entry, bool& holds) {
   int code = SQLITE_OK;
-  if (ask_name.handle == nullptr) {
-    code = ask_name.Prepare(db, "SELECT 1 FROM names WHERE names MATCH ?1 AND rowid = ?2");
+  if (ask_name == nullptr) {
+    code = statements.Find("SELECT 1 FROM names WHERE names MATCH ?1 AND rowid = ?2", ask_name);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  ask_name.BindText(1, asked.LeafOf(leaf)->names_query);
-  ask_name.BindInt(2, entry);
-  code = ask_name.Step();
+  ask_name->BindText(1, asked.LeafOf(leaf)->names_query);
+  ask_name->BindInt(2, entry);
+  code = ask_name->Step();
   holds = code == SQLITE_ROW;
-  ask_name.Reset();
+  ask_name->Reset();
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
 int WordSets::AskText(const QueryNode& leaf, int64_t text, bool& holds) {
   int code = SQLITE_OK;
-  if (ask_text.handle == nullptr) {
-    code = ask_text.Prepare(db,
-                            "SELECT word_mark(words) FROM contents.words WHERE words MATCH ?1 AND "
-                            "rowid = ?2");
+  if (ask_text == nullptr) {
+    code = statements.Find(
+        "SELECT word_mark(words) FROM contents.words WHERE words MATCH ?1 AND "
+        "rowid = ?2",
+        ask_text);
   }
   if (code != SQLITE_OK) {
     return code;
   }
   const WordLeaf& asked_leaf = *asked.LeafOf(leaf);
-  ask_text.BindText(1, asked_leaf.text_query);
-  ask_text.BindInt(2, text);
-  code = ask_text.Step();
+  ask_text->BindText(1, asked_leaf.text_query);
+  ask_text->BindInt(2, text);
+  code = ask_text->Step();
   holds = code == SQLITE_ROW;
   if (holds) {
-    marks[NumberOf(asked_leaf)].Set(text, static_cast<uint16_t>(ask_text.Int(0)));
+    marks[NumberOf(asked_leaf)].Set(text, static_cast<uint16_t>(ask_text->Int(0)));
   }
-  ask_text.Reset();
+  ask_text->Reset();
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 

@@ -56,8 +56,8 @@ bool IsFullPathIndexed(const std::string& path, const std::vector<Folder>& folde
 
 }  // namespace IndexMgr
 
-// The configuration of the deepest of `folders` that covers `path`: an object of the four flags
-// "document", "audio", "video", "photo". Null when none covers it.
+// The configuration of the deepest of `folders` that covers `path`, for the indexer: what is in it
+// is between the two. Null when none covers it.
 Json::Value GetMostSuitableCfg(std::vector<Folder> folders, const std::string& path);
 
 }  // namespace fileindexd::TALO::FILEINDEX

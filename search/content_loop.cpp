@@ -94,7 +94,7 @@ Time ContentLoop::Due(Time now) const {
     return due;  // the helpers are dead or dying, and their ends are polled for
   }
 
-  const bool takes_jobs = pool != nullptr ? pool->Room() > 0 : true;
+  const bool takes_jobs = pool == nullptr || pool->Room() > 0;
   for (const auto& [name, followed] : shares) {
     due = std::min(due, followed.contents.Due());
     if (takes_jobs && followed.contents.MayHaveJobs(now)) {
@@ -159,22 +159,16 @@ void ContentLoop::Listen(Time now) {
     const Time good = is_told ? now + RELOAD_AGAIN : Time::max();
     next_reload = Reload() ? good : now + RELOAD_FAILED;
   }
-  for (const std::string& name : std::exchange(hints.remade, {})) {
+  Tell(hints.remade, &ShareContents::FilesChanged);
+  Tell(hints.shares, &ShareContents::EntriesChanged);
+  Tell(hints.closed, &ShareContents::EntriesClosed);
+}
+
+void ContentLoop::Tell(std::set<std::string>& names, void (ShareContents::*what)()) {
+  for (const std::string& name : std::exchange(names, {})) {
     const auto found = shares.find(name);
     if (found != shares.end()) {
-      found->second.contents.FilesChanged();
-    }
-  }
-  for (const std::string& name : std::exchange(hints.shares, {})) {
-    const auto found = shares.find(name);
-    if (found != shares.end()) {
-      found->second.contents.EntriesChanged();
-    }
-  }
-  for (const std::string& name : std::exchange(hints.closed, {})) {
-    const auto found = shares.find(name);
-    if (found != shares.end()) {
-      found->second.contents.EntriesClosed();
+      (found->second.contents.*what)();
     }
   }
 }
@@ -277,11 +271,11 @@ void ContentLoop::TakeOutcomes(Time now) {
     return;
   }
   std::vector<ExtractOutcome> outcomes = pool->Work();
+  if (!outcomes.empty()) {
+    TellLeftOut();  // before anything is counted that it explains
+  }
   for (ExtractOutcome& outcome : outcomes) {
     TakeOutcome(std::move(outcome), now);
-  }
-  if (!outcomes.empty()) {
-    TellLeftOut();
   }
 }
 
@@ -307,11 +301,13 @@ void ContentLoop::TakeOutcome(ExtractOutcome&& outcome, Time now) {
 }
 
 void ContentLoop::HandOut(Time now) {
-  size_t busy = 0;
+  size_t sharing = 0;  // the room for files and words
+  bool has_jobs = false;
   for (const auto& [name, followed] : shares) {
-    busy += followed.contents.MayHaveJobs(now) ? 1 : 0;
+    sharing += followed.contents.TakesRoom(now) ? 1 : 0;
+    has_jobs = has_jobs || followed.contents.MayHaveJobs(now);
   }
-  if (busy == 0 || now < pool_rest_until) {
+  if (!has_jobs || now < pool_rest_until) {
     return;
   }
   if (pool == nullptr) {
@@ -319,8 +315,8 @@ void ContentLoop::HandOut(Time now) {
   }
 
   for (auto& [name, followed] : shares) {
-    followed.contents.largest_batch = std::min(MOST_READY / busy, ShareContents::LARGEST_BATCH);
-    followed.contents.enough_pending = ContentsWriter::ENOUGH_PENDING / busy;
+    followed.contents.largest_batch = std::min(MOST_READY / sharing, ShareContents::LARGEST_BATCH);
+    followed.contents.enough_pending = ContentsWriter::ENOUGH_PENDING / sharing;
   }
   while (pool != nullptr && pool->Room() > 0 && HandOutOne(now)) {
   }

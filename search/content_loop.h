@@ -2,7 +2,9 @@
 // The content service: follows what the daemon commits, has what is wanted read by the pool of
 // helpers, and writes it down.
 //
-// DESIGN. One thread, which never waits but in poll, and for disks of our own:
+// DESIGN. One thread for all but what the shares' file systems are asked, and the cutting of texts
+// while one share alone has any (see opener.h). It never waits but in poll, and for disks of our
+// own:
 //
 //   watches      hints: a commit, other settings, the pause, the daemon's pid file
 //   permission   the daemon's end, the end of a pause
@@ -12,11 +14,11 @@
 //
 // A step takes in what was told, ends what the helpers ended, gives each share one slice, and hands
 // files to the helpers, one share after the other. Reading is child processes' work, and what a
-// share's file system is asked, which may never answer, is a thread's of that share (see opener.h).
-// The rest is SQLite's, which takes one writer at a time, and cutting words, which takes a quarter
-// of that: with as many helpers as processors, another thread had no processor of its own. Without
-// permission nothing is read and nothing written: what runs is killed and taken back, and it goes
-// on where it was.
+// share's file system is asked, which may never answer, is a thread's of that share.
+// The rest is SQLite's, which takes one writer at a time. Texts are packed and cut into words
+// beside it, by the thread that looked whether their file is still the same; where several shares
+// are at work, whose texts would add up, by the writer. Without permission nothing is read and
+// nothing written: what runs is killed and taken back, and it goes on where it was.
 #pragma once
 
 #include <poll.h>
@@ -26,6 +28,7 @@
 #include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -60,6 +63,8 @@ class ContentLoop {
   };
 
   void Listen(Time now);
+  // Those of the shares that are followed; `names` is empty then.
+  void Tell(std::set<std::string>& names, void (ShareContents::*what)());
   bool Reload();
   bool ReadState(std::string& problem);
   bool Follow(const Share& share, const std::string& folders,

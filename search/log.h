@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// Log lines of the content service: syslog, as `talocontentsearchd`, facility daemon.
+// Log lines of the content service: syslog, as `talocontentsearchd`, facility daemon, and all at
+// priority LOG_ERR, as the daemon's.
 #pragma once
 
 namespace fileindexd {

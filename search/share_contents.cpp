@@ -6,7 +6,6 @@
 #include <utility>
 
 #include "search/log.h"
-#include "state/belonging.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
 
@@ -188,7 +187,8 @@ bool ShareContents::ReleasePatient(Time now) {
   return true;
 }
 
-// With nothing more to come, at once: somebody may be waiting for it.
+// With nothing more to come, at once: somebody may be waiting for it. What is being read for longer
+// than a lull is slow, and is not waited for.
 Time ShareContents::CommitDue() const {
   if (!first_change) {
     return Time();
@@ -197,7 +197,11 @@ Time ShareContents::CommitDue() const {
   if (has_news || Sweeps() || may_have_jobs || is_opening || !ready.empty()) {
     return latest;
   }
-  return running.empty() ? Time() : std::min(latest, last_end + LULL);
+  Time newest;
+  for (const auto& [id, one] : running) {
+    newest = std::max(newest, one.since);
+  }
+  return running.empty() ? Time() : std::min({latest, last_end + LULL, newest + LULL});
 }
 
 bool ShareContents::CommitIfDue(Time now) {
@@ -275,11 +279,11 @@ Time ShareContents::Due() const {
   if (no_space) {
     return Time::max();
   }
-  Time due = next_full_look;
-  const bool has_work = Sweeps() || look_at_all || retry_wanted || (may_merge && IsIdle());
   if (is_asking_root && !root.has_value()) {
     return opener.Deadline();
   }
+  Time due = next_full_look;
+  const bool has_work = Sweeps() || look_at_all || retry_wanted || (may_merge && IsIdle());
   if (!writer.IsOpen()) {
     due = is_missing ? due : has_news || has_work ? Time() : std::min(due, later_look);
     return std::max(due, rest_until);

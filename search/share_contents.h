@@ -58,6 +58,9 @@ class ShareContents {
   // The next file to read. False when there is none now; MayHaveJobs tells whether to ask again.
   bool Next(Time now, uint64_t id, ExtractJob& job);
   bool MayHaveJobs(Time now) const;
+  // Whether it holds open files or words that are not written down, or may soon: all that do share
+  // the room there is for them.
+  bool TakesRoom(Time now) const;
   // What came of a file that was given out under that id; of one that was taken back: nothing.
   void End(ExtractOutcome&& outcome, Time now);
   // Takes back what was given out, and closes. For pauses: it goes on as it was.
@@ -77,24 +80,24 @@ class ShareContents {
 
   static constexpr size_t SMALLEST_BATCH = 4;
   static constexpr size_t LARGEST_BATCH = 64;
-  // What they were found to hold is kept meanwhile.
-  static constexpr size_t MOST_LOOKING = 4;
 
  private:
+  static constexpr std::chrono::hours BETWEEN_FULL_LOOKS{24};
   struct Ready {
     ContentJob job;
-    ScopedFd file;
+    std::shared_ptr<ScopedFd> file;  // this, and all that are open: kept by the opener
     std::string name;
   };
   struct Running {
     int64_t file = 0;
     FileIdentity identity;
-    ScopedFd open;  // the same open file, to be looked at afterwards
-    // It has ended so, and its file is being looked at.
-    std::optional<ExtractOutcome> outcome;
+    Time since;
+    std::shared_ptr<ScopedFd> open;  // the same as the job's, to be looked at afterwards
   };
   // Files that are being opened.
   struct Batch;
+  // One that was read, and is being looked at.
+  struct Ended;
   // Of a file that was not what the index knows: it is looked at again later.
   struct Patience {
     std::chrono::seconds rest{0};
@@ -119,14 +122,14 @@ class ShareContents {
 
   bool Refill(Time now);
   void TakeBatch(Batch& opened);
-  void TakeLook(uint64_t id, bool is_still);
+  void TakeLook(uint64_t id, const Ended& ended);
   bool BeginTries();
   void BePatient(int64_t file, Time now);
   void AdaptBatch(Time now);
 
-  bool HasRoom(Time now);  // rests if not
-  bool IsSound(RootState root, Time now);
-  void Ask(Opener::Question question, Time now);
+  bool HasRoom(Time now);                   // rests if not
+  bool IsSound(RootState state, Time now);  // rests if not
+  void Ask(Opener::Question question, Time now, Opener::Work work = nullptr);
   void TakeAnswers(Time now);
   void DropQuestions();
   void Rest(Time now, const std::string& reason);
@@ -135,13 +138,13 @@ class ShareContents {
   void Forget();
 
   ContentsWriter writer;
+  std::shared_ptr<ContentPreparer> preparer;  // null until it is needed
   Opener opener;
   bool is_asking_root = false;
   std::optional<RootState> root;  // the answer, until it is used
   bool is_opening = false;        // a batch
   size_t looking = 0;             // at files that were read
   Time answered;                  // the time, for answers
-  static constexpr std::chrono::hours BETWEEN_FULL_LOOKS{24};
   bool has_news = true;
   bool look_at_all = true;
   bool is_missing = false;  // there were no entries at the last opening

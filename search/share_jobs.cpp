@@ -1,8 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // The files of a share on their way to the helpers and back.
-#include <fcntl.h>
-
 #include <algorithm>
+#include <cassert>
 #include <memory>
 #include <utility>
 
@@ -23,6 +22,9 @@ using std::chrono::seconds;
 // rare, and shrinks while they are slow, so that what is newer need not wait behind it.
 constexpr milliseconds QUICK_BATCH(250);
 constexpr milliseconds SLOW_BATCH(1000);
+
+// Files that were read and are looked at again: what they were found to hold is kept meanwhile.
+constexpr size_t MOST_LOOKING = 4;
 
 constexpr seconds FIRST_PATIENCE(2);
 constexpr seconds LONGEST_PATIENCE(300);
@@ -73,6 +75,11 @@ bool ShareContents::MayHaveJobs(Time now) const {
   return writer.IsOpen() && CanWork(now) && looking < MOST_LOOKING && (!ready.empty() || may_open);
 }
 
+bool ShareContents::TakesRoom(Time now) const {
+  return writer.IsOpen() && CanWork(now) &&
+         (may_have_jobs || is_opening || !ready.empty() || !running.empty() || writer.HasChanges());
+}
+
 bool ShareContents::Next(Time now, uint64_t id, ExtractJob& job) {
   if (!MayHaveJobs(now) || (ready.empty() && !Refill(now))) {
     return false;
@@ -82,11 +89,11 @@ bool ShareContents::Next(Time now, uint64_t id, ExtractJob& job) {
   Running& begun = running[id];
   begun.file = next.job.file;
   begun.identity = next.job.identity;
-  ScopedFd same(fcntl(next.file.fd, F_DUPFD_CLOEXEC, 0));
-  begun.open.Swap(same);
+  begun.since = now;
+  begun.open = next.file;
 
   job.id = id;
-  job.file.Swap(next.file);
+  job.file = std::move(next.file);
   job.name = std::move(next.name);
   ready.pop_front();
   return true;
@@ -104,7 +111,7 @@ bool ShareContents::Refill(Time now) {
     return false;
   }
 
-  const auto asked = std::make_shared<Batch>();
+  auto asked = std::make_shared<Batch>();
   asked->share = share;
   for (ContentJob& job : jobs) {
     const auto known = patience.find(job.file);
@@ -116,11 +123,11 @@ bool ShareContents::Refill(Time now) {
   }
   if (!asked->files.empty()) {
     is_opening = true;
-    const auto open = [this, asked]() -> Opener::Answer {
+    auto open = [this, asked = std::move(asked)]() -> Opener::Answer {
       asked->Open();
       return [this, asked] { TakeBatch(*asked); };
     };
-    Ask(open, now);
+    Ask(std::move(open), now);
   }
   return !ready.empty();
 }
@@ -128,16 +135,24 @@ bool ShareContents::Refill(Time now) {
 void ShareContents::TakeBatch(Batch& opened) {
   const Time now = answered;
   is_opening = false;
-  if (!IsSound(opened.root, now)) {
-    return;
-  }
+  // First: what is open is not left to the batch, which would close it here. Closing is asking,
+  // too.
   for (Batch::File& one : opened.files) {
     if (one.opening == Opening::DONE) {
       Ready& next = ready.emplace_back();
-      next.file.Swap(one.file);
+      next.file = opener.Keep(one.file);
       next.name = one.path.substr(one.path.rfind('/') + 1);
       next.job = std::move(one.job);
-    } else if (one.opening == Opening::REFUSED) {
+    }
+  }
+  if (!IsSound(opened.root, now)) {
+    return;
+  }
+  for (const Batch::File& one : opened.files) {
+    if (one.opening == Opening::DONE) {
+      continue;
+    }
+    if (one.opening == Opening::REFUSED) {
       if (!writer.Fail(one.job.file, one.reason, {}, false)) {
         RestForError(now);
         return;
@@ -157,7 +172,7 @@ void ShareContents::TakeBatch(Batch& opened) {
 
 void ShareContents::AdaptBatch(Time now) {
   const auto took = now - refilled;
-  if (batch == 0 || took > SLOW_BATCH) {
+  if (took > SLOW_BATCH) {
     batch /= 2;
   } else if (took < QUICK_BATCH) {
     batch *= 2;
@@ -188,48 +203,73 @@ void ShareContents::BePatient(int64_t file, Time now) {
   patient_with.until = now + patient_with.rest;
 }
 
-// Another look at the file tells whether it is still what was to be read.
+// Belongs to the opener's thread until it is answered.
+struct ShareContents::Ended {
+  ExtractOutcome outcome;
+  std::shared_ptr<ScopedFd> file;
+  bool is_still = false;
+  PreparedContent found;
+};
+
+// Another look at the file tells whether it is still what was to be read. What takes no database is
+// done along with it.
 void ShareContents::End(ExtractOutcome&& outcome, Time now) {
   const auto found = running.find(outcome.id);
   if (found == running.end()) {
     return;
   }
   last_end = now;
-  const uint64_t id = outcome.id;
-  Running& ended = found->second;
-  ended.outcome = std::move(outcome);
+  // Of many shares at work, texts and what is made of them would add up.
+  const bool is_alone = enough_pending >= ContentsWriter::ENOUGH_PENDING;
+  if (!is_alone) {
+    preparer.reset();
+  } else if (preparer == nullptr) {
+    preparer = std::make_shared<ContentPreparer>(share.language);
+  }
 
-  const auto file = std::make_shared<ScopedFd>();
-  file->Swap(ended.open);
+  const uint64_t id = outcome.id;
+  const auto ended = std::make_shared<Ended>();
+  ended->outcome = std::move(outcome);
+  ended->file = std::move(found->second.open);
   ++looking;
-  const auto look = [this, id, file, identity = ended.identity]() -> Opener::Answer {
-    const bool is_still = IsStill(file->fd, identity);
-    file->Close();
-    return [this, id, is_still] { TakeLook(id, is_still); };
+  const auto look = [this, id, ended, identity = found->second.identity]() -> Opener::Answer {
+    ended->is_still = IsStill(ended->file->fd, identity);
+    ended->file.reset();
+    return [this, id, ended] { TakeLook(id, *ended); };
   };
-  Ask(look, now);
+  const auto prepare = [ended, with = preparer] {
+    if (ended->is_still && ended->outcome.result == ExtractOutcome::Result::DONE) {
+      ended->found.content = std::move(ended->outcome.content);
+      if (with != nullptr) {
+        with->Prepare(ended->found);
+      }
+    }
+  };
+  Ask(look, now, prepare);
 }
 
-void ShareContents::TakeLook(uint64_t id, bool is_still) {
+void ShareContents::TakeLook(uint64_t id, const Ended& ended) {
   const auto found = running.find(id);
-  if (found == running.end()) {
-    return;  // what it belonged to was taken back
-  }
+  assert(found != running.end());  // who takes back what runs drops the questions about it
   const Time now = answered;
   --looking;
   const int64_t file = found->second.file;
-  const ExtractOutcome outcome = std::move(*found->second.outcome);
+  const ExtractOutcome& outcome = ended.outcome;
   running.erase(found);
 
   bool good = false;
-  if (outcome.result == ExtractOutcome::Result::LOST || !is_still) {
+  const bool is_unread = outcome.result == ExtractOutcome::Result::UNREAD;
+  if (is_unread) {
+    ServiceDebug("Share[%s] a file waits, reason=%s", share.name.c_str(), outcome.reason.c_str());
+  }
+  if (outcome.result == ExtractOutcome::Result::LOST || is_unread || !ended.is_still) {
     BePatient(file, now);
     good = writer.Release(file);
   } else {
     patience.erase(file);
     switch (outcome.result) {
       case ExtractOutcome::Result::DONE:
-        good = writer.Finish(file, outcome.content);
+        good = writer.Finish(file, ended.found);
         break;
       case ExtractOutcome::Result::FAILED:
         good = writer.Fail(file, outcome.reason, outcome.content, false);

@@ -83,8 +83,8 @@ bool ShareContents::IsSound(RootState state, Time now) {
   return false;
 }
 
-void ShareContents::Ask(Opener::Question question, Time now) {
-  if (!opener.Ask(std::move(question), now)) {
+void ShareContents::Ask(Opener::Question question, Time now, Opener::Work work) {
+  if (!opener.Ask(std::move(question), now, std::move(work))) {
     Rest(now, "no thread can be had");
     return;
   }
@@ -136,6 +136,7 @@ void ShareContents::GoneOn() {
 
 void ShareContents::DropQuestions() {
   opener.Drop();
+  preparer.reset();  // a thread that hangs may come back to it
   is_asking_root = false;
   root.reset();
   is_opening = false;

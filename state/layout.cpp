@@ -44,6 +44,19 @@ bool MakeFolderAndParents(const std::string& path, std::string& error) {
   return MakeFolder(path, error);
 }
 
+// Whether an absolute path is as NormalPath gives it, as nearly all are. Not of "/".
+bool IsNormal(std::string_view path) {
+  for (size_t slash = 0; slash < path.size();) {
+    const size_t end = std::min(path.find('/', slash + 1), path.size());
+    const std::string_view component = path.substr(slash + 1, end - slash - 1);
+    if (component.empty() || component == "." || component == "..") {
+      return false;
+    }
+    slash = end;
+  }
+  return true;
+}
+
 }  // namespace
 
 std::string StateRoot() {
@@ -121,6 +134,9 @@ bool IsValidShareName(std::string_view name) {
 std::optional<std::string> NormalPath(std::string_view path) {
   if (path.empty() || path.front() != '/' || path.find('\0') != std::string_view::npos) {
     return std::nullopt;
+  }
+  if (IsNormal(path)) {
+    return std::string(path);
   }
   std::string normal;
   normal.reserve(path.size());

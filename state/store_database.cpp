@@ -16,20 +16,18 @@
 #include <thread>
 
 #include "base/scoped_fd.h"
-#include "state/filesystem.h"
 #include "state/layout.h"
 
 namespace fileindexd {
 
 namespace {
 
-constexpr int SCHEMA_VERSION = 4;
 constexpr int BUSY_WAIT_MS = 5000;
 constexpr std::chrono::milliseconds LOCK_WAIT(BUSY_WAIT_MS);
 constexpr std::chrono::milliseconds LOCK_NAP(5);
 
 // UPGRADES[n] leads from version n to n + 1. Paths and names are bytes, hence BLOB.
-constexpr const char* UPGRADES[SCHEMA_VERSION] = {
+constexpr const char* UPGRADES[STATE_VERSION] = {
     "CREATE TABLE share(name BLOB PRIMARY KEY, path BLOB NOT NULL UNIQUE,"
     " filesystem TEXT NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE folder(path BLOB PRIMARY KEY, share BLOB NOT NULL, document INT NOT NULL,"
@@ -122,11 +120,11 @@ Opened Failed(const StateConnection& connection, const char* what, int result, s
 
 Opened Upgrade(const StateConnection& connection, int64_t version, std::string& error) {
   int result = Exec(connection, "BEGIN IMMEDIATE");
-  for (int64_t at = version; result == SQLITE_OK && at < SCHEMA_VERSION; ++at) {
+  for (int64_t at = version; result == SQLITE_OK && at < STATE_VERSION; ++at) {
     result = Exec(connection, UPGRADES[at]);
   }
   if (result == SQLITE_OK) {
-    const std::string mark = "PRAGMA user_version=" + std::to_string(SCHEMA_VERSION);
+    const std::string mark = "PRAGMA user_version=" + std::to_string(STATE_VERSION);
     result = Exec(connection, mark.c_str());
   }
   if (result == SQLITE_OK) {
@@ -147,9 +145,9 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
   if (result != SQLITE_OK) {
     return Failed(connection, "cannot read", result, error);
   }
-  if (version > SCHEMA_VERSION) {
+  if (version > STATE_VERSION) {
     error = connection.path + " has version " + std::to_string(version) +
-            ", made by a newer program; this one knows " + std::to_string(SCHEMA_VERSION);
+            ", made by a newer program; this one knows " + std::to_string(STATE_VERSION);
     return Opened::FAILED;
   }
   // A copy exists only beside a database that had its tables: an empty one has lost them.
@@ -166,7 +164,7 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     error = connection.path + " is damaged";
     return Opened::DAMAGED;
   }
-  return version < SCHEMA_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
+  return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
 }
 
 // Whether closing writes the log back into the database and removes it. Off while the database is
@@ -197,42 +195,6 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
   }
   TidyOnClose(connection, true);
   return Opened::GOOD;
-}
-
-// The form in which SQLite takes options with a path.
-std::string Uri(const std::string& path, const char* options) {
-  constexpr char DIGITS[] = "0123456789abcdef";
-  std::string uri = "file:";
-  for (const char c : path) {
-    if (c == '%' || c == '?' || c == '#') {
-      const auto byte = static_cast<unsigned char>(c);
-      uri += {'%', DIGITS[byte / 16], DIGITS[byte % 16]};
-    } else {
-      uri += c;
-    }
-  }
-  return uri + options;
-}
-
-// On a full disk there is no room for the log and the shared memory that even a reader needs. What
-// was closed properly can be read without them. `error` is what kept it from being opened.
-bool OpenForReading(StateConnection& connection, const std::string& error) {
-  struct stat log {};
-  const std::string log_path = connection.path + "-wal";
-  if (HasSpace(StateRoot(), false) || (lstat(log_path.c_str(), &log) == 0 && log.st_size > 0)) {
-    return false;
-  }
-  const std::string uri = Uri(connection.path, "?immutable=1");
-  constexpr int FLAGS = SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_URI;
-  int64_t version = 0;
-  bool ok = false;
-  if (sqlite3_open_v2(uri.c_str(), &connection.db, FLAGS, nullptr) != SQLITE_OK ||
-      SchemaVersion(connection.db, version) != SQLITE_OK || version != SCHEMA_VERSION ||
-      QuickCheck(connection.db, ok) != SQLITE_OK || !ok) {
-    return false;
-  }
-  connection.read_only = error + "; its disk is full";
-  return true;
 }
 
 bool ReadAll(const std::string& path, std::string& bytes) {
@@ -375,7 +337,7 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     if (outcome == Opened::FAILED) {
       connection = std::make_unique<StateConnection>();
       connection->path = path;
-      return OpenForReading(*connection, error) ? std::move(connection) : nullptr;
+      return OpenFullState(*connection, error) ? std::move(connection) : nullptr;
     }
     if (recovered) {
       return nullptr;

@@ -45,5 +45,7 @@ CLI::Option* AddJson(CLI::App* command, Arguments& arguments, const char* help);
 // All that there are, in two parts.
 void DeclareManagement(Declarer& declare);
 void DeclareQuestions(Declarer& declare);
+// Of these the one that is run most often, and whose start should not be that of all.
+void DeclareSearch(Declarer& declare);
 
 }  // namespace fileindexd

@@ -4,9 +4,7 @@
 
 namespace fileindexd {
 
-namespace {
-
-void AddSearch(Declarer& declare) {
+void DeclareSearch(Declarer& declare) {
   Arguments& into = declare.arguments;
   CLI::App* search = declare.Add(&declare.app, "search", Search, "Search the index, best first",
                                  "--kind document --under /srv/projects 'annual report -draft'");
@@ -25,7 +23,7 @@ void AddSearch(Declarer& declare) {
             "Not the best first, but by name, or the largest or youngest first",
             {"name", "size", "modified"});
   search->add_flag("--reverse", into.reverse, "The other way round");
-  AddOption(search, "--limit", into.limit, "N", "At most so many hits; 20 if not given");
+  AddOption(search, "--limit", into.limit, "N", "At most so many hits, or 'all'; 20 if not given");
   AddOption(search, "--offset", into.offset, "N", "Leave out so many of the first");
   search->add_flag("--count", into.count,
                    "The number of hits alone, on a line; with --json as {\"count\":N}");
@@ -43,6 +41,8 @@ void AddSearch(Declarer& declare) {
       "of all. Options may stand between the words; what follows a lone -- is QUERY.\n\n" +
       search->get_footer());
 }
+
+namespace {
 
 void AddInfo(Declarer& declare) {
   Arguments& into = declare.arguments;
@@ -117,7 +117,7 @@ void DeclareQuestions(Declarer& declare) {
       declare.Add(&declare.app, "status", Status, "Show what is going on", "--follow");
   status->add_flag("--follow", into.follow, "Show it again whenever it has changed");
   AddJson(status, into, "One JSON document; with --follow one a line");
-  AddSearch(declare);
+  DeclareSearch(declare);
   AddInfo(declare);
   AddStats(declare);
   AddReports(declare);

@@ -5,6 +5,7 @@
 
 #include "index/writer.h"
 #include "platform/paths.h"
+#include "platform/standalone/configuration.h"
 #include "platform/standalone/environment.h"
 #include "platform/standalone/glance.h"
 #include "platform/standalone/pass_progress.h"
@@ -130,7 +131,7 @@ bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
     Seen kept;
     const Seen* seen = TakeGlance(path, kept) ? &kept : nullptr;
-    return writer.Add(path, FlagsOf(cfg), seen);
+    return writer.Add(path, FlagsOfConfiguration(cfg), seen);
   });
 }
 
@@ -139,7 +140,7 @@ bool Indexer::UpdateFSDocument(const std::string& path, const Json::Value& cfg,
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
     Seen kept;
     const Seen* seen = TakeGlance(path, kept) ? &kept : nullptr;
-    return writer.Refresh(path, FlagsOf(cfg), FlagsOf(data), seen);
+    return writer.Refresh(path, FlagsOfConfiguration(cfg), FlagsOf(data), seen);
   });
 }
 

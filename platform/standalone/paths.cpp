@@ -35,6 +35,8 @@ struct Glance {
 struct Glances {
   Glance kept;
   FolderView folder;
+  std::shared_ptr<const Settings> settings;  // null: to be asked for
+  int64_t settings_time = 0;                 // monotonic
 };
 
 Glances& OfThisThread() {
@@ -83,21 +85,28 @@ void NoteShortage(const Settings& settings, const std::string& path, const Look&
 }
 
 const Glance& GlanceAt(const std::string& path) {
-  auto& [kept, folder] = OfThisThread();
+  auto& [kept, folder, settings, settings_time] = OfThisThread();
   const int64_t now = Now();
   if (kept.settings == nullptr || kept.path != path || now - kept.time >= GLANCE_NS) {
-    kept.settings = CurrentSettings();
+    // Who changes them queues an event behind the change: they may be as old as a look when it is
+    // made, and as old again when it is used.
+    if (settings == nullptr || now - settings_time >= GLANCE_NS) {
+      settings = CurrentSettings();
+      settings_time = now;
+    }
+    kept.settings = settings;
     errno = 0;
     kept.look = LookNear(*kept.settings, path, folder);
     NoteShortage(*kept.settings, path, kept.look, errno);
     kept.thing = IsNameVerdict(kept.look.verdict) ? ThingAt(*kept.settings, path) : kept.look.thing;
     kept.path = path;
     kept.time = now;
-    // Between two passes a queue file is asked for. That look is not kept, nor the folder before
-    // it, and so nothing that was seen before the drain is believed after it.
+    // Between two passes a queue file is asked for. That look is not kept, nor the folder and the
+    // settings before it, and so nothing that was seen before the drain is believed after it.
     if (IsOutside(kept.look.verdict)) {
       kept.time = 0;
       folder = {};
+      settings.reset();
     }
   }
   return kept;

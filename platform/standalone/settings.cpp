@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <iterator>
 
+#include "platform/standalone/configuration.h"
 #include "platform/standalone/environment.h"
 #include "platform/standalone/uncancelled.h"
 #include "state/layout.h"
@@ -36,18 +37,9 @@ bool ReadFolders(std::vector<Folder>& folders) {
   });
 }
 
-// Made for each document: keys that are known to live for ever are not copied.
-Json::Value Flags(const Folder& folder) {
-  static const ::Json::StaticString document("document");
-  static const ::Json::StaticString audio("audio");
-  static const ::Json::StaticString video("video");
-  static const ::Json::StaticString photo("photo");
-  Json::Value flags(Json::objectValue);
-  flags[document] = folder.document;
-  flags[audio] = folder.audio;
-  flags[video] = folder.video;
-  flags[photo] = folder.photo;
-  return flags;
+unsigned BitsOf(const Folder& folder) {
+  return (folder.document ? CONFIGURED_DOCUMENT : 0) | (folder.audio ? CONFIGURED_AUDIO : 0) |
+         (folder.video ? CONFIGURED_VIDEO : 0) | (folder.photo ? CONFIGURED_PHOTO : 0);
 }
 
 }  // namespace
@@ -57,9 +49,13 @@ std::string Folder::GetFullPath() const {
 }
 
 Json::Value Folder::asJson() const {
-  Json::Value value = Flags(*this);
+  Json::Value value(Json::objectValue);
   value["share"] = share;
   value["path"] = path;
+  value["document"] = document;
+  value["audio"] = audio;
+  value["video"] = video;
+  value["photo"] = photo;
   return value;
 }
 
@@ -100,7 +96,7 @@ Json::Value GetMostSuitableCfg(std::vector<Folder> folders, const std::string& p
       deepest = &folder;
     }
   }
-  return deepest == nullptr ? Json::Value(Json::nullValue) : Flags(*deepest);
+  return deepest == nullptr ? Json::Value(Json::nullValue) : Json::Value(BitsOf(*deepest));
 }
 
 }  // namespace fileindexd::TALO::FILEINDEX

@@ -20,6 +20,7 @@ void Try(std::string_view frame, size_t text_cap) {
     return;
   }
 
+  Require(answer->sort != Answer::Sort::UNREAD || !answer->reason.empty(), "what failed is said");
   Require(answer->content.text.size() <= text_cap, "text is within its cap");
   Require(IsCleanText(answer->content.text), "text is clean");
   Require(DecodeAnswer(EncodeAnswer(*answer), text_cap, fault).has_value(),

@@ -117,7 +117,8 @@ class Index {
   void Run(const Question& question, const Asked& asked) {
     BestHits best(10, {});
     uint64_t total = 0;
-    ShareRun run(database.db, true, question, asked, "s", marker);
+    KeptStatements statements(database.db);
+    ShareRun run(statements, true, question, asked, "s", marker);
     Require(run.Run(best, total) == SQLITE_OK, "no error");
     best.Cut();
     Require(best.hits.size() <= total, "hits are counted");
@@ -129,7 +130,7 @@ class Index {
     counted.limit = 0;
     BestHits none(0, {});
     uint64_t again = 0;
-    ShareRun count(database.db, true, counted, asked, "s", marker);
+    ShareRun count(statements, true, counted, asked, "s", marker);
     Require(count.Run(none, again) == SQLITE_OK, "no error");
     Require(again == total, "counting finds as many as looking");
   }

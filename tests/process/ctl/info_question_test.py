@@ -112,7 +112,7 @@ class ReadingTest(InfoQuestionTest):
             contents.execute("UPDATE texts SET packed = x'00'")
         contents.close()
 
-        self.check_problem("cannot be read")
+        self.check_problem("^the index is damaged$")
         for name in os.listdir(os.path.dirname(self.contents())):
             os.unlink(f"{os.path.dirname(self.contents())}/{name}")
         self.write(self.contents(), "no database at all")
@@ -162,6 +162,13 @@ class QueryTest(InfoQuestionTest):
 
     def test_a_question_may_begin_with_a_minus(self):
         self.assertEqual(self.ask("-draft report")["text"], "-draft report")
+
+    def test_a_question_may_name_shares(self):
+        self.make_share("beta", folders=())
+
+        self.assertTrue(self.ask("share:alpha report")["matches"])
+        self.assertFalse(self.ask("share:beta report")["matches"])
+        self.ctl("info", self.path, "--query", "share:nope report", code=2)
 
     def test_what_is_no_question_is_refused(self):
         self.ctl("info", self.path, "--query", "", code=2)

@@ -5,7 +5,7 @@ import os
 import unicodedata
 
 from ctl.terminal import COLOUR, Terminal, marked, width
-from harness import IndexTest, main
+from harness import IndexTest, main, namespace
 from harness.machine import full_path, program
 from search.library import ContentsTest
 
@@ -143,6 +143,65 @@ class TerminalTest(ContentsTest):
         self.assertEqual(shown.err, b"")
         self.assertEqual(self.try_ctl("search", "--count", "lighthuose").out, b"0\n")
         self.assertEqual(self.ctl("search", "story").err, b"")
+
+    def test_nothing_found_is_told_to_people(self):
+        self.assertEqual(self.show("zzzzzz").out, "Nothing found.\n")
+        self.assertEqual(self.show("zzzzzz", "--limit", "0").out, "")
+        self.assertEqual(self.show("--count", "zzzzzz").out, "0\n")
+        for arguments in (["zzzzzz"], ["--json", "zzzzzz"], ["-0", "zzzzzz"]):
+            self.assertEqual(self.ctl("search", *arguments).out, b"")
+
+    def test_a_word_that_looks_for_no_field_is_told(self):
+        note = "There is no field 'type': 'type:pdf' was looked for as words.\n"
+        self.assertEqual(self.show("lighthouse type:pdf").out, note)
+        self.assertEqual(self.show("(zzz OR type:pdf) ext:txt -lighthouse").out, note)
+        piped = self.try_ctl("search", "type:pdf")
+        self.assertEqual((piped.code, piped.out, piped.err), (0, b"", note.encode()))
+        for words in ("12:30 zzzzzz", "http://zzzzzz", "fs::zzzzzz", "c:zzzzzz", '"type:pdf"',
+                      "zzzzzz -type:pdf"):
+            with self.subTest(words=words):
+                self.assertEqual(self.show(words).out, "Nothing found.\n")
+
+
+class MoreTest(IndexTest):
+    NOTE = "There are more than these 20: --limit N or --limit all shows them, --offset N the next."
+
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(files=[f"tower {n}.txt" for n in range(25)])
+        self.start()
+        self.await_drained("alpha")
+
+    def show(self, *arguments, columns=100):
+        return Terminal([program("fileindexctl"), "search", *arguments], columns).plain_lines()
+
+    def test_that_there_are_more_is_told_where_somebody_looks_on(self):
+        self.assertEqual(self.show("tower")[20:], [self.NOTE])
+        self.assertEqual(self.show("tower", "--offset", "4")[20:], [self.NOTE])
+        for line in self.show("tower", columns=30):
+            self.assertLess(width(line), 30, line)
+        self.assertEqual(" ".join(self.show("tower", columns=30)[20:]), self.NOTE)
+
+        into_file = f"{program('fileindexctl')} search tower >{namespace.RUN}/found"
+        self.assertEqual(Terminal(["sh", "-c", into_file], 80, err_too=True).out, f"{self.NOTE}\n")
+        with open(f"{namespace.RUN}/found", "rb") as file:
+            self.assertEqual(len(file.readlines()), 20)
+
+    def test_otherwise_nothing_is_told(self):
+        for count, *arguments in ((20, "--offset", "5"), (20, "--limit", "20"),
+                                  (3, "--limit", "3"), (25, "--limit", "all")):
+            with self.subTest(arguments=arguments):
+                lines = self.show("tower", *arguments)
+                self.assertEqual(len(lines), count)
+                self.assertTrue(all("tower" in line for line in lines), lines)
+        self.assertEqual(self.show("tower", "--count"), ["25"])
+        self.assertEqual(len(self.ctl("search", "tower").out.splitlines()), 20)
+
+    def test_all_are_shown_where_that_is_asked_for(self):
+        everything = self.ctl("search", "--limit", "all", "tower").out.splitlines()
+        self.assertEqual(len(set(everything)), 25)
+        rest = self.ctl("search", "--limit", "all", "--offset", "7", "tower").out.splitlines()
+        self.assertEqual(rest, everything[7:])
 
 
 class HostileNameTest(IndexTest):

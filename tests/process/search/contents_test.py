@@ -1,9 +1,11 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """From files to hits on what is inside them: what is read when, and what is not."""
 
+import contextlib
 import os
 import shutil
 import signal
+import sqlite3
 
 from harness import main, namespace
 from harness.awaiting import await_exit_of
@@ -154,19 +156,34 @@ class ContentsFollowTest(ScriptedTest):
         namespace.unmount(folder)
         self.await_hits("lighthouse", ["one.txt", "two.txt"])
 
+    def test_what_the_disk_does_not_give_is_read_when_it_does(self):
+        root = self.make_share(folders=())
+        for name in ("unread.txt", "good.txt"):
+            self.write(f"{root}/{name}", "lighthouse")
+        self.start()
+        self.ctl("folder", "add", root, "--document")
+        self.await_given("unread.txt")
+        self.await_counts(done=1, waiting=1, failed=0)
+
+        self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
+
+        self.await_hits("lighthouse", ["good.txt", "unread.txt"])
+        self.assertEqual(self.failed(), {})
+
 
 class PauseTest(ScriptedTest):
-    def setUp(self):
-        super().setUp()
+    def begin(self, name):
+        """A document that a helper is in the middle of: that helper."""
         self.root = self.make_share(folders=())
-        self.write(f"{self.root}/gate.txt", "lighthouse")
+        self.write(f"{self.root}/{name}", "lighthouse")
         self.daemon = self.start()
         self.ctl("folder", "add", self.root, "--document")
-        self.helper = self.await_given("gate.txt")
+        return self.await_given(name)
 
     def test_a_pause_stops_a_document_in_the_middle(self):
+        helper = self.begin("gate.txt")
         self.ctl("pause")
-        self.assertTrue(await_exit_of(self.helper))
+        self.assertTrue(await_exit_of(helper))
         self.assertEqual(self.given(), ["gate.txt"])
 
         self.open_gate()
@@ -175,17 +192,34 @@ class PauseTest(ScriptedTest):
         self.assertEqual(self.failed(), {})
         self.assertEqual(self.given(), ["gate.txt"] * 2)
 
+    def test_what_a_pause_stopped_is_no_try(self):
+        helper = self.begin("gatecrash.txt")
+        for given in (2, 3):
+            self.ctl("pause")
+            self.assertTrue(await_exit_of(helper))
+            self.ctl("resume")
+            helper = self.await_given("gatecrash.txt", given)
+
+        self.open_gate()
+
+        # That one and the next end over it: both tries, and not the second after the first pause.
+        self.await_counts(failed=1, waiting=0)
+        self.assertEqual(self.failed(), {"gatecrash.txt": ("the helper ended with SIGABRT", 2)})
+        self.assertEqual(self.given(), ["gatecrash.txt"] * 4)
+
     def test_a_pause_ends_by_itself(self):
+        helper = self.begin("gate.txt")
         self.ctl("pause", "--for", "2s")
-        self.assertTrue(await_exit_of(self.helper))
+        self.assertTrue(await_exit_of(helper))
 
         self.open_gate()
 
         self.await_hits("lighthouse", ["gate.txt"])
 
     def test_without_a_daemon_nothing_is_read(self):
+        helper = self.begin("gate.txt")
         self.kill(self.daemon)
-        self.assertTrue(await_exit_of(self.helper))
+        self.assertTrue(await_exit_of(helper))
 
         self.open_gate()
         self.start()
@@ -200,7 +234,7 @@ class QuarantineTest(ScriptedTest):
         self.root = self.make_share(folders=())
         for name in ("crash.txt", "bad.txt", "nonsense.txt", "good.txt"):
             self.write(f"{self.root}/{name}", "lighthouse")
-        self.start()
+        self.daemon = self.start()
         self.ctl("folder", "add", self.root, "--document")
         self.await_counts(done=1, failed=3, waiting=0)
 
@@ -218,6 +252,10 @@ class QuarantineTest(ScriptedTest):
         self.assertEqual(sorted(self.failed("alpha")), sorted(failed))
         self.assertIn(b"crash.txt: the helper ended with SIGABRT (2 tries)", self.ctl("failed").out)
         self.assertIn(b"1 read, 3 failed", self.ctl("status").out)
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        by_kind = share["contents_by_kind"]
+        self.assertEqual(by_kind["document"], {"waiting": 0, "done": 1, "failed": 3})
+        self.assertEqual(by_kind["photo"], {"waiting": 0, "done": 0, "failed": 0})
         self.ctl("failed", "beta", code=1)
 
     def test_retry_reads_it_once_more(self):
@@ -228,6 +266,20 @@ class QuarantineTest(ScriptedTest):
         self.await_counts(done=2, failed=2, waiting=0)
         self.assertEqual(self.hits("lighthouse"), ["crash.txt", "good.txt"])
         self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
+
+    def test_what_an_older_extractor_failed_at_is_tried_again(self):
+        self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
+        self.stop(self.daemon)
+        with contextlib.closing(sqlite3.connect(self.contents())) as contents, contents:
+            for table in ("files", "meta"):
+                contents.execute(f"UPDATE {table} SET extractor = extractor - 1")
+
+        self.start()
+
+        self.await_counts(done=2, failed=2, waiting=0)
+        self.assertEqual(self.hits("lighthouse"), ["crash.txt", "good.txt"])
+        self.assertEqual(self.failed()["nonsense.txt"][1], 2)
+        self.assertEqual(self.given().count("good.txt"), 1)
 
     def test_a_changed_file_is_tried_again(self):
         self.write(f"{os.path.dirname(self.diary_path)}/mended", "")

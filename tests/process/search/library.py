@@ -62,15 +62,23 @@ class ContentsTest(IndexTest):
         return os.posix_spawn(path, [path], environment())
 
 
+    def use_own_programs(self):
+        """Copies, with a place beside them for a helper: its path."""
+        os.mkdir(PROGRAMS)
+        for name in ("fileindexd", "fileindexctl", "talocontentsearchd"):
+            shutil.copy(program(name), PROGRAMS)
+        patch = unittest.mock.patch.dict(os.environ, FILEINDEXD_BIN_DIR=PROGRAMS)
+        patch.start()
+        self.addCleanup(patch.stop)
+        return f"{PROGRAMS}/fileindex-extract"
+
+
 class ScriptedTest(ContentsTest):
     """With a helper that does what files' names say, see scripted_extract.py."""
 
     def setUp(self):
         super().setUp()
-        os.mkdir(PROGRAMS)
-        for name in ("fileindexd", "fileindexctl", "talocontentsearchd"):
-            shutil.copy(program(name), PROGRAMS)
-        helper = f"{PROGRAMS}/fileindex-extract"
+        helper = self.use_own_programs()
         with open(f"{HERE}/scripted_extract.py", encoding="utf-8") as script:
             self.write(helper, f"#!{sys.executable}\n{script.read()}")
         os.chmod(helper, 0o755)
@@ -79,9 +87,6 @@ class ScriptedTest(ContentsTest):
         os.chmod(f"{PROGRAMS}/gate", 0o666)
         self.write(self.diary_path, "")
         os.chmod(self.diary_path, 0o666)
-        patch = unittest.mock.patch.dict(os.environ, FILEINDEXD_BIN_DIR=PROGRAMS)
-        patch.start()
-        self.addCleanup(patch.stop)
 
     diary_path = f"{PROGRAMS}/diary"
 

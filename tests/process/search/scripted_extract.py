@@ -4,8 +4,9 @@
 It speaks as the real one does (see extract/answer.h); what a file holds is its text.
 
     gate…      waits until somebody opens the pipe "gate" for writing
-    crash…     ends by a signal, unless there is a file "mended"
+    crash…     ends by a signal, unless there is a file "mended"; so does gatecrash…, at the gate's end
     bad…       cannot be read
+    unread…    is not given by the disk, unless there is a file "mended"
     nonsense…  is answered with bytes that are no answer
 
 All files are in the helper's own folder. "diary" gets a line for each file: its name, our process.
@@ -19,8 +20,8 @@ import struct
 
 FOLDER = os.path.dirname(os.path.abspath(__file__))
 SOCKET = 3
-VERSION = 1
-TEXT, KIND, SAMPLE, FAILED, BEGUN, READY = 128, 130, 131, 133, 134, 135
+VERSION = 2
+TEXT, KIND, SAMPLE, FAILED, BEGUN, READY, UNREAD = 128, 130, 131, 133, 134, 135, 136
 DOCUMENT = 1
 
 
@@ -46,10 +47,12 @@ def note(name):
 def read(file, name):
     if name.startswith(b"gate"):
         os.close(os.open(beside("gate"), os.O_RDONLY))
-    if name.startswith(b"crash") and not os.path.exists(beside("mended")):
+    if name.startswith((b"crash", b"gatecrash")) and not os.path.exists(beside("mended")):
         os.kill(os.getpid(), signal.SIGABRT)
     if name.startswith(b"nonsense"):
         return b"\xff" * 100
+    if name.startswith(b"unread") and not os.path.exists(beside("mended")):
+        return frame(record(UNREAD, b"the disk is gone"))
     found = [record(KIND, bytes([DOCUMENT])), record(SAMPLE, struct.pack("<Q", 1))]
     if name.startswith(b"bad"):
         return frame(*found, record(FAILED, b"damaged"))

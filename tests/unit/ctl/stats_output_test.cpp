@@ -55,5 +55,28 @@ TEST_F(StatisticsLinesTest, PartsAreSeparatedThroughAPipeToo) {
   EXPECT_THAT(Lines(std::nullopt), ElementsAre("300\t1\t2\t0\ts", "", "300\t1\tdocument"));
 }
 
+TEST_F(StatisticsLinesTest, OthersAreNoGroupOfThatName) {
+  EntryGroup others;
+  others.share = "s";
+  others.name = OTHER_NAMES;
+  others.is_others = true;
+  EntryGroup named = others;
+  named.is_others = false;
+  statistics.groups = {others, named};
+  wish.by = GroupBy::FOLDER;
+  const Json::Value folders = StatisticsObject(wish, statistics)["groups"];
+  wish.by = GroupBy::EXTENSION;
+  const Json::Value endings = StatisticsObject(wish, statistics)["groups"];
+
+  for (const Json::Value& groups : {folders, endings}) {
+    EXPECT_TRUE(groups[0]["others"].asBool());
+    EXPECT_FALSE(groups[0].isMember("path") || groups[0].isMember("name"));
+    EXPECT_FALSE(groups[1].isMember("others"));
+  }
+  EXPECT_EQ(folders[0]["share"].asString(), "s");
+  EXPECT_EQ(folders[1]["path"].asString(), OTHER_NAMES);
+  EXPECT_EQ(endings[1]["name"].asString(), OTHER_NAMES);
+}
+
 }  // namespace
 }  // namespace fileindexd

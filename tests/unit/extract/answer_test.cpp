@@ -69,7 +69,7 @@ TEST(AnswerTest, WhatIsEncodedComesBack) {
   EXPECT_EQ(got->reason, "damaged here");
 }
 
-TEST(AnswerTest, AGreetingAndABeginningComeBack) {
+TEST(AnswerTest, WhatStandsAloneComesBack) {
   Answer sent;
   sent.sort = Answer::Sort::READY;
   sent.left_out = "PDF";
@@ -83,6 +83,13 @@ TEST(AnswerTest, AGreetingAndABeginningComeBack) {
   const auto begun = DecodeAnswer(EncodeAnswer(sent), CAP, fault);
   ASSERT_TRUE(begun) << fault;
   EXPECT_EQ(begun->sort, Answer::Sort::BEGUN);
+
+  sent.sort = Answer::Sort::UNREAD;
+  sent.reason = "a disk\tthat fails";
+  const auto unread = DecodeAnswer(EncodeAnswer(sent), CAP, fault);
+  ASSERT_TRUE(unread) << fault;
+  EXPECT_EQ(unread->sort, Answer::Sort::UNREAD);
+  EXPECT_EQ(unread->reason, "a disk that fails");
 }
 
 TEST(AnswerTest, TheLeastAnswerIsTaken) {
@@ -131,12 +138,18 @@ TEST(AnswerTest, NonsenseIsRefused) {
       Frame(Least() + Record(TAG_CONVERTER, "\x1B[2J")),
       Frame(Record(TAG_READY, "")),
       Frame(Record(TAG_READY, "\x7F")),
-      Frame(Record(TAG_READY, "\1\t")),
-      Frame(Record(TAG_READY, "\1PDF\nRTF")),
-      Frame(Least() + Record(TAG_READY, "\1")),
+      Frame(Record(TAG_READY, "\2\t")),
+      Frame(Record(TAG_READY, "\2PDF\nRTF")),
+      Frame(Least() + Record(TAG_READY, "\2")),
+      Frame(Record(TAG_READY, "\1")),  // another version
+      Frame(Record(TAG_UNREAD, "")),
+      Frame(Record(TAG_UNREAD, "two\nlines")),
+      Frame(Record(TAG_UNREAD, std::string(MAX_REASON + 1, 'x'))),
+      Frame(Least() + Record(TAG_UNREAD, "x")),
+      Frame(Record(TAG_UNREAD, "x") + Record(TAG_UNREAD, "x")),
       Frame(Record(TAG_BEGUN, "x")),
       Frame(Least() + Record(TAG_BEGUN, "")),
-      Frame(Record(TAG_BEGUN, "") + Record(TAG_READY, "\1")),
+      Frame(Record(TAG_BEGUN, "") + Record(TAG_READY, "\2")),
   };
   for (size_t row = 0; row < std::size(rows); ++row) {
     EXPECT_NE(FaultOf(rows[row]), "") << "row " << row;

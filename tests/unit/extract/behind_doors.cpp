@@ -84,9 +84,8 @@ ExtractPool& PoolOf(const Walls& walls) {
 ExtractOutcome ReadByHelper(ExtractPool& pool, const Document& document) {
   ExtractJob job;
   job.name = document.name;
-  ScopedFd file(dup(document.file));
-  EXPECT_EQ(lseek(file.fd, 0, SEEK_SET), 0);
-  job.file.Swap(file);
+  job.file = std::make_shared<ScopedFd>(dup(document.file));
+  EXPECT_EQ(lseek(job.file->fd, 0, SEEK_SET), 0);
   pool.Submit(std::move(job));
   while (true) {
     std::vector<ExtractOutcome> outcomes = pool.Work();

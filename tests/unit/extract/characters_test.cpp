@@ -11,10 +11,11 @@ namespace {
 
 TEST(CharactersTest, WellFormedOnesHaveTheirCodeAndLength) {
   const struct {
-    const char* bytes;
+    std::string_view bytes;
     char32_t code;
     size_t length;
   } rows[] = {{"a", U'a', 1},
+              {std::string_view("\0", 1), 0, 1},
               {"\xC2\x80", 0x80, 2},
               {"\xE2\x82\xAC!", 0x20AC, 3},
               {"\xED\x9F\xBF", 0xD7FF, 3},
@@ -25,7 +26,11 @@ TEST(CharactersTest, WellFormedOnesHaveTheirCodeAndLength) {
     const Utf8Character character = FirstCharacter(row.bytes);
     EXPECT_EQ(character.code, row.code) << row.bytes;
     EXPECT_EQ(character.length, row.length) << row.bytes;
+    EXPECT_FALSE(character.is_wrong) << row.bytes;
     EXPECT_FALSE(character.is_cut) << row.bytes;
+    std::string again;
+    AppendUtf8(row.code, again);
+    EXPECT_EQ(again, row.bytes.substr(0, row.length));
   }
 }
 
@@ -50,10 +55,19 @@ TEST(CharactersTest, IllFormedOnesEndWhereAnotherCanBegin) {
               {"\xF0\x9F\x98", 3, true}};
   for (const auto& row : rows) {
     const Utf8Character character = FirstCharacter(row.bytes);
+    EXPECT_TRUE(character.is_wrong) << row.bytes;
     EXPECT_EQ(character.code, U'\0') << row.bytes;
     EXPECT_EQ(character.length, row.length) << row.bytes;
     EXPECT_EQ(character.is_cut, row.is_cut) << row.bytes;
   }
+}
+
+TEST(CharactersTest, WhatIsNoCharacterIsWrittenAsTheOneForThat) {
+  std::string text;
+  AppendUtf8(0x110000, text);
+  AppendUtf8(0xD800, text);
+  AppendUtf8(0xDFFF, text);
+  EXPECT_EQ(text, "\uFFFD\uFFFD\uFFFD");
 }
 
 TEST(CharactersTest, CleanTextHasNoBlankButSpaceAndLineFeed) {

@@ -2,9 +2,12 @@
 // The helper itself, through the pool.
 #include <fcntl.h>
 #include <signal.h>
+#include <sys/mount.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 
+#include <cerrno>
+#include <cstring>
 #include <fstream>
 #include <sstream>
 
@@ -42,6 +45,16 @@ std::string FieldOf(const ExtractOutcome& outcome, ContentField field) {
   return "";
 }
 
+// With room for its root and one page. -1, with errno, where it cannot be made.
+int SmallFilesystem() {
+  const ScopedFd made(static_cast<int>(syscall(SYS_fsopen, "tmpfs", FSOPEN_CLOEXEC)));
+  if (made.fd < 0 || syscall(SYS_fsconfig, made.fd, FSCONFIG_SET_STRING, "size", "4096", 0) != 0 ||
+      syscall(SYS_fsconfig, made.fd, FSCONFIG_CMD_CREATE, nullptr, nullptr, 0) != 0) {
+    return -1;
+  }
+  return static_cast<int>(syscall(SYS_fsmount, made.fd, FSMOUNT_CLOEXEC, 0));
+}
+
 class HelperTest : public PoolFixture {
  public:
   void SetUp() override {
@@ -49,6 +62,15 @@ class HelperTest : public PoolFixture {
     options.program = HELPER;
     options.text_cap = 1000;
     OpenPool(options);
+  }
+
+  ExtractOutcome RunFile(const std::string& name, ScopedFd& file) {
+    ExtractJob job;
+    job.id = 1;
+    job.name = name;
+    job.file = std::make_shared<ScopedFd>(file.Release());
+    pool->Submit(std::move(job));
+    return std::move(Await(1)[1]);
   }
 };
 
@@ -129,21 +151,39 @@ TEST_F(HelperTest, WhatNoReaderIsForIsDoneWithoutContent) {
   }
 }
 
-TEST_F(HelperTest, WhatTheDiskDoesNotGiveIsAFailureAndHasNoSample) {
+TEST_F(HelperTest, WhatTheDiskDoesNotGiveIsNoFailureOfTheFile) {
   for (const char* name : {"a.txt", "a", "a.pdf", "a.mp3"}) {
     const ScopedFd file = FileOf("words");
     ScopedFd unreadable(open(("/proc/self/fd/" + std::to_string(file.fd)).c_str(), O_WRONLY));
     ASSERT_GE(unreadable.fd, 0);
-    ExtractJob job;
-    job.id = 1;
-    job.name = name;
-    job.file.Swap(unreadable);
-    pool->Submit(std::move(job));
-
-    const ExtractOutcome outcome = std::move(Await(1)[1]);
-    EXPECT_EQ(Told(outcome), "failed: cannot be read: Bad file descriptor") << name;
+    const ExtractOutcome outcome = RunFile(name, unreadable);
+    EXPECT_EQ(Told(outcome), "unread: cannot be read: Bad file descriptor") << name;
     EXPECT_EQ(outcome.content.sample, 0U);
   }
+}
+
+// Beyond the parts that are sampled: what has no size has none. Nothing lies at the beginning of a
+// process's memory.
+TEST_F(HelperTest, WhatTheDiskDoesNotGiveAReaderIsNoFailureOfTheFile) {
+  ScopedFd memory(open("/proc/self/mem", O_RDONLY | O_CLOEXEC));
+  ASSERT_GE(memory.fd, 0);
+  EXPECT_EQ(Told(RunFile("README", memory)), "unread: cannot be read: Input/output error");
+}
+
+// The library is given a mapping. No page is left for the second part of this file: reading finds a
+// hole there, and looking at it fails as it does on a disk that is gone.
+TEST_F(HelperTest, APageThatTheDiskDoesNotGiveIsNoFailureOfTheFile) {
+  const ScopedFd folder(SmallFilesystem());
+  if (folder.fd < 0) {
+    GTEST_SKIP() << "no file system can be made here: " << strerror(errno);
+  }
+  ScopedFd file(openat(folder.fd, "a.tif", O_RDWR | O_CREAT | O_CLOEXEC, 0600));
+  constexpr std::string_view HEAD("II*\0\0\0\x08\0", 8);  // where the rest lies
+  ASSERT_EQ(write(file.fd, HEAD.data(), HEAD.size()), static_cast<ssize_t>(HEAD.size()));
+  ASSERT_EQ(ftruncate(file.fd, 1 << 20), 0);
+
+  EXPECT_EQ(Told(RunFile("a.tif", file)), "unread: cannot be read: Input/output error");
+  EXPECT_EQ(Told(Run("a.txt", "words")), "done");
 }
 
 TEST_F(HelperTest, ContentTellsWhereTheNameDoesNot) {

@@ -38,8 +38,7 @@ class PoolFixture : public ::testing::Test {
     ExtractJob job;
     job.id = id;
     job.name = name;
-    ScopedFd file = FileOf(bytes);
-    job.file.Swap(file);
+    job.file = std::make_shared<ScopedFd>(FileOf(bytes).Release());
     pool->Submit(std::move(job));
   }
 
@@ -77,7 +76,7 @@ class PoolFixture : public ::testing::Test {
 
 // "killed: reason", to be compared in one go.
 inline std::string Told(const ExtractOutcome& outcome) {
-  constexpr const char* RESULTS[] = {"done", "failed", "killed", "lost"};
+  constexpr const char* RESULTS[] = {"done", "failed", "killed", "lost", "unread"};
   const std::string result = RESULTS[static_cast<int>(outcome.result)];
   return outcome.reason.empty() ? result : result + ": " + outcome.reason;
 }

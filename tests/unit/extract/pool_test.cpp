@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/pool.h"
 
+#include <fcntl.h>
 #include <sys/wait.h>
 
 #include <csignal>
@@ -66,6 +67,13 @@ TEST_F(PoolTest, AFailureKeepsItsReasonAndWhatWasFound) {
   EXPECT_EQ(outcome.content.text, "it is damaged");
 }
 
+TEST_F(PoolTest, WhatTheDiskDoesNotGiveIsNoFailureAndCostsNoHelper) {
+  const ExtractOutcome outcome = Run("unread the disk is gone");
+  EXPECT_EQ(Told(outcome), "unread: the disk is gone");
+  EXPECT_TRUE(outcome.content.text.empty());
+  EXPECT_EQ(Run("count").content.text, "2");
+}
+
 TEST_F(PoolTest, AHelperServesOneJobAfterTheOther) {
   EXPECT_EQ(Run("count").content.text, "1");
   EXPECT_EQ(Run("count").content.text, "2");
@@ -112,6 +120,22 @@ TEST_F(PoolTest, ADocumentThatWaitsForEverIsKilledInTheEnd) {
   OpenWith(1, std::chrono::milliseconds(300));
   EXPECT_EQ(Told(Run("loop")), "killed: took longer than 300 ms");
   EXPECT_EQ(Told(Run("half")), "killed: took longer than 300 ms");
+}
+
+TEST_F(PoolTest, ADocumentThatWaitsForEverHasThreeDeadlines) {
+  constexpr std::chrono::milliseconds DEADLINE(300);
+  OpenWith(1, DEADLINE);
+  const ScopedFd file = FileOf("");
+  ExtractJob job;
+  job.id = 1;
+  job.name = "hang";
+  job.file = std::make_shared<ScopedFd>(fcntl(file.fd, F_DUPFD_CLOEXEC, 0));
+  const auto before = std::chrono::steady_clock::now();
+  pool->Submit(std::move(job));
+
+  EXPECT_EQ(Told(Await(1)[1]), "killed: took longer than 300 ms");
+  EXPECT_GE(std::chrono::steady_clock::now() - before, 3 * DEADLINE);
+  EXPECT_EQ(lseek(file.fd, 0, SEEK_END), 3) << "how often it was begun";
 }
 
 TEST_F(PoolTest, ADocumentThatGotNoProcessorTimeIsBegunAgain) {
@@ -201,6 +225,20 @@ TEST_F(PoolTest, AbortEndsAllWithoutOutcome) {
   EXPECT_EQ(Told(Run("text on")), "done");
 }
 
+TEST_F(PoolTest, AFileIsLetGoWhenItsJobHasEnded) {
+  const auto file = std::make_shared<ScopedFd>(FileOf("x").Release());
+  pool->Submit({.id = 1, .file = file, .name = "text a"});
+  EXPECT_GT(file.use_count(), 1);
+  (void)Await(1);
+  EXPECT_EQ(file.use_count(), 1);
+
+  for (uint64_t id = 2; id < 4; ++id) {
+    pool->Submit({.id = id, .file = file, .name = "loop"});
+  }
+  pool->Abort();
+  EXPECT_EQ(file.use_count(), 1);
+}
+
 TEST_F(PoolTest, NoHelperIsLeftBehind) {
   const pid_t helper = std::stoi(Run("pid").content.text);
   EXPECT_EQ(kill(helper, 0), 0);
@@ -255,6 +293,7 @@ TEST_F(PoolTest, WhatAConverterMakesIsReadAndHowItEndsIsTold) {
   } rows[] = {{"say text some words", "done", "some words"},
               {"say fail no words", "failed: catdoc: no words", "no words"},
               {"say never", "lost: the helper ended before it began, with code 5", ""},
+              {"say unread it is gone", "unread: it is gone", ""},
               {"say crash", "killed: the helper ended with SIGSEGV", ""},
               {"part text some", "failed: catdoc: code 9", "some"},
               {"doors", "lost: catdoc: the doors cannot be closed", ""},

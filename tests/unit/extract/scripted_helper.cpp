@@ -1,26 +1,40 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Stands in for fileindex-extract: greets, takes jobs, and does what each job's name says.
 //
-//   text WORDS     answers with these words          field TITLE    with a title and no text
-//   fail REASON    says that it cannot be read       convert NAME   asks for a converter
-//   crash, loop, exit, memory, close, grow, nonsense, twice, half, last  misbehaves
+//   text WORDS     answers with these words
+//   field TITLE    with a title and no text
+//   fail REASON    says that it cannot be read
+//   unread REASON  says that the disk does not give it
+//   convert NAME   asks for a converter
+//   pid            answers with its process number
+//   count          how many jobs it has had
+//   state          answers with what it was started with
+//   crash, loop, exit, memory, close, grow, nonsense, twice, half, last
+//                  misbehaves
 //   spin           stops until it is let go on, uses more than 300 ms of processor time, stops
-//   again starve         waits for ever, as long as the file is empty; adds a byte to it more
-//   answers, and when that was taken says another word killed         is killed from outside, as
-//   long as the file is empty; adds a byte to it pid            answers with its process number
-//   count          how many jobs it has had state          answers with what it was started with
+//                  again
+//   hang           adds a byte to the file, and waits for ever
+//   starve         waits for ever, as long as the file is empty; adds a byte to it
+//   more           answers, and when that was taken says another word
+//   killed         is killed from outside, as long as the file is empty; adds a byte to it
 //   refuse         ends before it begins, if it had a job before
-//   never          ends before it begins           mute           never begins
+//   never          ends before it begins
+//   mute           never begins
 //
 // What a converter has made holds such an order itself. As a converter it does what the document
 // says:
 //
-//   say ORDER      makes that                      part ORDER      makes that, and fails
-//   doors, program says what was in its way        slow            waits for ever
+//   say ORDER      makes that
+//   part ORDER     makes that, and fails
+//   doors          says what was in its way
+//   program        says what was in its way
+//   slow           waits for ever
 //   spin           uses more than 300 ms of processor time, and stops
 //   kill           is killed from outside
-//   killed, starve is killed, or waits for ever, once: adds a letter to the document
-//   killed?, starve?  makes an order to answer with words
+//   killed, starve
+//                  is killed, or waits for ever, once: adds a letter to the document
+//   killed?, starve?
+//                  makes an order to answer with words
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/socket.h>
@@ -150,6 +164,12 @@ void Misbehave(const std::string& verb, int file) {
   } else if (verb == "last") {
     Say(EncodeAnswer(Words("said and gone")));
     _exit(0);
+  } else if (verb == "hang") {
+    struct stat info = {};
+    if (fstat(file, &info) == 0) {
+      (void)!pwrite(file, "x", 1, info.st_size);
+    }
+    WaitForEver();
   } else if (verb == "starve") {
     struct stat info = {};
     if (fstat(file, &info) == 0 && info.st_size == 0) {
@@ -171,6 +191,9 @@ void Do(const std::string& verb, const std::string& rest, int file, int count) {
   Answer answer = Words(rest.empty() ? verb : rest);
   if (verb == "fail") {
     answer.has_failed = true;
+    answer.reason = rest;
+  } else if (verb == "unread") {
+    answer.sort = Answer::Sort::UNREAD;
     answer.reason = rest;
   } else if (verb == "field") {
     answer.content.texts = {{ContentField::TITLE, rest}};

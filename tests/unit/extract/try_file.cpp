@@ -11,7 +11,7 @@ namespace fileindexd {
 namespace {
 
 void Print(const char* name, const ExtractOutcome& outcome) {
-  constexpr const char* RESULTS[] = {"done", "failed", "killed", "lost"};
+  constexpr const char* RESULTS[] = {"done", "failed", "killed", "lost", "unread"};
   printf("== %s: %s %s\n", name, RESULTS[static_cast<int>(outcome.result)], outcome.reason.c_str());
   printf("   kind %d sample %016llx%s\n", static_cast<int>(outcome.content.kind),
          static_cast<unsigned long long>(outcome.content.sample),
@@ -38,7 +38,7 @@ int Try(int argc, char** argv) {
   for (int at = 2; at < argc; ++at) {
     const std::string path = argv[at];
     ExtractJob job;
-    job.file.fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    job.file = std::make_shared<ScopedFd>(open(path.c_str(), O_RDONLY | O_CLOEXEC));
     job.name = path.substr(path.rfind('/') + 1);
     pool->Submit(std::move(job));
     std::vector<ExtractOutcome> outcomes;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// The helper with no more rights than the shipped units leave to the service that starts it.
+// What the shipped units leave to the service and its helpers: their rights, and their priority.
 #include <fcntl.h>
 #include <sched.h>
 #include <sys/prctl.h>
@@ -7,6 +7,9 @@
 
 #include <fstream>
 #include <sstream>
+#include <string>
+#include <utility>
+#include <vector>
 
 #include "base/capabilities.h"
 #include "pool_fixture.h"
@@ -33,16 +36,24 @@ int CapabilityOfName(const std::string& name) {
   return 0;
 }
 
-uint64_t BoundingSetOf(const std::string& unit) {
-  constexpr std::string_view KEY = "CapabilityBoundingSet=";
+// What the unit sets `key` to, in the order of its lines.
+std::vector<std::string> ValuesOf(const std::string& unit, const std::string& key) {
   std::ifstream lines(std::string(UNITS) + "/" + unit);
-  uint64_t set = 0;
+  std::vector<std::string> values;
   for (std::string line; std::getline(lines, line);) {
-    if (line.starts_with(KEY)) {
-      std::istringstream names(line.substr(KEY.size()));
-      for (std::string name; names >> name;) {
-        set |= CapabilityBit(CapabilityOfName(name));
-      }
+    if (line.starts_with(key + "=")) {
+      values.push_back(line.substr(key.size() + 1));
+    }
+  }
+  return values;
+}
+
+uint64_t BoundingSetOf(const std::string& unit) {
+  uint64_t set = 0;
+  for (const std::string& value : ValuesOf(unit, "CapabilityBoundingSet")) {
+    std::istringstream names(value);
+    for (std::string name; names >> name;) {
+      set |= CapabilityBit(CapabilityOfName(name));
     }
   }
   EXPECT_NE(set, 0u) << unit;
@@ -91,6 +102,18 @@ TEST_F(UnitsTest, HelpersCloseTheirDoorsWithTheRightsOfTheUnits) {
     EXPECT_EQ(ReadWithin(HELPER, set, "a.txt", "some words"), "done: some words") << unit;
     EXPECT_EQ(ReadWithin(HELPER, set, "a.rtf", "{\\rtf1\\ansi some words}"), "done: some words")
         << unit;
+  }
+}
+
+// Each line alone: the last one of a key counts, and helpers inherit all of them.
+TEST_F(UnitsTest, ReadingContentsWaitsForEverybodyElse) {
+  const std::pair<const char*, const char*> rows[] = {{"CPUSchedulingPolicy", "idle"},
+                                                      {"IOSchedulingClass", "idle"},
+                                                      {"CPUWeight", "idle"},
+                                                      {"IOWeight", "1"}};
+  for (const auto& [key, value] : rows) {
+    EXPECT_EQ(ValuesOf("talocontentsearchd.service.in", key), std::vector<std::string>{value})
+        << key;
   }
 }
 

@@ -285,11 +285,10 @@ TEST_F(ContentSearchTest, ReaderTellsStatesAndCounts) {
   }));
   EXPECT_EQ(lines, Names({At(failed) + " damaged"}));
 
-  Content content;
-  std::string state;
-  std::string reason;
-  ASSERT_TRUE(reader.Find(ContentsTest::Find(failed), content, state, reason));
-  EXPECT_EQ(state + " " + reason, "failed damaged");
+  StoredContent stored;
+  ASSERT_EQ(reader.Find(ContentsTest::Find(failed), stored), IndexError::NONE);
+  EXPECT_EQ(stored.state + " " + stored.reason, "failed damaged");
+  const Content& content = stored.content;
   ASSERT_EQ(content.texts.size(), 1U);
   EXPECT_EQ(content.texts[0].text, "T");
   ASSERT_EQ(content.numbers.size(), 2U);

@@ -3,10 +3,13 @@
 
 #include <gmock/gmock.h>
 
+#include <tuple>
+
 #include "index/content_terms.h"
 #include "index/contents_schema.h"
 #include "index/text_tokenizer.h"
 #include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/contents_fixture.h"
 
 namespace fileindexd {
@@ -29,10 +32,82 @@ TEST_F(ContentsReaderTest, BeforeThereAreWordsThereAreNoContents) {
 }
 
 TEST_F(ContentsReaderTest, TellsTheLanguageOfItsWords) {
+  File("a.txt");
+  ASSERT_EQ(Read(), Names({"a.txt"}));
   ContentsReader reader;
+  StoredContent stored;
 
   ASSERT_EQ(reader.Open("s"), IndexError::NONE);
-  EXPECT_EQ(reader.Language(), DEFAULT_LANGUAGE);
+  ASSERT_EQ(reader.Find(ContentsTest::Find("a.txt"), stored), IndexError::NONE);
+  EXPECT_EQ(stored.state, "done");
+  EXPECT_EQ(stored.language, DEFAULT_LANGUAGE);
+}
+
+TEST_F(ContentsReaderTest, WhatIsNotReadOrNotWantedWaits) {
+  File("a.txt");
+  File("b.txt");
+  ASSERT_EQ(Read().size(), 2U);
+  const Entry old = ContentsTest::Find("a.txt");
+  Entry unwanted = ContentsTest::Find("b.txt");
+  unwanted.content_wanted = false;
+  File("a.txt", "other bytes");
+  ContentsReader reader;
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+
+  for (const Entry& entry : {old, unwanted, ContentsTest::Find("a.txt")}) {
+    StoredContent stored;
+    stored.state = "done";
+    EXPECT_EQ(reader.Find(entry, stored), IndexError::NONE);
+    EXPECT_EQ(stored.state, "waiting") << entry.path;
+  }
+}
+
+TEST_F(ContentsReaderTest, WhatCannotBeReadIsNoContent) {
+  File("a.txt");
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+  const Entry entry = ContentsTest::Find("a.txt");
+  contents.reset();
+  DamageTable(ContentsPath("s") + "/" + CONTENTS_FORM.file, "texts");
+  ContentsReader reader;
+  StoredContent stored;
+
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  EXPECT_EQ(reader.Find(entry, stored), IndexError::DAMAGED);
+}
+
+// Beside the entries they are found as wrong as they are alone, and the entries stay usable.
+TEST_F(ContentsReaderTest, WhatIsWrongWithThemIsTold) {
+  File("a.txt");
+  contents.reset();
+  const std::string file = "f=" + ContentsPath("s") + "/contents.db; ";
+  const std::tuple<const char*, const char*, IndexError> cases[] = {
+      {"without tables", "sqlite3 $f 'DROP TABLE meta'", IndexError::DAMAGED},
+      {"another version", "sqlite3 $f 'PRAGMA user_version = 99'", IndexError::PATH_NOT_FOUND},
+      {"another's", "rm $f*; sqlite3 $f 'CREATE TABLE t(a)'", IndexError::PATH_NOT_FOUND},
+      {"of another encoding",
+       "rm $f*; sqlite3 $f 'PRAGMA encoding = \"UTF-16\"; CREATE TABLE t(a)'",
+       IndexError::PATH_NOT_FOUND},
+      {"no database", "(seq 3000 >$f)", IndexError::DAMAGED},
+      {"empty", "truncate -s 0 $f", IndexError::PATH_NOT_FOUND},
+      {"a folder", "rm $f; mkdir $f", IndexError::PATH_NOT_FOUND},
+      {"nowhere", "rmdir $f", IndexError::PATH_NOT_FOUND},
+  };
+
+  for (const auto& [name, damage, expected] : cases) {
+    Run(file + damage);
+    ContentsReader reader;
+    EXPECT_EQ(reader.Open("s"), expected) << name;
+
+    Statement attached;
+    ASSERT_EQ(attached.Prepare(reader.entries.db, "SELECT count(*) FROM pragma_database_list"),
+              SQLITE_OK);
+    ASSERT_EQ(attached.Step(), SQLITE_ROW);
+    EXPECT_EQ(attached.Int(0), 1) << name;
+    Statement entries;
+    ASSERT_EQ(entries.Prepare(reader.entries.db, "SELECT count(*) FROM entries"), SQLITE_OK);
+    ASSERT_EQ(entries.Step(), SQLITE_ROW);
+    EXPECT_GT(entries.Int(0), 0) << name;
+  }
 }
 
 std::vector<std::string> TermTexts(const Content& content, const std::string& language) {

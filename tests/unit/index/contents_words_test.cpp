@@ -92,6 +92,24 @@ TEST_F(ContentsWordsTest, WordsAreMadeAnewOnceForALanguageThatIsNotKnown) {
   EXPECT_EQ(Holding("txt"), 1);
 }
 
+TEST_F(ContentsWordsTest, ATableOfALanguageThatIsNotKnownIsMadeAnewFromTheTexts) {
+  File("a.txt");
+  Read();
+  Change(
+      "PRAGMA writable_schema = 1;"
+      "UPDATE sqlite_master SET sql = replace(sql, 'english', 'klingon') WHERE name = 'words';"
+      "UPDATE meta SET language = 'klingon'");
+
+  for (int i = 0; i < 2; ++i) {
+    OpenContents();
+    TakeIn();
+    EXPECT_EQ(Holding("txt"), 1);
+    EXPECT_EQ(Jobs(), Names());
+  }
+  EXPECT_NE(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'old_words'"), 0);
+}
+
 TEST_F(ContentsWordsTest, ContentsWithoutWordsAreDamaged) {
   File("a.txt");
   Read();
@@ -215,14 +233,12 @@ TEST_F(ContentsWordsTest, YearAndTrackAreWords) {
   EXPECT_EQ(Holding("17"), 2);
   EXPECT_EQ(Holding("3"), 0);
 
-  Content content;
-  std::string state;
-  std::string reason;
+  StoredContent stored;
   ContentsReader reader;
   ASSERT_EQ(reader.Open("s"), IndexError::NONE);
-  ASSERT_TRUE(reader.Find(ContentsTest::Find("a.mp3"), content, state, reason));
-  EXPECT_EQ(content.numbers.size(), 3U);
-  EXPECT_EQ(content.texts.size(), 1U);
+  ASSERT_EQ(reader.Find(ContentsTest::Find("a.mp3"), stored), IndexError::NONE);
+  EXPECT_EQ(stored.content.numbers.size(), 3U);
+  EXPECT_EQ(stored.content.texts.size(), 1U);
 
   File("a.mp3", "other bytes");
   EXPECT_EQ(Holding("1999"), 1) << "words go as they came";

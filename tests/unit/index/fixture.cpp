@@ -2,9 +2,11 @@
 #include "tests/unit/index/fixture.h"
 
 #include <filesystem>
+#include <fstream>
 
 #include "index/disk_walk.h"
 #include "state/filesystem.h"
+#include "state/sqlite.h"
 
 namespace fileindexd {
 
@@ -125,16 +127,45 @@ Names IndexTest::Differences() {
 }
 
 Entry IndexTest::Find(std::string_view name) {
-  Entry entry;
+  std::optional<Entry> entry;
   const auto reader = Read();
-  EXPECT_TRUE(reader != nullptr && reader->Find(At(name), entry)) << name;
-  return entry;
+  EXPECT_TRUE(reader != nullptr && reader->Find(At(name), entry) == IndexError::NONE) << name;
+  EXPECT_TRUE(entry.has_value()) << name;
+  return entry.value_or(Entry());
 }
 
 void RemoveTree(const std::string& path) {
   std::error_code failure;
   std::filesystem::remove_all(path, failure);
   EXPECT_FALSE(failure) << path;
+}
+
+void DamageTable(const std::string& database_file, const std::string& table) {
+  int64_t page = 0;
+  int64_t page_size = 0;
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(database_file.c_str(), &db), SQLITE_OK);
+  {
+    // What its log holds is in the file before.
+    Statement checkpoint;
+    ASSERT_EQ(checkpoint.Prepare(db, "PRAGMA wal_checkpoint(TRUNCATE)"), SQLITE_OK);
+    ASSERT_EQ(checkpoint.Step(), SQLITE_ROW);
+    ASSERT_EQ(checkpoint.Int(0), 0) << "somebody has it open";
+    Statement find;
+    ASSERT_EQ(find.Prepare(db,
+                           "SELECT rootpage, page_size FROM sqlite_master, pragma_page_size"
+                           " WHERE name = ?1"),
+              SQLITE_OK);
+    find.BindText(1, table);
+    ASSERT_EQ(find.Step(), SQLITE_ROW) << table;
+    page = find.Int(0);
+    page_size = find.Int(1);
+  }
+  ASSERT_EQ(sqlite3_close(db), SQLITE_OK);
+  std::fstream file(database_file, std::ios::in | std::ios::out | std::ios::binary);
+  file.seekp((page - 1) * page_size);
+  file << std::string(static_cast<size_t>(page_size), '\0') << std::flush;
+  ASSERT_TRUE(file.good());
 }
 
 }  // namespace fileindexd

@@ -50,4 +50,7 @@ class IndexTest : public MountTest {
 // Removes what stands there, whatever it is.
 void RemoveTree(const std::string& path);
 
+// Puts zeros where a table or an index of that database begins: nobody has it open.
+void DamageTable(const std::string& database_file, const std::string& table);
+
 }  // namespace fileindexd

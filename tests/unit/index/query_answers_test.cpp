@@ -9,7 +9,6 @@
 #include "index/contents_schema.h"
 #include "index/entry_table.h"
 #include "index/name_marker.h"
-#include "index/suggestion.h"
 #include "state/layout.h"
 #include "tests/unit/index/question_fixture.h"
 
@@ -170,6 +169,31 @@ TEST_F(QueryAnswersTest, SlowShareIsGivenUp) {
   EXPECT_TRUE(share.hits.empty());
 }
 
+TEST_F(QueryAnswersTest, HitsOfManyAreWholeEntries) {
+  Names names;
+  for (int i = 0; i < 500; ++i) {
+    names.push_back("whale " + std::to_string(i));
+  }
+  Fill("a", names);
+  question.shares = {"a"};
+  EntryReader reader;
+  ASSERT_EQ(reader.Open("a"), IndexError::NONE);
+  for (const bool shows : {true, false}) {
+    question.shows = shows;
+    ASSERT_EQ(Paths("whale").size(), 20U);
+    for (const Hit& hit : answer.hits) {
+      std::optional<Entry> entry;
+      ASSERT_EQ(reader.Find(hit.entry.path, entry), IndexError::NONE);
+      ASSERT_TRUE(entry);
+      EXPECT_EQ(hit.entry.id, entry->id);
+      EXPECT_EQ(hit.entry.thing, entry->thing);
+      EXPECT_EQ(hit.entry.inode, entry->inode);
+      EXPECT_EQ(hit.entry.mode, entry->mode);
+      EXPECT_EQ(hit.entry.written, entry->written);
+    }
+  }
+}
+
 TEST_F(QueryAnswersTest, ManyHitsKeepTheirPages) {
   Names names;
   for (int i = 0; i < 2500; ++i) {
@@ -248,38 +272,6 @@ TEST_F(QueryAnswersTest, SharesAreNamedInQuestions) {
   std::string error;
   EXPECT_FALSE(Ask(question, answer, error));
   EXPECT_EQ(error, "there is no such share (character 3, at: share:c)");
-}
-
-TEST_F(QueryAnswersTest, SuggestionsAreWordsThatTheIndexHas) {
-  Store({{"holiday plans.txt", TextContent("the computer counts invoices")}});
-  Empty({"holy.txt", "\u6771\u4eac.txt"});
-
-  EXPECT_EQ(Suggested("holidya"), "holiday");
-  EXPECT_EQ(Suggested("holidys plans"), "holiday plans");
-  EXPECT_EQ(Suggested("ohliday"), "holiday");
-  EXPECT_EQ(Suggested("computr"), "computer") << "not the stem alone";
-  EXPECT_EQ(Suggested("invocies OR xyzzyx"), "");
-  EXPECT_EQ(Suggested("kind:document  invocies"), "kind:document  invoices");
-  EXPECT_EQ(Suggested("\"holidya\""), "");
-  EXPECT_EQ(Suggested("zzzzzz"), "");
-  EXPECT_EQ(Suggested("ho"), "");
-  EXPECT_EQ(Suggested("kind:audio holidya"), "") << "would find nothing either";
-  EXPECT_EQ(Suggested("kind:audio"), "");
-  EXPECT_EQ(Hits("holiday"), Names({"holiday plans.txt"}));
-  EXPECT_EQ(answer.suggestion, "");
-}
-
-TEST_F(QueryAnswersTest, DistanceCountsSlips) {
-  EXPECT_EQ(EditDistance("abc", "abc", 2), 0);
-  EXPECT_EQ(EditDistance("abc", "acb", 2), 1);
-  EXPECT_EQ(EditDistance("abc", "ab", 2), 1);
-  EXPECT_EQ(EditDistance("abc", "xbc", 2), 1);
-  EXPECT_EQ(EditDistance("abc", "abxc", 2), 1);
-  EXPECT_EQ(EditDistance("abcd", "badc", 2), 2);
-  EXPECT_EQ(EditDistance("abc", "xyz", 2), 3);
-  EXPECT_EQ(EditDistance("\u00fcb", "\u00e4b", 2), 1);
-  EXPECT_EQ(EditDistance("", "ab", 1), 2);
-  EXPECT_EQ(EditDistance("", "", 1), 0);
 }
 
 TEST_F(QueryAnswersTest, ReasonsTellWhyPartByPart) {
@@ -385,7 +377,7 @@ TEST_F(QueryAnswersTest, ShareThatLeavesInBetweenIsNoFailureOnceItWasOpen) {
 
   BestHits best(20, {});
   uint64_t total = 0;
-  ShareRun run(share.reader.database.db, share.has_contents, question, asked, "a", marker);
+  ShareRun run(share.statements, share.has_contents, question, asked, "a", marker);
   EXPECT_EQ(run.Run(best, total), SQLITE_OK);
   EXPECT_EQ(total, 1U);
 }

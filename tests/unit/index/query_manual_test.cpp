@@ -78,13 +78,39 @@ class QueryManualTest : public QuestionTest {
            {".hidden", TextContent("x")}});
   }
 
+  // The example, of this share, its folder and users that there are.
+  std::string Here(std::string example) const {
+    const std::map<std::string, std::string> changed = {{"share:data", "share:s"},
+                                                        {"/srv/data", root},
+                                                        {"owner:root", "owner:" + Own()},
+                                                        {"owner:1000", "owner:" + Other()}};
+    for (const auto& [there, here] : changed) {
+      const size_t at = example.find(there);
+      if (at != std::string::npos) {
+        example.replace(at, there.size(), here);
+      }
+    }
+    return example;
+  }
+  static std::string Own() { return std::to_string(geteuid()); }
+  // Without root no file can be given away.
+  static std::string Other() { return geteuid() == 0 ? "1000" : Own(); }
+
   // What the other examples are for: places, sizes, times, and contents that were not read.
   void StoreTheRest() {
     constexpr time_t DAY_OF_2024 = 1'704'370'000;  // the 4th of January
     ASSERT_EQ(mkdir(At("projects").c_str(), 0755), 0);
     ASSERT_EQ(mkdir(At("projects/2024").c_str(), 0755), 0);
+    ASSERT_EQ(mkdir(At("old projects").c_str(), 0755), 0);
     ASSERT_EQ(symlink("report.pdf", At("link").c_str()), 0);
-    for (const char* name : {"projects", "projects/2024", "link"}) {
+    for (const char* name : {"projects/2024/plan", "old projects/plan", "given away"}) {
+      WriteFile(At(name), "");
+    }
+    if (geteuid() == 0) {
+      ASSERT_EQ(chown(At("given away").c_str(), 1000, static_cast<gid_t>(-1)), 0);
+    }
+    for (const char* name : {"projects", "projects/2024", "projects/2024/plan", "old projects",
+                             "old projects/plan", "given away", "link"}) {
       Add(name);
     }
     OldFile("old.txt", DAY_OF_2024);
@@ -118,13 +144,36 @@ TEST_F(QueryManualTest, EveryExampleHasAnAnswer) {
   StoreAll();
   ASSERT_NO_FATAL_FAILURE(StoreTheRest());
   for (const std::string& example : Examples()) {
-    // These name a share, folders and users that are not here.
-    const bool is_of_another_place = example.starts_with("share:") ||
-                                     example.starts_with("under:") || example.starts_with("owner:");
-    const Names hits = Hits(example);
-    if (!is_of_another_place) {
-      ASSERT_FALSE(hits.empty()) << example;
-      EXPECT_FALSE(hits[0].starts_with("error")) << example << ": " << hits[0];
+    const Names hits = Hits(Here(example));
+    ASSERT_FALSE(hits.empty()) << example;
+    EXPECT_FALSE(hits[0].starts_with("error")) << example << ": " << hits[0];
+  }
+}
+
+TEST_F(QueryManualTest, ExamplesOfPlacesAndUsersFindWhatIsTheirs) {
+  StoreAll();
+  ASSERT_NO_FATAL_FAILURE(StoreTheRest());
+  question.limit = 1000;
+  const Names all = Sorted("is:folder OR is:file OR is:link");
+  EXPECT_GT(all.size(), 20U);
+  Names own = all;
+  if (geteuid() == 0) {
+    std::erase(own, "given away");
+  }
+
+  const std::map<std::string, Names> found = {
+      {"share:data", all},
+      {"under:/srv/data/projects", {"projects", "projects/2024", "projects/2024/plan"}},
+      {"under:\"/srv/data/old projects\"", {"old projects", "old projects/plan"}},
+      {"owner:root", own},
+      {"owner:root,1000", all},
+      {"owner:1000", geteuid() == 0 ? Names{"given away"} : all},
+  };
+  for (const std::string& example : Examples()) {
+    if (example.starts_with("share:") || example.starts_with("under:") ||
+        example.starts_with("owner:")) {
+      ASSERT_TRUE(found.contains(example)) << example;
+      EXPECT_EQ(Sorted(Here(example)), found.at(example)) << example;
     }
   }
 }
@@ -143,6 +192,7 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
       {"kind:photo,video", {"film.mkv", "img_2024.jpg", "paris.png"}},
       {"is:hidden", {".hidden"}},
       {"duration:3m..5m", {"song.mp3"}},
+      {"duration:200", {"song.mp3"}},
       {"year:1990..1999", {"song.mp3"}},
       {"bitrate:>=320K", {"song.mp3"}},
       {"taken:2024-01-05", {"img_2024.jpg", "paris.png"}},
@@ -159,12 +209,40 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
 }
 
 TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
-  for (const char* text :
-       {"-draft", "OR a", "inv*ce", "sise:>1G", "share:data", "under:/srv/data/projects"}) {
+  for (const char* text : {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "size>1G",
+                           "size: 1G", "share:data", "under:/srv/data/projects"}) {
     EXPECT_TRUE(Hits(text)[0].starts_with("error: ")) << text;
   }
-  EXPECT_EQ(Hits("kind:document -draft"), Names());
-  EXPECT_EQ(Hits("12:30"), Names());
+  EXPECT_EQ(Hits("Kind:DOCUMENT -draft"), Names());
+  for (const char* text : {"12:30", "http://example.org", "fs::path", "\"sise:1G\""}) {
+    EXPECT_EQ(Hits(text), Names()) << text;
+  }
+}
+
+TEST_F(QueryManualTest, WhatItSaysIsTheSameIsTheSame) {
+  StoreAll();
+  ASSERT_NO_FATAL_FAILURE(StoreTheRest());
+  question.limit = 1000;
+  for (const Names& same : std::vector<Names>{
+           {"size:10M..20M", "size:10MB..20mb", "size:10MiB..20MiB", "size:10240K..0.01953125G"},
+           {"size:15728640", "size:15M"},
+           {"size:2G..", "size:>=2G", "size:>=2048M", "size:2G..1P"},
+           {"duration:200", "duration:200s", "duration:3m20s"},
+           {"bitrate:>=320K", "bitrate:320000.."},
+           {"ext:gz", "ext:tar.gz", "ext:.GZ"},
+           {"kind:photo", "Kind:PHOTO"},
+           {"has:artist", "HAS:Artist"},
+           {"near:48.8584,2.2945,500m", "near:48.8584,2.2945,500", "near:48.8584,2.2945,0.5km"},
+           {"modified:-400d..now", "modified:-400d", "modified:>=-400d", "modified:>=-9600h"},
+           {"path:projects/2024", "path:projects*2024"},
+           {"annual report", "annual AND report"},
+           {"name:report -draft", "name:report NOT draft"}}) {
+    const Names hits = Sorted(same.front());
+    EXPECT_FALSE(hits.empty()) << same.front();
+    for (const std::string& other : same) {
+      EXPECT_EQ(Sorted(other), hits) << other;
+    }
+  }
 }
 
 }  // namespace fileindexd

@@ -4,6 +4,7 @@
 #include <cmath>
 #include <functional>
 
+#include "base/utf8.h"
 #include "index/asked.h"
 #include "index/asked_share.h"
 #include "index/name_marker.h"
@@ -179,7 +180,7 @@ TEST_F(QueryManyTextsTest, BeginningsAreNotPutTogetherForEachHit) {
     std::string text = "common";
     for (int word = 0; word < 40; ++word) {
       text += " inv" + std::to_string((i * 40 + word) * 7919) + " \u6771";
-      AppendUtf8(0x4e00 + i * 40 + word, text);
+      AppendUtf8(static_cast<char32_t>(0x4e00 + i * 40 + word), text);
     }
     return TextContent(text);
   });

@@ -202,6 +202,8 @@ TEST_F(QueryWordsTest, MarksAreTheBytesThatAnswer) {
   EXPECT_EQ(Marked("path:share/old*rep"), "share/Old|rep");
   EXPECT_EQ(Marked("path:CAF\u00c9"), "Caf\u00e9");
   EXPECT_EQ(Marked("report OR path:*old*nothing*"), "report") << "only half of it is there";
+  EXPECT_EQ(Marked("name:*report OR old"), "Old") << "it is not at the end";
+  EXPECT_EQ(Marked("name:*pdf*pdf OR old"), "Old") << "it is there once";
 }
 
 TEST_F(QueryWordsTest, StarsInQuotesSayNothing) {

@@ -2,7 +2,10 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <optional>
 
+#include "index/schema.h"
+#include "state/layout.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -90,11 +93,19 @@ TEST_F(ReaderTest, NothingIsMadeWhereThereIsNoIndex) {
   EXPECT_FALSE(Exists(state_root + "/shares/s/index"));
 }
 
-TEST_F(ReaderTest, FindOfWhatIsNotHeldIsFalse) {
-  Entry entry;
-  entry.id = 7;
-  EXPECT_FALSE(Read()->Find(At("none"), entry));
-  EXPECT_EQ(entry.id, 7);
+TEST_F(ReaderTest, WhatIsNotHeldIsNotFound) {
+  std::optional<Entry> entry = Entry();
+  EXPECT_EQ(Read()->Find(At("none"), entry), IndexError::NONE);
+  EXPECT_FALSE(entry.has_value());
+}
+
+TEST_F(ReaderTest, WhatCannotBeLookedUpIsNoMissingEntry) {
+  writer.reset();
+  DamageTable(IndexPath("s") + "/" + ENTRIES_FILE, "sqlite_autoindex_entries_1");
+
+  std::optional<Entry> entry = Entry();
+  EXPECT_EQ(Read()->Find(At("none"), entry), IndexError::DAMAGED);
+  EXPECT_TRUE(entry.has_value()) << "changed";
 }
 
 TEST_F(ReaderTest, EntriesOfAnInodeAreAllItsNamesAndNoOthers) {

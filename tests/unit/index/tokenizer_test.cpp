@@ -232,6 +232,24 @@ TEST_F(TokenizerTest, WordThatWasMetBeforeIsCutTheSame) {
   EXPECT_EQ(words, Names({"", "", "foobar", "foo", "bar"}));
 }
 
+TEST_F(TokenizerTest, TextThatWasCutBeforeHasTheSameWords) {
+  TextCutter cutter("english");
+  for (const char* text : {"Two connections of fooBar_1 in v1.2", "\u00dcber H\u00e4user",
+                           "\u6771\u4eac\u90fd ", ""}) {
+    EXPECT_EQ(Words(cutter.CutForTable(text)), Words(text)) << text;
+  }
+  EXPECT_TRUE(Finds("connected", cutter.CutForTable("two connections")));
+}
+
+TEST_F(TokenizerTest, CutTextThatEndsWithinATokenEndsBeforeIt) {
+  const std::string cut = TextCutter("none").CutForTable("one two");
+  const size_t mark = CUT_MARK.size();
+  ASSERT_EQ(cut.size(), mark + 10);
+  for (size_t size = mark; size < cut.size(); ++size) {
+    EXPECT_EQ(Words(cut.substr(0, size)), size < mark + 5 ? Names() : Names({"one"})) << size;
+  }
+}
+
 TEST_F(TokenizerTest, AnyBytesAreTaken) {
   std::string bytes;
   uint32_t seed = 7;

@@ -225,6 +225,23 @@ TEST_F(ContentLoopTest, SharesTakeTurns) {
   EXPECT_THAT(Running(), testing::Not(ElementsAre("a1", "a2", "a3", "b1")));
 }
 
+TEST_F(ContentLoopTest, SharesWhoseFilesAreBeingReadHaveTheirPartOfTheRoom) {
+  StartDaemon();
+  Pool().room = 1000;
+  for (const char* name : {"a", "b", "c", "d", "e", "f", "g"}) {
+    AddShare(name, 1);
+  }
+  Settle();
+  ASSERT_EQ(Running().size(), 7U);
+
+  AddShare("h", 300);
+  Settle();
+
+  EXPECT_EQ(Running().size(), 307U);
+  EXPECT_THAT(Scripted("h").calls, testing::Contains("NextJobs 32"));
+  EXPECT_THAT(Scripted("h").calls, testing::Not(testing::Contains("NextJobs 64")));
+}
+
 TEST_F(ContentLoopTest, WhatIsReadIsWrittenDownAndTheNextIsGivenOut) {
   StartDaemon();
   AddShare("a", 3);
@@ -254,6 +271,23 @@ TEST_F(ContentLoopTest, AHostWithoutProcessesIsTriedAgainLater) {
 
   Pass(seconds(5));
   EXPECT_THAT(Running(), testing::Contains("a1"));
+}
+
+TEST_F(ContentLoopTest, ADiskThatDoesNotGiveAFileHoldsNobodyUp) {
+  StartDaemon();
+  Pool().room = 1;
+  AddShare("a", 2);
+  Settle();
+  ASSERT_THAT(Running(), ElementsAre("a1"));
+
+  Pool().End(Result::UNREAD, "");
+  Settle();
+  EXPECT_THAT(Running(), ElementsAre("a2"));
+
+  Pool().End(Result::DONE, "words");
+  Settle();
+  Pass(seconds(5));
+  EXPECT_THAT(Running(), ElementsAre("a1"));
 }
 
 TEST_F(ContentLoopTest, AMissingHelperIsTriedAgainLater) {

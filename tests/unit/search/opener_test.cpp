@@ -1,11 +1,14 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "search/opener.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <future>
 #include <memory>
 #include <string>
+#include <thread>
 
 namespace fileindexd {
 namespace {
@@ -42,6 +45,8 @@ class OpenerTest : public testing::Test {
   std::unique_ptr<Opener> opener = std::make_unique<Opener>();
   std::promise<void> begun;  // what hangs
   std::promise<void> gate;
+  // Shared with who sets it, and may still be at that when the test is gone.
+  std::shared_ptr<std::promise<void>> gone = std::make_shared<std::promise<void>>();
   Clock::time_point now = Clock::time_point(std::chrono::hours(1));
   std::string heard;
 };
@@ -53,6 +58,22 @@ TEST_F(OpenerTest, AnswersComeInOrderToWhoTakesThem) {
   Ask("c");
   Await();
   EXPECT_EQ(heard, "abc");
+}
+
+TEST_F(OpenerTest, WorkBehindAnAnswerMayTakeAsLongAsItTakes) {
+  const auto question = [this]() -> Opener::Answer { return [this] { heard += "a"; }; };
+  const auto work = [this, opened = gate.get_future().share()] {
+    begun.set_value();
+    opened.wait();
+  };
+  ASSERT_TRUE(opener->Ask(question, now, work));
+  begun.get_future().wait();
+  EXPECT_EQ(opener->Deadline(), Clock::time_point::max());
+  EXPECT_EQ(heard, "");
+
+  gate.set_value();
+  Await();
+  EXPECT_EQ(heard, "a");
 }
 
 TEST_F(OpenerTest, NobodyWaitsForWhatHangsAndItsAnswerIsDropped) {
@@ -88,20 +109,116 @@ TEST_F(OpenerTest, EachAnswerMovesTheDeadline) {
   Await();
 }
 
+// What is freed where closing hangs: tells when it is, and then waits for the gate.
+class OpenerWasteTest : public OpenerTest {
+ protected:
+  std::shared_ptr<void> Held() {
+    return {nullptr, [this, freed = gone, opened = gate.get_future().share()](void*) {
+              freed_by = std::this_thread::get_id();
+              begun.set_value();
+              if (freed_by != own) {
+                opened.wait();
+              }
+              freed->set_value();
+            }};
+  }
+  void ExpectFreedElsewhere() {
+    begun.get_future().wait();
+    EXPECT_NE(freed_by, own);
+    gate.set_value();
+    gone->get_future().wait();
+  }
+
+  std::thread::id own = std::this_thread::get_id();
+  std::thread::id freed_by;
+};
+
+TEST_F(OpenerWasteTest, AnAnswerThatNobodyTakesIsFreedByTheThread) {
+  std::shared_ptr<void> file = Held();
+  ASSERT_TRUE(
+      opener->Ask([&file]() -> Opener::Answer { return [kept = std::move(file)] {}; }, now));
+  std::vector<pollfd> polled;
+  opener->AddPolled(polled);
+  ASSERT_EQ(poll(polled.data(), polled.size(), 60'000), 1);
+
+  opener->Drop();
+  ExpectFreedElsewhere();
+}
+
+TEST_F(OpenerWasteTest, AQuestionThatIsNotRunIsFreedByTheThread) {
+  std::promise<void> let_go;
+  std::promise<void> hangs;
+  const auto hang = [&, opened = let_go.get_future().share()]() -> Opener::Answer {
+    hangs.set_value();
+    opened.wait();
+    return [] {};
+  };
+  ASSERT_TRUE(opener->Ask(hang, now));
+  hangs.get_future().wait();
+  ASSERT_TRUE(opener->Ask([file = Held()]() -> Opener::Answer { return [] {}; }, now));
+
+  opener->Drop();
+  opener.reset();
+  let_go.set_value();
+  ExpectFreedElsewhere();
+}
+
+// Both ends of a pipe: of the one, the other tells when it is closed.
+class OpenerFileTest : public OpenerTest {
+ protected:
+  void SetUp() override {
+    int ends[2] = {-1, -1};
+    ASSERT_EQ(pipe2(ends, O_CLOEXEC), 0);
+    reading.fd = ends[0];
+    ScopedFd writing(ends[1]);
+    file = opener->Keep(writing);
+    EXPECT_EQ(writing.fd, -1);
+  }
+  bool IsClosed(int timeout_ms) const {
+    pollfd closed = {reading.fd, 0, 0};
+    return poll(&closed, 1, timeout_ms) == 1 && closed.revents == POLLHUP;
+  }
+
+  ScopedFd reading;
+  std::shared_ptr<ScopedFd> file;
+};
+
+TEST_F(OpenerFileTest, AFileIsClosedByTheThreadWhenItsTurnComes) {
+  AskAndHang("a");
+  begun.get_future().wait();
+  std::shared_ptr<ScopedFd> other = file;
+  file.reset();
+  other.reset();
+  EXPECT_FALSE(IsClosed(0)) << "the thread hangs";
+  opener->Drop();
+  EXPECT_FALSE(IsClosed(0));
+
+  gate.set_value();
+  EXPECT_TRUE(IsClosed(60'000));
+}
+
+TEST_F(OpenerFileTest, AFileMayOutliveTheOpener) {
+  opener->Drop();
+  opener.reset();
+  EXPECT_FALSE(IsClosed(0));
+
+  file.reset();
+  EXPECT_TRUE(IsClosed(60'000));
+}
+
 TEST_F(OpenerTest, WhoGoesWhileItHangsIsNotHeldUp) {
-  std::promise<void> gone;
-  const auto question = [this, &gone, opened = gate.get_future().share()]() -> Opener::Answer {
+  const auto question = [this, freed = gone,
+                         opened = gate.get_future().share()]() -> Opener::Answer {
     begun.set_value();
     opened.wait();
-    const std::shared_ptr<void> file(nullptr, [&gone](void*) { gone.set_value(); });
-    return [file] {};
+    return [file = std::shared_ptr<void>(nullptr, [freed](void*) { freed->set_value(); })] {};
   };
   ASSERT_TRUE(opener->Ask(question, now));
   begun.get_future().wait();
 
   opener.reset();
   gate.set_value();
-  gone.get_future().wait();
+  gone->get_future().wait();
 }
 
 }  // namespace

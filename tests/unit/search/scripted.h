@@ -2,8 +2,8 @@
 // A contents database that a test fills and looks at, in the place of the real writer.
 //
 // What is written stands in `now` until a commit makes it `kept`; an opening begins with what was
-// kept. And a pool whose helpers do what the test says, and openers that have no thread. One
-// thread.
+// kept, where what failed with an older extractor waits. And a pool whose helpers do what the test
+// says, and openers that have no thread. One thread.
 #pragma once
 
 #include <cstdint>
@@ -21,8 +21,10 @@ struct ScriptedFile {
   enum class State { WAITS, DONE, FAILED };
   ContentJob job;
   State state = State::WAITS;
-  int64_t tries = 0;  // begun, not taken back
-  std::string text;   // or the reason of a failure
+  int64_t tries = 0;                      // begun, not taken back
+  std::string text;                       // or the reason of a failure
+  int64_t extractor = EXTRACTOR_VERSION;  // that failed
+  bool is_prepared = false;
 };
 
 struct ScriptedContents {

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// An opener without a thread: what is asked is answered when answers are taken, unless the file
-// system hangs.
+// An opener without a thread: what is asked is answered, and what is to be closed is closed, when
+// answers are taken, unless the file system hangs.
 #include <deque>
 #include <utility>
 
@@ -11,6 +11,8 @@ namespace fileindexd {
 
 struct Opener::Shared {
   std::deque<Question> questions;
+  std::deque<Question> dropped;
+  std::deque<std::shared_ptr<ScopedFd>> closing;
 };
 
 bool& FilesystemHangs() {
@@ -21,14 +23,24 @@ bool& FilesystemHangs() {
 Opener::Opener() : shared(std::make_shared<Shared>()) {}
 Opener::~Opener() = default;
 
-bool Opener::Ask(Question question, Time now) {
+bool Opener::Ask(Question question, Time now, Work work) {
   heard = waiting == 0 ? now : heard;
   ++waiting;
-  shared->questions.push_back(std::move(question));
+  shared->questions.push_back([question = std::move(question), work = std::move(work)] {
+    Answer answer = question();
+    if (work != nullptr) {
+      work();
+    }
+    return answer;
+  });
   return true;
 }
 
 void Opener::Take(Time now) {
+  if (!FilesystemHangs()) {
+    shared->dropped.clear();
+    shared->closing.clear();
+  }
   while (!FilesystemHangs() && !shared->questions.empty()) {
     const Answer answer = shared->questions.front()();
     shared->questions.pop_front();
@@ -40,7 +52,15 @@ void Opener::Take(Time now) {
 
 void Opener::Drop() {
   waiting = 0;
+  for (Question& question : shared->questions) {
+    shared->dropped.push_back(std::move(question));
+  }
   shared->questions.clear();
+}
+
+std::shared_ptr<ScopedFd> Opener::Keep(ScopedFd& file) {
+  return {new ScopedFd(file.Release()),
+          [owner = shared](ScopedFd* last) { owner->closing.emplace_back(last); }};
 }
 
 Opener::Time Opener::Deadline() const {

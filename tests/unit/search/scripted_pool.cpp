@@ -41,10 +41,7 @@ size_t ExtractPool::Running() const {
 }
 
 void ExtractPool::Submit(ExtractJob&& job) {
-  ExtractJob& taken = Pool().running.emplace_back();
-  taken.id = job.id;
-  taken.name = std::move(job.name);
-  taken.file.Swap(job.file);
+  Pool().running.push_back(std::move(job));
 }
 
 void ExtractPool::AddPolled(std::vector<pollfd>& /*polled*/) const {}

@@ -12,6 +12,7 @@ namespace fileindexd {
 
 struct ContentsWriter::Impl {
   ScriptedContents* contents = nullptr;  // null: closed
+  int64_t extractor = 0;
   bool changed = false;
   std::set<int64_t> out;  // given out and not ended
   IndexError error = IndexError::NONE;
@@ -34,6 +35,7 @@ struct ContentsWriter::Impl {
     ScriptedFile& row = contents->now[file];
     row.state = state;
     row.text = text;
+    row.extractor = extractor;
     out.erase(file);
     changed = true;
     return true;
@@ -73,13 +75,19 @@ FileIdentity IdentityOf(const std::string& path) {
 ContentsWriter::ContentsWriter() : impl(std::make_unique<Impl>()) {}
 ContentsWriter::~ContentsWriter() = default;
 
-IndexError ContentsWriter::Open(const Share& share, int64_t /*extractor_version*/) {
+IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
   impl->contents = &Scripted(share.name);
   if (!impl->Call("Open")) {
     impl->contents = nullptr;
     return impl->error;
   }
   impl->contents->now = impl->contents->kept;
+  impl->extractor = extractor_version;
+  for (auto& [row, file] : impl->contents->now) {
+    if (file.state == ScriptedFile::State::FAILED && file.extractor < extractor_version) {
+      file.state = ScriptedFile::State::WAITS;
+    }
+  }
   return IndexError::NONE;
 }
 
@@ -137,9 +145,10 @@ bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
   return impl->Call("BeginTries", std::to_string(files.size())) && Commit();
 }
 
-bool ContentsWriter::Finish(int64_t file, const Content& content) {
-  impl->contents->pending_bytes += content.text.size();
-  return impl->End("Finish", file, ScriptedFile::State::DONE, content.text);
+bool ContentsWriter::Finish(int64_t file, const PreparedContent& found) {
+  impl->contents->pending_bytes += found.content.text.size();
+  impl->contents->now[file].is_prepared = !found.packed.empty() && !found.cut_text.empty();
+  return impl->End("Finish", file, ScriptedFile::State::DONE, found.content.text);
 }
 
 bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& /*found*/,

@@ -45,6 +45,28 @@ TEST_F(ShareContentsTest, AMissingRootIsNotTakenForMissingFiles) {
   EXPECT_EQ(GiveOut().size(), 1U);
 }
 
+TEST_F(ShareContentsTest, FilesOfAFileSystemThatHangsAreNotClosedHere) {
+  const auto open_files = [] {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
+  };
+  for (int64_t row = 1; row <= 3; ++row) {
+    AddFile(row);
+  }
+  Settle();
+  const auto closed = open_files();
+  ASSERT_EQ(GiveOut(1).size(), 1U);
+  const auto open = open_files();
+  ASSERT_EQ(open, closed + 3);
+
+  FilesystemHangs() = true;
+  contents.Halt();
+  EXPECT_EQ(open_files(), open);
+
+  FilesystemHangs() = false;
+  Settle();
+  EXPECT_EQ(open_files(), closed);
+}
+
 TEST_F(ShareContentsTest, AShareLowOnSpaceGetsNoContents) {
   AddFile(1);
   Settle();

@@ -11,6 +11,18 @@ using testing::Contains;
 using testing::IsEmpty;
 using testing::Not;
 
+TEST_F(ShareContentsTest, WhatWasReadIsPreparedBeforeTheWriterGetsIt) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+  End(ids[0], ExtractOutcome::Result::DONE);
+  Settle();
+
+  EXPECT_EQ(Kept(1).text, "words");
+  EXPECT_TRUE(Kept(1).is_prepared);
+}
+
 TEST_F(ShareContentsTest, AFileIsReadAndWrittenDown) {
   AddFile(1);
   Settle();
@@ -46,7 +58,6 @@ TEST_F(ShareContentsTest, WhatWasReadBesideASlowFileDoesNotWaitForIt) {
   Settle();
   const auto ids = GiveOut();
   ASSERT_EQ(ids.size(), 2U);
-  Quieten();
 
   End(ids[0], ExtractOutcome::Result::DONE);
   EXPECT_THAT(GiveOut(), IsEmpty());
@@ -54,6 +65,21 @@ TEST_F(ShareContentsTest, WhatWasReadBesideASlowFileDoesNotWaitForIt) {
 
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
   EXPECT_EQ(Kept(2).state, ScriptedFile::State::WAITS);
+}
+
+TEST_F(ShareContentsTest, BesideAFileThatIsKnownToBeSlowNothingElseIsWaitedFor) {
+  AddFile(1);
+  AddFile(2);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 2U);
+  Quieten();
+
+  End(ids[0], ExtractOutcome::Result::DONE);
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  Settle();
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
 }
 
 TEST_F(ShareContentsTest, MuchTextIsCommittedAtOnce) {
@@ -124,19 +150,42 @@ TEST_F(ShareContentsTest, WhatKillsHelpersTwiceIsNotTriedAgain) {
   EXPECT_EQ(Kept(1).text, "the reason");
 }
 
-TEST_F(ShareContentsTest, AHelperThatTheHostTookCostsNoTry) {
+TEST_F(ShareContentsTest, WhatFailedWithAnOlderExtractorIsReadAnew) {
   AddFile(1);
+  AddFile(2);
+  Scripted().kept = Scripted().entries;
+  for (const int64_t row : {1, 2}) {
+    Scripted().kept[row].state = ScriptedFile::State::FAILED;
+  }
+  Scripted().kept[2].extractor = EXTRACTOR_VERSION - 1;
   Settle();
-  const auto ids = GiveOut();
-  ASSERT_EQ(ids.size(), 1U);
-
-  End(ids[0], ExtractOutcome::Result::LOST);
-  Pass(milliseconds(500));
-  EXPECT_EQ(Kept(1).tries, 0);
-  (void)GiveOut();
-  Pass(seconds(3));
 
   EXPECT_EQ(GiveOut().size(), 1U);
+  EXPECT_EQ(names, std::vector<std::string>{"f2"});
+}
+
+TEST_F(ShareContentsTest, WhatTheHostOrItsDiskTookCostsNoTryAndIsReadLater) {
+  for (const auto result : {ExtractOutcome::Result::LOST, ExtractOutcome::Result::UNREAD}) {
+    const int64_t row = static_cast<int64_t>(result) + 1;
+    AddFile(row);
+    contents.EntriesChanged();
+    Pass(seconds(1));
+    const auto ids = GiveOut();
+    ASSERT_EQ(ids.size(), 1U);
+
+    End(ids[0], result);
+    Pass(milliseconds(500));
+    EXPECT_EQ(Kept(row).tries, 0);
+    EXPECT_EQ(Kept(row).state, ScriptedFile::State::WAITS);
+    (void)GiveOut();
+    Pass(seconds(3));
+
+    const auto again = GiveOut();
+    ASSERT_EQ(again.size(), 1U);
+    End(again[0], ExtractOutcome::Result::DONE);
+    Pass(seconds(1));
+    EXPECT_EQ(Kept(row).state, ScriptedFile::State::DONE);
+  }
 }
 
 TEST_F(ShareContentsTest, AHaltTakesBackWhatIsGivenOut) {
@@ -284,6 +333,25 @@ TEST_F(ShareContentsTest, AFileSystemThatDoesNotAnswerLetsItsShareRest) {
   EXPECT_THAT(GiveOut(), Not(IsEmpty()));
 }
 
+TEST_F(ShareContentsTest, AFileSystemThatIsTooSlowForABatchIsAskedForSmallerOnes) {
+  for (int64_t row = 1; row <= 100; ++row) {
+    AddFile(row);
+  }
+  Settle();
+  ASSERT_EQ(GiveOut(28).size(), 28U);
+  ASSERT_EQ(Count("NextJobs 16"), 1U);
+  FilesystemHangs() = true;
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  ASSERT_EQ(Count("NextJobs 32"), 1U);
+  Pass(seconds(10));
+  ASSERT_EQ(Count("Close"), 1U);
+
+  FilesystemHangs() = false;
+  Pass(seconds(1));
+  (void)GiveOut(1);
+  EXPECT_EQ(Count("NextJobs 16"), 2U);
+}
+
 TEST_F(ShareContentsTest, WhatWasReadWhenTheFileSystemHungIsReadAgain) {
   AddFile(1);
   Settle();
@@ -303,6 +371,30 @@ TEST_F(ShareContentsTest, WhatWasReadWhenTheFileSystemHungIsReadAgain) {
   End(again[0], ExtractOutcome::Result::DONE);
   Settle();
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+}
+
+TEST_F(ShareContentsTest, ItTakesRoomUntilAllIsWrittenDown) {
+  EXPECT_FALSE(contents.TakesRoom(now));
+  AddFile(1);
+  AddFile(2);
+  Settle();
+  FilesystemHangs() = true;
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_FALSE(contents.MayHaveJobs(now));
+  EXPECT_TRUE(contents.TakesRoom(now)) << "files are being opened";
+
+  FilesystemHangs() = false;
+  contents.Work(now, WALL);
+  const std::vector<uint64_t> ids = GiveOut();
+  ASSERT_EQ(ids.size(), 2U);
+  EXPECT_FALSE(contents.MayHaveJobs(now));
+  EXPECT_TRUE(contents.TakesRoom(now)) << "they are being read";
+  for (const uint64_t id : ids) {
+    End(id, ExtractOutcome::Result::DONE);
+  }
+  Pass(seconds(1));
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_FALSE(contents.TakesRoom(now));
 }
 
 TEST_F(ShareContentsTest, QuickFilesAreGivenOutInLargerBatches) {

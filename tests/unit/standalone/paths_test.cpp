@@ -51,6 +51,19 @@ TEST_F(PathsTest, AFolderSeenBeforeADrainIsNotBelievedAfterIt) {
   }
 }
 
+TEST_F(PathsTest, SettingsSeenBeforeADrainAreNotBelievedAfterIt) {
+  const auto store = OpenStore();
+  for (int i = 0; i < 20; ++i) {  // each time within the time that settings are kept for
+    ASSERT_FALSE(TALO::FILEINDEX::IsSkipIndex(root + "/d/f"));
+    ASSERT_TRUE(store->RemoveFolder(root)) << store->Error();
+    EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
+    EXPECT_TRUE(TALO::FILEINDEX::IsSkipIndex(root + "/d/f"));
+
+    ASSERT_TRUE(store->AddFolder(root, {})) << store->Error();
+    EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
+  }
+}
+
 TEST_F(PathsTest, ALinkIsNoQueueFile) {
   fs::create_symlink(root + "/d/f", QueuePath("s"));
   EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));

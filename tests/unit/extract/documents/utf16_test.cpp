@@ -26,11 +26,4 @@ TEST(Utf16Test, BytesOfTheWesternCodePageHaveTheirLetters) {
   EXPECT_EQ(FromWestern(0x81), 0x81);
 }
 
-TEST(Utf16Test, WhatIsNoCodePointIsReplaced) {
-  std::string text;
-  AppendUtf8(0x110000, text);
-  AppendUtf8(0xD800, text);
-  EXPECT_EQ(text, "\uFFFD\uFFFD");
-}
-
 }  // namespace fileindexd

@@ -1,0 +1,21 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What is said beside the hits of a search: where they would stand for people, else on standard
+// error.
+#pragma once
+
+#include <optional>
+
+#include "ctl/terminal/screen.h"
+#include "index/search.h"
+
+namespace fileindexd {
+
+// Of a question without any hit: one that has some, or what in it is no field. People are told at
+// least that there is none.
+void TellNothingFound(const Question& question, const Answer& answer,
+                      const std::optional<Screen>& screen);
+
+// Nobody has said how many were wanted.
+void TellOfMore(uint64_t shown, const std::optional<Screen>& screen);
+
+}  // namespace fileindexd

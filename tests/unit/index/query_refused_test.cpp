@@ -1,0 +1,285 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Questions that make no sense.
+#include <dlfcn.h>
+#include <pwd.h>
+
+#include <cerrno>
+
+#include "tests/unit/index/query_parse_fixture.h"
+
+namespace {
+
+std::vector<int> fail_lookups;  // codes of the next look-ups of users
+
+}  // namespace
+
+// In the place of the C library's.
+extern "C" int getpwnam_r(const char* name, passwd* user, char* room, size_t size, passwd** found) {
+  if (!fail_lookups.empty()) {
+    const int code = fail_lookups.front();
+    fail_lookups.erase(fail_lookups.begin());
+    *found = nullptr;
+    return code;
+  }
+  using Function = int (*)(const char*, passwd*, char*, size_t, passwd**);
+  static const auto own = reinterpret_cast<Function>(dlsym(RTLD_NEXT, "getpwnam_r"));
+  return own(name, user, room, size, found);
+}
+
+namespace fileindexd {
+
+class QueryRefusedTest : public QueryParseTest {};
+
+TEST_F(QueryRefusedTest, SenselessQuestionsSayWhere) {
+  ExpectAll({
+      {"", "?0"},
+      {" \t", "?0"},
+      {std::string("\0", 1), "?0"},
+      {"\"", "?0"},
+      {"a \"b", "?2"},
+      {"\"\"", "?0"},
+      {"a \"\" b", "?2"},
+      {"(", "?1"},
+      {"(a", "?0"},
+      {"x (a OR (b)", "?2"},
+      {"a)", "a)"},
+      {"a )", "?2"},
+      {"()", "?1"},
+      {"a ()", "?3"},
+      {"OR a", "?0"},
+      {"a OR", "?4"},
+      {"a OR OR b", "?5"},
+      {"a (OR b)", "?3"},
+      {"AND a", "?0"},
+      {"a AND", "?5"},
+      {"a AND AND b", "?6"},
+      {"a AND OR b", "?6"},
+      {"a NOT", "?2"},
+      {"NOT OR a", "?0"},
+      {"(a NOT)", "?3"},
+      {"-a", "?0"},
+      {"-a -b", "?0"},
+      {"NOT a", "?0"},
+      {"a OR -b", "?5"},
+      {"-(a b)", "?0"},
+      {"*", "?0"},
+      {"a *", "?2"},
+      {"***", "?0"},
+      {"\"*\"", "?1"},
+      {"name:", "?0"},
+      {"a name: b", "?2"},
+      {"name:*", "?5"},
+      {"name:**", "?5"},
+      {"name:\"\"", "?0"},
+      {"name:\"*\"", "?6"},
+      {"name:\"a", "?5"},
+      {"name:\"a/b\"", "?7"},
+      {"name:*a/b*", "?7"},
+      {"name:/*b", "?5"},
+      {"path:", "?0"},
+      {"path:*", "?5"},
+      {"share:", "?0"},
+      {"share:.x", "?6"},
+      {"share:a,", "?6"},
+      {"share:a/b", "?6"},
+      {"text:++", "?5"},
+      {"author:*", "?7"},
+      {"author:\"\"", "?0"},
+      {"author:\"x", "?7"},
+      {"kind:", "?0"},
+      {"kind:film", "?5"},
+      {"kind:video,", "?5"},
+      {"kind:video, audio", "?5"},
+      {"ext:", "?0"},
+      {"ext:,", "?4"},
+      {"ext:a/b", "?4"},
+      {"owner:no_such_user_here", "?6"},
+      {"owner:-1", "?6"},
+      {"owner:4294967296", "?6"},
+      {"under:a/b", "?6"},
+      {"under:/a/../b", "?6"},
+      {"under:.", "?6"},
+      {"is:nice", "?3"},
+      {"is:", "?0"},
+      {"has:name", "?4"},
+      {"has:size", "?4"},
+      {"has:x", "?4"},
+      {"content:read", "?8"},
+      {"size:big", "?5"},
+      {"size:>", "?6"},
+      {"size:>=", "?7"},
+      {"size:>x", "?6"},
+      {"size:1X", "?5"},
+      {"size:-1", "?5"},
+      {"size:1M..x", "?9"},
+      {"size:2M..1M", "?5"},
+      {"size:..", "?5"},
+      {"size:1e3", "?5"},
+      {"size:inf", "?5"},
+      {"size:nan", "?5"},
+      {"size:99999999T", "?5"},
+      {"size:0x10", "?5"},
+      {"size:M", "?5"},
+      {"year:two", "?5"},
+      {"year:99999999999999999999", "?5"},
+      {"pages:1.5", "?6"},
+      {"duration:m", "?9"},
+      {"duration:3x", "?9"},
+      {"duration:-3m", "?9"},
+      {"duration:99999999999999999999s", "?9"},
+      {"modified:tomorrowish", "?9"},
+      {"modified:2024-13", "?9"},
+      {"modified:2024-02-30", "?9"},
+      {"modified:2024-1", "?9"},
+      {"modified:24", "?9"},
+      {"modified:20245", "?9"},
+      {"modified:2024-01-05T25:00", "?9"},
+      {"modified:-7", "?9"},
+      {"modified:-", "?9"},
+      {"modified:>-7q", "?10"},
+      {"near:1,2", "?5"},
+      {"near:1,2,3,4", "?5"},
+      {"near:91,0,1km", "?5"},
+      {"near:0,181,1km", "?5"},
+      {"near:0,0,-1", "?5"},
+      {"near:a,b,c", "?5"},
+      {"near:0,0,km", "?5"},
+      {"near:nan,0,1", "?5"},
+      {std::string(5000, 'a'), "?4096"},
+  });
+}
+
+TEST_F(QueryRefusedTest, StarsThatWouldFindNothingAreRefused) {
+  ExpectAll({
+      {"inv*ce", "?3"},
+      {"a *port", "?2"},
+      {"re*po*", "?2"},
+      {"+*+", "?1"},
+      {"text:re*port", "?7"},
+      {"author:*x", "?7"},
+      {"under:\"/a\"*", "?10"},
+      {"size:\"1M\"*", "?9"},
+      {"kind:\"video\"*", "?12"},
+      {"ext:\"pdf\"*", "?9"},
+      {"ext:jp*", "?4"},
+      {"ext:\"*\"", "?5"},
+      {"is:\"file\"*", "?9"},
+      {"year:\"2024\"*", "?11"},
+  });
+}
+
+TEST_F(QueryRefusedTest, WhatCanOnlyBeMeantForAFieldIsRefused) {
+  ExpectAll({
+      {"sise:>1G", "?0"},       {"a -sise:1G", "?3"},     {"(sise:1G)", "?1"},
+      {"SIZ:1M", "?0"},         {"autor:x", "?0"},        {"form:bob", "?0"},
+      {"tags:sea", "?0"},       {"foo:>3", "?0"},         {"foo:<=3", "?0"},
+      {"foo:\"a b\"", "?0"},    {"undr:/srv/data", "?0"}, {"a undr:/srv/data", "?2"},
+      {"pth:/srv", "?0"},       {"shere:/x", "?0"},       {"siz:/", "?0"},
+      {"exr:pdf", "?0"},        {"ex:pdf", "?0"},         {"exxt:pdf", "?0"},
+      {"tga:sea", "?0"},        {"si:folder", "?0"},      {"iss:folder", "?0"},
+      {"us:folder", "?0"},      {"hsa:text", "?0"},       {"ot:bob", "?0"},
+      {"-(a exr:pdf)", "?4"},   {"size>10M", "?0"},       {"a Width<100", "?2"},
+      {"modified>=2024", "?0"},
+  });
+  QueryNode query;
+  QueryError error;
+  ASSERT_FALSE(ParseQuery("a sise:>1G", NOW, query, error));
+  EXPECT_EQ(error.Line("a sise:>1G"),
+            "there is no field 'sise'; 'size'? (a word with a colon stands in quotes) "
+            "(character 3, at: sise:>1G)");
+}
+
+TEST_F(QueryRefusedTest, WordsWithColonsAreWords) {
+  ExpectAll({
+      {"http://x", "http://x"},
+      {"https://example.org/a?b=c:d", "https://example.org/a?b=c:d"},
+      {"file:///x", "file:///x"},
+      {"texts://x", "texts://x"},
+      {"fs::path id::x tags::", "(fs::path id::x tags::)"},
+      {"C:\\x c:/y x:y", "(C:\\x c:/y x:y)"},
+      {"12:30", "12:30"},
+      {"std:vector", "std:vector"},
+      {"size> size=10 from<x xsize>10", "(size> size=10 from<x xsize>10)"},
+      {"Note: exr: size", "(Note: exr: size)"},
+      {"\"exr:pdf\"", "\"exr:pdf\""},
+  });
+}
+
+TEST_F(QueryRefusedTest, UsersThatCannotBeLookedUpAreNotUnknownOnes) {
+  QueryNode query;
+  QueryError error;
+  fail_lookups = {ERANGE, ERANGE};
+  EXPECT_EQ(Parsed("owner:root"), "owner:0") << "asked again with more room";
+  fail_lookups = {ENOENT};
+  EXPECT_FALSE(ParseQuery("owner:root", NOW, query, error));
+  EXPECT_EQ(error.what, "there is no user 'root'");
+  fail_lookups = {EIO};
+  EXPECT_FALSE(ParseQuery("owner:root", NOW, query, error));
+  EXPECT_EQ(error.what, "cannot look up the user 'root': Input/output error; a number needs none");
+  EXPECT_EQ(error.at, 6U);
+  fail_lookups = std::vector<int>(100, ERANGE);
+  EXPECT_FALSE(ParseQuery("owner:root", NOW, query, error));
+  EXPECT_TRUE(error.what.starts_with("cannot look up")) << error.what;
+  fail_lookups.clear();
+}
+
+TEST_F(QueryRefusedTest, WhatIsTooMuchIsRefused) {
+  std::string words;
+  for (int i = 0; i < 100; ++i) {
+    words += "a ";
+  }
+  EXPECT_NE(Parsed(words).front(), '?');
+  EXPECT_EQ(Parsed(words + "b"), "?200");
+  const auto nested = [](const std::string& before, size_t depth, const std::string& behind) {
+    std::string text;
+    for (size_t i = 0; i < depth; ++i) {
+      text += before;
+    }
+    return text + "b" + std::string(behind.empty() ? 0 : depth, ')');
+  };
+  EXPECT_EQ(Parsed(nested("(", 50, ")")), "b");
+  EXPECT_EQ(Parsed(nested("(", 51, ")")), "?51");
+  EXPECT_EQ(Parsed(nested("(", 2000, ")")), "?51");
+  EXPECT_EQ(Parsed("a " + nested("NOT ", 50, "")), "(a " + std::string(50, '-') + "b)");
+  EXPECT_EQ(Parsed("a " + nested("NOT ", 51, "")), "?202");
+  EXPECT_EQ(Parsed("a " + nested("-(", 25, ")")), "(a " + std::string(25, '-') + "b)");
+  EXPECT_EQ(Parsed("a " + nested("-(", 26, ")")).front(), '?');
+}
+
+TEST_F(QueryRefusedTest, ErrorsShowTheCharacterAndWhatStandsThere) {
+  const std::string text = "\u00fcber size:1X und mehr";
+  QueryNode query;
+  QueryError error;
+
+  ASSERT_FALSE(ParseQuery(text, NOW, query, error));
+  EXPECT_EQ(error.Line(text),
+            "'1X' is not a size like 500K, 10M or 1.5G (character 11, at: 1X und mehr)");
+}
+
+// What they say, and where.
+TEST_F(QueryRefusedTest, ErrorsAreLinesForPeople) {
+  const std::string missing = "something to find is missing here";
+  const std::vector<Case> cases = {
+      {"a OR", missing + " (character 5, at the end)"},
+      {"\u00fc (", missing + " (character 4, at the end)"},
+      {"a AND", missing + " (character 6, at the end)"},
+      {"a ()", "something to find is missing in front of this bracket (character 4, at: ))"},
+      {"OR a",
+       "OR stands between two things (the word stands in quotes: \"OR\") (character 1, at: OR a)"},
+      {"size:", "size: needs a value right behind the colon (character 1, at: size:)"},
+      {"size>1M",
+       "a colon is missing behind 'size' (a word with > stands in quotes) (character 1, at: "
+       "size>1M)"},
+      {"foo:>3",
+       "there is no field 'foo' (a word with a colon stands in quotes) (character 1, at: foo:>3)"},
+      {"", "nothing to search for"},
+  };
+  for (const Case& one : cases) {
+    QueryNode query;
+    QueryError error;
+    EXPECT_FALSE(ParseQuery(one.text, NOW, query, error)) << one.text;
+    EXPECT_EQ(error.Line(one.text), one.parsed);
+  }
+}
+
+}  // namespace fileindexd

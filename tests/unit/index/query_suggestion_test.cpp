@@ -1,0 +1,60 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/suggestion.h"
+#include "tests/unit/index/question_fixture.h"
+
+namespace fileindexd {
+
+class QuerySuggestionTest : public QuestionTest {};
+
+TEST_F(QuerySuggestionTest, SuggestionsAreWordsThatTheIndexHas) {
+  Store({{"holiday plans.txt", TextContent("the computer counts invoices")}});
+  Empty({"holy.txt", "\u6771\u4eac.txt"});
+
+  EXPECT_EQ(Suggested("holidya"), "holiday");
+  EXPECT_EQ(Suggested("holidys plans"), "holiday plans");
+  EXPECT_EQ(Suggested("ohliday"), "holiday");
+  EXPECT_EQ(Suggested("computr"), "computer") << "not the stem alone";
+  EXPECT_EQ(Suggested("invocies OR xyzzyx"), "");
+  EXPECT_EQ(Suggested("kind:document  invocies"), "kind:document  invoices");
+  EXPECT_EQ(Suggested("\"holidya\""), "");
+  EXPECT_EQ(Suggested("zzzzzz"), "");
+  EXPECT_EQ(Suggested("ho"), "");
+  EXPECT_EQ(Suggested("kind:audio holidya"), "") << "would find nothing either";
+  EXPECT_EQ(Suggested("kind:audio"), "");
+  EXPECT_EQ(Hits("holiday"), Names({"holiday plans.txt"}));
+  EXPECT_EQ(answer.suggestion, "");
+}
+
+// Composed or parted, in the question or on disk: an accent is no slip.
+TEST_F(QuerySuggestionTest, SuggestionsAreThoseOfTheLettersWithoutAccents) {
+  Store({{"\u00dcberweisung.txt", TextContent("die Geb\u00fchren")},
+         {"Re\u0301sume\u0301.txt", TextContent("\u041c\u043e\u0441\u043a\u0432\u0430")}});
+
+  for (const char* slip : {"\u00fcberwiesung", "u\u0308berwiesung", "uberwiesung",
+                           "\u00dcBERWIESUNG", "\u00fcberweisnug", "u\u0308berweisnug"}) {
+    EXPECT_EQ(Suggested(slip), "uberweisung") << slip;
+  }
+  for (const char* slip : {"geb\u00fcrhen", "gebu\u0308rhen"}) {
+    EXPECT_EQ(Suggested(slip), "gebuhren") << slip;
+  }
+  EXPECT_EQ(Suggested("r\u00e9smu\u00e9"), "resume");
+  EXPECT_EQ(Suggested("re\u0301smue\u0301"), "resume");
+  EXPECT_EQ(Suggested("\u043c\u043e\u0441\u043a\u0430\u0432"),
+            "\u043c\u043e\u0441\u043a\u0432\u0430");
+  EXPECT_EQ(Sorted("uberweisung"), Names({"\u00dcberweisung.txt"}));
+}
+
+TEST_F(QuerySuggestionTest, DistanceCountsSlips) {
+  EXPECT_EQ(EditDistance("abc", "abc", 2), 0);
+  EXPECT_EQ(EditDistance("abc", "acb", 2), 1);
+  EXPECT_EQ(EditDistance("abc", "ab", 2), 1);
+  EXPECT_EQ(EditDistance("abc", "xbc", 2), 1);
+  EXPECT_EQ(EditDistance("abc", "abxc", 2), 1);
+  EXPECT_EQ(EditDistance("abcd", "badc", 2), 2);
+  EXPECT_EQ(EditDistance("abc", "xyz", 2), 3);
+  EXPECT_EQ(EditDistance("\u00fcb", "\u00e4b", 2), 1);
+  EXPECT_EQ(EditDistance("", "ab", 1), 2);
+  EXPECT_EQ(EditDistance("", "", 1), 0);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,111 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/snippet.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+#include <set>
+
+#include "base/content.h"
+#include "index/query.h"
+#include "index/text_tokenizer.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr size_t SHOWN = 120;  // bytes from the first shown word on, in which all others end
+
+struct Text {
+  std::string text;
+  std::vector<Snippet::Mark> places;  // of the words that are asked for
+  std::vector<std::string> words;     // at those places
+};
+
+// No two fillers are the same, so a part of it is found again in one place alone.
+Text MakeText(std::mt19937& random, size_t words) {
+  constexpr const char* ASKED[] = {"alpha", "beta", "gamma"};
+  std::uniform_int_distribution<size_t> kind(0, 20);
+  Text made;
+  for (size_t i = 0; i < words; ++i) {
+    const size_t chosen = kind(random);
+    const std::string word = chosen < 3 ? ASKED[chosen] : "w" + std::to_string(1000 + i);
+    if (chosen < 3) {
+      made.places.push_back({made.text.size(), made.text.size() + word.size()});
+      made.words.push_back(word);
+    }
+    made.text += word + " ";
+  }
+  return made;
+}
+
+// The first place from which on most different words are shown.
+size_t BestPlace(const Text& text) {
+  size_t best = 0;
+  size_t most = 0;
+  for (size_t i = 0; i < text.places.size(); ++i) {
+    std::set<std::string> shown;
+    for (size_t j = i; j < text.places.size(); ++j) {
+      if (text.places[j].end < text.places[i].start + SHOWN) {
+        shown.insert(text.words[j]);
+      }
+    }
+    best = shown.size() > most ? i : best;
+    most = std::max(most, shown.size());
+  }
+  return best;
+}
+
+// The parameter is the number of words in a text.
+class SnippetTest : public testing::TestWithParam<size_t> {
+ protected:
+  Snippet Make(const std::string& text) {
+    QueryNode nodes[3];
+    std::vector<const QueryNode*> words;
+    constexpr const char* ASKED[] = {"alpha", "beta", "gamma"};
+    for (size_t i = 0; i < 3; ++i) {
+      nodes[i].text = ASKED[i];
+      words.push_back(&nodes[i]);
+    }
+    Content content;
+    content.text = text;
+    return MakeSnippet(content, words, cutter);
+  }
+
+  TextCutter cutter{NO_LANGUAGE};
+};
+
+TEST_P(SnippetTest, FirstPlaceWithMostWordsIsShownWithAllThatStandThere) {
+  std::mt19937 random(20);
+  for (int round = 0; round < 200; ++round) {
+    const Text text = MakeText(random, GetParam());
+    const Snippet snippet = Make(text.text);
+    ASSERT_EQ(snippet.text.empty(), text.places.empty());
+    if (text.places.empty()) {
+      continue;
+    }
+    const size_t at = text.text.find(snippet.text);
+    const Snippet::Mark& best = text.places[BestPlace(text)];
+    ASSERT_NE(at, std::string::npos);
+    EXPECT_LE(at, best.start);
+    EXPECT_GE(at + 40, best.start);
+
+    std::vector<size_t> marked;
+    for (const Snippet::Mark& mark : snippet.marks) {
+      marked.push_back(at + mark.start);
+    }
+    std::vector<size_t> standing;
+    for (const Snippet::Mark& place : text.places) {
+      if (place.start >= at && place.end <= at + snippet.text.size()) {
+        standing.push_back(place.start);
+      }
+    }
+    EXPECT_EQ(marked, standing) << text.text;
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(Lengths, SnippetTest, testing::Values(5, 50, 200));
+
+}  // namespace
+
+}  // namespace fileindexd
