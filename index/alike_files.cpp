@@ -126,6 +126,10 @@ class SetCollector {
       ++duplicates.set_count;
       duplicates.files += set.files;
       duplicates.spare = AddedBytes(duplicates.spare, set.Spare());
+      // They come in the order of their inode numbers, which tells people nothing.
+      std::sort(set.places.begin(), set.places.end(), [](const auto& a, const auto& b) {
+        return std::tie(a.path, a.share) < std::tie(b.path, b.share);
+      });
       Keep(std::move(set));
     }
     set = {};

@@ -78,7 +78,7 @@ struct AlikeFiles {
   };
   int64_t size = 0;
   uint64_t files = 0;         // different ones, at least two
-  std::vector<Place> places;  // the first path of each, at most MOST_PLACES of them
+  std::vector<Place> places;  // by path: the first one of each file, at most MOST_PLACES of them
 
   int64_t Spare() const { return ManifoldBytes(size, files - 1); }  // bytes
 };

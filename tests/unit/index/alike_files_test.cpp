@@ -37,7 +37,7 @@ class AlikeFilesTest : public ContentsTest {
 };
 
 TEST_F(AlikeFilesTest, AreThoseOfOneSizeAndOneSample) {
-  StoreAlike({"a", "b"}, 7);
+  StoreAlike({"b", "a"}, 7);
   StoreAlike({"c"}, 8);
 
   const Statistics statistics = Ask();
