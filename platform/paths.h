@@ -24,6 +24,10 @@ bool IsFileExist(const std::string& path);
 // Whether a directory itself may be an index entry.
 bool CanFullPathBeIndexed(const std::string& path);
 
+// Told of a directory that a walk passes over, as opening it failed with `error` (of errno): what
+// only lacked a descriptor can be walked later. Never tests for cancellation.
+void NoteUnopenedDirectory(const std::string& path, int error);
+
 // True for bare names that are never indexed and never descended into.
 bool IsSystemPreservedFileName(const std::string& name);
 

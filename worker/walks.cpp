@@ -32,7 +32,12 @@ Open OpenDirectory(const std::string& path, ScopedDir& stream) {
   if (stream.dir != nullptr) {
     return Open::DONE;
   }
-  return errno == ENOTDIR ? Open::NOT_A_DIRECTORY : Open::FAILED;
+  const int error = errno;
+  if (error == ENOTDIR) {
+    return Open::NOT_A_DIRECTORY;
+  }
+  TALO::FILEINDEX::NoteUnopenedDirectory(path, error);
+  return Open::FAILED;
 }
 
 // As readdir64_r. The entry is read into the caller's own buffer, one for each level; hence the

@@ -70,18 +70,21 @@ int64_t Now() {
   return static_cast<int64_t>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
 }
 
-// `error`: of a look that failed.
-void NoteShortage(const Settings& settings, const std::string& path, const Look& look, int error) {
+void NoteShortage(const Settings& settings, const std::string& path, int error) {
   const std::optional<std::string> normal = NormalPath(path);
   const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
-  if (share == nullptr) {
-    return;
-  }
-  if (look.verdict == Verdict::UNKNOWN) {
+  if (share != nullptr) {
     NoteFailedLook(share->name, path, error);
-  } else if (look.verdict == Verdict::BELONGS && look.thing == Thing::DIRECTORY) {
-    NoteDirectory(share->name, path);
   }
+}
+
+Thing LookAgain(const Settings& settings, const std::string& path) {
+  errno = 0;
+  const Thing thing = ThingAt(settings, path);
+  if (thing == Thing::NONE) {
+    NoteShortage(settings, path, errno);
+  }
+  return thing;
 }
 
 const Glance& GlanceAt(const std::string& path) {
@@ -97,8 +100,11 @@ const Glance& GlanceAt(const std::string& path) {
     kept.settings = settings;
     errno = 0;
     kept.look = LookNear(*kept.settings, path, folder);
-    NoteShortage(*kept.settings, path, kept.look, errno);
-    kept.thing = IsNameVerdict(kept.look.verdict) ? ThingAt(*kept.settings, path) : kept.look.thing;
+    if (kept.look.verdict == Verdict::UNKNOWN) {
+      NoteShortage(*kept.settings, path, errno);
+    }
+    kept.thing =
+        IsNameVerdict(kept.look.verdict) ? LookAgain(*kept.settings, path) : kept.look.thing;
     kept.path = path;
     kept.time = now;
     // Between two passes a queue file is asked for. That look is not kept, nor the folder and the
@@ -166,6 +172,11 @@ bool CanFullPathBeIndexed(const std::string& path) {
     // What is not covered was judged by its name alone.
     return verdict == Verdict::BELONGS ? !glance.look.mount_root : IsMountPoint(normal) == 0;
   });
+}
+
+void NoteUnopenedDirectory(const std::string& path, int error) {
+  const CancelOff off;
+  NoteShortage(*CurrentSettings(), path, error);
 }
 
 bool IsSystemPreservedFileName(const std::string& name) {

@@ -1,16 +1,12 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "platform/standalone/shortage.h"
 
-#include <fcntl.h>
-#include <sys/resource.h>
-
 #include <cerrno>
 #include <cstdlib>
 #include <map>
 #include <mutex>
 #include <utility>
 
-#include "base/scoped_fd.h"
 #include "platform/log.h"
 #include "platform/standalone/environment.h"
 #include "state/queue_writer.h"
@@ -21,9 +17,6 @@ namespace {
 
 constexpr int MAX_TRIES = 8;
 constexpr unsigned FIRST_WAIT_US = 20000;  // at most; doubled for each try
-
-// Between a look at a directory and its opening other threads take descriptors, too.
-constexpr rlim_t MARGIN = 6;
 
 struct Pass {
   bool is_short = false;
@@ -64,21 +57,7 @@ int CountShort(const std::string& share) {
   return ++found->second.tries;
 }
 
-// New descriptors get the lowest free numbers.
-bool IsNearLimit() {
-  rlimit limit = {};
-  const ScopedFd lowest(fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 0));
-  return lowest.fd >= 0 && getrlimit(RLIMIT_NOFILE, &limit) == 0 &&
-         static_cast<rlim_t>(lowest.fd) + MARGIN >= limit.rlim_cur;
-}
-
 }  // namespace
-
-void NoteDirectory(const std::string& share, const std::string& path) {
-  if (IsNearLimit()) {
-    NoteFailedLook(share, path, EMFILE);
-  }
-}
 
 void NoteFailedLook(const std::string& share, const std::string& path, int error) {
   if (error != EMFILE && error != ENFILE) {

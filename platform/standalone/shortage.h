@@ -11,12 +11,8 @@
 
 namespace fileindexd {
 
-// A look at `path` failed with `error`; only a shortage counts.
+// A look at `path`, or its opening, failed with `error`; only a shortage counts.
 void NoteFailedLook(const std::string& share, const std::string& path, int error);
-
-// A directory was found at `path`, and may be about to be opened: counts as well when hardly any
-// descriptor is left.
-void NoteDirectory(const std::string& share, const std::string& path);
 
 // At the end of a pass. Microseconds to wait before the next one, 0 when the pass was whole, or
 // when it is not tried again: then the share's needs-reindex flag stands until its next event.

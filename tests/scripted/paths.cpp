@@ -36,6 +36,10 @@ bool CanFullPathBeIndexed(const std::string& path) {
   return TheScript().Enter("CanFullPathBeIndexed", path, path).value_or(1) != 0;
 }
 
+void NoteUnopenedDirectory(const std::string& path, int error) {
+  TheScript().Enter("NoteUnopenedDirectory", path, path + " " + std::to_string(error));
+}
+
 bool IsSystemPreservedFileName(const std::string& name) {
   return TheScript().Enter("IsSystemPreservedFileName", name, name).value_or(0) != 0;
 }

@@ -87,8 +87,9 @@ class FuseTest(WatchedDiskTest):
             self.skipTest("no FUSE here")
         behind = f"{namespace.DATA}/behind"
         os.mkdir(behind)
-        # The kernel may believe for a second what it knew of a file's other names.
-        run("bindfs", "-o", "attr_timeout=0", behind, self.disk)
+        # The kernel may believe for a second what it knew of a file's other names. A removed file that
+        # somebody has open would stay in its folder under another name.
+        run("bindfs", "-o", "attr_timeout=0,hard_remove", behind, self.disk)
 
     def tearDown(self):
         super().tearDown()
