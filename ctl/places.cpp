@@ -100,10 +100,6 @@ bool Session::Open() {
   return true;
 }
 
-bool Session::OpenSettings() {
-  return StateStore::PeekSettings(settings) || Open();
-}
-
 const Share* Session::FindShare(const std::string& name) const {
   const Share* share = settings->ShareByName(name);
   if (share == nullptr) {

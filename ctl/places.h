@@ -14,8 +14,6 @@ namespace fileindexd {
 struct Session {
   // False, with its line written, on failure.
   bool Open();
-  // For a command that needs nothing but the settings; there may be no store then.
-  bool OpenSettings();
   // The share of that name; null, with its line written, when there is none.
   const Share* FindShare(const std::string& name) const;
 

@@ -168,8 +168,7 @@ int Search(const Arguments& arguments) {
   question.limit += tells_of_more ? 1 : 0;
 
   Session session;
-  const bool opened = arguments.wait ? session.Open() : session.OpenSettings();
-  if (!opened || !ChooseShares(session, arguments, question)) {
+  if (!session.Open() || !ChooseShares(session, arguments, question)) {
     return EXIT_FAILED;
   }
   if (arguments.wait) {

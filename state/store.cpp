@@ -177,17 +177,6 @@ std::unique_ptr<StateStore> StateStore::Open(std::string& error) {
   return store;
 }
 
-bool StateStore::PeekSettings(std::shared_ptr<const Settings>& settings) {
-  Impl impl;
-  impl.connection = OpenUnusedState();
-  auto loaded = std::make_shared<Settings>();
-  if (impl.connection == nullptr || !impl.Load(*loaded)) {
-    return false;
-  }
-  settings = loaded;
-  return true;
-}
-
 std::string StateStore::Error() {
   const std::lock_guard guard(impl->mutex);
   return impl->error;

@@ -35,9 +35,6 @@ class StateStore {
   // Opens the database, making it and the state root where they are missing. None on failure, and
   // `error` then tells.
   static std::unique_ptr<StateStore> Open(std::string& error);
-  // The settings in force, for whoever wants nothing else. False, with nothing told, where the
-  // store has to be opened for that: as always while another program has it open.
-  static bool PeekSettings(std::shared_ptr<const Settings>& settings);
   ~StateStore();
   StateStore(const StateStore&) = delete;
   StateStore& operator=(const StateStore&) = delete;

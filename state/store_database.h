@@ -15,7 +15,6 @@
 #include <memory>
 #include <string>
 
-#include "base/scoped_fd.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -32,10 +31,8 @@ class StateConnection {
 
   sqlite3* db = nullptr;
   std::string path;
-  // Why it is for reading only, and sees no later change: the disk is full, or it is one of
-  // OpenUnusedState. Else empty.
+  // Why it is for reading only, and sees no later change: the disk is full. Else empty.
   std::string read_only;
-  ScopedFd lock;  // on the state root, of OpenUnusedState; let go after the database
 };
 
 // Opens the database: makes it where there is none, upgrades an older one, refuses a newer one, and
@@ -44,13 +41,8 @@ class StateConnection {
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 
 // The second half of that: opens `connection` for reading what was closed properly, on a full disk.
-// `error` is what kept it from being opened. In store_unlogged.cpp, as the next one.
+// `error` is what kept it from being opened. In store_unlogged.cpp.
 bool OpenFullState(StateConnection& connection, const std::string& error);
-
-// Opens a database that no program has open, to read it once, with neither log nor shared memory:
-// these would be made and removed again, which costs several times as much as the reading. While
-// it is open, others wait for the lock. Null where that cannot be: OpenStateDatabase then tells.
-std::unique_ptr<StateConnection> OpenUnusedState();
 
 // Leaves a copy of what is committed beside the database. It is checked before it replaces the one
 // that is there. False on failure, and that one stays.

@@ -1,13 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Reading the state database without its log and without the shared memory that a log needs, while
 // that holds nothing that the database does not.
-#include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 
-#include <cerrno>
-
-#include "base/scoped_fd.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
 #include "state/store_database.h"
@@ -42,11 +37,6 @@ bool OpenUnlogged(StateConnection& connection) {
          QuickCheck(connection.db, ok) == SQLITE_OK && ok;
 }
 
-bool IsAbsent(const std::string& path) {
-  struct stat st {};
-  return lstat(path.c_str(), &st) != 0 && errno == ENOENT;
-}
-
 }  // namespace
 
 bool OpenFullState(StateConnection& connection, const std::string& error) {
@@ -58,27 +48,6 @@ bool OpenFullState(StateConnection& connection, const std::string& error) {
   }
   connection.read_only = error + "; its disk is full";
   return true;
-}
-
-std::unique_ptr<StateConnection> OpenUnusedState() {
-  auto connection = std::make_unique<StateConnection>();
-  connection->path = StateDatabasePath();
-  ScopedFd lock(open(StateRoot().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (lock.fd < 0 || flock(lock.fd, LOCK_SH | LOCK_NB) != 0) {
-    return nullptr;
-  }
-  connection->lock.Swap(lock);
-
-  // Whoever has it open has made these.
-  struct stat st {};
-  for (const char* companion : {"-wal", "-shm", "-journal"}) {
-    if (!IsAbsent(connection->path + companion)) {
-      return nullptr;
-    }
-  }
-  const bool is_file = lstat(connection->path.c_str(), &st) == 0 && S_ISREG(st.st_mode);
-  connection->read_only = "it was opened to be read once";
-  return is_file && OpenUnlogged(*connection) ? std::move(connection) : nullptr;
 }
 
 }  // namespace fileindexd
