@@ -56,7 +56,7 @@ std::string NameFolder::Fold(std::string_view name, bool apart, std::vector<uint
       }
       last = joined != 0 ? joined : plain;
       last_at = text.size();
-      AppendUtf8(last, text);
+      AppendUtf8(static_cast<char32_t>(last), text);
     } else if (entry.type != CharacterClass::MARK) {
       last = 0;
       if (entry.type == CharacterClass::SEPARATOR || character.code == END_CODE) {

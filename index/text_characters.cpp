@@ -187,7 +187,7 @@ const CharacterTable::Entry& CharacterTable::Of(int32_t code) {
     return entry;
   }
   std::string raw;
-  AppendUtf8(code, raw);
+  AppendUtf8(static_cast<char32_t>(code), raw);
   std::string exact = LowerComposed(raw);
   std::string folded = WithoutMarks(raw);
   if (exact.size() + folded.size() > entry.bytes.size()) {

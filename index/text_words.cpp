@@ -222,8 +222,8 @@ size_t TextWords::Pairs(std::string_view text, size_t at) {
   std::string pair;
   const auto put_pair = [&] {
     pair.clear();
-    AppendUtf8(before.code, pair);
-    AppendUtf8(last.code, pair);
+    AppendUtf8(static_cast<char32_t>(before.code), pair);
+    AppendUtf8(static_cast<char32_t>(last.code), pair);
     Put(pair, before.start, last.end);
   };
   while (at < text.size() && code == SQLITE_OK) {
@@ -251,7 +251,7 @@ size_t TextWords::Pairs(std::string_view text, size_t at) {
   // A question's last character may go on in the text; if words follow, their place counts.
   if (is_only || !is_question || HoldsWordsFrom(text, at)) {
     pair.clear();
-    AppendUtf8(last.code, pair);
+    AppendUtf8(static_cast<char32_t>(last.code), pair);
     Put(pair, last.start, last.end);
   }
   return at;
