@@ -54,11 +54,10 @@ class Opener {
   std::shared_ptr<ScopedFd> Keep(ScopedFd& file);
 
   bool IsWaiting() const { return waiting > 0; }
-  // When it is too late for the next answer; max() if none is awaited, or the file system has
-  // given it, and the work that goes with it is done. 10 s after the last one, or
-  // after the first question: long enough for a disk that has to start, however many files a
-  // question is about. Whoever asks too much at once for a slow file system asks for less the next
-  // time.
+  // When it is too late for the next answer; max() if none is awaited, or the file system has given
+  // it, and the work that goes with it is being done. 10 s after the last one, or after the first
+  // question: long enough for a disk that has to start, however many files a question is about.
+  // Whoever asks too much at once for a slow file system asks for less the next time.
   Time Deadline() const;
   void AddPolled(std::vector<pollfd>& polled) const;
 
