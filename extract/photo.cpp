@@ -37,8 +37,8 @@ constexpr int64_t MAX_PIXELS = 1 << 20;    // on a side
 constexpr size_t SMALLEST = 256;
 
 // A file's bytes, mapped: the library wants all of a raw file at once, and looks at few of its
-// pages. A page that cannot be had, of a disk that
-// fails or a file that was cut meanwhile, ends the helper by SIGBUS (see main.cpp).
+// pages. A page that cannot be had, of a disk that fails or a file that was cut meanwhile, ends the
+// helper by SIGBUS (see main.cpp).
 class Mapping {
  public:
   explicit Mapping(const Document& document) : size(static_cast<size_t>(document.size)) {
