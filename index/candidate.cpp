@@ -17,6 +17,13 @@ std::string FactsColumns() {
          std::string(NUMBER_COLUMNS);
 }
 
+void ReadShort(const Statement& row, Entry& entry) {
+  entry.id = row.Int(0);
+  entry.path = row.Bytes(1);
+  entry.kind = static_cast<Kind>(row.Int(2));
+  entry.mtime = row.Int(3);
+}
+
 FileFacts ReadFacts(const Statement& row, int first) {
   FileFacts facts;
   facts.id = row.Int(first);
@@ -41,46 +48,35 @@ int Done(int code) {
 
 }  // namespace
 
-int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
-  int code = SQLITE_OK;
-  if (by_id == nullptr) {
-    code = statements.Find("SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1", by_id);
-  }
+int CandidateRows::FindRow(int64_t id, const char* sql, ReadColumns* read, Statement*& by,
+                           Candidate& candidate, bool& found) {
+  int code = by == nullptr ? statements.Find(sql, by) : SQLITE_OK;
   if (code != SQLITE_OK) {
     return code;
   }
-  by_id->BindInt(1, id);
-  code = by_id->Step();
+  by->BindInt(1, id);
+  code = by->Step();
   found = code == SQLITE_ROW;
   if (found) {
     candidate = Candidate();
-    ReadEntry(*by_id, candidate.entry);
+    read(*by, candidate.entry);
   }
-  by_id->Reset();
+  by->Reset();
   return Done(code);
 }
 
+int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
+  return FindRow(id, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1", ReadEntry,
+                 by_id, candidate, found);
+}
+
 int CandidateRows::FindShort(int64_t id, Candidate& candidate, bool& found) {
-  int code = SQLITE_OK;
-  if (short_by_id == nullptr) {
-    code = statements.Find("SELECT path, kind, mtime FROM entries WHERE id = ?1", short_by_id);
-  }
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  short_by_id->BindInt(1, id);
-  code = short_by_id->Step();
-  found = code == SQLITE_ROW;
+  const int code = FindRow(id, "SELECT id, path, kind, mtime FROM entries WHERE id = ?1", ReadShort,
+                           short_by_id, candidate, found);
   if (found) {
-    candidate = Candidate();
     candidate.is_whole = false;
-    candidate.entry.id = id;
-    candidate.entry.path = short_by_id->Bytes(0);
-    candidate.entry.kind = static_cast<Kind>(short_by_id->Int(1));
-    candidate.entry.mtime = short_by_id->Int(2);
   }
-  short_by_id->Reset();
-  return Done(code);
+  return code;
 }
 
 int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {

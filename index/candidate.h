@@ -64,6 +64,11 @@ class CandidateRows {
   bool has_contents;
 
  private:
+  using ReadColumns = void(const Statement& row, Entry& entry);
+
+  int FindRow(int64_t id, const char* sql, ReadColumns* read, Statement*& by, Candidate& candidate,
+              bool& found);
+
   NameFolder folder;
   // Null: not asked for yet.
   Statement* by_id = nullptr;
