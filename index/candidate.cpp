@@ -84,7 +84,8 @@ int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
   if (of_text == nullptr) {
     const std::string sql = "SELECT " FILEINDEX_ENTRY_COLUMNS ", " + FactsColumns() +
                             " FROM contents.files AS files CROSS JOIN entries "
-                            "ON " FILEINDEX_SAME_FILE " WHERE files.text = ?1 AND files.text <> 0";
+                            "ON " FILEINDEX_WANTED_FILE
+                            " WHERE files.text = ?1 AND files.text <> 0";
     code = statements.Find(sql, of_text);
   }
   if (code != SQLITE_OK) {
@@ -120,18 +121,14 @@ int CandidateRows::NeedFacts(Candidate& candidate) {
   }
   int code = SQLITE_OK;
   if (facts == nullptr) {
-    const std::string sql = "SELECT " + FactsColumns() +
-                            " FROM contents.files AS files WHERE inode = ?1 AND birth_time = ?2 "
-                            "AND size = ?3 AND mtime = ?4";
+    const std::string sql =
+        "SELECT " + FactsColumns() + " FROM contents.files AS files WHERE " FILEINDEX_THAT_FILE;
     code = statements.Find(sql, facts);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  facts->BindInt(1, static_cast<int64_t>(candidate.entry.inode));
-  facts->BindInt(2, candidate.entry.birth_time);
-  facts->BindInt(3, candidate.entry.size);
-  facts->BindInt(4, candidate.entry.mtime);
+  BindIdentity(*facts, IdentityOf(candidate.entry));
   code = facts->Step();
   if (code == SQLITE_ROW) {
     candidate.facts = ReadFacts(*facts, 0);
@@ -170,7 +167,7 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
   if (twin == nullptr) {
     code = statements.Find(
         "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
-        "ON " FILEINDEX_SAME_FILE
+        "ON " FILEINDEX_WANTED_FILE
         " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
         "AND files.id <> ?3 AND files.state = 1 LIMIT 1",
         twin);

@@ -78,9 +78,4 @@ class CandidateRows {
   Statement* twin = nullptr;
 };
 
-// Columns of an entry and of its file that are the same file, contents of it wanted.
-#define FILEINDEX_SAME_FILE                                                    \
-  "entries.inode = files.inode AND entries.birth_time = files.birth_time AND " \
-  "entries.size = files.size AND entries.mtime = files.mtime AND entries.content_wanted = 1"
-
 }  // namespace fileindexd

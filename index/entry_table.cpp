@@ -55,6 +55,13 @@ void ReadEntry(const Statement& statement, Entry& entry) {
   entry.reread = statement.Int(15);
 }
 
+void BindIdentity(Statement& statement, const FileIdentity& identity) {
+  statement.BindInt(1, static_cast<int64_t>(identity.inode));
+  statement.BindInt(2, identity.birth_time);
+  statement.BindInt(3, identity.size);
+  statement.BindInt(4, identity.mtime);
+}
+
 int EntryTable::Prepare(sqlite3* db) {
   handle = db;
   const std::pair<Statement*, const char*> statements[] = {

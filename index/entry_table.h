@@ -28,6 +28,8 @@ struct PathRange {
 std::string_view LastComponent(std::string_view path);
 // Reads the columns of FILEINDEX_ENTRY_COLUMNS.
 void ReadEntry(const Statement& statement, Entry& entry);
+// Binds the values of FILEINDEX_THAT_FILE.
+void BindIdentity(Statement& statement, const FileIdentity& identity);
 
 class EntryTable {
  public:

@@ -143,7 +143,8 @@ std::string RowsSql(const QueryNode& tree, bool has_contents) {
   const std::string columns = "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM ";
   return by_file && has_contents
              ? columns +
-                   "contents.files AS files CROSS JOIN entries ON " FILEINDEX_SAME_FILE " WHERE 1" +
+                   "contents.files AS files CROSS JOIN entries ON " FILEINDEX_WANTED_FILE
+                   " WHERE 1" +
                    of_file + of_entry
              : columns + "entries WHERE 1" + of_entry;
 }
