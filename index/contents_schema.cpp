@@ -5,7 +5,8 @@
 
 namespace fileindexd {
 
-static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3,
+static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
+                  ALL_WORDS == 9223372036854775807,
               "numbers in the text below");
 
 namespace {

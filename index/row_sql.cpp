@@ -156,15 +156,15 @@ std::string OrderedSql(SortBy sort) {
       return "";
     case SortBy::SIZE:
       return "SELECT " FILEINDEX_ENTRY_COLUMNS
-             ", size FROM entries INDEXED BY entries_large WHERE size >= 1048576 "
-             "ORDER BY size DESC";
+             ", size FROM entries INDEXED BY entries_large WHERE " FILEINDEX_IS_LARGE
+             " ORDER BY size DESC";
     case SortBy::MODIFIED:
       break;
   }
   // What is older than the first week has the key 0, like nothing at all.
-  return "SELECT " FILEINDEX_ENTRY_COLUMNS
-         ", mtime / 604800000000000 FROM entries INDEXED BY entries_by_week "
-         "WHERE mtime <> 0 AND mtime / 604800000000000 > 0 ORDER BY mtime / 604800000000000 DESC";
+  return "SELECT " FILEINDEX_ENTRY_COLUMNS ", " FILEINDEX_WEEK
+         " FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND " FILEINDEX_WEEK
+         " > 0 ORDER BY " FILEINDEX_WEEK " DESC";
 }
 
 }  // namespace fileindexd
