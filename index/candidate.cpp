@@ -33,12 +33,7 @@ FileFacts ReadFacts(const Statement& row, int first) {
   facts.length = row.Int(first + 4);
   facts.sample = row.Int(first + 5);
   facts.fields = row.Int(first + 6);
-  for (size_t i = 0; i < NUMBER_FIELDS; ++i) {
-    const int column = first + FIRST_NUMBER + static_cast<int>(i);
-    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
-      facts.numbers[i] = row.Int(column);
-    }
-  }
+  facts.numbers = ReadNumbers(row, first + FIRST_NUMBER);
   return facts;
 }
 

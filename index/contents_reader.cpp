@@ -60,11 +60,11 @@ bool ReadContent(const Statement& row, Content& content) {
   content.kind = static_cast<Kind>(row.Int(2));
   content.is_cut = row.Int(3) != 0;
   content.sample = static_cast<uint64_t>(row.Int(4));
-  const auto last = static_cast<int>(ContentField::RATING);
-  for (int field = static_cast<int>(FIRST_NUMBER_FIELD); field <= last; ++field) {
-    const int column = FIRST_NUMBER_COLUMN + field - static_cast<int>(FIRST_NUMBER_FIELD);
-    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
-      content.numbers.push_back({static_cast<ContentField>(field), row.Int(column)});
+  const FieldNumbers numbers = ReadNumbers(row, FIRST_NUMBER_COLUMN);
+  for (size_t i = 0; i < numbers.size(); ++i) {
+    if (numbers[i].has_value()) {
+      const auto number = static_cast<size_t>(FIRST_NUMBER_FIELD) + i;
+      content.numbers.push_back({static_cast<ContentField>(number), *numbers[i]});
     }
   }
   return row.Int(5) == 0 || UnpackTexts(row.Bytes(6), content);

@@ -50,11 +50,7 @@ std::string Between(const std::string& column, int64_t lowest, int64_t highest) 
 }
 
 std::string ColumnOf(ContentField field) {
-  std::string_view columns = NUMBER_COLUMNS;
-  for (auto i = static_cast<int>(FIRST_NUMBER_FIELD); i < static_cast<int>(field); ++i) {
-    columns.remove_prefix(columns.find(", ") + 2);
-  }
-  return "files." + std::string(columns.substr(0, columns.find(',')));
+  return "files." + ColumnAt(NUMBER_COLUMNS, NumberPlace(field));
 }
 
 std::string OfEntry(const QueryNode& node) {
