@@ -140,14 +140,6 @@ std::string TextQueryOf(const QueryNode& node) {
   return "";
 }
 
-std::string Quoted(std::string_view text) {
-  std::string quoted = "\"";
-  for (const char c : text) {
-    quoted.append(c == '"' ? 2 : 1, c);
-  }
-  return quoted + '"';
-}
-
 std::vector<size_t> CharacterStarts(std::string_view text) {
   std::vector<size_t> starts;
   for (size_t i = 0; i < text.size(); ++i) {

@@ -8,6 +8,7 @@
 #include "base/utf8.h"
 #include "index/asked.h"
 #include "index/entry_table.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 

@@ -9,6 +9,7 @@
 #include "index/row_sql.h"
 #include "index/schema.h"
 #include "index/text_order.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 

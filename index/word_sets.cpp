@@ -8,6 +8,7 @@
 #include "index/name_pattern.h"
 #include "index/name_text.h"
 #include "index/schema.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
