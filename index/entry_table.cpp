@@ -24,12 +24,23 @@ int64_t Now() {
 
 }  // namespace
 
-PathRange::PathRange(const std::string& path) : first(path), end() {
+PathRange::PathRange(const std::string& path) : at(path), first(path), end() {
   if (path != "/") {
     first += '/';
   }
   end = first;
   end.back() = '/' + 1;
+}
+
+void PathRange::Bind(Statement& statement) const {
+  statement.BindBlob(1, at);
+  statement.BindBlob(2, first);
+  statement.BindBlob(3, end);
+}
+
+std::string AtOrBelowSql(const std::string& at, const std::string& first, const std::string& end) {
+  return "(entries.path = " + at + " OR (entries.path > " + first + " AND entries.path < " + end +
+         "))";
 }
 
 std::string_view LastComponent(std::string_view path) {
@@ -76,7 +87,7 @@ int EntryTable::Prepare(sqlite3* db) {
       {&find, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1"},
       {&next, "SELECT path, id FROM entries WHERE path >= ?1 ORDER BY path LIMIT 1"},
       {&row, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1"},
-      {&below, "SELECT 1 FROM entries WHERE path > ?1 AND path < ?2 LIMIT 1"},
+      {&below, "SELECT 1 FROM entries WHERE path > ?2 AND path < ?3 LIMIT 1"},
       {&slice, "SELECT " FILEINDEX_ENTRY_COLUMNS
                " FROM entries WHERE path > ?1 AND path < ?2 ORDER BY path LIMIT ?3"},
       {&twins,
@@ -202,8 +213,7 @@ int EntryTable::FindOrBelow(const std::string& path, Entry& entry, bool& found, 
 }
 
 int EntryTable::HasBelow(const PathRange& range, bool& has) {
-  below.BindBlob(1, range.first);
-  below.BindBlob(2, range.end);
+  range.Bind(below);
   const int code = below.Step();
   has = code == SQLITE_ROW;
   below.Reset();

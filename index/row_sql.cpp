@@ -65,8 +65,7 @@ std::string OfEntry(const QueryNode& node) {
                  : "";
     case Part::UNDER: {
       const PathRange range(node.names.front());
-      return " AND (entries.path = " + Blob(node.names.front()) + " OR (entries.path > " +
-             Blob(range.first) + " AND entries.path < " + Blob(range.end) + "))";
+      return " AND " + AtOrBelowSql(Blob(range.at), Blob(range.first), Blob(range.end));
     }
     case Part::OWNER: {
       std::string numbers;

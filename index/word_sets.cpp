@@ -86,7 +86,7 @@ int WordSets::ReadFew(Statement& statement, WordSet& set) {
   return code;
 }
 
-// What a small folder holds.
+// What a small folder holds. As two statements in one it is read faster than with an OR.
 int WordSets::ReadUnder(const QueryNode& node) {
   const PathRange range(node.names.front());
   Statement* below = nullptr;
@@ -97,9 +97,7 @@ int WordSets::ReadUnder(const QueryNode& node) {
   if (code != SQLITE_OK) {
     return code;
   }
-  below->BindBlob(1, node.names.front());
-  below->BindBlob(2, range.first);
-  below->BindBlob(3, range.end);
+  range.Bind(*below);
   WordSet& set = sets[&node];
   set.is_sure = true;
   return ReadFew(*below, set);
