@@ -81,21 +81,6 @@ bool EntryReader::Count(uint64_t& entries) {
   return true;
 }
 
-bool EntryReader::CountBelow(const std::string& under, uint64_t& entries) {
-  Statement statement;
-  const std::string sql = "SELECT count(*) FROM entries WHERE " + AtOrBelowSql("?1", "?2", "?3");
-  if (statement.Prepare(database.db, sql.c_str()) != SQLITE_OK) {
-    return false;
-  }
-  const PathRange range(under);
-  range.Bind(statement);
-  if (statement.Step() != SQLITE_ROW) {
-    return false;
-  }
-  entries = static_cast<uint64_t>(statement.Int(0));
-  return true;
-}
-
 bool EntryReader::ForEach(const std::string& under,
                           const std::function<bool(const Entry&)>& visit) {
   Statement at;
