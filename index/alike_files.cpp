@@ -71,14 +71,14 @@ class SampleStream {
     }
     BindIdentity(path_of, {static_cast<uint64_t>(sampled.inode), sampled.birth_time, sampled.size,
                            sampled.mtime});
-    const int looked = path_of.Step();
-    std::string path = looked == SQLITE_ROW ? path_of.Bytes(0) : std::string();
-    code = looked == SQLITE_ROW || looked == SQLITE_DONE ? code : looked;
-    path_of.Reset();
+    std::string path;
+    bool found = false;
+    const int looked = path_of.ReadOne(found, [&] { path = path_of.Bytes(0); });
+    code = looked == SQLITE_OK ? code : looked;
     return path;
   }
 
-  bool HasFailed() const { return code != SQLITE_OK && code != SQLITE_ROW && code != SQLITE_DONE; }
+  bool HasFailed() const { return StepError(code) != SQLITE_OK; }
 
   OpenShare& share;
   std::string filesystem;

@@ -37,10 +37,6 @@ FileFacts ReadFacts(const Statement& row, int first) {
   return facts;
 }
 
-int Done(int code) {
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
-}
-
 }  // namespace
 
 int CandidateRows::FindRow(int64_t id, const char* sql, ReadColumns* read, Statement*& by,
@@ -50,14 +46,10 @@ int CandidateRows::FindRow(int64_t id, const char* sql, ReadColumns* read, State
     return code;
   }
   by->BindInt(1, id);
-  code = by->Step();
-  found = code == SQLITE_ROW;
-  if (found) {
+  return by->ReadOne(found, [&] {
     candidate = Candidate();
     read(*by, candidate.entry);
-  }
-  by->Reset();
-  return Done(code);
+  });
 }
 
 int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
@@ -99,7 +91,7 @@ int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
     return SQLITE_OK;
   }
   of_text->Reset();
-  return Done(code);
+  return StepError(code);
 }
 
 int CandidateRows::NeedFacts(Candidate& candidate) {
@@ -124,13 +116,9 @@ int CandidateRows::NeedFacts(Candidate& candidate) {
     return code;
   }
   BindIdentity(*facts, IdentityOf(candidate.entry));
-  code = facts->Step();
-  if (code == SQLITE_ROW) {
-    candidate.facts = ReadFacts(*facts, 0);
-  }
-  facts->Reset();
   candidate.is_asked = true;
-  return Done(code);
+  bool found = false;
+  return facts->ReadOne(found, [&] { candidate.facts = ReadFacts(*facts, 0); });
 }
 
 int CandidateRows::KindOf(Candidate& candidate, Kind& kind) {
@@ -173,10 +161,7 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
   twin->BindInt(1, candidate.facts->sample);
   twin->BindInt(2, candidate.entry.size);
   twin->BindInt(3, candidate.facts->id);
-  code = twin->Step();
-  has = code == SQLITE_ROW;
-  twin->Reset();
-  return Done(code);
+  return twin->ReadOne(has, [] {});
 }
 
 }  // namespace fileindexd

@@ -136,7 +136,7 @@ int ContentsTable::RemoveWordsOf(int64_t text) {
   const bool sound = code == SQLITE_ROW && UnpackTexts(read_text.Bytes(0), content);
   read_text.Reset();
   if (!sound) {
-    return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+    return StepError(code) == SQLITE_OK ? SQLITE_CORRUPT : code;
   }
 
   code = SQLITE_OK;

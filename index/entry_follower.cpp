@@ -40,8 +40,8 @@ void ReadFollowed(const Statement& row, FollowedEntry& entry) {
 // SQLITE_ROW: there is more than was asked for.
 int EntryFollower::End(Statement& statement, int code) {
   statement.Reset();
-  failed = code != SQLITE_DONE && code != SQLITE_ROW;
-  return failed ? code : SQLITE_OK;
+  failed = StepError(code) != SQLITE_OK;
+  return StepError(code);
 }
 
 IndexError EntryFollower::EnsureOpen(const std::string& share_name) {

@@ -12,7 +12,11 @@
 
 namespace fileindexd {
 
-constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
+constexpr int64_t MOST_ROWS = int64_t{1} << 32;
+// What is none is damage.
+constexpr bool IsRowid(int64_t id) {
+  return id >= 0 && id <= MOST_ROWS;
+}
 
 class IdSet {
  public:

@@ -122,7 +122,7 @@ IndexError EntryReader::Find(const std::string& path, std::optional<Entry>& entr
                                "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1");
   statement.BindBlob(1, path);
   code = code == SQLITE_OK ? statement.Step() : code;
-  if (code != SQLITE_ROW && code != SQLITE_DONE) {
+  if (StepError(code) != SQLITE_OK) {
     return FromSqlite(code);
   }
 

@@ -155,7 +155,7 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
       first.Add(begins->Int(0));
     }
   }
-  if (code != SQLITE_DONE && code != SQLITE_ROW) {
+  if (StepError(code) != SQLITE_OK) {
     return code;
   }
   if (first.Count() > BLOCK) {
@@ -356,7 +356,7 @@ int ShareRun::WalkRows(BestHits& best) {
       return checked;
     }
   }
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 // From the top, until there is enough and what comes next stands lower. Rows of one key come in no
@@ -393,7 +393,7 @@ int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enoug
   for (size_t i = 0; i < found.hits.size() && is_enough; ++i) {
     best.Add(std::move(found.hits[i]));
   }
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 }  // namespace fileindexd

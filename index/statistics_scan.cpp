@@ -170,7 +170,7 @@ int StatisticsScan::FindFurtherNames() {
     any = true;
   }
   std::sort(further_names.begin(), further_names.end());
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 std::string StatisticsScan::EntriesSql() const {
@@ -216,7 +216,7 @@ int StatisticsScan::Walk(void (StatisticsScan::*count)(const CountedEntry& entry
     further += entry.is_further_name ? 1 : 0;
     (this->*count)(entry);
   }
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 void StatisticsScan::Count(const CountedEntry& entry) {

@@ -20,7 +20,7 @@ int ReadIds(Statement& rows, int64_t most, IdSet& ids) {
   int code = rows.Step();
   for (; code == SQLITE_ROW && found < most; code = rows.Step()) {
     const int64_t id = rows.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
+    if (!IsRowid(id)) {
       return SQLITE_CORRUPT;
     }
     ids.Add(id);
