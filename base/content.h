@@ -53,10 +53,17 @@ constexpr ContentField FIRST_NUMBER_FIELD = ContentField::PAGES;
 constexpr bool IsNumberField(ContentField field) {
   return field >= FIRST_NUMBER_FIELD;
 }
-constexpr size_t TEXT_FIELD_COUNT = 18;  // numbered from 1
+constexpr size_t TEXT_FIELD_COUNT = 18;    // numbered from 1
+constexpr size_t NUMBER_FIELD_COUNT = 14;  // numbered from FIRST_NUMBER_FIELD
+// Of a number field, from 0.
+constexpr size_t NumberPlace(ContentField field) {
+  return static_cast<size_t>(field) - static_cast<size_t>(FIRST_NUMBER_FIELD);
+}
 // A field that this build knows.
 constexpr bool IsContentField(uint8_t number) {
-  return (number >= 1 && number <= TEXT_FIELD_COUNT) || (number >= 64 && number <= 77);
+  const auto field = static_cast<ContentField>(number);
+  return (number >= 1 && number <= TEXT_FIELD_COUNT) ||
+         (IsNumberField(field) && NumberPlace(field) < NUMBER_FIELD_COUNT);
 }
 
 struct TextField {

@@ -5,6 +5,8 @@
 #include <tuple>
 #include <utility>
 
+#include "index/entry_table.h"
+#include "index/schema.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -15,7 +17,7 @@ namespace {
 struct Sampled {
   int64_t size = 0;
   int64_t sample = 0;
-  int64_t inode = 0;
+  int64_t inode = 0;  // signed: they come in that order
   int64_t birth_time = 0;
   int64_t mtime = 0;
 
@@ -43,10 +45,9 @@ class SampleStream {
                         " WHERE state = 1 AND sample <> 0 AND size > 0"
                         " ORDER BY size DESC, sample, inode, birth_time");
     code = code == SQLITE_OK
-               ? path_of.Prepare(db,
-                                 "SELECT path FROM entries WHERE inode = ?1 AND birth_time = ?2"
-                                 " AND size = ?3 AND mtime = ?4 AND content_wanted = 1"
-                                 " ORDER BY path LIMIT 1")
+               ? path_of.Prepare(db, "SELECT path FROM entries WHERE " FILEINDEX_THAT_FILE
+                                     " AND content_wanted = 1"
+                                     " ORDER BY path LIMIT 1")
                : code;
     return code == SQLITE_OK;
   }
@@ -68,18 +69,16 @@ class SampleStream {
     if (HasFailed()) {
       return {};
     }
-    path_of.BindInt(1, sampled.inode);
-    path_of.BindInt(2, sampled.birth_time);
-    path_of.BindInt(3, sampled.size);
-    path_of.BindInt(4, sampled.mtime);
-    const int looked = path_of.Step();
-    std::string path = looked == SQLITE_ROW ? path_of.Bytes(0) : std::string();
-    code = looked == SQLITE_ROW || looked == SQLITE_DONE ? code : looked;
-    path_of.Reset();
+    BindIdentity(path_of, {static_cast<uint64_t>(sampled.inode), sampled.birth_time, sampled.size,
+                           sampled.mtime});
+    std::string path;
+    bool found = false;
+    const int looked = path_of.ReadOne(found, [&] { path = path_of.Bytes(0); });
+    code = looked == SQLITE_OK ? code : looked;
     return path;
   }
 
-  bool HasFailed() const { return code != SQLITE_OK && code != SQLITE_ROW && code != SQLITE_DONE; }
+  bool HasFailed() const { return StepError(code) != SQLITE_OK; }
 
   OpenShare& share;
   std::string filesystem;

@@ -45,12 +45,7 @@ void AddOptions(const Question& question, size_t end, QueryNode& tree) {
 }
 
 std::string ColumnName(ContentField field) {
-  std::string_view columns = WORD_COLUMNS;
-  const int number = FIRST_FIELD_COLUMN + static_cast<int>(field) - 1;
-  for (int i = 0; i < number; ++i) {
-    columns.remove_prefix(columns.find(", ") + 2);
-  }
-  return std::string(columns.substr(0, columns.find(',')));
+  return ColumnAt(WORD_COLUMNS, FIRST_FIELD_COLUMN + static_cast<size_t>(field) - 1);
 }
 
 void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& tokenizer,
@@ -143,14 +138,6 @@ std::string TextQueryOf(const QueryNode& node) {
       break;
   }
   return "";
-}
-
-std::string Quoted(std::string_view text) {
-  std::string quoted = "\"";
-  for (const char c : text) {
-    quoted.append(c == '"' ? 2 : 1, c);
-  }
-  return quoted + '"';
 }
 
 std::vector<size_t> CharacterStarts(std::string_view text) {

@@ -44,7 +44,6 @@ class Asked {
 
 // Of a WORD, in the contents' table's own language. Empty: it is looked for in names alone.
 std::string TextQueryOf(const QueryNode& word);
-std::string Quoted(std::string_view text);  // for the full-text tables
 // Where each character of valid UTF-8 begins, and the end.
 std::vector<size_t> CharacterStarts(std::string_view text);
 

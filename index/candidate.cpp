@@ -17,6 +17,13 @@ std::string FactsColumns() {
          std::string(NUMBER_COLUMNS);
 }
 
+void ReadShort(const Statement& row, Entry& entry) {
+  entry.id = row.Int(0);
+  entry.path = row.Bytes(1);
+  entry.kind = static_cast<Kind>(row.Int(2));
+  entry.mtime = row.Int(3);
+}
+
 FileFacts ReadFacts(const Statement& row, int first) {
   FileFacts facts;
   facts.id = row.Int(first);
@@ -26,61 +33,37 @@ FileFacts ReadFacts(const Statement& row, int first) {
   facts.length = row.Int(first + 4);
   facts.sample = row.Int(first + 5);
   facts.fields = row.Int(first + 6);
-  for (size_t i = 0; i < NUMBER_FIELDS; ++i) {
-    const int column = first + FIRST_NUMBER + static_cast<int>(i);
-    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
-      facts.numbers[i] = row.Int(column);
-    }
-  }
+  facts.numbers = ReadNumbers(row, first + FIRST_NUMBER);
   return facts;
-}
-
-int Done(int code) {
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
 }  // namespace
 
-int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
-  int code = SQLITE_OK;
-  if (by_id == nullptr) {
-    code = statements.Find("SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1", by_id);
-  }
+int CandidateRows::FindRow(int64_t id, const char* sql, ReadColumns* read, Statement*& by,
+                           Candidate& candidate, bool& found) {
+  int code = by == nullptr ? statements.Find(sql, by) : SQLITE_OK;
   if (code != SQLITE_OK) {
     return code;
   }
-  by_id->BindInt(1, id);
-  code = by_id->Step();
-  found = code == SQLITE_ROW;
-  if (found) {
+  by->BindInt(1, id);
+  return by->ReadOne(found, [&] {
     candidate = Candidate();
-    ReadEntry(*by_id, candidate.entry);
-  }
-  by_id->Reset();
-  return Done(code);
+    read(*by, candidate.entry);
+  });
+}
+
+int CandidateRows::Find(int64_t id, Candidate& candidate, bool& found) {
+  return FindRow(id, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1", ReadEntry,
+                 by_id, candidate, found);
 }
 
 int CandidateRows::FindShort(int64_t id, Candidate& candidate, bool& found) {
-  int code = SQLITE_OK;
-  if (short_by_id == nullptr) {
-    code = statements.Find("SELECT path, kind, mtime FROM entries WHERE id = ?1", short_by_id);
-  }
-  if (code != SQLITE_OK) {
-    return code;
-  }
-  short_by_id->BindInt(1, id);
-  code = short_by_id->Step();
-  found = code == SQLITE_ROW;
+  const int code = FindRow(id, "SELECT id, path, kind, mtime FROM entries WHERE id = ?1", ReadShort,
+                           short_by_id, candidate, found);
   if (found) {
-    candidate = Candidate();
     candidate.is_whole = false;
-    candidate.entry.id = id;
-    candidate.entry.path = short_by_id->Bytes(0);
-    candidate.entry.kind = static_cast<Kind>(short_by_id->Int(1));
-    candidate.entry.mtime = short_by_id->Int(2);
   }
-  short_by_id->Reset();
-  return Done(code);
+  return code;
 }
 
 int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
@@ -88,7 +71,8 @@ int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
   if (of_text == nullptr) {
     const std::string sql = "SELECT " FILEINDEX_ENTRY_COLUMNS ", " + FactsColumns() +
                             " FROM contents.files AS files CROSS JOIN entries "
-                            "ON " FILEINDEX_SAME_FILE " WHERE files.text = ?1 AND files.text <> 0";
+                            "ON " FILEINDEX_WANTED_FILE
+                            " WHERE files.text = ?1 AND files.text <> 0";
     code = statements.Find(sql, of_text);
   }
   if (code != SQLITE_OK) {
@@ -107,7 +91,7 @@ int CandidateRows::NextOfText(int64_t text, Candidate& candidate, bool& found) {
     return SQLITE_OK;
   }
   of_text->Reset();
-  return Done(code);
+  return StepError(code);
 }
 
 int CandidateRows::NeedFacts(Candidate& candidate) {
@@ -124,25 +108,17 @@ int CandidateRows::NeedFacts(Candidate& candidate) {
   }
   int code = SQLITE_OK;
   if (facts == nullptr) {
-    const std::string sql = "SELECT " + FactsColumns() +
-                            " FROM contents.files AS files WHERE inode = ?1 AND birth_time = ?2 "
-                            "AND size = ?3 AND mtime = ?4";
+    const std::string sql =
+        "SELECT " + FactsColumns() + " FROM contents.files AS files WHERE " FILEINDEX_THAT_FILE;
     code = statements.Find(sql, facts);
   }
   if (code != SQLITE_OK) {
     return code;
   }
-  facts->BindInt(1, static_cast<int64_t>(candidate.entry.inode));
-  facts->BindInt(2, candidate.entry.birth_time);
-  facts->BindInt(3, candidate.entry.size);
-  facts->BindInt(4, candidate.entry.mtime);
-  code = facts->Step();
-  if (code == SQLITE_ROW) {
-    candidate.facts = ReadFacts(*facts, 0);
-  }
-  facts->Reset();
+  BindIdentity(*facts, IdentityOf(candidate.entry));
   candidate.is_asked = true;
-  return Done(code);
+  bool found = false;
+  return facts->ReadOne(found, [&] { candidate.facts = ReadFacts(*facts, 0); });
 }
 
 int CandidateRows::KindOf(Candidate& candidate, Kind& kind) {
@@ -174,7 +150,7 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
   if (twin == nullptr) {
     code = statements.Find(
         "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
-        "ON " FILEINDEX_SAME_FILE
+        "ON " FILEINDEX_WANTED_FILE
         " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
         "AND files.id <> ?3 AND files.state = 1 LIMIT 1",
         twin);
@@ -185,10 +161,7 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
   twin->BindInt(1, candidate.facts->sample);
   twin->BindInt(2, candidate.entry.size);
   twin->BindInt(3, candidate.facts->id);
-  code = twin->Step();
-  has = code == SQLITE_ROW;
-  twin->Reset();
-  return Done(code);
+  return twin->ReadOne(has, [] {});
 }
 
 }  // namespace fileindexd

@@ -2,7 +2,6 @@
 // Entries that may answer a question, and what is known of their content.
 #pragma once
 
-#include <array>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -15,8 +14,6 @@
 
 namespace fileindexd {
 
-constexpr size_t NUMBER_FIELDS = 14;
-
 // A row of `files` that stands for an entry now.
 struct FileFacts {
   int64_t id = 0;
@@ -26,11 +23,9 @@ struct FileFacts {
   int64_t length = 0;
   int64_t sample = 0;
   int64_t fields = 0;  // bits
-  std::array<std::optional<int64_t>, NUMBER_FIELDS> numbers;
+  FieldNumbers numbers;
 
-  std::optional<int64_t> Number(ContentField field) const {
-    return numbers[static_cast<size_t>(field) - static_cast<size_t>(FIRST_NUMBER_FIELD)];
-  }
+  std::optional<int64_t> Number(ContentField field) const { return numbers[NumberPlace(field)]; }
 };
 
 struct Candidate {
@@ -64,6 +59,11 @@ class CandidateRows {
   bool has_contents;
 
  private:
+  using ReadColumns = void(const Statement& row, Entry& entry);
+
+  int FindRow(int64_t id, const char* sql, ReadColumns* read, Statement*& by, Candidate& candidate,
+              bool& found);
+
   NameFolder folder;
   // Null: not asked for yet.
   Statement* by_id = nullptr;
@@ -72,10 +72,5 @@ class CandidateRows {
   Statement* facts = nullptr;
   Statement* twin = nullptr;
 };
-
-// Columns of an entry and of its file that are the same file, contents of it wanted.
-#define FILEINDEX_SAME_FILE                                                    \
-  "entries.inode = files.inode AND entries.birth_time = files.birth_time AND " \
-  "entries.size = files.size AND entries.mtime = files.mtime AND entries.content_wanted = 1"
 
 }  // namespace fileindexd

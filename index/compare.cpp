@@ -248,7 +248,7 @@ bool Comparer::PassOver(int reason) {
     counts.unreadable_reason = text;
   }
   // Of what lies before the next entry, no entry is asked for any more.
-  if (side->entry != nullptr && side->path + "0" > side->entry->path) {
+  if (side->entry != nullptr && !PathRange(side->path).EndsBefore(side->entry->path)) {
     side->unreadable.insert(side->path);
   }
   return true;
@@ -258,7 +258,7 @@ bool Comparer::PassOver(int reason) {
 // in order of the paths: what no later path lies below is forgotten.
 bool Comparer::IsPassedOver(const std::string& path) {
   std::set<std::string>& unreadable = side->unreadable;
-  while (!unreadable.empty() && *unreadable.begin() + "0" <= path) {
+  while (!unreadable.empty() && PathRange(*unreadable.begin()).EndsBefore(path)) {
     unreadable.erase(unreadable.begin());
   }
   if (unreadable.empty()) {

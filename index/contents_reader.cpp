@@ -8,6 +8,8 @@
 #include "index/content_functions.h"
 #include "index/content_text.h"
 #include "index/contents_schema.h"
+#include "index/entry_table.h"
+#include "index/schema.h"
 #include "index/text_tokenizer.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
@@ -25,15 +27,13 @@ constexpr const char* COUNT =
     "SELECT kind, waiting, done, 0 FROM contents.counts"
     " UNION ALL SELECT iif(found_kind <> 0, found_kind, kind), 0, 0, 1"
     " FROM contents.files AS files WHERE state >= 2 AND EXISTS(SELECT 1 FROM entries"
-    " WHERE entries.inode = files.inode AND entries.birth_time = files.birth_time"
-    " AND entries.size = files.size AND entries.mtime = files.mtime"
-    " AND entries.content_wanted = 1)"
+    " WHERE " FILEINDEX_WANTED_FILE
+    ")"
     " UNION ALL SELECT entries.kind, 1, 0, 0 FROM contents.meta AS followed"
     " CROSS JOIN main.meta AS own CROSS JOIN entries ON entries.content_wanted <> 0"
     " AND entries.written > iif(followed.entries_made = own.made, followed.seen, 0)"
     " WHERE +entries.content_wanted = 1 AND NOT EXISTS(SELECT 1 FROM contents.files AS files"
-    " WHERE files.inode = entries.inode AND files.birth_time = entries.birth_time"
-    " AND files.size = entries.size AND files.mtime = entries.mtime)";
+    " WHERE " FILEINDEX_SAME_FILE ")";
 
 const char* StateText(ContentState state) {
   switch (state) {
@@ -52,8 +52,7 @@ std::string FileOfEntrySql() {
   return "SELECT state, reason, found_kind, is_cut, sample, text,"
          " (SELECT packed FROM contents.texts WHERE id = text), extractor, tries,"
          " (SELECT language FROM contents.meta WHERE id = 1), " +
-         std::string(NUMBER_COLUMNS) +
-         " FROM contents.files WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4";
+         std::string(NUMBER_COLUMNS) + " FROM contents.files WHERE " FILEINDEX_THAT_FILE;
 }
 
 bool ReadContent(const Statement& row, Content& content) {
@@ -61,11 +60,11 @@ bool ReadContent(const Statement& row, Content& content) {
   content.kind = static_cast<Kind>(row.Int(2));
   content.is_cut = row.Int(3) != 0;
   content.sample = static_cast<uint64_t>(row.Int(4));
-  const auto last = static_cast<int>(ContentField::RATING);
-  for (int field = static_cast<int>(FIRST_NUMBER_FIELD); field <= last; ++field) {
-    const int column = FIRST_NUMBER_COLUMN + field - static_cast<int>(FIRST_NUMBER_FIELD);
-    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
-      content.numbers.push_back({static_cast<ContentField>(field), row.Int(column)});
+  const FieldNumbers numbers = ReadNumbers(row, FIRST_NUMBER_COLUMN);
+  for (size_t i = 0; i < numbers.size(); ++i) {
+    if (numbers[i].has_value()) {
+      const auto number = static_cast<size_t>(FIRST_NUMBER_FIELD) + i;
+      content.numbers.push_back({static_cast<ContentField>(number), *numbers[i]});
     }
   }
   return row.Int(5) == 0 || UnpackTexts(row.Bytes(6), content);
@@ -135,9 +134,7 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
   if (failed.Prepare(entries.db,
                      "SELECT min(entries.path), files.reason, files.tries"
                      " FROM contents.files AS files CROSS JOIN entries"
-                     " ON entries.inode = files.inode AND entries.birth_time = files.birth_time"
-                     " AND entries.size = files.size AND entries.mtime = files.mtime"
-                     " AND entries.content_wanted = 1"
+                     " ON " FILEINDEX_WANTED_FILE
                      " WHERE files.state >= 2 GROUP BY files.id") != SQLITE_OK) {
     return false;
   }
@@ -156,10 +153,7 @@ IndexError ContentsReader::Find(const Entry& entry, StoredContent& stored) {
   int code = SQLITE_DONE;
   if (entry.content_wanted) {
     code = row.Prepare(entries.db, FileOfEntrySql().c_str());
-    row.BindInt(1, static_cast<int64_t>(entry.inode));
-    row.BindInt(2, entry.birth_time);
-    row.BindInt(3, entry.size);
-    row.BindInt(4, entry.mtime);
+    BindIdentity(row, IdentityOf(entry));
     code = code == SQLITE_OK ? row.Step() : code;
   }
   if (code == SQLITE_ROW) {

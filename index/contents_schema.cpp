@@ -1,11 +1,14 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/contents_schema.h"
 
+#include <string_view>
+
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
-static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3,
+static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
+                  ALL_WORDS == 9223372036854775807,
               "numbers in the text below");
 
 namespace {
@@ -88,6 +91,25 @@ const char* const NUMBER_COLUMNS =
 const char* const WORD_COLUMNS =
     "text, title, author, subject, description, keywords, sender, receivers, attachments, members, "
     "artist, album, album_artist, genre, composer, codecs, camera, lens, caption, numbers";
+
+FieldNumbers ReadNumbers(const Statement& row, int first) {
+  FieldNumbers numbers;
+  for (size_t i = 0; i < numbers.size(); ++i) {
+    const int column = first + static_cast<int>(i);
+    if (sqlite3_column_type(row.handle, column) != SQLITE_NULL) {
+      numbers[i] = row.Int(column);
+    }
+  }
+  return numbers;
+}
+
+std::string ColumnAt(const char* columns, size_t place) {
+  std::string_view rest = columns;
+  for (size_t i = 0; i < place; ++i) {
+    rest.remove_prefix(rest.find(", ") + 2);
+  }
+  return std::string(rest.substr(0, rest.find(',')));
+}
 
 // The hash that collects words before they are written as a segment holds 8 MiB: fewer segments
 // to merge, which is what most of the time goes into.

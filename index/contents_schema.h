@@ -48,10 +48,14 @@
 // tables, of the tokenizer, or of the text that is given to it is a new version.
 #pragma once
 
+#include <array>
 #include <cstdint>
+#include <optional>
 #include <string>
 
+#include "base/content.h"
 #include "index/database.h"
+#include "state/sqlite.h"
 
 namespace fileindexd {
 
@@ -72,12 +76,17 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;
+// The values of those columns, which begin with column `first`; none: not known.
+using FieldNumbers = std::array<std::optional<int64_t>, NUMBER_FIELD_COUNT>;
+FieldNumbers ReadNumbers(const Statement& row, int first);
 // The columns of `words`: the text, those of the text fields in their order, and numbers as words.
 // The text comes first: in each document's places of each word, the full-text table writes down all
 // columns but the first one.
 extern const char* const WORD_COLUMNS;
 constexpr int TEXT_COLUMN = 0;
 constexpr int FIRST_FIELD_COLUMN = 1;
+// The name at that place, from 0, of one of the two lists.
+std::string ColumnAt(const char* columns, size_t place);
 
 // Makes the words anew, empty, for that language (one of IsLanguage).
 std::string WordsSchema(const std::string& language);

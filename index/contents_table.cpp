@@ -184,11 +184,7 @@ int ContentsTable::Commit(int64_t now) {
   }
   code = code == SQLITE_OK ? WriteCounts(now) : code;
   if (code == SQLITE_OK && HasFreePages()) {
-    do {
-      code = give_back.Step();
-    } while (code == SQLITE_ROW);
-    give_back.Reset();
-    code = code == SQLITE_DONE ? SQLITE_OK : code;
+    code = give_back.ReadAll([] {});
   }
   code = code == SQLITE_OK ? Execute(handle, "COMMIT") : code;
   if (code == SQLITE_OK) {
@@ -215,34 +211,17 @@ void ContentsTable::Rollback() {
 int ContentsTable::Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found) {
   find.BindInt(1, static_cast<int64_t>(inode));
   find.BindInt(2, birth_time);
-  const int code = find.Step();
-  found = code == SQLITE_ROW;
-  if (found) {
-    ReadFile(find, file);
-  }
-  find.Reset();
-  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+  return find.ReadOne(found, [&] { ReadFile(find, file); });
 }
 
 int ContentsTable::FindById(int64_t id, ContentFile& file, bool& found) {
   find_by_id.BindInt(1, id);
-  const int code = find_by_id.Step();
-  found = code == SQLITE_ROW;
-  if (found) {
-    ReadFile(find_by_id, file);
-  }
-  find_by_id.Reset();
-  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+  return find_by_id.ReadOne(found, [&] { ReadFile(find_by_id, file); });
 }
 
 int ContentsTable::ReadFiles(Statement& statement, std::vector<ContentFile>& files) {
   files.clear();
-  int code = statement.Step();
-  for (; code == SQLITE_ROW; code = statement.Step()) {
-    ReadFile(statement, files.emplace_back());
-  }
-  statement.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return statement.ReadAll([&] { ReadFile(statement, files.emplace_back()); });
 }
 
 int ContentsTable::Waiting(int64_t limit, std::vector<ContentFile>& files) {

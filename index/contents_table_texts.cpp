@@ -9,12 +9,10 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t NUMBERS = 14;
-
 std::string SetContentSql() {
   std::string sql = "UPDATE files SET is_cut = ?2, sample = ?3, fields = ?4, (" +
                     std::string(NUMBER_COLUMNS) + ") = (?5";
-  for (size_t i = 1; i < NUMBERS; ++i) {
+  for (size_t i = 1; i < NUMBER_FIELD_COUNT; ++i) {
     sql += ", ?" + std::to_string(i + 5);
   }
   return sql + ") WHERE id = ?1";
@@ -56,12 +54,11 @@ int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& 
   set_content.BindInt(2, content.is_cut ? 1 : 0);
   set_content.BindInt(3, static_cast<int64_t>(content.sample));
   set_content.BindInt(4, FieldBits(content));
-  for (size_t i = 0; i < NUMBERS; ++i) {
+  for (size_t i = 0; i < NUMBER_FIELD_COUNT; ++i) {
     sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 5);
   }
   for (const NumberField& field : content.numbers) {
-    set_content.BindInt(5 + static_cast<int>(field.field) - static_cast<int>(FIRST_NUMBER_FIELD),
-                        field.number);
+    set_content.BindInt(5 + static_cast<int>(NumberPlace(field.field)), field.number);
   }
   code = set_content.Run();
   ContentWords words = WordsOf(content);
@@ -139,7 +136,7 @@ int ContentsTable::RemoveWordsOf(int64_t text) {
   const bool sound = code == SQLITE_ROW && UnpackTexts(read_text.Bytes(0), content);
   read_text.Reset();
   if (!sound) {
-    return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+    return StepError(code) == SQLITE_OK ? SQLITE_CORRUPT : code;
   }
 
   code = SQLITE_OK;

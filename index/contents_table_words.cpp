@@ -26,13 +26,13 @@ constexpr int64_t LEAST_TO_MERGE = 256;
 
 int ContentsTable::HasTable(const char* name, bool& has) {
   Statement statement;
+  has = false;
   int code = statement.Prepare(handle, "SELECT 1 FROM sqlite_master WHERE name = ?1");
   if (code == SQLITE_OK) {
     statement.BindText(1, name);
-    code = statement.Step();
+    code = statement.ReadOne(has, [] {});
   }
-  has = code == SQLITE_ROW;
-  return has || code == SQLITE_DONE ? SQLITE_OK : code;
+  return code;
 }
 
 int ContentsTable::PrepareWords() {
@@ -109,7 +109,7 @@ int ContentsTable::Reword(bool& more) {
     meta.reworded = ALL_WORDS;
     more = has_old_words;
   }
-  return code == SQLITE_DONE || code == SQLITE_ROW ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 // The table takes a segment for each transaction, merges those of a size when they are many, and

@@ -13,18 +13,11 @@
 
 #include "base/content.h"
 #include "index/database.h"
+#include "index/entry.h"
 #include "index/prepared_content.h"
 #include "state/settings.h"
 
 namespace fileindexd {
-
-struct FileIdentity {
-  uint64_t inode = 0;
-  int64_t birth_time = 0;  // nanoseconds since the epoch; 0: not known
-  int64_t size = 0;
-  int64_t mtime = 0;  // nanoseconds since the epoch
-  bool operator==(const FileIdentity&) const = default;
-};
 
 // A file that is to be read.
 struct ContentJob {

@@ -11,6 +11,16 @@
 namespace fileindexd {
 
 // Times are nanoseconds since the epoch.
+
+// What was read is the content of a file with exactly these four.
+struct FileIdentity {
+  uint64_t inode = 0;
+  int64_t birth_time = 0;  // 0: not known
+  int64_t size = 0;
+  int64_t mtime = 0;
+  bool operator==(const FileIdentity&) const = default;
+};
+
 struct Entry {
   int64_t id = 0;
   std::string path;  // normal
@@ -30,5 +40,9 @@ struct Entry {
       0;  // when the row was last written, a greater number each time; set by the table
   int64_t reread = 0;  // the `written` of the last add that found it changed; 0: none
 };
+
+inline FileIdentity IdentityOf(const Entry& entry) {
+  return {entry.inode, entry.birth_time, entry.size, entry.mtime};
+}
 
 }  // namespace fileindexd

@@ -3,6 +3,8 @@
 
 #include <algorithm>
 
+#include "index/entry_table.h"
+#include "index/schema.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -22,8 +24,7 @@ constexpr const char* LATEST = "SELECT " FOLLOWED_COLUMNS
                                "AND content_wanted = 1 ORDER BY written DESC LIMIT 1";
 // A file may have thousands of links; any of them will do.
 constexpr const char* PATHS =
-    "SELECT path FROM entries WHERE inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4 "
-    "AND content_wanted = 1 LIMIT 16";
+    "SELECT path FROM entries WHERE " FILEINDEX_THAT_FILE " AND content_wanted = 1 LIMIT 16";
 
 void ReadFollowed(const Statement& row, FollowedEntry& entry) {
   entry.identity = {static_cast<uint64_t>(row.Int(0)), row.Int(1), row.Int(2), row.Int(3)};
@@ -39,8 +40,8 @@ void ReadFollowed(const Statement& row, FollowedEntry& entry) {
 // SQLITE_ROW: there is more than was asked for.
 int EntryFollower::End(Statement& statement, int code) {
   statement.Reset();
-  failed = code != SQLITE_DONE && code != SQLITE_ROW;
-  return failed ? code : SQLITE_OK;
+  failed = StepError(code) != SQLITE_OK;
+  return StepError(code);
 }
 
 IndexError EntryFollower::EnsureOpen(const std::string& share_name) {
@@ -124,10 +125,7 @@ int EntryFollower::Latest(uint64_t inode, int64_t birth_time, FollowedEntry& ent
 
 int EntryFollower::Paths(const FileIdentity& identity, std::vector<std::string>& paths) {
   paths.clear();
-  paths_of.BindInt(1, static_cast<int64_t>(identity.inode));
-  paths_of.BindInt(2, identity.birth_time);
-  paths_of.BindInt(3, identity.size);
-  paths_of.BindInt(4, identity.mtime);
+  BindIdentity(paths_of, identity);
   int code = paths_of.Step();
   for (; code == SQLITE_ROW; code = paths_of.Step()) {
     paths.push_back(paths_of.Bytes(0));

@@ -24,12 +24,23 @@ int64_t Now() {
 
 }  // namespace
 
-PathRange::PathRange(const std::string& path) : first(path), end() {
+PathRange::PathRange(const std::string& path) : at(path), first(path), end() {
   if (path != "/") {
     first += '/';
   }
   end = first;
   end.back() = '/' + 1;
+}
+
+void PathRange::Bind(Statement& statement) const {
+  statement.BindBlob(1, at);
+  statement.BindBlob(2, first);
+  statement.BindBlob(3, end);
+}
+
+std::string AtOrBelowSql(const std::string& at, const std::string& first, const std::string& end) {
+  return "(entries.path = " + at + " OR (entries.path > " + first + " AND entries.path < " + end +
+         "))";
 }
 
 std::string_view LastComponent(std::string_view path) {
@@ -55,6 +66,13 @@ void ReadEntry(const Statement& statement, Entry& entry) {
   entry.reread = statement.Int(15);
 }
 
+void BindIdentity(Statement& statement, const FileIdentity& identity) {
+  statement.BindInt(1, static_cast<int64_t>(identity.inode));
+  statement.BindInt(2, identity.birth_time);
+  statement.BindInt(3, identity.size);
+  statement.BindInt(4, identity.mtime);
+}
+
 int EntryTable::Prepare(sqlite3* db) {
   handle = db;
   const std::pair<Statement*, const char*> statements[] = {
@@ -69,7 +87,7 @@ int EntryTable::Prepare(sqlite3* db) {
       {&find, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1"},
       {&next, "SELECT path, id FROM entries WHERE path >= ?1 ORDER BY path LIMIT 1"},
       {&row, "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE id = ?1"},
-      {&below, "SELECT 1 FROM entries WHERE path > ?1 AND path < ?2 LIMIT 1"},
+      {&below, "SELECT 1 FROM entries WHERE path > ?2 AND path < ?3 LIMIT 1"},
       {&slice, "SELECT " FILEINDEX_ENTRY_COLUMNS
                " FROM entries WHERE path > ?1 AND path < ?2 ORDER BY path LIMIT ?3"},
       {&twins,
@@ -149,22 +167,12 @@ int EntryTable::GiveBackPages() {
     return code == SQLITE_ROW ? SQLITE_OK : code;
   }
 
-  do {
-    code = give_back.Step();
-  } while (code == SQLITE_ROW);
-  give_back.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return give_back.ReadAll([] {});
 }
 
 int EntryTable::Find(const std::string& path, Entry& entry, bool& found) {
   find.BindBlob(1, path);
-  const int code = find.Step();
-  found = code == SQLITE_ROW;
-  if (found) {
-    ReadEntry(find, entry);
-  }
-  find.Reset();
-  return found || code == SQLITE_DONE ? SQLITE_OK : code;
+  return find.ReadOne(found, [&] { ReadEntry(find, entry); });
 }
 
 // A new entry costs one search: where the next path does not begin with this one, none does.
@@ -172,35 +180,28 @@ int EntryTable::FindOrBelow(const std::string& path, Entry& entry, bool& found, 
   found = false;
   has_below = false;
   next.BindBlob(1, path);
-  int code = next.Step();
-  const bool any = code == SQLITE_ROW;
-  const std::string neighbour = any ? next.Bytes(0) : std::string();
-  const int64_t id = any ? next.Int(1) : 0;
-  next.Reset();
+  bool any = false;
+  std::string neighbour;
+  int64_t id = 0;
+  int code = next.ReadOne(any, [&] {
+    neighbour = next.Bytes(0);
+    id = next.Int(1);
+  });
   if (!any || !neighbour.starts_with(path)) {
-    return any || code == SQLITE_DONE ? SQLITE_OK : code;
+    return code;
   }
   if (neighbour != path) {
     return HasBelow(PathRange(path), has_below);
   }
 
   row.BindInt(1, id);
-  code = row.Step();
-  found = code == SQLITE_ROW;
-  if (found) {
-    ReadEntry(row, entry);
-  }
-  row.Reset();
-  return found ? SQLITE_OK : code == SQLITE_DONE ? SQLITE_CORRUPT : code;
+  code = row.ReadOne(found, [&] { ReadEntry(row, entry); });
+  return code == SQLITE_OK && !found ? SQLITE_CORRUPT : code;
 }
 
 int EntryTable::HasBelow(const PathRange& range, bool& has) {
-  below.BindBlob(1, range.first);
-  below.BindBlob(2, range.end);
-  const int code = below.Step();
-  has = code == SQLITE_ROW;
-  below.Reset();
-  return has || code == SQLITE_DONE ? SQLITE_OK : code;
+  range.Bind(below);
+  return below.ReadOne(has, [] {});
 }
 
 int EntryTable::Slice(const std::string& after, const std::string& end, int limit,
@@ -209,21 +210,11 @@ int EntryTable::Slice(const std::string& after, const std::string& end, int limi
   slice.BindBlob(1, after);
   slice.BindBlob(2, end);
   slice.BindInt(3, limit);
-  int code = slice.Step();
-  for (; code == SQLITE_ROW; code = slice.Step()) {
-    ReadEntry(slice, slice_entries.emplace_back());
-  }
-  slice.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return slice.ReadAll([&] { ReadEntry(slice, slice_entries.emplace_back()); });
 }
 
 int EntryTable::CollectPaths(Statement& statement, std::vector<std::string>& paths) {
-  int code = statement.Step();
-  for (; code == SQLITE_ROW; code = statement.Step()) {
-    paths.push_back(statement.Bytes(0));
-  }
-  statement.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return statement.ReadAll([&] { paths.push_back(statement.Bytes(0)); });
 }
 
 int EntryTable::OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths) {

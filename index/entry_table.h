@@ -17,17 +17,28 @@
 
 namespace fileindexd {
 
-// The range of paths below normal path `path`: greater than `first`, less than `end`.
+// The range of paths below normal path `at`: greater than `first`, less than `end`.
 struct PathRange {
   explicit PathRange(const std::string& path);
 
+  // The three as ?1 to ?3, of which a statement may leave some out. It outlives the step.
+  void Bind(Statement& statement) const;
+  // Whether all at or below `at` sorts before that absolute path.
+  bool EndsBefore(std::string_view path) const { return end <= path; }
+
+  std::string at;
   std::string first;
   std::string end;
 };
 
+// The condition that a row's path is `at` or lies below. The arguments are SQL.
+std::string AtOrBelowSql(const std::string& at, const std::string& first, const std::string& end);
+
 std::string_view LastComponent(std::string_view path);
 // Reads the columns of FILEINDEX_ENTRY_COLUMNS.
 void ReadEntry(const Statement& statement, Entry& entry);
+// Binds the values of FILEINDEX_THAT_FILE.
+void BindIdentity(Statement& statement, const FileIdentity& identity);
 
 class EntryTable {
  public:

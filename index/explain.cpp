@@ -145,13 +145,11 @@ class Explainer {
       const std::string query = TextQueryOf(in_field);
       match.BindText(1, query);
       match.BindInt(2, candidate.facts->text);
-      code = match.Step();
-      if (code == SQLITE_ROW) {
+      bool found = false;
+      code = match.ReadOne(found, [&] {
         where += where.empty() ? "" : ", ";
         where += number > TEXT_FIELD_COUNT ? "text" : FieldName(in_field.field);
-      }
-      code = code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
-      match.Reset();
+      });
     }
     where += where.empty() ? "number" : "";
     return code;

@@ -8,24 +8,9 @@
 
 namespace fileindexd {
 
-const IdSet::Chunk* IdSet::ChunkAt(size_t number) const {
-  return number < places.size() && places[number] != 0 ? &chunks[places[number] - 1] : nullptr;
-}
-
-IdSet::Chunk& IdSet::MakeChunk(size_t number) {
-  if (number >= places.size()) {
-    places.resize(std::max(number + 1, places.size() * 2));
-  }
-  if (places[number] == 0) {
-    chunks.emplace_back();
-    places[number] = static_cast<uint32_t>(chunks.size());
-  }
-  return chunks[places[number] - 1];
-}
-
 void IdSet::Add(int64_t id) {
   const auto at = static_cast<size_t>(id);
-  uint64_t& word = MakeChunk(at / CHUNK_IDS)[at % CHUNK_IDS / 64];
+  uint64_t& word = words.At(at / 64);
   const uint64_t bit = uint64_t{1} << (at % 64);
   count += (word & bit) == 0 ? 1 : 0;
   word |= bit;
@@ -33,21 +18,20 @@ void IdSet::Add(int64_t id) {
 
 bool IdSet::Has(int64_t id) const {
   const auto at = static_cast<size_t>(id);
-  const Chunk* chunk = ChunkAt(at / CHUNK_IDS);
-  return chunk != nullptr && ((*chunk)[at % CHUNK_IDS / 64] >> (at % 64) & 1) != 0;
+  return (words.Get(at / 64) >> (at % 64) & 1) != 0;
 }
 
 void IdSet::Remove(int64_t id) {
   if (Has(id)) {
     const auto at = static_cast<size_t>(id);
-    chunks[places[at / CHUNK_IDS] - 1][at % CHUNK_IDS / 64] &= ~(uint64_t{1} << (at % 64));
+    words.At(at / 64) &= ~(uint64_t{1} << (at % 64));
     --count;
   }
 }
 
 void IdSet::Recount() {
   count = 0;
-  for (const Chunk& chunk : chunks) {
+  for (const Words::Chunk& chunk : words.All()) {
     for (const uint64_t word : chunk) {
       count += static_cast<uint64_t>(std::popcount(word));
     }
@@ -55,10 +39,10 @@ void IdSet::Recount() {
 }
 
 void IdSet::Unite(const IdSet& other) {
-  for (size_t i = 0; i < other.places.size(); ++i) {
-    const Chunk* from = other.ChunkAt(i);
+  for (size_t i = 0; i < other.words.End(); ++i) {
+    const Words::Chunk* from = other.words.Find(i);
     if (from != nullptr) {
-      Chunk& to = MakeChunk(i);
+      Words::Chunk& to = words.Make(i);
       std::transform(to.begin(), to.end(), from->begin(), to.begin(), std::bit_or<>());
     }
   }
@@ -67,11 +51,11 @@ void IdSet::Unite(const IdSet& other) {
 
 void IdSet::Intersect(const IdSet& other) {
   IdSet common;
-  for (size_t i = 0; i < std::min(places.size(), other.places.size()); ++i) {
-    const Chunk* mine = ChunkAt(i);
-    const Chunk* from = other.ChunkAt(i);
+  for (size_t i = 0; i < std::min(words.End(), other.words.End()); ++i) {
+    const Words::Chunk* mine = words.Find(i);
+    const Words::Chunk* from = other.words.Find(i);
     if (mine != nullptr && from != nullptr) {
-      Chunk& to = common.MakeChunk(i);
+      Words::Chunk& to = common.words.Make(i);
       std::transform(mine->begin(), mine->end(), from->begin(), to.begin(), std::bit_and<>());
     }
   }
@@ -80,10 +64,10 @@ void IdSet::Intersect(const IdSet& other) {
 }
 
 void IdSet::Subtract(const IdSet& other) {
-  for (size_t i = 0; i < std::min(places.size(), other.places.size()); ++i) {
-    const Chunk* from = other.ChunkAt(i);
-    if (from != nullptr && places[i] != 0) {
-      Chunk& to = chunks[places[i] - 1];
+  for (size_t i = 0; i < std::min(words.End(), other.words.End()); ++i) {
+    const Words::Chunk* from = other.words.Find(i);
+    if (from != nullptr && words.Find(i) != nullptr) {
+      Words::Chunk& to = words.Make(i);
       std::transform(to.begin(), to.end(), from->begin(), to.begin(),
                      [](uint64_t a, uint64_t b) { return a & ~b; });
     }
@@ -93,8 +77,8 @@ void IdSet::Subtract(const IdSet& other) {
 
 int64_t IdSet::Next(int64_t id) const {
   const auto first = static_cast<size_t>(id + 1);
-  for (size_t number = first / CHUNK_IDS; number < places.size(); ++number) {
-    const Chunk* chunk = ChunkAt(number);
+  for (size_t number = first / CHUNK_IDS; number < words.End(); ++number) {
+    const Words::Chunk* chunk = words.Find(number);
     const size_t start = number == first / CHUNK_IDS ? first % CHUNK_IDS : 0;
     for (size_t i = start / 64; chunk != nullptr && i < CHUNK_WORDS; ++i) {
       const uint64_t word = (*chunk)[i] & (i == start / 64 ? ~uint64_t{0} << (start % 64) : ~0ULL);
@@ -107,12 +91,12 @@ int64_t IdSet::Next(int64_t id) const {
 }
 
 int64_t IdSet::Previous(int64_t id) const {
-  const auto most = static_cast<int64_t>(places.size() * CHUNK_IDS);
+  const auto most = static_cast<int64_t>(words.End() * CHUNK_IDS);
   const int64_t last = std::min(id, most) - 1;
   for (int64_t number = last / static_cast<int64_t>(CHUNK_IDS); last >= 0 && number >= 0;
        --number) {
     const auto at = static_cast<size_t>(number);
-    const Chunk* chunk = ChunkAt(at);
+    const Words::Chunk* chunk = words.Find(at);
     const bool is_first = at == static_cast<size_t>(last) / CHUNK_IDS;
     const size_t start = is_first ? static_cast<size_t>(last) % CHUNK_IDS : CHUNK_IDS - 1;
     for (size_t i = start / 64 + 1; chunk != nullptr && i-- > 0;) {

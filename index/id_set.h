@@ -1,16 +1,22 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Rowids of one table: a bit each, in chunks that are there only where they hold some. A million
-// neighbours take 125 KB; a few take half a KB each at most, however large the numbers are.
+// neighbours take 125 KB. A few take half a KB each, and 1 KB for each million up to the greatest.
+// A set that has grown may take twice that.
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <vector>
 
+#include "index/chunked.h"
+
 namespace fileindexd {
 
-constexpr int64_t MOST_ROWS = int64_t{1} << 32;  // a rowid beyond is damage
+constexpr int64_t MOST_ROWS = int64_t{1} << 32;
+// What is none is damage.
+constexpr bool IsRowid(int64_t id) {
+  return id >= 0 && id <= MOST_ROWS;
+}
 
 class IdSet {
  public:
@@ -32,14 +38,11 @@ class IdSet {
  private:
   static constexpr size_t CHUNK_WORDS = 64;
   static constexpr size_t CHUNK_IDS = CHUNK_WORDS * 64;
-  using Chunk = std::array<uint64_t, CHUNK_WORDS>;
+  using Words = Chunked<uint64_t, CHUNK_WORDS>;
 
-  const Chunk* ChunkAt(size_t number) const;
-  Chunk& MakeChunk(size_t number);
   void Recount();
 
-  std::vector<uint32_t> places;  // by number of the chunk: its place, from 1; 0: holds none
-  std::vector<Chunk> chunks;
+  Words words;
   uint64_t count = 0;
 };
 

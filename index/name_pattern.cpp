@@ -8,6 +8,7 @@
 #include "base/utf8.h"
 #include "index/asked.h"
 #include "index/entry_table.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
@@ -100,7 +101,7 @@ int NamePattern::Find(sqlite3* db, IdSet& ids) {
                                              : "SELECT rowid FROM parts WHERE parts MATCH ?1");
   match.BindText(1, query);
   for (code = code == SQLITE_OK ? match.Step() : code; code == SQLITE_ROW; code = match.Step()) {
-    if (match.Int(0) < 0 || match.Int(0) > MOST_ROWS) {
+    if (!IsRowid(match.Int(0))) {
       return SQLITE_CORRUPT;
     }
     ids.Add(match.Int(0));
@@ -142,7 +143,7 @@ int NamePattern::Look(Statement& rows, const IdSet* among, IdSet& fitting) {
   int code = rows.Step();
   for (; code == SQLITE_ROW; code = rows.Step()) {
     const int64_t id = rows.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
+    if (!IsRowid(id)) {
       return SQLITE_CORRUPT;
     }
     if (among != nullptr && !among->Has(id)) {
@@ -155,7 +156,7 @@ int NamePattern::Look(Statement& rows, const IdSet* among, IdSet& fitting) {
     }
   }
   rows.Reset();
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 bool NamePattern::FitsName(std::string_view name) {

@@ -81,24 +81,6 @@ bool EntryReader::Count(uint64_t& entries) {
   return true;
 }
 
-bool EntryReader::CountBelow(const std::string& under, uint64_t& entries) {
-  Statement statement;
-  if (statement.Prepare(database.db,
-                        "SELECT count(*) FROM entries WHERE path = ?1 OR"
-                        " (path > ?2 AND path < ?3)") != SQLITE_OK) {
-    return false;
-  }
-  const PathRange range(under);
-  statement.BindBlob(1, under);
-  statement.BindBlob(2, range.first);
-  statement.BindBlob(3, range.end);
-  if (statement.Step() != SQLITE_ROW) {
-    return false;
-  }
-  entries = static_cast<uint64_t>(statement.Int(0));
-  return true;
-}
-
 bool EntryReader::ForEach(const std::string& under,
                           const std::function<bool(const Entry&)>& visit) {
   Statement at;
@@ -109,14 +91,13 @@ bool EntryReader::ForEach(const std::string& under,
           SQLITE_OK ||
       below.Prepare(database.db,
                     "SELECT " FILEINDEX_ENTRY_COLUMNS
-                    " FROM entries WHERE path > ?1 AND path < ?2 ORDER BY path") != SQLITE_OK) {
+                    " FROM entries WHERE path > ?2 AND path < ?3 ORDER BY path") != SQLITE_OK) {
     return false;
   }
 
   const PathRange range(under);
   at.BindBlob(1, under);
-  below.BindBlob(1, range.first);
-  below.BindBlob(2, range.end);
+  range.Bind(below);
   bool going = true;
   const bool read = VisitAll(at, visit, going) && VisitAll(below, visit, going);
   at.Reset();
@@ -141,7 +122,7 @@ IndexError EntryReader::Find(const std::string& path, std::optional<Entry>& entr
                                "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM entries WHERE path = ?1");
   statement.BindBlob(1, path);
   code = code == SQLITE_OK ? statement.Step() : code;
-  if (code != SQLITE_ROW && code != SQLITE_DONE) {
+  if (StepError(code) != SQLITE_OK) {
     return FromSqlite(code);
   }
 
@@ -156,15 +137,14 @@ bool EntryReader::CountBelow(const std::string& directory, uint64_t limit, uint6
   Statement statement;
   if (statement.Prepare(database.db,
                         "SELECT count(*) FROM"
-                        " (SELECT 1 FROM entries WHERE path > ?1 AND path < ?2 LIMIT ?3)") !=
+                        " (SELECT 1 FROM entries WHERE path > ?2 AND path < ?3 LIMIT ?4)") !=
       SQLITE_OK) {
     return false;
   }
 
   const PathRange range(directory);
-  statement.BindBlob(1, range.first);
-  statement.BindBlob(2, range.end);
-  statement.BindInt(3, static_cast<int64_t>(limit));
+  range.Bind(statement);
+  statement.BindInt(4, static_cast<int64_t>(limit));
   if (statement.Step() != SQLITE_ROW) {
     return false;
   }

@@ -28,10 +28,8 @@ class EntryReader {
   };
   bool Summarise(Summary& summary);
 
-  // Entries of the share; those at or below normal path `under`, which reads their part of an
-  // index. False when reading failed.
+  // Entries of the share. False when reading failed.
   bool Count(uint64_t& entries);
-  bool CountBelow(const std::string& under, uint64_t& entries);
 
   // Calls `visit` with each entry at or below normal path `under` in byte order of the paths, until
   // it returns false. False when reading failed.
@@ -44,8 +42,8 @@ class EntryReader {
   // reading failed.
   bool ForEachOfInode(uint64_t inode, const std::function<bool(const Entry&)>& visit);
 
-  // How many entries lie below normal path `directory`, counted up to `limit`. False when reading
-  // failed.
+  // How many entries lie below normal path `directory`, counted up to `limit`, which reads their
+  // part of an index. False when reading failed.
   bool CountBelow(const std::string& directory, uint64_t limit, uint64_t& below);
 
   IndexDatabase database;

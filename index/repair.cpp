@@ -2,18 +2,10 @@
 #include "index/repair.h"
 
 #include "base/event_codes.h"
+#include "index/entry_table.h"
 #include "state/layout.h"
 
 namespace fileindexd {
-
-namespace {
-
-// Whether nothing at or below normal path `directory` sorts after `path` or at it.
-bool IsBehind(const std::string& directory, const std::string& path) {
-  return !Covers(directory, path) && directory + "0" <= path;
-}
-
-}  // namespace
 
 Repair::Repair(const Settings& in_force, const Share& of_share, EntryReader& entries,
                size_t lines_kept)
@@ -58,7 +50,7 @@ bool Repair::Add(const Found& found) {
 }
 
 void Repair::AddLeftOver(const Found& found) {
-  while (!emptied.empty() && IsBehind(emptied.back(), found.path)) {
+  while (!emptied.empty() && PathRange(emptied.back()).EndsBefore(found.path)) {
     emptied.pop_back();
   }
   for (const std::string& directory : emptied) {

@@ -50,11 +50,7 @@ std::string Between(const std::string& column, int64_t lowest, int64_t highest) 
 }
 
 std::string ColumnOf(ContentField field) {
-  std::string_view columns = NUMBER_COLUMNS;
-  for (auto i = static_cast<int>(FIRST_NUMBER_FIELD); i < static_cast<int>(field); ++i) {
-    columns.remove_prefix(columns.find(", ") + 2);
-  }
-  return "files." + std::string(columns.substr(0, columns.find(',')));
+  return "files." + ColumnAt(NUMBER_COLUMNS, NumberPlace(field));
 }
 
 std::string OfEntry(const QueryNode& node) {
@@ -69,8 +65,7 @@ std::string OfEntry(const QueryNode& node) {
                  : "";
     case Part::UNDER: {
       const PathRange range(node.names.front());
-      return " AND (entries.path = " + Blob(node.names.front()) + " OR (entries.path > " +
-             Blob(range.first) + " AND entries.path < " + Blob(range.end) + "))";
+      return " AND " + AtOrBelowSql(Blob(range.at), Blob(range.first), Blob(range.end));
     }
     case Part::OWNER: {
       std::string numbers;
@@ -143,7 +138,8 @@ std::string RowsSql(const QueryNode& tree, bool has_contents) {
   const std::string columns = "SELECT " FILEINDEX_ENTRY_COLUMNS " FROM ";
   return by_file && has_contents
              ? columns +
-                   "contents.files AS files CROSS JOIN entries ON " FILEINDEX_SAME_FILE " WHERE 1" +
+                   "contents.files AS files CROSS JOIN entries ON " FILEINDEX_WANTED_FILE
+                   " WHERE 1" +
                    of_file + of_entry
              : columns + "entries WHERE 1" + of_entry;
 }
@@ -155,15 +151,15 @@ std::string OrderedSql(SortBy sort) {
       return "";
     case SortBy::SIZE:
       return "SELECT " FILEINDEX_ENTRY_COLUMNS
-             ", size FROM entries INDEXED BY entries_large WHERE size >= 1048576 "
-             "ORDER BY size DESC";
+             ", size FROM entries INDEXED BY entries_large WHERE " FILEINDEX_IS_LARGE
+             " ORDER BY size DESC";
     case SortBy::MODIFIED:
       break;
   }
   // What is older than the first week has the key 0, like nothing at all.
-  return "SELECT " FILEINDEX_ENTRY_COLUMNS
-         ", mtime / 604800000000000 FROM entries INDEXED BY entries_by_week "
-         "WHERE mtime <> 0 AND mtime / 604800000000000 > 0 ORDER BY mtime / 604800000000000 DESC";
+  return "SELECT " FILEINDEX_ENTRY_COLUMNS ", " FILEINDEX_WEEK
+         " FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND " FILEINDEX_WEEK
+         " > 0 ORDER BY " FILEINDEX_WEEK " DESC";
 }
 
 }  // namespace fileindexd

@@ -34,8 +34,8 @@ CREATE TABLE entries(
   reread INTEGER NOT NULL);
 CREATE INDEX entries_by_inode ON entries(inode);
 CREATE INDEX entries_wanted ON entries(written, content_wanted) WHERE content_wanted <> 0;
-CREATE INDEX entries_by_week ON entries(mtime / 604800000000000) WHERE mtime <> 0;
-CREATE INDEX entries_large ON entries(size) WHERE size >= 1048576;
+CREATE INDEX entries_by_week ON entries()sql" FILEINDEX_WEEK R"sql() WHERE mtime <> 0;
+CREATE INDEX entries_large ON entries(size) WHERE )sql" FILEINDEX_IS_LARGE R"sql(;
 CREATE VIRTUAL TABLE names USING fts5(
   name, content='', columnsize=0, tokenize='unicode61 remove_diacritics 2');
 CREATE VIRTUAL TABLE parts USING fts5(

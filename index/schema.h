@@ -53,4 +53,21 @@ extern const char* const ENTRIES_SCHEMA;
 
 constexpr int ENTRY_COLUMN_COUNT = 16;
 
+// What the indexes by size and by time hold: a statement that is to use one has to say the same.
+// As numbers for C++, and as texts for SQL.
+#define FILEINDEX_LARGE_BYTES 1048576
+#define FILEINDEX_WEEK_NANOSECONDS 604800000000000
+#define FILEINDEX_SQL_NUMBER(number) FILEINDEX_SQL_TEXT(number)
+#define FILEINDEX_SQL_TEXT(text) #text
+#define FILEINDEX_IS_LARGE "size >= " FILEINDEX_SQL_NUMBER(FILEINDEX_LARGE_BYTES)
+#define FILEINDEX_WEEK "mtime / " FILEINDEX_SQL_NUMBER(FILEINDEX_WEEK_NANOSECONDS)
+
+// The identity of a file (see contents_schema.h). An entry and a row of `files` that have the same;
+// those and the content is wanted; and the one that is bound (BindIdentity), of either table.
+#define FILEINDEX_SAME_FILE                                                    \
+  "entries.inode = files.inode AND entries.birth_time = files.birth_time AND " \
+  "entries.size = files.size AND entries.mtime = files.mtime"
+#define FILEINDEX_WANTED_FILE FILEINDEX_SAME_FILE " AND entries.content_wanted = 1"
+#define FILEINDEX_THAT_FILE "inode = ?1 AND birth_time = ?2 AND size = ?3 AND mtime = ?4"
+
 }  // namespace fileindexd

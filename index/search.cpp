@@ -42,14 +42,12 @@ const QueryNode* UnknownShare(const QueryNode& node, const Question& question) {
 bool HoldsAny(sqlite3* db, const std::string& path) {
   const PathRange range(path);
   Statement below;
-  if (below.Prepare(db,
-                    "SELECT 1 FROM entries WHERE path = ?1 OR (path > ?2 AND path < ?3) LIMIT 1") !=
-      SQLITE_OK) {
+  const std::string sql =
+      "SELECT 1 FROM entries WHERE " + AtOrBelowSql("?1", "?2", "?3") + " LIMIT 1";
+  if (below.Prepare(db, sql.c_str()) != SQLITE_OK) {
     return true;  // not known
   }
-  below.BindBlob(1, path);
-  below.BindBlob(2, range.first);
-  below.BindBlob(3, range.end);
+  range.Bind(below);
   return below.Step() != SQLITE_DONE;
 }
 

@@ -6,6 +6,7 @@
 
 #include "index/contents_reader.h"
 #include "index/entry_table.h"
+#include "index/schema.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -169,7 +170,7 @@ int StatisticsScan::FindFurtherNames() {
     any = true;
   }
   std::sort(further_names.begin(), further_names.end());
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 std::string StatisticsScan::EntriesSql() const {
@@ -177,9 +178,7 @@ std::string StatisticsScan::EntriesSql() const {
   if (open.has_contents && wish.by == GroupBy::KIND) {
     kind =
         "CASE WHEN kind = 0 AND content_wanted = 1 THEN coalesce((SELECT found_kind"
-        " FROM contents.files AS files WHERE files.inode = entries.inode"
-        " AND files.birth_time = entries.birth_time AND files.size = entries.size"
-        " AND files.mtime = entries.mtime), 0) ELSE kind END";
+        " FROM contents.files AS files WHERE " FILEINDEX_SAME_FILE "), 0) ELSE kind END";
   }
   return "SELECT id, path, thing, " + kind +
          ", owner, mtime, CASE birth_time WHEN 0 THEN first_seen ELSE birth_time END, size"
@@ -217,7 +216,7 @@ int StatisticsScan::Walk(void (StatisticsScan::*count)(const CountedEntry& entry
     further += entry.is_further_name ? 1 : 0;
     (this->*count)(entry);
   }
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 void StatisticsScan::Count(const CountedEntry& entry) {

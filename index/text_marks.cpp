@@ -24,25 +24,4 @@ double TextMark::Score(uint16_t mark, double length) {
   }
 }
 
-void TextMarks::Set(int64_t text, uint16_t mark) {
-  const auto at = static_cast<size_t>(text);
-  const size_t number = at / CHUNK_TEXTS;
-  if (number >= places.size()) {
-    places.resize(std::max(number + 1, places.size() * 2));
-  }
-  if (places[number] == 0) {
-    chunks.emplace_back();
-    places[number] = static_cast<uint32_t>(chunks.size());
-  }
-  chunks[places[number] - 1][at % CHUNK_TEXTS] = mark;
-}
-
-uint16_t TextMarks::Of(int64_t text) const {
-  const auto at = static_cast<size_t>(text);
-  const size_t number = at / CHUNK_TEXTS;
-  return number < places.size() && places[number] != 0
-             ? chunks[places[number] - 1][at % CHUNK_TEXTS]
-             : uint16_t{0};
-}
-
 }  // namespace fileindexd

@@ -1,13 +1,12 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // How a part of a question stands in each of some texts, in two bytes, in chunks that are there
-// only where some have one. A million neighbours take 2 MB; a few take 2 KB each at most, however
-// large their rowids are.
+// only where some have one. A million neighbours take 2 MB. A few take 2 KB each, and 4 KB for each
+// million of rowids up to the greatest. What has grown may take twice that.
 #pragma once
 
-#include <array>
-#include <cstddef>
 #include <cstdint>
-#include <vector>
+
+#include "index/chunked.h"
 
 namespace fileindexd {
 
@@ -26,15 +25,12 @@ constexpr double USUAL_LENGTH = 8192;  // of a text whose length is not known
 
 class TextMarks {
  public:
-  void Set(int64_t text, uint16_t mark);  // `text`: 0 to MOST_ROWS
-  uint16_t Of(int64_t text) const;        // 0: none
+  // `text`: 0 to MOST_ROWS. 0: none.
+  void Set(int64_t text, uint16_t mark) { marks.At(static_cast<size_t>(text)) = mark; }
+  uint16_t Of(int64_t text) const { return marks.Get(static_cast<size_t>(text)); }
 
  private:
-  static constexpr size_t CHUNK_TEXTS = 1024;
-  using Chunk = std::array<uint16_t, CHUNK_TEXTS>;
-
-  std::vector<uint32_t> places;  // by number of the chunk: its place, from 1; 0: none
-  std::vector<Chunk> chunks;
+  Chunked<uint16_t, 1024> marks;
 };
 
 }  // namespace fileindexd

@@ -107,13 +107,16 @@ bool IsBeginning(std::string_view word) {
   return word.ends_with('*') || EndsInOnePaired(word);
 }
 
-std::string TextQuery(std::string_view word) {
-  std::string query = "\"";
-  for (const char c : word) {
-    query.append(c == '"' ? 2 : 1, c);
+std::string Quoted(std::string_view text) {
+  std::string quoted = "\"";
+  for (const char c : text) {
+    quoted.append(c == '"' ? 2 : 1, c);
   }
-  query += '"';
-  return IsBeginning(word) ? query + " *" : query;
+  return quoted + '"';
+}
+
+std::string TextQuery(std::string_view word) {
+  return IsBeginning(word) ? Quoted(word) + " *" : Quoted(word);
 }
 
 }  // namespace fileindexd

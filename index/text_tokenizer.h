@@ -54,8 +54,9 @@ class TextCutter {
   std::unique_ptr<Impl> impl;
 };
 
-// One word of a question in the full-text tables' own language: a quoted literal there, so that no
-// text of a user is taken for syntax. One that ends with '*' matches beginnings, as does a last
+// In the full-text tables' own language: a literal, so that no text of a user is taken for syntax.
+std::string Quoted(std::string_view text);
+// One word of a question, quoted. One that ends with '*' matches beginnings, as does a last
 // character of Han, kana or Hangul that stands alone.
 std::string TextQuery(std::string_view word);
 bool IsBeginning(std::string_view word);  // whether it matches beginnings

@@ -7,14 +7,12 @@
 #include "index/entry_table.h"
 #include "index/name_pattern.h"
 #include "index/name_text.h"
+#include "index/schema.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
 namespace {
-
-// As in the schema's indexes.
-constexpr int64_t LARGE = 1 << 20;
-constexpr int64_t WEEK = 604'800'000'000'000;
 
 // SQLITE_OK at the end, SQLITE_ROW where there are more than `most`.
 int ReadIds(Statement& rows, int64_t most, IdSet& ids) {
@@ -22,7 +20,7 @@ int ReadIds(Statement& rows, int64_t most, IdSet& ids) {
   int code = rows.Step();
   for (; code == SQLITE_ROW && found < most; code = rows.Step()) {
     const int64_t id = rows.Int(0);
-    if (id < 0 || id > MOST_ROWS) {
+    if (!IsRowid(id)) {
       return SQLITE_CORRUPT;
     }
     ids.Add(id);
@@ -88,7 +86,7 @@ int WordSets::ReadFew(Statement& statement, WordSet& set) {
   return code;
 }
 
-// What a small folder holds.
+// What a small folder holds. As two statements in one it is read faster than with an OR.
 int WordSets::ReadUnder(const QueryNode& node) {
   const PathRange range(node.names.front());
   Statement* below = nullptr;
@@ -99,9 +97,7 @@ int WordSets::ReadUnder(const QueryNode& node) {
   if (code != SQLITE_OK) {
     return code;
   }
-  below->BindBlob(1, node.names.front());
-  below->BindBlob(2, range.first);
-  below->BindBlob(3, range.end);
+  range.Bind(*below);
   WordSet& set = sets[&node];
   set.is_sure = true;
   return ReadFew(*below, set);
@@ -109,23 +105,24 @@ int WordSets::ReadUnder(const QueryNode& node) {
 
 // The large ones, and those of some weeks.
 int WordSets::ReadRange(const QueryNode& node) {
-  const bool by_size = node.column == Column::SIZE && node.lowest >= LARGE;
-  const bool by_week = node.column == Column::MODIFIED && node.lowest >= WEEK;
+  const bool by_size = node.column == Column::SIZE && node.lowest >= FILEINDEX_LARGE_BYTES;
+  const bool by_week = node.column == Column::MODIFIED && node.lowest >= FILEINDEX_WEEK_NANOSECONDS;
   if (!by_size && !by_week) {
     return SQLITE_OK;
   }
   Statement* inside = nullptr;
   const int code = statements.Find(
-      by_size ? "SELECT id FROM entries INDEXED BY entries_large "
-                "WHERE size >= 1048576 AND size >= ?1 AND size <= ?2"
-              : "SELECT id FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND "
-                "mtime / 604800000000000 >= ?1 AND mtime / 604800000000000 <= ?2",
+      by_size
+          ? "SELECT id FROM entries INDEXED BY entries_large "
+            "WHERE " FILEINDEX_IS_LARGE " AND size >= ?1 AND size <= ?2"
+          : "SELECT id FROM entries INDEXED BY entries_by_week WHERE mtime <> 0 AND " FILEINDEX_WEEK
+            " >= ?1 AND " FILEINDEX_WEEK " <= ?2",
       inside);
   if (code != SQLITE_OK) {
     return code;
   }
-  inside->BindInt(1, by_size ? node.lowest : node.lowest / WEEK);
-  inside->BindInt(2, by_size ? node.highest : node.highest / WEEK);
+  inside->BindInt(1, by_size ? node.lowest : node.lowest / FILEINDEX_WEEK_NANOSECONDS);
+  inside->BindInt(2, by_size ? node.highest : node.highest / FILEINDEX_WEEK_NANOSECONDS);
   WordSet& set = sets[&node];
   set.is_sure = by_size;
   return ReadFew(*inside, set);

@@ -161,7 +161,7 @@ int WordSets::ReadTable(const WordLeaf& leaf, Table table, const std::string& be
   int64_t id = 0;
   for (code = match->Step(); code == SQLITE_ROW && found < most; code = match->Step()) {
     id = match->Int(0);
-    if (id < 0 || id > MOST_ROWS) {
+    if (!IsRowid(id)) {
       return SQLITE_CORRUPT;
     }
     ++found;
@@ -179,7 +179,7 @@ int WordSets::ReadTable(const WordLeaf& leaf, Table table, const std::string& be
                               static_cast<double>(std::max<int64_t>(id, 1));
     return code;
   }
-  return code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 int WordSets::LastId(Table table, int64_t& last) {
@@ -189,7 +189,7 @@ int WordSets::LastId(Table table, int64_t& last) {
       read);
   code = code == SQLITE_OK ? read->Step() : code;
   last = code == SQLITE_ROW ? read->Int(0) : 0;
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  return StepError(code);
 }
 
 int WordSets::ReadBeside(const WordLeaf& leaf) {
@@ -236,10 +236,7 @@ int WordSets::AskName(const QueryNode& leaf, int64_t entry, bool& holds) {
   }
   ask_name->BindText(1, asked.LeafOf(leaf)->names_query);
   ask_name->BindInt(2, entry);
-  code = ask_name->Step();
-  holds = code == SQLITE_ROW;
-  ask_name->Reset();
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  return ask_name->ReadOne(holds, [] {});
 }
 
 int WordSets::AskText(const QueryNode& leaf, int64_t text, bool& holds) {
@@ -256,13 +253,9 @@ int WordSets::AskText(const QueryNode& leaf, int64_t text, bool& holds) {
   const WordLeaf& asked_leaf = *asked.LeafOf(leaf);
   ask_text->BindText(1, asked_leaf.text_query);
   ask_text->BindInt(2, text);
-  code = ask_text->Step();
-  holds = code == SQLITE_ROW;
-  if (holds) {
+  return ask_text->ReadOne(holds, [&] {
     marks[NumberOf(asked_leaf)].Set(text, static_cast<uint16_t>(ask_text->Int(0)));
-  }
-  ask_text->Reset();
-  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  });
 }
 
 }  // namespace fileindexd

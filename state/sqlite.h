@@ -10,6 +10,12 @@
 
 namespace fileindexd {
 
+// Of a step, or of the last one of a loop: SQLITE_OK where it came to a row or to the end, else
+// what failed.
+inline int StepError(int code) {
+  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
 // A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
 class Statement {
  public:
@@ -28,6 +34,27 @@ class Statement {
   // comes as SQLITE_OK.
   int Run();
   void Reset() { sqlite3_reset(handle); }
+  // Steps once, has `read` take the row if there is one, and resets. SQLITE_OK with and without.
+  template <typename Read>
+  int ReadOne(bool& found, const Read& read) {
+    const int code = Step();
+    found = code == SQLITE_ROW;
+    if (found) {
+      read();
+    }
+    Reset();
+    return StepError(code);
+  }
+  // The same with each row.
+  template <typename Read>
+  int ReadAll(const Read& read) {
+    int code = Step();
+    for (; code == SQLITE_ROW; code = Step()) {
+      read();
+    }
+    Reset();
+    return StepError(code);
+  }
 
   int64_t Int(int column) const { return sqlite3_column_int64(handle, column); }
   std::string Bytes(int column) const;

@@ -32,10 +32,13 @@ std::optional<uint64_t> EntriesAt(const Share& share, const std::string& path) {
     return 0;
   }
   uint64_t entries = 0;
-  const bool counted =
-      opened == IndexError::NONE &&
-      (path == share.path ? reader.Count(entries) : reader.CountBelow(path, entries));
-  return counted ? std::optional(entries) : std::nullopt;
+  if (opened == IndexError::NONE && path == share.path) {
+    return reader.Count(entries) ? std::optional(entries) : std::nullopt;
+  }
+  std::optional<Entry> own;
+  const bool counted = opened == IndexError::NONE && reader.CountBelow(path, INT64_MAX, entries) &&
+                       reader.Find(path, own) == IndexError::NONE;
+  return counted ? std::optional(entries + (own.has_value() ? 1 : 0)) : std::nullopt;
 }
 
 // What lies on the share's file system, where the share is the whole of it; many kinds do not tell.
