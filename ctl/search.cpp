@@ -50,8 +50,7 @@ bool IsAboveShare(const Settings& settings, const std::string& path) {
                      [&path](const Share& share) { return Covers(path, share.path); });
 }
 
-// The shares to be searched, those without an index included. False, with its line written, when
-// there is nothing to ask.
+// The shares to be searched. False, with its line written, when there is nothing to ask.
 bool ChooseShares(const Session& session, const Arguments& arguments, Question& question) {
   if (arguments.in_share && session.FindShare(*arguments.in_share) == nullptr) {
     return false;
@@ -77,6 +76,7 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
                          Covers(share.path, question.under);
     if (named && reached) {
       question.shares.push_back(share.name);
+      question.roots.emplace(share.name, share.path);
     }
     question.known.push_back(share.name);
   }
@@ -178,9 +178,6 @@ int Search(const Arguments& arguments) {
       return code;
     }
   }
-  // A share without an index yet holds nothing to find: that is no failure.
-  std::erase_if(question.shares,
-                [](const std::string& share) { return IsDirectoryGone(IndexPath(share)); });
 
   Answer answer;
   std::string error;

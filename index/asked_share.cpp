@@ -124,6 +124,10 @@ void AskedShare::Ask(const Question& question, const Asked& asked, const HitOrde
 void AskedShare::AskTries(const Question& question, const Asked& asked, const HitOrder& order,
                           uint64_t wanted) {
   deadline = std::chrono::steady_clock::now() + patience;
+  has_index = !EntryReader::IsMissing(name);
+  if (!has_index) {
+    return;  // it holds nothing to find yet: that is no failure
+  }
   IndexError of_contents = IndexError::NONE;
   int failed_with_contents = 0;
   bool was_there = false;

@@ -37,6 +37,7 @@ class AskedShare {
   void Complete(std::vector<Hit>& hits, CutterPool& cutters);
 
   std::string name;
+  bool has_index = true;  // false: the last question met a share that was not indexed yet
   std::chrono::seconds patience = MOST_ASKING;
   EntryReader reader;
   KeptStatements statements;  // of its connection

@@ -28,6 +28,9 @@ class EntryReader {
   };
   bool Summarise(Summary& summary);
 
+  // Whether the share was never indexed: it has no folder for an index.
+  static bool IsMissing(const std::string& share_name);
+
   // Entries of the share; those at or below normal path `under`, which reads their part of an
   // index. False when reading failed.
   bool Count(uint64_t& entries);

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -22,7 +23,9 @@ struct Question {
   std::string text;
   std::optional<Kind> kind;
   std::string under;                // normal path, or empty: everywhere
-  std::vector<std::string> shares;  // names to ask
+  std::vector<std::string> shares;  // names to ask; one without an index folder yet holds nothing
+  // Their folders, by name: a folder there may be asked for, though no index knows it yet.
+  std::map<std::string, std::string> roots;
   std::vector<std::string> known;  // names that the text may say as well, though they are not asked
   uint64_t limit = 20;
   uint64_t offset = 0;

@@ -142,6 +142,7 @@ TEST_F(QueryAnswersTest, BrokenShareIsNamedAndTheOthersAnswer) {
   Fill("b", {"x"});
   WriteFile(IndexPath("b") + "/entries.db", std::string(9000, 'x'));
   std::filesystem::remove(IndexPath("b") + "/entries.db-wal");
+  std::filesystem::create_directories(IndexPath("none"));
   question.shares = {"a", "b", "none"};
 
   EXPECT_EQ(Paths("x"), Names({"/a/x"}));
@@ -248,6 +249,7 @@ TEST_F(QueryAnswersTest, SharesThatStayOpenShowWhatIsCommittedAndWhatIsMadeAnew)
   question.text = "(";
   EXPECT_FALSE(asker.Ask(question, answer, error));
   question.text = "whale";
+  std::filesystem::create_directories(IndexPath("none"));
   question.shares = {"s", "none"};
   ASSERT_TRUE(asker.Ask(question, answer, error)) << error;
   EXPECT_EQ(answer.total, 1U);
