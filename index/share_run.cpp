@@ -16,6 +16,7 @@ namespace {
 
 constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
 constexpr size_t SCORED_TEXTS = 100;     // the same of texts
+constexpr uint64_t FEW_TEXTS = 500;      // of no more than that, each is looked at
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -299,13 +300,15 @@ int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& ca
 }
 
 int ShareRun::WalkTexts(BestHits& best) {
-  TextOrder order(upper.texts, sets);
   Block block;
   block.of_texts = true;
+  const auto add = [&](Candidate& candidate) { return AddHit(candidate, best, block); };
   int code = SQLITE_OK;
+  const size_t block_size = upper.texts.Count() <= FEW_TEXTS ? FEW_TEXTS : SCORED_TEXTS;
+  TextOrder order(upper.texts, sets);
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.
-    if (i % SCORED_TEXTS == 0) {
+    if (i % block_size == 0) {
       if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i > 0))) {
         return question.count_all ? CountTexts(order) : SQLITE_OK;
       }
@@ -315,8 +318,7 @@ int ShareRun::WalkTexts(BestHits& best) {
     if (text < 0) {
       break;
     }
-    code =
-        VisitEntriesOf(text, [&](Candidate& candidate) { return AddHit(candidate, best, block); });
+    code = VisitEntriesOf(text, add);
   }
   return code;
 }
