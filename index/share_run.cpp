@@ -304,6 +304,13 @@ int ShareRun::WalkTexts(BestHits& best) {
   block.of_texts = true;
   const auto add = [&](Candidate& candidate) { return AddHit(candidate, best, block); };
   int code = SQLITE_OK;
+  if (!IsScored() && wanted > 0) {  // all are looked at, in whatever order
+    for (int64_t text = upper.texts.Next(-1); text >= 0 && code == SQLITE_OK;
+         text = upper.texts.Next(text)) {
+      code = VisitEntriesOf(text, add);
+    }
+    return code;
+  }
   const size_t block_size = upper.texts.Count() <= FEW_TEXTS ? FEW_TEXTS : SCORED_TEXTS;
   TextOrder order(upper.texts, sets);
   for (size_t i = 0; code == SQLITE_OK; ++i) {
