@@ -15,9 +15,6 @@
 
 namespace fileindexd {
 
-// A share that has not answered by then is given up.
-constexpr std::chrono::seconds MOST_ASKING{30};
-
 class AskedShare {
  public:
   explicit AskedShare(std::string share_name) : name(std::move(share_name)) {}
@@ -38,7 +35,6 @@ class AskedShare {
 
   std::string name;
   bool has_index = true;  // false: the last question met a share that was not indexed yet
-  std::chrono::seconds patience = MOST_ASKING;
   EntryReader reader;
   KeptStatements statements;  // of its connection
   bool has_contents = false;

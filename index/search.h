@@ -2,6 +2,7 @@
 // Questions to the indexes.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <map>
 #include <memory>
@@ -35,7 +36,8 @@ struct Question {
   bool reverse = false;
   bool count_all = true;  // false: of very many hits `total` may count only those looked at
   bool suggests = true;   // without any hit, a suggestion is looked for
-  bool shows = true;      // false: of hits only share, path and what their order needs are told
+  std::chrono::seconds patience{30};  // a share that has not answered by then is given up
+  bool shows = true;  // false: of hits only share, path and what their order needs are told
 };
 
 struct Hit {
@@ -55,8 +57,8 @@ struct Answer {
 };
 
 // False when the question makes no sense, and `error` then says why and where, in one line. Shares
-// are asked side by side, each in one state of it; one that does not answer within 30 seconds is
-// among the failures.
+// are asked side by side, each in one state of it; one that does not answer in time is among the
+// failures.
 bool Ask(const Question& question, Answer& answer, std::string& error);
 
 // The same, and the shares of the last question stay open for the next. One thread.

@@ -21,19 +21,9 @@ class QueryPlacesTest : public QuestionTest {
     question.roots = {{"s", root}, {"fresh", fresh}};
   }
 
-  // Paths of the hits in these shares; "error: " and the reason when it was refused.
-  Names Paths(const Names& shares, const std::string& text) {
+  Names PathsIn(const Names& shares, const std::string& text) {
     question.shares = shares;
-    question.text = text;
-    std::string error;
-    if (!Ask(question, answer, error)) {
-      return {"error: " + error};
-    }
-    Names paths;
-    for (const Hit& hit : answer.hits) {
-      paths.push_back(hit.entry.path);
-    }
-    return paths;
+    return Paths(text);
   }
 
   std::string fresh;  // folder of a share that was never indexed
@@ -42,13 +32,14 @@ class QueryPlacesTest : public QuestionTest {
 TEST_F(QueryPlacesTest, ShareWithoutAnIndexYetHoldsNothingToFind) {
   Store({{"whale.txt", TextContent("x")}});
 
-  EXPECT_EQ(Paths({"fresh"}, "whale"), Names());
+  EXPECT_EQ(PathsIn({"fresh"}, "whale"), Names());
   EXPECT_EQ(answer.failures, Names());
-  EXPECT_EQ(Paths({"s", "fresh"}, "whale"), Names({At("whale.txt")}));
+  EXPECT_EQ(PathsIn({"s", "fresh"}, "whale"), Names({At("whale.txt")}));
   EXPECT_EQ(answer.failures, Names());
   std::string error;
   ASSERT_TRUE(MakeShareFolder("fresh", error)) << error;
-  EXPECT_EQ(Paths({"fresh", "s"}, "whale"), Names({At("whale.txt")})) << "its queue is there alone";
+  EXPECT_EQ(PathsIn({"fresh", "s"}, "whale"), Names({At("whale.txt")}))
+      << "its queue is there alone";
   EXPECT_EQ(answer.failures, Names());
 }
 
@@ -57,7 +48,7 @@ TEST_F(QueryPlacesTest, IndexFolderWithoutItsDatabaseIsNamed) {
   ASSERT_TRUE(MakeShareFolder("fresh", error)) << error;
   MakeFolder(IndexPath("fresh"));
 
-  EXPECT_EQ(Paths({"fresh"}, "whale"), Names());
+  EXPECT_EQ(PathsIn({"fresh"}, "whale"), Names());
   ASSERT_EQ(answer.failures.size(), 1U);
   EXPECT_TRUE(answer.failures[0].starts_with("share fresh: ")) << answer.failures[0];
 }
@@ -95,7 +86,7 @@ TEST_F(QueryPlacesTest, FoldersThatNoShareKnowsAreRefused) {
 // What a share will hold that was never indexed is known by the disk alone.
 TEST_F(QueryPlacesTest, FoldersOfAShareWithoutAnIndexYetAreKnownByTheDisk) {
   const auto is_refused = [this](const Names& shares, const std::string& path) {
-    const Names hits = Paths(shares, "whale under:" + path);
+    const Names hits = PathsIn(shares, "whale under:" + path);
     EXPECT_LE(hits.size(), 1U) << path;
     return !hits.empty();
   };
@@ -124,9 +115,9 @@ TEST_F(QueryPlacesTest, FoldersOfAShareWithoutAnIndexYetAreKnownByTheDisk) {
 TEST_F(QueryPlacesTest, FolderOfAnEmptyShareIsKnown) {
   AddAll();
 
-  EXPECT_EQ(Paths({"s"}, "whale under:" + root), Names());
-  EXPECT_EQ(Paths({"s"}, "whale under:" + folder), Names());
-  EXPECT_EQ(Paths({"s"}, "whale under:" + root + "/none")[0].substr(0, 6), "error:");
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + root), Names());
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + folder), Names());
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + root + "/none")[0].substr(0, 6), "error:");
 }
 
 }  // namespace fileindexd
