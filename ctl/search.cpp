@@ -192,7 +192,7 @@ int Search(const Arguments& arguments) {
     TellOfMore(USUAL_HITS, screen);
   } else if (answer.total == 0 && answer.failures.empty() &&
              (question.limit > 0 || question.count_all)) {
-    TellNothingFound(question, answer, screen);
+    TellNothingFound(answer, screen);
   }
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());

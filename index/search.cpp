@@ -195,6 +195,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   }
   if (!suggestion.empty() && HasHits(question, suggestion)) {
     made.suggestion = std::move(suggestion);
+  } else if (suggests) {
+    made.word_like_field = WordLikeField(asked.tree);
   }
   answer = std::move(made);
   return true;

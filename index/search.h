@@ -54,6 +54,7 @@ struct Answer {
   uint64_t total = 0;                 // matching entries, whatever the limit
   std::vector<std::string> failures;  // a line for each share that could not be asked
   std::string suggestion;             // without any hit: the question in words that the index has
+  std::string word_like_field;        // without either: the first word like "type:pdf"
 };
 
 // False when the question makes no sense, and `error` then says why and where, in one line. Shares
