@@ -86,7 +86,8 @@ int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
     return SQLITE_OK;
   }
   Hit hit;
-  const int code = IsScored() ? score.Score(candidate, hit.score, hit.text) : SQLITE_OK;
+  const int code =
+      IsScored() ? score.Score(candidate, block.of_texts, hit.score, hit.text) : SQLITE_OK;
   answered_by_name += hit.score >= 1 ? 1 : 0;
   if (hit.score >= 1 || block.of_texts) {
     hit.score = std::min(hit.score, block.ceiling);
@@ -101,7 +102,7 @@ int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
 int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
   Candidate candidate;
   candidate.entry = hit.entry;
-  int code = IsScored() ? SQLITE_OK : score.Score(candidate, hit.score, hit.text);
+  int code = IsScored() ? SQLITE_OK : score.Score(candidate, false, hit.score, hit.text);
   code = code == SQLITE_OK ? rows.KindOf(candidate, hit.entry.kind) : code;
   hit.marks = MarksInPath(asked, hit.entry, names);
   return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;

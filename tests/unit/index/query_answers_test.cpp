@@ -73,6 +73,25 @@ TEST_F(QueryAnswersTest, ANameThatAnswersAloneStandsAboveOthersWhateverItsConten
   EXPECT_EQ(Hits("budget OR invoice"), Names({"budget.xlsx", "old draft budget copy.xlsx"}));
 }
 
+// What its text alone makes an answer stands behind those whose names are one, though a part of the
+// question is in its name.
+TEST_F(QueryAnswersTest, TextsBesideAPieceOfTheNameKeepTheirPages) {
+  Store({{"k.txt", TextContent("whale")},
+         {"k first.md", TextContent("x")},
+         {"k second.md", TextContent("x")},
+         {"k third.md", TextContent("x")},
+         {"other.txt", TextContent("whale")}});
+  question.count_all = false;
+  const Names whole = Hits("(ext:md OR whale) -(-name:*k*)");
+  ASSERT_EQ(whole.size(), 4U);
+  EXPECT_EQ(whole.back(), "k.txt");
+
+  question.limit = 2;
+  EXPECT_EQ(Hits("(ext:md OR whale) -(-name:*k*)"), Names(whole.begin(), whole.begin() + 2));
+  question.offset = 2;
+  EXPECT_EQ(Hits("(ext:md OR whale) -(-name:*k*)"), Names(whole.begin() + 2, whole.end()));
+}
+
 TEST_F(QueryAnswersTest, NoQuestionHoldsAZero) {
   question.shares = {"a"};
   question.text = std::string("\"a\0b\"", 5);
