@@ -50,8 +50,7 @@ bool IsAboveShare(const Settings& settings, const std::string& path) {
                      [&path](const Share& share) { return Covers(path, share.path); });
 }
 
-// The shares to be searched, those without an index included. False, with its line written, when
-// there is nothing to ask.
+// The shares to be searched. False, with its line written, when there is nothing to ask.
 bool ChooseShares(const Session& session, const Arguments& arguments, Question& question) {
   if (arguments.in_share && session.FindShare(*arguments.in_share) == nullptr) {
     return false;
@@ -77,6 +76,7 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
                          Covers(share.path, question.under);
     if (named && reached) {
       question.shares.push_back(share.name);
+      question.roots.emplace(share.name, share.path);
     }
     question.known.push_back(share.name);
   }
@@ -177,9 +177,6 @@ int Search(const Arguments& arguments) {
       return code;
     }
   }
-  // A share without an index yet holds nothing to find: that is no failure.
-  std::erase_if(question.shares,
-                [](const std::string& share) { return IsDirectoryGone(IndexPath(share)); });
 
   Answer answer;
   std::string error;
@@ -194,7 +191,7 @@ int Search(const Arguments& arguments) {
     TellOfMore(USUAL_HITS, screen);
   } else if (answer.total == 0 && answer.failures.empty() &&
              (question.limit > 0 || question.count_all)) {
-    TellNothingFound(question, answer, screen);
+    TellNothingFound(answer, screen);
   }
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());

@@ -12,8 +12,7 @@ namespace fileindexd {
 
 // Of a question without any hit: one that has some, or what in it is no field. People are told at
 // least that there is none.
-void TellNothingFound(const Question& question, const Answer& answer,
-                      const std::optional<Screen>& screen);
+void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen);
 
 // Nobody has said how many were wanted.
 void TellOfMore(uint64_t shown, const std::optional<Screen>& screen);

@@ -8,7 +8,6 @@
 #include "ctl/places.h"
 #include "ctl/stats_output.h"
 #include "ctl/values.h"
-#include "state/layout.h"
 
 namespace fileindexd {
 
@@ -64,9 +63,7 @@ int Stats(const Arguments& arguments) {
     return EXIT_FAILED;
   }
   for (const Share& share : session.settings->shares) {
-    // One without an index yet holds nothing to count: that is no failure.
-    if ((!arguments.in_share || share.name == *arguments.in_share) &&
-        !IsDirectoryGone(IndexPath(share.name))) {
+    if (!arguments.in_share || share.name == *arguments.in_share) {
       wish.shares.push_back(share);
     }
   }

@@ -123,7 +123,11 @@ void AskedShare::Ask(const Question& question, const Asked& asked, const HitOrde
 // the names answer.
 void AskedShare::AskTries(const Question& question, const Asked& asked, const HitOrder& order,
                           uint64_t wanted) {
-  deadline = std::chrono::steady_clock::now() + patience;
+  deadline = std::chrono::steady_clock::now() + question.patience;
+  has_index = !EntryReader::IsMissing(name);
+  if (!has_index) {
+    return;  // it holds nothing to find yet: that is no failure
+  }
   IndexError of_contents = IndexError::NONE;
   int failed_with_contents = 0;
   bool was_there = false;
@@ -144,14 +148,16 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
     hits.clear();
     total = 0;
     run.reset();
-    if ((code & 0xff) == SQLITE_INTERRUPT) {
-      Fail("no answer within " + std::to_string(patience.count()) + " seconds");
+    error = error == IndexError::NONE ? FromSqlite(code) : error;
+    // Somebody may hold its databases: waiting for them counts as well.
+    if ((code & 0xff) == SQLITE_INTERRUPT ||
+        (error == IndexError::BUSY && IsTooLate(&deadline) != 0)) {
+      Fail("no answer within " + std::to_string(question.patience.count()) + " seconds");
       return;
     }
     if (error == IndexError::PATH_NOT_FOUND && was_there) {
       return;  // the share was removed meanwhile: it holds nothing to find
     }
-    error = error == IndexError::NONE ? FromSqlite(code) : error;
     if (has_contents) {
       ++failed_with_contents;
       of_contents = error;

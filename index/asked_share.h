@@ -15,9 +15,6 @@
 
 namespace fileindexd {
 
-// A share that has not answered by then is given up.
-constexpr std::chrono::seconds MOST_ASKING{30};
-
 class AskedShare {
  public:
   explicit AskedShare(std::string share_name) : name(std::move(share_name)) {}
@@ -37,7 +34,7 @@ class AskedShare {
   void Complete(std::vector<Hit>& hits, CutterPool& cutters);
 
   std::string name;
-  std::chrono::seconds patience = MOST_ASKING;
+  bool has_index = true;  // false: the last question met a share that was not indexed yet
   EntryReader reader;
   KeptStatements statements;  // of its connection
   bool has_contents = false;

@@ -44,6 +44,7 @@ std::string NumberText(const QueryNode& node, int64_t number) {
     case ValueForm::BITS:
       return std::to_string(number) + " bits/s";
     case ValueForm::NUMBER:
+    case ValueForm::RATING:
       break;
   }
   return std::to_string(number);

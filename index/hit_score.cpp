@@ -124,7 +124,7 @@ bool HitScore::NameAnswers(const QueryNode& node, const std::vector<Found>& foun
   }
 }
 
-int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
+int HitScore::Score(Candidate& candidate, bool by_text, double& score, int64_t& text) {
   std::vector<Found> found;
   const int code = Find(candidate, found);
   score = 0;
@@ -133,7 +133,8 @@ int HitScore::Score(Candidate& candidate, double& score, int64_t& text) {
     return code;
   }
   const auto in_name = [](const Found& part) { return part.in_name; };
-  if (std::any_of(found.begin(), found.end(), in_name) && NameAnswers(asked.tree, found)) {
+  if (!by_text && std::any_of(found.begin(), found.end(), in_name) &&
+      NameAnswers(asked.tree, found)) {
     double weight = 0;
     for (const Found& part : found) {
       weight += sets.WeightOf(*part.leaf);

@@ -23,8 +23,9 @@ class HitScore {
   HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of_check,
            const Asked& in_question, NameMarker& of_names);
 
-  // Of an entry that answers. `text` is set where a content counted. SQLite's code.
-  int Score(Candidate& candidate, double& score, int64_t& text);
+  // Of an entry that answers. `by_text`: it was come upon through its content, so its name alone
+  // does not answer. `text` is set where a content counted. SQLite's code.
+  int Score(Candidate& candidate, bool by_text, double& score, int64_t& text);
 
  private:
   struct Found {

@@ -128,6 +128,8 @@ ValueForm FormOf(Column column, ContentField field) {
       return ValueForm::DURATION;
     case C::BIT_RATE:
       return ValueForm::BITS;
+    case C::RATING:
+      return ValueForm::RATING;
     default:
       return ValueForm::NUMBER;
   }

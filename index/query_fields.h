@@ -46,7 +46,16 @@ const char* NearField(std::string_view name);
 const char* FieldName(ContentField field);
 
 // How values of a number are written.
-enum class ValueForm : uint8_t { NUMBER, BYTES, BITS, DURATION, SECONDS, NANOSECONDS, CAMERA_TIME };
+enum class ValueForm : uint8_t {
+  NUMBER,
+  RATING,
+  BYTES,
+  BITS,
+  DURATION,
+  SECONDS,
+  NANOSECONDS,
+  CAMERA_TIME
+};
 ValueForm FormOf(Column column, ContentField field);
 
 }  // namespace fileindexd

@@ -112,6 +112,7 @@ std::optional<Point> PointOf(std::string_view text, ValueForm form, time_t now) 
   std::optional<int64_t> value;
   switch (form) {
     case ValueForm::NUMBER:
+    case ValueForm::RATING:
       value = Number(text);
       break;
     case ValueForm::BYTES:
@@ -133,6 +134,7 @@ std::optional<Point> PointOf(std::string_view text, ValueForm form, time_t now) 
 const char* Expected(ValueForm form) {
   switch (form) {
     case ValueForm::NUMBER:
+    case ValueForm::RATING:
       return "a number";
     case ValueForm::BYTES:
       return "a size like 500K, 10M or 1.5G";
@@ -148,10 +150,25 @@ const char* Expected(ValueForm form) {
   return "a time like today, -7d, 2024, 2024-01 or 2024-01-05";
 }
 
-}  // namespace
+bool IsTime(ValueForm form) {
+  return form == ValueForm::SECONDS || form == ValueForm::NANOSECONDS ||
+         form == ValueForm::CAMERA_TIME;
+}
 
-bool ParseRange(std::string_view text, ValueForm form, time_t now, ValueRange& range,
-                std::string& what, size_t& at) {
+// Why nothing can lie in it; null: something can.
+const char* WhyEmpty(const ValueRange& range, ValueForm form) {
+  constexpr int64_t BEST_RATING = 5;
+  if (range.lowest > range.highest) {
+    return "the range ends before it begins";
+  }
+  if (form == ValueForm::RATING && (range.highest < 0 || range.lowest > BEST_RATING)) {
+    return "a rating goes from 0 to 5";
+  }
+  return range.highest < 0 && !IsTime(form) ? "no such number is below 0" : nullptr;
+}
+
+bool ReadRange(std::string_view text, ValueForm form, time_t now, ValueRange& range,
+               std::string& what, size_t& at) {
   const auto point = [&](std::string_view value) {
     const std::optional<Point> read = PointOf(value, form, now);
     if (!read.has_value()) {
@@ -181,11 +198,6 @@ bool ParseRange(std::string_view text, ValueForm form, time_t now, ValueRange& r
       }
       made.highest = to.front() == '-' ? high->last : high->until;
     }
-    if (made.lowest > made.highest) {
-      at = 0;
-      what = "the range ends before it begins";
-      return false;
-    }
     range = made;
     return true;
   }
@@ -198,10 +210,31 @@ bool ParseRange(std::string_view text, ValueForm form, time_t now, ValueRange& r
   }
   if (!is_compared) {
     made = {value->alone, value->until};
+  } else if (text.front() == '>' && !or_equal && value->last == INT64_MAX) {
+    what = "no number is greater than that";
+    at = 0;
+    return false;
   } else if (text.front() == '>') {
     made.lowest = or_equal ? value->first : Plus(value->last, 1);
   } else {
     made.highest = or_equal ? value->last : Plus(value->first, -1);
+  }
+  range = made;
+  return true;
+}
+
+}  // namespace
+
+bool ParseRange(std::string_view text, ValueForm form, time_t now, ValueRange& range,
+                std::string& what, size_t& at) {
+  ValueRange made;
+  if (!ReadRange(text, form, now, made, what, at)) {
+    return false;
+  }
+  if (const char* why = WhyEmpty(made, form); why != nullptr) {
+    what = why;
+    at = 0;
+    return false;
   }
   range = made;
   return true;
@@ -234,8 +267,8 @@ bool ParseCircle(std::string_view text, Circle& circle, std::string& what) {
     what = "'" + std::string(text) + "' is not LATITUDE,LONGITUDE,RADIUS like 52.52,13.40,2km";
     return false;
   }
-  if (std::fabs(*latitude) > 90 || std::fabs(*longitude) > 180 || *radius < 0) {
-    what = "latitude goes from -90 to 90, longitude from -180 to 180, and a radius is positive";
+  if (std::fabs(*latitude) > 90 || std::fabs(*longitude) > 180 || *radius <= 0) {
+    what = "latitude goes from -90 to 90, longitude from -180 to 180, and a radius is above 0";
     return false;
   }
   circle = {*latitude, *longitude, std::min(*radius * unit, HALF_ROUND)};

@@ -21,7 +21,9 @@ namespace fileindexd {
 //   day       = year [ "-" month [ "-" day ] ]
 //
 // A day, a month or a year stands for all of it: behind it begins what is greater. A duration
-// stands for its second. A time before now that stands alone means from then until now.
+// stands for its second. A time before now that stands alone means from then until now. A range in
+// which nothing can lie makes no sense: one that ends before it begins, sizes and numbers below 0,
+// ratings above 5.
 struct ValueRange {
   int64_t lowest = INT64_MIN;  // inclusive, in the unit that is stored
   int64_t highest = INT64_MAX;

@@ -3,6 +3,7 @@
 
 #include <sys/stat.h>
 
+#include <cerrno>
 #include <chrono>
 #include <thread>
 
@@ -37,6 +38,11 @@ bool VisitAll(Statement& statement, const std::function<bool(const Entry&)>& vis
 
 IndexError EntryReader::Open(const std::string& share_name) {
   return database.OpenForReading(IndexPath(share_name));
+}
+
+bool EntryReader::IsMissing(const std::string& share_name) {
+  struct stat status {};
+  return lstat(IndexPath(share_name).c_str(), &status) != 0 && errno == ENOENT;
 }
 
 // Of a share without a folder there will be none.

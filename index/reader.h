@@ -28,6 +28,9 @@ class EntryReader {
   };
   bool Summarise(Summary& summary);
 
+  // Whether the share was never indexed: it has no folder for an index.
+  static bool IsMissing(const std::string& share_name);
+
   // Entries of the share. False when reading failed.
   bool Count(uint64_t& entries);
 

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/search.h"
 
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <deque>
 #include <iterator>
@@ -12,6 +14,7 @@
 #include "index/entry_table.h"
 #include "index/side_by_side.h"
 #include "index/suggestion.h"
+#include "state/layout.h"
 
 namespace fileindexd {
 
@@ -51,16 +54,33 @@ bool HoldsAny(sqlite3* db, const std::string& path) {
   return below.Step() != SQLITE_DONE;
 }
 
+bool IsDirectory(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+}
+
+// A share without an index yet knows no more than what lies on its disk.
+bool Knows(const AskedShare& share, const Question& question, const std::string& path) {
+  if (share.run != nullptr && HoldsAny(share.reader.database.db, path)) {
+    return true;
+  }
+  const auto root = question.roots.find(share.name);
+  return root != question.roots.end() &&
+         (Covers(path, root->second) ||
+          (!share.has_index && Covers(root->second, path) && IsDirectory(path)));
+}
+
 // A folder in the question's text of which the shares know nothing: null, or the first of them.
-const QueryNode* UnknownFolder(const QueryNode& node, const std::deque<AskedShare>& shares) {
+const QueryNode* UnknownFolder(const QueryNode& node, const Question& question,
+                               const std::deque<AskedShare>& shares) {
   const bool is_written = node.part == Part::UNDER && node.end > node.start;
   if (is_written && std::none_of(shares.begin(), shares.end(), [&](const AskedShare& share) {
-        return share.run == nullptr || HoldsAny(share.reader.database.db, node.names.front());
+        return Knows(share, question, node.names.front());
       })) {
     return &node;
   }
   for (size_t i = 0; i < node.below.size() && node.part != Part::NOT; ++i) {
-    const QueryNode* unknown = UnknownFolder(node.below[i], shares);
+    const QueryNode* unknown = UnknownFolder(node.below[i], question, shares);
     if (unknown != nullptr) {
       return unknown;
     }
@@ -155,7 +175,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
     Complete(made.hits);
   }
   const QueryNode* folder = made.total == 0 && made.failures.empty() && !shares.empty()
-                                ? UnknownFolder(asked.tree, shares)
+                                ? UnknownFolder(asked.tree, question, shares)
                                 : nullptr;
   if (folder != nullptr) {
     for (AskedShare& share : shares) {
@@ -173,6 +193,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   }
   if (!suggestion.empty() && HasHits(question, suggestion)) {
     made.suggestion = std::move(suggestion);
+  } else if (suggests) {
+    made.word_like_field = WordLikeField(asked.tree);
   }
   answer = std::move(made);
   return true;

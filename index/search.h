@@ -2,7 +2,9 @@
 // Questions to the indexes.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -22,7 +24,9 @@ struct Question {
   std::string text;
   std::optional<Kind> kind;
   std::string under;                // normal path, or empty: everywhere
-  std::vector<std::string> shares;  // names to ask
+  std::vector<std::string> shares;  // names to ask; one without an index folder yet holds nothing
+  // Their folders, by name: a folder there may be asked for, though no index knows it yet.
+  std::map<std::string, std::string> roots;
   std::vector<std::string> known;  // names that the text may say as well, though they are not asked
   uint64_t limit = 20;
   uint64_t offset = 0;
@@ -32,7 +36,8 @@ struct Question {
   bool reverse = false;
   bool count_all = true;  // false: of very many hits `total` may count only those looked at
   bool suggests = true;   // without any hit, a suggestion is looked for
-  bool shows = true;      // false: of hits only share, path and what their order needs are told
+  std::chrono::seconds patience{30};  // a share that has not answered by then is given up
+  bool shows = true;  // false: of hits only share, path and what their order needs are told
 };
 
 struct Hit {
@@ -49,11 +54,12 @@ struct Answer {
   uint64_t total = 0;                 // matching entries, whatever the limit
   std::vector<std::string> failures;  // a line for each share that could not be asked
   std::string suggestion;             // without any hit: the question in words that the index has
+  std::string word_like_field;        // without either: the first word like "type:pdf"
 };
 
 // False when the question makes no sense, and `error` then says why and where, in one line. Shares
-// are asked side by side, each in one state of it; one that does not answer within 30 seconds is
-// among the failures.
+// are asked side by side, each in one state of it; one that does not answer in time is among the
+// failures.
 bool Ask(const Question& question, Answer& answer, std::string& error);
 
 // The same, and the shares of the last question stay open for the next. One thread.

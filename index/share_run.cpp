@@ -15,6 +15,7 @@ namespace fileindexd {
 namespace {
 
 constexpr size_t SCORED_TEXTS = 100;     // that are looked at before it is asked if that is enough
+constexpr uint64_t FEW_TEXTS = 500;      // of no more than that, each is looked at
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -84,7 +85,8 @@ int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
     return SQLITE_OK;
   }
   Hit hit;
-  const int code = IsScored() ? score.Score(candidate, hit.score, hit.text) : SQLITE_OK;
+  const int code =
+      IsScored() ? score.Score(candidate, block.of_texts, hit.score, hit.text) : SQLITE_OK;
   answered_by_name += hit.score >= 1 ? 1 : 0;
   if (hit.score >= 1 || block.of_texts) {
     hit.score = std::min(hit.score, block.ceiling);
@@ -99,7 +101,7 @@ int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
 int ShareRun::Complete(Hit& hit, TextCutter& cutter) {
   Candidate candidate;
   candidate.entry = hit.entry;
-  int code = IsScored() ? SQLITE_OK : score.Score(candidate, hit.score, hit.text);
+  int code = IsScored() ? SQLITE_OK : score.Score(candidate, false, hit.score, hit.text);
   code = code == SQLITE_OK ? rows.KindOf(candidate, hit.entry.kind) : code;
   hit.marks = MarksInPath(asked, hit.entry, names);
   return code == SQLITE_OK ? AddSnippet(rows, asked, candidate, cutter, hit.snippet) : code;
@@ -143,13 +145,22 @@ int ShareRun::VisitEntriesOf(int64_t text, const std::function<int(Candidate& ca
 }
 
 int ShareRun::WalkTexts(BestHits& best) {
-  TextOrder order(upper.texts, sets);
   Block block;
   block.of_texts = true;
+  const auto add = [&](Candidate& candidate) { return AddHit(candidate, best, block); };
   int code = SQLITE_OK;
+  if (!IsScored() && wanted > 0) {  // all are looked at, in whatever order
+    for (int64_t text = upper.texts.Next(-1); text >= 0 && code == SQLITE_OK;
+         text = upper.texts.Next(text)) {
+      code = VisitEntriesOf(text, add);
+    }
+    return code;
+  }
+  const size_t block_size = upper.texts.Count() <= FEW_TEXTS ? FEW_TEXTS : SCORED_TEXTS;
+  TextOrder order(upper.texts, sets);
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.
-    if (i % SCORED_TEXTS == 0) {
+    if (i % block_size == 0) {
       if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i > 0))) {
         return question.count_all ? CountTexts(order) : SQLITE_OK;
       }
@@ -159,8 +170,7 @@ int ShareRun::WalkTexts(BestHits& best) {
     if (text < 0) {
       break;
     }
-    code =
-        VisitEntriesOf(text, [&](Candidate& candidate) { return AddHit(candidate, best, block); });
+    code = VisitEntriesOf(text, add);
   }
   return code;
 }

@@ -35,6 +35,9 @@ bool OpenShare::Open(bool with_contents, std::vector<std::string>& failures) {
   const auto fail = [&](const char* what, IndexError error) {
     failures.push_back("share " + share.name + ": " + what + IndexErrorText(error));
   };
+  if (EntryReader::IsMissing(share.name)) {
+    return false;
+  }
   const IndexError error = reader.OpenOnceMade(share.name);
   if (error != IndexError::NONE) {
     fail("", error);

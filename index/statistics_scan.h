@@ -21,7 +21,7 @@ class OpenShare {
   explicit OpenShare(const Share& opened) : share(opened) {}
 
   // False when the entries cannot be read. Each trouble adds its line, that with contents too: the
-  // entries are good without them.
+  // entries are good without them. A share that is not indexed yet is none.
   bool Open(bool with_contents, std::vector<std::string>& failures);
 
   Share share;

@@ -106,6 +106,10 @@ bool IsKnown(const AskedShare& share, const WordLeaf& leaf) {
   return share.run != nullptr && share.run->Sets().CountOf(leaf) > 0;
 }
 
+bool IsLetter(char c) {
+  return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+}
+
 }  // namespace
 
 int EditDistance(const std::string& from, const std::string& to, int most) {
@@ -179,6 +183,27 @@ std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares) {
     at = change.first;
   }
   return changes.empty() ? "" : text + asked.text.substr(at);
+}
+
+std::string WordLikeField(const QueryNode& node) {
+  if (node.part == Part::NOT) {
+    return "";
+  }
+  for (const QueryNode& below : node.below) {
+    std::string word = WordLikeField(below);
+    if (!word.empty()) {
+      return word;
+    }
+  }
+  if (node.part != Part::WORD || node.scope != Scope::ANY || node.is_phrase) {
+    return "";
+  }
+  const std::string& text = node.text;
+  const auto end = std::find_if_not(text.begin(), text.end(), IsLetter);
+  const std::string_view rest(end, text.end());
+  const bool is_like_field = end - text.begin() >= 2 && rest.size() >= 2 && rest[0] == ':' &&
+                             rest[1] != ':' && rest[1] != '/';
+  return is_like_field ? text : "";
 }
 
 }  // namespace fileindexd

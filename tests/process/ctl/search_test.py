@@ -135,11 +135,36 @@ class SearchTest(IndexTest):
             ("--nope", "beach"),
             ("--json", "-0", "beach"),
             ("--share",),
+            ("size:<0", "beach"),
+            ("modified:2024-06..2024-01",),
+            ("beach", f"under:{namespace.DATA}/nowhere"),
         ):
             with self.subTest(arguments=arguments):
                 self.ctl("search", *arguments, code=2)
         self.ctl("search", "--share", "nope", "beach", code=1)
         self.ctl("search", "--under", "/nowhere", "beach", code=1)
+
+
+class UnindexedTest(IndexTest):
+    """A share that was added while no daemon ran: there is no index of it."""
+
+    def setUp(self):
+        super().setUp()
+        self.root = f"{namespace.DATA}/gamma"
+        os.makedirs(f"{self.root}/new")
+        self.ctl("share", "add", "gamma", self.root)
+        self.assertFalse(os.path.exists(f"{namespace.STATE}/shares/gamma/index"))
+
+    def test_it_holds_nothing_and_its_folders_are_known_by_the_disk(self):
+        for words in ("beach", "share:gamma beach", f"beach under:{self.root}",
+                      f"beach under:{self.root}/new"):
+            with self.subTest(words=words):
+                self.assertEqual(self.ctl("search", words).out, b"")
+
+    def test_a_folder_that_is_not_there_is_refused(self):
+        told = self.ctl("search", f"beach under:{self.root}/nwe", code=2).err.decode()
+        self.assertIn("know no such folder (character 7, at: under:", told)
+        self.assertEqual(told.count("\n"), 1)
 
 
 if __name__ == "__main__":

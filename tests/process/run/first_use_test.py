@@ -174,5 +174,78 @@ class ReadmeTest(RunTest):
         self.stop_all()
 
 
+class ReadmeSessionTest(RunTest):
+    """The session that README.md shows, on a folder of the same name."""
+
+    SHOWN = "/usr/share/doc"
+    BUILT = "$PWD/build/release/bin"  # those that are tested may lie elsewhere
+    folder = f"{namespace.DATA}/doc"
+
+    # What each prompt answers: the names of its hits, or its lines.
+    ANSWERS = {
+        "fileindexctl search --share doc --limit 3 text:devices": ["first.txt", "second.txt"],
+        "fileindexctl search --limit 2 byte-compiled modules": ["policy.html", "policy.txt"],
+        "fileindexctl search '\"free software\" ext:pdf'": ["libtasn1.pdf"],
+        f"touch {SHOWN}/holiday-plan.txt; fileindexctl search --wait name:holiday":
+            ["holiday-plan.txt"],
+        f"rm {SHOWN}/holiday-plan.txt": [],
+        "fileindexctl verify doc && echo the index agrees with the disk":
+            ["the index agrees with the disk"],
+    }
+
+    def prompts(self):
+        """Its commands, in order, without what is said about them."""
+        with open(f"{PROJECT}/README.md", encoding="utf-8") as file:
+            found = re.findall(r"(?m)^    [#$] (.*?)(?: {2,}# .*)?$", file.read())
+        self.assertEqual(found.pop(0), f"./run {self.SHOWN}")
+        return found
+
+    def make_folder(self):
+        for name in self.ANSWERS["fileindexctl search --share doc --limit 3 text:devices"]:
+            self.put(name, "what is said of devices: devices")
+        self.put("policy.html", "<p>modules should be byte-compiled</p>")
+        self.put("policy.txt", "byte-compiled are the modules")
+        self.put("modules.txt", "of modules, and of what is compiled")
+        self.put("libtasn1.pdf", pdf("This is free software", "and more"))
+        self.put("gpl.txt", "free software")
+        self.put("other.pdf", pdf("software, free of charge"))
+
+    def test_each_prompt_answers_what_it_is_for(self):
+        self.make_folder()
+        out = self.index()
+        self.assertRegex(out, rf"(?m)^{self.folder} is indexed as share \"doc\": 9 entries\.$")
+        prompts = self.prompts()
+        export = f"export PATH={self.BUILT}:$PATH"
+        self.assertEqual([prompt for prompt in prompts if prompt != export], list(self.ANSWERS))
+        prompts.remove(export)
+        export = export.replace(self.BUILT, os.environ["FILEINDEXD_BIN_DIR"])
+
+        for prompt in prompts:
+            command = f"{export}; {prompt}".replace(self.SHOWN, self.folder)
+            done = subprocess.run(["bash", "-c", command], cwd=PROJECT, env=environment(),
+                                  check=False, capture_output=True, timeout=LIMIT)
+            self.assertEqual((done.returncode, done.stderr), (0, b""), command)
+            lines = [line.removeprefix(f"{self.folder}/")
+                     for line in done.stdout.decode().splitlines()]
+            self.assertEqual(sorted(lines), self.ANSWERS[prompt], prompt)
+        self.stop_all()
+
+    def test_the_command_line_of_the_manual_of_questions_finds_what_it_says(self):
+        with open(f"{PROJECT}/QUERY.md", encoding="utf-8") as file:
+            commands = re.findall(r"`(fileindexctl search [^`]+)`", file.read())
+        self.assertEqual(commands, ["fileindexctl search 'size:>1G \"annual report\"'"])
+        for name, size in (("annual report.bin", 2 << 30), ("old annual report.bin", 1 << 30),
+                           ("report annual.bin", 2 << 30)):
+            os.truncate(self.put(name, ""), size)
+        self.index()
+
+        path = f"{os.environ['FILEINDEXD_BIN_DIR']}:{os.environ['PATH']}"
+        done = subprocess.run(["bash", "-c", commands[0]], env=environment(PATH=path), check=False,
+                              capture_output=True, timeout=LIMIT)
+        self.assertEqual((done.returncode, done.stderr), (0, b""))
+        self.assertEqual(done.stdout.decode(), f"{self.folder}/annual report.bin\n")
+        self.stop_all()
+
+
 if __name__ == "__main__":
     main()

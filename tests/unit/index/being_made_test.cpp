@@ -23,12 +23,14 @@ class BeingMadeTest : public IndexTest {
     WriteFile(At("a"), "text");
     AddAll();
     writer.reset();
-    std::filesystem::rename(IndexPath("s"), IndexPath("s") + ".away");
+    std::filesystem::rename(Database(), Database() + ".away");
   }
   void TearDown() override {
     while_asleep = nullptr;
     IndexTest::TearDown();
   }
+
+  static std::string Database() { return IndexPath("s") + "/entries.db"; }
 
   Statistics Ask() {
     Share share;
@@ -44,7 +46,7 @@ class BeingMadeTest : public IndexTest {
 };
 
 TEST_F(BeingMadeTest, ADatabaseThatComesAtOnceIsCounted) {
-  while_asleep = [] { std::filesystem::rename(IndexPath("s") + ".away", IndexPath("s")); };
+  while_asleep = [] { std::filesystem::rename(Database() + ".away", Database()); };
 
   const Statistics statistics = Ask();
 

@@ -10,6 +10,7 @@ namespace fileindexd {
 namespace {
 
 using Texts = std::vector<std::string>;
+using NamedFields = std::vector<std::pair<std::string, ContentField>>;
 
 // A range as questions write it, of whole numbers.
 struct Limits {
@@ -29,7 +30,10 @@ Limits RangeOf(Chance& chance, int64_t low, int64_t high, const std::string& uni
     case 1:
       return {">=" + text(low), low * unit, INT64_MAX};
     case 2:
-      return {"<" + text(high), INT64_MIN, high * unit - 1};
+      if (high > 0) {  // nothing is below 0, and to ask for it is refused
+        return {"<" + text(high), INT64_MIN, high * unit - 1};
+      }
+      [[fallthrough]];
     case 3:
       return {"<=" + text(high), INT64_MIN, high * unit};
     case 4:
@@ -139,7 +143,7 @@ PlainQuestion QuestionMaker::Time() {
     return seconds >= limits.lowest && seconds <= limits.highest;
   };
   constexpr int64_t SECOND = 1'000'000'000;
-  switch (chance.Below(3)) {
+  switch (chance.Below(4)) {
     case 0:
       return {"modified:" + limits.text, [=](const PlainFile& f) {
                 return f.entry.thing != Thing::DIRECTORY && holds(f.entry.mtime / SECOND);
@@ -147,21 +151,31 @@ PlainQuestion QuestionMaker::Time() {
     case 1:
       return {"added:" + limits.text,
               [=](const PlainFile& f) { return holds(f.entry.first_seen / SECOND); }};
-    default:
-      return {"taken:" + limits.text, [=](const PlainFile& f) {
-                const int64_t* taken = f.Number(ContentField::TAKEN);
-                return taken != nullptr && holds(*taken);
+    default: {
+      static const NamedFields FIELDS = {{"taken:", ContentField::TAKEN},
+                                         {"created:", ContentField::CREATED},
+                                         {"sent:", ContentField::SENT},
+                                         {"recorded:", ContentField::RECORDED}};
+      const auto& [name, field] = chance.Of(FIELDS);
+      return {name + limits.text, [field = field, holds](const PlainFile& f) {
+                const int64_t* time = f.Number(field);
+                return time != nullptr && holds(*time);
               }};
+    }
   }
 }
 
 PlainQuestion QuestionMaker::Number() {
-  const bool is_duration = chance.OneOf(2);
-  const ContentField field = is_duration ? ContentField::DURATION : ContentField::PAGES;
+  static const NamedFields FIELDS = {{"duration:", ContentField::DURATION},
+                                     {"pages:", ContentField::PAGES},
+                                     {"width:", ContentField::WIDTH},
+                                     {"height:", ContentField::HEIGHT}};
+  const auto& [name, field] = chance.Of(FIELDS);
+  const bool is_duration = field == ContentField::DURATION;
   const int64_t low = chance.Between(0, is_duration ? 200 : 20);
   const Limits limits = RangeOf(chance, low, low + chance.Between(0, 20), is_duration ? "s" : "",
                                 is_duration ? 1000 : 1);
-  return {(is_duration ? "duration:" : "pages:") + limits.text, [=](const PlainFile& f) {
+  return {name + limits.text, [field = field, limits](const PlainFile& f) {
             const int64_t* number = f.Number(field);
             return number != nullptr && *number >= limits.lowest && *number <= limits.highest;
           }};

@@ -89,7 +89,7 @@ PlainQuestion QuestionMaker::Words() {
     return found != file.texts.end() && HasRow(found->second, row, beginning);
   };
   const auto in_name = [=](const PlainFile& f) { return HasRow(f.PlainName(), row, beginning); };
-  switch (chance.Below(7)) {
+  switch (chance.Below(8)) {
     case 0:
       if (row.size() == 1) {  // several in quotes would be the whole name
         return {"name:" + text, in_name};
@@ -103,6 +103,9 @@ PlainQuestion QuestionMaker::Words() {
     case 3:
       return {"camera:" + text,
               [=](const PlainFile& f) { return in_field(f, ContentField::CAMERA); }};
+    case 4:
+      return {(chance.OneOf(2) ? "keyword:" : "tag:") + text,
+              [=](const PlainFile& f) { return in_field(f, ContentField::KEYWORDS); }};
     default:
       return {text, [=](const PlainFile& f) {
                 return in_name(f) || HasRow(f.text, row, beginning) ||

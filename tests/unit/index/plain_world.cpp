@@ -109,9 +109,12 @@ bool PlainWorld::Place(PlainFile& file, const std::string& folder, const Line& n
 void PlainWorld::Describe(PlainFile& file) {
   Entry& entry = file.entry;
   entry.inode = ++last_inode;
-  entry.birth_time = entry.ctime = YEAR_BEGIN * SECOND;
+  entry.birth_time = YEAR_BEGIN * SECOND;
+  entry.ctime = chance.Between(YEAR_BEGIN * SECOND, YEAR_END * SECOND);
   entry.first_seen = chance.Between(YEAR_BEGIN * SECOND, YEAR_END * SECOND);
   entry.owner = static_cast<uint32_t>(1000 + chance.Below(4));
+  entry.group = static_cast<uint32_t>(chance.Below(1 << 16));
+  entry.mode = static_cast<uint32_t>(chance.Below(1 << 12));
   if (entry.thing == Thing::DIRECTORY) {
     return;
   }
@@ -192,8 +195,8 @@ void PlainWorld::MakeContent(PlainFile& file) {
   content.text = text.spelt;
   file.text = text.plain;
   for (const ContentField field :
-       {ContentField::TITLE, ContentField::AUTHOR, ContentField::CAMERA}) {
-    const Line line = Words(2, " ");
+       {ContentField::TITLE, ContentField::AUTHOR, ContentField::KEYWORDS, ContentField::CAMERA}) {
+    const Line line = Words(2, field == ContentField::KEYWORDS ? "," : " ");
     if (chance.OneOf(3) && !line.plain.empty()) {
       content.texts.push_back({field, line.spelt});
       file.texts[field] = line.plain;
@@ -206,8 +209,16 @@ void PlainWorld::MakeContent(PlainFile& file) {
     number(ContentField::PAGES, 1, 20);
     number(ContentField::DURATION, 0, 200'000);
   }
+  for (const ContentField field :
+       {ContentField::CREATED, ContentField::SENT, ContentField::RECORDED}) {
+    if (chance.OneOf(4)) {
+      number(field, YEAR_BEGIN, YEAR_END);
+    }
+  }
   if (chance.OneOf(3)) {
     number(ContentField::TAKEN, YEAR_BEGIN, YEAR_END);
+    number(ContentField::WIDTH, 1, 40);
+    number(ContentField::HEIGHT, 1, 40);
     number(ContentField::LATITUDE, 520'000'000, 530'000'000);
     number(ContentField::LONGITUDE, 130'000'000, 140'000'000);
   }

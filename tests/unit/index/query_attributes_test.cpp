@@ -95,6 +95,78 @@ TEST_F(QueryAttributesTest, NumbersOfContentsAreRanges) {
   EXPECT_EQ(Sorted("has:content"), Names({"a.mp3", "b.mp3", "c.jpg", "d.txt"}));
 }
 
+TEST_F(QueryAttributesTest, PicturesAreAsWideAndAsHighAsTheirNumbersSay) {
+  Store({{"wide.jpg",
+          Numbered({{ContentField::WIDTH, 4000}, {ContentField::HEIGHT, 3000}}, Kind::PHOTO)},
+         {"high.jpg",
+          Numbered({{ContentField::WIDTH, 3000}, {ContentField::HEIGHT, 4000}}, Kind::PHOTO)},
+         {"film.mkv",
+          Numbered({{ContentField::WIDTH, 3840}, {ContentField::HEIGHT, 2160}}, Kind::VIDEO)},
+         {"song.mp3", Numbered({{ContentField::DURATION, 3000}}, Kind::AUDIO)}});
+
+  EXPECT_EQ(Sorted("height:3000"), Names({"wide.jpg"}));
+  EXPECT_EQ(Sorted("height:>3000"), Names({"high.jpg"}));
+  EXPECT_EQ(Sorted("height:>=3000"), Names({"high.jpg", "wide.jpg"}));
+  EXPECT_EQ(Sorted("height:<3000"), Names({"film.mkv"}));
+  EXPECT_EQ(Sorted("height:2160..3000"), Names({"film.mkv", "wide.jpg"}));
+  EXPECT_EQ(Sorted("width:3000"), Names({"high.jpg"}));
+  EXPECT_EQ(Sorted("width:<=3840"), Names({"film.mkv", "high.jpg"}));
+  EXPECT_EQ(Sorted("width:>=3840 height:<3000"), Names({"film.mkv"}));
+  EXPECT_EQ(Sorted("width:>=0"), Names({"film.mkv", "high.jpg", "wide.jpg"}))
+      << "what has none is not 0";
+  EXPECT_EQ(Sorted("has:height -kind:video"), Names({"high.jpg", "wide.jpg"}));
+}
+
+// Each is stored in seconds, and its days are those of the local time zone.
+TEST_F(QueryAttributesTest, DocumentsMailsAndFilmsHaveTheirOwnTimes) {
+  setenv("TZ", "CET-1", 1);
+  tzset();
+  constexpr int64_t MIDNIGHT = 1'704'409'200;  // where 2024-01-05 begins there
+  const std::vector<std::pair<std::string, ContentField>> times = {
+      {"created", ContentField::CREATED},
+      {"sent", ContentField::SENT},
+      {"recorded", ContentField::RECORDED}};
+  for (const auto& [name, field] : times) {
+    Store({{name + " before", Numbered({{field, MIDNIGHT - 1}})},
+           {name + " first", Numbered({{field, MIDNIGHT}})},
+           {name + " last", Numbered({{field, MIDNIGHT + 86399}})},
+           {name + " after", Numbered({{field, MIDNIGHT + 86400}})}});
+  }
+  for (const auto& [name, field] : times) {
+    const std::string after = name + " after";
+    const std::string before = name + " before";
+    const std::string first = name + " first";
+    const std::string last = name + " last";
+    EXPECT_EQ(Sorted(name + ":2024-01-05"), Names({first, last}));
+    EXPECT_EQ(Sorted(name + ":<2024-01-05"), Names({before}));
+    EXPECT_EQ(Sorted(name + ":<=2024-01-05"), Names({before, first, last}));
+    EXPECT_EQ(Sorted(name + ":>2024-01-05"), Names({after}));
+    EXPECT_EQ(Sorted(name + ":>=2024-01-05"), Names({after, first, last}));
+    EXPECT_EQ(Sorted(name + ":2024-01-04..2024-01-05"), Names({before, first, last}));
+    EXPECT_EQ(Sorted(name + ":2024-01-05T00:00"), Names({first}));
+    EXPECT_EQ(Sorted(name + ":2023"), Names());
+    EXPECT_EQ(Sorted("has:" + name), Names({after, before, first, last}));
+  }
+  setenv("TZ", "UTC", 1);
+  tzset();
+}
+
+TEST_F(QueryAttributesTest, KeywordsAreWordsOfTheirOwnField) {
+  Store({{"paper.pdf", Tagged(ContentField::KEYWORDS, "old ships, sea")},
+         {"photo.jpg", Tagged(ContentField::KEYWORDS, "Sea, beach")},
+         {"sea.txt", TextContent("a keyword of the sea")},
+         {"title.pdf", Tagged(ContentField::TITLE, "sea")}});
+
+  for (const std::string name : {"keyword", "keywords", "tag", "TAG"}) {
+    EXPECT_EQ(Sorted(name + ":sea"), Names({"paper.pdf", "photo.jpg"}));
+    EXPECT_EQ(Sorted(name + ":\"old ships\""), Names({"paper.pdf"}));
+    EXPECT_EQ(Sorted(name + ":ship"), Names({"paper.pdf"})) << "another form of the word";
+    EXPECT_EQ(Sorted(name + ":bea*"), Names({"photo.jpg"}));
+    EXPECT_EQ(Sorted(name + ":sea -" + name + ":beach"), Names({"paper.pdf"}));
+    EXPECT_EQ(Sorted("has:" + name), Names({"paper.pdf", "photo.jpg"}));
+  }
+}
+
 TEST_F(QueryAttributesTest, NearIsACircleOnTheGlobe) {
   const auto at = [](double latitude, double longitude) {
     return Numbered({{ContentField::LATITUDE, static_cast<int64_t>(latitude * 1e7)},

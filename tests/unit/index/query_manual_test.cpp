@@ -210,8 +210,11 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
 
 TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
   for (const char* text : {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "size>1G",
-                           "size: 1G", "share:data", "under:/srv/data/projects"}) {
-    EXPECT_TRUE(Hits(text)[0].starts_with("error: ")) << text;
+                           "size: 1G", "share:data", "under:/srv/data/projects", "size:<0",
+                           "rating:>5", "modified:2024-06..2024-01", "near:52.5,13.4,0"}) {
+    const Names hits = Hits(text);
+    ASSERT_EQ(hits.size(), 1U) << text;
+    EXPECT_TRUE(hits[0].starts_with("error: ")) << text;
   }
   EXPECT_EQ(Hits("Kind:DOCUMENT -draft"), Names());
   for (const char* text : {"12:30", "http://example.org", "fs::path", "\"sise:1G\""}) {

@@ -118,7 +118,7 @@ TEST_F(QueryParseTest, NumbersSizesAndDurations) {
       {"bitrate:>=128K", "bitrate[128000..]"},
       {"year:1990..1999", "year[1990..1999]"},
       {"rating:5", "rating[5..5]"},
-      {"track:-1", "track[-1..-1]"},
+      {"track:-1..2", "track[-1..2]"},
   });
 }
 

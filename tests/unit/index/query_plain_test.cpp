@@ -6,7 +6,9 @@
 #include <algorithm>
 #include <cstdlib>
 #include <iterator>
+#include <map>
 
+#include "index/contents_reader.h"
 #include "index/reader.h"
 #include "index/search.h"
 #include "tests/unit/index/plain_questions.h"
@@ -34,6 +36,49 @@ std::string Few(const Paths& first, const Paths& second) {
     text += "\n    " + others[i];
   }
   return text;
+}
+
+// All that was made up, but for numbers that the tables give.
+std::string TextOf(const Entry& entry) {
+  std::string text = entry.path;
+  for (const int64_t number :
+       {static_cast<int64_t>(entry.thing), static_cast<int64_t>(entry.kind),
+        int64_t{entry.content_wanted}, static_cast<int64_t>(entry.inode), entry.size, entry.mtime,
+        entry.ctime, entry.birth_time, entry.first_seen, int64_t{entry.owner}, int64_t{entry.group},
+        int64_t{entry.mode}}) {
+    text += " " + std::to_string(number);
+  }
+  return text;
+}
+
+std::string TextOf(const StoredContent& stored) {
+  const Content& content = stored.content;
+  std::map<int, std::string> fields;
+  for (const TextField& field : content.texts) {
+    fields[static_cast<int>(field.field)] += field.text;
+  }
+  for (const NumberField& field : content.numbers) {
+    fields[static_cast<int>(field.field)] += std::to_string(field.number);
+  }
+  std::string text = ", " + stored.state + " " + stored.reason + " " +
+                     std::to_string(static_cast<int>(content.kind)) + " " +
+                     std::to_string(content.sample) + " " +
+                     (stored.state == "waiting" ? "" : stored.language);
+  for (const auto& [field, value] : fields) {
+    text += ", " + std::to_string(field) + ": " + value;
+  }
+  return text + ", " + content.text;
+}
+
+StoredContent StoredOf(const PlainFile& file) {
+  StoredContent stored;
+  if (file.WasRead()) {
+    stored.state = file.stage == PlainStage::DONE ? "done" : "failed";
+    stored.reason = file.stage == PlainStage::DONE ? "" : "broken";
+    stored.content = file.content;
+    stored.language = "english";
+  }
+  return stored;
 }
 
 class QueryPlainTest : public testing::Test {
@@ -135,14 +180,27 @@ class QueryPlainTest : public testing::Test {
 TEST_F(QueryPlainTest, TheIndexHoldsTheWorld) {
   Make(4'000);
   for (const std::string& share : world->shares) {
-    EntryReader reader;
+    ContentsReader reader;
     ASSERT_EQ(reader.Open(share), IndexError::NONE);
+    EntryReader entries;
+    ASSERT_EQ(entries.Open(share), IndexError::NONE);
     Paths held;
-    ASSERT_TRUE(reader.ForEach("/world/" + share, [&](const Entry& entry) {
-      held.push_back(entry.path);
+    ASSERT_TRUE(entries.ForEach("/world/" + share, [&](const Entry& entry) {
+      StoredContent stored;
+      EXPECT_EQ(reader.Find(entry, stored), IndexError::NONE) << entry.path;
+      held.push_back(TextOf(entry) + TextOf(stored));
       return true;
     }));
-    EXPECT_EQ(held, Expected([&](const PlainFile& file) { return file.share == share; }));
+    std::sort(held.begin(), held.end());
+    Paths made;
+    for (const PlainFile& file : world->files) {
+      if (file.share == share) {
+        made.push_back(TextOf(file.entry) + TextOf(StoredOf(file)));
+      }
+    }
+    std::sort(made.begin(), made.end());
+    ASSERT_TRUE(held == made) << "too much: " << Few(held, made)
+                              << "\nmissing: " << Few(made, held);
   }
 }
 

@@ -141,6 +141,27 @@ TEST_F(QueryRankingTest, TheVeryThingComesFirst) {
   }
 }
 
+TEST_F(QueryRankingTest, YoungerContentsStandAboveOlderOnesThatSayTheSame) {
+  constexpr time_t DAY = 86400;
+  const time_t now = time(nullptr);
+  // Neither in the order of their names nor in that in which they are read.
+  const std::vector<std::pair<std::string, time_t>> ages = {
+      {"b", 400 * DAY}, {"e", 2 * DAY}, {"a", 3000 * DAY}, {"d", 30 * DAY}, {"c", 4000 * DAY}};
+  for (const auto& [name, age] : ages) {
+    OldFile(name, now - age);
+  }
+  TakeIn();
+  Jobs();
+  for (const auto& [name, age] : ages) {
+    Finish(name, "a walrus once");
+  }
+
+  const Names order = {"e", "d", "b", "a", "c"};
+  for (const char* text : {"walrus", "text:walrus", "walr*", "walrus OR nothing", "walrus once"}) {
+    EXPECT_EQ(Hits(text), order) << text;
+  }
+}
+
 class QueryManyTextsTest : public QuestionTest {
  protected:
   // More than are looked at closely.
@@ -201,6 +222,27 @@ TEST_F(QueryManyTextsTest, TitlesStandAboveWhatIsSaidOftenHoweverManySayIt) {
   for (const char* text : {"whale", "whal*", "whale OR none"}) {
     const Names hits = Hits(text);
     EXPECT_EQ(Names(hits.begin(), hits.begin() + 2), Names({"f0", "f1"})) << text;
+  }
+}
+
+TEST_F(QueryManyTextsTest, TheYoungestOfManyThatSayTheSameComeFirst) {
+  constexpr time_t DAY = 86400;
+  constexpr int FILES = 350;
+  const time_t now = time(nullptr);
+  for (int i = 0; i < FILES; ++i) {
+    OldFile("f" + std::to_string(i), now - (i * 101 % FILES) * 10 * DAY);
+  }
+  TakeIn();
+  Jobs(FILES);
+  for (const auto& [name, job] : handed) {
+    EXPECT_TRUE(contents->Finish(job.file, TextContent("one walrus")));
+  }
+  EXPECT_TRUE(contents->Commit());
+
+  const Names hits = Hits("walrus");
+  ASSERT_EQ(hits.size(), 20U);
+  for (int i = 0; i < 20; ++i) {
+    EXPECT_EQ(std::stoi(hits[static_cast<size_t>(i)].substr(1)) * 101 % FILES, i);
   }
 }
 

@@ -149,6 +149,72 @@ TEST_F(QueryRefusedTest, SenselessQuestionsSayWhere) {
   });
 }
 
+TEST_F(QueryRefusedTest, RangesThatNothingCanLieInAreRefused) {
+  ExpectAll({
+      {"size:<0", "?5"},
+      {"a size:<0 b", "?7"},
+      {"-size:<0 a", "?6"},
+      {"size:<0K", "?5"},
+      {"size:5M..1M", "?5"},
+      {"size:1..0", "?5"},
+      {"duration:<0", "?9"},
+      {"duration:<0m", "?9"},
+      {"duration:5m..3m", "?9"},
+      {"bitrate:<0", "?8"},
+      {"rating:>5", "?7"},
+      {"rating:>=6", "?7"},
+      {"rating:6", "?7"},
+      {"rating:6..", "?7"},
+      {"rating:7..9", "?7"},
+      {"rating:<0", "?7"},
+      {"rating:-1", "?7"},
+      {"height:<0", "?7"},
+      {"height:<-3", "?7"},
+      {"height:..-1", "?7"},
+      {"width:<=-1", "?6"},
+      {"width:-3..-1", "?6"},
+      {"year:<0", "?5"},
+      {"year:2000..1990", "?5"},
+      {"year:>9223372036854775807", "?5"},
+      {"pages:<0", "?6"},
+      {"track:-1", "?6"},
+      {"near:0,0,0", "?5"},
+      {"near:0,0,0m", "?5"},
+      {"near:0,0,0.0km", "?5"},
+      {"near:0,0,-0", "?5"},
+      {"near:90.1,0,1km", "?5"},
+      {"near:-91,0,1km", "?5"},
+      {"near:0,-181,1km", "?5"},
+      {"modified:2024-06..2024-01", "?9"},
+      {"modified:now..-7d", "?9"},
+      {"modified:-1d..-7d", "?9"},
+      {"modified:today..yesterday", "?9"},
+      {"created:2024..2023", "?8"},
+      {"taken:2024-01-05..2024-01-04", "?6"},
+  });
+}
+
+TEST_F(QueryRefusedTest, RangesThatOnlyTheLeastOrTheGreatestLiesInAreNot) {
+  ExpectAll({
+      {"size:<1", "size[..0]"},
+      {"size:<=0", "size[..0]"},
+      {"size:0", "size[0..0]"},
+      {"duration:<=0", "duration[..0]"},
+      {"rating:>4", "rating[5..]"},
+      {"rating:5", "rating[5..5]"},
+      {"rating:>=5", "rating[5..]"},
+      {"rating:<=9", "rating[..9]"},
+      {"rating:3..9", "rating[3..9]"},
+      {"rating:<1", "rating[..0]"},
+      {"pages:>-1", "pages[0..]"},
+      {"width:-3..0", "width[-3..0]"},
+      {"year:1994..1994", "year[1994..1994]"},
+      {"near:0,0,1", "near:0.000000,0.000000,1.000000"},
+      {"near:90,180,0.5m", "near:90.000000,180.000000,0.500000"},
+      {"modified:<1970", "modified[..-1]"},
+  });
+}
+
 TEST_F(QueryRefusedTest, StarsThatWouldFindNothingAreRefused) {
   ExpectAll({
       {"inv*ce", "?3"},
@@ -273,6 +339,14 @@ TEST_F(QueryRefusedTest, ErrorsAreLinesForPeople) {
       {"foo:>3",
        "there is no field 'foo' (a word with a colon stands in quotes) (character 1, at: foo:>3)"},
       {"", "nothing to search for"},
+      {"a size:<0", "no such number is below 0 (character 8, at: <0)"},
+      {"rating:>5", "a rating goes from 0 to 5 (character 8, at: >5)"},
+      {"pages:>9223372036854775807",
+       "no number is greater than that (character 7, at: >9223372036854775807)"},
+      {"size:5M..1M", "the range ends before it begins (character 6, at: 5M..1M)"},
+      {"near:1,2,0",
+       "latitude goes from -90 to 90, longitude from -180 to 180, and a radius is above 0 "
+       "(character 6, at: 1,2,0)"},
   };
   for (const Case& one : cases) {
     QueryNode query;

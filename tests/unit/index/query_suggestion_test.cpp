@@ -44,6 +44,30 @@ TEST_F(QuerySuggestionTest, SuggestionsAreThoseOfTheLettersWithoutAccents) {
   EXPECT_EQ(Sorted("uberweisung"), Names({"\u00dcberweisung.txt"}));
 }
 
+TEST_F(QuerySuggestionTest, WordsThatLookLikeFieldsAreToldWhereNothingIsFound) {
+  Store({{"holiday type:pdf.txt", TextContent("x")}});
+  const std::map<std::string, std::string> told = {
+      {"type:doc", "type:doc"},
+      {"nothing (type:doc OR colour:red)", "type:doc"},
+      {"nothing OR colour:red", "colour:red"},
+      {"holidya type:pdf", ""},  // a suggestion says more
+      {"type:pdf", ""},          // is found
+      {"nothing", ""},
+      {"nothing -type:doc", ""},
+      {"\"type:doc\"", ""},
+      {"name:type:doc", ""},
+      {"fs::path", ""},
+      {"http://x", ""},
+      {"x:y", ""},
+      {"12:30", ""},
+      {"type: nothing", ""},
+  };
+  for (const auto& [text, word] : told) {
+    (void)Hits(text);
+    EXPECT_EQ(answer.word_like_field, word) << text;
+  }
+}
+
 TEST_F(QuerySuggestionTest, DistanceCountsSlips) {
   EXPECT_EQ(EditDistance("abc", "abc", 2), 0);
   EXPECT_EQ(EditDistance("abc", "acb", 2), 1);

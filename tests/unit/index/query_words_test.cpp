@@ -218,19 +218,4 @@ TEST_F(QueryWordsTest, StarsInQuotesSayNothing) {
   EXPECT_EQ(Marked("name:reports \"rep*\" OR name:reports"), "reports");
 }
 
-TEST_F(QueryWordsTest, FoldersThatNoShareKnowsAreRefused) {
-  Store({{"whale.txt", TextContent("x")}});
-
-  EXPECT_EQ(Hits("whale under:/no/such"),
-            Names({"error: the shares that are asked know no such folder (character 7, at: "
-                   "under:/no/such)"}));
-  EXPECT_EQ(Hits("under:" + root + "/whale.tx")[0].substr(0, 6), "error:");
-  EXPECT_EQ(Hits("whale under:" + root), Names({"whale.txt"}));
-  EXPECT_EQ(Hits("none under:" + root), Names());
-  EXPECT_EQ(Hits("whale -under:/no/such"), Names({"whale.txt"}));
-  EXPECT_EQ(Hits("whale OR under:/no/such"), Names({"whale.txt"}));
-  question.under = "/no/such";
-  EXPECT_EQ(Hits("whale"), Names()) << "an option is its caller's matter";
-}
-
 }  // namespace fileindexd

@@ -3,6 +3,9 @@
 
 #include <algorithm>
 
+#include "index/entry_table.h"
+#include "state/layout.h"
+
 namespace fileindexd {
 
 void QuestionTest::Store(const std::map<std::string, Content>& files) {
@@ -35,17 +38,48 @@ void QuestionTest::Empty(const Names& names) {
   Commit();
 }
 
-Names QuestionTest::Hits(const std::string& text) {
+bool QuestionTest::TryToFill(const std::string& share, const Names& names) {
+  std::string error;
+  IndexDatabase database;
+  EntryTable table;
+  bool done = MakeShareFolder(share, error) &&
+              database.OpenForWriting(IndexPath(share), true) == IndexError::NONE &&
+              table.Prepare(database.db) == SQLITE_OK && table.Begin() == SQLITE_OK;
+  for (size_t i = 0; i < names.size() && done; ++i) {
+    Entry entry;
+    entry.path = "/" + share + "/" + names[i];
+    entry.thing = Thing::FILE;
+    done = table.Insert(entry) == SQLITE_OK;
+  }
+  return done && table.Commit(1) == SQLITE_OK;
+}
+
+void QuestionTest::Fill(const std::string& share, const Names& names) {
+  ASSERT_TRUE(TryToFill(share, names));
+}
+
+Names QuestionTest::Paths(const std::string& text) {
   question.text = text;
-  question.shares = {"s"};
   std::string error;
   if (!Ask(question, answer, error)) {
     return {"error: " + error};
   }
-  EXPECT_EQ(answer.failures, Names()) << text;
-  Names names;
+  Names paths;
   for (const Hit& hit : answer.hits) {
-    names.push_back(hit.entry.path == root ? "" : hit.entry.path.substr(root.size() + 1));
+    paths.push_back(hit.entry.path);
+  }
+  return paths;
+}
+
+Names QuestionTest::Hits(const std::string& text) {
+  question.shares = {"s"};
+  answer.failures.clear();
+  Names names = Paths(text);
+  EXPECT_EQ(answer.failures, Names()) << text;
+  for (std::string& name : names) {
+    if (Covers(root, name)) {
+      name.erase(0, name == root ? root.size() : root.size() + 1);
+    }
   }
   return names;
 }

@@ -18,6 +18,12 @@ class QuestionTest : public ContentsTest {
   void StoreOne(const std::string& name, const Content& content, const std::string& bytes);
   void Empty(const Names& names);  // added, nothing read
 
+  // Rows without files, in a share of their own.
+  static bool TryToFill(const std::string& share, const Names& names);
+  static void Fill(const std::string& share, const Names& names);
+
+  // Whole paths of the hits of the question's shares, in order; "error: " as below.
+  Names Paths(const std::string& text);
   // Relative paths of the hits, in order; "error: " and the reason when it was refused.
   Names Hits(const std::string& text);
   Names Sorted(const std::string& text);  // the same, by name

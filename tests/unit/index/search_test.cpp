@@ -4,6 +4,9 @@
 #include <sys/stat.h>
 #include <sys/time.h>
 
+#include <filesystem>
+
+#include "state/layout.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -172,6 +175,7 @@ TEST_F(SearchTest, LimitAndOffsetCutTheSameOrder) {
 TEST_F(SearchTest, ShareThatCannotBeAskedIsNamed) {
   Files({"a.txt"});
   question.text = "a";
+  std::filesystem::create_directories(IndexPath("none"));
   question.shares = {"s", "none", "s"};
   std::string error;
 

@@ -4,6 +4,7 @@
 #include <gmock/gmock.h>
 
 #include <algorithm>
+#include <filesystem>
 #include <map>
 #include <random>
 #include <set>
@@ -276,6 +277,7 @@ TEST_F(StatisticsTest, AShareThatCannotBeReadIsNamedAndTheOthersCounted) {
   wish.totals = true;
   Share broken = wish.shares[0];
   broken.name = "none";
+  std::filesystem::create_directories(IndexPath("none"));
   wish.shares.insert(wish.shares.begin(), broken);
 
   Statistics statistics;

@@ -1,0 +1,123 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Shares that have no index yet, and folders that questions name.
+#include <sys/stat.h>
+
+#include <filesystem>
+
+#include "index/statistics.h"
+#include "state/layout.h"
+#include "tests/unit/index/question_fixture.h"
+
+namespace fileindexd {
+
+class QueryPlacesTest : public QuestionTest {
+ protected:
+  void SetUp() override {
+    QuestionTest::SetUp();
+    fresh = folder + "/fresh";
+    MakeFolder(fresh);
+    MakeFolder(fresh + "/new");
+    WriteFile(fresh + "/new/whale.txt", "");
+    question.roots = {{"s", root}, {"fresh", fresh}};
+  }
+
+  Names PathsIn(const Names& shares, const std::string& text) {
+    question.shares = shares;
+    return Paths(text);
+  }
+
+  std::string fresh;  // folder of a share that was never indexed
+};
+
+TEST_F(QueryPlacesTest, ShareWithoutAnIndexYetHoldsNothingToFind) {
+  Store({{"whale.txt", TextContent("x")}});
+
+  EXPECT_EQ(PathsIn({"fresh"}, "whale"), Names());
+  EXPECT_EQ(answer.failures, Names());
+  EXPECT_EQ(PathsIn({"s", "fresh"}, "whale"), Names({At("whale.txt")}));
+  EXPECT_EQ(answer.failures, Names());
+  std::string error;
+  ASSERT_TRUE(MakeShareFolder("fresh", error)) << error;
+  EXPECT_EQ(PathsIn({"fresh", "s"}, "whale"), Names({At("whale.txt")}))
+      << "its queue is there alone";
+  EXPECT_EQ(answer.failures, Names());
+}
+
+TEST_F(QueryPlacesTest, IndexFolderWithoutItsDatabaseIsNamed) {
+  std::string error;
+  ASSERT_TRUE(MakeShareFolder("fresh", error)) << error;
+  MakeFolder(IndexPath("fresh"));
+
+  EXPECT_EQ(PathsIn({"fresh"}, "whale"), Names());
+  ASSERT_EQ(answer.failures.size(), 1U);
+  EXPECT_TRUE(answer.failures[0].starts_with("share fresh: ")) << answer.failures[0];
+}
+
+TEST_F(QueryPlacesTest, StatisticsCountNothingOfAShareWithoutAnIndexYet) {
+  AddAll();
+  StatisticsWish wish;
+  wish.totals = wish.duplicates = true;
+  for (const auto& [name, path] : question.roots) {
+    wish.shares.push_back({name, path, ""});
+  }
+
+  Statistics statistics;
+  Gather(wish, statistics);
+  EXPECT_EQ(statistics.failures, Names());
+  ASSERT_EQ(statistics.totals.size(), 1U);
+  EXPECT_EQ(statistics.totals[0].share, "s");
+}
+
+TEST_F(QueryPlacesTest, FoldersThatNoShareKnowsAreRefused) {
+  Store({{"whale.txt", TextContent("x")}});
+
+  EXPECT_EQ(Hits("whale under:/no/such"),
+            Names({"error: the shares that are asked know no such folder (character 7, at: "
+                   "under:/no/such)"}));
+  EXPECT_EQ(Hits("under:" + root + "/whale.tx")[0].substr(0, 6), "error:");
+  EXPECT_EQ(Hits("whale under:" + root), Names({"whale.txt"}));
+  EXPECT_EQ(Hits("none under:" + root), Names());
+  EXPECT_EQ(Hits("whale -under:/no/such"), Names({"whale.txt"}));
+  EXPECT_EQ(Hits("whale OR under:/no/such"), Names({"whale.txt"}));
+  question.under = "/no/such";
+  EXPECT_EQ(Hits("whale"), Names()) << "an option is its caller's matter";
+}
+
+// What a share will hold that was never indexed is known by the disk alone.
+TEST_F(QueryPlacesTest, FoldersOfAShareWithoutAnIndexYetAreKnownByTheDisk) {
+  const auto is_refused = [this](const Names& shares, const std::string& path) {
+    const Names hits = PathsIn(shares, "whale under:" + path);
+    EXPECT_LE(hits.size(), 1U) << path;
+    return !hits.empty();
+  };
+  const struct {
+    std::string path;
+    bool is_refused;
+  } cases[] = {
+      {fresh, false},
+      {fresh + "/new", false},
+      {folder, false},
+      {fresh + "/nwe", true},
+      {fresh + "/new/nothing", true},
+      {fresh + "/new/whale.txt", true},
+      {fresh + "x", true},
+      {"/proc", true},
+      {"/no/such", true},
+  };
+  for (const auto& one : cases) {
+    EXPECT_EQ(is_refused({"fresh"}, one.path), one.is_refused) << one.path;
+    EXPECT_EQ(is_refused({"fresh", "s"}, one.path), one.is_refused) << one.path;
+  }
+  EXPECT_TRUE(is_refused({"s"}, fresh + "/new")) << "that share is not asked";
+  EXPECT_FALSE(is_refused({}, "/no/such")) << "where nobody is asked, nobody can tell";
+}
+
+TEST_F(QueryPlacesTest, FolderOfAnEmptyShareIsKnown) {
+  AddAll();
+
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + root), Names());
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + folder), Names());
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + root + "/none")[0].substr(0, 6), "error:");
+}
+
+}  // namespace fileindexd
