@@ -176,6 +176,14 @@ class MachineTest(unittest.TestCase):
             with contextlib.suppress(OSError):  # taken meanwhile
                 os.close(os.open(path, os.O_WRONLY | os.O_APPEND | os.O_NONBLOCK))
 
+    def await_held(self):
+        """Until the log is held, see SystemLog.hold_at. Queues are touched as above."""
+        for _ in range(int(LIMIT / NUDGE_SECONDS)):
+            if self.log.await_held(NUDGE_SECONDS):
+                return
+            self._touch_queues()
+        self.fail(f"the log was not held within {LIMIT} s")
+
     def await_lines(self, wanted, after=0):
         """All of them, in this order, whatever lies between."""
         for text in wanted:
