@@ -11,6 +11,7 @@ import re
 import signal
 import subprocess
 import sys
+import time
 import unittest
 
 from harness import control, namespace
@@ -142,6 +143,19 @@ class MachineTest(unittest.TestCase):
         found = [pid for pid, name in children().items() if name == "fileindexd"]
         self.assertEqual(len(found), 1, children())
         return found[0]
+
+    def descriptors(self, pid):
+        return len(os.listdir(f"/proc/{pid}/fd"))
+
+    def await_alone(self, pid):
+        """Until the process has no thread but its first.
+
+        One that was joined is listed a moment longer, and nothing tells of the end of that.
+        """
+        deadline = time.monotonic() + LIMIT
+        while len(threads := os.listdir(f"/proc/{pid}/task")) > 1:
+            self.assertLess(time.monotonic(), deadline, threads)
+            os.sched_yield()
 
     def await_exit(self, pid):
         status = await_exit(pid)
