@@ -110,8 +110,7 @@ std::chrono::steady_clock::time_point ExtractPool::Due() const {
   return due;
 }
 
-std::vector<ExtractOutcome> ExtractPool::Work() {
-  const auto now = std::chrono::steady_clock::now();
+std::vector<ExtractOutcome> ExtractPool::Work(std::chrono::steady_clock::time_point now) {
   for (const std::unique_ptr<Slot>& slot : impl->slots) {
     if (auto outcome = slot->Work(now)) {
       impl->outcomes.push_back(std::move(*outcome));

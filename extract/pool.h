@@ -67,7 +67,8 @@ class ExtractPool {
   void AddPolled(std::vector<pollfd>& polled) const;
   // When Work wants to be called even though nothing is ready; max() without running jobs.
   std::chrono::steady_clock::time_point Due() const;
-  std::vector<ExtractOutcome> Work();
+  std::vector<ExtractOutcome> Work(
+      std::chrono::steady_clock::time_point now = std::chrono::steady_clock::now());
 
   // Kills the helpers; running jobs end without outcome. For pauses.
   void Abort();

@@ -30,10 +30,13 @@ class KilledTest(IndexTest):
             for name in sorted(os.listdir(path)):
                 yield {"event": code, "path": f"{path}/{name}"}
 
-    def kill_after(self, pid, pattern, after, count):
-        """Kills the daemon once that many operations are done, and finds it in the middle."""
-        self.await_line(pattern, after, count)
-        self.kill(pid)
+    def kill_after(self, pattern, count, work):
+        """Kills the daemon once that many operations of the work are done, in the middle of it."""
+        self.log.hold_at(pattern, count)
+        work()
+        self.await_held()
+        self.kill(self.daemon_pid())
+        self.log.go_on()
         self.assertTrue(os.path.exists(self.queue("alpha") + ".tmp"), "the drain was over")
 
     def check_restart(self, root):
@@ -42,28 +45,26 @@ class KilledTest(IndexTest):
         self.assert_index(root)
 
     def test_in_the_middle_of_a_drain(self):
-        for count in (1, 300, 1200):
+        for count in (1, 300, 900):
             with self.subTest(count=count):
                 top = f"top{count}"
                 root = self.make_share() if count == 1 else root
-                pid = self.start() if count == 1 else self.daemon_pid()
+                if count == 1:
+                    self.start()
                 self.await_drained("alpha")
                 self.make_tree(root, top)
                 self.make_files(root, f"{top}/")
                 events = [{"event": CREATE, "path": f"{root}/{top}"}]
                 events += self.events(root, top, CREATE)
-                after = self.log.mark()
 
-                self.append("alpha", *events)
-                self.await_taken("alpha")
-                self.kill_after(pid, ADDED, after, count)
+                self.kill_after(ADDED, count, lambda: self.append("alpha", *events))
 
                 self.check_restart(root)
 
     def test_in_the_middle_of_deletions(self):
         root = self.make_share()
         self.make_tree(root, "top")
-        pid = self.start()
+        self.start()
         self.await_drained("alpha")
         self.append("alpha", {"event": REINDEX, "path": root})
         self.await_taken("alpha")
@@ -71,11 +72,8 @@ class KilledTest(IndexTest):
         events = list(self.events(root, "top", DELETE))
         for folder in os.listdir(f"{root}/top"):
             shutil.rmtree(f"{root}/top/{folder}")
-        after = self.log.mark()
 
-        self.append("alpha", *events)
-        self.await_taken("alpha")
-        self.kill_after(pid, DELETED, after, 200)
+        self.kill_after(DELETED, 200, lambda: self.append("alpha", *events))
 
         self.check_restart(root)
 
@@ -84,13 +82,11 @@ class KilledTest(IndexTest):
         self.make_tree(root, "top")
         for count in (1, 700):
             with self.subTest(count=count):
-                pid = self.start()
+                self.start()
                 self.await_drained("alpha")
-                after = self.log.mark()
+                event = {"event": REINDEX, "path": root}
 
-                self.append("alpha", {"event": REINDEX, "path": root})
-                self.await_taken("alpha")
-                self.kill_after(pid, ADDED, after, count)
+                self.kill_after(ADDED, count, lambda: self.append("alpha", event))
 
                 self.check_restart(root)
                 self.stop(self.daemon_pid())
@@ -98,17 +94,15 @@ class KilledTest(IndexTest):
     def test_at_the_first_index_of_all(self):
         root = self.make_share()
         self.make_tree(root, "top")
-        pid = self.start()
 
-        self.kill_after(pid, ADDED, 0, 100)
+        self.kill_after(ADDED, 100, self.launch)
 
         self.check_restart(root)
 
     def test_lines_written_after_the_kill_are_not_lost(self):
         root = self.make_share()
         self.make_tree(root, "top")
-        pid = self.start()
-        self.kill_after(pid, ADDED, 0, 100)
+        self.kill_after(ADDED, 100, self.launch)
 
         self.make_files(root, "late.txt")
         self.ctl("event", "alpha", "QLIB_NOTIFY_CREATE", f"{root}/late.txt")

@@ -150,8 +150,9 @@ class FollowTest(IndexTest):
         self.assertEqual(follower.stop(), (0, b""))
 
     def test_end_of_a_pause_is_shown(self):
-        self.ctl("pause", "--for", "2s")
         follower = Follower("--json")
+        follower.await_status(lambda status: True)
+        self.ctl("pause", "--for", "5s")
 
         follower.await_status(lambda status: status["paused_until"])
         follower.await_status(lambda status: status["paused_until"] is None)

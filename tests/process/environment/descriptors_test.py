@@ -1,7 +1,6 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Eight shares at work: no Worker closes what is not its own, and nothing is left over."""
 
-import os
 import time
 
 from harness import IndexTest, main
@@ -18,11 +17,12 @@ FIRST_WRONG = 16  # where its text stands
 
 
 class DescriptorsTest(IndexTest):
-    def counts(self, pid):
-        """Descriptors and threads of the daemon without Workers."""
+    def left_without_workers(self, pid):
+        """Descriptors of the daemon."""
         for name in SHARES:
             self.assertEqual(self.command("delete_share_worker", share_name=name), 0)
-        return len(os.listdir(f"/proc/{pid}/fd")), len(os.listdir(f"/proc/{pid}/task"))
+        self.await_alone(pid)
+        return self.descriptors(pid)
 
     def revive_all(self):
         for name in SHARES:
@@ -41,7 +41,7 @@ class DescriptorsTest(IndexTest):
         pid = self.start(debug=False, **watch.environment)
         for name in SHARES:
             self.await_drained(name)
-        before = self.counts(pid)
+        before = self.left_without_workers(pid)
         self.revive_all()
 
         for number in self.rounds():
@@ -58,7 +58,7 @@ class DescriptorsTest(IndexTest):
         for name, load in loads.items():
             self.await_drained(name)
             self.assert_index(load.root, name)
-        self.assertEqual(self.counts(pid), before)
+        self.assertEqual(self.left_without_workers(pid), before)
         self.assertEqual(watch.number(WRONG), 0, watch.text(FIRST_WRONG))
         self.assertGreater(watch.number(CLOSED), 1000)
 

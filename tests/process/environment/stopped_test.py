@@ -34,10 +34,11 @@ class StoppedTest(IndexTest):
 
     def hold_after(self, pid, count, *lines):
         """Queues the lines, and stops the daemon once that many entries are added."""
-        after = self.log.mark()
+        self.log.hold_at(ADDED, count)
         self.append("alpha", *lines)
-        self.await_line(ADDED, after, count)
+        self.await_held()
         self.hold(pid)
+        self.log.go_on()
         self.assertTrue(os.path.exists(self.queue("alpha") + ".tmp"), "the pass was over")
 
     def change_more(self):

@@ -5,7 +5,6 @@ import os
 import re
 import signal
 import socket
-import threading
 import time
 
 from harness import IndexTest, control, main
@@ -21,20 +20,10 @@ ADDED = re.compile(r"\[alpha\] Document\[.*\] added")
 
 
 class HeldLog(SystemLog):
-    """A log whose reader can be held."""
+    """A log that nobody can write a line to."""
 
-    def __init__(self):
-        self.reading = threading.Event()
-        self.reading.set()
-        super().__init__()
-
-    def receive(self):
-        self.reading.wait()
-        return super().receive()
-
-    def hold(self):
-        """Stops reading. Nobody can write a line when this returns."""
-        self.reading.clear()
+    def fill(self):
+        """While it is held."""
         with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
             sender.connect(self.path)
             # One buffer for each writer, and one queue for all: the queue is the smaller.
@@ -45,9 +34,6 @@ class HeldLog(SystemLog):
                     sender.send(b"<7>filler: of the test")
             except BlockingIOError:
                 pass
-
-    def go_on(self):
-        self.reading.set()
 
 
 class UnreadLogTest(IndexTest):
@@ -66,10 +52,10 @@ class UnreadLogTest(IndexTest):
 
     def hold_in_a_walk(self):
         """Nobody reads the log any more, and a walk has not come to its end."""
-        after = self.log.mark()
+        self.log.hold_at(ADDED, 50)
         self.append("alpha", {"event": REINDEX, "path": self.root})
-        self.await_line(ADDED, after, 50)
-        self.log.hold()
+        self.await_held()
+        self.log.fill()
         self.assertTrue(os.path.exists(self.queue("alpha") + ".tmp"), "the pass was over")
         self.make_files(self.root, "late.txt")
         self.append("alpha", {"event": CREATE, "path": f"{self.root}/late.txt"})

@@ -11,6 +11,7 @@ import re
 import signal
 import subprocess
 import sys
+import time
 import unittest
 
 from harness import control, namespace
@@ -143,6 +144,19 @@ class MachineTest(unittest.TestCase):
         self.assertEqual(len(found), 1, children())
         return found[0]
 
+    def descriptors(self, pid):
+        return len(os.listdir(f"/proc/{pid}/fd"))
+
+    def await_alone(self, pid):
+        """Until the process has no thread but its first.
+
+        One that was joined is listed a moment longer, and nothing tells of the end of that.
+        """
+        deadline = time.monotonic() + LIMIT
+        while len(threads := os.listdir(f"/proc/{pid}/task")) > 1:
+            self.assertLess(time.monotonic(), deadline, threads)
+            os.sched_yield()
+
     def await_exit(self, pid):
         status = await_exit(pid)
         self.assertIsNotNone(status, f"process {pid} still runs after {LIMIT} s")
@@ -175,6 +189,14 @@ class MachineTest(unittest.TestCase):
         for path in glob.glob(f"{namespace.STATE}/shares/*/{QUEUE}"):
             with contextlib.suppress(OSError):  # taken meanwhile
                 os.close(os.open(path, os.O_WRONLY | os.O_APPEND | os.O_NONBLOCK))
+
+    def await_held(self):
+        """Until the log is held, see SystemLog.hold_at. Queues are touched as above."""
+        for _ in range(int(LIMIT / NUDGE_SECONDS)):
+            if self.log.await_held(NUDGE_SECONDS):
+                return
+            self._touch_queues()
+        self.fail(f"the log was not held within {LIMIT} s")
 
     def await_lines(self, wanted, after=0):
         """All of them, in this order, whatever lies between."""

@@ -46,10 +46,14 @@ class SystemLog:
         self.marks = 0
         self.marked = {}  # number of a mark: its position
         self.changed = threading.Condition()
+        self.reading = threading.Event()
+        self.reading.set()
+        self.hold_behind = None  # (line that reading stops behind, how many of them until then)
         self.thread = threading.Thread(target=self._drain, daemon=True)
         self.thread.start()
 
     def receive(self):
+        self.reading.wait()
         return self.socket.recv(1 << 20)
 
     def _drain(self):
@@ -65,9 +69,37 @@ class SystemLog:
                     self.marked[line.message] = len(self.lines)
                 else:
                     self.lines.append(line)
+                    self._hold_if_behind(line)
                 self.changed.notify_all()
 
+    def _hold_if_behind(self, line):
+        if self.hold_behind is None or not self._is(line, self.hold_behind[0]):
+            return
+        wanted, count = self.hold_behind
+        self.hold_behind = (wanted, count - 1) if count > 1 else None
+        if count == 1:
+            self.reading.clear()
+
+    def hold_at(self, wanted, count):
+        """Reading stops at the count-th such line from now on: whoever writes more of them waits.
+
+        The kernel takes a few lines that nobody reads, on some machines a few hundred.
+        """
+        with self.changed:
+            self.hold_behind = (wanted, count)
+
+    def await_held(self, limit):
+        """False when those lines do not come."""
+        with self.changed:
+            return self.changed.wait_for(lambda: not self.reading.is_set(), limit)
+
+    def go_on(self):
+        with self.changed:
+            self.hold_behind = None
+            self.reading.set()
+
     def close(self):
+        self.go_on()
         with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as end:
             end.connect(self.path)
             end.send(b"")
@@ -90,6 +122,13 @@ class SystemLog:
                 raise TimeoutError("the log is not drained")
             return self.marked.pop(number)
 
+    def _is(self, line, wanted):
+        if line.program != self.program:
+            return False
+        if isinstance(wanted, re.Pattern):
+            return wanted.fullmatch(line.text) is not None
+        return line.text == wanted
+
     def texts(self, after=0, before=None):
         with self.changed:
             return [line.text for line in self.lines[after:before] if line.program == self.program]
@@ -99,14 +138,13 @@ class SystemLog:
 
         `wanted`: the whole text, or a compiled pattern for the whole text.
         """
-        matches = wanted.fullmatch if isinstance(wanted, re.Pattern) else wanted.__eq__
         deadline = time.monotonic() + limit
         position = after
         with self.changed:
             while True:
                 for line in self.lines[position:]:
                     position += 1
-                    if line.program == self.program and matches(line.text):
+                    if self._is(line, wanted):
                         count -= 1
                         if count == 0:
                             return position

@@ -32,7 +32,7 @@ class BoundsTest(ContentsTest):
         self.await_counts(done=LARGE + SMALL, waiting=0, failed=0)
 
         self.assertLess(self.highest_memory(service), 64 * 1024)
-        self.assertLess(len(os.listdir(f"/proc/{service}/fd")), 100)
+        self.assertLess(self.descriptors(service), 100)
         self.assertEqual(self.ctl("search", "--count", "lighthouse").out.strip().decode(),
                          str(LARGE + SMALL))
 

@@ -13,8 +13,8 @@
 //                  misbehaves
 //   spin           stops until it is let go on, uses more than 300 ms of processor time, stops
 //                  again
-//   hang           adds a byte to the file, and waits for ever
-//   starve         waits for ever, as long as the file is empty; adds a byte to it
+//   stop           stops itself
+//   starve         stops itself, as long as the file is empty; adds a byte to it
 //   more           answers, and when that was taken says another word
 //   killed         is killed from outside, as long as the file is empty; adds a byte to it
 //   refuse         ends before it begins, if it had a job before
@@ -32,7 +32,7 @@
 //   spin           uses more than 300 ms of processor time, and stops
 //   kill           is killed from outside
 //   killed, starve
-//                  is killed, or waits for ever, once: adds a letter to the document
+//                  is killed, or stops itself, once: adds a letter to the document
 //   killed?, starve?
 //                  makes an order to answer with words
 #include <dirent.h>
@@ -164,17 +164,13 @@ void Misbehave(const std::string& verb, int file) {
   } else if (verb == "last") {
     Say(EncodeAnswer(Words("said and gone")));
     _exit(0);
-  } else if (verb == "hang") {
-    struct stat info = {};
-    if (fstat(file, &info) == 0) {
-      (void)!pwrite(file, "x", 1, info.st_size);
-    }
-    WaitForEver();
+  } else if (verb == "stop") {
+    (void)raise(SIGSTOP);
   } else if (verb == "starve") {
     struct stat info = {};
     if (fstat(file, &info) == 0 && info.st_size == 0) {
       (void)!write(file, "x", 1);
-      pause();
+      (void)raise(SIGSTOP);
     }
   } else if (verb == "killed") {
     struct stat info = {};
@@ -271,8 +267,11 @@ int Convert() {
   if (verb == "kill" || verb == "killed") {
     raise(SIGKILL);
   }
-  if (verb == "slow" || verb == "starve") {
+  if (verb == "slow") {
     WaitForEver();
+  }
+  if (verb == "starve") {
+    (void)raise(SIGSTOP);
   }
 
   const bool is_late = verb == "killed?" || verb == "starve?";

@@ -58,9 +58,22 @@ TEST_F(PreparedContentTest, AllItsWordsGoWithIt) {
 TEST_F(PreparedContentTest, WordsThatWereCutForAnotherLanguageAreCutAnew) {
   File("a.txt");
   Jobs();
-  FinishPrepared("a.txt", Prepared("aufgegangenen houses", "german"));
+  FinishPrepared("a.txt", Prepared("walking", "german"));
 
-  EXPECT_EQ(Holding("house"), 1);
+  EXPECT_EQ(Holding("walked"), 1);
+}
+
+TEST_F(PreparedContentTest, WhatIsPreparedIsNotMadeAgain) {
+  PreparedContent prepared = Prepared("a few words that were prepared");
+  prepared.content.text = "others";
+  File("a.txt");
+  Jobs();
+  FinishPrepared("a.txt", prepared);
+
+  EXPECT_EQ(Holding("prepared"), 1);
+  EXPECT_EQ(Holding("others"), 0);
+  EXPECT_EQ(Number("SELECT length(packed) FROM texts"),
+            static_cast<int64_t>(prepared.packed.size()));
 }
 
 TEST_F(PreparedContentTest, NothingIsMadeOfNothing) {

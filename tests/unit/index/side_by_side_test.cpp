@@ -70,6 +70,13 @@ TEST(SideBySideTest, AllButOneHangAndTheLastIsDone) {
   }
 }
 
+TEST(SideBySideTest, ASingleJobNeedsNoThread) {
+  const std::ptrdiff_t before = Threads();
+  SideBySide side_by_side;
+  side_by_side.Run(1, [](size_t) {});
+  EXPECT_LE(Threads(), before);
+}
+
 // Also those that have not begun when the next jobs come.
 TEST(SideBySideTest, ThreadsAreKept) {
   constexpr std::ptrdiff_t COUNT = 4;

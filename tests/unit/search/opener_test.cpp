@@ -3,8 +3,10 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sched.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <future>
 #include <memory>
 #include <string>
@@ -109,6 +111,30 @@ TEST_F(OpenerTest, EachAnswerMovesTheDeadline) {
   Await();
 }
 
+TEST_F(OpenerTest, AnotherQuestionDoesNotMoveTheDeadline) {
+  const Clock::time_point first = now;
+  AskAndHang("a");
+  now += seconds(5);
+  Ask("b");
+  EXPECT_EQ(opener->Deadline(), first + seconds(10));
+  gate.set_value();
+  Await();
+}
+
+TEST_F(OpenerTest, WhatWasTakenIsNotToldAgain) {
+  Ask("a");
+  AskAndHang("b");
+  begun.get_future().wait();
+  opener->Take(now);
+  EXPECT_EQ(heard, "a");
+
+  std::vector<pollfd> polled;
+  opener->AddPolled(polled);
+  EXPECT_EQ(poll(polled.data(), polled.size(), 0), 0);
+  gate.set_value();
+  Await();
+}
+
 // What is freed where closing hangs: tells when it is, and then waits for the gate.
 class OpenerWasteTest : public OpenerTest {
  protected:
@@ -174,6 +200,17 @@ class OpenerFileTest : public OpenerTest {
     file = opener->Keep(writing);
     EXPECT_EQ(writing.fd, -1);
   }
+  // Its number.
+  pid_t Thread() {
+    pid_t number = 0;
+    const auto question = [&number]() -> Opener::Answer {
+      number = gettid();
+      return [] {};
+    };
+    EXPECT_TRUE(opener->Ask(question, now));
+    Await();
+    return number;
+  }
   bool IsClosed(int timeout_ms) const {
     pollfd closed = {reading.fd, 0, 0};
     return poll(&closed, 1, timeout_ms) == 1 && closed.revents == POLLHUP;
@@ -197,13 +234,22 @@ TEST_F(OpenerFileTest, AFileIsClosedByTheThreadWhenItsTurnComes) {
   EXPECT_TRUE(IsClosed(60'000));
 }
 
-TEST_F(OpenerFileTest, AFileMayOutliveTheOpener) {
+TEST_F(OpenerFileTest, AFileMayOutliveTheOpenerAndItsThreadStaysForIt) {
+  const pid_t thread = Thread();
   opener->Drop();
+  EXPECT_EQ(Thread(), thread) << "one thread";
   opener.reset();
   EXPECT_FALSE(IsClosed(0));
+  for (int time = 0; time < 1000; ++time) {
+    ASSERT_EQ(tgkill(getpid(), thread, 0), 0);
+    sched_yield();
+  }
 
   file.reset();
   EXPECT_TRUE(IsClosed(60'000));
+  while (tgkill(getpid(), thread, 0) == 0) {  // for ever, if it does not end
+    sched_yield();
+  }
 }
 
 TEST_F(OpenerTest, WhoGoesWhileItHangsIsNotHeldUp) {

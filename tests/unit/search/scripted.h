@@ -23,6 +23,7 @@ struct ScriptedFile {
   State state = State::WAITS;
   int64_t tries = 0;                      // begun, not taken back
   std::string text;                       // or the reason of a failure
+  std::string found;                      // text, in spite of that
   int64_t extractor = EXTRACTOR_VERSION;  // that failed
   bool is_prepared = false;
 };

@@ -50,7 +50,7 @@ std::chrono::steady_clock::time_point ExtractPool::Due() const {
   return std::chrono::steady_clock::time_point::max();
 }
 
-std::vector<ExtractOutcome> ExtractPool::Work() {
+std::vector<ExtractOutcome> ExtractPool::Work(std::chrono::steady_clock::time_point /*now*/) {
   return std::exchange(Pool().outcomes, {});
 }
 

@@ -151,8 +151,9 @@ bool ContentsWriter::Finish(int64_t file, const PreparedContent& found) {
   return impl->End("Finish", file, ScriptedFile::State::DONE, found.content.text);
 }
 
-bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& /*found*/,
+bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content& found,
                           bool killed) {
+  impl->contents->now[file].found = found.text;
   const bool again = killed && impl->contents->now[file].tries < 2;
   return impl->End("Fail", file, again ? ScriptedFile::State::WAITS : ScriptedFile::State::FAILED,
                    reason);

@@ -99,6 +99,41 @@ TEST_F(ShareContentsTest, AWishToRetryIsFulfilledOnce) {
   EXPECT_EQ(GiveOut().size(), 1U);
 }
 
+TEST_F(ShareContentsTest, WhatWasFoundBeforeAFailureIsKept) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+
+  End(ids[0], ExtractOutcome::Result::FAILED, "a part");
+  Pass(milliseconds(500));
+
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::FAILED);
+  EXPECT_EQ(Kept(1).text, "the reason");
+  EXPECT_EQ(Kept(1).found, "a part");
+}
+
+TEST_F(ShareContentsTest, AFileThatWasReadHasLostNoPatience) {
+  AddFile(1);
+  Settle();
+  for (const bool is_retried : {false, true}) {
+    contents.Set(contents.share, {.retry_contents = is_retried});
+    Settle();
+    auto ids = GiveOut();
+    ASSERT_EQ(ids.size(), 1U);
+    End(ids[0], ExtractOutcome::Result::UNREAD);
+    Pass(milliseconds(500));
+
+    (void)GiveOut();
+    Pass(seconds(3));  // twice as long, if it counted as the second time
+
+    ids = GiveOut();
+    ASSERT_EQ(ids.size(), 1U) << is_retried;
+    End(ids[0], ExtractOutcome::Result::FAILED);
+    Pass(milliseconds(500));
+  }
+}
+
 TEST_F(ShareContentsTest, WhatIsToldOfBeforeItCountsIsSeenALittleLater) {
   Settle();
   contents.EntriesChanged();

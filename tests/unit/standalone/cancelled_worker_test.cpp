@@ -163,10 +163,19 @@ class CancelledWorkerTest : public MountTest {
   void Revive() {
     daemon.DeleteWorker("s");
     ASSERT_EQ(CountIn("/proc/self/fd"), descriptors);
-    ASSERT_EQ(CountIn("/proc/self/task"), threads);
+    ASSERT_NO_FATAL_FAILURE(AwaitThreads());
     ASSERT_EQ(waitpid(-1, nullptr, WNOHANG), -1);
     ASSERT_EQ(errno, ECHILD);
     ASSERT_TRUE(daemon.CreateWorker("s", false));
+  }
+
+  // One that was joined is listed a moment longer, and nothing tells of the end of that.
+  void AwaitThreads() const {
+    const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(JOIN_LIMIT);
+    while (CountIn("/proc/self/task") != threads) {
+      ASSERT_LT(std::chrono::steady_clock::now(), end);
+      sched_yield();
+    }
   }
 
   bool HasWork() {
@@ -208,13 +217,13 @@ class CancelledWorkerTest : public MountTest {
 
   // The process's first of all: what everybody leaves behind once.
   Microseconds WarmUp() {
+    threads = CountIn("/proc/self/task");
     MakeWork(0);
     Drain();
     MakeWork(0);
     const Microseconds taken = Drain();
     daemon.DeleteWorker("s");
     descriptors = CountIn("/proc/self/fd");
-    threads = CountIn("/proc/self/task");
     EXPECT_TRUE(daemon.CreateWorker("s", false));
     return taken;
   }
