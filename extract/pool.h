@@ -82,6 +82,6 @@ class ExtractPool {
 };
 
 // Of the readers as a whole: a higher one reads again what failed.
-constexpr int64_t EXTRACTOR_VERSION = 2;
+constexpr int64_t EXTRACTOR_VERSION = 3;
 
 }  // namespace fileindexd

@@ -161,13 +161,22 @@ TEST(OldOfficeTest, OfSlidesTheLastSavedTextIsFoundMastersAreNot) {
   EXPECT_EQ(reading.Text(ContentField::TITLE), "Talk");
 }
 
-TEST(OldOfficeTest, OlderVersionsAreLeftToConverters) {
+TEST(OldOfficeTest, OlderDocumentsAreLeftToAConverter) {
   EXPECT_EQ(ReadBytes(ReadOldOffice, "a.doc", Compound({{"WordDocument", "\xDC\xA5"}})).converter,
             "catdoc");
-  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.xls", Compound({{"Book", "x"}})).converter, "xls2csv");
   EXPECT_EQ(
       ReadBytes(ReadOldOffice, "a.doc", Compound({{"WordDocument", "\xDC\xA5"}}), {1}).converter,
       "");
+}
+
+TEST(OldOfficeTest, OldPresentationsAreSaidToBeUnread) {
+  const std::string why = "a presentation from before 1997: no reader is known for it";
+  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.ppt", Compound({{"PP40", "x"}})).why, why);
+  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.ppt", Compound({{"PowerPoint Document", "x"}})).why, why);
+  const Reading named =
+      ReadBytes(ReadOldOffice, "a.ppt", Compound({{"PP40", "x"}}, "Harbour plans", "Clerk"));
+  EXPECT_EQ(named.Text(ContentField::TITLE), "Harbour plans");
+  EXPECT_EQ(named.converter, "");
 }
 
 TEST(OldOfficeTest, OtherFormatsUnderTheOldEndingsAreRead) {
