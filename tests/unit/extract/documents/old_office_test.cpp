@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/extract/behind_doors.h"
 #include "tests/unit/extract/documents/compound.h"
 #include "tests/unit/extract/documents/fixture.h"
 
@@ -167,6 +168,17 @@ TEST(OldOfficeTest, OlderDocumentsAreLeftToAConverter) {
   EXPECT_EQ(
       ReadBytes(ReadOldOffice, "a.doc", Compound({{"WordDocument", "\xDC\xA5"}}), {1}).converter,
       "");
+}
+
+// Its text stands in one piece, from where the header says.
+TEST(OldOfficeTest, AnOlderDocumentIsReadByItsConverter) {
+  const std::string text = "the red harbour\rby night\r";
+  std::string document(0x300, '\0');
+  document.replace(0, 4, Le16(0xA5DC) + Le16(0x65));
+  const auto begin = static_cast<uint32_t>(document.size());
+  document.replace(24, 8, Le32(begin) + Le32(begin + static_cast<uint32_t>(text.size())));
+
+  ExpectSameBehindDoors("a.doc", Compound({{"WordDocument", document + text}}));
 }
 
 TEST(OldOfficeTest, OldPresentationsAreSaidToBeUnread) {
