@@ -14,12 +14,10 @@ namespace fileindexd {
 
 namespace {
 
-const std::array<Converter, 4>& Converters() {
-  // UTF-8 as the charset of what comes out; lines as long as their paragraphs; bare cells.
-  static const std::array<Converter, 4> converters = {{
+const std::array<Converter, 2>& Converters() {
+  // UTF-8 as the charset of what comes out; lines as long as their paragraphs.
+  static const std::array<Converter, 2> converters = {{
       {"catdoc", {"-w", "-dutf-8"}, "converted.txt"},
-      {"xls2csv", {"-q0", "-dutf-8"}, "converted.txt"},
-      {"catppt", {"-dutf-8"}, "converted.txt"},
       // As plain text it writes a mixture of charsets; pictures would be files.
       {"unrtf", {"--nopict", "--html"}, "converted.html"},
   }};

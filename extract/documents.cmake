@@ -16,6 +16,7 @@ add_library(extract_documents STATIC
   office_words.cpp
   office_zip.cpp
   old_office.cpp
+  old_workbook_text.cpp
   ole_file.cpp
   pdf.cpp
   rtf.cpp
@@ -23,6 +24,7 @@ add_library(extract_documents STATIC
   slides_text.cpp
   unpacker.cpp
   word_text.cpp
+  workbook_records.cpp
   workbook_text.cpp
   xml_part.cpp)
 target_link_libraries(extract_documents
@@ -30,4 +32,4 @@ target_link_libraries(extract_documents
   PRIVATE extract_readers project_flags)
 check_headers(extract_documents
   document_stream.h gobject.h iso_date.h little_endian.h mail_parts.h memory_file.h nested.h office_words.h
-  old_office.h ole_file.h rtf_tokens.h unpacker.h utf16.h xml_part.h)
+  old_office.h ole_file.h rtf_tokens.h unpacker.h utf16.h workbook_records.h xml_part.h)

@@ -44,7 +44,7 @@ constexpr EndingRow ENDINGS[] = {
     {Format::MESSAGE, "eml emlx mht mhtml"},
     {Format::MAILBOX, "mbox mbx"},
     {Format::ARCHIVE,
-     "zip zipx rar 7z tar gz tgz bz2 tbz tbz2 xz txz zst tzst lz lzma tlz lz4 lzo z taz cpio ar "
+     "zip zipx rar 7z tar gz tgz bz2 tbz tbz2 xz txz zst tzst lz lzma tlz lz4 z taz cpio ar "
      "lha lzh cab iso jar war ear apk xpi deb rpm udf cbz cbr cb7 cbt svgz zabw fbz maff gnumeric"},
     {Format::AUDIO,
      "mp3 mp2 mp1 mpga m4a m4b m4p m4r aac flac fla ogg oga opus spx wav wave rf64 bwf aif aiff "
@@ -105,7 +105,6 @@ constexpr MimeRow MIMES[] = {
     {"application/x-lzma", Format::ARCHIVE},
     {"application/x-lzip", Format::ARCHIVE},
     {"application/x-lz4", Format::ARCHIVE},
-    {"application/x-lzop", Format::ARCHIVE},
     {"application/zstd", Format::ARCHIVE},
     {"application/x-zstd", Format::ARCHIVE},
     {"application/x-compress", Format::ARCHIVE},

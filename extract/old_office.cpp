@@ -30,8 +30,7 @@ bool LeaveTo(const char* converter, const Document& document, ContentSink& sink)
   return true;
 }
 
-bool ReadStreams(const OleFile& ole, const Document& document, ContentSink& sink,
-                 std::string& why) {
+bool ReadStreams(const OleFile& ole, ContentSink& sink, std::string& why) {
   if (ole.Has("EncryptedPackage") || ole.Has("EncryptedSummary")) {
     why = "encrypted";
     return false;
@@ -41,16 +40,17 @@ bool ReadStreams(const OleFile& ole, const Document& document, ContentSink& sink
     return AddWordText(ole.Stream("WordDocument"), ole.Stream("0Table"), ole.Stream("1Table"), sink,
                        why);
   }
-  if (ole.Has("Workbook")) {
-    return AddWorkbookText(ole.Stream("Workbook"), sink, why);
+  for (const char* workbook : {"Workbook", "Book"}) {
+    if (ole.Has(workbook)) {
+      return AddWorkbookText(ole.Stream(workbook), sink, why);
+    }
   }
-  if (ole.Has("Book")) {
-    return LeaveTo("xls2csv", document, sink);
-  }
-  if (ole.Has("PowerPoint Document")) {
+  if (ole.Has("PowerPoint Document") && ole.Has("Current User")) {
     return AddSlidesText(ole.Stream("PowerPoint Document"), ole.Stream("Current User"), sink, why);
   }
-  why = "not an office document";
+  why = ole.Has("PP40") || ole.Has("PowerPoint Document")
+            ? "a presentation from before 1997: no reader is known for it"
+            : "not an office document";
   return false;
 }
 
@@ -73,14 +73,15 @@ bool ReadOldOffice(const Document& document, ContentSink& sink, std::string& why
   if (begin.starts_with("\xDB\xA5") || begin.starts_with("\x31\xBE")) {
     return LeaveTo("catdoc", document, sink);  // older than compound files
   }
-  if (begin.starts_with(std::string_view("\x09\x08\x06\x00", 4)) ||
-      begin.starts_with(std::string_view("\x09\x04\x06\x00", 4))) {
-    return LeaveTo("xls2csv", document, sink);
+  if (IsBareWorkbook(begin)) {
+    std::string workbook;
+    return ReadWhole(document, OleFile::MAX_STREAM, workbook, why) &&
+           AddWorkbookText(workbook, sink, why);
   }
   if (!ole.Open(document, why)) {
     return false;
   }
-  const bool is_good = ReadStreams(ole, document, sink, why);
+  const bool is_good = ReadStreams(ole, sink, why);
   if (document.depth > 0) {
     sink.converter.clear();
   }

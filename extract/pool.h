@@ -82,7 +82,7 @@ class ExtractPool {
   std::unique_ptr<Impl> impl;
 };
 
-// Of the readers as a whole: a higher one reads again what failed.
-constexpr int64_t EXTRACTOR_VERSION = 2;
+// Of the readers as a whole: a higher one reads anew what failed, and later, what was read.
+constexpr int64_t EXTRACTOR_VERSION = 3;
 
 }  // namespace fileindexd

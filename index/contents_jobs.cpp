@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What waits is handed out, and taken back when it ended.
 #include <algorithm>
+#include <ctime>
 
 #include "index/contents_writer_impl.h"
 
@@ -23,31 +24,48 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs,
     return false;
   }
 
-  Company company = Begun();
-  bool dropped = true;
-  for (int round = 0; round < ROUNDS && dropped && jobs.size() < limit && !IsFull(); ++round) {
-    dropped = false;
+  const auto most = static_cast<int64_t>(limit + out.size() + released.size()) + SLACK;
+  Round round{.limit = limit, .company = Begun()};
+  round.dropped = true;
+  for (int i = 0; i < ROUNDS && round.dropped && jobs.size() < limit && !IsFull(); ++i) {
+    round.dropped = false;
     std::vector<ContentFile> rows;
-    int code =
-        table->Waiting(static_cast<int64_t>(limit + out.size() + released.size()) + SLACK, rows);
-    // What was given back goes last: it may be given back again at once.
-    std::stable_partition(rows.begin(), rows.end(),
-                          [this](const ContentFile& file) { return !released.contains(file.id); });
-    for (size_t i = 0; i < rows.size() && code == SQLITE_OK && jobs.size() < limit; ++i) {
-      const bool is_suspect = rows[i].unended >= SUSPECT_DEATHS;
-      if (out.contains(rows[i].id) || company.suspect || (is_suspect && company.any)) {
-        continue;
-      }
-      code = Offer(rows[i], jobs, dropped);
-      company.any = company.any || !jobs.empty();
-      company.suspect = is_suspect && !jobs.empty();
+    int code = table->Waiting(most, rows);
+    code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
+    // A suspect that waits to be alone would wait for all of these.
+    if (code == SQLITE_OK && !round.dropped && !round.held && jobs.size() < limit) {
+      code = table->Aged(most, rows);
+      code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
     }
     if (code != SQLITE_OK) {
       return Done(code);
     }
   }
-  more = dropped || jobs.size() >= limit;
+  more = round.dropped || jobs.size() >= limit;
   return true;
+}
+
+int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round,
+                                    std::vector<ContentJob>& jobs) {
+  // What was given back goes last: it may be given back again at once.
+  std::stable_partition(rows.begin(), rows.end(),
+                        [this](const ContentFile& file) { return !released.contains(file.id); });
+  Company& company = round.company;
+  int code = SQLITE_OK;
+  for (size_t i = 0; i < rows.size() && code == SQLITE_OK && jobs.size() < round.limit; ++i) {
+    const bool is_suspect = rows[i].unended >= SUSPECT_DEATHS;
+    if (out.contains(rows[i].id) || company.suspect) {
+      continue;
+    }
+    if (is_suspect && company.any) {
+      round.held = true;
+      continue;
+    }
+    code = Offer(rows[i], jobs, round.dropped);
+    company.any = company.any || !jobs.empty();
+    company.suspect = is_suspect && !jobs.empty();
+  }
+  return code;
 }
 
 ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
@@ -77,8 +95,14 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
     return SQLITE_OK;
   }
 
-  // No entry waits for it. Whatever stands for that file now is taken in anew.
   dropped = true;
+  if (file.state == ContentState::DONE) {
+    // Its entry may be about to come back, and then it costs no reading: see Sweep.
+    ContentFile unreferred = file;
+    unreferred.unreferred_since = static_cast<int64_t>(time(nullptr));
+    return table->Update(file, unreferred);
+  }
+  // No entry waits for it. Whatever stands for that file now is taken in anew.
   FollowedEntry latest;
   bool found = false;
   code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);

@@ -133,7 +133,9 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
     ++now.tries;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
-      code = Keep(file, content, now);
+      // What older readers found in the same bytes is better than nothing.
+      now.extractor = extractor;
+      code = IsAged(file) ? SQLITE_OK : Keep(file, content, now);
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
   }

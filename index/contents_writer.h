@@ -56,13 +56,15 @@ class ContentsWriter {
   // once a day. Along with it goes what entries no longer want (see Sweep).
   void LookAtAll();
 
-  // Files that wait, newest and smallest first, without those handed out and not ended. `more`:
-  // others may wait, though these are less than `limit`.
+  // Files that wait, newest and smallest first, without those handed out and not ended; behind
+  // them, in the same order, what an older extractor read well: until it is read anew, that is
+  // kept. `more`: there may be others, though these are less than `limit`.
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   // On disk when it returns: what is about to be tried.
   bool BeginTries(const std::vector<int64_t>& files);
   bool Finish(int64_t file, const PreparedContent& found);
-  // It cannot be read; what was found before the failure is kept. `killed`: the helper died; after
+  // It cannot be read; what was found before the failure is kept, or what an older extractor had
+  // found. `killed`: the helper died; after
   // the second time the file is not handed out again until it or the extractor changes.
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   // Not tried after all, or its file changed meanwhile: it waits again.

@@ -34,6 +34,19 @@ inline Content OfKind(Kind kind) {
 }
 
 struct ContentsWriter::Impl {
+  // What is with helpers, and what is about to be. A suspect is alone.
+  struct Company {
+    bool any = false;
+    bool suspect = false;
+  };
+  // One look for files to hand out.
+  struct Round {
+    size_t limit = 0;
+    Company company;
+    bool dropped = false;  // rows that are not looked at again: others may come behind them
+    bool held = false;     // a suspect that has to be alone
+  };
+
   // contents_writer_open.cpp
   IndexError Open(const Share& share, int64_t extractor_version);
   IndexError TryOpen();
@@ -58,6 +71,7 @@ struct ContentsWriter::Impl {
 
   // contents_jobs.cpp
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
+  int OfferSome(std::vector<ContentFile>& rows, Round& round, std::vector<ContentJob>& jobs);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
@@ -73,11 +87,6 @@ struct ContentsWriter::Impl {
   void LookAtAll();
   void Rollback();
   bool Commit();
-  // What is with helpers, and what is about to be. A suspect is alone.
-  struct Company {
-    bool any = false;
-    bool suspect = false;
-  };
   Company Begun() const;
 
   // Runs one operation. Memory that runs out undoes what a failure undoes.
@@ -85,6 +94,11 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
+  // Read well by older readers, and read anew behind all that waits; until then it stays as it is.
+  bool IsAged(const ContentFile& file) const {
+    return file.state == ContentState::DONE && file.extractor != KEPT_OUT &&
+           file.extractor < extractor;
+  }
   bool IsFull() const { return table->pending_bytes >= ENOUGH_PENDING; }
 
   struct HandedOut {

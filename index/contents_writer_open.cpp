@@ -90,8 +90,10 @@ int ContentsWriter::Impl::Own() {
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
   if (code == SQLITE_OK && table->meta.extractor != extractor) {
     code = RetryAll(true);
+    code = code == SQLITE_OK ? table->MakeAged(extractor) : code;
     table->meta.extractor = extractor;
   }
+  code = code == SQLITE_OK ? table->PrepareAged(extractor) : code;
   return code == SQLITE_OK ? table->Commit(Now()) : code;
 }
 
@@ -108,7 +110,8 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
       const bool was_alone = file.begun == 1;
       file.begun = 0;
       file.unended += has_judged ? 0 : 1;
-      if (was_alone && file.unended >= MOST_DEATHS && file.state == ContentState::WAITING) {
+      const bool is_read = file.state == ContentState::WAITING || IsAged(file);
+      if (was_alone && file.unended >= MOST_DEATHS && is_read) {
         file.state = ContentState::QUARANTINED;
         file.tries = file.unended;
         file.extractor = extractor;

@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <string_view>
 
+#include "extract/doors.h"
 #include "extract/sanitized.h"
 
 namespace fileindexd {
@@ -21,6 +22,13 @@ inline void Limit(__rlimit_resource resource, rlim_t most) {
   EXPECT_EQ(getrlimit(resource, &limit), 0);
   limit.rlim_cur = std::min(limit.rlim_max, most);
   EXPECT_EQ(setrlimit(resource, &limit), 0);
+}
+
+// As much as the helper has.
+inline void LimitMemory() {
+  if (!IS_SANITIZED) {
+    Limit(RLIMIT_AS, ADDRESS_SPACE);
+  }
 }
 
 // What goes on for longer ends the process.

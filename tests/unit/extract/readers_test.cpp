@@ -367,10 +367,17 @@ TEST(FormatTableTest, EveryFormatOfDocumentsIsToldByItsEnding) {
               {".txt", Format::NONE},
               {"a", Format::NONE},
               {"a.", Format::NONE},
+              {"a.lzo", Format::NONE},  // its library reads it by a program alone
               {"a.exe", Format::NONE}};
   for (const auto& row : rows) {
     EXPECT_EQ(static_cast<int>(FormatOfName(row.names)), static_cast<int>(row.format)) << row.names;
   }
+}
+
+TEST(FormatTableTest, WhatNoReaderIsForIsNotClaimedByItsContent) {
+  EXPECT_EQ(static_cast<int>(FormatOfMime("application/x-lzop")), static_cast<int>(Format::NONE));
+  EXPECT_EQ(static_cast<int>(FormatOfMime("application/x-lzip")),
+            static_cast<int>(Format::ARCHIVE));
 }
 
 TEST(ChoiceTest, WhatTheDiskDoesNotGiveAnyReaderIsNoted) {

@@ -80,6 +80,33 @@ std::string Rar(const std::vector<Member>& members, uint32_t flags = 0) {
   return rar + RarBlock('\x7B' + Le16(0x4000) + Le16(7));
 }
 
+// Numbers of seven bits a byte.
+std::string Vint(size_t number) {
+  std::string bytes;
+  for (; number >= 0x80; number >>= 7) {
+    bytes += static_cast<char>(0x80 | (number & 0x7F));
+  }
+  return bytes + static_cast<char>(number);
+}
+
+std::string Rar5Block(const std::string& head) {
+  const std::string block = Vint(head.size()) + head;
+  return Le32(Crc32(block)) + block;
+}
+
+// Members as they are.
+std::string Rar5(const std::vector<Member>& members) {
+  std::string rar = std::string("Rar!\x1A\x07\1\0", 8) + Rar5Block(std::string("\1\0\0", 3));
+  for (const Member& member : members) {
+    const std::string size = Vint(member.bytes.size());
+    rar += Rar5Block(std::string("\2\2", 2) + size + '\4' + size + Vint(0x81A4) +
+                     Le32(Crc32(member.bytes)) + '\0' + '\1' + Vint(member.name.size()) +
+                     member.name) +
+           member.bytes;
+  }
+  return rar + Rar5Block(std::string("\5\0\0", 3));
+}
+
 class ArchiveFormatTest : public testing::TestWithParam<Case> {};
 
 // One member of so many zeros, then another.
@@ -184,6 +211,16 @@ TEST(ArchiveTest, EncryptedNamesAreSaidToBe) {
 
 TEST(ArchiveTest, MembersOfARarAreFound) {
   const std::string rar = Rar({{"notes\\first.txt", "the red harbour"}, {"b.md", "a green gate"}});
+  const Reading reading = ReadBytes(ReadArchive, "a.rar", rar);
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.Text(ContentField::MEMBERS), "notes/first.txt\nb.md");
+  EXPECT_EQ(reading.content.text, "the red harbour a green gate");
+  ExpectSurvivesDamage(ReadArchive, "a.rar", rar);
+}
+
+TEST(ArchiveTest, MembersOfALaterRarAreFound) {
+  const std::string rar = Rar5({{"notes/first.txt", "the red harbour"}, {"b.md", "a green gate"}});
   const Reading reading = ReadBytes(ReadArchive, "a.rar", rar);
 
   EXPECT_TRUE(reading.is_good) << reading.why;

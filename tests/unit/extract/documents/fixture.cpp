@@ -7,9 +7,7 @@
 #include <cstdio>
 #include <random>
 
-#include "extract/doors.h"
 #include "extract/memory_file.h"
-#include "extract/sanitized.h"
 #include "tests/unit/extract/behind_doors.h"
 #include "tests/unit/extract/file_bounds.h"
 
@@ -35,9 +33,7 @@ void ExpectWithinBounds(FormatReader reader, const std::string& name, const std:
 }
 
 void ReadDamaged(FormatReader reader, const std::string& name, const std::string& bytes) {
-  if (!IS_SANITIZED) {
-    Limit(RLIMIT_AS, ADDRESS_SPACE);
-  }
+  LimitMemory();
   for (size_t tenth = 0; tenth < 10; ++tenth) {
     AllowSeconds();
     ExpectWithinBounds(reader, name, bytes.substr(0, bytes.size() * tenth / 10));

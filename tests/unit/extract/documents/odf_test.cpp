@@ -60,6 +60,39 @@ TEST(OdfTest, TextAndFieldsAreFoundDeletedTextIsNot) {
   ExpectFields(reading);
 }
 
+TEST(OdfTest, SheetsAndSlidesAreReadByTheirEndings) {
+  const struct {
+    const char* name;
+    const char* type;
+    const char* body;
+    const char* text;
+  } rows[] = {{"a.ods", "spreadsheet",
+               "<office:spreadsheet><table:table table:name=\"Dues\"><table:table-row>"
+               "<table:table-cell><text:p>quay</text:p></table:table-cell><table:table-cell>"
+               "<text:p>42.5</text:p></table:table-cell></table:table-row></table:table>"
+               "</office:spreadsheet>",
+               "Dues quay 42.5"},
+              {"a.odp", "presentation",
+               "<office:presentation><draw:page xmlns:draw=\"w\"><draw:frame><draw:text-box>"
+               "<text:p>The lighthouse</text:p><text:list><text:list-item><text:p>lamp</text:p>"
+               "</text:list-item></text:list></draw:text-box></draw:frame></draw:page>"
+               "</office:presentation>",
+               "The lighthouse lamp"}};
+  for (const auto& row : rows) {
+    const std::string bytes =
+        Zipped({{"mimetype", std::string("application/vnd.oasis.opendocument.") + row.type},
+                {"content.xml", std::string("<office:document-content") + NAMES + "><office:body>" +
+                                    row.body + "</office:body></office:document-content>"},
+                {"meta.xml", std::string("<office:document-meta") + NAMES + ">" + META +
+                                 "</office:document-meta>"}});
+    const Reading reading = ReadBytes(ReadDocument, row.name, bytes);
+    EXPECT_TRUE(reading.is_good) << reading.why;
+    EXPECT_EQ(reading.content.text, row.text);
+    ExpectFields(reading);
+    ExpectSurvivesDamage(ReadDocument, row.name, bytes);
+  }
+}
+
 TEST(OdfTest, TheFlatFormIsReadAlike) {
   const Reading reading = ReadBytes(ReadOfficeZip, "a.fodt", FlatOdt());
 

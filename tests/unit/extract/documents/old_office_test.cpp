@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/extract/behind_doors.h"
 #include "tests/unit/extract/documents/compound.h"
 #include "tests/unit/extract/documents/fixture.h"
 
@@ -161,13 +162,33 @@ TEST(OldOfficeTest, OfSlidesTheLastSavedTextIsFoundMastersAreNot) {
   EXPECT_EQ(reading.Text(ContentField::TITLE), "Talk");
 }
 
-TEST(OldOfficeTest, OlderVersionsAreLeftToConverters) {
+TEST(OldOfficeTest, OlderDocumentsAreLeftToAConverter) {
   EXPECT_EQ(ReadBytes(ReadOldOffice, "a.doc", Compound({{"WordDocument", "\xDC\xA5"}})).converter,
             "catdoc");
-  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.xls", Compound({{"Book", "x"}})).converter, "xls2csv");
   EXPECT_EQ(
       ReadBytes(ReadOldOffice, "a.doc", Compound({{"WordDocument", "\xDC\xA5"}}), {1}).converter,
       "");
+}
+
+// Its text stands in one piece, from where the header says.
+TEST(OldOfficeTest, AnOlderDocumentIsReadByItsConverter) {
+  const std::string text = "the red harbour\rby night\r";
+  std::string document(0x300, '\0');
+  document.replace(0, 4, Le16(0xA5DC) + Le16(0x65));
+  const auto begin = static_cast<uint32_t>(document.size());
+  document.replace(24, 8, Le32(begin) + Le32(begin + static_cast<uint32_t>(text.size())));
+
+  ExpectSameBehindDoors("a.doc", Compound({{"WordDocument", document + text}}));
+}
+
+TEST(OldOfficeTest, OldPresentationsAreSaidToBeUnread) {
+  const std::string why = "a presentation from before 1997: no reader is known for it";
+  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.ppt", Compound({{"PP40", "x"}})).why, why);
+  EXPECT_EQ(ReadBytes(ReadOldOffice, "a.ppt", Compound({{"PowerPoint Document", "x"}})).why, why);
+  const Reading named =
+      ReadBytes(ReadOldOffice, "a.ppt", Compound({{"PP40", "x"}}, "Harbour plans", "Clerk"));
+  EXPECT_EQ(named.Text(ContentField::TITLE), "Harbour plans");
+  EXPECT_EQ(named.converter, "");
 }
 
 TEST(OldOfficeTest, OtherFormatsUnderTheOldEndingsAreRead) {

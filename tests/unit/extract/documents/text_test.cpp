@@ -36,6 +36,19 @@ std::string Widened(std::string_view ascii) {
 
 }  // namespace
 
+// As programs write it: with the colours of a terminal.
+TEST(TextFilesTest, ALogIsReadAsText) {
+  const std::string log =
+      "2026-01-02T03:04:05Z quay[42]: \x1b[31mcrane stuck\x1b[0m\n"
+      "2026-01-02T03:04:06Z quay[42]: caf\u00e9 shut\n";
+  const Reading reading = ReadBytes(ReadDocument, "quay.log", log);
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_EQ(reading.content.kind, Kind::DOCUMENT);
+  EXPECT_THAT(reading.content.text, testing::HasSubstr("crane stuck"));
+  EXPECT_THAT(reading.content.text, testing::HasSubstr("caf\u00e9 shut"));
+}
+
 TEST(TextFilesTest, DamageIsSurvived) {
   ExpectSurvivesDamage(ReadText, "a.txt", PLAIN);
   ExpectSurvivesDamage(ReadText, "b.txt", RUSSIAN);

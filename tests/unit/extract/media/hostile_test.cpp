@@ -69,6 +69,7 @@ class HostileMediaTest : public testing::TestWithParam<Victim> {
       const pid_t child = fork();
       ASSERT_GE(child, 0);
       if (child == 0) {
+        LimitMemory();
         for (size_t i = *next; i < count; i++) {
           *next = i + 1;
           AllowSeconds();

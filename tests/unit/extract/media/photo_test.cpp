@@ -37,7 +37,8 @@ INSTANTIATE_TEST_SUITE_P(Formats, PictureTest, testing::ValuesIn(PictureSamples(
 std::vector<Sample> Photos() {
   std::vector<Sample> samples = PictureSamples();
   std::erase_if(samples, [](const Sample& sample) {
-    return sample.name.ends_with(".gif") || sample.name.ends_with(".bmp");
+    return sample.name.ends_with(".gif") || sample.name.ends_with(".bmp") ||
+           sample.name.ends_with(".crw");
   });
   return samples;
 }
@@ -77,6 +78,13 @@ using Entries = std::vector<TiffEntry>;
 
 Found ReadTiff(const Entries& picture, const Entries& camera, const Entries& position) {
   return Read(ReadPhoto, {"p.tif", TiffFile(PlainTiffHeader(), picture, camera, position)});
+}
+
+TEST(PhotoReaderTest, WhatAnOldRawFileHoldsIsFound) {
+  const Found found = Read(ReadPhoto, CrwSample());
+
+  EXPECT_EQ(found.Number(ContentField::TAKEN), PHOTO_TAKEN);
+  EXPECT_EQ(found.Text(ContentField::CAMERA), "Canon EOS 10D");
 }
 
 TEST(PhotoReaderTest, MakerAndModelThatDifferStandTogether) {

@@ -176,8 +176,9 @@ Sample BmpSample() {
 
 std::vector<Sample> PictureSamples() {
   std::vector<Sample> samples = RawSamples();
-  for (const Sample& sample : {JpegSample(), PngSample(), WebpSample(), TiffSample(), HeicSample(),
-                               RafSample(), GifSample(), BmpSample()}) {
+  for (const Sample& sample :
+       {JpegSample(), PngSample(), WebpSample(), TiffSample(), HeicSample(), RafSample(),
+        GifSample(), BmpSample(), MrwSample(), Cr3Sample(), CrwSample()}) {
     samples.push_back(sample);
   }
   return samples;

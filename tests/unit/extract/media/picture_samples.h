@@ -24,6 +24,10 @@ std::string PlainTiffHeader();
 Sample TiffSample();
 std::vector<Sample> RawSamples();  // dng, nef, arw, pef, cr2, orf, rw2
 Sample RafSample();
+Sample MrwSample();
+Sample Cr3Sample();
+// Taken then by a clock without a zone, with a "Canon EOS 10D", and no more.
+Sample CrwSample();
 Sample HeicSample();
 
 // With all three sorts of metadata, by the library's writer: title "Titel", author "Zoë", keywords

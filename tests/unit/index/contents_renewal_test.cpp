@@ -1,0 +1,194 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What older readers read well is read anew by newer ones, behind all else.
+#include <gmock/gmock.h>
+#include <unistd.h>
+
+#include "tests/unit/index/contents_fixture.h"
+
+namespace fileindexd {
+
+namespace {
+
+class ContentsRenewalTest : public ContentsTest {
+ protected:
+  void ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes") {
+    OldFile(name, mtime, bytes);
+    TakeIn();
+    ASSERT_EQ(Jobs(), Names({name}));
+    Finish(name, "old" + name);
+  }
+  void BeginAndDie(const std::string& name, int64_t extractor) {
+    ASSERT_TRUE(contents->BeginTries({JobOf(name).file}));
+    OpenContents(extractor);
+  }
+};
+
+}  // namespace
+
+TEST_F(ContentsRenewalTest, NewestAndSmallestComeFirstBehindAllThatWaits) {
+  ReadOldFile("big.txt", 3000, "many bytes");
+  ReadOldFile("old.txt", 1000);
+  ReadOldFile("small.txt", 3000, "few");
+  OldFile("failed.txt", 500);
+  TakeIn();
+  Jobs();
+  ASSERT_TRUE(contents->Fail(JobOf("failed.txt").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->Commit());
+
+  OpenContents(2);
+  OldFile("new.txt", 100);
+  TakeIn();
+
+  EXPECT_EQ(Jobs(1), Names({"failed.txt"}));
+  EXPECT_EQ(Jobs(), Names({"new.txt", "small.txt", "big.txt", "old.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, WhatComesMeanwhileGoesAhead) {
+  ReadOldFile("a.txt", 3000);
+  ReadOldFile("b.txt", 2000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(1), Names({"a.txt"}));
+  EXPECT_TRUE(more_jobs);
+
+  OldFile("new.txt", 100);
+  TakeIn();
+
+  EXPECT_EQ(Jobs(1), Names({"new.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, OldTextIsFoundAndCountedAsReadUntilTheNewOneIsThere) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+  EXPECT_EQ(Holding("olda"), 1);
+  EXPECT_EQ(Number("SELECT state FROM files"), 1);
+  EXPECT_EQ(Number("SELECT done * 10 + waiting FROM counts WHERE kind = 1"), 10);
+
+  Finish("a.txt", "anew");
+
+  EXPECT_EQ(Holding("olda"), 0);
+  EXPECT_EQ(Holding("anew"), 1);
+  EXPECT_EQ(Number("SELECT done * 10 + waiting FROM counts WHERE kind = 1"), 10);
+}
+
+TEST_F(ContentsRenewalTest, NothingIsReadTwiceForOneVersion) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  EXPECT_EQ(Read(), Names({"a.txt"}));
+
+  EXPECT_EQ(Jobs(), Names());
+  OpenContents(2);
+  EXPECT_EQ(Jobs(), Names());
+  OpenContents(1);
+  EXPECT_EQ(Jobs(), Names()) << "older readers";
+  OpenContents(3);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, WhatWasNotRenewedBeforeARestartIsAfterwards) {
+  ReadOldFile("a.txt", 3000);
+  ReadOldFile("b.txt", 2000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(1), Names({"a.txt"}));
+  Finish("a.txt", "anew");
+
+  OpenContents(2);
+  EXPECT_EQ(Jobs(), Names({"b.txt"}));
+  OpenContents(3);
+  EXPECT_EQ(Jobs(), Names({"a.txt", "b.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, AFailureIsNamedOnceAndTakesNothingAway) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Number("SELECT state FROM files"), 2);
+  EXPECT_EQ(Number("SELECT reason = 'damaged' FROM files"), 1);
+  EXPECT_EQ(Holding("olda"), 1);
+  EXPECT_EQ(Jobs(), Names());
+  OpenContents(2);
+  EXPECT_EQ(Jobs(), Names());
+}
+
+TEST_F(ContentsRenewalTest, SecondDeathIsTheLast) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  for (int death = 0; death < 2; ++death) {
+    ASSERT_EQ(Jobs(), Names({"a.txt"})) << death;
+    ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "killed", {}, true));
+    ASSERT_TRUE(contents->Commit());
+  }
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Number("SELECT state FROM files"), 3);
+  EXPECT_EQ(Holding("olda"), 1);
+}
+
+TEST_F(ContentsRenewalTest, WhoEndsTheServiceAloneFiveTimesIsLeftAlone) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  for (int death = 0; death < 5; ++death) {
+    ASSERT_EQ(Jobs(), Names({"a.txt"})) << death;
+    BeginAndDie("a.txt", 2);
+  }
+
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Number("SELECT state FROM files"), 3);
+  EXPECT_EQ(Holding("olda"), 1);
+}
+
+// Entries may be made anew just now: what was read stays until they are there again.
+TEST_F(ContentsRenewalTest, WithoutAnEntryItIsKeptAndLeftAlone) {
+  ReadOldFile("a.txt", 3000);
+  ReadOldFile("b.txt", 2000);
+  OpenContents(2);
+  ASSERT_EQ(rename(At("a.txt").c_str(), (root + "/../a.txt").c_str()), 0);
+  Delete("a.txt");
+  Commit();
+
+  EXPECT_EQ(Read(), Names({"b.txt"}));
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_EQ(Holding("olda"), 1);
+
+  ASSERT_EQ(rename((root + "/../a.txt").c_str(), At("a.txt").c_str()), 0);
+  Add("a.txt");
+  Commit();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, AFileThatChangedMeanwhileWaitsAsEver) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  const int64_t file = JobOf("a.txt").file;
+  OldFile("a.txt", 4000, "other bytes");
+  TakeIn();
+  ASSERT_TRUE(contents->Finish(file, TextContent("stale")));
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Holding("stale"), 0);
+  EXPECT_EQ(Number("SELECT state FROM files"), 0);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, ManyAreReadInBatchesToTheEnd) {
+  constexpr int FILES = 150;
+  for (int i = 0; i < FILES; ++i) {
+    OldFile("f" + std::to_string(i) + ".txt", 60 * (i + 1));
+  }
+  TakeIn();
+  ASSERT_EQ(Read().size(), 100U);
+  ASSERT_EQ(Read().size(), 50U);
+  OpenContents(2);
+
+  ASSERT_EQ(Read().size(), 100U);
+  EXPECT_EQ(Read().size(), 50U);
+  EXPECT_EQ(Jobs(), Names());
+}
+
+}  // namespace fileindexd
