@@ -312,8 +312,8 @@ TEST_F(WorkerWalksTest, ADirectoryThatCannotBeOpenedIsPassedOver) {
       script.Forget();
       EXPECT_EQ(Walk(which, Dir("d")), 1) << which << " " << error;
       EXPECT_THAT(Log(), IsEmpty());
-      EXPECT_THAT(script.Calls(), Contains("NoteUnopenedDirectory " + In("d") + " " +
-                                           std::to_string(error)));
+      EXPECT_THAT(script.Calls(),
+                  Contains("NoteUnopenedDirectory " + In("d") + " " + std::to_string(error)));
     }
   }
 }
