@@ -85,6 +85,10 @@ int ContentsWriter::Impl::TakeInEntry(const FollowedEntry& entry) {
 int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentFile& file) {
   ContentFile now = file;
   bool again = entry.reread > file.reread;
+  if (again) {
+    now.extractor =
+        0;  // its bytes may be others: what was read of them goes if they cannot be read
+  }
   now.reread = std::max(file.reread, entry.reread);
   now.ctime = std::max(now.ctime, entry.ctime);
   now.unreferred_since = 0;

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What waits is handed out, and taken back when it ended.
 #include <algorithm>
-#include <ctime>
 
 #include "index/contents_writer_impl.h"
 
@@ -14,6 +13,8 @@ namespace {
 constexpr int64_t SUSPECT_DEATHS = 2;
 constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file any more
 constexpr int ROUNDS = 8;
+constexpr int64_t MOST_LOOKED = 1000;  // rows in one go
+constexpr size_t MOST_RENEWED = 64;    // at once: what waits already goes ahead of all others
 
 }  // namespace
 
@@ -34,8 +35,7 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs,
     code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
     // A suspect that waits to be alone would wait for all of these.
     if (code == SQLITE_OK && !round.dropped && !round.held && jobs.size() < limit) {
-      code = table->Aged(most, rows);
-      code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
+      code = Renew(round.dropped);
     }
     if (code != SQLITE_OK) {
       return Done(code);
@@ -68,6 +68,33 @@ int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round
   return code;
 }
 
+// Makes a few of what older readers read wait: nothing else does. What was read stays, and is
+// found, until it is read anew.
+int ContentsWriter::Impl::Renew(bool& more) {
+  more = false;
+  if (table->meta.extractor == extractor) {
+    return SQLITE_OK;
+  }
+  std::vector<ContentFile> files;
+  int code = table->Slice(renewed, MOST_LOOKED, files);
+  size_t begun = 0;
+  for (size_t i = 0; i < files.size() && code == SQLITE_OK && begun < MOST_RENEWED; ++i) {
+    renewed = files[i].id;
+    if (IsAged(files[i]) && files[i].unreferred_since == 0) {
+      ContentFile now = files[i];
+      now.state = ContentState::WAITING;
+      code = table->Update(files[i], now);
+      ++begun;
+    }
+  }
+  if (code == SQLITE_OK && files.empty()) {
+    table->meta.extractor = extractor;
+    code = table->Begin();
+  }
+  more = !files.empty();
+  return code;
+}
+
 ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
   Company company;
   for (const auto& [id, handed] : out) {
@@ -95,14 +122,8 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
     return SQLITE_OK;
   }
 
-  dropped = true;
-  if (file.state == ContentState::DONE) {
-    // Its entry may be about to come back, and then it costs no reading: see Sweep.
-    ContentFile unreferred = file;
-    unreferred.unreferred_since = static_cast<int64_t>(time(nullptr));
-    return table->Update(file, unreferred);
-  }
   // No entry waits for it. Whatever stands for that file now is taken in anew.
+  dropped = true;
   FollowedEntry latest;
   bool found = false;
   code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);

@@ -21,8 +21,7 @@
 //     is_cut, sample    as in Content
 //     unreferred_since  seconds since the epoch: found without an entry; 0: has one
 //     reread            the greatest `reread` of its entries: what was written to before is read,
-//     or
-//                       waits
+//                       or waits
 //     text              rowid in `texts` and `words`; 0: there is none
 //     length            bytes of its words
 //     fields            a bit for each text field that it has: 1 << number
@@ -36,8 +35,7 @@
 //             failed
 //   rate      for each second with commits of the last minute: how many files were done
 //   meta      one row: the share's file system (contents of another one say nothing), the language
-//             of the words, the version of the readers that what failed was tried with (what was
-//             read before has an index of its own, files_aged: see ContentsTable), the random
+//             of the words, the version of the readers that all was read or tried with, the random
 //             number of the entries database that was followed and the greatest `written` seen in
 //             it, the last rowid in `texts`, and while the words are being made anew, up to which
 //             of them that is done (all, unless it is going on) and up to which it has to be, the

@@ -47,13 +47,6 @@ void BindFile(Statement& statement, const ContentFile& file) {
   }
 }
 
-// The same text in the index and in the question, or the index is not used. A row of which nothing
-// was kept (0) does not tell what read it.
-std::string ConditionOfAged(int64_t version) {
-  return "state = 1 AND unreferred_since = 0 AND extractor > 0 AND extractor < " +
-         std::to_string(version);
-}
-
 int Execute(sqlite3* db, const std::string& sql) {
   return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
 }
@@ -107,21 +100,6 @@ int ContentsTable::Prepare(sqlite3* db) {
   }
   const int code = PrepareTexts();
   return code == SQLITE_OK ? ReadMeta() : code;
-}
-
-int ContentsTable::MakeAged(int64_t version) {
-  const int code = Begin();
-  return code == SQLITE_OK ? Execute(handle,
-                                     "DROP INDEX IF EXISTS files_aged;"
-                                     "CREATE INDEX files_aged ON files(" WAITING_ORDER ") WHERE " +
-                                         ConditionOfAged(version))
-                           : code;
-}
-
-int ContentsTable::PrepareAged(int64_t version) {
-  return aged.Prepare(handle, ("SELECT " FILE_COLUMNS " FROM files WHERE " +
-                               ConditionOfAged(version) + " ORDER BY " WAITING_ORDER " LIMIT ?1")
-                                  .c_str());
 }
 
 int ContentsTable::ReadMeta() {
@@ -249,11 +227,6 @@ int ContentsTable::ReadFiles(Statement& statement, std::vector<ContentFile>& fil
 int ContentsTable::Waiting(int64_t limit, std::vector<ContentFile>& files) {
   waiting.BindInt(1, limit);
   return ReadFiles(waiting, files);
-}
-
-int ContentsTable::Aged(int64_t limit, std::vector<ContentFile>& files) {
-  aged.BindInt(1, limit);
-  return ReadFiles(aged, files);
 }
 
 int ContentsTable::Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files) {

@@ -60,11 +60,6 @@ class ContentsTable {
   // All anew, from what is stored: see Reword. What is stored from now on has its words at once.
   int MakeWords(const std::string& language, const std::string& version);
 
-  // Aged is what readers before that version read well. Few of a share's files are, but after an
-  // upgrade: the index of them names the version, so that it is empty at all other times.
-  int MakeAged(int64_t version);
-  int PrepareAged(int64_t version);
-
   // Commit writes `meta`, and counts `done_now` files as done in that second.
   int Begin();  // nothing, if a transaction is open
   int Commit(int64_t now);
@@ -75,7 +70,6 @@ class ContentsTable {
   int FindById(int64_t id, ContentFile& file, bool& found);
   // Each of these gives up to `limit` rows.
   int Waiting(int64_t limit, std::vector<ContentFile>& files);
-  int Aged(int64_t limit, std::vector<ContentFile>& files);
   int Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files);
   int LeftBegun(int64_t limit, std::vector<ContentFile>& files);
   int Unreferred(int64_t until, int64_t limit, std::vector<ContentFile>& files);
@@ -129,7 +123,7 @@ class ContentsTable {
   std::vector<int64_t> leaving;        // rowids in `texts`
   bool has_old_words = false;
   bool merging = false;
-  Statement find, find_by_id, waiting, aged, failed, left_begun, unreferred, slice;
+  Statement find, find_by_id, waiting, failed, left_begun, unreferred, slice;
   Statement insert, update, set_reason, set_content, remove;
   Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
   Statement write_meta, write_counts, write_rate, cut_rate, free_pages, give_back, count_done;

@@ -133,9 +133,10 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
     ++now.tries;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
-      // What older readers found in the same bytes is better than nothing.
+      // What was found before in the same bytes, by older readers or in another try, stays.
+      const bool is_known = file.text != 0 && file.extractor != KEPT_OUT;
       now.extractor = extractor;
-      code = IsAged(file) ? SQLITE_OK : Keep(file, content, now);
+      code = is_known ? SQLITE_OK : Keep(file, content, now);
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
   }
@@ -172,6 +173,7 @@ void ContentsWriter::Impl::LookAtAll() {
 // How far the passes have come is no part of the transaction: they begin anew.
 void ContentsWriter::Impl::Rollback() {
   table->Rollback();
+  renewed = 0;
   if (std::exchange(has_passed, false)) {
     LookAtAll();
   }

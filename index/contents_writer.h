@@ -56,16 +56,16 @@ class ContentsWriter {
   // once a day. Along with it goes what entries no longer want (see Sweep).
   void LookAtAll();
 
-  // Files that wait, newest and smallest first, without those handed out and not ended; behind
-  // them, in the same order, what an older extractor read well: until it is read anew, that is
+  // Files that wait, newest and smallest first, without those handed out and not ended. Where none
+  // does, a few of what an older extractor read well begin to: until they are read anew, that is
   // kept. `more`: there may be others, though these are less than `limit`.
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   // On disk when it returns: what is about to be tried.
   bool BeginTries(const std::vector<int64_t>& files);
   bool Finish(int64_t file, const PreparedContent& found);
-  // It cannot be read; what was found before the failure is kept, or what an older extractor had
-  // found. `killed`: the helper died; after
-  // the second time the file is not handed out again until it or the extractor changes.
+  // It cannot be read; what was found before the failure is kept, or what an earlier reading of the
+  // same bytes had found. `killed`: the helper died; after the second time the file is not handed
+  // out again until it or the extractor changes.
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   // Not tried after all, or its file changed meanwhile: it waits again.
   bool Release(int64_t file);

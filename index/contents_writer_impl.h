@@ -72,6 +72,7 @@ struct ContentsWriter::Impl {
   // contents_jobs.cpp
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
   int OfferSome(std::vector<ContentFile>& rows, Round& round, std::vector<ContentJob>& jobs);
+  int Renew(bool& more);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
@@ -94,7 +95,7 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
-  // Read well by older readers, and read anew behind all that waits; until then it stays as it is.
+  // Read well by older readers.
   bool IsAged(const ContentFile& file) const {
     return file.state == ContentState::DONE && file.extractor != KEPT_OUT &&
            file.extractor < extractor;
@@ -123,6 +124,7 @@ struct ContentsWriter::Impl {
   int64_t looked = 0;          // up to this `written`
   bool is_sweeping = false;    // over every file
   int64_t swept = 0;           // up to this row
+  int64_t renewed = 0;         // the same, of what older readers read
   bool has_passed = false;     // one of these changed what is not committed
 };
 

@@ -89,11 +89,9 @@ int ContentsWriter::Impl::Own() {
   code = code == SQLITE_OK ? table->PrepareWords() : code;
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
   if (code == SQLITE_OK && table->meta.extractor != extractor) {
-    code = RetryAll(true);
-    code = code == SQLITE_OK ? table->MakeAged(extractor) : code;
-    table->meta.extractor = extractor;
+    code = RetryAll(true);  // what was read well: see Renew, which also ends it
+    renewed = 0;
   }
-  code = code == SQLITE_OK ? table->PrepareAged(extractor) : code;
   return code == SQLITE_OK ? table->Commit(Now()) : code;
 }
 
@@ -110,8 +108,7 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
       const bool was_alone = file.begun == 1;
       file.begun = 0;
       file.unended += has_judged ? 0 : 1;
-      const bool is_read = file.state == ContentState::WAITING || IsAged(file);
-      if (was_alone && file.unended >= MOST_DEATHS && is_read) {
+      if (was_alone && file.unended >= MOST_DEATHS && file.state == ContentState::WAITING) {
         file.state = ContentState::QUARANTINED;
         file.tries = file.unended;
         file.extractor = extractor;
