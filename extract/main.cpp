@@ -169,8 +169,8 @@ int Serve(int parent) {
   if (!doors.can_open_files) {
     LeaveOutFileUsers();
     greeting.left_out =
-        "PDF, old office formats, RTF, rare charsets (the kernel has neither Landlock nor "
-        "namespaces)";
+        "PDF, Word documents from before 1997, RTF, rare charsets (the kernel has neither Landlock "
+        "nor namespaces)";
   }
   if (!SendAll(EncodeAnswer(greeting))) {
     return 0;

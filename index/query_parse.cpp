@@ -234,7 +234,7 @@ bool Parser::ReadNot(QueryNode& node, size_t length, int depth) {
   if (!ReadPart(negation.below.emplace_back(), depth + 1)) {
     return false;
   }
-  negation.end = negation.below.front().end;
+  negation.end = at;
   node = std::move(negation);
   return true;
 }

@@ -252,6 +252,8 @@ TEST_F(QueryAnswersTest, ReasonsTellWhyPartByPart) {
   EXPECT_EQ(Reasons("moby call.txt", "melville -ishmael"),
             Names({"melville: author", "no -ishmael: "}));
   EXPECT_FALSE(explanation.matches);
+  EXPECT_EQ(Reasons("moby call.txt", "call -(whale OR x) NOT (draft AND copy)"),
+            Names({"call: name, text", "-(whale OR x): ", "NOT (draft AND copy): "}));
   EXPECT_EQ(Reasons("moby call.txt", "size:>1M kind:audio name:*oby*"),
             Names({"no size:>1M: 13 bytes", "no kind:audio: document", "name:*oby*: name"}));
   EXPECT_EQ(Reasons("moby call.txt", "duration:1m near:0,0,1km"),
