@@ -71,6 +71,9 @@ int64_t Now() {
 }
 
 void NoteShortage(const Settings& settings, const std::string& path, int error) {
+  if (!IsShortage(error)) {
+    return;
+  }
   const std::optional<std::string> normal = NormalPath(path);
   const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
   if (share != nullptr) {
@@ -175,6 +178,9 @@ bool CanFullPathBeIndexed(const std::string& path) {
 }
 
 void NoteUnopenedDirectory(const std::string& path, int error) {
+  if (!IsShortage(error)) {
+    return;  // what is gone, or cannot be read, needs no settings
+  }
   const CancelOff off;
   NoteShortage(*CurrentSettings(), path, error);
 }

@@ -59,10 +59,11 @@ int CountShort(const std::string& share) {
 
 }  // namespace
 
+bool IsShortage(int error) {
+  return error == EMFILE || error == ENFILE;
+}
+
 void NoteFailedLook(const std::string& share, const std::string& path, int error) {
-  if (error != EMFILE && error != ENFILE) {
-    return;
-  }
   if (MarkShort(share)) {
     errno = error;
     FI_LOG("Share[%s] has to be indexed again, path=%s, reason=%m", share.c_str(), path.c_str());

@@ -11,7 +11,10 @@
 
 namespace fileindexd {
 
-// A look at `path`, or its opening, failed with `error`; only a shortage counts.
+// Whether what failed with `error` lacked nothing but a descriptor.
+bool IsShortage(int error);
+
+// A look at `path`, or its opening, failed for want of a descriptor.
 void NoteFailedLook(const std::string& share, const std::string& path, int error);
 
 // At the end of a pass. Microseconds to wait before the next one, 0 when the pass was whole, or
