@@ -6,6 +6,7 @@
 
 #include "index/contents_schema.h"
 #include "index/fts5_api.h"
+#include "index/hit_score.h"
 #include "index/text_marks.h"
 
 namespace fileindexd {
@@ -69,7 +70,7 @@ void NameRank(const Fts5ExtensionApi* api, Fts5Context* match, sqlite3_context* 
     return;
   }
   const int rank = covered >= end ? 3 : first != 0 ? 0 : covered + 1 == end ? 2 : 1;
-  sqlite3_result_double(result, rank + static_cast<double>(covered) / (end + 1));
+  sqlite3_result_double(result, rank + NAME_COVER * covered / (end + 1));
 }
 
 }  // namespace

@@ -14,7 +14,6 @@ namespace {
 
 constexpr double FIRST_NAME_SCORE = 1;
 // Ranks of a name; what is covered of it, and how rare the words are, add less than one together.
-constexpr double COVER = 0.6;
 constexpr double RARITY = 0.39;
 constexpr double WHOLE_NAME = 3;
 constexpr double WHOLE_STEM = 2;  // but for the ending
@@ -45,7 +44,7 @@ double Covered(const std::vector<std::string>& name, const std::vector<Token>& t
     covered += best;
     all += word.size();
   }
-  return all == 0 ? 0 : COVER * static_cast<double>(covered) / static_cast<double>(all + 1);
+  return all == 0 ? 0 : NAME_COVER * static_cast<double>(covered) / static_cast<double>(all + 1);
 }
 
 bool IsSame(const std::vector<std::string>& name, const std::vector<Token>& tokens) {
@@ -84,6 +83,10 @@ double HitScore::AllWeights() {
     }
   }
   return all_weights;
+}
+
+double HitScore::Rarity(double weights) {
+  return RARITY * weights / AllWeights();
 }
 
 // The parts that say what to find, as far as this entry has them.
@@ -140,7 +143,7 @@ int HitScore::Score(Candidate& candidate, bool by_text, double& score, int64_t& 
       weight += sets.WeightOf(*part.leaf);
     }
     found.erase(std::stable_partition(found.begin(), found.end(), in_name), found.end());
-    score = FIRST_NAME_SCORE + NameScore(candidate, found) + RARITY * weight / AllWeights();
+    score = FIRST_NAME_SCORE + NameScore(candidate, found) + Rarity(weight);
     return SQLITE_OK;
   }
   text = candidate.facts->text;

@@ -18,6 +18,9 @@
 
 namespace fileindexd {
 
+// What is covered of a name by the words, at most.
+constexpr double NAME_COVER = 0.6;
+
 class HitScore {
  public:
   HitScore(CandidateRows& of_rows, const WordSets& of_sets, RowCheck& of_check,
@@ -26,6 +29,8 @@ class HitScore {
   // Of an entry that answers. `by_text`: it was come upon through its content, so its name alone
   // does not answer. `text` is set where a content counted. SQLite's code.
   int Score(Candidate& candidate, bool by_text, double& score, int64_t& text);
+  // What a name gains by words whose weights are that together.
+  double Rarity(double weights);
 
  private:
   struct Found {

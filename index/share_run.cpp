@@ -6,9 +6,9 @@
 #include <utility>
 
 #include "index/entry_table.h"
+#include "index/promise_order.h"
 #include "index/row_sql.h"
 #include "index/schema.h"
-#include "index/text_order.h"
 
 namespace fileindexd {
 
@@ -157,7 +157,7 @@ int ShareRun::WalkTexts(BestHits& best) {
     return code;
   }
   const size_t block_size = upper.texts.Count() <= FEW_TEXTS ? FEW_TEXTS : SCORED_TEXTS;
-  TextOrder order(upper.texts, sets);
+  PromiseOrder order(upper.texts, [this](int64_t text) { return sets.PromiseOfText(text); });
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.
     if (i % block_size == 0) {
@@ -175,7 +175,7 @@ int ShareRun::WalkTexts(BestHits& best) {
   return code;
 }
 
-int ShareRun::CountTexts(const TextOrder& order) {
+int ShareRun::CountTexts(const PromiseOrder& order) {
   int code = SQLITE_OK;
   for (int64_t text = upper.texts.Next(-1); text >= 0 && code == SQLITE_OK;
        text = upper.texts.Next(text)) {

@@ -18,7 +18,7 @@
 #include "index/best_hits.h"
 #include "index/hit_display.h"
 #include "index/hit_score.h"
-#include "index/text_order.h"
+#include "index/promise_order.h"
 
 namespace fileindexd {
 
@@ -46,11 +46,10 @@ class ShareRun {
   int CountNames(IdSet& others);
   int VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit);
   int WalkTexts(BestHits& best);
-  int CountTexts(const TextOrder& order);
+  int CountTexts(const PromiseOrder& order);
   int WalkRows(BestHits& best);
   int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
   std::string BeginningsQuery() const;
-  bool AreAllLookedAt() const;
   int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
   int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
   int Answers(Candidate& candidate, bool& answers);

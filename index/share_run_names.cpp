@@ -11,6 +11,7 @@ namespace fileindexd {
 
 namespace {
 
+constexpr uint64_t FEW_NAMES = 2000;  // of no more than that, each is looked at
 constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
 
 }  // namespace
@@ -26,29 +27,13 @@ std::string ShareRun::BeginningsQuery() const {
   return query;
 }
 
-// Where the words stand in many more rows than there are names that can answer, looking at those is
-// less than reading which of all names begin so.
-bool ShareRun::AreAllLookedAt() const {
-  constexpr uint64_t MOST = 2000;      // of a word that is common in texts alone
-  constexpr double NAMES_OF_ONE = 64;  // are read while one row is looked at
-  if (upper.names.Count() > MOST) {
-    return false;
-  }
-  double held = 0;
-  for (const WordLeaf& leaf : asked.leaves) {
-    held += leaf.is_positive ? sets.CountOf(leaf) : 0;
-  }
-  return static_cast<double>(upper.names.Count()) * NAMES_OF_ONE < held;
-}
-
-// The best come first: those that begin with a word, as whole names do. Where they alone are many,
-// the youngest of them are compared by how many words they have; the rest comes as it is, the
-// youngest rows first.
+// Where they are many, those come first that begin with a word, as whole names do. Where these
+// alone are many, the youngest of them are compared by how many words they have. The rest is known
+// by which of the words it holds.
 int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   rest = upper.names;
   const std::string query = BeginningsQuery();
-  if (upper.names.Count() <= BLOCK || AreAllLookedAt() || !IsScored() || wanted == 0 ||
-      query.empty()) {
+  if (upper.names.Count() <= FEW_NAMES || !IsScored() || wanted == 0 || query.empty()) {
     return SQLITE_OK;
   }
   Statement* begins = nullptr;
@@ -87,8 +72,10 @@ int ShareRun::RankByLength(const std::string& query, std::vector<int64_t>& ids, 
   rank->BindText(1, query);
   std::vector<std::pair<double, int64_t>> ranked;
   for (code = rank->Step(); code == SQLITE_ROW; code = rank->Step()) {
-    if (upper.names.Has(rank->Int(0))) {
-      ranked.emplace_back(-sqlite3_column_double(rank->handle, 1), -rank->Int(0));
+    const int64_t id = rank->Int(0);
+    if (upper.names.Has(id)) {
+      const double rarity = score.Rarity(sets.PromiseOfName(id));
+      ranked.emplace_back(-sqlite3_column_double(rank->handle, 1) - rarity, -id);
     }
   }
   if (code != SQLITE_DONE) {
@@ -112,10 +99,10 @@ bool ShareRun::IsShort(int64_t id) const {
 int ShareRun::WalkNames(BestHits& best) {
   std::vector<int64_t> ids;
   IdSet rest;
-  const size_t block_size = AreAllLookedAt() ? SIZE_MAX : BLOCK;
+  const size_t block_size = upper.names.Count() <= FEW_NAMES ? FEW_NAMES : BLOCK;
   int code = NamesByRank(ids, rest);
+  PromiseOrder others(rest, [this](int64_t id) { return sets.PromiseOfName(id); });
   Block block;
-  int64_t last = INT64_MAX;  // that was taken of the rest: downwards, the youngest rows first
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     if (i % block_size == 0) {
       if (answered_by_name >= wanted && (wanted == 0 || BestComeFirst())) {
@@ -126,9 +113,7 @@ int ShareRun::WalkNames(BestHits& best) {
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 1.0);
     }
-    const bool is_ranked = i < ids.size();
-    last = is_ranked ? last : rest.Previous(last);
-    const int64_t id = is_ranked ? ids[i] : last;
+    const int64_t id = i < ids.size() ? ids[i] : others.Next();
     if (id < 0) {
       break;
     }

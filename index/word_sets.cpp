@@ -235,11 +235,19 @@ uint16_t WordSets::MarkOf(const WordLeaf& leaf, int64_t text) const {
   return mark != 0 || !Of(*leaf.node).texts.Has(text) ? mark : TextMark::Of(TextMark::TEXT, 1);
 }
 
-double WordSets::Promise(int64_t text) const {
+double WordSets::PromiseOfText(int64_t text) const {
   double promise = 0;
   for (const WordLeaf& leaf : asked.leaves) {
     promise +=
         leaf.is_positive ? WeightOf(leaf) * TextMark::Score(MarkOf(leaf, text), USUAL_LENGTH) : 0;
+  }
+  return promise;
+}
+
+double WordSets::PromiseOfName(int64_t entry) const {
+  double promise = 0;
+  for (const WordLeaf& leaf : asked.leaves) {
+    promise += leaf.is_positive && Of(*leaf.node).names.Has(entry) ? WeightOf(leaf) : 0;
   }
   return promise;
 }

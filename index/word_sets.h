@@ -62,7 +62,9 @@ class WordSets {
   // How a leaf that says what to find stands in a text.
   uint16_t MarkOf(const WordLeaf& leaf, int64_t text) const;
   // About how well a text answers all of them, by their weights.
-  double Promise(int64_t text) const;
+  double PromiseOfText(int64_t text) const;
+  // The same of a name: the weights of what it holds.
+  double PromiseOfName(int64_t entry) const;
 
  private:
   // Where a leaf is looked for.

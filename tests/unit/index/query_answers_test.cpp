@@ -191,6 +191,36 @@ TEST_F(QueryAnswersTest, ManyHitsKeepTheirPages) {
   EXPECT_EQ(pages, all);
 }
 
+TEST_F(QueryAnswersTest, ShortNamesStandAboveLongOnesThoughHundredsHoldTheWordInTheirMiddle) {
+  Names names = {"the whale.txt"};
+  for (int i = 0; i < 1000; ++i) {
+    names.push_back("a long tale of a whale " + std::to_string(i) + ".txt");
+  }
+  Fill("a", names);
+  question.shares = {"a"};
+  EXPECT_EQ(Paths("whale").front(), "/a/the whale.txt");
+}
+
+TEST_F(QueryAnswersTest, RareWordsOfNamesStandAboveCommonOnesThoughThousandsHoldThose) {
+  Names names = {"a walrus there.txt"};
+  for (int i = 0; i < 2500; ++i) {
+    names.push_back("a whale there " + std::to_string(i));
+  }
+  Fill("a", names);
+  question.shares = {"a"};
+  for (const char* text : {"walrus OR whale", "whale OR walr*"}) {
+    EXPECT_EQ(Paths(text).front(), "/a/a walrus there.txt") << text;
+  }
+
+  names = {"walrus there.txt"};
+  for (int i = 0; i < 2500; ++i) {
+    names.push_back("whale there " + std::to_string(i));
+  }
+  Fill("b", names);
+  question.shares = {"b"};
+  EXPECT_EQ(Paths("whale OR walrus").front(), "/b/walrus there.txt") << "all begin with a word";
+}
+
 TEST_F(QueryAnswersTest, SharesThatStayOpenShowWhatIsCommittedAndWhatIsMadeAnew) {
   Store({{"whale.txt", TextContent("sea")}});
   Asker asker;
