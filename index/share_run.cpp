@@ -14,8 +14,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t SCORED_TEXTS = 100;     // that are looked at before it is asked if that is enough
-constexpr uint64_t FEW_TEXTS = 500;      // of no more than that, each is looked at
 constexpr uint64_t FEW = 2000;           // are looked at rather than searched for in order
 constexpr uint64_t MOST_WALKED = 50000;  // rows in order, before the rest is asked otherwise
 
@@ -72,6 +70,12 @@ int ShareRun::Run(BestHits& best, uint64_t& total) {
   }
   total += answered;
   return code;
+}
+
+size_t ShareRun::BlockSize(const IdSet& candidates, const Sizes& sizes) const {
+  const size_t shares = std::max<size_t>(1, question.shares.size());
+  const size_t few = std::max(sizes.few / shares, 2 * sizes.least);
+  return candidates.Count() <= few ? few : std::max(sizes.block / shares, sizes.least);
 }
 
 int ShareRun::Answers(Candidate& candidate, bool& answers) {
@@ -156,7 +160,7 @@ int ShareRun::WalkTexts(BestHits& best) {
     }
     return code;
   }
-  const size_t block_size = upper.texts.Count() <= FEW_TEXTS ? FEW_TEXTS : SCORED_TEXTS;
+  const size_t block_size = BlockSize(upper.texts, TEXTS);
   PromiseOrder order(upper.texts, [this](int64_t text) { return sets.PromiseOfText(text); });
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.

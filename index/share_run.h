@@ -42,6 +42,17 @@ class ShareRun {
     bool of_texts = false;
   };
 
+  // How many are looked at before it is asked if that is enough: of no more than `few`, each; of
+  // more, blocks. Both are shared out among the shares that are asked, down to `least`.
+  struct Sizes {
+    size_t few;
+    size_t block;
+    size_t least;
+  };
+  static constexpr Sizes NAMES = {.few = 500, .block = 300, .least = 64};
+  static constexpr Sizes TEXTS = {.few = 500, .block = 100, .least = 32};
+  size_t BlockSize(const IdSet& candidates, const Sizes& sizes) const;
+
   int WalkNames(BestHits& best);
   int CountNames(IdSet& others);
   int VisitEntriesOf(int64_t text, const std::function<int(Candidate& candidate)>& visit);
@@ -51,7 +62,7 @@ class ShareRun {
   int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
   std::string BeginningsQuery() const;
   int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
-  int NamesByRank(std::vector<int64_t>& ids, IdSet& rest);
+  int NamesByRank(size_t block_size, std::vector<int64_t>& ids, IdSet& rest);
   int Answers(Candidate& candidate, bool& answers);
   int AddHit(Candidate& candidate, BestHits& best, Block& block);
   // Whether of a name only what its score needs is read, until it is known to be among the best.

@@ -9,13 +9,6 @@
 
 namespace fileindexd {
 
-namespace {
-
-constexpr uint64_t FEW_NAMES = 2000;  // of no more than that, each is looked at
-constexpr size_t BLOCK = 300;  // names that are looked at before it is asked if that is enough
-
-}  // namespace
-
 // Names that begin with one of the words, in the full-text table's language.
 std::string ShareRun::BeginningsQuery() const {
   std::string query;
@@ -30,10 +23,10 @@ std::string ShareRun::BeginningsQuery() const {
 // Where they are many, those come first that begin with a word, as whole names do. Where these
 // alone are many, the youngest of them are compared by how many words they have. The rest is known
 // by which of the words it holds.
-int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
+int ShareRun::NamesByRank(size_t block_size, std::vector<int64_t>& ids, IdSet& rest) {
   rest = upper.names;
   const std::string query = BeginningsQuery();
-  if (upper.names.Count() <= FEW_NAMES || !IsScored() || wanted == 0 || query.empty()) {
+  if (upper.names.Count() <= block_size || !IsScored() || wanted == 0 || query.empty()) {
     return SQLITE_OK;
   }
   Statement* begins = nullptr;
@@ -43,7 +36,8 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   }
   begins->BindText(1, query);
   IdSet first;
-  for (code = begins->Step(); code == SQLITE_ROW && first.Count() <= BLOCK; code = begins->Step()) {
+  for (code = begins->Step(); code == SQLITE_ROW && first.Count() <= block_size;
+       code = begins->Step()) {
     if (upper.names.Has(begins->Int(0))) {
       first.Add(begins->Int(0));
     }
@@ -51,7 +45,7 @@ int ShareRun::NamesByRank(std::vector<int64_t>& ids, IdSet& rest) {
   if (StepError(code) != SQLITE_OK) {
     return code;
   }
-  if (first.Count() > BLOCK) {
+  if (first.Count() > block_size) {
     return RankByLength("(" + query + ") AND " + Quoted(NAME_END), ids, rest);
   }
   ids = first.Ids();
@@ -99,8 +93,8 @@ bool ShareRun::IsShort(int64_t id) const {
 int ShareRun::WalkNames(BestHits& best) {
   std::vector<int64_t> ids;
   IdSet rest;
-  const size_t block_size = upper.names.Count() <= FEW_NAMES ? FEW_NAMES : BLOCK;
-  int code = NamesByRank(ids, rest);
+  const size_t block_size = BlockSize(upper.names, NAMES);
+  int code = NamesByRank(block_size, ids, rest);
   PromiseOrder others(rest, [this](int64_t id) { return sets.PromiseOfName(id); });
   Block block;
   for (size_t i = 0; code == SQLITE_OK; ++i) {
