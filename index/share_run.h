@@ -49,8 +49,8 @@ class ShareRun {
     size_t block;
     size_t least;
   };
-  static constexpr Sizes NAMES = {.few = 500, .block = 300, .least = 64};
-  static constexpr Sizes TEXTS = {.few = 500, .block = 100, .least = 32};
+  static constexpr Sizes NAMES = {.few = 400, .block = 200, .least = 40};
+  static constexpr Sizes TEXTS = {.few = 400, .block = 100, .least = 25};
   size_t BlockSize(const IdSet& candidates, const Sizes& sizes) const;
 
   int WalkNames(BestHits& best);

@@ -193,7 +193,7 @@ TEST_F(QueryAnswersTest, ManyHitsKeepTheirPages) {
 
 TEST_F(QueryAnswersTest, ShortNamesStandAboveLongOnesThoughHundredsHoldTheWordInTheirMiddle) {
   Names names = {"the whale.txt"};
-  for (int i = 0; i < 400; ++i) {
+  for (int i = 0; i < 300; ++i) {
     names.push_back("a long tale of a whale " + std::to_string(i) + ".txt");
   }
   Fill("a", names);
