@@ -29,12 +29,7 @@ class ServerTest : public MountTest {
     if (IsSkipped()) {
       return;
     }
-    MountTmpfs("/run");
-    if (struct stat run = {}, var_run = {}; stat("/run", &run) != 0 ||
-                                            stat("/var/run", &var_run) != 0 ||
-                                            run.st_ino != var_run.st_ino) {
-      Bind("/run", "/var/run");
-    }
+    MountOwnRun();
     server = std::make_unique<Server>();
     std::string error;
     ASSERT_TRUE(server->Open(error)) << error;

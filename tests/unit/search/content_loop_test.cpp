@@ -6,7 +6,6 @@
 #include <poll.h>
 #include <signal.h>
 #include <spawn.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 
 #include <ctime>
@@ -35,12 +34,7 @@ class ContentLoopTest : public MountTest {
     if (IsSkipped()) {
       return;
     }
-    MountTmpfs("/run");
-    if (struct stat run = {}, var_run = {}; stat("/run", &run) != 0 ||
-                                            stat("/var/run", &var_run) != 0 ||
-                                            run.st_ino != var_run.st_ino) {
-      Bind("/run", "/var/run");
-    }
+    MountOwnRun();
     ForgetScripted();
     Pool().running.clear();
     Pool() = ScriptedPool();

@@ -3,6 +3,7 @@
 
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstdlib>
@@ -63,6 +64,15 @@ void MountTest::MountTmpfs(const std::string& at) {
 void MountTest::Bind(const std::string& from, const std::string& at) {
   ASSERT_EQ(mount(from.c_str(), at.c_str(), nullptr, MS_BIND, nullptr), 0) << at;
   mounted.push_back(at);
+}
+
+void MountTest::MountOwnRun() {
+  MountTmpfs("/run");
+  struct stat run = {};
+  struct stat var_run = {};
+  if (stat("/run", &run) != 0 || stat("/var/run", &var_run) != 0 || run.st_ino != var_run.st_ino) {
+    Bind("/run", "/var/run");
+  }
 }
 
 void MountTest::Unmount(const std::string& at) {

@@ -21,6 +21,7 @@ class MountTest : public StateTest {
   void MountImage(const std::string& type, const std::string& at);  // a new one, "ext4" …
   void MountTmpfs(const std::string& at);
   void Bind(const std::string& from, const std::string& at);
+  void MountOwnRun();  // for sockets and pid files of the test's own, by either of its names
   void Unmount(const std::string& at);
   void Run(const std::string& command);
   // Folders on the way are made.
