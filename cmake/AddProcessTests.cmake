@@ -13,7 +13,7 @@ function(add_process_tests label)
     string(REPLACE "/" "_" name "${label}_${name}")
     add_test(NAME ${name} COMMAND "${PYTHON3}" "${CMAKE_CURRENT_SOURCE_DIR}/${file}")
     set_tests_properties(${name} PROPERTIES
-      LABELS ${label} TIMEOUT 900 SKIP_RETURN_CODE 77
+      LABELS ${label} TIMEOUT ${FILEINDEXD_TEST_TIMEOUT} SKIP_RETURN_CODE 77
       ENVIRONMENT "FILEINDEXD_BIN_DIR=$<TARGET_FILE_DIR:fileindexd>;PYTHONPATH=${PROJECT_SOURCE_DIR}/tests/process;PYTHONDONTWRITEBYTECODE=1")
   endforeach()
 endfunction()

@@ -7,7 +7,7 @@
 # THREADS says that the program has more than one of them: the others have nothing to show to the
 # thread sanitizer, and are built for it by name alone.
 function(add_unit_test name)
-  cmake_parse_arguments(arg "THREADS" "TIMEOUT" "LIBS;SOURCES;LABELS" ${ARGN})
+  cmake_parse_arguments(arg "THREADS" "" "LIBS;SOURCES;LABELS" ${ARGN})
   add_executable(${name} ${arg_SOURCES})
   target_link_libraries(${name} PRIVATE project_flags ${arg_LIBS} GTest::gtest_main GTest::gmock)
   set_target_properties(${name} PROPERTIES IS_TEST ON
@@ -17,13 +17,23 @@ function(add_unit_test name)
     return()
   endif()
   add_test(NAME ${name} COMMAND ${name} --gtest_brief=1)
-  if(NOT arg_TIMEOUT)
-    set(arg_TIMEOUT 1200)  # a test that hangs; no time decides another
-  endif()
   if(NOT arg_LABELS)
     set(arg_LABELS unit)
   endif()
-  set_tests_properties(${name} PROPERTIES TIMEOUT ${arg_TIMEOUT} LABELS "${arg_LABELS}")
+  set_tests_properties(${name} PROPERTIES TIMEOUT ${FILEINDEXD_TEST_TIMEOUT}
+    LABELS "${arg_LABELS}")
+endfunction()
+
+# add_long_test(NAME PROGRAM [option…]): one more entry for a unit test, with all that takes its
+# time; the program's own entry stays short however the tests are run.
+function(add_long_test name program)
+  if(NOT TEST ${program})
+    return()
+  endif()
+  add_test(NAME ${name} COMMAND ${program} --gtest_brief=1 ${ARGN})
+  set_tests_properties(${program} PROPERTIES ENVIRONMENT FILEINDEXD_TEST_SCALE=normal)
+  set_tests_properties(${name} PROPERTIES
+    LABELS long TIMEOUT 14400 ENVIRONMENT FILEINDEXD_TEST_SCALE=long)
 endfunction()
 
 # add_test_library(NAME LIBS lib… SOURCES file…): what several of these programs have in common.
