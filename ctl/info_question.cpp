@@ -26,7 +26,7 @@ int CheckQuestion(const std::string& text, const std::vector<Share>& shares) {
   Answer answer;  // of no share: only the question is looked at
   std::string error;
   if (!Ask(question, answer, error)) {
-    return Fail(EXIT_USAGE, "info: --query: %s: %s", text.c_str(), error.c_str());
+    return Fail(EXIT_USAGE, "info: --query: %s", error.c_str());
   }
   return EXIT_DONE;
 }

@@ -181,7 +181,7 @@ int Search(const Arguments& arguments) {
   Answer answer;
   std::string error;
   if (!Ask(question, answer, error)) {
-    return Fail(EXIT_USAGE, "search: %s: %s", arguments.query.c_str(), error.c_str());
+    return Fail(EXIT_USAGE, "search: %s", error.c_str());
   }
 
   const bool has_more = tells_of_more && answer.hits.size() > USUAL_HITS;

@@ -78,9 +78,7 @@ class Explainer {
       return code;
     }
     Reason reason;
-    // What came from an option has no text.
-    reason.part = node.end > node.start ? asked.text.substr(node.start, node.end - node.start)
-                                        : QueryText(node);
+    reason.part = PartText(node);
     int code = check.Matches(node, candidate, reason.matches);
     if (code == SQLITE_OK && (reason.matches || node.part == Part::RANGE ||
                               node.part == Part::NEAR || node.part == Part::KIND)) {
@@ -88,6 +86,16 @@ class Explainer {
     }
     explanation.reasons.push_back(std::move(reason));
     return code;
+  }
+
+  // As it was written; what came from an option was not.
+  std::string PartText(const QueryNode& node) const {
+    if (node.end == node.start) {
+      return QueryText(node);
+    }
+    const std::string written = asked.text.substr(node.start, node.end - node.start);
+    return node.shared_field == nullptr ? written
+                                        : std::string(node.shared_field) + ":(" + written + ")";
   }
 
   int Where(const QueryNode& node, Candidate& candidate, std::string& where) {

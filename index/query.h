@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "base/content.h"
+#include "index/query_error.h"
 
 namespace fileindexd {
 
@@ -58,10 +59,12 @@ struct QueryNode {
   Part part = Part::WORD;
   size_t start = 0;  // bytes of the question
   size_t end = 0;
-  std::vector<QueryNode> below;  // AND, OR: two at least
+  const char* shared_field = nullptr;  // in front of the brackets that it stands in; null: none
+  std::vector<QueryNode> below;        // AND, OR: two at least
 
   // WORD, EXACT_NAME
   std::string text;
+  size_t text_at = 0;  // where it stands in the question
   Scope scope = Scope::ANY;
   bool is_phrase = false;
   bool is_beginning = false;                 // the last word may go on
@@ -84,14 +87,6 @@ struct QueryNode {
   Property property = Property::FILE;
   ContentStage stage = ContentStage::DONE;
   Presence presence = Presence::TEXT;
-};
-
-struct QueryError {
-  std::string what;
-  size_t at = 0;  // byte of the question
-
-  // One line: what, and where.
-  std::string Line(std::string_view question) const;
 };
 
 // `now`, seconds since the epoch, is what "today" and "-7d" count from; days are those of the local

@@ -83,18 +83,26 @@ const NamedField* FindField(std::string_view name) {
 }
 
 const char* NearField(std::string_view name) {
-  if (name.size() < 2) {
-    return nullptr;  // "C:\\x" is a place
+  constexpr size_t SHORTEST = 4;
+  constexpr size_t LONG = 6;
+  if (name.size() < SHORTEST) {
+    return nullptr;
   }
   std::string lower(name);
   std::transform(lower.begin(), lower.end(), lower.begin(),
                  [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
+  const char* near = nullptr;
+  int nearest = 3;
   for (const NamedField& field : FIELDS) {
-    if (EditDistance(lower, field.name, 1) == 1) {
-      return field.name;
+    const bool is_long = name.size() >= LONG && std::string_view(field.name).size() >= LONG;
+    const int most = is_long ? 2 : 1;
+    const int distance = EditDistance(lower, field.name, most);
+    if (distance <= most && distance < nearest) {
+      near = field.name;
+      nearest = distance;
     }
   }
-  return nullptr;
+  return near;
 }
 
 const char* FieldName(ContentField field) {

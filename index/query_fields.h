@@ -40,7 +40,9 @@ bool TakesRange(QueryField field);
 
 // Letter case does not count. Null: no such field.
 const NamedField* FindField(std::string_view name);
-// A field's name that differs from `name`, of at least two letters, by one slip; null: none.
+// The field's name that is nearest to `name` and can be meant by it: one slip away from a name of
+// at least four letters, or two where both have at least six. Null: none. What is shorter is near
+// to some field too often ("go:generate", "id:5").
 const char* NearField(std::string_view name);
 // The name that users know a text or number field by.
 const char* FieldName(ContentField field);

@@ -4,7 +4,8 @@
 //   question  = any
 //   any       = all { "OR" all }
 //   all       = part { [ "AND" ] part }
-//   part      = ( "-" | "NOT" ) part | "(" any ")" | field ":" value | words
+//   part      = ( "-" | "NOT" ) part | "(" any ")" | field ":" ( value | "(" values ")" ) | words
+//   values    = any    where each of words is a value of that field, and no other field stands
 //   words     = '"' { character } '"' [ "*" ] | word
 //   word      = characters up to a blank, or up to a ")" that closes a group; "*" at its end, and
 //               nowhere else: what begins with it. In quotes it says nothing
@@ -18,13 +19,14 @@
 //               alone
 //
 // AND, OR and NOT count in capitals only; alone they are words. What stands before a colon and is
-// no field belongs to the word, unless it can only be meant as one (IsMistakenField). A word
+// no field belongs to the word, unless it can only be meant as one (query_slips.h). A word
 // without a letter or a digit ("++") is looked for as it stands, in the name.
 #include <algorithm>
 #include <utility>
 
 #include "index/query.h"
 #include "index/query_parts.h"
+#include "index/query_slips.h"
 
 namespace fileindexd {
 
@@ -33,10 +35,6 @@ namespace {
 constexpr size_t MOST_BYTES = 4096;
 constexpr size_t MOST_PARTS = 100;
 constexpr int MOST_DEPTH = 50;
-
-bool IsBlank(char c) {
-  return static_cast<unsigned char>(c) <= 0x20 || c == 0x7f;
-}
 
 class Parser {
  public:
@@ -51,13 +49,11 @@ class Parser {
   bool ReadPart(QueryNode& node, int depth);
   bool ReadGroup(QueryNode& node, int depth);
   bool ReadNot(QueryNode& node, size_t length, int depth);
-  bool ReadLeaf(QueryNode& node);
+  bool ReadFieldGroup(const NamedField& field, QueryNode& node, int depth);
+  bool ReadLeaf(QueryNode& node, int depth);
   bool ReadQuoted(Value& value);
   void ReadBare(Value& value);
   const NamedField* TakeField();
-  bool LacksColon() const;
-  bool IsMistakenField(std::string& meant) const;
-  size_t NameEnd() const;
 
   void SkipBlanks();
   bool IsAt(std::string_view keyword) const;  // as a word of its own
@@ -68,7 +64,8 @@ class Parser {
   time_t now;
   QueryError& error;
   size_t at = 0;
-  int open = 0;  // groups
+  int open = 0;                        // groups
+  const NamedField* shared = nullptr;  // of all in the group that is open; null: each its own
   size_t leaves = 0;
 };
 
@@ -201,7 +198,7 @@ bool Parser::ReadPart(QueryNode& node, int depth) {
   if (IsAt("NOT")) {
     return ReadNot(node, 3, depth);
   }
-  return IsNegation() ? ReadNot(node, 1, depth) : ReadLeaf(node);
+  return IsNegation() ? ReadNot(node, 1, depth) : ReadLeaf(node, depth);
 }
 
 bool Parser::ReadGroup(QueryNode& node, int depth) {
@@ -235,59 +232,26 @@ bool Parser::ReadNot(QueryNode& node, size_t length, int depth) {
     return false;
   }
   negation.end = at;
+  negation.shared_field = shared == nullptr ? nullptr : shared->name;
   node = std::move(negation);
   return true;
 }
 
-// Where the letters end that begin here.
-size_t Parser::NameEnd() const {
-  size_t end = at;
-  while (end < text.size() &&
-         ((text[end] >= 'a' && text[end] <= 'z') || (text[end] >= 'A' && text[end] <= 'Z'))) {
-    ++end;
-  }
-  return end;
+bool Parser::ReadFieldGroup(const NamedField& field, QueryNode& node, int depth) {
+  shared = &field;
+  const bool is_read = ReadGroup(node, depth);
+  shared = nullptr;
+  return is_read;
 }
 
 // The field in front of a colon, if it is one.
 const NamedField* Parser::TakeField() {
-  const size_t end = NameEnd();
-  if (end == text.size() || text[end] != ':') {
-    return nullptr;
-  }
-  const NamedField* field = FindField(std::string_view(text).substr(at, end - at));
-  if (field != nullptr) {
-    at = end + 1;
-  }
+  const std::string_view rest = std::string_view(text).substr(at);
+  const size_t letters = LettersAtStart(rest);
+  const bool has_colon = letters < rest.size() && rest[letters] == ':';
+  const NamedField* field = has_colon ? FindField(rest.substr(0, letters)) : nullptr;
+  at += field == nullptr ? 0 : letters + 1;
   return field;
-}
-
-// "size>10M".
-bool Parser::LacksColon() const {
-  const size_t end = NameEnd();
-  if (end + 1 >= text.size() || (text[end] != '<' && text[end] != '>') || IsBlank(text[end + 1])) {
-    return false;
-  }
-  const NamedField* field = FindField(std::string_view(text).substr(at, end - at));
-  return field != nullptr && TakesRange(field->field);
-}
-
-// What can only be meant for a field, and is none: a comparison or a quote behind a colon, or a
-// name that is one slip away from a field's. Words of names and texts hold colons too: addresses
-// ("http://x") and names in programs ("fs::path").
-bool Parser::IsMistakenField(std::string& meant) const {
-  const size_t end = NameEnd();
-  if (end == at || end + 1 >= text.size() || text[end] != ':' || IsBlank(text[end + 1])) {
-    return false;
-  }
-  const std::string_view value = std::string_view(text).substr(end + 1);
-  if (value.starts_with("//") || value.starts_with(':')) {
-    return false;
-  }
-  const char* near = NearField(std::string_view(text).substr(at, end - at));
-  meant = near == nullptr ? "" : near;
-  const char first = value.front();
-  return first == '<' || first == '>' || first == '"' || near != nullptr;
 }
 
 bool Parser::ReadQuoted(Value& value) {
@@ -322,23 +286,25 @@ void Parser::ReadBare(Value& value) {
   value.text = text.substr(value.at, at - value.at);
 }
 
-bool Parser::ReadLeaf(QueryNode& node) {
+bool Parser::ReadLeaf(QueryNode& node, int depth) {
   if (++leaves > MOST_PARTS) {
     return Fail("too many words", at);
   }
   const size_t start = at;
   const NamedField* field = TakeField();
-  const std::string name = text.substr(at, NameEnd() - at);
-  if (field == nullptr && LacksColon()) {
-    return Fail("a colon is missing behind '" + name + "' (a word with " + text[NameEnd()] +
-                    " stands in quotes)",
-                start);
+  if (field != nullptr && shared != nullptr) {
+    return Fail(
+        "no field stands within the brackets of another, " + std::string(shared->name) + ":( )",
+        start);
   }
-  std::string meant;
-  if (field == nullptr && IsMistakenField(meant)) {
-    return Fail("there is no field '" + name + "'" + (meant.empty() ? "" : "; '" + meant + "'?") +
-                    " (a word with a colon stands in quotes)",
-                start);
+  if (field != nullptr && at < text.size() && text[at] == '(') {
+    return ReadFieldGroup(*field, node, depth);
+  }
+  if (field == nullptr) {
+    const std::string why = WhyMeantForField(std::string_view(text).substr(start));
+    if (!why.empty()) {
+      return Fail(why, start);
+    }
   }
   Value value;
   if (at < text.size() && text[at] == '"') {
@@ -350,6 +316,8 @@ bool Parser::ReadLeaf(QueryNode& node) {
   }
   node.start = start;
   node.end = at;
+  node.shared_field = shared == nullptr ? nullptr : shared->name;
+  field = field == nullptr ? shared : field;
   return field == nullptr ? FillWords(value, node, error)
                           : FillField(*field, value, now, node, error);
 }

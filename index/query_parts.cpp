@@ -99,6 +99,7 @@ bool FillName(const Value& value, QueryNode& node, QueryError& error) {
       return false;
     }
     node.part = Part::EXACT_NAME;
+    node.text_at = value.at;
     node.text = value.text;
     return true;
   }
@@ -110,7 +111,7 @@ bool FillShare(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::SHARE;
   node.names = SplitAt(value.text, ',');
   return std::all_of(node.names.begin(), node.names.end(), IsValidShareName) ||
-         Fail(error, "'" + value.text + "' is no name of a share", value.at);
+         Fail(error, Cited(value.text) + " is no name of a share", value.at);
 }
 
 bool FillRange(Column column, const Value& value, time_t now, QueryNode& node, QueryError& error) {
@@ -148,7 +149,7 @@ bool FillKind(const Value& value, QueryNode& node, QueryError& error) {
     const std::optional<Kind> kind = KindFromText(name);
     if (!kind.has_value()) {
       return Fail(error,
-                  "'" + name + "' is no kind: document, audio, video, photo, other or folder",
+                  Cited(name) + " is no kind: document, audio, video, photo, other or folder",
                   value.at);
     }
     node.numbers.push_back(static_cast<int64_t>(*kind));
@@ -165,7 +166,7 @@ bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
       return Fail(error, "ext: takes no '*'; names with gaps are found by name:*.jp*", value.at);
     }
     if (name.empty() || name.find('/') != std::string::npos) {
-      return Fail(error, "'" + value.text + "' is no ending of names like pdf or jpg,png",
+      return Fail(error, Cited(value.text) + " is no ending of names like pdf or jpg,png",
                   value.at);
     }
   }
@@ -202,12 +203,12 @@ bool FillOwner(const Value& value, QueryNode& node, QueryError& error) {
     const int failed = UserNumber(name, user);
     if (failed != 0) {
       return Fail(error,
-                  "cannot look up the user '" + name +
-                      "': " + std::generic_category().message(failed) + "; a number needs none",
+                  "cannot look up the user " + Cited(name) + ": " +
+                      std::generic_category().message(failed) + "; a number needs none",
                   value.at);
     }
     if (!user.has_value()) {
-      return Fail(error, "there is no user '" + name + "'", value.at);
+      return Fail(error, "there is no user " + Cited(name), value.at);
     }
     node.numbers.push_back(*user);
   }
@@ -217,7 +218,7 @@ bool FillOwner(const Value& value, QueryNode& node, QueryError& error) {
 bool FillUnder(const Value& value, QueryNode& node, QueryError& error) {
   const std::optional<std::string> path = NormalPath(value.text);
   if (!path.has_value()) {
-    return Fail(error, "'" + value.text + "' is not a plain absolute path", value.at);
+    return Fail(error, Cited(value.text) + " is not a plain absolute path", value.at);
   }
   node.part = Part::UNDER;
   node.names = {*path};
@@ -287,11 +288,12 @@ bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
       return Fail(error, "nothing stands between the quotes", value.at - 1);
     }
     if (node.scope == Scope::FIELD || node.scope == Scope::TEXT) {
-      return Fail(error, "'" + value.text + "' is no word", value.at);
+      return Fail(error, Cited(value.text) + " is no word", value.at);
     }
     return FillSign(value, node, error);
   }
   node.part = Part::WORD;
+  node.text_at = value.at;
   node.text = value.is_quoted ? value.text.substr(0, end) : value.text;
   node.is_phrase = value.is_quoted;
   node.is_beginning = value.is_quoted ? value.has_star : value.text.ends_with('*');

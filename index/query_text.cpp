@@ -1,5 +1,4 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include <algorithm>
 #include <string>
 
 #include "index/kind.h"
@@ -112,30 +111,6 @@ std::string QueryText(const QueryNode& node) {
       break;
   }
   return std::string("content:") + STAGES[static_cast<size_t>(node.stage)];
-}
-
-std::string QueryError::Line(std::string_view question) const {
-  constexpr size_t SHOWN = 30;
-  std::string line = what;
-  std::replace_if(
-      line.begin(), line.end(), [](char c) { return static_cast<unsigned char>(c) < 0x20; }, ' ');
-  size_t characters = 1;
-  for (size_t i = 0; i < std::min(at, question.size()); ++i) {
-    characters += (static_cast<unsigned char>(question[i]) & 0xc0) != 0x80 ? 1 : 0;
-  }
-  if (at >= question.size()) {
-    return line +
-           (question.empty() ? "" : " (character " + std::to_string(characters) + ", at the end)");
-  }
-  size_t end = std::min(at + SHOWN, question.size());
-  while (end < question.size() && (static_cast<unsigned char>(question[end]) & 0xc0) == 0x80) {
-    ++end;
-  }
-  std::string shown(question.substr(at, end - at));
-  std::replace_if(
-      shown.begin(), shown.end(),
-      [](char c) { return static_cast<unsigned char>(c) <= 0x20 || c == 0x7f; }, ' ');
-  return line + " (character " + std::to_string(characters) + ", at: " + shown + ")";
 }
 
 }  // namespace fileindexd

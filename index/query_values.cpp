@@ -7,6 +7,7 @@
 #include <cmath>
 #include <optional>
 
+#include "index/query_error.h"
 #include "index/query_times.h"
 
 namespace fileindexd {
@@ -173,7 +174,7 @@ bool ReadRange(std::string_view text, ValueForm form, time_t now, ValueRange& ra
     const std::optional<Point> read = PointOf(value, form, now);
     if (!read.has_value()) {
       at = static_cast<size_t>(value.data() - text.data());
-      what = (value.empty() ? "a value is missing: " : "'" + std::string(value) + "' is not ");
+      what = (value.empty() ? "a value is missing: " : Cited(value) + " is not ");
       what += Expected(form);
     }
     return read;
@@ -264,7 +265,7 @@ bool ParseCircle(std::string_view text, Circle& circle, std::string& what) {
   const std::optional<double> longitude = Decimal(values[1]);
   const std::optional<double> radius = Decimal(distance);
   if (count != 3 || !latitude.has_value() || !longitude.has_value() || !radius.has_value()) {
-    what = "'" + std::string(text) + "' is not LATITUDE,LONGITUDE,RADIUS like 52.52,13.40,2km";
+    what = Cited(text) + " is not LATITUDE,LONGITUDE,RADIUS like 52.52,13.40,2km";
     return false;
   }
   if (std::fabs(*latitude) > 90 || std::fabs(*longitude) > 180 || *radius <= 0) {

@@ -24,6 +24,13 @@ TEST_F(ExplainTest, AnIndexThatCannotBeReadIsSaid) {
   EXPECT_EQ(Reasons("a.txt", "a"), Names({"error: the index is damaged"}));
 }
 
+TEST_F(ExplainTest, PartsInBracketsAreToldWithTheirField) {
+  Empty({"a.txt"});
+  EXPECT_EQ(
+      Reasons("a.txt", "name:(a OR b) name:(txt -\"c\") (a)"),
+      Names({"name:(a): name", "no name:(b): ", "name:(txt): name", "name:(-\"c\"): ", "a: name"}));
+}
+
 TEST_F(ExplainTest, TimesBeforeTheEpochAreRoundedDown) {
   setenv("TZ", "UTC", 1);
   tzset();

@@ -267,7 +267,7 @@ TEST_F(QueryAnswersTest, SharesAreNamedInQuestions) {
   question.text = "x share:c";
   std::string error;
   EXPECT_FALSE(Ask(question, answer, error));
-  EXPECT_EQ(error, "there is no such share (character 3, at: share:c)");
+  EXPECT_EQ(error, "x share:c: there is no such share (character 3, at: share:c)");
 }
 
 TEST_F(QueryAnswersTest, ReasonsTellWhyPartByPart) {

@@ -282,11 +282,13 @@ TEST_F(QueryAttributesTest, OptionsNarrowLikeParts) {
   question.kind = Kind::PHOTO;
   question.under = At("d");
   EXPECT_EQ(Hits("a OR b"), Names({"d/a.jpg"}));
-  EXPECT_EQ(Hits("-b"), Names({"error: this says only what not to find; add what to find, as in "
-                               "kind:document (character 1, at: -b)"}));
-  EXPECT_EQ(Hits("a OR (b OR -c -d)"),
-            Names({"error: this says only what not to find; add what to find, as in kind:document "
-                   "(character 12, at: -c -d))"}));
+  EXPECT_EQ(Hits("-b"),
+            Names({"error: -b: this says only what not to find; add what to find, as in "
+                   "kind:document (character 1, at: -b)"}));
+  EXPECT_EQ(
+      Hits("a OR (b OR -c -d)"),
+      Names({"error: a OR (b OR -c -d): this says only what not to find; add what to find, as "
+             "in kind:document (character 12, at: -c -d))"}));
 }
 
 }  // namespace fileindexd

@@ -199,6 +199,9 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
       {"near:52.5163,13.3777,2km", {"img_2024.jpg"}},
       {"near:48.8584,2.2945,500m", {"paris.png"}},
       {"has:artist -has:album", {"song.mp3"}},
+      {"name:(invoice OR receipt)", {"invoice 2024.txt"}},
+      {"title:(moby -\"white whale\")",
+       {"annual report 2024.pdf", "annual report copy.pdf", "report.pdf"}},
   };
   const Names examples = Examples();
   const std::set<std::string> known(examples.begin(), examples.end());
@@ -209,15 +212,17 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
 }
 
 TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
-  for (const char* text : {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "size>1G",
-                           "size: 1G", "share:data", "under:/srv/data/projects", "size:<0",
-                           "rating:>5", "modified:2024-06..2024-01", "near:52.5,13.4,0"}) {
+  for (const char* text :
+       {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "midifed:2024", "size>1G", "ext=pdf",
+        "name:(a title:b)", "size: 1G", "share:data", "under:/srv/data/projects", "size:<0",
+        "rating:>5", "modified:2024-06..2024-01", "near:52.5,13.4,0"}) {
     const Names hits = Hits(text);
     ASSERT_EQ(hits.size(), 1U) << text;
     EXPECT_TRUE(hits[0].starts_with("error: ")) << text;
   }
   EXPECT_EQ(Hits("Kind:DOCUMENT -draft"), Names());
-  for (const char* text : {"12:30", "http://example.org", "fs::path", "\"sise:1G\""}) {
+  for (const char* text :
+       {"12:30", "http://example.org", "fs::path", "go:generate", "\"sise:1G\""}) {
     EXPECT_EQ(Hits(text), Names()) << text;
   }
 }
@@ -239,6 +244,8 @@ TEST_F(QueryManualTest, WhatItSaysIsTheSameIsTheSame) {
            {"modified:-400d..now", "modified:-400d", "modified:>=-400d", "modified:>=-9600h"},
            {"path:projects/2024", "path:projects*2024"},
            {"annual report", "annual AND report"},
+           {"name:(annual OR invoice)", "name:annual OR name:invoice"},
+           {"ext:(pdf OR jpg)", "ext:pdf,jpg"},
            {"name:report -draft", "name:report NOT draft"}}) {
     const Names hits = Sorted(same.front());
     EXPECT_FALSE(hits.empty()) << same.front();

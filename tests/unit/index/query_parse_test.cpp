@@ -59,6 +59,54 @@ TEST_F(QueryParseTest, OperatorsBindAsWritten) {
   });
 }
 
+TEST_F(QueryParseTest, AFieldGoesForAllWithinTheBracketsBehindIt) {
+  ExpectAll({
+      {"name:(a OR b)", "(name:a OR name:b)"},
+      {"name:(a b)", "(name:a name:b)"},
+      {"name:(a)", "name:a"},
+      {"x name:(a OR b) y", "(x (name:a OR name:b) y)"},
+      {"name:(a -b)", "(name:a -name:b)"},
+      {"name:(a NOT b AND c)", "(name:a -name:b name:c)"},
+      {"-name:(a OR b) x", "(-(name:a OR name:b) x)"},
+      {"x name:(-a)", "(x -name:a)"},
+      {"(name:(a OR b) OR c) d", "(((name:a OR name:b) OR c) d)"},
+      {"name:(a (b OR c))", "(name:a (name:b OR name:c))"},
+      {"name:( a* OR *b* OR \"c d\" )", "(name:a* OR name:*b* OR name:\"c d\")"},
+      {"title:(\"moby dick\" OR whale*)", "(title:\"moby dick\" OR title:whale*)"},
+      {"text:(a \"b c\"*) d", "((text:a text:\"b c\"*) d)"},
+      {"path:(a/b OR c)", "(path:*a/b* OR path:*c*)"},
+      {"NAME:(a) OR tag:(b)", "(name:a OR keywords:b)"},
+      {"name:(12:30 c:)", "(name:12:30 name:c:)"},
+      {"name:(copy(1) x)", "(name:copy(1) name:x)"},
+      {"name:(a)b", "(name:a b)"},
+      {"name:(a)name:b", "(name:a name:b)"},
+      {"name:(a OR b)author:(c)", "((name:a OR name:b) author:c)"},
+      {"name:(or and not)", "(name:or name:and name:not)"},
+      {"kind:(photo OR video)", "(kind:photo OR kind:video)"},
+      {"ext:(pdf OR jpg,png)", "(ext:pdf OR ext:jpg,png)"},
+      {"has:(artist -album)", "(has:artist -has:album)"},
+      {"size:(>1K <1M)", "(size[1025..] size[..1048575])"},
+      {"name:\"(a\" b", "(name:\"(a\" b)"},
+      {"name:*(1)*", "name:*(1)*"},
+  });
+}
+
+TEST_F(QueryParseTest, WhatIsWrongInBracketsBehindAFieldIsShown) {
+  ExpectAll({
+      {"name:(", "?6"},           {"name:(a", "?5"},
+      {"x name:(a OR", "?12"},    {"name:()", "?6"},
+      {"name:(a OR)", "?10"},     {"name:(OR a)", "?6"},
+      {"name:(a title:b)", "?8"}, {"name:(a (b OR author:c))", "?14"},
+      {"name:(title:(a))", "?6"}, {"name:(-size:1)", "?7"},
+      {"name:(a name:b)", "?8"},  {"name:(a size=1)", "?8"},
+      {"name:(a sise:1)", "?8"},  {"name:(-a)", "?6"},
+      {"name:(a OR -b)", "?11"},  {"name: (a)", "?0"},
+      {"name:(\"a/b\")", "?8"},   {"name:(*)", "?6"},
+      {"title:(a ++)", "?9"},     {"kind:(film)", "?6"},
+      {"size:(1X)", "?6"},        {"name:(a) )", "?9"},
+  });
+}
+
 TEST_F(QueryParseTest, FieldsAndTheirValues) {
   ExpectAll({
       {"name:report", "name:report"},

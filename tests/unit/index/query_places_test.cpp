@@ -72,8 +72,8 @@ TEST_F(QueryPlacesTest, FoldersThatNoShareKnowsAreRefused) {
   Store({{"whale.txt", TextContent("x")}});
 
   EXPECT_EQ(Hits("whale under:/no/such"),
-            Names({"error: the shares that are asked know no such folder (character 7, at: "
-                   "under:/no/such)"}));
+            Names({"error: whale under:/no/such: the shares that are asked know no such folder "
+                   "(character 7, at: under:/no/such)"}));
   EXPECT_EQ(Hits("under:" + root + "/whale.tx")[0].substr(0, 6), "error:");
   EXPECT_EQ(Hits("whale under:" + root), Names({"whale.txt"}));
   EXPECT_EQ(Hits("none under:" + root), Names());

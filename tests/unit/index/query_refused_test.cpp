@@ -4,7 +4,9 @@
 #include <pwd.h>
 
 #include <cerrno>
+#include <map>
 
+#include "base/utf8.h"
 #include "tests/unit/index/query_parse_fixture.h"
 
 namespace {
@@ -234,25 +236,45 @@ TEST_F(QueryRefusedTest, StarsThatWouldFindNothingAreRefused) {
   });
 }
 
+// Fields' names with a slip in them: one, or two in a longer name.
 TEST_F(QueryRefusedTest, WhatCanOnlyBeMeantForAFieldIsRefused) {
   ExpectAll({
-      {"sise:>1G", "?0"},       {"a -sise:1G", "?3"},     {"(sise:1G)", "?1"},
-      {"SIZ:1M", "?0"},         {"autor:x", "?0"},        {"form:bob", "?0"},
-      {"tags:sea", "?0"},       {"foo:>3", "?0"},         {"foo:<=3", "?0"},
-      {"foo:\"a b\"", "?0"},    {"undr:/srv/data", "?0"}, {"a undr:/srv/data", "?2"},
-      {"pth:/srv", "?0"},       {"shere:/x", "?0"},       {"siz:/", "?0"},
-      {"exr:pdf", "?0"},        {"ex:pdf", "?0"},         {"exxt:pdf", "?0"},
-      {"tga:sea", "?0"},        {"si:folder", "?0"},      {"iss:folder", "?0"},
-      {"us:folder", "?0"},      {"hsa:text", "?0"},       {"ot:bob", "?0"},
-      {"-(a exr:pdf)", "?4"},   {"size>10M", "?0"},       {"a Width<100", "?2"},
-      {"modified>=2024", "?0"},
+      {"sise:>1G", "?0"},        {"a -sise:1G", "?3"},   {"(sise:1G)", "?1"},
+      {"autor:x", "?0"},         {"form:bob", "?0"},     {"tags:sea", "?0"},
+      {"undr:/srv/data", "?0"},  {"a undr:/srv", "?2"},  {"shere:/x", "?0"},
+      {"SIEZ:1M", "?0"},         {"exxt:pdf", "?0"},     {"kidn:video", "?0"},
+      {"-(a kidn:video)", "?4"}, {"modifed:2024", "?0"}, {"midifed:2024", "?0"},
+      {"artits:x", "?0"},        {"atrits:x", "?0"},     {"durasoin:>3m", "?0"},
+      {"durattoin:3m", "?0"},    {"foo:>3", "?0"},       {"foo:<=3", "?0"},
+      {"foo:\"a b\"", "?0"},     {"c:\"a b\"", "?0"},
   });
   QueryNode query;
   QueryError error;
   ASSERT_FALSE(ParseQuery("a sise:>1G", NOW, query, error));
   EXPECT_EQ(error.Line("a sise:>1G"),
-            "there is no field 'sise'; 'size'? (a word with a colon stands in quotes) "
+            "a sise:>1G: there is no field 'sise'; 'size'? (a word with a colon stands in quotes) "
             "(character 3, at: sise:>1G)");
+}
+
+// The nearest, and of those the one that is listed first.
+TEST_F(QueryRefusedTest, TheFieldThatIsNearestIsNamed) {
+  for (const auto& [text, meant] : std::map<std::string, std::string>{{"kidn:x", "kind"},
+                                                                      {"albm:x", "album"},
+                                                                      {"keyword2:x", ""},
+                                                                      {"keywrod:x", "keyword"},
+                                                                      {"keywrods:x", "keywords"},
+                                                                      {"heigth:5", "height"},
+                                                                      {"widht:5", "width"},
+                                                                      {"brtrate:5", "bitrate"},
+                                                                      {"kyewrd:x", "keyword"}}) {
+    QueryNode query;
+    QueryError error;
+    EXPECT_EQ(ParseQuery(text, NOW, query, error), meant.empty()) << text;
+    const size_t at = error.what.find("; '");
+    EXPECT_EQ(at == std::string::npos ? "" : error.what.substr(at, meant.size() + 5),
+              meant.empty() ? "" : "; '" + meant + "'?")
+        << text << ": " << error.what;
+  }
 }
 
 TEST_F(QueryRefusedTest, WordsWithColonsAreWords) {
@@ -262,13 +284,59 @@ TEST_F(QueryRefusedTest, WordsWithColonsAreWords) {
       {"file:///x", "file:///x"},
       {"texts://x", "texts://x"},
       {"fs::path id::x tags::", "(fs::path id::x tags::)"},
-      {"C:\\x c:/y x:y", "(C:\\x c:/y x:y)"},
+      {"C:\\x c:/y x:y c:", "(C:\\x c:/y x:y c:)"},
       {"12:30", "12:30"},
-      {"std:vector", "std:vector"},
-      {"size> size=10 from<x xsize>10", "(size> size=10 from<x xsize>10)"},
+      {"std:vector std:move", "(std:vector std:move)"},
+      {"go:generate id:5", "(go:generate id:5)"},
+      {"exr:pdf SIZ:1 si:x us:x", "(exr:pdf SIZ:1 si:x us:x)"},
+      {"todo:x note:x main:x", "(todo:x note:x main:x)"},
+      {"knsid:x", "knsid:x"},
+      {"modfd:x", "modfd:x"},
       {"Note: exr: size", "(Note: exr: size)"},
-      {"\"exr:pdf\"", "\"exr:pdf\""},
+      {"\"size:pdf\" \"exxt:pdf\"", "(\"size:pdf\" \"exxt:pdf\")"},
   });
+}
+
+TEST_F(QueryRefusedTest, FieldsWithoutTheirColonAreRefused) {
+  ExpectAll({
+      {"size>10M", "?0"},
+      {"a Width<100", "?2"},
+      {"modified>=2024", "?0"},
+      {"size=10M", "?0"},
+      {"a size==10M", "?2"},
+      {"modified<2024", "?0"},
+      {"ext=pdf", "?0"},
+      {"a -ext=pdf", "?3"},
+      {"(kind=video)", "?1"},
+      {"name<x", "?0"},
+      {"title=\"moby dick\"", "?0"},
+      {"from<x", "?0"},
+      {"size> 10M", "?0"},
+      {"size=", "?0"},
+      {"xsize>10", "xsize>10"},
+      {"a=b sizes=1 a<b x>=y", "(a=b sizes=1 a<b x>=y)"},
+      {"size-x=1 size_=1 \"size=10M\"", "(size-x=1 size_=1 \"size=10M\")"},
+      {"ext!=pdf", "ext!=pdf"},
+      {"a=size=1", "a=size=1"},
+  });
+  for (const auto& [text, form] :
+       std::map<std::string, std::string>{{"size=10M", "size:10M"},
+                                          {"size==10M", "size:10M"},
+                                          {"a SIZE>10M b", "size:>10M"},
+                                          {"(size>=10M)", "size:>=10M"},
+                                          {"size=>10M", "size:>=10M"},
+                                          {"size=<10M", "size:<=10M"},
+                                          {"modified<2024 x", "modified:<2024"},
+                                          {"ext=pdf", "ext:pdf"},
+                                          {"tag>sea", "tag:sea"},
+                                          {"title=\"moby dick\" x", "title:\"moby dick\""},
+                                          {"title=\"moby", "title:\"moby"}}) {
+    QueryNode query;
+    QueryError error;
+    EXPECT_FALSE(ParseQuery(text, NOW, query, error)) << text;
+    EXPECT_NE(error.what.find(", as in " + form + " ("), std::string::npos) << error.what;
+    EXPECT_NE(error.what.find("in quotes"), std::string::npos) << error.what;
+  }
 }
 
 TEST_F(QueryRefusedTest, UsersThatCannotBeLookedUpAreNotUnknownOnes) {
@@ -319,7 +387,7 @@ TEST_F(QueryRefusedTest, ErrorsShowTheCharacterAndWhatStandsThere) {
 
   ASSERT_FALSE(ParseQuery(text, NOW, query, error));
   EXPECT_EQ(error.Line(text),
-            "'1X' is not a size like 500K, 10M or 1.5G (character 11, at: 1X und mehr)");
+            text + ": '1X' is not a size like 500K, 10M or 1.5G (character 11, at: 1X und mehr)");
 }
 
 // What they say, and where.
@@ -334,8 +402,14 @@ TEST_F(QueryRefusedTest, ErrorsAreLinesForPeople) {
        "OR stands between two things (the word stands in quotes: \"OR\") (character 1, at: OR a)"},
       {"size:", "size: needs a value right behind the colon (character 1, at: size:)"},
       {"size>1M",
-       "a colon is missing behind 'size' (a word with > stands in quotes) (character 1, at: "
-       "size>1M)"},
+       "a colon is missing behind 'size', as in size:>1M (a word with > stands in quotes) "
+       "(character 1, at: size>1M)"},
+      {"size=",
+       "a colon is missing behind 'size' (a word with = stands in quotes) (character 1, "
+       "at: size=)"},
+      {"name:(a title:b)",
+       "no field stands within the brackets of another, name:( ) (character 9, "
+       "at: title:b))"},
       {"foo:>3",
        "there is no field 'foo' (a word with a colon stands in quotes) (character 1, at: foo:>3)"},
       {"", "nothing to search for"},
@@ -352,8 +426,66 @@ TEST_F(QueryRefusedTest, ErrorsAreLinesForPeople) {
     QueryNode query;
     QueryError error;
     EXPECT_FALSE(ParseQuery(one.text, NOW, query, error)) << one.text;
-    EXPECT_EQ(error.Line(one.text), one.parsed);
+    EXPECT_EQ(error.Line(one.text), (one.text.empty() ? "" : one.text + ": ") + one.parsed);
   }
+}
+
+std::string LineOf(const std::string& text) {
+  QueryNode query;
+  QueryError error;
+  EXPECT_FALSE(ParseQuery(text, NOW, query, error)) << text;
+  return error.Line(text);
+}
+
+std::string Times(const std::string& text, size_t count) {
+  std::string times;
+  for (size_t i = 0; i < count; ++i) {
+    times += text;
+  }
+  return times;
+}
+
+// What is shown of a long question is what stands around the place.
+TEST_F(QueryRefusedTest, ErrorsOfLongQuestionsShowAPieceOfThem) {
+  const std::string many = Times("\u00fc", 1500);
+  const std::string what = ": 'x' is not a size like 500K, 10M or 1.5G (character ";
+  EXPECT_EQ(LineOf(many + " size:x"),
+            "\u2026" + Times("\u00fc", 53) + " size:x" + what + "1507, at: x)");
+  EXPECT_EQ(LineOf("size:x " + many), "size:x " + Times("\u00fc", 53) + "\u2026" + what +
+                                          "6, at: x " + Times("\u00fc", 28) + "\u2026)");
+  EXPECT_EQ(LineOf(many + " size:x " + Times("\u00fc", 100)),
+            "\u2026" + Times("\u00fc", 14) + " size:x " + Times("\u00fc", 38) + "\u2026" + what +
+                "1507, at: x " + Times("\u00fc", 28) + "\u2026)");
+  EXPECT_EQ(LineOf(many + " ("),
+            "\u2026" + Times("\u00fc", 58) +
+                " (: something to find is missing here (character 1503, at the end)");
+  EXPECT_EQ(LineOf(std::string(5000, 'a')), "\u2026" + std::string(20, 'a') + std::string(40, 'a') +
+                                                "\u2026: the question is too long (character "
+                                                "4097, at: " +
+                                                std::string(30, 'a') + "\u2026)");
+}
+
+TEST_F(QueryRefusedTest, ErrorsCiteNoMoreOfAValueThanShowsWhichItIs) {
+  const std::string many = Times("\u00fc", 1500);
+  for (const std::string& text :
+       {"size:" + many, "kind:" + many, "owner:" + many, "under:" + many, "share:/" + many,
+        "near:" + many, "ext:/" + many, "is:" + many, "has:" + many, "content:" + many,
+        "text:" + Times("+", 3000), "size>" + many, "title=\"" + many + "\"",
+        std::string(3000, 'q') + ":>1", "modified:" + many + ".." + many, "year:" + many}) {
+    const std::string line = LineOf(text);
+    EXPECT_LT(line.size(), 600U) << line;
+    EXPECT_EQ(ToUtf8(line), line);
+    EXPECT_NE(line.find("\u2026"), std::string::npos) << line;
+  }
+}
+
+TEST_F(QueryRefusedTest, ErrorsShowControlCharactersInDigits) {
+  EXPECT_EQ(LineOf("a\x1b[31m\tb size:1X\n\x7f"),
+            "a\\x1b[31m\\x09b size:1X\\x0a\\x7f: '1X' is not a size like 500K, 10M or 1.5G "
+            "(character 15, at: 1X\\x0a\\x7f)");
+  EXPECT_EQ(LineOf("kind:\"a\x01\""),
+            "kind:\"a\\x01\": 'a\\x01' is no kind: document, audio, video, photo, other or folder "
+            "(character 7, at: a\\x01\")");
 }
 
 }  // namespace fileindexd

@@ -1,0 +1,86 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/query_slips.h"
+
+#include <algorithm>
+
+#include "index/query_error.h"
+#include "index/query_fields.h"
+
+namespace fileindexd {
+
+namespace {
+
+// What was compared with: a quoted text, or up to a blank or a bracket.
+std::string_view ValueAt(std::string_view text) {
+  if (text.starts_with('"')) {
+    const size_t end = text.find('"', 1);
+    return text.substr(0, end == std::string_view::npos ? end : end + 1);
+  }
+  const auto* const end = std::find_if(text.begin(), text.end(),
+                                       [](char c) { return IsBlank(c) || c == '(' || c == ')'; });
+  return text.substr(0, static_cast<size_t>(end - text.begin()));
+}
+
+// "size>10M".
+std::string WhyColonIsMissing(std::string_view text) {
+  const size_t letters = LettersAtStart(text);
+  const size_t end = std::min(text.find_first_not_of("<>=", letters), text.size());
+  const NamedField* field = end > letters ? FindField(text.substr(0, letters)) : nullptr;
+  if (field == nullptr) {
+    return "";
+  }
+  const std::string_view compared = text.substr(letters, end - letters);
+  const std::string_view value = ValueAt(text.substr(end));
+  std::string form = std::string(field->name) + ":";
+  if (TakesRange(field->field)) {
+    const size_t sign = compared.find_first_of("<>");
+    const bool is_compared = sign != std::string_view::npos;
+    form += is_compared ? std::string(1, compared[sign]) : "";
+    form += is_compared && compared.find('=') != std::string_view::npos ? "=" : "";
+  }
+  form += Shortened(value);
+  return "a colon is missing behind " + Cited(text.substr(0, letters)) +
+         (value.empty() ? "" : ", as in " + form) + " (a word with " + compared.front() +
+         " stands in quotes)";
+}
+
+// "sise:10M", "foo:>3".
+std::string WhyNoField(std::string_view text) {
+  const size_t letters = LettersAtStart(text);
+  if (letters == 0 || letters + 1 >= text.size() || text[letters] != ':' ||
+      IsBlank(text[letters + 1])) {
+    return "";
+  }
+  const std::string_view value = text.substr(letters + 1);
+  if (value.starts_with("//") || value.starts_with(':')) {
+    return "";
+  }
+  const char* near = NearField(text.substr(0, letters));
+  const char first = value.front();
+  if (near == nullptr && first != '<' && first != '>' && first != '"') {
+    return "";
+  }
+  return "there is no field " + Cited(text.substr(0, letters)) +
+         (near == nullptr ? "" : "; '" + std::string(near) + "'?") +
+         " (a word with a colon stands in quotes)";
+}
+
+}  // namespace
+
+bool IsBlank(char c) {
+  return static_cast<unsigned char>(c) <= 0x20 || c == 0x7f;
+}
+
+size_t LettersAtStart(std::string_view text) {
+  const auto* const end = std::find_if_not(text.begin(), text.end(), [](char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+  });
+  return static_cast<size_t>(end - text.begin());
+}
+
+std::string WhyMeantForField(std::string_view text) {
+  std::string why = WhyColonIsMissing(text);
+  return why.empty() ? WhyNoField(text) : why;
+}
+
+}  // namespace fileindexd
