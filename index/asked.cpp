@@ -44,10 +44,6 @@ void AddOptions(const Question& question, size_t end, QueryNode& tree) {
   }
 }
 
-std::string ColumnName(ContentField field) {
-  return ColumnAt(WORD_COLUMNS, FIRST_FIELD_COLUMN + static_cast<size_t>(field) - 1);
-}
-
 void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& tokenizer,
                 NameFolder& folder, Asked& asked) {
   for (const QueryNode& below : node.below) {
@@ -122,6 +118,10 @@ const WordLeaf* Asked::LeafOf(const QueryNode& node) const {
     }
   }
   return nullptr;
+}
+
+std::string ColumnName(ContentField field) {
+  return ColumnAt(WORD_COLUMNS, FIRST_FIELD_COLUMN + static_cast<size_t>(field) - 1);
 }
 
 std::string TextQueryOf(const QueryNode& node) {

@@ -42,6 +42,8 @@ class Asked {
   bool needs_contents = false;   // some part asks for more than names and attributes
 };
 
+// The column of the contents' table that a text field stands in.
+std::string ColumnName(ContentField field);
 // Of a WORD, in the contents' table's own language. Empty: it is looked for in names alone.
 std::string TextQueryOf(const QueryNode& word);
 // Where each character of valid UTF-8 begins, and the end.

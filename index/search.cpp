@@ -187,7 +187,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   }
   const bool suggests =
       made.total == 0 && question.suggests && (question.limit > 0 || question.count_all);
-  std::string suggestion = suggests ? Suggest(asked, shares) : "";
+  std::string suggestion = suggests ? Suggest(asked, shares, names) : "";
   for (AskedShare& share : shares) {
     share.Release();
   }

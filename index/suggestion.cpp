@@ -9,7 +9,9 @@
 #include <utility>
 #include <vector>
 
+#include "index/contents_schema.h"
 #include "index/name_text.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
@@ -29,17 +31,44 @@ std::vector<int32_t> Codes(const std::string& text) {
   return codes;
 }
 
-// A word of a vocabulary, the better the smaller: near, not cut short as stems are, frequent.
-struct Nearest {
-  int distance = 0;
-  bool is_shorter = false;
-  int64_t frequency = 0;
-  std::string word;
-
-  bool IsBetterThan(const Nearest& other) const {
-    return std::make_tuple(distance, is_shorter, -frequency, word) <
-           std::make_tuple(other.distance, other.is_shorter, -other.frequency, other.word);
+// The words of vocabularies that are nearest to one, and rather none shorter than it, as stems are.
+class NearestWords {
+ public:
+  void Add(int distance, bool is_shorter, int64_t frequency, std::string word) {
+    const std::pair<int, bool> nearness = {distance, is_shorter};
+    if (!words.empty() && nearness > nearest) {
+      return;
+    }
+    if (words.empty() || nearness < nearest) {
+      words.clear();
+      nearest = nearness;
+    }
+    words.push_back({frequency, std::move(word)});
   }
+
+  // The most frequent; empty: there is none. Stems, which stand in for many words and are none
+  // themselves, go behind what goes on from them.
+  std::string Best() const {
+    const Word* best = nullptr;
+    for (const Word& word : words) {
+      const bool is_stem = std::any_of(words.begin(), words.end(), [&](const Word& other) {
+        return other.text.size() > word.text.size() && other.text.starts_with(word.text);
+      });
+      if (!is_stem && (best == nullptr || std::make_tuple(-word.frequency, word.text) <
+                                              std::make_tuple(-best->frequency, best->text))) {
+        best = &word;
+      }
+    }
+    return best == nullptr ? "" : best->text;
+  }
+
+ private:
+  struct Word {
+    int64_t frequency = 0;
+    std::string text;
+  };
+  std::pair<int, bool> nearest;
+  std::vector<Word> words;
 };
 
 // Words with the first letter of the asked one: slips happen there rarely, and the others would
@@ -62,23 +91,28 @@ std::string BehindAll(const std::string& beginning) {
   return beginning + "\xf4\x8f\xbf\xbf";
 }
 
+// The words of one full-text table, or of one column of it.
 class Vocabulary {
  public:
-  int Open(sqlite3* db, const char* database, const char* table) {
-    const std::string name = std::string("vocabulary_") + table;
+  // `of_column`: empty: of all.
+  int Open(sqlite3* db, const char* database, const char* table, const std::string& of_column) {
+    column = of_column;
+    const char* type = column.empty() ? "row" : "col";
+    const std::string name = std::string("vocabulary_") + table + "_" + type;
     const std::string make = "CREATE VIRTUAL TABLE IF NOT EXISTS temp." + name +
-                             " USING fts5vocab(" + database + ", " + table + ", 'row')";
+                             " USING fts5vocab(" + database + ", " + table + ", '" + type + "')";
     // Temporary tables are changes too.
     (void)sqlite3_exec(db, "PRAGMA query_only = 0", nullptr, nullptr, nullptr);
     int code = sqlite3_exec(db, make.c_str(), nullptr, nullptr, nullptr);
     (void)sqlite3_exec(db, "PRAGMA query_only = 1", nullptr, nullptr, nullptr);
-    const std::string read = "SELECT term, doc FROM temp." + name +
-                             " WHERE term >= ?1 AND term <= ?2 LIMIT " + std::to_string(MOST_TERMS);
+    const std::string read = "SELECT term, doc" + std::string(column.empty() ? "" : ", col") +
+                             " FROM temp." + name + " WHERE term >= ?1 AND term <= ?2 LIMIT " +
+                             std::to_string(MOST_TERMS);
     code = code == SQLITE_OK ? terms.Prepare(db, read.c_str()) : code;
     return code;
   }
 
-  void Look(const std::string& word, Nearest& best, bool& found) {
+  void Look(const std::string& word, NearestWords& nearest) {
     const size_t letters = CharacterStarts(word).size() - 1;
     const int most = letters >= LONG ? 2 : 1;
     for (const std::string& beginning : Beginnings(word)) {
@@ -86,12 +120,13 @@ class Vocabulary {
       terms.BindText(1, beginning);
       terms.BindText(2, end);
       while (terms.Step() == SQLITE_ROW) {
+        if (!column.empty() && terms.Bytes(2) != column) {
+          continue;
+        }
         const std::string term = terms.Bytes(0);
         const int distance = EditDistance(word, term, most);
-        const Nearest near = {distance, term.size() < word.size(), terms.Int(1), term};
-        if (distance > 0 && distance <= most && (!found || near.IsBetterThan(best))) {
-          best = near;
-          found = true;
+        if (distance > 0 && distance <= most) {
+          nearest.Add(distance, term.size() < word.size(), terms.Int(1), term);
         }
       }
       terms.Reset();
@@ -99,11 +134,106 @@ class Vocabulary {
   }
 
  private:
+  std::string column;
   Statement terms;
 };
 
 bool IsKnown(const AskedShare& share, const WordLeaf& leaf) {
   return share.run != nullptr && share.run->Sets().CountOf(leaf) > 0;
+}
+
+// A word of a leaf, and where it stands in the question.
+struct WordPlace {
+  std::string token;
+  size_t start = 0;
+  size_t end = 0;
+};
+
+// But for a last one of which only the beginning is said.
+std::vector<WordPlace> WordsOf(const QueryNode& node, NameMarker& names) {
+  std::vector<uint32_t> origins;
+  const std::string folded = names.folder.Words(node.text, &origins);
+  std::vector<WordPlace> words;
+  for (NameTokenizer::Place& place : names.tokenizer.Places(folded)) {
+    words.push_back({std::move(place.token), node.text_at + origins[place.start],
+                     node.text_at + origins[place.end]});
+  }
+  if (node.is_beginning && !words.empty()) {
+    words.pop_back();
+  }
+  return words;
+}
+
+bool HasMatch(sqlite3* db, const char* sql, const std::string& query) {
+  Statement read;
+  bool found = false;
+  if (query.empty() || read.Prepare(db, sql) != SQLITE_OK) {
+    return false;
+  }
+  read.BindText(1, query);
+  (void)read.ReadOne(found, [] {});
+  return found;
+}
+
+// One share, and one word in the place of a leaf.
+class WordSearch {
+ public:
+  WordSearch(AskedShare& of_share, const QueryNode& of_leaf)
+      : share(of_share), leaf(of_leaf), db(of_share.reader.database.db) {}
+
+  // Whether it stands where the leaf is looked for.
+  bool Knows(const std::string& word) const {
+    QueryNode alone = leaf;
+    alone.text = word;
+    alone.is_phrase = alone.is_beginning = false;
+    return (IsInNames() &&
+            HasMatch(db, "SELECT 1 FROM names WHERE names MATCH ?1 LIMIT 1", Quoted(word))) ||
+           (IsInContents() &&
+            HasMatch(db, "SELECT 1 FROM contents.words WHERE words MATCH ?1 LIMIT 1",
+                     TextQueryOf(alone)));
+  }
+
+  void Look(const std::string& word, NearestWords& nearest) const {
+    Vocabulary names;
+    Vocabulary texts;
+    if (IsInNames() && names.Open(db, "main", "names", "") == SQLITE_OK) {
+      names.Look(word, nearest);
+    }
+    if (IsInContents() && texts.Open(db, "contents", "words", Column()) == SQLITE_OK) {
+      texts.Look(word, nearest);
+    }
+  }
+
+ private:
+  bool IsInNames() const { return leaf.scope == Scope::ANY || leaf.scope == Scope::NAME; }
+  bool IsInContents() const { return leaf.scope != Scope::NAME && share.has_contents; }
+  std::string Column() const {
+    return leaf.scope == Scope::FIELD  ? ColumnName(leaf.field)
+           : leaf.scope == Scope::TEXT ? ColumnAt(WORD_COLUMNS, TEXT_COLUMN)
+                                       : "";
+  }
+
+  AskedShare& share;
+  const QueryNode& leaf;
+  sqlite3* db;
+};
+
+// The nearest word to one that no share knows; empty: there is none.
+std::string NearestTo(const std::string& word, const QueryNode& leaf,
+                      std::deque<AskedShare>& shares) {
+  NearestWords nearest;
+  for (AskedShare& share : shares) {
+    if (share.run != nullptr) {
+      WordSearch(share, leaf).Look(word, nearest);
+    }
+  }
+  return nearest.Best();
+}
+
+bool AnyKnows(const std::string& word, const QueryNode& leaf, std::deque<AskedShare>& shares) {
+  return std::any_of(shares.begin(), shares.end(), [&](AskedShare& share) {
+    return share.run != nullptr && WordSearch(share, leaf).Knows(word);
+  });
 }
 
 bool IsLetter(char c) {
@@ -146,41 +276,35 @@ int EditDistance(const std::string& from, const std::string& to, int most) {
   return std::min(rows[a.size() % 3][b.size()], most + 1);
 }
 
-std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares) {
-  std::map<size_t, std::pair<size_t, std::string>> changes;  // by their start: end, and the word
+std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMarker& names) {
+  std::map<size_t, WordPlace> changes;  // by their start, with the new word
   for (const WordLeaf& leaf : asked.leaves) {
     const QueryNode& node = *leaf.node;
-    const bool is_plain = leaf.is_positive && node.part == Part::WORD && !node.is_phrase &&
-                          !node.is_beginning && leaf.tokens.size() == 1 && node.scope == Scope::ANY;
-    if (!is_plain || CharacterStarts(leaf.tokens.front()).size() <= SHORTEST ||
+    const bool has_words = node.part == Part::WORD || node.part == Part::EXACT_NAME;
+    if (!leaf.is_positive || !has_words ||
         std::any_of(shares.begin(), shares.end(),
                     [&](const AskedShare& share) { return IsKnown(share, leaf); })) {
       continue;
     }
-    Nearest best;
-    bool found = false;
-    for (AskedShare& share : shares) {
-      Vocabulary names;
-      Vocabulary words;
-      sqlite3* db = share.run == nullptr ? nullptr : share.reader.database.db;
-      if (db != nullptr && names.Open(db, "main", "names") == SQLITE_OK) {
-        names.Look(leaf.tokens.front(), best, found);
+    QueryNode where = node;
+    where.scope = node.part == Part::EXACT_NAME ? Scope::NAME : node.scope;
+    for (WordPlace& word : WordsOf(node, names)) {
+      if (CharacterStarts(word.token).size() <= SHORTEST || AnyKnows(word.token, where, shares)) {
+        continue;
       }
-      if (db != nullptr && share.has_contents && words.Open(db, "contents", "words") == SQLITE_OK) {
-        words.Look(leaf.tokens.front(), best, found);
+      word.token = NearestTo(word.token, where, shares);
+      if (word.token.empty()) {
+        return "";
       }
+      changes.emplace(word.start, std::move(word));
     }
-    if (!found) {
-      return "";
-    }
-    changes[node.start] = {node.end, best.word};
   }
 
   std::string text;
   size_t at = 0;
   for (const auto& [start, change] : changes) {
-    text += asked.text.substr(at, start - at) + change.second;
-    at = change.first;
+    text += asked.text.substr(at, start - at) + change.token;
+    at = change.end;
   }
   return changes.empty() ? "" : text + asked.text.substr(at);
 }

@@ -80,6 +80,8 @@ class SearchTest(IndexTest):
         rest = self.ctl("search", "--offset", "2", "beach").out.splitlines()
         self.assertEqual(rest, everything[2:])
         self.assertEqual(self.ctl("search", "--limit", "0", "beach").out, b"")
+        self.assertEqual(self.ctl("search", "--limit", "0", "--count", "beach").out, b"5\n")
+        self.ctl("search", "--limit", "0", "beach OR", code=2)
         self.assertEqual(self.ctl("search", "--count", "beach").out, b"5\n")
 
     def test_twenty_hits_without_a_limit(self):
@@ -136,6 +138,8 @@ class SearchTest(IndexTest):
             ("--json", "-0", "beach"),
             ("--share",),
             ("size:<0", "beach"),
+            ("size=10M", "beach"),
+            ("beach", "name:(boys", "title:x)"),
             ("modified:2024-06..2024-01",),
             ("beach", f"under:{namespace.DATA}/nowhere"),
         ):
@@ -143,6 +147,33 @@ class SearchTest(IndexTest):
                 self.ctl("search", *arguments, code=2)
         self.ctl("search", "--share", "nope", "beach", code=1)
         self.ctl("search", "--under", "/nowhere", "beach", code=1)
+
+
+    def test_a_field_goes_for_all_in_the_brackets_behind_it(self):
+        self.assertEqual(self.hits("name:(plan OR budget)"),
+                         ["alpha/holiday/plan.txt", "alpha/office/budget.xyz"])
+        self.assertEqual(self.hits("beach", "ext:(mp4 OR pdf)"),
+                         ["alpha/holiday/beach.mp4", "alpha/office/report beach.pdf"])
+
+    def test_a_long_question_that_makes_no_sense_is_not_repeated_whole(self):
+        words = "über" * 700 + "\x1b "
+        told = self.ctl("search", words + "size:x", code=2).err.decode()
+
+        self.assertEqual(told.count("\n"), 1)
+        self.assertTrue(told.startswith("fileindexctl: search: \u2026"), told)
+        self.assertIn("überüber\\x1b size:x: 'x' is not a size", told)
+        self.assertIn("(character 2808, at: x)", told)
+        self.assertLess(len(told), 300)
+
+    def test_a_slip_behind_a_field_or_in_a_phrase_is_told(self):
+        for words, better in (("name:budgte", "name:budget"),
+                              ('"report baech"', '"report beach"'),
+                              ('kind:document name:(reprot beach)',
+                               "kind:document name:(report beach)")):
+            with self.subTest(words=words):
+                self.assertEqual(self.try_ctl("search", words).err.decode(),
+                                 f"Did you mean: {better}\n")
+                self.assertNotEqual(self.hits(better), [])
 
 
 class UnindexedTest(IndexTest):

@@ -16,13 +16,54 @@ TEST_F(QuerySuggestionTest, SuggestionsAreWordsThatTheIndexHas) {
   EXPECT_EQ(Suggested("computr"), "computer") << "not the stem alone";
   EXPECT_EQ(Suggested("invocies OR xyzzyx"), "");
   EXPECT_EQ(Suggested("kind:document  invocies"), "kind:document  invoices");
-  EXPECT_EQ(Suggested("\"holidya\""), "");
+  EXPECT_EQ(Suggested("\"holidya\""), "\"holiday\"");
   EXPECT_EQ(Suggested("zzzzzz"), "");
   EXPECT_EQ(Suggested("ho"), "");
   EXPECT_EQ(Suggested("kind:audio holidya"), "") << "would find nothing either";
   EXPECT_EQ(Suggested("kind:audio"), "");
   EXPECT_EQ(Hits("holiday"), Names({"holiday plans.txt"}));
   EXPECT_EQ(answer.suggestion, "");
+}
+
+TEST_F(QuerySuggestionTest, SuggestionsStandInTheirPlaceBehindFieldsAndInPhrases) {
+  Content book = TextContent("the computer counts invoices");
+  book.texts = {{ContentField::TITLE, "Annual Report of Whales"},
+                {ContentField::AUTHOR, "Herman Melville"}};
+  Store({{"holiday plans.txt", book}, {"song.mp3", Tagged(ContentField::ARTIST, "Beethoven")}});
+  const std::map<std::string, std::string> suggested = {
+      {"title:reprot", "title:report"},
+      {"author:melvile kind:document", "author:melville kind:document"},
+      {"artist:beethovn", "artist:beethoven"},
+      {"text:compuetr", "text:computer"},
+      {"name:holidya", "name:holiday"},
+      {"kind:document name:holidya compuetr", "kind:document name:holiday computer"},
+      {"\"annual reprot\"", "\"annual report\""},
+      {"\"anual reprot\" whales", "\"annual report\" whales"},
+      {"\"\u00e4nual r\u00e9prot\"", "\"annual report\""},
+      {"\"annu\u0308l  -report\"", "\"annual  -report\""},
+      {"title:\"anual rep\"*", "title:\"annual rep\"*"},
+      {"title:\"reprot of whales\"", "title:\"report of whales\""},
+      {"holiday-palns", "holiday-plans"},
+      {"name:\"holidya plans.txt\"", "name:\"holiday plans.txt\""},
+      {"name:(holidya plans)", "name:(holiday plans)"},
+      {"name:(holidya OR \"holidya plans.txt\")", "name:(holiday OR \"holiday plans.txt\")"},
+  };
+  for (const auto& [text, better] : suggested) {
+    EXPECT_EQ(Suggested(text), better) << text;
+    EXPECT_EQ(Hits(better).size(), 1U) << better;
+  }
+}
+
+TEST_F(QuerySuggestionTest, WordsThatStandElsewhereAreNotSuggested) {
+  Content book = TextContent("the computer counts invoices");
+  book.texts = {{ContentField::TITLE, "Annual Report of Whales"}};
+  Store({{"holiday plans.txt", book}});
+  for (const char* text :
+       {"title:compuetr", "author:reprot", "name:invocies", "text:reprot", "text:holidya",
+        "\"report annual\"", "\"reprot annual\"", "title:\"anual xyzzyx\"", "name:\"holidya\"",
+        "title:rerp*", "kind:audio title:reprot"}) {
+    EXPECT_EQ(Suggested(text), "") << text;
+  }
 }
 
 // Composed or parted, in the question or on disk: an accent is no slip.
