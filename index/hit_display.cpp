@@ -20,6 +20,35 @@ struct SeenName {
   std::vector<uint32_t> origins;
 };
 
+// For each byte of ToUtf8(name) the byte of `name` that it came from, and one more for the end.
+std::vector<uint32_t> PlacesOfText(std::string_view name) {
+  std::vector<uint32_t> places;
+  for (size_t at = 0; at < name.size();) {
+    const Utf8Character character = FirstCharacter(name.substr(at));
+    for (size_t i = 0; i < character.length; ++i, ++at) {
+      const size_t bytes = character.is_wrong ? ToUtf8(name.substr(at, 1)).size() : 1;
+      places.insert(places.end(), bytes, static_cast<uint32_t>(at));
+    }
+  }
+  places.push_back(static_cast<uint32_t>(name.size()));
+  return places;
+}
+
+// What of it is no UTF-8 is seen as the sign that stands for such bytes.
+SeenName Seen(std::string_view name, NameFolder& folder,
+              std::string (NameFolder::*fold)(std::string_view, std::vector<uint32_t>*)) {
+  SeenName seen;
+  const std::string text = ToUtf8(name);
+  seen.text = (folder.*fold)(text, &seen.origins);
+  if (text != name) {
+    const std::vector<uint32_t> places = PlacesOfText(name);
+    for (uint32_t& origin : seen.origins) {
+      origin = places[origin];
+    }
+  }
+  return seen;
+}
+
 void AddMark(const SeenName& name, size_t start, size_t end, std::vector<Snippet::Mark>& marks) {
   if (end > start && end < name.origins.size() && name.origins[end] > name.origins[start]) {
     marks.push_back({name.origins[start], name.origins[end]});
@@ -85,23 +114,21 @@ std::vector<Snippet::Mark> Joined(std::vector<Snippet::Mark> marks) {
 }
 
 SeenName PartsOf(std::string_view name, NameFolder& folder) {
-  SeenName parts;
-  parts.text = folder.Parts(name, &parts.origins);
-  return parts;
+  return Seen(name, folder, &NameFolder::Parts);
 }
 
 // Parts of the question that are no leaves: they need no word.
 void MarkPathsAndEndings(const QueryNode& node, const Entry& entry, NameFolder& folder,
                          std::vector<Snippet::Mark>& marks) {
   const std::string_view name = LastComponent(entry.path);
-  if (node.part == Part::EXT && entry.kind != Kind::FOLDER && IsUtf8(name)) {
+  if (node.part == Part::EXT && entry.kind != Kind::FOLDER) {
     std::vector<Snippet::Mark> in_name;
     MarkEnding(node, PartsOf(name, folder), folder, in_name);
     const size_t before = entry.path.size() - name.size();
     for (const Snippet::Mark& mark : in_name) {
       marks.push_back({mark.start + before, mark.end + before});
     }
-  } else if (node.part == Part::PATH && IsUtf8(entry.path)) {
+  } else if (node.part == Part::PATH) {
     MarkPieces(node, PartsOf(entry.path, folder), folder, marks);
   } else if (node.part == Part::AND || node.part == Part::OR) {
     for (const QueryNode& below : node.below) {
@@ -113,11 +140,7 @@ void MarkPathsAndEndings(const QueryNode& node, const Entry& entry, NameFolder& 
 std::vector<Snippet::Mark> MarksInName(const Asked& asked, const std::string& path,
                                        NameMarker& marker) {
   const std::string_view name = LastComponent(path);
-  if (!IsUtf8(name)) {
-    return {};  // places in what it was made into tell nothing of its bytes
-  }
-  SeenName words;
-  words.text = marker.folder.Words(name, &words.origins);
+  const SeenName words = Seen(name, marker.folder, &NameFolder::Words);
   const SeenName parts = PartsOf(name, marker.folder);
   const std::vector<NameTokenizer::Place> places = marker.tokenizer.Places(words.text);
   std::vector<Snippet::Mark> marks;

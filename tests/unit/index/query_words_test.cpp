@@ -181,8 +181,30 @@ TEST_F(QueryWordsTest, NamesThatAreNotTextAreFoundByWhatIs) {
   Empty({"whale \xff.txt", "\xee\x80\x80.txt", "a\xee\x80\x80whale"});
 
   EXPECT_EQ(Sorted("whale").size(), 2U);
-  EXPECT_EQ(Marked("name:*whale*"), "whale");
+  EXPECT_EQ(Marked("name:*whale*"), "whale|whale");
   EXPECT_EQ(Hits("\xee\x80\x80"), Names());
+}
+
+// "Grüße vom Hafen", in Latin-1.
+TEST_F(QueryWordsTest, MarksInNamesThatAreNotTextAreTheirBytes) {
+  Empty(
+      {"Gr\xfc\xdf"
+       "e vom Hafen.PDF",
+       "cut\xe2\x82 \xc9t\u00e9\u0301.txt"});
+
+  EXPECT_EQ(Marked("hafen"), "Hafen");
+  EXPECT_EQ(Marked("ha*"), "Ha");
+  EXPECT_EQ(Marked("gr hafen"), "Gr|Hafen");
+  EXPECT_EQ(Marked("name:*om*fen*"), "om|fen");
+  EXPECT_EQ(Marked("name:gr*pdf"), "Gr|PDF");
+  EXPECT_EQ(Marked("ext:pdf"), "PDF");
+  EXPECT_EQ(Marked("path:share/gr*vom"), "share/Gr|vom");
+  EXPECT_EQ(Marked("name:\"Gr\xfc\xdf"
+                   "e vom Hafen.PDF\""),
+            "Gr\xfc\xdf"
+            "e vom Hafen.PDF");
+  EXPECT_EQ(Marked("cut txt"), "cut|txt");
+  EXPECT_EQ(Marked("te"), "t\u00e9\u0301");
 }
 
 TEST_F(QueryWordsTest, MarksAreTheBytesThatAnswer) {
@@ -204,6 +226,23 @@ TEST_F(QueryWordsTest, MarksAreTheBytesThatAnswer) {
   EXPECT_EQ(Marked("report OR path:*old*nothing*"), "report") << "only half of it is there";
   EXPECT_EQ(Marked("name:*report OR old"), "Old") << "it is not at the end";
   EXPECT_EQ(Marked("name:*pdf*pdf OR old"), "Old") << "it is there once";
+}
+
+TEST_F(QueryWordsTest, SignsBesideLettersAreNoPartOfAWord) {
+  Store({{"c.txt", TextContent("x")},
+         {"C++ primer.txt", TextContent("x")},
+         {"a.txt", TextContent("a book on C# and others")},
+         {"b.txt", TextContent("written in C++")},
+         {"cc.txt", TextContent("x")}});
+
+  const Names all = {"C++ primer.txt", "a.txt", "b.txt", "c.txt"};
+  for (const char* text : {"C++", "c++", "c#", "C#", "\"c++\"", "c", "(c++)", ".c"}) {
+    EXPECT_EQ(Sorted(text), all) << text;
+  }
+  EXPECT_EQ(Sorted("text:c++"), Names({"a.txt", "b.txt"}));
+  EXPECT_EQ(Sorted("name:c#"), Names({"C++ primer.txt", "c.txt"}));
+  EXPECT_EQ(Sorted("name:*c++*"), Names({"C++ primer.txt"}));
+  EXPECT_EQ(Sorted("c ++"), Names({"C++ primer.txt"}));
 }
 
 TEST_F(QueryWordsTest, StarsInQuotesSayNothing) {
