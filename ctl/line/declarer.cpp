@@ -4,14 +4,45 @@
 #include <memory>
 #include <sstream>
 
+#include "ctl/terminal/cells.h"
+
 namespace fileindexd {
 
 namespace {
 
-// Where a command has others below it, those are listed in its place.
+constexpr size_t COLUMNS = 80;  // of a usual terminal
+
+std::string Wrapped(const std::string& text, size_t columns) {
+  std::string wrapped;
+  for (const std::string& line : WrappedLines(text, columns)) {
+    wrapped += (wrapped.empty() ? "" : "\n") + line;
+  }
+  return wrapped;
+}
+
+// Where a command has others below it, those are listed in its place. No line is wider than a
+// terminal.
 class CommandFormatter : public CLI::Formatter {
  public:
   CommandFormatter() { label("SUBCOMMAND", "COMMAND"); }
+
+  std::string make_description(const CLI::App* app) const override {
+    return Wrapped(app->get_description(), COLUMNS) + "\n";
+  }
+
+  std::string make_option_desc(const CLI::Option* option) const override {
+    return Described(option->get_description());
+  }
+
+  // Examples, which are indented, stay as they are.
+  std::string make_footer(const CLI::App* app) const override {
+    std::istringstream footer(app->get_footer());
+    std::string text;
+    for (std::string line; std::getline(footer, line);) {
+      text += (line.starts_with(' ') ? line : Wrapped(line, COLUMNS)) + "\n";
+    }
+    return text;
+  }
 
   std::string make_subcommands(const CLI::App* app, CLI::AppFormatMode /*mode*/) const override {
     std::ostringstream text;
@@ -20,11 +51,17 @@ class CommandFormatter : public CLI::Formatter {
   }
 
  private:
+  // What stands behind a name.
+  std::string Described(const std::string& text) const {
+    return Wrapped(text, COLUMNS - get_column_width());
+  }
+
   void AddCommands(const CLI::App* app, const std::string& before, std::ostream& text) const {
     for (const CLI::App* command : app->get_subcommands({})) {
       const std::string name = before + command->get_name();
       if (command->get_subcommands({}).empty()) {
-        CLI::detail::format_help(text, name, command->get_description(), get_column_width());
+        CLI::detail::format_help(text, name, Described(command->get_description()),
+                                 get_column_width());
       } else {
         AddCommands(command, name + " ", text);
       }

@@ -60,7 +60,7 @@ void AddFolders(Declarer& declare) {
 
   CLI::App* add = declare.Add(group, "add", FolderAdd,
                               "Index a folder: names and attributes, and the contents asked for",
-                              "/srv/projects --document --photo --exclude build/ --exclude '*.o'");
+                              "/srv/projects --document --photo --exclude '*.o'");
   AddText(add, "PATH", into.path, "A folder of a share");
   CLI::Option* document = AddOn(add, "--document", into.document, "Contents of documents");
   CLI::Option* audio = AddOn(add, "--audio", into.audio, "Contents of audio files");

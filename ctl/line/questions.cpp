@@ -7,7 +7,7 @@ namespace fileindexd {
 void DeclareSearch(Declarer& declare) {
   Arguments& into = declare.arguments;
   CLI::App* search = declare.Add(&declare.app, "search", Search, "Search the index, best first",
-                                 "--kind document --under /srv/projects 'annual report -draft'");
+                                 "--kind document --under /srv/projects 'annual -draft'");
   // For the help alone: the words are taken out before, see SplitSearchArguments.
   search
       ->add_option_function<std::vector<std::string>>(
@@ -23,7 +23,8 @@ void DeclareSearch(Declarer& declare) {
             "Not the best first, but by name, or the largest or youngest first",
             {"name", "size", "modified"});
   search->add_flag("--reverse", into.reverse, "The other way round");
-  AddOption(search, "--limit", into.limit, "N", "At most so many hits, or 'all'; 20 if not given");
+  AddOption(search, "--limit", into.limit, "N",
+            "At most so many hits, or 'all'; 20 if not given; with 0 the question is only checked");
   AddOption(search, "--offset", into.offset, "N", "Leave out so many of the first");
   search->add_flag("--count", into.count,
                    "The number of hits alone, on a line; with --json as {\"count\":N}");
@@ -36,8 +37,8 @@ void DeclareSearch(Declarer& declare) {
       "One JSON object a line; marks count bytes: of path_hex where that is given, else of path");
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")->excludes(json);
   search->footer(
-      "Every word of QUERY must stand in a file's name or content. \"words in a row\", begin*,\n"
-      "-without, one OR another, (groups), name:*.tar.gz, title:word, size:>10M; QUERY.md tells\n"
+      "Every word of QUERY must stand in a file's name or content. \"words in a row\", begin*, "
+      "-without, one OR another, (groups), name:*.tar.gz, title:word, size:>10M; QUERY.md tells "
       "of all. Options may stand between the words; what follows a lone -- is QUERY.\n\n" +
       search->get_footer());
 }
@@ -71,13 +72,13 @@ void AddStats(Declarer& declare) {
             "What was added since, by folder: 90s, 15m, 2h, 7d");
   AddJson(stats, into, "One JSON document");
   stats->footer(
-      "Each name of a file counts, its bytes count once in a share: at the first of its paths\n"
-      "there. A file with names in several shares counts in each, and so more than once in the\n"
+      "Each name of a file counts, its bytes count once in a share: at the first of its paths "
+      "there. A file with names in several shares counts in each, and so more than once in the "
       "line (all).\n"
-      "ext and age (since the last change) are of files and links alone; folder is the one\n"
-      "right below the share's. Alike are, of the files whose content is indexed, those of\n"
-      "one size whose beginning, middle and end are the same: probably, as nothing is\n"
-      "compared in full. Where the output is no terminal, columns are separated by\n"
+      "ext and age (since the last change) are of files and links alone; folder is the one "
+      "right below the share's. Alike are, of the files whose content is indexed, those of "
+      "one size whose beginning, middle and end are the same: probably, as nothing is "
+      "compared in full. Where the output is no terminal, columns are separated by "
       "tabulators, and bytes are exact.\n\n" +
       stats->get_footer());
 }

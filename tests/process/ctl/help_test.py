@@ -91,6 +91,18 @@ class HelpTest(IndexTest):
         for command in commands(self.ctl):
             self.assertNotEqual(self.ctl(*command, "--help", **self.state).out, b"")
 
+    def test_no_line_is_wider_than_a_usual_terminal(self):
+        for command in [(), ("share",), ("folder",), ("worker",), *commands(self.ctl)]:
+            for line in self.ctl(*command, "--help").out.decode().splitlines():
+                with self.subTest(command=command, line=line):
+                    self.assertLess(len(line), 80)
+
+    def test_search_tells_how_many_hits_there_are_without_a_limit_and_with_none(self):
+        told = " ".join(self.ctl("search", "--help").out.decode().split())
+
+        self.assertIn("--limit N At most so many hits, or 'all'; 20 if not given; with 0 the "
+                      "question is only checked", told)
+
     def test_examples_differ_from_each_other(self):
         found = [tuple(e) for command in commands(self.ctl) for e in self.examples(*command)]
 
