@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // The input is a question. It is understood as a tree of the right shape, or refused with a reason
-// in one line that points into it.
+// in one short line that points into it.
 #include <string>
 
 #include "base/utf8.h"
@@ -40,6 +40,7 @@ void Parse(const std::string& text) {
     const std::string line = error.Line(text);
     Require(error.at <= text.size(), "the place of an error lies in the question");
     Require(!error.what.empty() && line.find('\n') == std::string::npos, "a reason in one line");
+    Require(IsUtf8(line) && line.size() < 1000, "which shows no more than a piece of the question");
     return;
   }
   CheckShape(query, text.size());
