@@ -287,9 +287,6 @@ void Parser::ReadBare(Value& value) {
 }
 
 bool Parser::ReadLeaf(QueryNode& node, int depth) {
-  if (++leaves > MOST_PARTS) {
-    return Fail("too many words", at);
-  }
   const size_t start = at;
   const NamedField* field = TakeField();
   if (field != nullptr && shared != nullptr) {
@@ -299,6 +296,9 @@ bool Parser::ReadLeaf(QueryNode& node, int depth) {
   }
   if (field != nullptr && at < text.size() && text[at] == '(') {
     return ReadFieldGroup(*field, node, depth);
+  }
+  if (++leaves > MOST_PARTS) {
+    return Fail("too many words", start);
   }
   if (field == nullptr) {
     const std::string why = WhyMeantForField(std::string_view(text).substr(start));
