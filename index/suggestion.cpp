@@ -19,6 +19,7 @@ namespace {
 
 constexpr int64_t MOST_TERMS = 200'000;  // that are looked at for one word in one vocabulary
 constexpr size_t SHORTEST = 3;           // letters of a word for which another is looked for
+constexpr size_t MOST_SLIPS = 10;        // in one question: each costs a look through vocabularies
 constexpr size_t LONG = 6;               // letters of a word in which two slips are likely
 
 std::vector<int32_t> Codes(const std::string& text) {
@@ -291,6 +292,9 @@ std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMark
     for (WordPlace& word : WordsOf(node, names)) {
       if (CharacterStarts(word.token).size() <= SHORTEST || AnyKnows(word.token, where, shares)) {
         continue;
+      }
+      if (changes.size() == MOST_SLIPS) {
+        return "";
       }
       word.token = NearestTo(word.token, where, shares);
       if (word.token.empty()) {

@@ -66,6 +66,23 @@ TEST_F(QuerySuggestionTest, WordsThatStandElsewhereAreNotSuggested) {
   }
 }
 
+// Each costs a look through the vocabularies.
+TEST_F(QuerySuggestionTest, QuestionsFullOfSlipsGetNoSuggestion) {
+  std::string text;
+  std::string slips;
+  for (char c = 'a'; c < 'a' + 11; ++c) {
+    const std::string word = std::string(3, c) + "xyz";
+    text += (text.empty() ? "" : " ") + word;
+    slips += (slips.empty() ? "" : " ") + word.substr(0, 5);
+  }
+  Store({{"a.txt", TextContent(text)}});
+
+  EXPECT_EQ(Suggested("\"" + slips + "\""), "");
+  const size_t last = slips.rfind(' ');
+  EXPECT_EQ(Suggested("\"" + slips.substr(0, last) + "\""),
+            "\"" + text.substr(0, text.rfind(' ')) + "\"");
+}
+
 // Composed or parted, in the question or on disk: an accent is no slip.
 TEST_F(QuerySuggestionTest, SuggestionsAreThoseOfTheLettersWithoutAccents) {
   Store({{"\u00dcberweisung.txt", TextContent("die Geb\u00fchren")},
@@ -89,6 +106,7 @@ TEST_F(QuerySuggestionTest, WordsThatLookLikeFieldsAreToldWhereNothingIsFound) {
   Store({{"holiday type:pdf.txt", TextContent("x")}});
   const std::map<std::string, std::string> told = {
       {"type:doc", "type:doc"},
+      {"exr:pdf", "exr:pdf"},
       {"nothing (type:doc OR colour:red)", "type:doc"},
       {"nothing OR colour:red", "colour:red"},
       {"holidya type:pdf", ""},  // a suggestion says more
