@@ -15,7 +15,8 @@ void DeclareSearch(Declarer& declare) {
           "What to find, see below; joined by a blank")
       ->type_name("");
   search->set_help_flag("--help", "Print this help message and exit");
-  AddOption(search, "--share", into.in_share, "NAME", "In that share alone");
+  AddOption(search, "--share", into.in_share, "NAME",
+            "In that share alone; in several with share:A,B in QUERY");
   AddChoice(search, "--kind", into.kind, "KIND", "document, audio, video, photo, other or folder",
             {"document", "audio", "video", "photo", "other", "folder"});
   AddOption(search, "--under", into.under, "PATH", "At or below that path");
