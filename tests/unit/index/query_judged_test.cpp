@@ -134,6 +134,8 @@ std::vector<Judged> Judgements() {
         {"household budget template.ods", "draft budget 2023 old copy.xlsx"},
         {"cost plan.pdf"},
         {"minutes of march.txt"}}},
+      {"budget 2024", {{"Budget 2024.xlsx"}}},
+      {"budget OR invoice", {{"budget.xlsx", "invoice.pdf"}}},
       {"budget 2023", {{"Budget 2023.xlsx"}, {"draft budget 2023 old copy.xlsx"}}},
       {"annual report",
        {{"Annual Report.pdf"},
