@@ -84,25 +84,16 @@ const NamedField* FindField(std::string_view name) {
 
 const char* NearField(std::string_view name) {
   constexpr size_t SHORTEST = 4;
-  constexpr size_t LONG = 6;
   if (name.size() < SHORTEST) {
     return nullptr;
   }
   std::string lower(name);
   std::transform(lower.begin(), lower.end(), lower.begin(),
                  [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
-  const char* near = nullptr;
-  int nearest = 3;
-  for (const NamedField& field : FIELDS) {
-    const bool is_long = name.size() >= LONG && std::string_view(field.name).size() >= LONG;
-    const int most = is_long ? 2 : 1;
-    const int distance = EditDistance(lower, field.name, most);
-    if (distance <= most && distance < nearest) {
-      near = field.name;
-      nearest = distance;
-    }
-  }
-  return near;
+  const auto* const near = std::find_if(
+      std::begin(FIELDS), std::end(FIELDS),
+      [&lower](const NamedField& field) { return EditDistance(lower, field.name, 1) == 1; });
+  return near == std::end(FIELDS) ? nullptr : near->name;
 }
 
 const char* FieldName(ContentField field) {

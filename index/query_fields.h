@@ -40,9 +40,9 @@ bool TakesRange(QueryField field);
 
 // Letter case does not count. Null: no such field.
 const NamedField* FindField(std::string_view name);
-// The field's name that is nearest to `name` and can be meant by it: one slip away from a name of
-// at least four letters, or two where both have at least six. Null: none. What is shorter is near
-// to some field too often ("go:generate", "id:5").
+// The field's name that can be meant by `name`, which has at least four letters: it is one slip
+// away. Null: none. What is shorter, or two slips away, is near to some field too often
+// ("go:generate", "computer:7").
 const char* NearField(std::string_view name);
 // The name that users know a text or number field by.
 const char* FieldName(ContentField field);

@@ -213,7 +213,7 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
 
 TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
   for (const char* text :
-       {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "midifed:2024", "size>1G", "ext=pdf",
+       {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "size>1G", "ext=pdf",
         "name:(a title:b)", "size: 1G", "share:data", "under:/srv/data/projects", "size:<0",
         "rating:>5", "modified:2024-06..2024-01", "near:52.5,13.4,0"}) {
     const Names hits = Hits(text);
