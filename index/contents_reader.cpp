@@ -43,6 +43,7 @@ const char* StateText(ContentState state) {
       return "done";
     case ContentState::FAILED:
     case ContentState::QUARANTINED:
+    case ContentState::UNREAD:
       break;
   }
   return "failed";

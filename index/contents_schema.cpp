@@ -13,6 +13,10 @@ static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
 
 namespace {
 
+#define ADDITIONS                                                       \
+  "CREATE TABLE later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);" \
+  "CREATE INDEX later_by_due ON later(due);"
+
 // AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
 constexpr const char* CONTENTS_SCHEMA = R"sql(
 CREATE TABLE files(
@@ -70,7 +74,7 @@ CREATE TABLE meta(
 INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '', 0);
 PRAGMA application_id = 1179206479;
 PRAGMA user_version = 3;
-)sql";
+)sql" ADDITIONS;
 
 }  // namespace
 
@@ -83,6 +87,8 @@ const DatabaseForm CONTENTS_FORM = {
     .probed = "meta WHERE id = 1",
     .prepare = RegisterTextTokenizer,
 };
+
+const char* const CONTENTS_ADDITIONS = "BEGIN IMMEDIATE;" ADDITIONS "COMMIT";
 
 const char* const NUMBER_COLUMNS =
     "pages, created, sent, taken, recorded, year, track, duration, bit_rate, width, height, "

@@ -14,7 +14,8 @@
 //     state             ContentState
 //     extractor         version of the readers that read it last; 0: none did, or, of a file
 //                       that was read, nothing was kept, as what it was found to be is not wanted
-//     tries             how many ended in failure; while it waits, with the death of what read it
+//     tries             how many ended in failure; while it waits, with the death of what read it;
+//                       of an unread one, how often the disk did not give it
 //     unended           how many began beside others and have no end on record: its fault or not
 //     begun             0 not in flight, 1 alone, 2 beside others
 //     reason            of the failure, one line
@@ -31,6 +32,9 @@
 //   words     the same by words: a column for the text, and one for each text field. No stored
 //             copy, so deleting needs what was inserted. Made by the writer, as the share's
 //             language is among its arguments
+//   later     files whose bytes the disk did not give, and when the next try is due, in seconds
+//   since
+//             the epoch. While one is with a helper that is far away
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
 //             failed
 //   rate      for each second with commits of the last minute: how many files were done
@@ -64,7 +68,8 @@ constexpr int64_t CONTENTS_VERSION = 3;
 extern const DatabaseForm CONTENTS_FORM;
 
 // Numbers are stored.
-enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3 };
+// UNREAD: its bytes cannot be had, which tells nothing about it.
+enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3, UNREAD = 4 };
 
 constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being made anew
 
@@ -72,6 +77,10 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 // up; then the newest, by the minute, as of no two files the same time would ever be met; then the
 // smallest. An index has these expressions.
 #define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
+
+// What databases of this version lack that were made before it was thought of. Whoever only reads
+// needs none of it.
+extern const char* const CONTENTS_ADDITIONS;
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;

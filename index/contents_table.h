@@ -69,7 +69,11 @@ class ContentsTable {
   int Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found);
   int FindById(int64_t id, ContentFile& file, bool& found);
   // Each of these gives up to `limit` rows.
-  int Waiting(int64_t limit, std::vector<ContentFile>& files);
+  // Of those that wait, first what was never read, or only by these readers; then what older ones
+  // had read or failed at.
+  int WaitingNew(int64_t limit, int64_t extractor, std::vector<ContentFile>& files);
+  int WaitingAgain(int64_t limit, int64_t extractor, std::vector<ContentFile>& files);
+  int UnreadDue(int64_t now, int64_t limit, std::vector<ContentFile>& files);
   int Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files);
   int LeftBegun(int64_t limit, std::vector<ContentFile>& files);
   int Unreferred(int64_t until, int64_t limit, std::vector<ContentFile>& files);
@@ -78,6 +82,12 @@ class ContentsTable {
   int Insert(const ContentFile& file);
   int Update(const ContentFile& before, const ContentFile& file);
   int SetReason(int64_t id, const std::string& reason);
+  // Of an unread one: when it is tried again. It is forgotten with that state.
+  int SetDue(int64_t id, int64_t due);
+  // None is due later than that: the clock may have been set back.
+  int LimitDue(int64_t latest);
+  // The next one; INT64_MAX if there is none.
+  int NextDue(int64_t& due);
   // In place of what was stored. Sets `text`, `length` and `found_kind` of `file`, which Update
   // then writes; `before` is the row as it stands.
   int SetContent(const ContentFile& before, const PreparedContent& prepared, ContentFile& file);
@@ -105,11 +115,13 @@ class ContentsTable {
     bool IsZero() const { return waiting == 0 && done == 0 && failed == 0; }
   };
 
+  int Complete();  // see CONTENTS_ADDITIONS
   int PrepareTexts();
   int HasTable(const char* name, bool& has);
   int RemoveOldWords();
   int IsWorthMerging(bool& is_worth);
   bool HasFreePages();
+  int DropDue(int64_t id);
   int WriteMeta();
   int WriteCounts(int64_t now);
   void Count(const ContentFile& file, int64_t number);
@@ -123,8 +135,10 @@ class ContentsTable {
   std::vector<int64_t> leaving;        // rowids in `texts`
   bool has_old_words = false;
   bool merging = false;
-  Statement find, find_by_id, waiting, failed, left_begun, unreferred, slice;
+  Statement find, find_by_id, waiting_new, waiting_again, unread_due, failed, left_begun,
+      unreferred, slice;
   Statement insert, update, set_reason, set_content, remove;
+  Statement set_due, drop_due, limit_due, next_due;
   Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
   Statement write_meta, write_counts, write_rate, cut_rate, free_pages, give_back, count_done;
 };

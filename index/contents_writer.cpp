@@ -20,6 +20,14 @@ int64_t Now() {
   return static_cast<int64_t>(time(nullptr));
 }
 
+int64_t PauseAfter(int64_t tries) {
+  int64_t pause = SHORTEST_PAUSE;
+  for (int64_t one = 1; one < tries && pause < LONGEST_PAUSE; ++one) {
+    pause *= 2;
+  }
+  return std::min(pause, LONGEST_PAUSE);
+}
+
 }  // namespace
 
 bool ContentsWriter::Impl::Guarded(const std::function<bool()>& step) {
@@ -130,7 +138,8 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
   now.begun = 0;
   now.unended = 0;
   if (current) {
-    ++now.tries;
+    now.tries = file.state == ContentState::UNREAD ? 1 : file.tries + 1;
+    now.state = ContentState::WAITING;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
       // What was found before in the same bytes, by older readers or in another try, stays.
@@ -143,6 +152,34 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
 }
 
+// Deaths that were on record before are forgotten: there is one number for both.
+bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t now) {
+  ContentFile file;
+  bool found = false;
+  bool current = false;
+  if (!Ready()) {
+    return false;
+  }
+  int code = TakeBack(id, file, found, current);
+  if (code != SQLITE_OK || !found) {
+    return Done(code);
+  }
+
+  ContentFile unread = file;
+  unread.begun = 0;
+  unread.unended = 0;
+  if (current) {
+    unread.tries = file.state == ContentState::UNREAD ? file.tries + 1 : 1;
+    unread.state = ContentState::UNREAD;
+    // These readers tried it; what stands there of others keeps their version.
+    unread.extractor = file.text == 0 ? extractor : file.extractor;
+    code = table->SetReason(id, reason);
+    code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(unread.tries)) : code;
+    code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  }
+  return Done(code == SQLITE_OK ? table->Update(file, unread) : code);
+}
+
 bool ContentsWriter::Impl::Release(int64_t id) {
   ContentFile file;
   bool found = false;
@@ -150,7 +187,11 @@ bool ContentsWriter::Impl::Release(int64_t id) {
   if (!Ready()) {
     return false;
   }
-  const int code = TakeBack(id, file, found, current);
+  int code = TakeBack(id, file, found, current);
+  if (code == SQLITE_OK && found && file.state == ContentState::UNREAD) {
+    unread_due = 0;
+    code = table->SetDue(id, unread_due);
+  }
   if (code != SQLITE_OK || !found) {
     return Done(code);
   }
@@ -246,6 +287,15 @@ bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool&
   return impl->Guarded([&] { return impl->NextJobs(limit, jobs, more); });
 }
 
+bool ContentsWriter::NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs,
+                               bool& more) {
+  return impl->Guarded([&] { return impl->NextAgain(now, limit, jobs, more); });
+}
+
+int64_t ContentsWriter::UnreadDue() const {
+  return IsOpen() ? impl->unread_due : INT64_MAX;
+}
+
 bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
   return impl->Guarded([&] { return impl->BeginTries(files); });
 }
@@ -259,12 +309,16 @@ bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content
   return impl->Guarded([&] { return impl->Fail(file, reason, found, killed); });
 }
 
+bool ContentsWriter::Unread(int64_t file, const std::string& reason, int64_t now) {
+  return impl->Guarded([&] { return impl->Unread(file, reason, now); });
+}
+
 bool ContentsWriter::Release(int64_t file) {
   return impl->Guarded([&] { return impl->Release(file); });
 }
 
 bool ContentsWriter::RetryFailed() {
-  return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->RetryAll(false)); });
+  return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->RetryAll()); });
 }
 
 bool ContentsWriter::Sweep(int64_t now, size_t limit, bool& more) {

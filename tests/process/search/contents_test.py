@@ -163,7 +163,11 @@ class ContentsFollowTest(ScriptedTest):
         self.start()
         self.ctl("folder", "add", root, "--document")
         self.await_given("unread.txt")
-        self.await_counts(done=1, waiting=1, failed=0)
+        self.await_counts(done=1, waiting=0, failed=1)
+        ((reason, tries),) = self.failed().values()
+        self.assertEqual(reason, "the disk is gone")
+        self.assertGreaterEqual(tries, 1)
+        self.await_given("unread.txt", 3)
 
         self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
 

@@ -57,9 +57,27 @@ void ContentsTest::Sweep(int64_t now) {
   ASSERT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
 }
 
-Names ContentsTest::Jobs(size_t limit) {
+Names ContentsTest::NewJobs(size_t limit) {
   std::vector<ContentJob> jobs;
   EXPECT_TRUE(contents->NextJobs(limit, jobs, more_jobs)) << IndexErrorText(contents->Error());
+  return Handed(jobs);
+}
+
+Names ContentsTest::Jobs(size_t limit) {
+  Names names = NewJobs(limit);
+  if (names.size() < limit) {
+    std::vector<ContentJob> jobs;
+    bool more_again = false;
+    EXPECT_TRUE(contents->NextAgain(clock, limit - names.size(), jobs, more_again))
+        << IndexErrorText(contents->Error());
+    more_jobs = more_jobs || more_again;
+    const Names others = Handed(jobs);
+    names.insert(names.end(), others.begin(), others.end());
+  }
+  return names;
+}
+
+Names ContentsTest::Handed(const std::vector<ContentJob>& jobs) {
   Names names;
   for (const ContentJob& job : jobs) {
     EXPECT_FALSE(job.paths.empty());

@@ -21,8 +21,9 @@ class ContentsTest : public IndexTest {
   void OpenContents(int64_t extractor = 1);  // anew
   void TakeIn();                             // all there is, and commits
   void Sweep(int64_t now);                   // all there is, and commits
-  // Names of what is handed out, in order; each stays handed out.
+  // Names of what is handed out, in order, what is new first; each stays handed out.
   Names Jobs(size_t limit = 100);
+  Names NewJobs(size_t limit = 100);          // of these alone what is new
   ContentJob JobOf(const std::string& name);  // of what was handed out
   // Puts a file there, adds it to the entries, and takes it in.
   void File(const std::string& name, const std::string& bytes = "bytes");
@@ -37,7 +38,9 @@ class ContentsTest : public IndexTest {
   int64_t Holding(const std::string& word);
 
   std::unique_ptr<ContentsWriter> contents;
+  Names Handed(const std::vector<ContentJob>& jobs);
   std::map<std::string, ContentJob> handed;  // by name
+  int64_t clock = 2'000'000'000;             // seconds since the epoch
   bool more_jobs = false;                    // as the last Jobs was told
 };
 
