@@ -23,7 +23,10 @@ struct EntryContent {
 EntryContent ContentOf(const std::string& share, const Entry& entry);
 
 Json::Value ContentObject(const EntryContent& content);  // null when not known
-// Names and values for people: state first, then the fields; or the problem alone.
-std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content);
+// Names and values for people: state first, then the fields; or the problem alone. What holds
+// several lines, such as the members of an archive, has a line for each, the others without a name;
+// at most so many, and what is left out is told.
+std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content,
+                                                              size_t most_of_field);
 
 }  // namespace fileindexd

@@ -271,6 +271,26 @@ class QuarantineTest(ScriptedTest):
         self.assertEqual(self.hits("lighthouse"), ["crash.txt", "good.txt"])
         self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
 
+    def test_retry_says_what_it_does_and_who_does_not(self):
+        self.assertEqual(self.ctl("failed", "--retry").out, b"3 files will be tried again\n")
+        self.await_diary(lambda given: given.count("bad.txt") == 2)
+        self.await_counts(failed=3, waiting=0)
+
+        self.ctl("pause")
+        self.assertIn(b"3 files will be tried again when", self.ctl("failed", "--retry").out)
+        for one in self.ctl("failed", "--retry", "--json").json():
+            self.assertTrue(one["retry"] and one["paused"])
+        self.ctl("resume")
+        self.await_diary(lambda given: given.count("bad.txt") == 3)
+        self.await_counts(failed=3, waiting=0)
+
+        self.stop(self.daemon)
+        self.assertIn(b"content service", self.ctl("failed", "alpha", "--retry").out)
+        for one in self.ctl("failed", "--retry", "--json").json():
+            self.assertEqual((one["retry"], one["service_runs"], one["paused"]), (True, False, False))
+        self.start()
+        self.await_diary(lambda given: given.count("bad.txt") == 4)
+
     def test_what_an_older_extractor_failed_at_is_tried_again(self):
         self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
         self.stop(self.daemon)
