@@ -49,6 +49,7 @@ ContentsReport ReportContents(const std::string& share_name, uint64_t wanted) {
 
 void AddContents(Json::Value& object, const ContentsReport& report) {
   SetCounts(object, report.counts.all, "contents_");
+  object["contents_not_kept"] = static_cast<Json::UInt64>(report.counts.not_kept);
   object["contents_last_minute"] = static_cast<Json::UInt64>(report.counts.done_last_minute);
   object["contents_by_kind"] = Json::objectValue;
   for (const Kind kind : KINDS) {
@@ -65,6 +66,9 @@ std::string ContentsText(const ContentsReport& report) {
   }
 
   std::string text = CountsText(report.counts.all);
+  if (report.counts.not_kept > 0) {
+    text += ", " + std::to_string(report.counts.not_kept) + " with nothing to keep";
+  }
   if (report.counts.done_last_minute > 0) {
     text += ", " + std::to_string(report.counts.done_last_minute) + " in the last minute";
   }

@@ -113,6 +113,7 @@ bool ContentsReader::Count(ContentCounts& counts) {
   for (; code == SQLITE_ROW; code = by_kind.Step()) {
     const auto kind = static_cast<size_t>(by_kind.Int(0));
     if (kind >= read.kinds.size()) {
+      read.not_kept += kind == NOT_KEPT ? static_cast<uint64_t>(by_kind.Int(2)) : 0;
       continue;
     }
     for (ContentCounts::OfKind* counted : {&read.kinds[kind], &read.all}) {

@@ -21,6 +21,7 @@ struct ContentCounts {
   };
   std::array<OfKind, 5> kinds;  // by Kind, folders left out
   OfKind all;
+  uint64_t not_kept = 0;  // looked into, and of no kind that is read, or is wanted
   uint64_t done_last_minute = 0;
 };
 

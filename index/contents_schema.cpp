@@ -8,14 +8,21 @@
 namespace fileindexd {
 
 static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
-                  ALL_WORDS == 9223372036854775807,
+                  ALL_WORDS == 9223372036854775807 && NOT_KEPT == 5,
               "numbers in the text below");
 
 namespace {
 
-#define ADDITIONS                                                       \
-  "CREATE TABLE later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);" \
-  "CREATE INDEX later_by_due ON later(due);"
+#define ADDITIONS                                                                                \
+  "CREATE TABLE later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);"                          \
+  "CREATE INDEX later_by_due ON later(due);"                                                     \
+  "UPDATE counts SET waiting = 0, done = 0, failed = 0;"                                         \
+  "INSERT OR IGNORE INTO counts VALUES(5, 0, 0, 0);"                                             \
+  "INSERT INTO counts SELECT iif(state = 1 AND (extractor = 0 OR max(found_kind, kind) = 0), 5," \
+  " iif(found_kind <> 0, found_kind, kind)) AS counted,"                                         \
+  " sum(state = 0), sum(state = 1), sum(state >= 2) FROM files WHERE true GROUP BY counted"      \
+  " ON CONFLICT(kind) DO UPDATE SET"                                                             \
+  " waiting = excluded.waiting, done = excluded.done, failed = excluded.failed;"
 
 // AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
 constexpr const char* CONTENTS_SCHEMA = R"sql(

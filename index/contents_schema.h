@@ -36,7 +36,8 @@
 //   since
 //             the epoch. While one is with a helper that is far away
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
-//             failed
+//             failed; and under NOT_KEPT, as done, those that were looked into and left: of no kind
+//             that is read, or of one that is not wanted
 //   rate      for each second with commits of the last minute: how many files were done
 //   meta      one row: the share's file system (contents of another one say nothing), the language
 //             of the words, the version of the readers that all was read or tried with, the random
@@ -70,6 +71,8 @@ extern const DatabaseForm CONTENTS_FORM;
 // Numbers are stored.
 // UNREAD: its bytes cannot be had, which tells nothing about it.
 enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3, UNREAD = 4 };
+
+constexpr int64_t NOT_KEPT = 5;  // behind the kinds
 
 constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being made anew
 

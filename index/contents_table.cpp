@@ -47,11 +47,20 @@ void BindFile(Statement& statement, const ContentFile& file) {
   }
 }
 
+Kind KindOf(const ContentFile& file) {
+  return file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
+}
+
 int Execute(sqlite3* db, const std::string& sql) {
   return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
 }
 
 }  // namespace
+
+bool IsNotKept(const ContentFile& file) {
+  return file.state == ContentState::DONE &&
+         (file.extractor == KEPT_OUT || KindOf(file) == Kind::OTHER);
+}
 
 int ContentsTable::Complete() {
   bool is_complete = false;
@@ -101,7 +110,7 @@ int ContentsTable::Prepare(sqlite3* db) {
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
        "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
        "words_version = ?9, merged = ?10 WHERE id = 1"},
-      {&count_done, "SELECT coalesce(sum(done), 0) FROM counts"},
+      {&count_done, "SELECT coalesce(sum(done), 0) FROM counts WHERE kind < 5"},
       {&write_counts,
        "UPDATE counts SET waiting = waiting + ?2, done = done + ?3, "
        "failed = failed + ?4 WHERE kind = ?1"},
@@ -287,8 +296,8 @@ int ContentsTable::Slice(int64_t after, int64_t limit, std::vector<ContentFile>&
 }
 
 void ContentsTable::Count(const ContentFile& file, int64_t number) {
-  const Kind kind = file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
-  const auto place = static_cast<size_t>(kind);
+  const auto kind = static_cast<size_t>(KindOf(file));
+  const size_t place = IsNotKept(file) ? NOT_KEPT : kind;
   CountOfKind& count = counted[place < counted.size() ? place : 0];
   switch (file.state) {
     case ContentState::WAITING:

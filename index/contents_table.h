@@ -38,6 +38,12 @@ struct ContentFile {
   int64_t length = 0;
 };
 
+// `extractor` of a file that was read and of which nothing was kept: its kind is not wanted.
+constexpr int64_t KEPT_OUT = 0;
+
+// Whether it was looked into, and holds nothing that is read, or is wanted.
+bool IsNotKept(const ContentFile& file);
+
 struct ContentsMeta {
   std::string filesystem;
   std::string language;
@@ -131,8 +137,8 @@ class ContentsTable {
   int RemoveWords();
   int RemoveWordsOf(int64_t text);
 
-  std::array<CountOfKind, 5> counted;  // since the last commit
-  std::vector<int64_t> leaving;        // rowids in `texts`
+  std::array<CountOfKind, NOT_KEPT + 1> counted;  // since the last commit
+  std::vector<int64_t> leaving;                   // rowids in `texts`
   bool has_old_words = false;
   bool merging = false;
   Statement find, find_by_id, waiting_new, waiting_again, unread_due, failed, left_begun,

@@ -102,7 +102,7 @@ bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
     now.tries = 0;
     code = Keep(file, content, now);
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
-    ++table->done_now;
+    table->done_now += IsNotKept(now) ? 0 : 1;
   }
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
 }
@@ -119,6 +119,14 @@ int ContentsWriter::Impl::Keep(const ContentFile& file, const PreparedContent& c
   }
   return is_kept ? table->SetContent(file, content, now)
                  : table->SetContent(file, OfKind(kind), now);
+}
+
+// What is of no kind that is wanted has not failed: nobody wants to know what is in it.
+void ContentsWriter::Impl::SettleKeptOut(ContentFile& file) {
+  if (file.extractor == KEPT_OUT && file.state == ContentState::FAILED) {
+    file.state = ContentState::DONE;
+    file.tries = 0;
+  }
 }
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
@@ -146,8 +154,10 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
       const bool is_known = file.text != 0 && file.extractor != KEPT_OUT;
       now.extractor = extractor;
       code = is_known ? SQLITE_OK : Keep(file, content, now);
+      SettleKeptOut(now);
     }
-    code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
+    const bool is_failure = now.state != ContentState::DONE;
+    code = code == SQLITE_OK ? table->SetReason(id, is_failure ? reason : "") : code;
   }
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
 }
@@ -171,9 +181,13 @@ bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t
   if (current) {
     unread.tries = file.state == ContentState::UNREAD ? file.tries + 1 : 1;
     unread.state = ContentState::UNREAD;
-    // These readers tried it; what stands there of others keeps their version.
-    unread.extractor = file.text == 0 ? extractor : file.extractor;
-    code = table->SetReason(id, reason);
+    // These readers tried it; what stands there of others keeps their version. What may be of other
+    // bytes goes, unless there is a text to be found.
+    if (file.text == 0 && file.extractor == KEPT_OUT) {
+      unread.extractor = extractor;
+      code = table->SetContent(file, OfKind(file.found_kind), unread);
+    }
+    code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
     code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(unread.tries)) : code;
     code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
   }

@@ -24,9 +24,6 @@
 
 namespace fileindexd {
 
-// `extractor` of a file that was read and of which nothing was kept: its kind is not wanted.
-constexpr int64_t KEPT_OUT = 0;
-
 // Between two tries to have a file's bytes from the disk, in seconds.
 constexpr int64_t SHORTEST_PAUSE = 2;
 constexpr int64_t LONGEST_PAUSE = 60 * 60;
@@ -91,6 +88,7 @@ struct ContentsWriter::Impl {
   // contents_writer.cpp
   bool Finish(int64_t file, const PreparedContent& content);
   int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
+  static void SettleKeptOut(ContentFile& file);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Unread(int64_t file, const std::string& reason, int64_t now);
   bool Release(int64_t file);

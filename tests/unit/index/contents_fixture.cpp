@@ -41,6 +41,12 @@ void ContentsTest::OpenContents(int64_t extractor) {
   ASSERT_EQ(error, IndexError::NONE) << IndexErrorText(error);
 }
 
+void ContentsTest::UseSettings() {
+  std::shared_ptr<const Settings> in_force;
+  ASSERT_TRUE(store->GetSettings(in_force));
+  contents->UseSettings(in_force);
+}
+
 void ContentsTest::TakeIn() {
   bool more = true;
   while (more) {
@@ -121,6 +127,18 @@ Names ContentsTest::Read() {
   const Names names = Jobs();
   for (const std::string& name : names) {
     Finish(name, name);
+  }
+  return names;
+}
+
+Names ContentsTest::Hits(const std::string& text) {
+  question.text = text;
+  question.shares = {"s"};
+  std::string error;
+  EXPECT_TRUE(Ask(question, answer, error)) << error;
+  Names names;
+  for (const Hit& hit : answer.hits) {
+    names.push_back(hit.entry.path.substr(root.size() + 1));
   }
   return names;
 }

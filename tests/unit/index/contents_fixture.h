@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "index/contents_writer.h"
+#include "index/search.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -19,6 +20,7 @@ class ContentsTest : public IndexTest {
 
   Share TheShare();
   void OpenContents(int64_t extractor = 1);  // anew
+  void UseSettings();                        // that are in the store
   void TakeIn();                             // all there is, and commits
   void Sweep(int64_t now);                   // all there is, and commits
   // Names of what is handed out, in order, what is new first; each stays handed out.
@@ -33,10 +35,13 @@ class ContentsTest : public IndexTest {
   void Finish(const std::string& name, const std::string& text);
   // Hands out all that waits, and finishes each with its own name as its text.
   Names Read();
+  Names Hits(const std::string& text);     // of `question`, with that text
   int64_t Number(const std::string& sql);  // an answer of the contents database
   // How many stored files hold that word.
   int64_t Holding(const std::string& word);
 
+  Question question;
+  Answer answer;
   std::unique_ptr<ContentsWriter> contents;
   Names Handed(const std::vector<ContentJob>& jobs);
   std::map<std::string, ContentJob> handed;  // by name
