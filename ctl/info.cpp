@@ -10,6 +10,7 @@
 #include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/content_kinds.h"
+#include "ctl/contents_report.h"
 #include "ctl/info_facts.h"
 #include "ctl/info_question.h"
 #include "ctl/output.h"
@@ -161,6 +162,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
   object["stored"] = ContentObject(facts.content);
   object["content_problem"] = facts.content.problem;
+  object["words_made_anew"] = WordsObject(facts.content.words);
   object["needs_reindex"] = NeedsReindex(facts);
   object["root_problem"] = ToUtf8(ProblemOfRoot(facts));
   object["index_problem"] = facts.index_problem;
@@ -229,6 +231,9 @@ void PutFacts(const PathFacts& facts) {
   }
   if (NeedsReindex(facts)) {
     PutFact("problem", "the whole share waits for a reindex");
+  }
+  if (facts.content.words) {
+    PutFact("words", WordsText(*facts.content.words));
   }
   if (facts.in_index) {
     PutEntry(facts.entry);

@@ -73,12 +73,15 @@ void AddTextLines(const char* name, std::string_view text, size_t most, Lines& l
 
 }  // namespace
 
-EntryContent ContentOf(const std::string& share, const Entry& entry) {
+EntryContent ContentOf(const Share& share, const Entry& entry) {
   EntryContent content;
   StoredContent& stored = content.stored;
   ContentsReader reader;
-  IndexError error = reader.Open(share);
+  IndexError error = reader.Open(share.name);
   error = error == IndexError::NONE ? reader.Find(entry, stored) : error;
+  if (error == IndexError::NONE && !reader.FindWordsProgress(share.language, content.words)) {
+    error = IndexError::OTHER;
+  }
   if (error != IndexError::NONE && error != IndexError::PATH_NOT_FOUND) {
     content.problem = IndexErrorText(error);
     return content;

@@ -5,6 +5,7 @@
 #include <array>
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 
 #include "base/content.h"
@@ -31,6 +32,14 @@ struct FailedContent {
   int64_t tries = 0;
 };
 
+// Words that are made anew for another language; those of the old one are found until that is done.
+struct WordsProgress {
+  std::string language;  // whose words are found
+  std::string wanted;
+  uint64_t done = 0;  // texts
+  uint64_t total = 0;
+};
+
 // What is stored for an entry. Waiting where nothing was read yet, or nothing is wanted.
 struct StoredContent {
   std::string state = "waiting";  // or "done", "failed"
@@ -53,6 +62,9 @@ class ContentsReader {
   IndexError Open(const std::string& share_name);
 
   bool Count(ContentCounts& counts);
+  // Of a share with that language: none when its words are those that are wanted. False when that
+  // cannot be told.
+  bool FindWordsProgress(const std::string& share_language, std::optional<WordsProgress>& progress);
   bool ForEachFailed(const std::function<bool(const FailedContent&)>& visit);
   // What stands for the entry: of one moment. NONE, or why that cannot be told.
   IndexError Find(const Entry& entry, StoredContent& stored);

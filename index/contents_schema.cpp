@@ -126,15 +126,13 @@ std::string ColumnAt(const char* columns, size_t place) {
 
 // The hash that collects words before they are written as a segment holds 8 MiB: fewer segments
 // to merge, which is what most of the time goes into.
-std::string WordsSchema(const std::string& language) {
-  return "DROP TABLE IF EXISTS words;"
-         "CREATE VIRTUAL TABLE words USING fts5(" +
+std::string WordsSchema(const std::string& table, const std::string& language) {
+  const std::string insert = "INSERT INTO " + table + "(" + table + ", rank) ";
+  return "DROP TABLE IF EXISTS " + table + ";CREATE VIRTUAL TABLE " + table + " USING fts5(" +
          std::string(WORD_COLUMNS) + ", content='', columnsize=0, tokenize='" +
-         std::string(TEXT_TOKENIZER) + " " + language +
-         "');"
-         "INSERT INTO words(words, rank) VALUES('automerge', 16);"
-         "INSERT INTO words(words, rank) VALUES('crisismerge', 64);"
-         "INSERT INTO words(words, rank) VALUES('hashsize', 8388608)";
+         std::string(TEXT_TOKENIZER) + " " + language + "');" + insert +
+         "VALUES('automerge', 16);" + insert + "VALUES('crisismerge', 64);" + insert +
+         "VALUES('hashsize', 8388608)";
 }
 
 }  // namespace fileindexd

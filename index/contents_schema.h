@@ -44,9 +44,11 @@
 //             number of the entries database that was followed and the greatest `written` seen in
 //             it, the last rowid in `texts`, and while the words are being made anew, up to which
 //             of them that is done (all, unless it is going on) and up to which it has to be, the
-//             version of what cuts texts into words, and the last rowid in `texts` when the words
+//             version of what cut texts into words, and the last rowid in `texts` when the words
 //             were merged
-//   old_words what `words` was, while it is taken away after words began to be made anew
+//   new_words what `words` becomes once it holds all texts: questions ask the old ones until then
+//   words_to_be  one row while that is made: the language and the version of what is made
+//   old_words what `words` was, while it is taken away
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.
@@ -99,7 +101,8 @@ constexpr int FIRST_FIELD_COLUMN = 1;
 // The name at that place, from 0, of one of the two lists.
 std::string ColumnAt(const char* columns, size_t place);
 
-// Makes the words anew, empty, for that language (one of IsLanguage).
-std::string WordsSchema(const std::string& language);
+// Makes a table of words, empty, for that language (one of IsLanguage), in the place of one of that
+// name.
+std::string WordsSchema(const std::string& table, const std::string& language);
 
 }  // namespace fileindexd

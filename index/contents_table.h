@@ -59,12 +59,11 @@ struct ContentsMeta {
 
 class ContentsTable {
  public:
-  // Reads `meta` too. There are no words yet in a database that was just made: MakeWords, and then
-  // PrepareWords.
+  // Reads `meta` too. There are no words yet in a database that was just made: UseWords.
   int Prepare(sqlite3* db);
-  int PrepareWords();
-  // All anew, from what is stored: see Reword. What is stored from now on has its words at once.
-  int MakeWords(const std::string& language, const std::string& version);
+  // Has the words be those of that language and version. Others are made anew from what is stored,
+  // beside those that are there (see Reword); what is stored from now on has both at once.
+  int UseWords(const std::string& language, const std::string& version);
 
   // Commit writes `meta`, and counts `done_now` files as done in that second.
   int Begin();  // nothing, if a transaction is open
@@ -100,8 +99,8 @@ class ContentsTable {
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 
-  // Makes words of stored texts, about a MiB, and takes away as many old ones. `more`: there are
-  // others.
+  // Makes new words of stored texts, about a MiB, or puts them in the place of the old ones; and
+  // takes away as many of those that were replaced. `more`: there are others.
   int Reword(bool& more);
   // One step, bounded, towards words that stand in one piece, if so many are new that it is worth
   // it; and then towards a file without free pages. `more`: call again, after a commit.
@@ -124,6 +123,19 @@ class ContentsTable {
   int Complete();  // see CONTENTS_ADDITIONS
   int PrepareTexts();
   int HasTable(const char* name, bool& has);
+  struct Words {
+    std::string language;
+    std::string version;
+    bool operator==(const Words&) const = default;
+  };
+  int ReadWordsToBe(Words& to_be, bool& found);
+  int PrepareWords();
+  static int PrepareInto(const std::string& table, sqlite3* db, Statement& insert,
+                         Statement& remove);
+  int BeginWords(const Words& to_be);
+  int DropNewWords();
+  int ReplaceWords();
+  int MakeNewWords(bool& more);
   int RemoveOldWords();
   int IsWorthMerging(bool& is_worth);
   bool HasFreePages();
@@ -133,19 +145,22 @@ class ContentsTable {
   void Count(const ContentFile& file, int64_t number);
   int ReadFiles(Statement& statement, std::vector<ContentFile>& files);
   static int RunWords(Statement& statement, int64_t text, const ContentWords& words);
-  int AddWords(int64_t text, const ContentWords& words);
+  int AddWords(int64_t text, ContentWords& words, const PreparedContent& prepared);
   int RemoveWords();
   int RemoveWordsOf(int64_t text);
 
   std::array<CountOfKind, NOT_KEPT + 1> counted;  // since the last commit
   std::vector<int64_t> leaving;                   // rowids in `texts`
   bool has_old_words = false;
+  std::string new_language;  // whose words are being made; empty: none are
+  bool may_remove = true;    // from the words: they are those that would be cut now
   bool merging = false;
   Statement find, find_by_id, waiting_new, waiting_again, unread_due, failed, left_begun,
       unreferred, slice;
   Statement insert, update, set_reason, set_content, remove;
   Statement set_due, drop_due, limit_due, next_due;
   Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
+  Statement insert_new_words, remove_new_words;
   Statement write_meta, write_counts, write_rate, cut_rate, free_pages, give_back, count_done;
 };
 

@@ -82,11 +82,7 @@ int ContentsWriter::Impl::Own() {
     code = table->Begin();
     table->meta.filesystem = share.filesystem;
   }
-  if (code == SQLITE_OK &&
-      (table->meta.language != language || table->meta.words_version != version)) {
-    code = table->MakeWords(language, version);
-  }
-  code = code == SQLITE_OK ? table->PrepareWords() : code;
+  code = code == SQLITE_OK ? table->UseWords(language, version) : code;
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
   if (code == SQLITE_OK && table->meta.extractor != extractor) {
     renewed = 0;  // see Renew, which also ends it

@@ -90,12 +90,12 @@ TEST(ContentLinesTest, WhatHoldsSeveralHasALineForEach) {
 
 TEST_F(InfoContentTest, AChangeBetweenStatementsIsNoProblem) {
   const Entry entry = ContentsTest::Find("a.txt");
-  ASSERT_EQ(ContentOf("s", entry).stored.state, "done");
+  ASSERT_EQ(ContentOf(TheShare(), entry).stored.state, "done");
 
   int number = 0;
   do {
     MoveAtStatement(++number);
-    const EntryContent content = ContentOf("s", entry);
+    const EntryContent content = ContentOf(TheShare(), entry);
     (void)sqlite3_reset_auto_extension();
     EXPECT_EQ(content.problem, "") << number;
     EXPECT_TRUE(content.is_known) << number;
