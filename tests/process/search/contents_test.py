@@ -63,6 +63,44 @@ class ContentsFollowTest(ScriptedTest):
         self.await_all_taken_in(root)
         self.assertEqual(self.given(), ["last.txt", "one.txt", "two.txt"])
 
+    def test_a_move_from_one_indexed_folder_to_another_costs_no_reading(self):
+        root = self.make_share(folders=())
+        for folder in ("here", "there"):
+            os.mkdir(f"{root}/{folder}")
+            self.write(f"{root}/{folder}/{folder}.txt", f"lighthouse {folder}")
+        self.start()
+        for folder in ("here", "there"):
+            self.ctl("folder", "add", f"{root}/{folder}", "--document")
+        self.await_counts(done=2, waiting=0)
+
+        os.rename(f"{root}/here/here.txt", f"{root}/there/moved.txt")
+        self.change(root, "here/here.txt", code=0x80)
+        self.change(root, "there/moved.txt")
+        self.await_hits("lighthouse", ["moved.txt", "there.txt"])
+
+        self.write(f"{root}/there/last.txt", "afterwards")
+        self.change(root, "there/last.txt")
+        self.await_hits("afterwards", ["last.txt"])
+        self.await_counts(done=3, waiting=0)
+        self.assertEqual(self.given(), ["here.txt", "last.txt", "there.txt"])
+
+    def test_there_is_a_helper_for_each_processor(self):
+        processors = len(os.sched_getaffinity(0))
+        names = [f"gate{number}.txt" for number in range(3 * processors)]
+        root = self.make_share(folders=())
+        for name in names:
+            self.write(f"{root}/{name}", "lighthouse")
+        self.start()
+        self.ctl("folder", "add", root, "--document")
+
+        self.await_diary(lambda given: len(given) >= processors)
+        at_work = {pid for _, pid in self.diary()}
+        self.open_gate()
+
+        self.await_hits("lighthouse", names)
+        self.assertEqual(len(at_work), processors)
+        self.assertEqual({pid for _, pid in self.diary()}, at_work)
+
     def test_a_link_that_is_taken_away_costs_no_reading(self):
         root = self.make_documents(one="lighthouse")
         os.link(f"{root}/one.txt", f"{root}/twin.txt")
