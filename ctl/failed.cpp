@@ -99,7 +99,7 @@ bool LookAtService(Session& session, Retry& retry) {
 
 std::string RetryText(const Listing& listing) {
   const Retry& retry = listing.retry;
-  const std::string text = listing.files == 1
+  std::string text = listing.files == 1
                                ? "1 file will be tried again"
                                : std::to_string(listing.files) + " files will be tried again";
   if (listing.files == 0) {

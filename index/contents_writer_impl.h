@@ -126,17 +126,17 @@ struct ContentsWriter::Impl {
   std::shared_ptr<const Settings> settings;  // null: all kinds are wanted
   IndexError error = IndexError::PATH_NOT_FOUND;
   std::map<int64_t, HandedOut> out;
-  std::set<int64_t> released;    // those are offered last
-  bool is_suspect_held = false;  // one waits to be alone: nothing else is begun before
+  std::set<int64_t> released;  // those are offered last
   int64_t unread_due = INT64_MAX;
-  bool has_judged = false;   // what an earlier service left in flight
-  int64_t alone = 0;         // the one that was begun without another; 0: none
-  bool is_looking = false;   // at every entry
-  int64_t looked = 0;        // up to this `written`
-  bool is_sweeping = false;  // over every file
-  int64_t swept = 0;         // up to this row
-  int64_t renewed = 0;       // the same, of what older readers read
-  bool has_passed = false;   // one of these changed what is not committed
+  bool is_suspect_held = false;  // one waits to be alone: nothing else is begun before
+  bool has_judged = false;       // what an earlier service left in flight
+  int64_t alone = 0;             // the one that was begun without another; 0: none
+  bool is_looking = false;       // at every entry
+  int64_t looked = 0;            // up to this `written`
+  bool is_sweeping = false;      // over every file
+  int64_t swept = 0;             // up to this row
+  int64_t renewed = 0;           // the same, of what older readers read
+  bool has_passed = false;       // one of these changed what is not committed
 };
 
 }  // namespace fileindexd

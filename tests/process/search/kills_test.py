@@ -70,8 +70,11 @@ class RandomKillsTest(ScriptedTest):
 class RealHelperKillsTest(ContentsTest):
     def helpers(self, service):
         """Processes of the service's own that read files."""
-        with open(f"/proc/{service}/task/{service}/children", encoding="ascii") as children:
-            return [int(pid) for pid in children.read().split()]
+        pids = []
+        for task in os.listdir(f"/proc/{service}/task"):
+            with open(f"/proc/{service}/task/{task}/children", encoding="ascii") as children:
+                pids += [int(pid) for pid in children.read().split()]
+        return pids
 
     def test_kills(self):
         choice = make_choice()
@@ -80,7 +83,7 @@ class RealHelperKillsTest(ContentsTest):
         service = self.service_pid()
         self.ctl("folder", "add", root, "--document")
 
-        added = 0
+        added = killed = 0
         for _ in range(REAL_KILLS):
             done = added
             for _ in range(4 * FILES_BETWEEN):
@@ -91,11 +94,13 @@ class RealHelperKillsTest(ContentsTest):
             self.await_taken("alpha")
             until = done + choice.randrange(1, FILES_BETWEEN)
             self.await_contents(lambda until=until: self.status()["contents_done"] >= until)
-            for pid in self.helpers(service):
-                if choice.randrange(2):
-                    with contextlib.suppress(ProcessLookupError):
-                        os.kill(pid, signal.SIGKILL)
+            helpers = self.helpers(service)
+            for pid in choice.sample(helpers, choice.randrange(len(helpers) + 1)):
+                with contextlib.suppress(ProcessLookupError):
+                    os.kill(pid, signal.SIGKILL)
+                    killed += 1
 
+        self.assertGreater(killed, 0)
         self.await_counts(done=added, waiting=0, failed=0)
         self.assertEqual(self.failed(), {})
         self.assertEqual(len(self.hits("everywhere")), min(added, 1000))
