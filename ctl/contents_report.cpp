@@ -33,15 +33,16 @@ std::string CountsText(const ContentCounts::OfKind& counts) {
 
 }  // namespace
 
-ContentsReport ReportContents(const std::string& share_name, uint64_t wanted) {
+ContentsReport ReportContents(const Share& share, uint64_t wanted) {
   ContentsReport report;
   ContentsReader reader;
-  const IndexError opened = reader.Open(share_name);
+  const IndexError opened = reader.Open(share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {
     report.counts.all.waiting = wanted;
   } else if (opened != IndexError::NONE) {
     report.problem = IndexErrorText(opened);
-  } else if (!reader.Count(report.counts)) {
+  } else if (!reader.Count(report.counts) ||
+             !reader.FindWordsProgress(share.language, report.words)) {
     report.problem = "cannot be read";
   }
   return report;
@@ -49,14 +50,34 @@ ContentsReport ReportContents(const std::string& share_name, uint64_t wanted) {
 
 void AddContents(Json::Value& object, const ContentsReport& report) {
   SetCounts(object, report.counts.all, "contents_");
+  object["contents_not_kept"] = static_cast<Json::UInt64>(report.counts.not_kept);
   object["contents_last_minute"] = static_cast<Json::UInt64>(report.counts.done_last_minute);
   object["contents_by_kind"] = Json::objectValue;
   for (const Kind kind : KINDS) {
     SetCounts(object["contents_by_kind"][KindText(kind)], Of(report.counts, kind), "");
   }
+  object["words_made_anew"] = WordsObject(report.words);
   if (!report.problem.empty()) {
     object["contents_problem"] = report.problem;
   }
+}
+
+Json::Value WordsObject(const std::optional<WordsProgress>& words) {
+  if (!words) {
+    return {};
+  }
+  Json::Value object(Json::objectValue);
+  object["language"] = words->language;
+  object["wanted"] = words->wanted;
+  object["done"] = static_cast<Json::UInt64>(words->done);
+  object["total"] = static_cast<Json::UInt64>(words->total);
+  return object;
+}
+
+std::string WordsText(const WordsProgress& words) {
+  return "made anew for " + words.wanted + ", " + std::to_string(words.done) + " of " +
+         std::to_string(words.total) + " texts done; until then those for " + words.language +
+         " are found";
 }
 
 std::string ContentsText(const ContentsReport& report) {
@@ -65,6 +86,9 @@ std::string ContentsText(const ContentsReport& report) {
   }
 
   std::string text = CountsText(report.counts.all);
+  if (report.counts.not_kept > 0) {
+    text += ", " + std::to_string(report.counts.not_kept) + " with nothing to keep";
+  }
   if (report.counts.done_last_minute > 0) {
     text += ", " + std::to_string(report.counts.done_last_minute) + " in the last minute";
   }

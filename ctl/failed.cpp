@@ -1,10 +1,14 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // failed: files whose content could not be read.
+#include <ctime>
+
 #include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "index/contents_reader.h"
+#include "state/content_service.h"
+#include "state/pid_file.h"
 
 namespace fileindexd {
 
@@ -15,10 +19,26 @@ std::string TriesText(int64_t tries) {
   return tries > 1 ? " (" + std::to_string(tries) + " tries)" : "";
 }
 
-bool PutFailed(const Share& share, const FailedContent& failed, bool json, Json::Value& list) {
-  if (!json) {
-    return PutLine(ShownText(failed.path) + ": " + ShownText(failed.reason) +
-                   TriesText(failed.tries));
+// What happens to a wish to have them tried again.
+struct Retry {
+  bool is_wanted = false;
+  bool runs = false;  // the content service, which does it
+  bool is_paused = false;
+};
+
+// Goes through the failures of shares, and puts them out or collects them.
+struct Listing {
+  Retry retry;
+  bool json = false;
+  Json::Value list = Json::Value(Json::arrayValue);
+  uint64_t files = 0;
+};
+
+bool PutFailed(const Share& share, const FailedContent& failed, Listing& listing) {
+  ++listing.files;
+  if (!listing.json) {
+    return listing.retry.is_wanted || PutLine(ShownText(failed.path) + ": " +
+                                              ShownText(failed.reason) + TriesText(failed.tries));
   }
 
   Json::Value object(Json::objectValue);
@@ -26,12 +46,16 @@ bool PutFailed(const Share& share, const FailedContent& failed, bool json, Json:
   SetPath(object, failed.path);
   object["reason"] = ToUtf8(failed.reason);
   object["tries"] = static_cast<Json::Int64>(failed.tries);
-  list.append(object);
+  if (listing.retry.is_wanted) {
+    object["retry"] = true;
+    object["service_runs"] = listing.retry.runs;
+    object["paused"] = listing.retry.is_paused;
+  }
+  listing.list.append(object);
   return true;
 }
 
-// Puts the share's failures out, or adds them to the list.
-int ListFailed(const Share& share, bool json, Json::Value& list) {
+int ListFailed(const Share& share, Listing& listing) {
   ContentsReader reader;
   const IndexError opened = reader.Open(share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {  // nothing was read yet
@@ -43,7 +67,7 @@ int ListFailed(const Share& share, bool json, Json::Value& list) {
 
   bool written = true;
   const bool read = reader.ForEachFailed([&](const FailedContent& failed) {
-    written = PutFailed(share, failed, json, list);
+    written = PutFailed(share, failed, listing);
     return written;
   });
   if (!read && written) {
@@ -59,6 +83,31 @@ int AskForRetry(Session& session, const std::string& share) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
   return EXIT_DONE;
+}
+
+// False, with its line written, on failure.
+bool LookAtService(Session& session, Retry& retry) {
+  int64_t resume_time = -1;
+  if (!session.store->GetPause(resume_time)) {
+    (void)Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
+    return false;
+  }
+  retry.runs = AliveByPidFile(SERVICE_PID_FILE, SERVICE_PROGRAM) > 0;
+  retry.is_paused = resume_time == 0 || resume_time > time(nullptr);
+  return true;
+}
+
+std::string RetryText(const Listing& listing) {
+  const Retry& retry = listing.retry;
+  std::string text = listing.files == 1
+                               ? "1 file will be tried again"
+                               : std::to_string(listing.files) + " files will be tried again";
+  if (listing.files == 0) {
+    return text;
+  }
+  return text + (retry.is_paused ? " when indexing is resumed: it is paused"
+                 : !retry.runs   ? " when the content service runs: it does not"
+                                 : "");
 }
 
 }  // namespace
@@ -77,17 +126,24 @@ int Failed(const Arguments& arguments) {
     shares = {*share};
   }
 
+  Listing listing;
+  listing.json = arguments.json;
+  listing.retry.is_wanted = arguments.retry;
+  if (arguments.retry && !LookAtService(session, listing.retry)) {
+    return EXIT_FAILED;
+  }
   int code = EXIT_DONE;
-  Json::Value list(Json::arrayValue);
   for (const Share& share : shares) {
-    int done = ListFailed(share, arguments.json, list);
+    int done = ListFailed(share, listing);
     if (done == EXIT_DONE && arguments.retry) {
       done = AskForRetry(session, share.name);
     }
     code = done == EXIT_DONE ? code : done;
   }
   if (arguments.json) {
-    (void)PutJson(list);
+    (void)PutJson(listing.list);
+  } else if (arguments.retry && code == EXIT_DONE) {
+    (void)PutLine(RetryText(listing));
   }
   return code;
 }

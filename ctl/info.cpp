@@ -1,11 +1,16 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // info: what is known of one path, and why it is in the index or not.
+#include <unistd.h>
+
+#include <algorithm>
 #include <cstdio>
+#include <limits>
 #include <utility>
 
 #include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/content_kinds.h"
+#include "ctl/contents_report.h"
 #include "ctl/info_facts.h"
 #include "ctl/info_question.h"
 #include "ctl/output.h"
@@ -14,6 +19,8 @@
 namespace fileindexd {
 
 namespace {
+
+constexpr size_t MOST_SHOWN_OF_FIELD = 10;  // on a terminal: lines, of which an archive has many
 
 const char* VerdictKey(Verdict verdict) {
   switch (verdict) {
@@ -155,6 +162,7 @@ Json::Value FactsObject(const PathFacts& facts) {
   object["entry"] = facts.in_index ? EntryObject(facts.entry) : Json::Value();
   object["stored"] = ContentObject(facts.content);
   object["content_problem"] = facts.content.problem;
+  object["words_made_anew"] = WordsObject(facts.content.words);
   object["needs_reindex"] = NeedsReindex(facts);
   object["root_problem"] = ToUtf8(ProblemOfRoot(facts));
   object["index_problem"] = facts.index_problem;
@@ -162,10 +170,25 @@ Json::Value FactsObject(const PathFacts& facts) {
   return object;
 }
 
-void PutFact(const std::string& name, const std::string& text) {
-  constexpr size_t WIDTH = 16;
-  (void)PutLine(name + std::string(name.size() < WIDTH ? WIDTH - name.size() : 1, ' ') +
+constexpr size_t FACT_WIDTH = 16;
+
+void PutFact(const std::string& name, const std::string& text, size_t width = FACT_WIDTH) {
+  (void)PutLine(name + std::string(name.size() < width ? width - name.size() : 1, ' ') +
                 ShownText(text));
+}
+
+void PutContent(const EntryContent& content) {
+  const bool is_terminal = isatty(STDOUT_FILENO) == 1;
+  const size_t most = is_terminal ? MOST_SHOWN_OF_FIELD : std::numeric_limits<size_t>::max();
+  const std::string before = "  content ";
+  const FactLines lines = ContentLines(content, most);
+  size_t width = FACT_WIDTH;
+  for (const auto& [name, text] : lines) {
+    width = std::max(width, before.size() + name.size() + 1);
+  }
+  for (const auto& [name, text] : lines) {
+    PutFact(name.empty() ? "" : before + name, text, width);
+  }
 }
 
 std::string TimeText(int64_t nanoseconds) {
@@ -209,11 +232,12 @@ void PutFacts(const PathFacts& facts) {
   if (NeedsReindex(facts)) {
     PutFact("problem", "the whole share waits for a reindex");
   }
+  if (facts.content.words) {
+    PutFact("words", WordsText(*facts.content.words));
+  }
   if (facts.in_index) {
     PutEntry(facts.entry);
-    for (const auto& [name, text] : ContentLines(facts.content)) {
-      PutFact("  content " + name, text);
-    }
+    PutContent(facts.content);
   }
   for (const PendingEvent& event : facts.pending.events) {
     PutFact(

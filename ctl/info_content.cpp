@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/info_content.h"
 
+#include <algorithm>
 #include <cstdio>
+#include <string_view>
 
 #include "ctl/output.h"
 #include "index/kind.h"
@@ -54,14 +56,32 @@ std::string NumberText(const NumberField& field) {
   return std::to_string(field.number);
 }
 
+using Lines = std::vector<std::pair<std::string, std::string>>;
+
+void AddTextLines(const char* name, std::string_view text, size_t most, Lines& lines) {
+  const auto count = static_cast<size_t>(std::count(text.begin(), text.end(), '\n')) + 1;
+  const size_t shown = count > most ? most : count;
+  for (size_t i = 0; i < shown; ++i) {
+    const size_t end = text.find('\n');
+    lines.emplace_back(i == 0 ? name : "", text.substr(0, end));
+    text.remove_prefix(end == std::string_view::npos ? text.size() : end + 1);
+  }
+  if (shown < count) {
+    lines.emplace_back("", "... and " + std::to_string(count - shown) + " more");
+  }
+}
+
 }  // namespace
 
-EntryContent ContentOf(const std::string& share, const Entry& entry) {
+EntryContent ContentOf(const Share& share, const Entry& entry) {
   EntryContent content;
   StoredContent& stored = content.stored;
   ContentsReader reader;
-  IndexError error = reader.Open(share);
+  IndexError error = reader.Open(share.name);
   error = error == IndexError::NONE ? reader.Find(entry, stored) : error;
+  if (error == IndexError::NONE && !reader.FindWordsProgress(share.language, content.words)) {
+    error = IndexError::OTHER;
+  }
   if (error != IndexError::NONE && error != IndexError::PATH_NOT_FOUND) {
     content.problem = IndexErrorText(error);
     return content;
@@ -98,7 +118,8 @@ Json::Value ContentObject(const EntryContent& content) {
   return object;
 }
 
-std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content) {
+std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent& content,
+                                                              size_t most_of_field) {
   if (!content.problem.empty()) {
     return {{"problem", content.problem}};
   }
@@ -106,7 +127,7 @@ std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent
     return {};
   }
   const StoredContent& stored = content.stored;
-  std::vector<std::pair<std::string, std::string>> lines;
+  Lines lines;
   lines.emplace_back("state", stored.state + (stored.reason.empty() ? "" : ": " + stored.reason));
   if (stored.extractor != 0) {
     lines.emplace_back("read by", "version " + std::to_string(stored.extractor));
@@ -119,7 +140,7 @@ std::vector<std::pair<std::string, std::string>> ContentLines(const EntryContent
   }
   lines.emplace_back("kind", KindText(stored.content.kind));
   for (const TextField& field : stored.content.texts) {
-    lines.emplace_back(ShownName(field.field), field.text);
+    AddTextLines(ShownName(field.field), field.text, most_of_field, lines);
   }
   for (const NumberField& field : stored.content.numbers) {
     lines.emplace_back(ShownName(field.field), NumberText(field));

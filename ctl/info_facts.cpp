@@ -196,7 +196,7 @@ bool FindFacts(Session& session, const std::string& given, PathFacts& facts) {
     facts.root = LookAtRoot(*facts.share);
     AskIndex(settings, facts);
     if (facts.in_index && facts.entry.content_wanted) {
-      facts.content = ContentOf(facts.share->name, facts.entry);
+      facts.content = ContentOf(*facts.share, facts.entry);
     }
     facts.pending = ReadPending(facts.share->name, facts.path);
   }

@@ -193,6 +193,9 @@ int Search(const Arguments& arguments) {
              (question.limit > 0 || question.count_all)) {
     TellNothingFound(answer, screen);
   }
+  if (!arguments.json) {
+    TellOfWords(*session.settings, question.shares);
+  }
   for (const std::string& failure : answer.failures) {
     (void)Fail(EXIT_FAILED, "%s", failure.c_str());
   }

@@ -1,11 +1,15 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/search_notes.h"
 
+#include <unistd.h>
+
 #include <cstdio>
 #include <string>
 
+#include "ctl/contents_report.h"
 #include "ctl/output.h"
 #include "ctl/terminal/cells.h"
+#include "index/contents_reader.h"
 
 namespace fileindexd {
 
@@ -35,6 +39,19 @@ void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen)
             screen);
   } else if (screen.has_value()) {
     PutNote("Nothing found.", screen);
+  }
+}
+
+void TellOfWords(const Settings& settings, const std::vector<std::string>& shares) {
+  for (const std::string& name : shares) {
+    const Share* share = settings.ShareByName(name);
+    ContentsReader reader;
+    std::optional<WordsProgress> words;
+    if (share != nullptr && reader.Open(name) == IndexError::NONE &&
+        reader.FindWordsProgress(share->language, words) && words) {
+      const std::string note = "The words of share " + name + " are " + WordsText(*words) + ".";
+      PutNote(isatty(STDERR_FILENO) == 1 ? Printable(note) : OneLine(note), std::nullopt);
+    }
   }
 }
 

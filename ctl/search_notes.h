@@ -4,15 +4,21 @@
 #pragma once
 
 #include <optional>
+#include <string>
+#include <vector>
 
 #include "ctl/terminal/screen.h"
 #include "index/search.h"
+#include "state/settings.h"
 
 namespace fileindexd {
 
 // Of a question without any hit: one that has some, or what in it is no field. People are told at
 // least that there is none.
 void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen);
+
+// On standard error: shares whose words are being made anew.
+void TellOfWords(const Settings& settings, const std::vector<std::string>& shares);
 
 // Nobody has said how many were wanted.
 void TellOfMore(uint64_t shown, const std::optional<Screen>& screen);

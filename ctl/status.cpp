@@ -74,7 +74,7 @@ bool ReportShare(Session& session, const Share& share, pid_t daemon, ShareReport
   report.comparison = WorkAt(ComparisonProgressPath(share.name));
   LookAtFolders(*session.settings, report);
   ReadIndex(report);
-  report.contents = ReportContents(share.name, report.index.wanted);
+  report.contents = ReportContents(share, report.index.wanted);
   report.unwatched =
       report.has_folders && daemon > 0 && IsUnwatched(daemon, ShareFolder(share.name));
   report.root_emptied =

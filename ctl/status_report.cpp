@@ -158,6 +158,9 @@ void AddShare(std::string& text, const ShareReport& report) {
   if (report.index.wanted > 0 || !report.contents.problem.empty()) {
     AddLine(text, "contents", ContentsText(report.contents));
   }
+  if (report.contents.words) {
+    AddLine(text, "words", WordsText(*report.contents.words));
+  }
   AddLine(text, "last commit", last_commit == 0 ? "none" : LocalTime(last_commit));
   AddLine(text, "needs reindex", report.needs_reindex ? "yes" : "no");
   AddLine(text, "no space", report.no_space ? "yes" : "no");

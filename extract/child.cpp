@@ -110,8 +110,8 @@ int OutOfTheWay(int file, ScopedFd& moved) {
 
 }  // namespace
 
-bool StartChild(const std::string& program, std::vector<std::string> arguments,
-                const ChildFiles& files, Child& child, std::string& error) {
+bool SpawnChild(const std::string& program, std::vector<std::string> arguments,
+                const ChildFiles& files, pid_t& pid, std::string& error) {
   const auto fail = [&](int number) {
     error = program + ": " + ErrorText(number);
     return false;
@@ -129,19 +129,24 @@ bool StartChild(const std::string& program, std::vector<std::string> arguments,
   arguments.insert(arguments.begin(), program);
   arguments.push_back(std::to_string(getpid()));
   std::vector<std::string> environment = Environment();
-  pid_t pid = -1;
-  const int failure = posix_spawn(&pid, program.c_str(), &plan.actions, &plan.attributes,
+  pid_t spawned = -1;
+  const int failure = posix_spawn(&spawned, program.c_str(), &plan.actions, &plan.attributes,
                                   Pointers(arguments).data(), Pointers(environment).data());
   if (failure != 0) {
     return fail(failure);
   }
+  pid = spawned;
+  return true;
+}
 
+bool WatchChild(pid_t pid, const std::string& program, Child& child, std::string& error) {
   ScopedFd pid_fd(static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
   if (pid_fd.fd < 0) {
     const int number = errno;
     (void)kill(pid, SIGKILL);
     (void)waitpid(pid, nullptr, 0);
-    return fail(number);
+    error = program + ": " + ErrorText(number);
+    return false;
   }
   child.pid = pid;
   child.pid_fd.Swap(pid_fd);

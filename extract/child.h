@@ -38,8 +38,10 @@ struct ChildFiles {
 // signal mask, a fixed environment, and no descriptor but those. Standard error is /dev/null, but
 // for sanitizers' sake the caller's in such builds. The last argument that it gets is our process
 // number (see Doors::parent). False, and `error` then says why, on failure.
-bool StartChild(const std::string& program, std::vector<std::string> arguments,
-                const ChildFiles& files, Child& child, std::string& error);
+bool SpawnChild(const std::string& program, std::vector<std::string> arguments,
+                const ChildFiles& files, pid_t& pid, std::string& error);
+// What was started so, from any thread. Where it cannot be watched it is killed, and false.
+bool WatchChild(pid_t pid, const std::string& program, Child& child, std::string& error);
 
 // The status that waitpid tells if the child has ended; it is reaped then, and `child` is none. A
 // child that somebody else has reaped counts as ended with 0.

@@ -120,6 +120,10 @@ class Decoding {
 
 }  // namespace
 
+bool IsKnownCharset(const std::string& charset) {
+  return Iconv().Open(charset);
+}
+
 std::string ToUtf8(std::string_view bytes, const std::string& charset) {
   Iconv converter;
   return converter.Open(charset) ? converter.Convert(bytes) : std::string(bytes);

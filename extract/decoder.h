@@ -23,6 +23,8 @@ using CharsetFinder = std::function<std::string(std::string_view)>;
 bool DecodeText(const Document& document, const CharsetFinder& declared, const TextTaker& take,
                 std::string& why);
 
+// Whether ToUtf8 knows it.
+bool IsKnownCharset(const std::string& charset);
 // From that charset; as they are where it is not known. What is wrong becomes a blank.
 std::string ToUtf8(std::string_view bytes, const std::string& charset);
 

@@ -41,8 +41,9 @@ bool IsBegin(uint16_t type) {
   return type == RECORD_BOF_2 || type == RECORD_BOF_3 || type == RECORD_BOF_4 || type == RECORD_BOF;
 }
 
+constexpr const char* WESTERN = "CP1252";
+
 std::string CharsetOf(uint16_t page) {
-  constexpr const char* WESTERN = "CP1252";
   constexpr uint16_t APPLE = 0x8000;
   constexpr uint16_t WINDOWS = 0x8001;
   constexpr uint16_t WIDE = 1200;  // of later versions: there are no such letters here
@@ -94,7 +95,7 @@ class OldWorkbookText {
     switch (records.type) {
       case RECORD_CODEPAGE:
         Flush();
-        charset = CharsetOf(record.Word(0));
+        SetPage(record.Word(0));
         break;
       case RECORD_BOUNDSHEET:
         Add(ShortString(record, has_long_names ? 6 : 0));
@@ -125,6 +126,16 @@ class OldWorkbookText {
       default:
         Add(NumberIn(record));
         break;
+    }
+  }
+
+  // Of a page that nobody knows the Western letters are most likely right, and none is lost.
+  // Records of them may be many, and looking for a charset is not free.
+  void SetPage(uint16_t number) {
+    if (number != page) {
+      page = number;
+      const std::string told = CharsetOf(number);
+      charset = IsKnownCharset(told) ? told : WESTERN;
     }
   }
 
@@ -176,7 +187,8 @@ class OldWorkbookText {
 
   WorkbookRecords records;
   ContentSink& sink;
-  std::string charset = CharsetOf(0);
+  uint16_t page = 0;
+  std::string charset = CharsetOf(page);
   std::string letters;  // not yet in the sink; numbers are the same in all charsets
   bool is_first_version = false;
   bool has_long_names = false;  // the names of sheets stand behind their places

@@ -24,6 +24,7 @@ constexpr int END_TIMEOUT_MS = 1000;
 
 struct ExtractPool::Impl {
   PoolOptions options;
+  Starter starter;
   std::string left_out;
   std::list<Child> dying;
   std::vector<std::unique_ptr<Slot>> slots;
@@ -56,9 +57,12 @@ std::unique_ptr<ExtractPool> ExtractPool::Open(const PoolOptions& options, std::
 
   auto opened = std::make_unique<Impl>();
   opened->options = options;
+  if (!opened->starter.Open(error)) {
+    return nullptr;
+  }
   for (unsigned made = 0; made < std::max(options.helpers, 1U); ++made) {
     opened->slots.push_back(
-        std::make_unique<Slot>(opened->options, opened->left_out, opened->dying));
+        std::make_unique<Slot>(opened->options, opened->starter, opened->left_out, opened->dying));
   }
   return std::unique_ptr<ExtractPool>(new ExtractPool(std::move(opened)));
 }

@@ -196,8 +196,8 @@ std::optional<ExtractOutcome> Slot::StartConverter(const std::string& name) {
   if (made.fd < 0 || lseek(current.file->fd, 0, SEEK_SET) != 0) {
     return End(Result::LOST, name + ": " + ErrorText(errno));
   }
-  if (!StartChild(options.program, {CONVERT_MODE, name}, {current.file->fd, made.fd, -1}, converter,
-                  error)) {
+  if (!starter.Start(options.program, {CONVERT_MODE, name}, {current.file->fd, made.fd, -1},
+                     converter, error)) {
     return End(Result::LOST, error);
   }
   result.Swap(made);

@@ -23,6 +23,7 @@
 #include "extract/answer.h"
 #include "extract/child.h"
 #include "extract/pool.h"
+#include "extract/starter.h"
 
 namespace fileindexd {
 
@@ -30,9 +31,10 @@ class Slot {
  public:
   using Clock = std::chrono::steady_clock;
 
-  // `options` outlive the slot; `left_out` and `dying` are the pool's.
-  Slot(const PoolOptions& pool_options, std::string& pool_left_out, std::list<Child>& pool_dying)
-      : options(pool_options), left_out(pool_left_out), dying(pool_dying) {}
+  // `options` outlive the slot; the others are the pool's.
+  Slot(const PoolOptions& pool_options, Starter& pool_starter, std::string& pool_left_out,
+       std::list<Child>& pool_dying)
+      : options(pool_options), starter(pool_starter), left_out(pool_left_out), dying(pool_dying) {}
 
   bool IsFree() const { return stage == Stage::IDLE && !is_closing; }
   bool HasJob() const { return stage != Stage::IDLE; }
@@ -78,6 +80,7 @@ class Slot {
   void DropConverter();
 
   const PoolOptions& options;
+  Starter& starter;
   std::string& left_out;
   std::list<Child>& dying;  // killed, not reaped yet
 

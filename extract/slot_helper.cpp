@@ -48,7 +48,7 @@ bool Slot::Start(std::string& error) {
 
   ScopedFd ours(ends[0]);
   const ScopedFd theirs(ends[1]);
-  if (!StartChild(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
+  if (!starter.Start(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
     return false;
   }
   socket.Swap(ours);

@@ -42,7 +42,10 @@ bool WorkbookRecords::Next() {
   type = bytes.Word(at);
   views.assign(1, TakePiece());
   while (type != RECORD_CONTINUE && bytes.Word(at) == RECORD_CONTINUE) {
-    views.push_back(TakePiece());
+    const std::string_view piece = TakePiece();
+    if (!piece.empty() && views.size() < MOST_VIEWS) {
+      views.push_back(piece);
+    }
   }
   return true;
 }

@@ -29,6 +29,9 @@ constexpr uint16_t RECORD_FORMULA = 0x06;
 // Goes from record to record, until the sink is full or time is up.
 class WorkbookRecords {
  public:
+  // Programs fill each one with kilobytes.
+  static constexpr size_t MOST_VIEWS = size_t{1} << 16;
+
   // The bytes and the sink outlive it.
   WorkbookRecords(std::string_view workbook, const ContentSink& text_sink)
       : bytes(workbook), sink(text_sink) {}
@@ -37,7 +40,8 @@ class WorkbookRecords {
   bool Next();
 
   uint16_t type = 0;
-  std::vector<std::string_view> views;  // the record's, and of what continues it
+  // The record's, and of what continues it, but for empty ones; of hostile files not all.
+  std::vector<std::string_view> views;
 
  private:
   std::string_view TakePiece();

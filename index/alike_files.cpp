@@ -39,10 +39,12 @@ class SampleStream {
       return false;
     }
     filesystem = meta.Bytes(0);
-    // State 1: done. An empty file is like any other one, and nobody wants to hear of it.
+    // Of another state the sample is known as well: it may wait to be read anew, or that failed.
+    // Without an extractor its bytes may be others by now. An empty file is like any other one, and
+    // nobody wants to hear of it.
     code = rows.Prepare(db,
                         "SELECT size, sample, inode, birth_time, mtime FROM contents.files"
-                        " WHERE state = 1 AND sample <> 0 AND size > 0"
+                        " WHERE extractor <> 0 AND sample <> 0 AND size > 0"
                         " ORDER BY size DESC, sample, inode, birth_time");
     code = code == SQLITE_OK
                ? path_of.Prepare(db, "SELECT path FROM entries WHERE " FILEINDEX_THAT_FILE

@@ -12,7 +12,8 @@ namespace {
 constexpr int FIRST_NUMBER = 7;  // of the columns of FactsColumns
 
 std::string FactsColumns() {
-  return "files.id, files.state, files.found_kind, files.text, files.length, files.sample, "
+  return "files.id, files.state, files.found_kind, files.text, files.length, "
+         "iif(files.extractor <> 0, files.sample, 0), "
          "files.fields, " +
          std::string(NUMBER_COLUMNS);
 }
@@ -142,8 +143,7 @@ const std::string& CandidateRows::FoldedName(Candidate& candidate) {
 
 int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
   has = false;
-  if (!candidate.facts.has_value() || candidate.facts->state != ContentState::DONE ||
-      candidate.facts->sample == 0 || candidate.entry.size == 0) {
+  if (!candidate.facts.has_value() || candidate.facts->sample == 0 || candidate.entry.size == 0) {
     return SQLITE_OK;
   }
   int code = SQLITE_OK;
@@ -152,7 +152,7 @@ int CandidateRows::HasTwin(const Candidate& candidate, bool& has) {
         "SELECT 1 FROM contents.files AS files CROSS JOIN entries "
         "ON " FILEINDEX_WANTED_FILE
         " WHERE files.sample = ?1 AND files.sample <> 0 AND files.size = ?2 "
-        "AND files.id <> ?3 AND files.state = 1 LIMIT 1",
+        "AND files.id <> ?3 AND files.extractor <> 0 LIMIT 1",
         twin);
   }
   if (code != SQLITE_OK) {

@@ -21,7 +21,7 @@ struct FileFacts {
   Kind found_kind = Kind::OTHER;
   int64_t text = 0;  // rowid; 0: there is none
   int64_t length = 0;
-  int64_t sample = 0;
+  int64_t sample = 0;  // of the bytes that it has now; 0: not known
   int64_t fields = 0;  // bits
   FieldNumbers numbers;
 

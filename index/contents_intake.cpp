@@ -127,7 +127,12 @@ int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, 
   }
   again = is_kept && file.state != ContentState::QUARANTINED;
   now.extractor = KEPT_OUT;
-  return is_kept ? SQLITE_OK : table->SetContent(file, OfKind(file.found_kind), now);
+  if (is_kept) {
+    return SQLITE_OK;
+  }
+  SettleKeptOut(now);
+  const int settled = table->SetReason(file.id, "");
+  return settled == SQLITE_OK ? table->SetContent(file, OfKind(file.found_kind), now) : settled;
 }
 
 int ContentsWriter::Impl::IsKept(const ContentFile& file, Kind found, bool& is_kept) {

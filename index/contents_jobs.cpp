@@ -14,7 +14,8 @@ constexpr int64_t SUSPECT_DEATHS = 2;
 constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file any more
 constexpr int ROUNDS = 8;
 constexpr int64_t MOST_LOOKED = 1000;  // rows in one go
-constexpr size_t MOST_RENEWED = 64;    // at once: what waits already goes ahead of all others
+constexpr size_t MOST_RENEWED = 64;    // at once
+constexpr int64_t MOST_UNREAD = 4;     // at once
 
 }  // namespace
 
@@ -25,24 +26,75 @@ bool ContentsWriter::Impl::NextJobs(size_t limit, std::vector<ContentJob>& jobs,
     return false;
   }
 
-  const auto most = static_cast<int64_t>(limit + out.size() + released.size()) + SLACK;
-  Round round{.limit = limit, .company = Begun()};
-  round.dropped = true;
+  Round round = BeginRound(limit);
   for (int i = 0; i < ROUNDS && round.dropped && jobs.size() < limit && !IsFull(); ++i) {
     round.dropped = false;
     std::vector<ContentFile> rows;
-    int code = table->Waiting(most, rows);
+    int code = table->WaitingNew(round.most, extractor, rows);
     code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
-    // A suspect that waits to be alone would wait for all of these.
+    if (code != SQLITE_OK) {
+      return Done(code);
+    }
+  }
+  is_suspect_held = round.held;
+  more = round.dropped || jobs.size() >= limit;
+  return true;
+}
+
+// A suspect that waits to be alone would wait for all of these.
+bool ContentsWriter::Impl::NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs,
+                                     bool& more) {
+  jobs.clear();
+  more = false;
+  if (!Ready() || !ReadyToFollow()) {
+    return false;
+  }
+  if (is_suspect_held) {
+    return true;
+  }
+
+  Round round = BeginRound(limit);
+  int code = OfferUnread(now, round, jobs);
+  if (code != SQLITE_OK) {
+    return Done(code);
+  }
+  bool has_more = true;
+  for (int i = 0; i < ROUNDS && has_more && jobs.size() < limit && !IsFull(); ++i) {
+    round.dropped = false;
+    std::vector<ContentFile> rows;
+    code = table->WaitingAgain(round.most, extractor, rows);
+    code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
+    has_more = round.dropped;
     if (code == SQLITE_OK && !round.dropped && !round.held && jobs.size() < limit) {
-      code = Renew(round.dropped);
+      code = Renew(has_more);
     }
     if (code != SQLITE_OK) {
       return Done(code);
     }
   }
-  more = round.dropped || jobs.size() >= limit;
+  more = has_more || jobs.size() >= limit;
   return true;
+}
+
+ContentsWriter::Impl::Round ContentsWriter::Impl::BeginRound(size_t limit) const {
+  Round round;
+  round.limit = limit;
+  round.most = static_cast<int64_t>(limit + out.size() + released.size()) + SLACK;
+  round.company = Begun();
+  round.dropped = true;
+  return round;
+}
+
+// A few of those that are due: each may hold its reader up for long. Until it is known what became
+// of one, it is not due again.
+int ContentsWriter::Impl::OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs) {
+  std::vector<ContentFile> rows;
+  int code = unread_due <= now ? table->UnreadDue(now, MOST_UNREAD, rows) : SQLITE_OK;
+  code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
+  for (size_t i = 0; i < jobs.size() && code == SQLITE_OK; ++i) {
+    code = table->SetDue(jobs[i].file, now + LONGEST_PAUSE);
+  }
+  return code == SQLITE_OK ? table->NextDue(unread_due) : code;
 }
 
 int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round,
@@ -68,8 +120,8 @@ int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round
   return code;
 }
 
-// Makes a few of what older readers read wait: nothing else does. What was read stays, and is
-// found, until it is read anew.
+// Makes a few of what older readers read, or failed at, wait: no other ones do. What was read
+// stays, and is found, until it is read anew.
 int ContentsWriter::Impl::Renew(bool& more) {
   more = false;
   if (table->meta.extractor == extractor) {
@@ -83,6 +135,8 @@ int ContentsWriter::Impl::Renew(bool& more) {
     if (IsAged(files[i]) && files[i].unreferred_since == 0) {
       ContentFile now = files[i];
       now.state = ContentState::WAITING;
+      now.tries = 0;
+      now.unended = 0;
       code = table->Update(files[i], now);
       ++begun;
     }

@@ -43,6 +43,7 @@ const char* StateText(ContentState state) {
       return "done";
     case ContentState::FAILED:
     case ContentState::QUARANTINED:
+    case ContentState::UNREAD:
       break;
   }
   return "failed";
@@ -112,6 +113,7 @@ bool ContentsReader::Count(ContentCounts& counts) {
   for (; code == SQLITE_ROW; code = by_kind.Step()) {
     const auto kind = static_cast<size_t>(by_kind.Int(0));
     if (kind >= read.kinds.size()) {
+      read.not_kept += kind == NOT_KEPT ? static_cast<uint64_t>(by_kind.Int(2)) : 0;
       continue;
     }
     for (ContentCounts::OfKind* counted : {&read.kinds[kind], &read.all}) {
@@ -126,6 +128,43 @@ bool ContentsReader::Count(ContentCounts& counts) {
   }
   read.done_last_minute = static_cast<uint64_t>(rate.Int(0));
   counts = read;
+  return true;
+}
+
+bool ContentsReader::FindWordsProgress(const std::string& share_language,
+                                       std::optional<WordsProgress>& progress) {
+  progress.reset();
+  Statement words;
+  Statement texts;
+  if (words.Prepare(entries.db,
+                    "SELECT language, reworded, reword_end FROM contents.meta WHERE id = 1") !=
+          SQLITE_OK ||
+      texts.Prepare(entries.db,
+                    "SELECT count(*) FROM contents.files WHERE text <> 0 AND text <= ?1") !=
+          SQLITE_OK ||
+      words.Step() != SQLITE_ROW) {
+    return false;
+  }
+  WordsProgress found;
+  found.language = words.Bytes(0);
+  found.wanted = LanguageOfWords(share_language);
+  const bool has_begun = words.Int(1) != ALL_WORDS;
+  if (found.wanted == found.language && !has_begun) {
+    return true;
+  }
+  const auto count = [&texts](int64_t last, uint64_t& number) {
+    texts.BindInt(1, last);
+    bool is_counted = false;
+    return texts.ReadOne(is_counted, [&] { number = static_cast<uint64_t>(texts.Int(0)); }) ==
+           SQLITE_OK;
+  };
+  if (!count(has_begun ? words.Int(2) : ALL_WORDS, found.total) ||
+      (has_begun && !count(words.Int(1), found.done))) {
+    return false;
+  }
+  if (found.total > 0) {
+    progress = found;
+  }
   return true;
 }
 

@@ -5,6 +5,7 @@
 #include <array>
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 
 #include "base/content.h"
@@ -21,6 +22,7 @@ struct ContentCounts {
   };
   std::array<OfKind, 5> kinds;  // by Kind, folders left out
   OfKind all;
+  uint64_t not_kept = 0;  // looked into, and of no kind that is read, or is wanted
   uint64_t done_last_minute = 0;
 };
 
@@ -28,6 +30,14 @@ struct FailedContent {
   std::string path;  // of one entry of that file
   std::string reason;
   int64_t tries = 0;
+};
+
+// Words that are made anew for another language; those of the old one are found until that is done.
+struct WordsProgress {
+  std::string language;  // whose words are found
+  std::string wanted;
+  uint64_t done = 0;  // texts
+  uint64_t total = 0;
 };
 
 // What is stored for an entry. Waiting where nothing was read yet, or nothing is wanted.
@@ -52,6 +62,9 @@ class ContentsReader {
   IndexError Open(const std::string& share_name);
 
   bool Count(ContentCounts& counts);
+  // Of a share with that language: none when its words are those that are wanted. False when that
+  // cannot be told.
+  bool FindWordsProgress(const std::string& share_language, std::optional<WordsProgress>& progress);
   bool ForEachFailed(const std::function<bool(const FailedContent&)>& visit);
   // What stands for the entry: of one moment. NONE, or why that cannot be told.
   IndexError Find(const Entry& entry, StoredContent& stored);

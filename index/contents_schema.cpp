@@ -8,10 +8,21 @@
 namespace fileindexd {
 
 static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
-                  ALL_WORDS == 9223372036854775807,
+                  ALL_WORDS == 9223372036854775807 && NOT_KEPT == 5,
               "numbers in the text below");
 
 namespace {
+
+#define ADDITIONS                                                                                \
+  "CREATE TABLE later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);"                          \
+  "CREATE INDEX later_by_due ON later(due);"                                                     \
+  "UPDATE counts SET waiting = 0, done = 0, failed = 0;"                                         \
+  "INSERT OR IGNORE INTO counts VALUES(5, 0, 0, 0);"                                             \
+  "INSERT INTO counts SELECT iif(state = 1 AND (extractor = 0 OR max(found_kind, kind) = 0), 5," \
+  " iif(found_kind <> 0, found_kind, kind)) AS counted,"                                         \
+  " sum(state = 0), sum(state = 1), sum(state >= 2) FROM files WHERE true GROUP BY counted"      \
+  " ON CONFLICT(kind) DO UPDATE SET"                                                             \
+  " waiting = excluded.waiting, done = excluded.done, failed = excluded.failed;"
 
 // AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
 constexpr const char* CONTENTS_SCHEMA = R"sql(
@@ -70,7 +81,7 @@ CREATE TABLE meta(
 INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '', 0);
 PRAGMA application_id = 1179206479;
 PRAGMA user_version = 3;
-)sql";
+)sql" ADDITIONS;
 
 }  // namespace
 
@@ -83,6 +94,8 @@ const DatabaseForm CONTENTS_FORM = {
     .probed = "meta WHERE id = 1",
     .prepare = RegisterTextTokenizer,
 };
+
+const char* const CONTENTS_ADDITIONS = "BEGIN IMMEDIATE;" ADDITIONS "COMMIT";
 
 const char* const NUMBER_COLUMNS =
     "pages, created, sent, taken, recorded, year, track, duration, bit_rate, width, height, "
@@ -113,15 +126,13 @@ std::string ColumnAt(const char* columns, size_t place) {
 
 // The hash that collects words before they are written as a segment holds 8 MiB: fewer segments
 // to merge, which is what most of the time goes into.
-std::string WordsSchema(const std::string& language) {
-  return "DROP TABLE IF EXISTS words;"
-         "CREATE VIRTUAL TABLE words USING fts5(" +
+std::string WordsSchema(const std::string& table, const std::string& language) {
+  const std::string insert = "INSERT INTO " + table + "(" + table + ", rank) ";
+  return "DROP TABLE IF EXISTS " + table + ";CREATE VIRTUAL TABLE " + table + " USING fts5(" +
          std::string(WORD_COLUMNS) + ", content='', columnsize=0, tokenize='" +
-         std::string(TEXT_TOKENIZER) + " " + language +
-         "');"
-         "INSERT INTO words(words, rank) VALUES('automerge', 16);"
-         "INSERT INTO words(words, rank) VALUES('crisismerge', 64);"
-         "INSERT INTO words(words, rank) VALUES('hashsize', 8388608)";
+         std::string(TEXT_TOKENIZER) + " " + language + "');" + insert +
+         "VALUES('automerge', 16);" + insert + "VALUES('crisismerge', 64);" + insert +
+         "VALUES('hashsize', 8388608)";
 }
 
 }  // namespace fileindexd

@@ -14,7 +14,8 @@
 //     state             ContentState
 //     extractor         version of the readers that read it last; 0: none did, or, of a file
 //                       that was read, nothing was kept, as what it was found to be is not wanted
-//     tries             how many ended in failure; while it waits, with the death of what read it
+//     tries             how many ended in failure; while it waits, with the death of what read it;
+//                       of an unread one, how often the disk did not give it
 //     unended           how many began beside others and have no end on record: its fault or not
 //     begun             0 not in flight, 1 alone, 2 beside others
 //     reason            of the failure, one line
@@ -31,17 +32,23 @@
 //   words     the same by words: a column for the text, and one for each text field. No stored
 //             copy, so deleting needs what was inserted. Made by the writer, as the share's
 //             language is among its arguments
+//   later     files whose bytes the disk did not give, and when the next try is due, in seconds
+//   since
+//             the epoch. While one is with a helper that is far away
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
-//             failed
+//             failed; and under NOT_KEPT, as done, those that were looked into and left: of no kind
+//             that is read, or of one that is not wanted
 //   rate      for each second with commits of the last minute: how many files were done
 //   meta      one row: the share's file system (contents of another one say nothing), the language
 //             of the words, the version of the readers that all was read or tried with, the random
 //             number of the entries database that was followed and the greatest `written` seen in
 //             it, the last rowid in `texts`, and while the words are being made anew, up to which
 //             of them that is done (all, unless it is going on) and up to which it has to be, the
-//             version of what cuts texts into words, and the last rowid in `texts` when the words
+//             version of what cut texts into words, and the last rowid in `texts` when the words
 //             were merged
-//   old_words what `words` was, while it is taken away after words began to be made anew
+//   new_words what `words` becomes once it holds all texts: questions ask the old ones until then
+//   words_to_be  one row while that is made: the language and the version of what is made
+//   old_words what `words` was, while it is taken away
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.
@@ -64,7 +71,10 @@ constexpr int64_t CONTENTS_VERSION = 3;
 extern const DatabaseForm CONTENTS_FORM;
 
 // Numbers are stored.
-enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3 };
+// UNREAD: its bytes cannot be had, which tells nothing about it.
+enum class ContentState { WAITING = 0, DONE = 1, FAILED = 2, QUARANTINED = 3, UNREAD = 4 };
+
+constexpr int64_t NOT_KEPT = 5;  // behind the kinds
 
 constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being made anew
 
@@ -72,6 +82,10 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 // up; then the newest, by the minute, as of no two files the same time would ever be met; then the
 // smallest. An index has these expressions.
 #define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
+
+// What databases of this version lack that were made before it was thought of. Whoever only reads
+// needs none of it.
+extern const char* const CONTENTS_ADDITIONS;
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;
@@ -87,7 +101,8 @@ constexpr int FIRST_FIELD_COLUMN = 1;
 // The name at that place, from 0, of one of the two lists.
 std::string ColumnAt(const char* columns, size_t place);
 
-// Makes the words anew, empty, for that language (one of IsLanguage).
-std::string WordsSchema(const std::string& language);
+// Makes a table of words, empty, for that language (one of IsLanguage), in the place of one of that
+// name.
+std::string WordsSchema(const std::string& table, const std::string& language);
 
 }  // namespace fileindexd

@@ -47,19 +47,44 @@ void BindFile(Statement& statement, const ContentFile& file) {
   }
 }
 
+Kind KindOf(const ContentFile& file) {
+  return file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
+}
+
 int Execute(sqlite3* db, const std::string& sql) {
   return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
 }
 
 }  // namespace
 
+bool IsNotKept(const ContentFile& file) {
+  return file.state == ContentState::DONE &&
+         (file.extractor == KEPT_OUT || KindOf(file) == Kind::OTHER);
+}
+
+int ContentsTable::Complete() {
+  bool is_complete = false;
+  const int code = HasTable("later", is_complete);
+  return code != SQLITE_OK || is_complete ? code : Execute(handle, CONTENTS_ADDITIONS);
+}
+
 int ContentsTable::Prepare(sqlite3* db) {
   handle = db;
+  const int completed = Complete();
+  if (completed != SQLITE_OK) {
+    return completed;
+  }
   const std::pair<Statement*, const char*> statements[] = {
       {&find, "SELECT " FILE_COLUMNS " FROM files WHERE inode = ?1 AND birth_time = ?2"},
       {&find_by_id, "SELECT " FILE_COLUMNS " FROM files WHERE id = ?1"},
-      {&waiting,
-       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 ORDER BY " WAITING_ORDER " LIMIT ?1"},
+      {&waiting_new,
+       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND (extractor = 0 OR extractor >= ?2)"
+       " ORDER BY " WAITING_ORDER " LIMIT ?1"},
+      {&waiting_again,
+       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND extractor <> 0 AND extractor < ?2"
+       " ORDER BY " WAITING_ORDER " LIMIT ?1"},
+      {&unread_due, "SELECT " FILE_COLUMNS " FROM later CROSS JOIN files ON files.id = later.file"
+                    " WHERE later.due <= ?2 ORDER BY later.due LIMIT ?1"},
       {&failed,
        "SELECT " FILE_COLUMNS " FROM files WHERE state >= 2 AND id > ?1 ORDER BY id LIMIT ?2"},
       {&left_begun, "SELECT " FILE_COLUMNS " FROM files WHERE begun <> 0 LIMIT ?1"},
@@ -76,11 +101,16 @@ int ContentsTable::Prepare(sqlite3* db) {
        "WHERE id = ?1"},
       {&set_reason, "UPDATE files SET reason = ?2 WHERE id = ?1 AND reason <> ?2"},
       {&remove, "DELETE FROM files WHERE id = ?1"},
+      {&set_due,
+       "INSERT INTO later VALUES(?1, ?2) ON CONFLICT(file) DO UPDATE SET due = excluded.due"},
+      {&drop_due, "DELETE FROM later WHERE file = ?1"},
+      {&limit_due, "UPDATE later SET due = ?1 WHERE due > ?1"},
+      {&next_due, "SELECT min(due) FROM later"},
       {&write_meta,
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
        "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
        "words_version = ?9, merged = ?10 WHERE id = 1"},
-      {&count_done, "SELECT coalesce(sum(done), 0) FROM counts"},
+      {&count_done, "SELECT coalesce(sum(done), 0) FROM counts WHERE kind < 5"},
       {&write_counts,
        "UPDATE counts SET waiting = waiting + ?2, done = done + ?3, "
        "failed = failed + ?4 WHERE kind = ?1"},
@@ -224,9 +254,22 @@ int ContentsTable::ReadFiles(Statement& statement, std::vector<ContentFile>& fil
   return statement.ReadAll([&] { ReadFile(statement, files.emplace_back()); });
 }
 
-int ContentsTable::Waiting(int64_t limit, std::vector<ContentFile>& files) {
-  waiting.BindInt(1, limit);
-  return ReadFiles(waiting, files);
+int ContentsTable::WaitingNew(int64_t limit, int64_t extractor, std::vector<ContentFile>& files) {
+  waiting_new.BindInt(1, limit);
+  waiting_new.BindInt(2, extractor);
+  return ReadFiles(waiting_new, files);
+}
+
+int ContentsTable::WaitingAgain(int64_t limit, int64_t extractor, std::vector<ContentFile>& files) {
+  waiting_again.BindInt(1, limit);
+  waiting_again.BindInt(2, extractor);
+  return ReadFiles(waiting_again, files);
+}
+
+int ContentsTable::UnreadDue(int64_t now, int64_t limit, std::vector<ContentFile>& files) {
+  unread_due.BindInt(1, limit);
+  unread_due.BindInt(2, now);
+  return ReadFiles(unread_due, files);
 }
 
 int ContentsTable::Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
@@ -253,8 +296,8 @@ int ContentsTable::Slice(int64_t after, int64_t limit, std::vector<ContentFile>&
 }
 
 void ContentsTable::Count(const ContentFile& file, int64_t number) {
-  const Kind kind = file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
-  const auto place = static_cast<size_t>(kind);
+  const auto kind = static_cast<size_t>(KindOf(file));
+  const size_t place = IsNotKept(file) ? NOT_KEPT : kind;
   CountOfKind& count = counted[place < counted.size() ? place : 0];
   switch (file.state) {
     case ContentState::WAITING:
@@ -295,7 +338,38 @@ int ContentsTable::Update(const ContentFile& before, const ContentFile& file) {
     Count(before, -1);
     Count(file, 1);
   }
-  return code;
+  const bool was_unread =
+      before.state == ContentState::UNREAD && file.state != ContentState::UNREAD;
+  return code == SQLITE_OK && was_unread ? DropDue(file.id) : code;
+}
+
+int ContentsTable::DropDue(int64_t id) {
+  drop_due.BindInt(1, id);
+  return drop_due.Run();
+}
+
+int ContentsTable::SetDue(int64_t id, int64_t due) {
+  const int code = Begin();
+  set_due.BindInt(1, id);
+  set_due.BindInt(2, due);
+  return code == SQLITE_OK ? set_due.Run() : code;
+}
+
+int ContentsTable::LimitDue(int64_t latest) {
+  int64_t due = 0;
+  limit_due.BindInt(1, latest);
+  const int code = NextDue(due);
+  return code == SQLITE_OK && due != INT64_MAX ? limit_due.Run() : code;
+}
+
+int ContentsTable::NextDue(int64_t& due) {
+  due = INT64_MAX;
+  bool found = false;
+  return next_due.ReadOne(found, [&] {
+    if (sqlite3_column_type(next_due.handle, 0) != SQLITE_NULL) {
+      due = next_due.Int(0);
+    }
+  });
 }
 
 int ContentsTable::SetReason(int64_t id, const std::string& reason) {
@@ -316,7 +390,7 @@ int ContentsTable::Remove(const ContentFile& file) {
   if (code == SQLITE_OK) {
     Count(file, -1);
   }
-  return code;
+  return code == SQLITE_OK && file.state == ContentState::UNREAD ? DropDue(file.id) : code;
 }
 
 }  // namespace fileindexd

@@ -68,9 +68,6 @@ int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& 
 
   file.length = static_cast<int64_t>(words.Length());
   pending_bytes += words.Length();
-  if (!prepared.cut_text.empty() && prepared.language == meta.language) {
-    words.text = prepared.cut_text;
-  }
   std::string made;
   if (prepared.packed.empty()) {
     made = PackTexts(content);
@@ -83,7 +80,7 @@ int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& 
   insert_text.BindInt(1, file.text);
   insert_text.BindBlob(2, packed);
   code = insert_text.Run();
-  return code == SQLITE_OK ? AddWords(file.text, words) : code;
+  return code == SQLITE_OK ? AddWords(file.text, words, prepared) : code;
 }
 
 int ContentsTable::RemoveContent(ContentFile& file) {
@@ -115,8 +112,20 @@ int ContentsTable::RunWords(Statement& statement, int64_t text, const ContentWor
   return statement.Run();
 }
 
-int ContentsTable::AddWords(int64_t text, const ContentWords& words) {
-  return RunWords(insert_words, text, words);
+// What was cut beforehand is of one language, and both tables may want words.
+int ContentsTable::AddWords(int64_t text, ContentWords& words, const PreparedContent& prepared) {
+  const std::string_view whole = words.text;
+  const auto use = [&](const std::string& language) {
+    const bool is_cut = !prepared.cut_text.empty() && prepared.language == language;
+    words.text = is_cut ? std::string_view(prepared.cut_text) : whole;
+  };
+  use(meta.language);
+  const int code = RunWords(insert_words, text, words);
+  if (code != SQLITE_OK || new_language.empty()) {
+    return code;
+  }
+  use(new_language);
+  return RunWords(insert_new_words, text, words);
 }
 
 int ContentsTable::RemoveWords() {
@@ -139,9 +148,11 @@ int ContentsTable::RemoveWordsOf(int64_t text) {
     return StepError(code) == SQLITE_OK ? SQLITE_CORRUPT : code;
   }
 
-  code = SQLITE_OK;
-  if (text <= meta.reworded || text > meta.reword_end) {
-    code = RunWords(remove_words, text, WordsOf(content));
+  const ContentWords words = WordsOf(content);
+  code = may_remove ? RunWords(remove_words, text, words) : SQLITE_OK;
+  const bool is_made = text <= meta.reworded || text > meta.reword_end;
+  if (code == SQLITE_OK && !new_language.empty() && is_made) {
+    code = RunWords(remove_new_words, text, words);
   }
   remove_text.BindInt(1, text);
   return code == SQLITE_OK ? remove_text.Run() : code;

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "index/contents_table.h"
+#include "index/words_version.h"
 
 namespace fileindexd {
 
@@ -10,7 +11,9 @@ namespace {
 
 constexpr size_t REWORD_BYTES = size_t{1} << 20;
 constexpr size_t REWORD_ROW = 500;  // a text is not free, however short
+constexpr const char* NEW_WORDS = "new_words";
 constexpr const char* OLD_WORDS = "old_words";
+constexpr const char* NEW_TO_OLD = "ALTER TABLE new_words RENAME TO old_words";
 // Pages of the old table, from its end: 2 MiB. Its first rows tell what it holds, and go with it.
 constexpr const char* REMOVE_OLD_PAGES =
     "DELETE FROM old_words_data WHERE id IN "
@@ -21,6 +24,10 @@ constexpr const char* MERGE_PAGES = "INSERT INTO words(words, rank) VALUES('merg
 constexpr int MERGED = 2;  // rows that change though nothing was left to merge: fewer
 // Below that the segments are few or small.
 constexpr int64_t LEAST_TO_MERGE = 256;
+
+int Execute(sqlite3* db, const std::string& sql) {
+  return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
+}
 
 }  // namespace
 
@@ -35,45 +42,131 @@ int ContentsTable::HasTable(const char* name, bool& has) {
   return code;
 }
 
-int ContentsTable::PrepareWords() {
+int ContentsTable::PrepareInto(const std::string& table, sqlite3* db, Statement& insert,
+                               Statement& remove) {
   std::string values = "?1";
   for (size_t i = 0; i <= TEXT_FIELD_COUNT + 1; ++i) {
     values += ", ?" + std::to_string(i + 2);
   }
   const std::string columns = std::string("rowid, ") + WORD_COLUMNS + ") VALUES(";
-  const std::string insert_sql = "INSERT INTO words(" + columns + values + ")";
-  const std::string remove_sql =
-      "INSERT INTO words(words, " + columns + "'delete', " + values + ")";
-  int code = insert_words.Prepare(handle, insert_sql.c_str());
-  code = code == SQLITE_OK ? remove_words.Prepare(handle, remove_sql.c_str()) : code;
-  return code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
+  const std::string into = "INSERT INTO " + table + "(";
+  const int code = insert.Prepare(db, (into + columns + values + ")").c_str());
+  return code == SQLITE_OK
+             ? remove.Prepare(db,
+                              (into + table + ", " + columns + "'delete', " + values + ")").c_str())
+             : code;
 }
 
-// What stands in the words by now is taken away in slices (see Reword): of many texts it would take
-// long. There is one such table at most.
-int ContentsTable::MakeWords(const std::string& language, const std::string& version) {
+int ContentsTable::PrepareWords() {
+  const int code = PrepareInto("words", handle, insert_words, remove_words);
+  return code == SQLITE_OK && !new_language.empty()
+             ? PrepareInto(NEW_WORDS, handle, insert_new_words, remove_new_words)
+             : code;
+}
+
+int ContentsTable::ReadWordsToBe(Words& to_be, bool& found) {
+  int code = HasTable("words_to_be", found);
+  if (code != SQLITE_OK || !found) {
+    return code;
+  }
+  Statement statement;
+  code = statement.Prepare(handle, "SELECT language, version FROM words_to_be");
+  return code == SQLITE_OK ? statement.ReadOne(found,
+                                               [&] {
+                                                 to_be = {statement.Bytes(0), statement.Bytes(1)};
+                                               })
+                           : code;
+}
+
+int ContentsTable::UseWords(const std::string& language, const std::string& version) {
+  const Words wanted = {language, version};
+  const Words current = {meta.language, meta.words_version};
+  Words to_be;
+  bool is_making = false;
+  int code = ReadWordsToBe(to_be, is_making);
+  code = code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
+  if (code == SQLITE_OK && is_making && (to_be != wanted || current == wanted)) {
+    code = DropNewWords();
+    is_making = false;
+  }
+  if (code == SQLITE_OK && !is_making && (current != wanted || meta.reworded != ALL_WORDS)) {
+    code = BeginWords(wanted);
+  } else if (is_making) {
+    new_language = language;
+  }
+  may_remove = WordsVersion(meta.language) == meta.words_version;
+  return code == SQLITE_OK ? PrepareWords() : code;
+}
+
+// Without texts there is nothing to make anew.
+int ContentsTable::BeginWords(const Words& to_be) {
   bool has_words = false;
   int code = Begin();
   code = code == SQLITE_OK ? HasTable("words", has_words) : code;
-  code = code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
-  if (code == SQLITE_OK && has_words && !has_old_words) {
-    code = sqlite3_exec(handle, "ALTER TABLE words RENAME TO old_words", nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK) {
+    return code;
   }
+  if (meta.last_text == 0 || !has_words) {
+    meta.language = to_be.language;
+    meta.words_version = to_be.version;
+    meta.reworded = ALL_WORDS;
+    meta.merged = 0;
+    // With texts and without words it is not whole.
+    return meta.last_text == 0 ? Execute(handle, WordsSchema("words", to_be.language))
+                               : SQLITE_ERROR;
+  }
+  code = Execute(handle, WordsSchema(NEW_WORDS, to_be.language) +
+                             ";CREATE TABLE words_to_be(language TEXT, version TEXT)");
+  Statement note;
+  code = code == SQLITE_OK ? note.Prepare(handle, "INSERT INTO words_to_be VALUES(?1, ?2)") : code;
   if (code == SQLITE_OK) {
-    code = sqlite3_exec(handle, WordsSchema(language).c_str(), nullptr, nullptr, nullptr);
+    note.BindText(1, to_be.language);
+    note.BindText(2, to_be.version);
+    code = note.Run();
   }
-  meta.language = language;
-  meta.words_version = version;
+  new_language = to_be.language;
   meta.reword_end = meta.last_text;
-  meta.reworded = meta.last_text == 0 ? ALL_WORDS : 0;
+  meta.reworded = 0;
+  return code;
+}
+
+// What was made is taken away in slices (see Reword), as of many texts it would take long; but for
+// one such table, the others at once.
+int ContentsTable::DropNewWords() {
+  int code = Begin();
+  const char* const away = has_old_words ? "DROP TABLE new_words" : NEW_TO_OLD;
+  code = code == SQLITE_OK ? Execute(handle, std::string(away) + ";DROP TABLE words_to_be") : code;
+  has_old_words = true;
+  new_language.clear();
+  meta.reworded = ALL_WORDS;
+  return code;
+}
+
+int ContentsTable::ReplaceWords() {
+  Words made;
+  bool found = false;
+  int code = ReadWordsToBe(made, found);
+  if (code != SQLITE_OK || !found) {
+    return code == SQLITE_OK ? SQLITE_CORRUPT : code;
+  }
+  code = Execute(handle,
+                 "ALTER TABLE words RENAME TO old_words;"
+                 "ALTER TABLE new_words RENAME TO words;"
+                 "DROP TABLE words_to_be");
+  meta.language = made.language;
+  meta.words_version = made.version;
+  meta.reworded = ALL_WORDS;
   meta.merged = 0;
+  new_language.clear();
+  may_remove = true;
+  has_old_words = true;
   return code;
 }
 
 int ContentsTable::RemoveOldWords() {
   int code = sqlite3_exec(handle, REMOVE_OLD_PAGES, nullptr, nullptr, nullptr);
   if (code == SQLITE_OK && sqlite3_changes(handle) == 0) {
-    code = sqlite3_exec(handle, "DROP TABLE old_words", nullptr, nullptr, nullptr);
+    code = Execute(handle, "DROP TABLE old_words");
     has_old_words = code != SQLITE_OK;
   }
   return code;
@@ -86,10 +179,16 @@ int ContentsTable::Reword(bool& more) {
   if (code != SQLITE_OK || meta.reworded == ALL_WORDS) {
     return code;
   }
+  bool has_texts = false;
+  code = MakeNewWords(has_texts);
+  // There is one table of old words at most.
+  return code == SQLITE_OK && !has_texts && !has_old_words ? ReplaceWords() : code;
+}
 
+int ContentsTable::MakeNewWords(bool& more) {
   next_texts.BindInt(1, meta.reworded);
   next_texts.BindInt(2, meta.reword_end);
-  code = next_texts.Step();
+  int code = next_texts.Step();
   more = code == SQLITE_ROW;
   for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {
     Content content;
@@ -100,15 +199,11 @@ int ContentsTable::Reword(bool& more) {
     }
     bytes += content.text.size() + REWORD_ROW;
     pending_bytes += content.text.size();
-    code = AddWords(text, WordsOf(content));
+    code = RunWords(insert_new_words, text, WordsOf(content));
     meta.reworded = text;
     code = code == SQLITE_OK ? next_texts.Step() : code;
   }
   next_texts.Reset();
-  if (!more && code == SQLITE_DONE) {
-    meta.reworded = ALL_WORDS;
-    more = has_old_words;
-  }
   return StepError(code);
 }
 

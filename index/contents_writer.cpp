@@ -20,6 +20,14 @@ int64_t Now() {
   return static_cast<int64_t>(time(nullptr));
 }
 
+int64_t PauseAfter(int64_t tries) {
+  int64_t pause = SHORTEST_PAUSE;
+  for (int64_t one = 1; one < tries && pause < LONGEST_PAUSE; ++one) {
+    pause *= 2;
+  }
+  return std::min(pause, LONGEST_PAUSE);
+}
+
 }  // namespace
 
 bool ContentsWriter::Impl::Guarded(const std::function<bool()>& step) {
@@ -94,7 +102,7 @@ bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
     now.tries = 0;
     code = Keep(file, content, now);
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
-    ++table->done_now;
+    table->done_now += IsNotKept(now) ? 0 : 1;
   }
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
 }
@@ -111,6 +119,14 @@ int ContentsWriter::Impl::Keep(const ContentFile& file, const PreparedContent& c
   }
   return is_kept ? table->SetContent(file, content, now)
                  : table->SetContent(file, OfKind(kind), now);
+}
+
+// What is of no kind that is wanted has not failed: nobody wants to know what is in it.
+void ContentsWriter::Impl::SettleKeptOut(ContentFile& file) {
+  if (file.extractor == KEPT_OUT && file.state == ContentState::FAILED) {
+    file.state = ContentState::DONE;
+    file.tries = 0;
+  }
 }
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
@@ -130,17 +146,52 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
   now.begun = 0;
   now.unended = 0;
   if (current) {
-    ++now.tries;
+    now.tries = file.state == ContentState::UNREAD ? 1 : file.tries + 1;
+    now.state = ContentState::WAITING;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
       // What was found before in the same bytes, by older readers or in another try, stays.
       const bool is_known = file.text != 0 && file.extractor != KEPT_OUT;
       now.extractor = extractor;
       code = is_known ? SQLITE_OK : Keep(file, content, now);
+      SettleKeptOut(now);
     }
-    code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
+    const bool is_failure = now.state != ContentState::DONE;
+    code = code == SQLITE_OK ? table->SetReason(id, is_failure ? reason : "") : code;
   }
   return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+}
+
+// Deaths that were on record before are forgotten: there is one number for both.
+bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t now) {
+  ContentFile file;
+  bool found = false;
+  bool current = false;
+  if (!Ready()) {
+    return false;
+  }
+  int code = TakeBack(id, file, found, current);
+  if (code != SQLITE_OK || !found) {
+    return Done(code);
+  }
+
+  ContentFile unread = file;
+  unread.begun = 0;
+  unread.unended = 0;
+  if (current) {
+    unread.tries = file.state == ContentState::UNREAD ? file.tries + 1 : 1;
+    unread.state = ContentState::UNREAD;
+    // These readers tried it; what stands there of others keeps their version. What may be of other
+    // bytes goes, unless there is a text to be found.
+    if (file.text == 0 && file.extractor == KEPT_OUT) {
+      unread.extractor = extractor;
+      code = table->SetContent(file, OfKind(file.found_kind), unread);
+    }
+    code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
+    code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(unread.tries)) : code;
+    code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  }
+  return Done(code == SQLITE_OK ? table->Update(file, unread) : code);
 }
 
 bool ContentsWriter::Impl::Release(int64_t id) {
@@ -150,7 +201,11 @@ bool ContentsWriter::Impl::Release(int64_t id) {
   if (!Ready()) {
     return false;
   }
-  const int code = TakeBack(id, file, found, current);
+  int code = TakeBack(id, file, found, current);
+  if (code == SQLITE_OK && found && file.state == ContentState::UNREAD) {
+    unread_due = 0;
+    code = table->SetDue(id, unread_due);
+  }
   if (code != SQLITE_OK || !found) {
     return Done(code);
   }
@@ -246,6 +301,15 @@ bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool&
   return impl->Guarded([&] { return impl->NextJobs(limit, jobs, more); });
 }
 
+bool ContentsWriter::NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs,
+                               bool& more) {
+  return impl->Guarded([&] { return impl->NextAgain(now, limit, jobs, more); });
+}
+
+int64_t ContentsWriter::UnreadDue() const {
+  return IsOpen() ? impl->unread_due : INT64_MAX;
+}
+
 bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
   return impl->Guarded([&] { return impl->BeginTries(files); });
 }
@@ -259,12 +323,16 @@ bool ContentsWriter::Fail(int64_t file, const std::string& reason, const Content
   return impl->Guarded([&] { return impl->Fail(file, reason, found, killed); });
 }
 
+bool ContentsWriter::Unread(int64_t file, const std::string& reason, int64_t now) {
+  return impl->Guarded([&] { return impl->Unread(file, reason, now); });
+}
+
 bool ContentsWriter::Release(int64_t file) {
   return impl->Guarded([&] { return impl->Release(file); });
 }
 
 bool ContentsWriter::RetryFailed() {
-  return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->RetryAll(false)); });
+  return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->RetryAll()); });
 }
 
 bool ContentsWriter::Sweep(int64_t now, size_t limit, bool& more) {

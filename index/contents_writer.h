@@ -56,10 +56,15 @@ class ContentsWriter {
   // once a day. Along with it goes what entries no longer want (see Sweep).
   void LookAtAll();
 
-  // Files that wait, newest and smallest first, without those handed out and not ended. Where none
-  // does, a few of what an older extractor read well begin to: until they are read anew, that is
-  // kept. `more`: there may be others, though these are less than `limit`.
+  // What is new and waits, newest and smallest first, without what is handed out and not ended.
+  // `more`: there may be others, though these are less than `limit`.
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
+  // The same of what is read again, and comes behind all that is new: what the disk did not give
+  // and is due, and what an older extractor read or failed at, of which a few at a time begin to
+  // wait. What is stored is kept until that. `now`: seconds since the epoch.
+  bool NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs, bool& more);
+  // When the next file is due that the disk did not give; INT64_MAX: there is none.
+  int64_t UnreadDue() const;
   // On disk when it returns: what is about to be tried.
   bool BeginTries(const std::vector<int64_t>& files);
   bool Finish(int64_t file, const PreparedContent& found);
@@ -67,6 +72,9 @@ class ContentsWriter {
   // same bytes had found. `killed`: the helper died; after the second time the file is not handed
   // out again until it or the extractor changes.
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
+  // The disk did not give its bytes. It counts as failed until it does, and is due again after a
+  // pause, that grows from seconds to an hour.
+  bool Unread(int64_t file, const std::string& reason, int64_t now);
   // Not tried after all, or its file changed meanwhile: it waits again.
   bool Release(int64_t file);
   // All that failed waits again.

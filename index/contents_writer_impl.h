@@ -24,8 +24,9 @@
 
 namespace fileindexd {
 
-// `extractor` of a file that was read and of which nothing was kept: its kind is not wanted.
-constexpr int64_t KEPT_OUT = 0;
+// Between two tries to have a file's bytes from the disk, in seconds.
+constexpr int64_t SHORTEST_PAUSE = 2;
+constexpr int64_t LONGEST_PAUSE = 60 * 60;
 
 inline Content OfKind(Kind kind) {
   Content content;
@@ -42,6 +43,7 @@ struct ContentsWriter::Impl {
   // One look for files to hand out.
   struct Round {
     size_t limit = 0;
+    int64_t most = 0;  // rows that are looked at: some are handed out
     Company company;
     bool dropped = false;  // rows that are not looked at again: others may come behind them
     bool held = false;     // a suspect that has to be alone
@@ -53,7 +55,7 @@ struct ContentsWriter::Impl {
   IndexError SetUp();
   int Own();
   int JudgeLeftBegun();
-  int RetryAll(bool old_only);
+  int RetryAll();
   void CloseDatabase();
   void CloseAll();
 
@@ -71,6 +73,9 @@ struct ContentsWriter::Impl {
 
   // contents_jobs.cpp
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
+  bool NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs, bool& more);
+  Round BeginRound(size_t limit) const;
+  int OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs);
   int OfferSome(std::vector<ContentFile>& rows, Round& round, std::vector<ContentJob>& jobs);
   int Renew(bool& more);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
@@ -83,7 +88,9 @@ struct ContentsWriter::Impl {
   // contents_writer.cpp
   bool Finish(int64_t file, const PreparedContent& content);
   int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
+  static void SettleKeptOut(ContentFile& file);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
+  bool Unread(int64_t file, const std::string& reason, int64_t now);
   bool Release(int64_t file);
   void LookAtAll();
   void Rollback();
@@ -95,10 +102,12 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
-  // Read well by older readers.
+  // Read by older readers, or what those failed at.
   bool IsAged(const ContentFile& file) const {
-    return file.state == ContentState::DONE && file.extractor != KEPT_OUT &&
-           file.extractor < extractor;
+    const bool is_kept = file.state == ContentState::DONE && file.extractor != KEPT_OUT;
+    const bool has_failed =
+        file.state == ContentState::FAILED || file.state == ContentState::QUARANTINED;
+    return (is_kept || has_failed) && file.extractor < extractor;
   }
   bool IsFull() const { return table->pending_bytes >= ENOUGH_PENDING; }
 
@@ -118,14 +127,16 @@ struct ContentsWriter::Impl {
   IndexError error = IndexError::PATH_NOT_FOUND;
   std::map<int64_t, HandedOut> out;
   std::set<int64_t> released;  // those are offered last
-  bool has_judged = false;     // what an earlier service left in flight
-  int64_t alone = 0;           // the one that was begun without another; 0: none
-  bool is_looking = false;     // at every entry
-  int64_t looked = 0;          // up to this `written`
-  bool is_sweeping = false;    // over every file
-  int64_t swept = 0;           // up to this row
-  int64_t renewed = 0;         // the same, of what older readers read
-  bool has_passed = false;     // one of these changed what is not committed
+  int64_t unread_due = INT64_MAX;
+  bool is_suspect_held = false;  // one waits to be alone: nothing else is begun before
+  bool has_judged = false;       // what an earlier service left in flight
+  int64_t alone = 0;             // the one that was begun without another; 0: none
+  bool is_looking = false;       // at every entry
+  int64_t looked = 0;            // up to this `written`
+  bool is_sweeping = false;      // over every file
+  int64_t swept = 0;             // up to this row
+  int64_t renewed = 0;           // the same, of what older readers read
+  bool has_passed = false;       // one of these changed what is not committed
 };
 
 }  // namespace fileindexd

@@ -82,16 +82,13 @@ int ContentsWriter::Impl::Own() {
     code = table->Begin();
     table->meta.filesystem = share.filesystem;
   }
-  if (code == SQLITE_OK &&
-      (table->meta.language != language || table->meta.words_version != version)) {
-    code = table->MakeWords(language, version);
-  }
-  code = code == SQLITE_OK ? table->PrepareWords() : code;
+  code = code == SQLITE_OK ? table->UseWords(language, version) : code;
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
   if (code == SQLITE_OK && table->meta.extractor != extractor) {
-    code = RetryAll(true);  // what was read well: see Renew, which also ends it
-    renewed = 0;
+    renewed = 0;  // see Renew, which also ends it
   }
+  code = code == SQLITE_OK ? table->LimitDue(Now() + LONGEST_PAUSE) : code;
+  code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
   return code == SQLITE_OK ? table->Commit(Now()) : code;
 }
 
@@ -108,7 +105,9 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
       const bool was_alone = file.begun == 1;
       file.begun = 0;
       file.unended += has_judged ? 0 : 1;
-      if (was_alone && file.unended >= MOST_DEATHS && file.state == ContentState::WAITING) {
+      const bool was_tried =
+          file.state == ContentState::WAITING || file.state == ContentState::UNREAD;
+      if (was_alone && file.unended >= MOST_DEATHS && was_tried) {
         file.state = ContentState::QUARANTINED;
         file.tries = file.unended;
         file.extractor = extractor;
@@ -121,7 +120,7 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
   return code;
 }
 
-int ContentsWriter::Impl::RetryAll(bool old_only) {
+int ContentsWriter::Impl::RetryAll() {
   std::vector<ContentFile> failed;
   int64_t after = 0;
   int code = SQLITE_OK;
@@ -130,12 +129,10 @@ int ContentsWriter::Impl::RetryAll(bool old_only) {
     for (size_t i = 0; i < failed.size() && code == SQLITE_OK; ++i) {
       ContentFile file = failed[i];
       after = file.id;
-      if (!old_only || file.extractor < extractor) {
-        file.state = ContentState::WAITING;
-        file.tries = 0;
-        file.unended = 0;
-        code = table->Update(failed[i], file);
-      }
+      file.state = ContentState::WAITING;
+      file.tries = 0;
+      file.unended = 0;
+      code = table->Update(failed[i], file);
     }
   } while (code == SQLITE_OK && !failed.empty());
   return code;

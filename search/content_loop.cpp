@@ -14,6 +14,7 @@ namespace fileindexd {
 
 namespace {
 
+using Turn = ShareContents::Turn;
 using std::chrono::milliseconds;
 using std::chrono::seconds;
 
@@ -95,9 +96,11 @@ Time ContentLoop::Due(Time now) const {
   }
 
   const bool takes_jobs = pool == nullptr || pool->Room() > 0;
+  const bool may_read_again = MayReadAgain(now);
   for (const auto& [name, followed] : shares) {
     due = std::min(due, followed.contents.Due());
-    if (takes_jobs && followed.contents.MayHaveJobs(now)) {
+    if (takes_jobs && (followed.contents.MayHaveJobs(Turn::NEW, now) ||
+                       (may_read_again && followed.contents.MayHaveJobs(Turn::AGAIN, now)))) {
       due = std::min(due, std::max(now, pool_rest_until));
     }
   }
@@ -128,6 +131,10 @@ void ContentLoop::Step(const std::vector<pollfd>& polled, Time now, int64_t wall
     followed.contents.Work(now, wall);
   }
   HandOut(now);
+  const bool is_new_waiting = IsNewWaiting(now);
+  for (auto& [name, followed] : shares) {
+    followed.contents.may_read_again = !is_new_waiting;
+  }
   SettleRetries();
 }
 
@@ -293,11 +300,22 @@ void ContentLoop::TakeOutcome(ExtractOutcome&& outcome, Time now) {
   if (job == owner.end()) {
     return;
   }
-  const auto found = shares.find(job->second);
+  const auto found = shares.find(job->second.share);
   if (found != shares.end()) {
     found->second.contents.End(std::move(outcome), now);
   }
   owner.erase(job);
+}
+
+bool ContentLoop::MayReadAgain(Time now) const {
+  const auto running = std::count_if(
+      owner.begin(), owner.end(), [](const auto& one) { return one.second.turn == Turn::AGAIN; });
+  return running < std::max<int64_t>(1, int64_t{options.helpers} - 1) && !IsNewWaiting(now);
+}
+
+bool ContentLoop::IsNewWaiting(Time now) const {
+  return std::any_of(shares.begin(), shares.end(),
+                     [now](const auto& one) { return one.second.contents.IsNewWaiting(now); });
 }
 
 void ContentLoop::HandOut(Time now) {
@@ -305,7 +323,8 @@ void ContentLoop::HandOut(Time now) {
   bool has_jobs = false;
   for (const auto& [name, followed] : shares) {
     sharing += followed.contents.TakesRoom(now) ? 1 : 0;
-    has_jobs = has_jobs || followed.contents.MayHaveJobs(now);
+    has_jobs = has_jobs || followed.contents.MayHaveJobs(Turn::NEW, now) ||
+               followed.contents.MayHaveJobs(Turn::AGAIN, now);
   }
   if (!has_jobs || now < pool_rest_until) {
     return;
@@ -314,25 +333,28 @@ void ContentLoop::HandOut(Time now) {
     OpenPool(now);
   }
 
+  sharing = std::max<size_t>(sharing, 1);
   for (auto& [name, followed] : shares) {
     followed.contents.largest_batch = std::min(MOST_READY / sharing, ShareContents::LARGEST_BATCH);
     followed.contents.enough_pending = ContentsWriter::ENOUGH_PENDING / sharing;
   }
-  while (pool != nullptr && pool->Room() > 0 && HandOutOne(now)) {
+  while (pool != nullptr && pool->Room() > 0 && HandOutOne(Turn::NEW, now)) {
+  }
+  while (pool != nullptr && pool->Room() > 0 && MayReadAgain(now) && HandOutOne(Turn::AGAIN, now)) {
   }
 }
 
 // Of the share whose turn it is, or of the next one that has something.
-bool ContentLoop::HandOutOne(Time now) {
-  auto turn = shares.upper_bound(last_share);
-  for (size_t tried = 0; tried < shares.size(); ++tried, ++turn) {
-    if (turn == shares.end()) {
-      turn = shares.begin();
+bool ContentLoop::HandOutOne(Turn turn, Time now) {
+  auto next = shares.upper_bound(last_share);
+  for (size_t tried = 0; tried < shares.size(); ++tried, ++next) {
+    if (next == shares.end()) {
+      next = shares.begin();
     }
     ExtractJob job;
-    if (turn->second.contents.Next(now, last_job + 1, job)) {
-      last_share = turn->first;
-      owner.emplace(++last_job, turn->first);
+    if (next->second.contents.Next(turn, now, last_job + 1, job)) {
+      last_share = next->first;
+      owner.emplace(++last_job, Owner{next->first, turn});
       pool->Submit(std::move(job));
       return true;
     }

@@ -13,12 +13,13 @@
 //   deadlines    of documents, commits, rests
 //
 // A step takes in what was told, ends what the helpers ended, gives each share one slice, and hands
-// files to the helpers, one share after the other. Reading is child processes' work, and what a
-// share's file system is asked, which may never answer, is a thread's of that share.
-// The rest is SQLite's, which takes one writer at a time. Texts are packed and cut into words
-// beside it, by the thread that looked whether their file is still the same; where several shares
-// are at work, whose texts would add up, by the writer. Without permission nothing is read and
-// nothing written: what runs is killed and taken back, and it goes on where it was.
+// files to the helpers, one share after the other: first what is new in any of them. Reading is
+// child processes' work, and what a share's file system is asked, which may never answer, is a
+// thread's of that share. The rest is SQLite's, which takes one writer at a time. Texts are packed
+// and cut into words beside it, by the thread that looked whether their file is still the same;
+// where several shares are at work, whose texts would add up, by the writer. Without permission
+// nothing is read and nothing written: what runs is killed and taken back, and it goes on where it
+// was.
 #pragma once
 
 #include <poll.h>
@@ -73,8 +74,11 @@ class ContentLoop {
   void TellLeftOut();
   void TakeOutcomes(Time now);
   void TakeOutcome(ExtractOutcome&& outcome, Time now);
+  // What is read again leaves a helper to what is new, where there is more than one.
+  bool MayReadAgain(Time now) const;
+  bool IsNewWaiting(Time now) const;  // in any share
   void HandOut(Time now);
-  bool HandOutOne(Time now);
+  bool HandOutOne(ShareContents::Turn turn, Time now);
   void RestPool(Time now, const std::string& reason);
   void SettleRetries();
 
@@ -90,11 +94,15 @@ class ContentLoop {
   std::unique_ptr<ExtractPool> pool;
   Time pool_rest_until;
   std::chrono::seconds pool_rest{0};
-  bool pool_told = false;                 // that it rests
-  std::optional<std::string> left_out;    // as it was told
-  uint64_t last_job = 0;                  // id
-  std::map<uint64_t, std::string> owner;  // share, by job
-  std::string last_share;                 // that was given a turn
+  bool pool_told = false;               // that it rests
+  std::optional<std::string> left_out;  // as it was told
+  uint64_t last_job = 0;                // id
+  struct Owner {
+    std::string share;
+    ShareContents::Turn turn = ShareContents::Turn::NEW;
+  };
+  std::map<uint64_t, Owner> owner;  // by job
+  std::string last_share;           // that was given a turn
   Time next_listen;
   Time next_reload = Time::max();
   Time next_look;  // where something could not be watched

@@ -7,7 +7,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "search/service.h"
+#include "state/content_service.h"
 
 namespace fileindexd {
 

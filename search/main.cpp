@@ -24,6 +24,7 @@
 #include "search/content_loop.h"
 #include "search/log.h"
 #include "search/service.h"
+#include "state/content_service.h"
 #include "state/instance.h"
 
 namespace fileindexd {

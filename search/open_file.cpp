@@ -57,9 +57,16 @@ Opening OpeningOfError(int error, std::string& reason) {
     case EOVERFLOW:
       reason = std::string("cannot be opened: ") + strerrordesc_np(error);
       return Opening::REFUSED;
-    default:
+    case EMFILE:
+    case ENFILE:
+    case ENOMEM:
+    case ENOBUFS:
+    case EINTR:
       reason = strerrordesc_np(error);
       return Opening::LATER;
+    default:
+      reason = std::string("cannot be opened: ") + strerrordesc_np(error);
+      return Opening::UNREAD;
   }
 }
 

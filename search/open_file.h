@@ -14,7 +14,8 @@ enum class Opening {
   DONE,
   CHANGED,  // gone, behind a link, no regular file, or another one than the index knows
   REFUSED,  // the file's own fault: `reason`
-  LATER,    // the host's or the disk's fault: `reason`
+  UNREAD,   // the disk's fault, which does not give it: `reason`
+  LATER,    // the host's fault: `reason`
 };
 
 // Opens the file for reading. Nothing that is no regular file is ever opened, so that no pipe and

@@ -89,8 +89,23 @@ bool ShareContents::CanWork(Time now) const {
 }
 
 bool ShareContents::IsIdle() const {
-  return !has_news && !look_at_all && !Sweeps() && !may_have_jobs && ready.empty() &&
-         running.empty() && !opener.IsWaiting() && !retry_wanted && !writer.HasChanges();
+  return !has_news && !look_at_all && !Sweeps() && !WantsMore() && fresh.ready.empty() &&
+         again.ready.empty() && running.empty() && !opener.IsWaiting() && !retry_wanted &&
+         !writer.HasChanges();
+}
+
+// When the disk is asked again for what it did not give. The writer may be closed meanwhile.
+void ShareContents::FollowUnread(Time now, int64_t wall) {
+  wall_time = wall;
+  if (writer.IsOpen() && writer.UnreadDue() != unread_due) {
+    unread_due = writer.UnreadDue();
+    next_unread = unread_due == INT64_MAX ? Time::max()
+                                          : now + seconds(std::max<int64_t>(unread_due - wall, 0));
+  }
+  if (now >= next_unread) {
+    again.may_have = true;
+    next_unread = Time::max();
+  }
 }
 
 void ShareContents::Work(Time now, int64_t wall) {
@@ -104,6 +119,7 @@ void ShareContents::Work(Time now, int64_t wall) {
     look_at_all = true;
     next_full_look = now + BETWEEN_FULL_LOOKS;
   }
+  FollowUnread(now, wall);
   if (now >= later_look) {
     has_news = true;
     later_look = Time::max();
@@ -134,7 +150,7 @@ bool ShareContents::Retry() {
   }
   retry_wanted = false;
   retried = true;
-  may_have_jobs = true;
+  MayHaveMore();
   return true;
 }
 
@@ -153,7 +169,7 @@ bool ShareContents::TakeIn(Time now) {
   if (!writer.TakeIn(TAKE_IN_ROWS, more)) {
     return false;
   }
-  may_have_jobs = true;
+  MayHaveMore();
   has_news = more;
   if (!more) {
     is_sweeping = true;
@@ -182,7 +198,7 @@ bool ShareContents::ReleasePatient(Time now) {
       return false;
     }
     patient.erase(patient.begin());
-    may_have_jobs = true;
+    MayHaveMore();
   }
   return true;
 }
@@ -194,7 +210,8 @@ Time ShareContents::CommitDue() const {
     return Time();
   }
   const Time latest = *first_change + COMMIT_AGE;
-  if (has_news || Sweeps() || may_have_jobs || is_opening || !ready.empty()) {
+  if (has_news || Sweeps() || WantsMore() || opening || !fresh.ready.empty() ||
+      (may_read_again && !again.ready.empty())) {
     return latest;
   }
   Time newest;
@@ -246,10 +263,12 @@ void ShareContents::CloseIfIdle(Time now) {
   } else if (now - idle_since >= CLOSE_AFTER) {
     const Time look = later_look;
     const bool sweep = is_sweeping;
+    const bool reads_again = again.may_have;
     GoneOn();
     Forget();
     later_look = look;
     is_sweeping = sweep;
+    again.may_have = reads_again;
   }
 }
 
@@ -264,8 +283,10 @@ void ShareContents::Halt() {
   for (const auto& [id, one] : running) {
     good = good && writer.Release(one.file);
   }
-  for (const Ready& one : ready) {
-    good = good && writer.Release(one.job.file);
+  for (const Line* line : {&fresh, &again}) {
+    for (const Ready& one : line->ready) {
+      good = good && writer.Release(one.job.file);
+    }
   }
   if (!good || (writer.HasChanges() && !writer.Commit())) {
     ServiceDebug("Share[%s] stopped in the middle, reason=%s", share.name.c_str(),
@@ -282,10 +303,12 @@ Time ShareContents::Due() const {
   if (is_asking_root && !root.has_value()) {
     return opener.Deadline();
   }
-  Time due = next_full_look;
+  Time due = std::min(next_full_look, next_unread);
   const bool has_work = Sweeps() || look_at_all || retry_wanted || (may_merge && IsIdle());
   if (!writer.IsOpen()) {
-    due = is_missing ? due : has_news || has_work ? Time() : std::min(due, later_look);
+    due = is_missing                            ? due
+          : has_news || has_work || WantsMore() ? Time()
+                                                : std::min(due, later_look);
     return std::max(due, rest_until);
   }
 

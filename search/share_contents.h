@@ -26,6 +26,7 @@
 #include "base/scoped_fd.h"
 #include "extract/pool.h"
 #include "index/contents_writer.h"
+#include "search/open_file.h"
 #include "search/opener.h"
 #include "state/belonging.h"
 #include "state/settings.h"
@@ -55,9 +56,13 @@ class ShareContents {
   // One slice of all but reading: opening, taking in, sweeping, committing. `wall`: seconds since
   // the epoch.
   void Work(Time now, int64_t wall);
+  // What is new goes before what is read again, over all shares.
+  enum class Turn { NEW, AGAIN };
   // The next file to read. False when there is none now; MayHaveJobs tells whether to ask again.
-  bool Next(Time now, uint64_t id, ExtractJob& job);
-  bool MayHaveJobs(Time now) const;
+  bool Next(Turn turn, Time now, uint64_t id, ExtractJob& job);
+  bool MayHaveJobs(Turn turn, Time now) const;
+  // Whether something new waits, or may, be it that it cannot be given out at this moment.
+  bool IsNewWaiting(Time now) const;
   // Whether it holds open files or words that are not written down, or may soon: all that do share
   // the room there is for them.
   bool TakesRoom(Time now) const;
@@ -75,6 +80,7 @@ class ShareContents {
 
   Share share;
   size_t largest_batch = LARGEST_BATCH;  // files held open to be given out next
+  bool may_read_again = true;            // nothing new waits anywhere
   // Bytes of a transaction: words are collected in memory until its end.
   size_t enough_pending = ContentsWriter::ENOUGH_PENDING;
 
@@ -93,6 +99,11 @@ class ShareContents {
     FileIdentity identity;
     Time since;
     std::shared_ptr<ScopedFd> open;  // the same as the job's, to be looked at afterwards
+  };
+  // What waits for one of the turns.
+  struct Line {
+    bool may_have = false;
+    std::deque<Ready> ready;
   };
   // Files that are being opened.
   struct Batch;
@@ -120,10 +131,16 @@ class ShareContents {
   bool Commit();
   void CloseIfIdle(Time now);
 
-  bool Refill(Time now);
+  Line& LineOf(Turn turn) { return turn == Turn::NEW ? fresh : again; }
+  const Line& LineOf(Turn turn) const { return turn == Turn::NEW ? fresh : again; }
+  bool WantsMore() const { return fresh.may_have || (again.may_have && may_read_again); }
+  void MayHaveMore() { fresh.may_have = again.may_have = true; }
+  void FollowUnread(Time now, int64_t wall);
+  bool Refill(Turn turn, Time now);
+  bool TakeUnopened(int64_t file, Opening opening, const std::string& reason, Time now);
   void TakeBatch(Batch& opened);
   void TakeLook(uint64_t id, const Ended& ended);
-  bool BeginTries();
+  bool BeginTries(const Line& line);
   void BePatient(int64_t file, Time now);
   void AdaptBatch(Time now);
 
@@ -142,7 +159,7 @@ class ShareContents {
   Opener opener;
   bool is_asking_root = false;
   std::optional<RootState> root;  // the answer, until it is used
-  bool is_opening = false;        // a batch
+  std::optional<Turn> opening;    // a batch for that turn
   size_t looking = 0;             // at files that were read
   Time answered;                  // the time, for answers
   bool has_news = true;
@@ -153,7 +170,6 @@ class ShareContents {
   bool is_reindexing = false;  // what has no entry may be about to get one
   bool retry_wanted = false;
   bool retried = false;
-  bool may_have_jobs = false;
   bool may_merge = true;  // words that are new since they were merged
   Time next_take_in;
   Time taken_in;                               // the last time
@@ -171,7 +187,11 @@ class ShareContents {
 
   size_t batch = 0;
   Time refilled;
-  std::deque<Ready> ready;
+  Line fresh;
+  Line again;
+  int64_t wall_time = 0;                 // at the last slice
+  int64_t unread_due = INT64_MAX;        // by that clock, as the writer said
+  Time next_unread = Time::max();        // the same, until it has come
   std::map<uint64_t, Running> running;   // by the id of the job
   std::map<int64_t, Patience> patience;  // by file
   std::multimap<Time, int64_t> patient;  // files that the writer has given out and that wait here

@@ -26,6 +26,9 @@ constexpr milliseconds SLOW_BATCH(1000);
 // Files that were read and are looked at again: what they were found to hold is kept meanwhile.
 constexpr size_t MOST_LOOKING = 4;
 
+// Files that are open and on record while what is new goes first.
+constexpr size_t MOST_AGAIN = 16;
+
 constexpr seconds FIRST_PATIENCE(2);
 constexpr seconds LONGEST_PATIENCE(300);
 constexpr size_t MOST_PATIENT = 4096;
@@ -47,7 +50,7 @@ struct ShareContents::Batch {
     bool is_suspect = false;
     for (File& one : files) {
       Open(one);
-      is_suspect = is_suspect || one.opening == Opening::CHANGED || one.opening == Opening::LATER;
+      is_suspect = is_suspect || (one.opening != Opening::DONE && one.opening != Opening::REFUSED);
     }
     // Files that are not what the index knows: is it the share at all?
     root = is_suspect ? LookAtRoot(share) : RootState::SOUND;
@@ -70,22 +73,31 @@ struct ShareContents::Batch {
   RootState root = RootState::SOUND;
 };
 
-bool ShareContents::MayHaveJobs(Time now) const {
-  const bool may_open = may_have_jobs && !is_opening && patient.size() < MOST_PATIENT;
-  return writer.IsOpen() && CanWork(now) && looking < MOST_LOOKING && (!ready.empty() || may_open);
+bool ShareContents::MayHaveJobs(Turn turn, Time now) const {
+  const Line& line = LineOf(turn);
+  const bool may_open = line.may_have && !opening && patient.size() < MOST_PATIENT;
+  return writer.IsOpen() && CanWork(now) && looking < MOST_LOOKING &&
+         (!line.ready.empty() || may_open);
+}
+
+bool ShareContents::IsNewWaiting(Time now) const {
+  return writer.IsOpen() && CanWork(now) &&
+         (fresh.may_have || !fresh.ready.empty() || opening == Turn::NEW);
 }
 
 bool ShareContents::TakesRoom(Time now) const {
   return writer.IsOpen() && CanWork(now) &&
-         (may_have_jobs || is_opening || !ready.empty() || !running.empty() || writer.HasChanges());
+         (WantsMore() || opening || !fresh.ready.empty() || !again.ready.empty() ||
+          !running.empty() || writer.HasChanges());
 }
 
-bool ShareContents::Next(Time now, uint64_t id, ExtractJob& job) {
-  if (!MayHaveJobs(now) || (ready.empty() && !Refill(now))) {
+bool ShareContents::Next(Turn turn, Time now, uint64_t id, ExtractJob& job) {
+  Line& line = LineOf(turn);
+  if (!MayHaveJobs(turn, now) || (line.ready.empty() && !Refill(turn, now))) {
     return false;
   }
 
-  Ready& next = ready.front();
+  Ready& next = line.ready.front();
   Running& begun = running[id];
   begun.file = next.job.file;
   begun.identity = next.job.identity;
@@ -95,18 +107,26 @@ bool ShareContents::Next(Time now, uint64_t id, ExtractJob& job) {
   job.id = id;
   job.file = std::move(next.file);
   job.name = std::move(next.name);
-  ready.pop_front();
+  line.ready.pop_front();
   return true;
 }
 
 // What comes of it is ready now, or later.
-bool ShareContents::Refill(Time now) {
+bool ShareContents::Refill(Turn turn, Time now) {
   if (!HasRoom(now)) {
     return false;
   }
-  AdaptBatch(now);
+  Line& line = LineOf(turn);
   std::vector<ContentJob> jobs;
-  if (!writer.NextJobs(batch, jobs, may_have_jobs)) {
+  bool good = false;
+  if (turn == Turn::NEW) {
+    AdaptBatch(now);
+    good = writer.NextJobs(batch, jobs, line.may_have);
+  } else {
+    const size_t most = std::max(std::min(largest_batch, MOST_AGAIN), SMALLEST_BATCH);
+    good = writer.NextAgain(wall_time, most, jobs, line.may_have);
+  }
+  if (!good) {
     RestForError(now);
     return false;
   }
@@ -122,24 +142,25 @@ bool ShareContents::Refill(Time now) {
     }
   }
   if (!asked->files.empty()) {
-    is_opening = true;
+    opening = turn;
     auto open = [this, asked = std::move(asked)]() -> Opener::Answer {
       asked->Open();
       return [this, asked] { TakeBatch(*asked); };
     };
     Ask(std::move(open), now);
   }
-  return !ready.empty();
+  return !line.ready.empty();
 }
 
 void ShareContents::TakeBatch(Batch& opened) {
   const Time now = answered;
-  is_opening = false;
+  assert(opening);  // who does not wait for it any more drops the question
+  Line& line = LineOf(*std::exchange(opening, std::nullopt));
   // First: what is open is not left to the batch, which would close it here. Closing is asking,
   // too.
   for (Batch::File& one : opened.files) {
     if (one.opening == Opening::DONE) {
-      Ready& next = ready.emplace_back();
+      Ready& next = line.ready.emplace_back();
       next.file = opener.Keep(one.file);
       next.name = one.path.substr(one.path.rfind('/') + 1);
       next.job = std::move(one.job);
@@ -149,25 +170,33 @@ void ShareContents::TakeBatch(Batch& opened) {
     return;
   }
   for (const Batch::File& one : opened.files) {
-    if (one.opening == Opening::DONE) {
-      continue;
-    }
-    if (one.opening == Opening::REFUSED) {
-      if (!writer.Fail(one.job.file, one.reason, {}, false)) {
-        RestForError(now);
-        return;
-      }
-    } else {
-      if (one.opening == Opening::LATER) {
-        ServiceDebug("Share[%s] a file waits, reason=%s", share.name.c_str(), one.reason.c_str());
-      }
-      BePatient(one.job.file, now);
-      patient.emplace(patience[one.job.file].until, one.job.file);
+    if (one.opening != Opening::DONE && !TakeUnopened(one.job.file, one.opening, one.reason, now)) {
+      RestForError(now);
+      return;
     }
   }
-  if (!ready.empty() && !BeginTries()) {
+  if (!line.ready.empty() && !BeginTries(line)) {
     RestForError(now);
   }
+}
+
+// False when that could not be written down.
+bool ShareContents::TakeUnopened(int64_t file, Opening result, const std::string& reason,
+                                 Time now) {
+  switch (result) {
+    case Opening::REFUSED:
+      return writer.Fail(file, reason, {}, false);
+    case Opening::UNREAD:
+      return writer.Unread(file, reason, wall_time);
+    case Opening::LATER:
+      ServiceDebug("Share[%s] a file waits, reason=%s", share.name.c_str(), reason.c_str());
+      break;
+    default:
+      break;
+  }
+  BePatient(file, now);
+  patient.emplace(patience[file].until, file);
+  return true;
 }
 
 void ShareContents::AdaptBatch(Time now) {
@@ -181,10 +210,10 @@ void ShareContents::AdaptBatch(Time now) {
   refilled = now;
 }
 
-bool ShareContents::BeginTries() {
+bool ShareContents::BeginTries(const Line& line) {
   std::vector<int64_t> files;
-  files.reserve(ready.size());
-  for (const Ready& one : ready) {
+  files.reserve(line.ready.size());
+  for (const Ready& one : line.ready) {
     files.push_back(one.job.file);
   }
   if (!writer.BeginTries(files)) {
@@ -258,13 +287,11 @@ void ShareContents::TakeLook(uint64_t id, const Ended& ended) {
   running.erase(found);
 
   bool good = false;
-  const bool is_unread = outcome.result == ExtractOutcome::Result::UNREAD;
-  if (is_unread) {
-    ServiceDebug("Share[%s] a file waits, reason=%s", share.name.c_str(), outcome.reason.c_str());
-  }
-  if (outcome.result == ExtractOutcome::Result::LOST || is_unread || !ended.is_still) {
+  if (outcome.result == ExtractOutcome::Result::LOST || !ended.is_still) {
     BePatient(file, now);
     good = writer.Release(file);
+  } else if (outcome.result == ExtractOutcome::Result::UNREAD) {
+    good = writer.Unread(file, outcome.reason, wall_time);
   } else {
     patience.erase(file);
     switch (outcome.result) {
@@ -283,7 +310,7 @@ void ShareContents::TakeLook(uint64_t id, const Ended& ended) {
     RestForError(now);
     return;
   }
-  may_have_jobs = true;  // it may wait again, or another have waited for its end
+  MayHaveMore();  // it may wait again, or another have waited for its end
   may_merge = true;
 }
 

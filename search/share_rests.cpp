@@ -139,7 +139,7 @@ void ShareContents::DropQuestions() {
   preparer.reset();  // a thread that hangs may come back to it
   is_asking_root = false;
   root.reset();
-  is_opening = false;
+  opening.reset();
   looking = 0;
 }
 
@@ -147,12 +147,14 @@ void ShareContents::DropQuestions() {
 void ShareContents::Forget() {
   writer.Close();
   DropQuestions();
-  ready.clear();
+  fresh.ready.clear();
+  again.ready.clear();
   running.clear();
   patient.clear();
   patience.clear();
   first_change.reset();
-  may_have_jobs = false;
+  fresh.may_have = again.may_have = false;
+  unread_due = INT64_MAX;
   is_sweeping = false;
   has_news = false;
   later_look = Time::max();

@@ -63,6 +63,44 @@ class ContentsFollowTest(ScriptedTest):
         self.await_all_taken_in(root)
         self.assertEqual(self.given(), ["last.txt", "one.txt", "two.txt"])
 
+    def test_a_move_from_one_indexed_folder_to_another_costs_no_reading(self):
+        root = self.make_share(folders=())
+        for folder in ("here", "there"):
+            os.mkdir(f"{root}/{folder}")
+            self.write(f"{root}/{folder}/{folder}.txt", f"lighthouse {folder}")
+        self.start()
+        for folder in ("here", "there"):
+            self.ctl("folder", "add", f"{root}/{folder}", "--document")
+        self.await_counts(done=2, waiting=0)
+
+        os.rename(f"{root}/here/here.txt", f"{root}/there/moved.txt")
+        self.change(root, "here/here.txt", code=0x80)
+        self.change(root, "there/moved.txt")
+        self.await_hits("lighthouse", ["moved.txt", "there.txt"])
+
+        self.write(f"{root}/there/last.txt", "afterwards")
+        self.change(root, "there/last.txt")
+        self.await_hits("afterwards", ["last.txt"])
+        self.await_counts(done=3, waiting=0)
+        self.assertEqual(self.given(), ["here.txt", "last.txt", "there.txt"])
+
+    def test_there_is_a_helper_for_each_processor(self):
+        processors = len(os.sched_getaffinity(0))
+        names = [f"gate{number}.txt" for number in range(3 * processors)]
+        root = self.make_share(folders=())
+        for name in names:
+            self.write(f"{root}/{name}", "lighthouse")
+        self.start()
+        self.ctl("folder", "add", root, "--document")
+
+        self.await_diary(lambda given: len(given) >= processors)
+        at_work = {pid for _, pid in self.diary()}
+        self.open_gate()
+
+        self.await_hits("lighthouse", names)
+        self.assertEqual(len(at_work), processors)
+        self.assertEqual({pid for _, pid in self.diary()}, at_work)
+
     def test_a_link_that_is_taken_away_costs_no_reading(self):
         root = self.make_documents(one="lighthouse")
         os.link(f"{root}/one.txt", f"{root}/twin.txt")
@@ -163,7 +201,11 @@ class ContentsFollowTest(ScriptedTest):
         self.start()
         self.ctl("folder", "add", root, "--document")
         self.await_given("unread.txt")
-        self.await_counts(done=1, waiting=1, failed=0)
+        self.await_counts(done=1, waiting=0, failed=1)
+        ((reason, tries),) = self.failed().values()
+        self.assertEqual(reason, "the disk is gone")
+        self.assertGreaterEqual(tries, 1)
+        self.await_given("unread.txt", 3)
 
         self.write(f"{os.path.dirname(self.diary_path)}/mended", "")
 
@@ -266,6 +308,26 @@ class QuarantineTest(ScriptedTest):
         self.await_counts(done=2, failed=2, waiting=0)
         self.assertEqual(self.hits("lighthouse"), ["crash.txt", "good.txt"])
         self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
+
+    def test_retry_says_what_it_does_and_who_does_not(self):
+        self.assertEqual(self.ctl("failed", "--retry").out, b"3 files will be tried again\n")
+        self.await_diary(lambda given: given.count("bad.txt") == 2)
+        self.await_counts(failed=3, waiting=0)
+
+        self.ctl("pause")
+        self.assertIn(b"3 files will be tried again when", self.ctl("failed", "--retry").out)
+        for one in self.ctl("failed", "--retry", "--json").json():
+            self.assertTrue(one["retry"] and one["paused"])
+        self.ctl("resume")
+        self.await_diary(lambda given: given.count("bad.txt") == 3)
+        self.await_counts(failed=3, waiting=0)
+
+        self.stop(self.daemon)
+        self.assertIn(b"content service", self.ctl("failed", "alpha", "--retry").out)
+        for one in self.ctl("failed", "--retry", "--json").json():
+            self.assertEqual((one["retry"], one["service_runs"], one["paused"]), (True, False, False))
+        self.start()
+        self.await_diary(lambda given: given.count("bad.txt") == 4)
 
     def test_what_an_older_extractor_failed_at_is_tried_again(self):
         self.write(f"{os.path.dirname(self.diary_path)}/mended", "")

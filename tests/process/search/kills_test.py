@@ -7,19 +7,24 @@ import random
 import signal
 
 from harness import main
-from search.library import ScriptedTest
+from search.library import ContentsTest, ScriptedTest
 
 LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
 KILLS = 300 if LONG else 12
+REAL_KILLS = 60 if LONG else 12  # at each, helpers
 FILES_BETWEEN = 6  # that are read between two kills, at most
+
+
+def make_choice():
+    seed = int(os.environ.get("FILEINDEXD_TEST_SEED", "0")) or random.randrange(1, 1 << 32)
+    print(f"seed {seed}", flush=True)
+    return random.Random(seed)
 
 
 class RandomKillsTest(ScriptedTest):
     def setUp(self):
         super().setUp()
-        self.seed = int(os.environ.get("FILEINDEXD_TEST_SEED", "0")) or random.randrange(1, 1 << 32)
-        print(f"seed {self.seed}", flush=True)
-        self.choice = random.Random(self.seed)
+        self.choice = make_choice()
 
     def kill_helper(self):
         with contextlib.suppress(ProcessLookupError):  # it was killed with its service
@@ -60,6 +65,45 @@ class RandomKillsTest(ScriptedTest):
         self.assertEqual(len(self.hits("everywhere")), min(self.added, 1000))
         for number in self.choice.sample(range(1, self.added + 1), 20):
             self.assertEqual(self.hits(f"lighthouse{number}"), [f"f{number}.txt"])
+
+
+class RealHelperKillsTest(ContentsTest):
+    def helpers(self, service):
+        """Processes of the service's own that read files."""
+        pids = []
+        for task in os.listdir(f"/proc/{service}/task"):
+            with open(f"/proc/{service}/task/{task}/children", encoding="ascii") as children:
+                pids += [int(pid) for pid in children.read().split()]
+        return pids
+
+    def test_kills(self):
+        choice = make_choice()
+        root = self.make_share(folders=())
+        self.start()
+        service = self.service_pid()
+        self.ctl("folder", "add", root, "--document")
+
+        added = killed = 0
+        for _ in range(REAL_KILLS):
+            done = added
+            for _ in range(4 * FILES_BETWEEN):
+                added += 1
+                text = " ".join(f"word{choice.randrange(100000)}" for _ in range(20000))
+                self.write(f"{root}/f{added}.txt", f"lighthouse{added} everywhere {text}")
+            self.ctl("reindex", root)
+            self.await_taken("alpha")
+            until = done + choice.randrange(1, FILES_BETWEEN)
+            self.await_contents(lambda until=until: self.status()["contents_done"] >= until)
+            helpers = self.helpers(service)
+            for pid in choice.sample(helpers, choice.randrange(len(helpers) + 1)):
+                with contextlib.suppress(ProcessLookupError):
+                    os.kill(pid, signal.SIGKILL)
+                    killed += 1
+
+        self.assertGreater(killed, 0)
+        self.await_counts(done=added, waiting=0, failed=0)
+        self.assertEqual(self.failed(), {})
+        self.assertEqual(len(self.hits("everywhere")), min(added, 1000))
 
 
 if __name__ == "__main__":

@@ -70,14 +70,32 @@ class InfoContentTest : public ContentsTest {
 
 InfoContentTest* InfoContentTest::current = nullptr;
 
+TEST(ContentLinesTest, WhatHoldsSeveralHasALineForEach) {
+  EntryContent content;
+  content.is_known = true;
+  content.stored.state = "done";
+  content.stored.content.texts = {{ContentField::TITLE, "One"},
+                                  {ContentField::MEMBERS, "a\nb\nc\nd"}};
+  const auto shown = [&content](size_t most) {
+    std::string lines;
+    for (const auto& [name, text] : ContentLines(content, most)) {
+      lines += name + "=" + text + ";";
+    }
+    return lines;
+  };
+
+  EXPECT_EQ(shown(4), "state=done;kind=other;title=One;member=a;=b;=c;=d;text=0 bytes;");
+  EXPECT_EQ(shown(2), "state=done;kind=other;title=One;member=a;=b;=... and 2 more;text=0 bytes;");
+}
+
 TEST_F(InfoContentTest, AChangeBetweenStatementsIsNoProblem) {
   const Entry entry = ContentsTest::Find("a.txt");
-  ASSERT_EQ(ContentOf("s", entry).stored.state, "done");
+  ASSERT_EQ(ContentOf(TheShare(), entry).stored.state, "done");
 
   int number = 0;
   do {
     MoveAtStatement(++number);
-    const EntryContent content = ContentOf("s", entry);
+    const EntryContent content = ContentOf(TheShare(), entry);
     (void)sqlite3_reset_auto_extension();
     EXPECT_EQ(content.problem, "") << number;
     EXPECT_TRUE(content.is_known) << number;

@@ -8,6 +8,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <sstream>
 
@@ -17,12 +18,15 @@ namespace fileindexd {
 
 namespace {
 
-// Of the one child that this process has.
+// The one child that this process has, whichever of its threads started it.
 pid_t ChildOf(pid_t process) {
-  const std::string number = std::to_string(process);
-  std::ifstream children("/proc/" + number + "/task/" + number + "/children");
   pid_t child = -1;
-  children >> child;
+  for (const auto& task :
+       std::filesystem::directory_iterator("/proc/" + std::to_string(process) + "/task")) {
+    std::ifstream children(task.path() / "children");
+    pid_t found = -1;
+    child = children >> found ? found : child;
+  }
   return child;
 }
 
@@ -57,7 +61,10 @@ int SmallFilesystem() {
 
 class HelperTest : public PoolFixture {
  public:
-  void SetUp() override {
+  void SetUp() override { OpenOwn(); }
+
+  // Each process needs its own.
+  void OpenOwn() {
     PoolOptions options;
     options.program = HELPER;
     options.text_cap = 1000;
@@ -95,6 +102,7 @@ TEST_F(HelperTest, ItStandsBehindItsDoors) {
 TEST_F(HelperTest, ItDoesNotOutliveTheService) {
   const pid_t service = fork();
   if (service == 0) {
+    OpenOwn();
     (void)Run("a.txt", "words");
     raise(SIGSTOP);
     _exit(0);

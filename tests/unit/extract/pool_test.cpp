@@ -1,10 +1,14 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/pool.h"
 
+#include <sys/stat.h>
 #include <sys/wait.h>
 
+#include <algorithm>
 #include <csignal>
 #include <cstdlib>
+#include <filesystem>
+#include <string>
 #include <thread>
 
 #include "pool_fixture.h"
@@ -75,6 +79,26 @@ class PoolTest : public PoolFixture {
     return ended.size() == 1 ? Told(ended.front()) : std::to_string(ended.size()) + " outcomes";
   }
 };
+
+// Else each child would close a copy of it at its start, which is asking its file system.
+TEST_F(PoolTest, AFileThatIsOpenedLaterIsNoneOfWhoStartsHelpers) {
+  const ScopedFd file = FileOf("of a file system that hangs");
+  struct stat of_file {};
+  ASSERT_EQ(fstat(file.fd, &of_file), 0);
+  size_t without = 0;
+  for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
+    const auto descriptors = std::filesystem::directory_iterator(task.path() / "fd");
+    without += std::none_of(begin(descriptors), end(descriptors), [&](const auto& descriptor) {
+      struct stat of_descriptor {};
+      return stat(descriptor.path().c_str(), &of_descriptor) == 0 &&
+             of_descriptor.st_dev == of_file.st_dev && of_descriptor.st_ino == of_file.st_ino;
+    });
+  }
+  EXPECT_EQ(without, 1U);
+
+  Submit(1, "words");
+  EXPECT_EQ(Await(1)[1].result, ExtractOutcome::Result::DONE);
+}
 
 TEST_F(PoolTest, AnAnswerComesBackUnderItsId) {
   Submit(77, "text some words");

@@ -90,6 +90,7 @@ void ExpectWhole() {
             ALL * 1000);
   EXPECT_EQ(Number(db, "SELECT count(*) FROM words WHERE words MATCH 'houses'"), ALL);
   EXPECT_EQ(Number(db, "SELECT count(*) FROM sqlite_master WHERE name LIKE 'old_words%'"), 0);
+  EXPECT_EQ(Number(db, "SELECT count(*) FROM sqlite_master WHERE name LIKE 'new_words%'"), 0);
   EXPECT_EQ(Number(db,
                    "SELECT count(*) FROM files f WHERE (SELECT count(*) FROM words "
                    "WHERE words MATCH 'inode' || f.inode) <> 1"),

@@ -3,6 +3,8 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
+
 #include "index/schema.h"
 #include "state/layout.h"
 #include "tests/unit/index/contents_fixture.h"
@@ -26,7 +28,12 @@ class AlikeFilesTest : public ContentsTest {
     }
   }
 
-  Statistics Ask() {
+  static Names Sorted(Names names) {
+    std::sort(names.begin(), names.end());
+    return names;
+  }
+
+  Statistics Alike() {
     StatisticsWish wish;
     wish.duplicates = true;
     wish.shares = {TheShare()};
@@ -40,13 +47,44 @@ TEST_F(AlikeFilesTest, AreThoseOfOneSizeAndOneSample) {
   StoreAlike({"b", "a"}, 7);
   StoreAlike({"c"}, 8);
 
-  const Statistics statistics = Ask();
+  const Statistics statistics = Alike();
 
   EXPECT_THAT(statistics.failures, ElementsAre());
   ASSERT_EQ(statistics.duplicates.sets.size(), 1U);
   ASSERT_EQ(statistics.duplicates.sets[0].places.size(), 2U);
   EXPECT_EQ(statistics.duplicates.sets[0].places[0].path, At("a"));
   EXPECT_EQ(statistics.duplicates.sets[0].places[1].path, At("b"));
+}
+
+TEST_F(AlikeFilesTest, WhatCouldNotBeReadAnewIsStillAlike) {
+  StoreAlike({"a", "b"}, 7);
+  OpenContents(2);
+  ASSERT_EQ(Jobs().size(), 2U);
+  ASSERT_TRUE(contents->Fail(JobOf("a").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->Unread(JobOf("b").file, "cannot be read", clock));
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Alike().duplicates.sets.size(), 1U);
+  EXPECT_EQ(Sorted(Hits("is:duplicate")), Names({"a", "b"}));
+}
+
+TEST_F(AlikeFilesTest, WhatWasWrittenToIsNotUntilItIsReadAgain) {
+  StoreAlike({"a", "b"}, 7);
+  const int64_t mtime = ContentsTest::Find("a").mtime / 1'000'000'000;
+  for (const char* name : {"a", "b"}) {
+    SetTime(At(name), mtime);
+    File(name);
+    SetTime(At(name), mtime);
+    Add(name);
+    Commit();
+    TakeIn();
+  }
+  ASSERT_EQ(Jobs().size(), 2U);
+  ASSERT_TRUE(contents->Unread(JobOf("a").file, "cannot be read", clock));
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Hits("is:duplicate"), Names());
+  EXPECT_EQ(Alike().duplicates.sets.size(), 0U);
 }
 
 TEST_F(AlikeFilesTest, EntriesThatCannotBeReadFailTheShareOnce) {
@@ -56,7 +94,7 @@ TEST_F(AlikeFilesTest, EntriesThatCannotBeReadFailTheShareOnce) {
   contents.reset();
   DamageTable(IndexPath("s") + "/" + ENTRIES_FILE, "entries_by_inode");
 
-  EXPECT_THAT(Ask().failures, ElementsAre(HasSubstr(IndexErrorText(IndexError::DAMAGED))));
+  EXPECT_THAT(Alike().failures, ElementsAre(HasSubstr(IndexErrorText(IndexError::DAMAGED))));
 }
 
 }  // namespace

@@ -26,26 +26,11 @@ class ContentSearchTest : public ContentsTest {
     }
   }
 
-  Names Hits(const std::string& text) {
-    question.text = text;
-    question.shares = {"s"};
-    std::string error;
-    EXPECT_TRUE(Ask(question, answer, error)) << error;
-    Names names;
-    for (const Hit& hit : answer.hits) {
-      names.push_back(hit.entry.path.substr(root.size() + 1));
-    }
-    return names;
-  }
-
   Names Sorted(const std::string& text) {
     Names names = Hits(text);
     std::sort(names.begin(), names.end());
     return names;
   }
-
-  Question question;
-  Answer answer;
 };
 
 TEST_F(ContentSearchTest, EachWordMayStandInNameOrContent) {

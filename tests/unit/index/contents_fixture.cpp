@@ -41,6 +41,12 @@ void ContentsTest::OpenContents(int64_t extractor) {
   ASSERT_EQ(error, IndexError::NONE) << IndexErrorText(error);
 }
 
+void ContentsTest::UseSettings() {
+  std::shared_ptr<const Settings> in_force;
+  ASSERT_TRUE(store->GetSettings(in_force));
+  contents->UseSettings(in_force);
+}
+
 void ContentsTest::TakeIn() {
   bool more = true;
   while (more) {
@@ -57,9 +63,27 @@ void ContentsTest::Sweep(int64_t now) {
   ASSERT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
 }
 
-Names ContentsTest::Jobs(size_t limit) {
+Names ContentsTest::NewJobs(size_t limit) {
   std::vector<ContentJob> jobs;
   EXPECT_TRUE(contents->NextJobs(limit, jobs, more_jobs)) << IndexErrorText(contents->Error());
+  return Handed(jobs);
+}
+
+Names ContentsTest::Jobs(size_t limit) {
+  Names names = NewJobs(limit);
+  if (names.size() < limit) {
+    std::vector<ContentJob> jobs;
+    bool more_again = false;
+    EXPECT_TRUE(contents->NextAgain(clock, limit - names.size(), jobs, more_again))
+        << IndexErrorText(contents->Error());
+    more_jobs = more_jobs || more_again;
+    const Names others = Handed(jobs);
+    names.insert(names.end(), others.begin(), others.end());
+  }
+  return names;
+}
+
+Names ContentsTest::Handed(const std::vector<ContentJob>& jobs) {
   Names names;
   for (const ContentJob& job : jobs) {
     EXPECT_FALSE(job.paths.empty());
@@ -103,6 +127,18 @@ Names ContentsTest::Read() {
   const Names names = Jobs();
   for (const std::string& name : names) {
     Finish(name, name);
+  }
+  return names;
+}
+
+Names ContentsTest::Hits(const std::string& text) {
+  question.text = text;
+  question.shares = {"s"};
+  std::string error;
+  EXPECT_TRUE(Ask(question, answer, error)) << error;
+  Names names;
+  for (const Hit& hit : answer.hits) {
+    names.push_back(hit.entry.path.substr(root.size() + 1));
   }
   return names;
 }

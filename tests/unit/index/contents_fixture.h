@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "index/contents_writer.h"
+#include "index/search.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -19,10 +20,12 @@ class ContentsTest : public IndexTest {
 
   Share TheShare();
   void OpenContents(int64_t extractor = 1);  // anew
+  void UseSettings();                        // that are in the store
   void TakeIn();                             // all there is, and commits
   void Sweep(int64_t now);                   // all there is, and commits
-  // Names of what is handed out, in order; each stays handed out.
+  // Names of what is handed out, in order, what is new first; each stays handed out.
   Names Jobs(size_t limit = 100);
+  Names NewJobs(size_t limit = 100);          // of these alone what is new
   ContentJob JobOf(const std::string& name);  // of what was handed out
   // Puts a file there, adds it to the entries, and takes it in.
   void File(const std::string& name, const std::string& bytes = "bytes");
@@ -32,12 +35,17 @@ class ContentsTest : public IndexTest {
   void Finish(const std::string& name, const std::string& text);
   // Hands out all that waits, and finishes each with its own name as its text.
   Names Read();
+  Names Hits(const std::string& text);     // of `question`, with that text
   int64_t Number(const std::string& sql);  // an answer of the contents database
   // How many stored files hold that word.
   int64_t Holding(const std::string& word);
 
+  Question question;
+  Answer answer;
   std::unique_ptr<ContentsWriter> contents;
+  Names Handed(const std::vector<ContentJob>& jobs);
   std::map<std::string, ContentJob> handed;  // by name
+  int64_t clock = 2'000'000'000;             // seconds since the epoch
   bool more_jobs = false;                    // as the last Jobs was told
 };
 

@@ -26,9 +26,7 @@ class ContentsIntakeTest : public ContentsTest {
   // The kinds that the administrator wants from now on.
   void Want(const ContentFlags& flags) {
     ASSERT_TRUE(store->SetFolder(root, flags));
-    std::shared_ptr<const Settings> in_force;
-    ASSERT_TRUE(store->GetSettings(in_force));
-    contents->UseSettings(in_force);
+    UseSettings();
     contents->LookAtAll();
     TakeIn();
   }

@@ -62,6 +62,62 @@ TEST_F(ContentsReaderTest, WhatIsNotReadOrNotWantedWaits) {
   }
 }
 
+TEST_F(ContentsReaderTest, WhatHoldsNothingToKeepIsNoneThatWasRead) {
+  ASSERT_TRUE(store->SetFolder(root, {.document = true}));
+  UseSettings();
+  for (const char* name : {"paper.txt", "prose", "noise", "photo", "torn"}) {
+    File(name);
+  }
+  ASSERT_EQ(Jobs().size(), 5U);
+  Finish("paper.txt", "words");
+  Finish("prose", "words");
+  Content photo;
+  photo.kind = Kind::PHOTO;
+  ASSERT_TRUE(contents->Finish(JobOf("noise").file, Content()));
+  ASSERT_TRUE(contents->Finish(JobOf("photo").file, photo));
+  ASSERT_TRUE(contents->Fail(JobOf("torn").file, "damaged", photo, false));
+  ASSERT_TRUE(contents->Commit());
+
+  ContentsReader reader;
+  ContentCounts counts;
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  ASSERT_TRUE(reader.Count(counts));
+  EXPECT_EQ(counts.all.done, 2U);
+  EXPECT_EQ(counts.all.failed, 0U);
+  EXPECT_EQ(counts.all.waiting, 0U);
+  EXPECT_EQ(counts.not_kept, 3U);
+  EXPECT_EQ(counts.done_last_minute, 2U);
+  EXPECT_EQ(counts.kinds[static_cast<size_t>(Kind::DOCUMENT)].done, 2U);
+  EXPECT_TRUE(reader.ForEachFailed([](const FailedContent&) {
+    ADD_FAILURE();
+    return false;
+  }));
+}
+
+TEST_F(ContentsReaderTest, WhatWasCountedInAnotherWayIsCountedAnew) {
+  File("paper.txt");
+  File("noise");
+  File("next.txt");
+  ASSERT_EQ(Jobs().size(), 3U);
+  Finish("paper.txt", "words");
+  ASSERT_TRUE(contents->Finish(JobOf("noise").file, Content()));
+  ASSERT_TRUE(contents->Commit());
+  contents->Close();
+  Run("sqlite3 " + ContentsPath("s") +
+      "/contents.db 'DROP TABLE later; DELETE FROM counts WHERE kind = 5;"
+      " UPDATE counts SET done = 1 WHERE kind = 0'");
+
+  OpenContents();
+
+  ContentsReader reader;
+  ContentCounts counts;
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  ASSERT_TRUE(reader.Count(counts));
+  EXPECT_EQ(counts.all.done, 1U);
+  EXPECT_EQ(counts.all.waiting, 1U);
+  EXPECT_EQ(counts.not_kept, 1U);
+}
+
 TEST_F(ContentsReaderTest, WhatCannotBeReadIsNoContent) {
   File("a.txt");
   ASSERT_EQ(Read(), Names({"a.txt"}));

@@ -22,6 +22,16 @@ class ContentsWordsTest : public ContentsTest {
     EXPECT_TRUE(reader.Count(counts));
     return counts;
   }
+  // Of words that are made anew; empty where none are.
+  static std::string Progress(const char* language) {
+    ContentsReader reader;
+    std::optional<WordsProgress> words;
+    EXPECT_EQ(reader.Open("s"), IndexError::NONE);
+    EXPECT_TRUE(reader.FindWordsProgress(language, words));
+    return !words ? ""
+                  : words->language + " " + words->wanted + " " + std::to_string(words->done) +
+                        " of " + std::to_string(words->total);
+  }
   // With the contents closed.
   void Change(const char* sql) {
     contents.reset();
@@ -32,7 +42,7 @@ class ContentsWordsTest : public ContentsTest {
   }
 };
 
-TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndWhatIsNewIsFoundMeanwhile) {
+TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndAllIsFoundMeanwhile) {
   std::string text;
   while (text.size() < 700000) {
     text += "houses ";
@@ -44,15 +54,16 @@ TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndWhatIsNewIsFoundMeanwhil
   }
   ASSERT_TRUE(store->SetShareLanguage("s", "german")) << store->Error();
   OpenContents();
-  EXPECT_EQ(Holding("houses"), 0);
+  EXPECT_EQ(Holding("houses"), 4);
+  EXPECT_EQ(Progress("german"), "english german 0 of 4");
 
   bool more = false;
   ASSERT_TRUE(contents->TakeIn(100, more));
   ASSERT_TRUE(contents->Commit());
   EXPECT_TRUE(more);
-  const int64_t held = Holding("houses");
-  EXPECT_GT(held, 0);
-  EXPECT_LT(held, 4);
+  EXPECT_EQ(Holding("houses"), 4);
+  EXPECT_EQ(Holding("house"), 4) << "as in the old language";
+  EXPECT_EQ(Progress("german"), "english german 2 of 4");
   WriteFile(At("new.txt"), "bytes");
   WriteFile(At("d.txt"), "other bytes");
   Add("new.txt");
@@ -64,13 +75,42 @@ TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndWhatIsNewIsFoundMeanwhil
   EXPECT_EQ(Holding("fresh"), 1);
   Finish("d.txt", "anew");
 
-  TakeIn();
   EXPECT_EQ(Holding("houses"), 3);
+  TakeIn();
+  EXPECT_EQ(Progress("german"), "");
+  EXPECT_EQ(Holding("houses"), 3);
+  EXPECT_EQ(Number("SELECT language = 'german' FROM meta"), 1);
   EXPECT_EQ(Holding("fresh"), 1);
   EXPECT_EQ(Holding("anew"), 1);
   EXPECT_EQ(Number("SELECT count(*) FROM texts"), 5);
   File("new.txt", "gone");
   EXPECT_EQ(Holding("fresh"), 0);
+}
+
+TEST_F(ContentsWordsTest, ALanguageThatIsTakenBackLeavesTheWordsAsTheyWere) {
+  const std::string text(700000, ' ');
+  for (const char* name : {"a.txt", "b.txt", "c.txt"}) {
+    File(name);
+    Jobs();
+    Finish(name, "houses" + text + name);
+  }
+  for (const char* language : {"german", "french", "english"}) {
+    bool more = false;
+    ASSERT_TRUE(store->SetShareLanguage("s", language)) << store->Error();
+    OpenContents();
+    ASSERT_TRUE(contents->TakeIn(100, more));
+    ASSERT_TRUE(contents->Commit());
+    EXPECT_EQ(Holding("house"), 3) << language;
+    File("b.txt", language);
+    Jobs();
+    Finish("b.txt", "houses");
+  }
+  TakeIn();
+
+  EXPECT_EQ(Holding("house"), 3);
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name LIKE 'new_words%'"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name LIKE 'old_words%'"), 0);
+  EXPECT_EQ(Progress("english"), "");
 }
 
 TEST_F(ContentsWordsTest, WordsAreMadeAnewOnceForALanguageThatIsNotKnown) {
@@ -157,9 +197,14 @@ TEST_F(ContentsWordsTest, OldWordsAreTakenAwaySliceBySlice) {
   ASSERT_TRUE(store->SetShareLanguage("s", "german")) << store->Error();
 
   OpenContents();
+  bool more = true;
+  while (Number("SELECT count(*) FROM sqlite_master WHERE name = 'old_words'") == 0) {
+    ASSERT_TRUE(contents->TakeIn(100, more)) << IndexErrorText(contents->Error());
+    ASSERT_TRUE(contents->Commit());
+    ASSERT_TRUE(more);
+  }
   int64_t left = Number("SELECT count(*) FROM old_words_data");
   EXPECT_GT(left, 600);
-  bool more = true;
   while (more) {
     ASSERT_TRUE(contents->TakeIn(100, more)) << IndexErrorText(contents->Error());
     ASSERT_TRUE(contents->Commit());

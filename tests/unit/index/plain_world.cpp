@@ -188,7 +188,7 @@ void PlainWorld::MakeContent(PlainFile& file) {
   content.kind =
       file.entry.kind != Kind::OTHER ? file.entry.kind : static_cast<Kind>(chance.Below(5));
   content.sample = chance.OneOf(3) ? 0 : chance.Below(30);
-  if (file.stage == PlainStage::DONE && content.sample != 0 && file.entry.size != 0) {
+  if (content.sample != 0 && file.entry.size != 0) {
     sampled[{file.share, file.entry.size, content.sample}].insert(file.entry.inode);
   }
   const Line text = Words(8, " ");
@@ -226,7 +226,7 @@ void PlainWorld::MakeContent(PlainFile& file) {
 
 bool PlainWorld::HasTwin(const PlainFile& file) const {
   const auto same = sampled.find({file.share, file.entry.size, file.content.sample});
-  return file.stage == PlainStage::DONE && same != sampled.end() && same->second.size() > 1;
+  return file.WasRead() && same != sampled.end() && same->second.size() > 1;
 }
 
 void PlainWorld::Store() {

@@ -221,6 +221,41 @@ TEST_F(ContentLoopTest, SharesTakeTurns) {
   EXPECT_THAT(Running(), testing::Not(ElementsAre("a1", "a2", "a3", "b1")));
 }
 
+TEST_F(ContentLoopTest, WhatIsReadAgainWaitsForWhatIsNewInAnyShare) {
+  StartDaemon();
+  ASSERT_TRUE(store->SetPause(0));
+  AddShare("a", 3);
+  for (auto& [row, file] : Scripted("a").entries) {
+    file.is_old = true;
+  }
+  AddShare("b", 2);
+  Pool().room = 1;
+  ASSERT_TRUE(store->ClearPause(0));
+  Settle();
+
+  std::vector<std::string> read;
+  while (!Running().empty()) {
+    read.push_back(Running().front());
+    Pool().End(Result::DONE, "words");
+    Settle();
+  }
+  EXPECT_EQ(read, (std::vector<std::string>{"b1", "b2", "a1", "a2", "a3"}));
+}
+
+TEST_F(ContentLoopTest, WhatIsReadAgainLeavesHelpersToWhatIsNew) {
+  StartDaemon();
+  AddShare("a", 3);
+  for (auto& [row, file] : Scripted("a").entries) {
+    file.is_old = true;
+  }
+  Settle();
+  EXPECT_THAT(Running(), ElementsAre("a1"));
+
+  AddShare("b", 1);
+  Settle();
+  EXPECT_THAT(Running(), ElementsAre("a1", "b1"));
+}
+
 TEST_F(ContentLoopTest, SharesWhoseFilesAreBeingReadHaveTheirPartOfTheRoom) {
   StartDaemon();
   Pool().room = 1000;
@@ -283,7 +318,8 @@ TEST_F(ContentLoopTest, ADiskThatDoesNotGiveAFileHoldsNobodyUp) {
   Pool().End(Result::DONE, "words");
   Settle();
   Pass(seconds(5));
-  EXPECT_THAT(Running(), ElementsAre("a1"));
+  EXPECT_THAT(Running(), ElementsAre());
+  EXPECT_EQ(Scripted("a").kept[1].state, ScriptedFile::State::UNREAD);
 }
 
 TEST_F(ContentLoopTest, AMissingHelperIsTriedAgainLater) {

@@ -89,9 +89,10 @@ TEST_F(OpenFileTest, OnlyWhatTheFileIsToBlameForIsRefused) {
   const std::pair<Opening, std::vector<int>> cases[] = {
       {Opening::REFUSED, {EACCES, EPERM, EFBIG, EOVERFLOW}},
       {Opening::CHANGED, {ENOENT, ENOTDIR, ELOOP, ENAMETOOLONG, ESTALE, ENXIO, EAGAIN}},
-      {Opening::LATER,
-       {EIO, ENOTCONN, ETIMEDOUT, EHOSTDOWN, EHOSTUNREACH, ENODEV, ENOMEM, EMFILE, ENFILE, EINTR,
-        ECONNREFUSED, EKEYEXPIRED, EREMOTEIO, EUCLEAN}},
+      {Opening::UNREAD,
+       {EIO, ENOTCONN, ETIMEDOUT, EHOSTDOWN, EHOSTUNREACH, ENODEV, ECONNREFUSED, EKEYEXPIRED,
+        EREMOTEIO, EUCLEAN}},
+      {Opening::LATER, {ENOMEM, ENOBUFS, EMFILE, ENFILE, EINTR}},
   };
   for (const auto& [opening, errors] : cases) {
     for (const int error : errors) {

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // A contents database that a test fills and looks at, in the place of the real writer.
 //
-// What is written stands in `now` until a commit makes it `kept`; an opening begins with what was
-// kept, where what failed with an older extractor waits. And a pool whose helpers do what the test
-// says, and openers that have no thread. One thread.
+// What is unread is due after a minute. What is written stands in `now` until a commit makes it
+// `kept`; an opening begins with what was kept, where what failed with an older extractor waits.
+// And a pool whose helpers do what the test says, and openers that have no thread. One thread.
 #pragma once
 
 #include <cstdint>
@@ -17,8 +17,10 @@
 
 namespace fileindexd {
 
+constexpr int64_t UNREAD_PAUSE = 60;  // seconds
+
 struct ScriptedFile {
-  enum class State { WAITS, DONE, FAILED };
+  enum class State { WAITS, DONE, FAILED, UNREAD };
   ContentJob job;
   State state = State::WAITS;
   int64_t tries = 0;                      // begun, not taken back
@@ -26,6 +28,8 @@ struct ScriptedFile {
   std::string found;                      // text, in spite of that
   int64_t extractor = EXTRACTOR_VERSION;  // that failed
   bool is_prepared = false;
+  bool is_old = false;  // what waits was read by older readers
+  int64_t due = 0;      // of an unread one
 };
 
 struct ScriptedContents {

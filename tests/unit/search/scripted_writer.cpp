@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <set>
 #include <utility>
 
@@ -26,6 +27,17 @@ struct ContentsWriter::Impl {
       return false;
     }
     return true;
+  }
+
+  // Those that fulfil the condition, and are not out.
+  template <typename Condition>
+  void Offer(size_t limit, std::vector<ContentJob>& jobs, const Condition& is_offered) {
+    for (const auto& [row, file] : contents->now) {
+      if (jobs.size() < limit && is_offered(file) && out.insert(row).second) {
+        jobs.push_back(file.job);
+        jobs.back().file = row;
+      }
+    }
   }
 
   bool End(const char* name, int64_t file, ScriptedFile::State state, const std::string& text) {
@@ -127,15 +139,40 @@ bool ContentsWriter::NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool&
   if (!impl->Call("NextJobs", std::to_string(limit))) {
     return false;
   }
-  for (const auto& [row, file] : impl->contents->now) {
-    if (jobs.size() < limit && file.state == ScriptedFile::State::WAITS &&
-        impl->out.insert(row).second) {
-      jobs.push_back(file.job);
-      jobs.back().file = row;
-    }
-  }
+  impl->Offer(limit, jobs, [](const ScriptedFile& file) {
+    return file.state == ScriptedFile::State::WAITS && !file.is_old;
+  });
   more = jobs.size() >= limit;
   return true;
+}
+
+bool ContentsWriter::NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs,
+                               bool& more) {
+  if (!impl->Call("NextAgain")) {
+    return false;
+  }
+  impl->Offer(limit, jobs, [now](const ScriptedFile& file) {
+    return file.state == ScriptedFile::State::UNREAD
+               ? file.due <= now
+               : file.state == ScriptedFile::State::WAITS && file.is_old;
+  });
+  more = jobs.size() >= limit;
+  return true;
+}
+
+int64_t ContentsWriter::UnreadDue() const {
+  int64_t due = INT64_MAX;
+  for (const auto& [row, file] : impl->contents->now) {
+    if (file.state == ScriptedFile::State::UNREAD && !impl->out.contains(row)) {
+      due = std::min(due, file.due);
+    }
+  }
+  return due;
+}
+
+bool ContentsWriter::Unread(int64_t file, const std::string& reason, int64_t now) {
+  impl->contents->now[file].due = now + UNREAD_PAUSE;
+  return impl->End("Unread", file, ScriptedFile::State::UNREAD, reason);
 }
 
 bool ContentsWriter::BeginTries(const std::vector<int64_t>& files) {
@@ -167,7 +204,7 @@ bool ContentsWriter::Release(int64_t file) {
 
 bool ContentsWriter::RetryFailed() {
   for (auto& [row, file] : impl->contents->now) {
-    if (file.state == ScriptedFile::State::FAILED) {
+    if (file.state != ScriptedFile::State::DONE) {
       file.state = ScriptedFile::State::WAITS;
     }
   }

@@ -22,6 +22,8 @@ constexpr int64_t WALL = 1'900'000'000;
 
 class ShareContentsTest : public StateTest {
  protected:
+  using Turn = ShareContents::Turn;
+
   ShareContentsTest() : root(folder + "/share"), contents({"a", root, ""}) {
     ForgetScripted();
     std::filesystem::create_directory(root);
@@ -44,12 +46,16 @@ class ShareContentsTest : public StateTest {
   // Works until the share waits for something else than its next slice.
   void Settle() {
     for (int slices = 0; slices < 100 && contents.Due() <= now; ++slices) {
-      contents.Work(now, WALL);
+      contents.Work(now, Wall());
     }
   }
   void Pass(std::chrono::milliseconds time) {
     now += time;
     Settle();
+  }
+  // The clock on the wall goes along.
+  int64_t Wall() const {
+    return WALL + std::chrono::duration_cast<std::chrono::seconds>(now - BEGIN).count();
   }
   // Second by second, with nothing to read.
   void Wait(int seconds_long) {
@@ -66,7 +72,8 @@ class ShareContentsTest : public StateTest {
     std::vector<uint64_t> ids;
     while (ids.size() < most) {
       ExtractJob job;
-      if (!contents.Next(now, last_id + 1, job)) {
+      if (!contents.Next(Turn::NEW, now, last_id + 1, job) &&
+          !contents.Next(Turn::AGAIN, now, last_id + 1, job)) {
         break;
       }
       ids.push_back(++last_id);
@@ -93,7 +100,8 @@ class ShareContentsTest : public StateTest {
 
   std::string root;
   ShareContents contents;
-  Time now = Time(std::chrono::hours(1));
+  static constexpr Time BEGIN{std::chrono::hours(1)};
+  Time now = BEGIN;
   uint64_t last_id = 0;
   std::vector<std::string> names;
 };

@@ -15,7 +15,7 @@ TEST_F(ShareContentsTest, ItAsksAgainWhileMoreMayWait) {
   Settle();
   EXPECT_THAT(GiveOut(), IsEmpty());
 
-  EXPECT_TRUE(contents.MayHaveJobs(now));
+  EXPECT_TRUE(contents.MayHaveJobs(Turn::NEW, now));
   EXPECT_EQ(GiveOut().size(), 1U);
 }
 
@@ -38,7 +38,7 @@ TEST_F(ShareContentsTest, AMissingRootIsNotTakenForMissingFiles) {
   std::filesystem::rename(root, root + ".away");
 
   EXPECT_THAT(GiveOut(), IsEmpty());
-  EXPECT_FALSE(contents.MayHaveJobs(now));  // rests
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));  // rests
   std::filesystem::rename(root + ".away", root);
   Pass(seconds(100));
 
@@ -121,7 +121,7 @@ TEST_F(ShareContentsTest, AFileThatWasReadHasLostNoPatience) {
     Settle();
     auto ids = GiveOut();
     ASSERT_EQ(ids.size(), 1U);
-    End(ids[0], ExtractOutcome::Result::UNREAD);
+    End(ids[0], ExtractOutcome::Result::LOST);
     Pass(milliseconds(500));
 
     (void)GiveOut();

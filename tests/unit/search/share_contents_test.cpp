@@ -164,28 +164,61 @@ TEST_F(ShareContentsTest, WhatFailedWithAnOlderExtractorIsReadAnew) {
   EXPECT_EQ(names, std::vector<std::string>{"f2"});
 }
 
-TEST_F(ShareContentsTest, WhatTheHostOrItsDiskTookCostsNoTryAndIsReadLater) {
-  for (const auto result : {ExtractOutcome::Result::LOST, ExtractOutcome::Result::UNREAD}) {
-    const int64_t row = static_cast<int64_t>(result) + 1;
+TEST_F(ShareContentsTest, WhatTheHostTookCostsNoTryAndIsReadLater) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+
+  End(ids[0], ExtractOutcome::Result::LOST);
+  Pass(milliseconds(500));
+  EXPECT_EQ(Kept(1).tries, 0);
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
+  (void)GiveOut();
+  Pass(seconds(3));
+
+  const auto again = GiveOut();
+  ASSERT_EQ(again.size(), 1U);
+  End(again[0], ExtractOutcome::Result::DONE);
+  Pass(seconds(1));
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+}
+
+TEST_F(ShareContentsTest, WhatTheDiskDidNotGiveIsSaidAndReadWhenItIsDue) {
+  AddFile(1);
+  Settle();
+  const auto ids = GiveOut();
+  ASSERT_EQ(ids.size(), 1U);
+
+  End(ids[0], ExtractOutcome::Result::UNREAD);
+  Pass(milliseconds(500));
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::UNREAD);
+  EXPECT_EQ(Kept(1).text, "the reason");
+  Wait(UNREAD_PAUSE - 10);
+  EXPECT_GT(Count("Close"), 0U) << "the databases are not held open for it";
+  Pass(seconds(12));
+
+  const auto again = GiveOut();
+  ASSERT_EQ(again.size(), 1U);
+  End(again[0], ExtractOutcome::Result::DONE);
+  Pass(seconds(1));
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+}
+
+TEST_F(ShareContentsTest, WhatIsReadAgainDoesNotStandInTheWayOfWhatIsNew) {
+  for (int64_t row = 1; row <= 3; ++row) {
     AddFile(row);
-    contents.EntriesChanged();
-    Pass(seconds(1));
-    const auto ids = GiveOut();
-    ASSERT_EQ(ids.size(), 1U);
-
-    End(ids[0], result);
-    Pass(milliseconds(500));
-    EXPECT_EQ(Kept(row).tries, 0);
-    EXPECT_EQ(Kept(row).state, ScriptedFile::State::WAITS);
-    (void)GiveOut();
-    Pass(seconds(3));
-
-    const auto again = GiveOut();
-    ASSERT_EQ(again.size(), 1U);
-    End(again[0], ExtractOutcome::Result::DONE);
-    Pass(seconds(1));
-    EXPECT_EQ(Kept(row).state, ScriptedFile::State::DONE);
+    Scripted().entries[row].is_old = true;
   }
+  Settle();
+  EXPECT_EQ(GiveOut(1).size(), 1U);
+  AddFile(4);
+  contents.EntriesChanged();
+  Pass(seconds(1));
+
+  EXPECT_TRUE(contents.IsNewWaiting(now));
+  EXPECT_EQ(GiveOut().size(), 3U);
+  EXPECT_EQ(names, (std::vector<std::string>{"f1", "f4", "f2", "f3"}));
 }
 
 TEST_F(ShareContentsTest, AHaltTakesBackWhatIsGivenOut) {
@@ -230,9 +263,9 @@ TEST_F(ShareContentsTest, AFailureAtAnyCallLosesNothing) {
     ShareContents fresh({"a", root, ""});
     const auto run = [&] {
       for (int round = 0; round < 20; ++round, now += seconds(2)) {
-        fresh.Work(now, WALL);
+        fresh.Work(now, Wall());
         ExtractJob job;
-        if (fresh.Next(now, ++last_id, job)) {
+        if (fresh.Next(Turn::NEW, now, ++last_id, job)) {
           ExtractOutcome outcome;
           outcome.id = last_id;
           outcome.result = ExtractOutcome::Result::DONE;
@@ -257,11 +290,11 @@ TEST_F(ShareContentsTest, AnEndMayLetAnotherFileGo) {
   Settle();
   const auto ids = GiveOut();
   ASSERT_EQ(ids.size(), 1U);
-  ASSERT_FALSE(contents.MayHaveJobs(now));
+  ASSERT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
 
   End(ids[0], ExtractOutcome::Result::DONE);
 
-  EXPECT_TRUE(contents.MayHaveJobs(now));
+  EXPECT_TRUE(contents.MayHaveJobs(Turn::NEW, now));
 }
 
 TEST_F(ShareContentsTest, NothingIsSweptWhileTheEntriesAreMadeAnew) {
@@ -301,7 +334,7 @@ TEST_F(ShareContentsTest, WhatComesMeanwhileIsReadBeforeTheMergingGoesOn) {
   Scripted().unmerged = 1000;
   Settle();
   (void)GiveOut();
-  contents.Work(now, WALL);
+  contents.Work(now, Wall());
   EXPECT_EQ(Count("Merge"), 1U);
 
   AddFile(1);
@@ -318,7 +351,7 @@ TEST_F(ShareContentsTest, AFileSystemThatDoesNotAnswerLetsItsShareRest) {
   Settle();
   FilesystemHangs() = true;
   EXPECT_THAT(GiveOut(), IsEmpty());
-  EXPECT_FALSE(contents.MayHaveJobs(now));
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
 
   Pass(seconds(9));
   EXPECT_EQ(Count("Close"), 0U);
@@ -328,7 +361,7 @@ TEST_F(ShareContentsTest, AFileSystemThatDoesNotAnswerLetsItsShareRest) {
   Pass(seconds(1));
   EXPECT_EQ(Count("Open"), 1U) << "its root does not answer either";
   FilesystemHangs() = false;
-  contents.Work(now, WALL);
+  contents.Work(now, Wall());
   Settle();
   EXPECT_THAT(GiveOut(), Not(IsEmpty()));
 }
@@ -380,14 +413,14 @@ TEST_F(ShareContentsTest, ItTakesRoomUntilAllIsWrittenDown) {
   Settle();
   FilesystemHangs() = true;
   EXPECT_THAT(GiveOut(), IsEmpty());
-  EXPECT_FALSE(contents.MayHaveJobs(now));
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
   EXPECT_TRUE(contents.TakesRoom(now)) << "files are being opened";
 
   FilesystemHangs() = false;
-  contents.Work(now, WALL);
+  contents.Work(now, Wall());
   const std::vector<uint64_t> ids = GiveOut();
   ASSERT_EQ(ids.size(), 2U);
-  EXPECT_FALSE(contents.MayHaveJobs(now));
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
   EXPECT_TRUE(contents.TakesRoom(now)) << "they are being read";
   for (const uint64_t id : ids) {
     End(id, ExtractOutcome::Result::DONE);

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "tests/unit/extract/behind_doors.h"
 #include "tests/unit/extract/documents/fixture.h"
 #include "tests/unit/extract/documents/packing.h"
 
@@ -91,6 +92,22 @@ TEST(OdfTest, SheetsAndSlidesAreReadByTheirEndings) {
     ExpectFields(reading);
     ExpectSurvivesDamage(ReadDocument, row.name, bytes);
   }
+}
+
+TEST(OdfTest, RepeatedCellsAreReadOnce) {
+  const std::string bytes = Zipped(
+      {{"mimetype", "application/vnd.oasis.opendocument.spreadsheet"},
+       {"content.xml",
+        std::string("<office:document-content") + NAMES +
+            "><office:body><office:spreadsheet><table:table table:name=\"Dues\">"
+            "<table:table-row table:number-rows-repeated=\"1048576\">"
+            "<table:table-cell table:number-columns-repeated=\"1000000\"><text:p>quay</text:p>"
+            "</table:table-cell><table:table-cell "
+            "table:number-columns-repeated=\"4000000000\"/></table:table-row></table:table>"
+            "</office:spreadsheet></office:body></office:document-content>"}});
+
+  EXPECT_EQ(ReadBytes(ReadOfficeZip, "a.ods", bytes).content.text, "Dues quay");
+  ExpectSameBehindDoors("a.ods", bytes);
 }
 
 TEST(OdfTest, TheFlatFormIsReadAlike) {

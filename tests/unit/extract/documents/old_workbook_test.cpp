@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/converters.h"
+#include "extract/workbook_records.h"
 #include "tests/unit/extract/documents/compound.h"
 #include "tests/unit/extract/documents/fixture.h"
 
@@ -94,6 +95,30 @@ TEST(OldWorkbookTest, FilesWithoutACompoundFileAroundThemAreRead) {
     EXPECT_EQ(reading.content.text, row.text);
     EXPECT_EQ(ReadBytes(ReadOldOffice, "a.xls", row.bytes, {1}).content.text, row.text);
   }
+}
+
+TEST(OldWorkbookTest, LettersOfAnUnknownCodePageAreWestern) {
+  const Reading reading = ReadBytes(
+      ReadOldOffice, "a.xls",
+      BookFile(Codepage(59999) + Record(0x204, CELL + Long("harb\xf6ur")) + Record(0x0A, "")));
+
+  EXPECT_EQ(reading.content.text, "harb\u00f6ur");
+}
+
+TEST(OldWorkbookTest, PiecesOfARecordAreBounded) {
+  constexpr size_t MANY = 1 << 20;
+  std::string records = Record(0x204, "label");
+  for (size_t i = 0; i < MANY; ++i) {
+    records += Record(0x3C, i % 4 == 0 ? "x" : "");
+  }
+  records += Record(0x204, "behind");
+  ContentSink sink(1 << 20);
+  WorkbookRecords reader(records, sink);
+
+  ASSERT_TRUE(reader.Next());
+  EXPECT_LE(reader.views.size(), WorkbookRecords::MOST_VIEWS);
+  ASSERT_TRUE(reader.Next());
+  EXPECT_EQ(reader.views.front(), "behind");
 }
 
 TEST(OldWorkbookTest, LettersAreThoseOfTheCodePage) {

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "extract/choice.h"
+#include "tests/unit/extract/behind_doors.h"
 #include "tests/unit/extract/documents/fixture.h"
 #include "tests/unit/extract/documents/packing.h"
 
@@ -121,6 +122,21 @@ TEST(OoxmlTest, StringsNumbersAndNamesOfSheetsAreFound) {
   ASSERT_TRUE(reading.is_good) << reading.why;
   EXPECT_EQ(reading.content.text, "Dues sh ared 42.5 in place made");
   EXPECT_EQ(reading.Text(ContentField::SUBJECT), "Harbour");
+}
+
+TEST(OoxmlTest, HugePlacesOfCellsCostNothing) {
+  const std::string bytes = Zipped(
+      {{"xl/worksheets/sheet1.xml",
+        "<worksheet><dimension ref=\"A1:XFD1048576\"/><cols><col min=\"1\" max=\"4000000000\"/>"
+        "</cols><sheetData><row r=\"1048576\" spans=\"1:1000000\"><c r=\"XFD1048576\" "
+        "t=\"inlineStr\"><is><t>quay</t></is></c><c r=\"ZZZZZZZ4000000000\" t=\"s\">"
+        "<v>4000000000</v></c></row></sheetData><mergeCells><mergeCell "
+        "ref=\"A1:XFD1048576\"/></mergeCells></worksheet>"},
+       {"xl/sharedStrings.xml",
+        "<sst count=\"4000000000\" uniqueCount=\"4000000000\"><si><t>shared</t></si></sst>"}});
+
+  EXPECT_EQ(ReadBytes(ReadOfficeZip, "a.xlsx", bytes).content.text, "shared quay");
+  ExpectSameBehindDoors("a.xlsx", bytes);
 }
 
 TEST(OoxmlTest, ATableOfNumbersHidesNoWords) {

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <vector>
 
+#include "tests/unit/extract/behind_doors.h"
 #include "tests/unit/extract/documents/fixture.h"
 
 namespace fileindexd {
@@ -131,6 +132,39 @@ TEST(PdfTest, PagesThatHoldThemselvesEnd) {
 
   EXPECT_FALSE(reading.is_good);
   EXPECT_EQ(reading.why, "damaged");
+}
+
+TEST(PdfTest, PagesOfAnySizeCostNothing) {
+  for (const char* box : {"0 0 1000000000 1000000000", "-1e30 -1e30 1e30 1e30", "0 0 0 0",
+                          "2147483647 2147483647 -2147483648 -2147483648"}) {
+    std::string page = PageOf(5);
+    page.replace(page.find("0 0 400 400"), 11, box);
+    const std::string pdf =
+        PdfOf({"<< /Type /Catalog /Pages 2 0 R >>", "<< /Type /Pages /Kids [4 0 R] /Count 1 >>",
+               FONT, page, Stream("BT /F 12 Tf 20 300 Td (alone) Tj ET"), INFO});
+    const Reading reading = ReadBytes(ReadPdf, "a.pdf", pdf);
+
+    EXPECT_TRUE(reading.is_good) << box << ": " << reading.why;
+    EXPECT_EQ(reading.Text(ContentField::TITLE), "Harbour dues") << box;
+    ExpectSameBehindDoors("a.pdf", pdf);
+  }
+}
+
+// The font names a table of characters, which is a file of the library's own.
+TEST(PdfTest, LettersOfTheEastAreFoundByTheirTablesBehindTheDoorsToo) {
+  const std::string pdf =
+      PdfOf({"<< /Type /Catalog /Pages 2 0 R >>", "<< /Type /Pages /Kids [4 0 R] /Count 1 >>",
+             "<< /Type /Font /Subtype /Type0 /BaseFont /HeiseiMin-W3 /Encoding /90ms-RKSJ-H"
+             " /DescendantFonts [6 0 R] >>",
+             PageOf(5), Stream("BT /F 12 Tf 20 300 Td <938C8B9E> Tj ET"),
+             "<< /Type /Font /Subtype /CIDFontType0 /BaseFont /HeiseiMin-W3 /FontDescriptor 7 0 R"
+             " /CIDSystemInfo << /Registry (Adobe) /Ordering (Japan1) /Supplement 2 >> >>",
+             "<< /Type /FontDescriptor /FontName /HeiseiMin-W3 /Flags 4 /FontBBox [0 -136 1000 859]"
+             " /ItalicAngle 0 /Ascent 859 /Descent -140 /CapHeight 709 /StemV 80 >>",
+             INFO});
+
+  EXPECT_EQ(ReadBytes(ReadPdf, "a.pdf", pdf).content.text, "\u6771\u4eac");
+  ExpectSameBehindDoors("a.pdf", pdf);
 }
 
 TEST(PdfTest, DamageIsSurvived) {

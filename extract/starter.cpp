@@ -1,0 +1,221 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/starter.h"
+
+#include <pthread.h>
+#include <sched.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <condition_variable>
+#include <csignal>
+#include <cstring>
+#include <mutex>
+#include <system_error>
+#include <thread>
+#include <utility>
+
+#include "extract/error_text.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr std::chrono::seconds PATIENCE(10);
+constexpr size_t MOST_FILES = 3;
+
+std::vector<int> Those(const ChildFiles& files) {
+  std::vector<int> there;
+  for (const int file : {files.input, files.output, files.socket}) {
+    if (file >= 0) {
+      there.push_back(file);
+    }
+  }
+  return there;
+}
+
+// In the place of those that are there, others, in the same order.
+ChildFiles InPlace(const ChildFiles& files, const std::vector<ScopedFd>& others) {
+  ChildFiles placed = files;
+  size_t next = 0;
+  for (int* file : {&placed.input, &placed.output, &placed.socket}) {
+    if (*file >= 0) {
+      *file = next < others.size() ? others[next++].fd : -1;
+    }
+  }
+  return placed;
+}
+
+// Along with a byte.
+bool SendFiles(int socket, const std::vector<int>& files) {
+  char byte = 0;
+  iovec bytes = {&byte, 1};
+  alignas(cmsghdr) char control[CMSG_SPACE(MOST_FILES * sizeof(int))] = {};
+  msghdr message = {};
+  message.msg_iov = &bytes;
+  message.msg_iovlen = 1;
+  if (!files.empty()) {
+    const size_t size = files.size() * sizeof(int);
+    message.msg_control = control;
+    message.msg_controllen = CMSG_SPACE(size);
+    cmsghdr* head = CMSG_FIRSTHDR(&message);
+    head->cmsg_level = SOL_SOCKET;
+    head->cmsg_type = SCM_RIGHTS;
+    head->cmsg_len = CMSG_LEN(size);
+    memcpy(CMSG_DATA(head), files.data(), size);
+  }
+  return sendmsg(socket, &message, MSG_NOSIGNAL) == 1;
+}
+
+// But for the standard ones. The asker's end among them: or its closing would never be seen. Files
+// that are closed by others later would not be closed, and locks are none of this table's.
+void CloseOthers(int kept) {
+  const auto first = static_cast<unsigned>(STDERR_FILENO) + 1;
+  const auto number = static_cast<unsigned>(kept);
+  if (number > first) {
+    (void)close_range(first, number - 1, 0);
+  }
+  (void)close_range(std::max(number + 1, first), ~0U, 0);
+}
+
+// False at the end.
+bool ReceiveFiles(int socket, std::vector<ScopedFd>& files) {
+  char byte = 0;
+  iovec bytes = {&byte, 1};
+  alignas(cmsghdr) char control[CMSG_SPACE(MOST_FILES * sizeof(int))] = {};
+  msghdr message = {};
+  message.msg_iov = &bytes;
+  message.msg_iovlen = 1;
+  message.msg_control = control;
+  message.msg_controllen = sizeof(control);
+  if (recvmsg(socket, &message, MSG_CMSG_CLOEXEC) <= 0) {  // all signals are blocked
+    return false;
+  }
+
+  const cmsghdr* head = CMSG_FIRSTHDR(&message);
+  const size_t count = head == nullptr ? 0 : (head->cmsg_len - CMSG_LEN(0)) / sizeof(int);
+  std::vector<ScopedFd> received(count);
+  for (size_t i = 0; i < count; ++i) {
+    memcpy(&received[i].fd, CMSG_DATA(head) + i * sizeof(int), sizeof(int));
+  }
+  files.swap(received);
+  return true;
+}
+
+}  // namespace
+
+// All under the mutex.
+struct Starter::Shared {
+  enum class Stage { OPENING, FREE, STARTING, STARTED };
+  std::mutex mutex;
+  std::condition_variable ended;
+  Stage stage = Stage::OPENING;
+  std::string program;
+  std::vector<std::string> arguments;
+  ChildFiles files;   // as the asker calls them
+  pid_t pid = -1;     // STARTED: -1 where it could not be
+  std::string error;  // then; and of an opening that failed
+
+  void End(Stage next, pid_t started, std::string why) {
+    const std::lock_guard lock(mutex);
+    stage = next;
+    pid = started;
+    error = std::move(why);
+    ended.notify_one();
+  }
+};
+
+void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
+  sigset_t all;
+  sigfillset(&all);
+  (void)pthread_sigmask(SIG_BLOCK, &all, nullptr);
+  if (unshare(CLONE_FILES) != 0) {
+    shared->End(Shared::Stage::FREE, -1, "unshare: " + ErrorText(errno));
+    return;
+  }
+  const ScopedFd socket(asked);
+  CloseOthers(asked);
+  shared->End(Shared::Stage::FREE, -1, "");
+
+  std::vector<ScopedFd> files;
+  while (ReceiveFiles(socket.fd, files)) {
+    std::unique_lock lock(shared->mutex);
+    const std::string program = shared->program;
+    std::vector<std::string> arguments = shared->arguments;
+    const ChildFiles placed = InPlace(shared->files, files);
+    lock.unlock();
+
+    pid_t pid = -1;
+    std::string error;
+    (void)SpawnChild(program, std::move(arguments), placed, pid, error);
+    shared->End(Shared::Stage::STARTED, pid, error);
+    files.clear();  // closing is asking, too
+  }
+}
+
+Starter::~Starter() {
+  asking.Close();  // the thread ends, now or when it comes back
+}
+
+bool Starter::Open(std::string& error) {
+  int ends[2] = {-1, -1};
+  if (socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
+    error = "socket: " + ErrorText(errno);
+    return false;
+  }
+  ScopedFd ours(ends[0]);
+  const ScopedFd theirs(ends[1]);  // here; the thread has its own
+  const auto made = std::make_shared<Shared>();
+  try {
+    std::thread(Run, made, theirs.fd).detach();
+  } catch (const std::system_error&) {
+    error = "no thread can be had";
+    return false;
+  }
+  std::unique_lock lock(made->mutex);
+  made->ended.wait(lock, [&] { return made->stage != Shared::Stage::OPENING; });
+  if (!made->error.empty()) {
+    error = made->error;
+    return false;
+  }
+  shared = made;
+  asking.Swap(ours);
+  return true;
+}
+
+bool Starter::Start(const std::string& program, std::vector<std::string> arguments,
+                    const ChildFiles& files, Child& child, std::string& error) {
+  std::unique_lock lock(shared->mutex);
+  if (shared->stage == Shared::Stage::STARTED && shared->pid > 0) {  // it came too late
+    (void)kill(shared->pid, SIGKILL);
+    (void)waitpid(shared->pid, nullptr, 0);
+    shared->pid = -1;
+  }
+  if (shared->stage != Shared::Stage::STARTING) {
+    shared->stage = Shared::Stage::STARTING;
+    shared->program = program;
+    shared->arguments = std::move(arguments);
+    shared->files = files;
+    if (!SendFiles(asking.fd, Those(files))) {
+      shared->stage = Shared::Stage::FREE;
+      error = program + ": " + ErrorText(errno);
+      return false;
+    }
+    shared->ended.wait_for(lock, PATIENCE,
+                           [this] { return shared->stage == Shared::Stage::STARTED; });
+  }
+  if (shared->stage == Shared::Stage::STARTING) {
+    error = program + ": does not start";
+    return false;
+  }
+
+  shared->stage = Shared::Stage::FREE;
+  error = shared->error;
+  const pid_t pid = std::exchange(shared->pid, -1);
+  return pid > 0 && WatchChild(pid, program, child, error);
+}
+
+}  // namespace fileindexd

@@ -1,0 +1,10 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// By what the content service is known to others.
+#pragma once
+
+namespace fileindexd {
+
+constexpr const char* SERVICE_PROGRAM = "talocontentsearchd";
+constexpr const char* SERVICE_PID_FILE = "/var/run/talocontentsearchd.pid";
+
+}  // namespace fileindexd

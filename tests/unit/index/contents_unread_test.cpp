@@ -1,0 +1,183 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Files whose bytes the disk does not give.
+#include <gmock/gmock.h>
+
+#include <ctime>
+
+#include "index/contents_reader.h"
+#include "state/layout.h"
+#include "tests/unit/index/contents_fixture.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr int64_t HOUR = 3600;
+
+class ContentsUnreadTest : public ContentsTest {
+ protected:
+  void Unread(const std::string& name) {
+    ASSERT_TRUE(contents->BeginTries({JobOf(name).file}));
+    ASSERT_TRUE(contents->Unread(JobOf(name).file, "cannot be read", clock));
+    ASSERT_TRUE(contents->Commit());
+  }
+  // Waits until the next one is due: for how long.
+  int64_t Pass() {
+    const int64_t pause = contents->UnreadDue() - clock;
+    clock += pause;
+    return pause;
+  }
+  static std::vector<FailedContent> Listed() {
+    std::vector<FailedContent> listed;
+    ContentsReader reader;
+    EXPECT_EQ(reader.Open("s"), IndexError::NONE);
+    EXPECT_TRUE(reader.ForEachFailed([&](const FailedContent& failed) {
+      listed.push_back(failed);
+      return true;
+    }));
+    return listed;
+  }
+};
+
+}  // namespace
+
+TEST_F(ContentsUnreadTest, ItIsListedAndCountedAndHoldsNothingUp) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+
+  const std::vector<FailedContent> listed = Listed();
+  ASSERT_EQ(listed.size(), 1U);
+  EXPECT_EQ(listed[0].reason, "cannot be read");
+  EXPECT_EQ(listed[0].tries, 1);
+  EXPECT_EQ(Number("SELECT waiting * 10 + failed FROM counts WHERE kind = 1"), 1);
+  EXPECT_EQ(Jobs(), Names());
+  EXPECT_FALSE(more_jobs);
+}
+
+TEST_F(ContentsUnreadTest, ThePausesGrowToAnHour) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  int64_t last = 0;
+  for (int tries = 1; tries < 15; ++tries) {
+    const int64_t pause = Pass();
+    EXPECT_GE(pause, last);
+    EXPECT_LE(pause, HOUR);
+    last = pause;
+    --clock;
+    EXPECT_EQ(Jobs(), Names());
+    ++clock;
+    ASSERT_EQ(NewJobs(), Names());
+    ASSERT_EQ(Jobs(), Names({"a.txt"})) << tries;
+    Unread("a.txt");
+  }
+
+  EXPECT_EQ(last, HOUR);
+  EXPECT_EQ(Listed().at(0).tries, 15);
+}
+
+TEST_F(ContentsUnreadTest, OnceItIsReadNothingIsLeftOfIt) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  Pass();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+
+  Finish("a.txt", "words");
+
+  EXPECT_EQ(Holding("words"), 1);
+  EXPECT_THAT(Listed(), testing::IsEmpty());
+  EXPECT_EQ(Number("SELECT count(*) FROM later"), 0);
+  EXPECT_EQ(Number("SELECT tries FROM files"), 0);
+}
+
+TEST_F(ContentsUnreadTest, AFileThatChangesIsNewAtOnce) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+
+  File("a.txt", "other bytes");
+
+  EXPECT_EQ(NewJobs(), Names({"a.txt"}));
+  EXPECT_EQ(Number("SELECT count(*) FROM later"), 0);
+}
+
+TEST_F(ContentsUnreadTest, WhoeverAsksHasItTriedAtOnce) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+
+  ASSERT_TRUE(contents->RetryFailed());
+
+  EXPECT_EQ(NewJobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, ItsTriesAreNoDeaths) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  for (int tries = 0; tries < 3; ++tries) {
+    Unread("a.txt");
+    Pass();
+    ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  }
+
+  ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "killed", {}, true));
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Number("SELECT state FROM files"), 0);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, WhatWasReadBeforeIsKeptAndTriedByItsReadersVersion) {
+  File("a.txt");
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+
+  EXPECT_EQ(Holding("a"), 1);
+  Pass();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Finish("a.txt", "anew");
+  EXPECT_EQ(Holding("anew"), 1);
+  EXPECT_EQ(Number("SELECT extractor FROM files"), 2);
+}
+
+TEST_F(ContentsUnreadTest, WhatIsGivenBackIsDueAtOnce) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  Pass();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  EXPECT_GT(contents->UnreadDue(), clock) << "it is with a helper";
+
+  ASSERT_TRUE(contents->Release(JobOf("a.txt").file));
+
+  EXPECT_LE(contents->UnreadDue(), clock);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, AnOpeningDoesNotForgetIt) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  clock = time(nullptr);
+
+  OpenContents();
+
+  EXPECT_THAT(Jobs(), Names());
+  EXPECT_EQ(Pass(), HOUR) << "by a clock that was ahead";
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, DatabasesThatWereMadeBeforeAreCompleted) {
+  contents->Close();
+  Run("sqlite3 " + ContentsPath("s") + "/contents.db 'DROP TABLE later'");
+
+  OpenContents();
+
+  EXPECT_EQ(Number("SELECT count(*) FROM later"), 0);
+}
+
+}  // namespace fileindexd
