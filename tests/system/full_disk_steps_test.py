@@ -16,14 +16,14 @@ from harness.filesystems import (
     can_use_loop_devices,
     run,
 )
-from harness.sampling import LONG
+from harness.scale import IS_LONG
 
 KIB = 1 << 10
 MIB = 1 << 20
 PIECE = 4 * MIB
 SIZE = 16 * MIB
-STEP = (32 if LONG else 256) * KIB  # while commits fail
-WIDE_STEP = (128 if LONG else 512) * KIB  # while the daemon stops for too little space
+STEP = (32 if IS_LONG else 256) * KIB  # while commits fail
+WIDE_STEP = (128 if IS_LONG else 512) * KIB  # while the daemon stops for too little space
 FIRST_STEPS = (0, 4 * KIB, 16 * KIB, 64 * KIB)
 ENTRIES = f"{namespace.STATE}/shares/alpha/index/entries.db"
 COMMIT_FAILED = "Worker[alpha] failed to commit db"
@@ -125,7 +125,7 @@ class FullDiskSteps:
             if not said & {COMMIT_FAILED, NO_SPACE}:
                 break
             self.assertLess(free, SIZE)
-            if not LONG and number < len(FIRST_STEPS):
+            if not IS_LONG and number < len(FIRST_STEPS):
                 free = FIRST_STEPS[number]
             else:
                 free += STEP if COMMIT_FAILED in said else WIDE_STEP

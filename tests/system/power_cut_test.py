@@ -18,9 +18,10 @@ import signal
 from harness import LoadTest, main, namespace
 from harness.awaiting import children
 from harness.filesystems import CREATE, REINDEX, can_use_loop_devices, on_each, run
+from harness.scale import IS_LONG
 
-CUTS = 34 if os.environ.get("FILEINDEXD_TEST_SCALE") == "long" else 4
-FIRST_CUTS = 4 if os.environ.get("FILEINDEXD_TEST_SCALE") == "long" else 1
+CUTS = 34 if IS_LONG else 4
+FIRST_CUTS = 4 if IS_LONG else 1
 
 CARRIER = f"{namespace.RUN}/carrier"
 FICLONE = 0x40049409

@@ -1,12 +1,11 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """kill -9 at random moments under load: what was acknowledged stays, and the rest is made good."""
 
-import os
-
 from harness import LoadTest, main
 from harness.awaiting import children
+from harness.scale import IS_LONG
 
-KILLS = 500 if os.environ.get("FILEINDEXD_TEST_SCALE") == "long" else 30
+KILLS = 500 if IS_LONG else 30
 
 
 class RandomKillsTest(LoadTest):

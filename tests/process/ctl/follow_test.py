@@ -15,9 +15,10 @@ import time
 from harness import IndexTest, main, namespace
 from harness.awaiting import LIMIT, await_in_folder
 from harness.machine import environment, program
+from harness.scale import IS_LONG
 
 REINDEX = 0x10000
-FILES = 6000 if os.environ.get("FILEINDEXD_TEST_SCALE") == "long" else 1500
+FILES = 6000 if IS_LONG else 1500
 
 
 class Follower:

@@ -8,10 +8,10 @@ from ctl import plain_asker
 from ctl.plain_asker import ENDINGS, WORDS, Asker, Seen
 from harness import main
 from harness.machine import full_path
+from harness.scale import IS_LONG
 from search.library import ContentsTest
 
 SEED = 20_261_122
-IS_LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
 FILES = 400 if IS_LONG else 120
 QUESTIONS = 5000 if IS_LONG else 400
 YEAR_BEGIN, YEAR_END = 1_704_067_200, 1_735_689_599  # 2024

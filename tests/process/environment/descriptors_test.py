@@ -4,7 +4,8 @@
 import time
 
 from harness import IndexTest, main
-from harness.load import Load, is_long
+from harness.load import Load
+from harness.scale import IS_LONG
 from harness.preload import Page
 
 SHARES = [f"share{number}" for number in range(8)]
@@ -31,7 +32,7 @@ class DescriptorsTest(IndexTest):
     def rounds(self):
         began = time.monotonic()
         done = 0
-        while time.monotonic() - began < LONG_SECONDS if is_long() else done < ROUNDS:
+        while time.monotonic() - began < LONG_SECONDS if IS_LONG else done < ROUNDS:
             yield done
             done += 1
 

@@ -8,7 +8,7 @@ import socket
 import time
 
 from harness import IndexTest, control, main
-from harness.load import is_long
+from harness.scale import IS_LONG
 from harness.system_log import SystemLog
 
 FILES = 600
@@ -61,7 +61,7 @@ class UnreadLogTest(IndexTest):
         self.append("alpha", {"event": CREATE, "path": f"{self.root}/late.txt"})
 
     def let_time_pass(self):
-        if is_long():
+        if IS_LONG:
             time.sleep(UNREAD_SECONDS)  # what is asked is how it is after this time
 
     def test_all_that_waited_is_done_once_it_is_read(self):

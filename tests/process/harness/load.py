@@ -8,11 +8,6 @@ import shutil
 
 DELETE = 0x80
 REINDEX = 0x10000
-SCALE = os.environ.get("FILEINDEXD_TEST_SCALE", "normal")
-
-
-def is_long():
-    return SCALE == "long"
 
 
 class Load:

@@ -9,12 +9,8 @@ from harness.awaiting import LIMIT
 from harness.checks import IndexTest
 from harness.machine import NUDGE_SECONDS
 
-LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
-
 
 class SamplingTest(IndexTest):
-    limit = LIMIT * (20 if LONG else 1)
-
     def setUp(self):
         super().setUp()
         self.queued = None  # the queue file that was appended to last
@@ -47,7 +43,7 @@ class SamplingTest(IndexTest):
 
     def sample_until_drained(self, sample, share="alpha"):
         """Calls `sample(drained)` until it was called once after the end. Returns the number."""
-        deadline = time.monotonic() + self.limit
+        deadline = time.monotonic() + LIMIT
         nudge = time.monotonic() + NUDGE_SECONDS
         count = 0
         while True:

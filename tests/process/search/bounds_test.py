@@ -1,14 +1,13 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """With the real helper: much text goes through, and the service stays small."""
 
-import os
 import re
 
 from harness import main
+from harness.scale import IS_LONG
 from search.library import ContentsTest
 
-LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
-LARGE, SMALL = (500, 20000) if LONG else (40, 400)  # files; each large one beyond the text's cap
+LARGE, SMALL = (500, 20000) if IS_LONG else (40, 400)  # files; each large one beyond the text's cap
 SHARES = 6
 WORDS = "lighthouse keepers number their lamps "
 

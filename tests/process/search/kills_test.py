@@ -7,11 +7,11 @@ import random
 import signal
 
 from harness import main
+from harness.scale import IS_LONG
 from search.library import ContentsTest, ScriptedTest
 
-LONG = os.environ.get("FILEINDEXD_TEST_SCALE") == "long"
-KILLS = 300 if LONG else 12
-REAL_KILLS = 60 if LONG else 12  # at each, helpers
+KILLS = 300 if IS_LONG else 12
+REAL_KILLS = 60 if IS_LONG else 12  # at each, helpers
 FILES_BETWEEN = 6  # that are read between two kills, at most
 
 

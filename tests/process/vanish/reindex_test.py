@@ -4,9 +4,10 @@
 import os
 
 from harness import main
-from harness.sampling import LONG, SamplingTest
+from harness.sampling import SamplingTest
+from harness.scale import IS_LONG
 
-FILES = 200_000 if LONG else 3_000
+FILES = 200_000 if IS_LONG else 3_000
 IN_A_FOLDER = 500
 EACH = FILES // 30  # every so many files, one is known
 

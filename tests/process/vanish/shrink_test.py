@@ -7,9 +7,10 @@ import shutil
 import sqlite3
 
 from harness import main, namespace
-from harness.sampling import LONG, SamplingTest
+from harness.sampling import SamplingTest
+from harness.scale import IS_LONG
 
-FILES = 200_000 if LONG else 4_000
+FILES = 200_000 if IS_LONG else 4_000
 IN_A_FOLDER = 500
 DELETE = 0x80
 

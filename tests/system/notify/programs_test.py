@@ -7,6 +7,7 @@ import subprocess
 
 from harness import main
 from harness.filesystems import on_each, run
+from harness.scale import IS_LONG
 from harness.watched_disks import (
     BoundTest,
     FuseTest,
@@ -153,7 +154,7 @@ class Programs:
         self.assert_converged(self.root)
 
     def test_chmod_of_many(self):
-        count = 200_000 if os.environ.get("FILEINDEXD_TEST_SCALE") == "long" else 3_000
+        count = 200_000 if IS_LONG else 3_000
         for number in range(count):
             name = self.at("many", str(number // 1000), f"{number}.txt")
             if number % 1000 == 0:
