@@ -96,8 +96,7 @@ class QueryBesideTest : public QuestionTest {
     ContentsTable table;
     ASSERT_EQ(database.OpenForWriting(ContentsPath("big"), true, CONTENTS_FORM), IndexError::NONE);
     ASSERT_EQ(table.Prepare(database.db), SQLITE_OK);
-    ASSERT_EQ(table.MakeWords("english", WordsVersion("english")), SQLITE_OK);
-    ASSERT_EQ(table.PrepareWords(), SQLITE_OK);
+    ASSERT_EQ(table.UseWords("english", WordsVersion("english")), SQLITE_OK);
     ASSERT_EQ(table.Begin(), SQLITE_OK);
     for (size_t i = 0; i < entries.size(); ++i) {
       ContentFile file;
