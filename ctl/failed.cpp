@@ -100,8 +100,8 @@ bool LookAtService(Session& session, Retry& retry) {
 std::string RetryText(const Listing& listing) {
   const Retry& retry = listing.retry;
   std::string text = listing.files == 1
-                               ? "1 file will be tried again"
-                               : std::to_string(listing.files) + " files will be tried again";
+                         ? "1 file will be tried again"
+                         : std::to_string(listing.files) + " files will be tried again";
   if (listing.files == 0) {
     return text;
   }

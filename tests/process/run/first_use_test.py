@@ -142,7 +142,7 @@ class ReadmeTest(RunTest):
         for number in range(1, 13):
             self.put_hole(f"films/{number}.mkv", number * 20_000_000, owner=self.ANNA)
         self.put_hole("films/hers too, but no film.txt", 900_000_000, owner=self.ANNA)
-        self.put_hole("films/not hers.mkv", 900_000_000)
+        self.put_hole("films/not hers.mkv", 900_000_001)
         scan = photo("Nikon", "Nikon D5", datetime.datetime(2020, 1, 5, 12))
         for number in range(30):
             self.put_hole(f"copies/{number}.jpg", 11_000_000, scan)
