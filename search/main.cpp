@@ -21,6 +21,7 @@
 #include <thread>
 #include <vector>
 
+#include "base/standard_streams.h"
 #include "search/content_loop.h"
 #include "search/log.h"
 #include "search/service.h"
@@ -135,6 +136,7 @@ int Serve() {
 }  // namespace fileindexd
 
 int main(int argc, char** argv) {
+  fileindexd::FillStandardStreams();
   if (argc > 1) {
     (void)fprintf(stderr, "%s: %s: takes no arguments\n", fileindexd::SERVICE_PROGRAM, argv[1]);
     return 2;

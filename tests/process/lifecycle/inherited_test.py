@@ -1,0 +1,64 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""What whoever starts the programs leaves to them: closed standard streams."""
+
+import os
+import stat
+import subprocess
+
+from harness import MachineTest, main
+from harness.awaiting import LIMIT
+from harness.machine import SERVICE_PID_FILE, environment, program
+from harness.watching import NOTIFIER_PID_FILE
+
+NULL = "/dev/null"
+STREAMS = (0, 1, 2)
+
+
+def without_streams(name, numbers):
+    """The command that runs the program with these streams closed."""
+    closing = " ".join(f"{number}>&-" for number in numbers)
+    return ["/bin/sh", "-c", f'exec "$0" {closing}', program(name)]
+
+
+class InheritedTest(MachineTest):
+    def assert_streams_lead_nowhere(self, pid):
+        for number in STREAMS:
+            self.assertEqual(os.readlink(f"/proc/{pid}/fd/{number}"), NULL)
+
+    def test_daemon_starts_with_closed_streams_and_leaves_the_null_device_alone(self):
+        os.chmod(NULL, 0o666)
+        for numbers in (*((number,) for number in STREAMS), STREAMS):
+            with self.subTest(numbers):
+                after = self.log.mark()
+
+                subprocess.run(
+                    without_streams("fileindexd", numbers),
+                    env=environment(FILEINDEXD_LOG_LEVEL="debug"),
+                    check=True,
+                    timeout=LIMIT,
+                )
+
+                self.await_line("Search daemon launched ...", after)
+                pid = self.daemon_pid()
+                self.assert_streams_lead_nowhere(pid)
+                self.assertEqual(stat.S_IMODE(os.stat(NULL).st_mode), 0o666)
+                self.stop(pid)
+
+    def check_service(self, name, pid_file):
+        service = subprocess.Popen(without_streams(name, STREAMS), env=environment())
+        self.await_file(pid_file)
+
+        self.assert_streams_lead_nowhere(service.pid)
+
+        service.terminate()
+        self.assertEqual(service.wait(LIMIT), 0)
+
+    def test_content_service_opens_nothing_under_the_numbers_of_closed_streams(self):
+        self.check_service("talocontentsearchd", SERVICE_PID_FILE)
+
+    def test_notification_service_opens_nothing_under_the_numbers_of_closed_streams(self):
+        self.check_service("fileindex-notifyd", NOTIFIER_PID_FILE)
+
+
+if __name__ == "__main__":
+    main()
