@@ -42,6 +42,7 @@ int Complain(const std::string& error) {
 int OpenSignals() {
   (void)signal(SIGTERM, SIG_DFL);
   (void)signal(SIGINT, SIG_DFL);
+  (void)signal(SIGCHLD, SIG_DFL);  // what is ignored leaves no status of a helper's end
   (void)signal(SIGPIPE, SIG_IGN);
 
   sigset_t ending;

@@ -1,15 +1,16 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
-"""What whoever starts the programs leaves to them: closed standard streams."""
+"""What whoever starts the programs leaves to them: closed streams, signals that it ignores."""
 
 import os
 import stat
 import subprocess
 
-from harness import MachineTest, main
+from harness import IndexTest, MachineTest, main, namespace
 from harness.awaiting import LIMIT
 from harness.machine import SERVICE_PID_FILE, environment, program
 from harness.watching import NOTIFIER_PID_FILE
 
+CREATE = 0x40
 NULL = "/dev/null"
 STREAMS = (0, 1, 2)
 
@@ -58,6 +59,31 @@ class InheritedTest(MachineTest):
 
     def test_notification_service_opens_nothing_under_the_numbers_of_closed_streams(self):
         self.check_service("fileindex-notifyd", NOTIFIER_PID_FILE)
+
+
+class IgnoredSignalTest(IndexTest):
+    def launch(self, debug=True, **more):
+        subprocess.run(
+            ["env", "--ignore-signal=CHLD", program("fileindexd")],
+            env=environment(FILEINDEXD_LOG_LEVEL="debug"),
+            check=True,
+            timeout=LIMIT,
+        )
+
+    def test_whole_reindex_ends_where_the_ends_of_children_are_ignored(self):
+        root = self.make_share(files=("a.txt",))
+        self.start()
+        self.await_drained("alpha")
+        os.rename(f"{namespace.STATE}/shares/alpha/index", f"{namespace.STATE}/away")
+        after = self.log.mark()
+
+        self.append("alpha", {"event": CREATE, "path": f"{root}/a.txt"})
+
+        after = self.await_line(f"IndexDirAdd: {root}", after)
+        self.await_line("Worker[alpha] finished all task, stopping", after)
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertFalse(share["needs_reindex"])
+        self.assert_index(root)
 
 
 if __name__ == "__main__":

@@ -292,5 +292,19 @@ class QuarantineTest(ScriptedTest):
         self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
 
 
+class IgnoredSignalTest(ScriptedTest):
+    def test_service_that_was_to_ignore_the_ends_of_children_sees_those_of_its_helpers(self):
+        root = self.make_share(folders=())
+        self.write(f"{root}/crash.txt", "lighthouse")
+        self.start()
+        self.kill(self.service_pid())
+        self.start_service("env", "--ignore-signal=CHLD")
+
+        self.ctl("folder", "add", root, "--document")
+
+        self.await_counts(failed=1, waiting=0)
+        self.assertEqual(self.failed()["crash.txt"], ("the helper ended with SIGABRT", 2))
+
+
 if __name__ == "__main__":
     main()
