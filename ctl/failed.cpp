@@ -1,5 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // failed: files whose content could not be read.
+#include <string>
+#include <utility>
+#include <vector>
+
 #include "base/utf8.h"
 #include "ctl/commands.h"
 #include "ctl/output.h"
@@ -30,15 +34,15 @@ bool PutFailed(const Share& share, const FailedContent& failed, bool json, Json:
   return true;
 }
 
-// Puts the share's failures out, or adds them to the list.
-int ListFailed(const Share& share, bool json, Json::Value& list) {
+// Puts the share's failures out, or adds them to the list. Empty, or why they cannot be read.
+std::string ListFailed(const Share& share, bool json, Json::Value& list) {
   ContentsReader reader;
   const IndexError opened = reader.Open(share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {  // nothing was read yet
-    return EXIT_DONE;
+    return {};
   }
   if (opened != IndexError::NONE) {
-    return Fail(EXIT_FAILED, "%s: contents: %s", share.name.c_str(), IndexErrorText(opened));
+    return share.name + ": contents: " + IndexErrorText(opened);
   }
 
   bool written = true;
@@ -46,19 +50,14 @@ int ListFailed(const Share& share, bool json, Json::Value& list) {
     written = PutFailed(share, failed, json, list);
     return written;
   });
-  if (!read && written) {
-    return Fail(EXIT_FAILED, "%s: the contents cannot be read", share.name.c_str());
-  }
-  return EXIT_DONE;
+  return read || !written ? "" : share.name + ": the contents cannot be read";
 }
 
 // The content service alone writes contents: it finds the wish in the state.
-int AskForRetry(Session& session, const std::string& share) {
+// Empty, or why it cannot be written down.
+std::string AskForRetry(Session& session, const std::string& share) {
   const auto wish = [](ShareStatus& status) { status.retry_contents = true; };
-  if (!session.store->UpdateStatus(share, wish)) {
-    return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
-  }
-  return EXIT_DONE;
+  return session.store->UpdateStatus(share, wish) ? "" : session.store->Error();
 }
 
 }  // namespace
@@ -77,19 +76,23 @@ int Failed(const Arguments& arguments) {
     shares = {*share};
   }
 
-  int code = EXIT_DONE;
+  std::vector<std::string> problems;
   Json::Value list(Json::arrayValue);
   for (const Share& share : shares) {
-    int done = ListFailed(share, arguments.json, list);
-    if (done == EXIT_DONE && arguments.retry) {
-      done = AskForRetry(session, share.name);
+    std::string problem = ListFailed(share, arguments.json, list);
+    if (problem.empty() && arguments.retry) {
+      problem = AskForRetry(session, share.name);
     }
-    code = done == EXIT_DONE ? code : done;
+    if (!problem.empty()) {
+      problems.push_back(std::move(problem));
+    }
   }
-  if (arguments.json) {
+  // An empty list would say that nothing has failed: of no share could that be told.
+  const bool is_answered = problems.empty() || problems.size() < shares.size() || !list.empty();
+  if (arguments.json && is_answered) {
     (void)PutJson(list);
   }
-  return code;
+  return FailAll(problems);
 }
 
 }  // namespace fileindexd

@@ -85,6 +85,14 @@ int Fail(int code, const char* format, ...) {
   return code;
 }
 
+int FailAll(const std::vector<std::string>& failures) {
+  std::string text;
+  for (const std::string& failure : failures) {
+    text.append(text.empty() ? "" : "; ").append(failure);
+  }
+  return failures.empty() ? EXIT_DONE : Fail(EXIT_FAILED, "%s", text.c_str());
+}
+
 bool Put(std::string_view bytes) {
   if (output_error != 0) {
     return false;

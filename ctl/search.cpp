@@ -193,10 +193,7 @@ int Search(const Arguments& arguments) {
              (question.limit > 0 || question.count_all)) {
     TellNothingFound(answer, screen);
   }
-  for (const std::string& failure : answer.failures) {
-    (void)Fail(EXIT_FAILED, "%s", failure.c_str());
-  }
-  return answer.failures.empty() ? EXIT_DONE : EXIT_FAILED;
+  return FailAll(answer.failures);
 }
 
 }  // namespace fileindexd
