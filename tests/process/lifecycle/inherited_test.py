@@ -1,5 +1,6 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
-"""What whoever starts the programs leaves to them: closed streams, signals that it ignores."""
+"""What whoever starts the programs leaves to them: closed streams, ignored signals, a state folder
+that is none."""
 
 import os
 import stat
@@ -7,7 +8,7 @@ import subprocess
 
 from harness import IndexTest, MachineTest, main, namespace
 from harness.awaiting import LIMIT
-from harness.machine import SERVICE_PID_FILE, environment, program
+from harness.machine import PID_FILE, SERVICE_PID_FILE, environment, program
 from harness.watching import NOTIFIER_PID_FILE
 
 CREATE = 0x40
@@ -84,6 +85,38 @@ class IgnoredSignalTest(IndexTest):
         (share,) = self.ctl("status", "--json").json()["shares"]
         self.assertFalse(share["needs_reindex"])
         self.assert_index(root)
+
+
+class RelativeStateTest(MachineTest):
+    error = "FILEINDEXD_STATE_DIR is not an absolute path: state"
+
+    def test_daemon_tells_and_ends(self):
+        self.launch(FILEINDEXD_STATE_DIR="state")
+
+        self.await_lines([f"Failed to open the state database: {self.error}", "DoUpdate failed"])
+        self.assertEqual(self.await_exit(self.detached_pid()), 0)
+        self.assertFalse(os.path.lexists(PID_FILE))
+
+    def test_services_refuse(self):
+        for name in ("talocontentsearchd", "fileindex-notifyd"):
+            with self.subTest(name):
+                done = subprocess.run(
+                    [program(name)],
+                    env=environment(FILEINDEXD_STATE_DIR="state"),
+                    capture_output=True,
+                    check=False,
+                    timeout=5,
+                )
+                self.assertEqual((done.returncode, done.stdout), (1, b""))
+                self.assertIn(self.error, done.stderr.decode())
+
+    def test_command_refuses(self):
+        for command in ("status", "share list", "search lighthouse", "pause", "reindex /", "stats",
+                        "event alpha 8 /a", "share add alpha /", "folder add /"):
+            with self.subTest(command):
+                result = self.ctl(*command.split(), code=1, FILEINDEXD_STATE_DIR="state")
+                self.assertEqual(result.err.decode(), f"fileindexctl: {self.error}\n")
+                self.assertEqual(result.out, b"")
 
 
 if __name__ == "__main__":
