@@ -90,6 +90,15 @@ class IgnoredSignalTest(IndexTest):
 class RelativeStateTest(MachineTest):
     error = "FILEINDEXD_STATE_DIR is not an absolute path: state"
 
+    def setUp(self):
+        super().setUp()
+        namespace.mount("tmpfs", "/var/lib", "tmpfs")  # where the usual state folder would be
+        self.addCleanup(namespace.unmount, "/var/lib", namespace.MNT_DETACH)
+
+    def tearDown(self):
+        super().tearDown()
+        self.assertEqual(os.listdir("/var/lib"), [])
+
     def test_daemon_tells_and_ends(self):
         self.launch(FILEINDEXD_STATE_DIR="state")
 
