@@ -3,13 +3,14 @@
 #include "ctl/commands.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
+#include "index/found_kind.h"
 #include "index/reader.h"
 
 namespace fileindexd {
 
 namespace {
 
-bool PutEntry(const Entry& entry, const Arguments& arguments) {
+bool PutEntry(const Entry& entry, Kind kind, const Arguments& arguments) {
   if (!arguments.json) {
     return arguments.nul_ended ? PutLine(entry.path, '\0') : PutLine(ShownName(entry.path));
   }
@@ -17,7 +18,7 @@ bool PutEntry(const Entry& entry, const Arguments& arguments) {
   Json::Value object(Json::objectValue);
   SetPath(object, entry.path);
   object["dir"] = entry.thing == Thing::DIRECTORY;
-  object["kind"] = KindText(entry.kind);
+  object["kind"] = KindText(kind);
   object["size"] = static_cast<Json::Int64>(entry.size);
   object["mtime"] = static_cast<Json::Int64>(WholeSeconds(entry.mtime));
   object["content"] = entry.content_wanted;
@@ -45,14 +46,26 @@ int Dump(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s: index: %s", share->name.c_str(), IndexErrorText(opened));
   }
 
+  // Paths alone need nothing of what was read out of files.
+  FoundKinds kinds;
+  const IndexError contents =
+      arguments.json ? kinds.Open(reader.database, share->name) : IndexError::PATH_NOT_FOUND;
+
   const Progress progress("reading the index of " + share->name);
   bool written = true;
+  bool told = true;
   const bool read = reader.ForEach(share->path, [&](const Entry& entry) {
-    written = PutEntry(entry, arguments);
+    Kind kind = entry.kind;
+    told = kinds.KindOf(entry, kind);
+    written = told && PutEntry(entry, kind, arguments);
     return written;
   });
-  if (!read && written) {
+  if (!told || (!read && written)) {
     return Fail(EXIT_FAILED, "%s: the index cannot be read", share->name.c_str());
+  }
+  if (contents != IndexError::NONE && contents != IndexError::PATH_NOT_FOUND) {
+    return Fail(EXIT_FAILED, "share %s: contents: %s", share->name.c_str(),
+                IndexErrorText(contents));
   }
   return EXIT_DONE;
 }

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // failed: files whose content could not be read.
 #include <ctime>
+#include <string>
+#include <utility>
+#include <vector>
 
 #include "base/utf8.h"
 #include "ctl/commands.h"
@@ -55,14 +58,15 @@ bool PutFailed(const Share& share, const FailedContent& failed, Listing& listing
   return true;
 }
 
-int ListFailed(const Share& share, Listing& listing) {
+// Puts the share's failures out, or collects them. Empty, or why they cannot be read.
+std::string ListFailed(const Share& share, Listing& listing) {
   ContentsReader reader;
   const IndexError opened = reader.Open(share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {  // nothing was read yet
-    return EXIT_DONE;
+    return {};
   }
   if (opened != IndexError::NONE) {
-    return Fail(EXIT_FAILED, "%s: contents: %s", share.name.c_str(), IndexErrorText(opened));
+    return share.name + ": contents: " + IndexErrorText(opened);
   }
 
   bool written = true;
@@ -70,19 +74,14 @@ int ListFailed(const Share& share, Listing& listing) {
     written = PutFailed(share, failed, listing);
     return written;
   });
-  if (!read && written) {
-    return Fail(EXIT_FAILED, "%s: the contents cannot be read", share.name.c_str());
-  }
-  return EXIT_DONE;
+  return read || !written ? "" : share.name + ": the contents cannot be read";
 }
 
 // The content service alone writes contents: it finds the wish in the state.
-int AskForRetry(Session& session, const std::string& share) {
+// Empty, or why it cannot be written down.
+std::string AskForRetry(Session& session, const std::string& share) {
   const auto wish = [](ShareStatus& status) { status.retry_contents = true; };
-  if (!session.store->UpdateStatus(share, wish)) {
-    return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
-  }
-  return EXIT_DONE;
+  return session.store->UpdateStatus(share, wish) ? "" : session.store->Error();
 }
 
 // False, with its line written, on failure.
@@ -132,20 +131,25 @@ int Failed(const Arguments& arguments) {
   if (arguments.retry && !LookAtService(session, listing.retry)) {
     return EXIT_FAILED;
   }
-  int code = EXIT_DONE;
+  std::vector<std::string> problems;
   for (const Share& share : shares) {
-    int done = ListFailed(share, listing);
-    if (done == EXIT_DONE && arguments.retry) {
-      done = AskForRetry(session, share.name);
+    std::string problem = ListFailed(share, listing);
+    if (problem.empty() && arguments.retry) {
+      problem = AskForRetry(session, share.name);
     }
-    code = done == EXIT_DONE ? code : done;
+    if (!problem.empty()) {
+      problems.push_back(std::move(problem));
+    }
   }
-  if (arguments.json) {
+  // An empty list would say that nothing has failed: of no share could that be told.
+  const bool is_answered =
+      problems.empty() || problems.size() < shares.size() || !listing.list.empty();
+  if (arguments.json && is_answered) {
     (void)PutJson(listing.list);
-  } else if (arguments.retry && code == EXIT_DONE) {
+  } else if (!arguments.json && arguments.retry && problems.empty()) {
     (void)PutLine(RetryText(listing));
   }
-  return code;
+  return FailAll(problems);
 }
 
 }  // namespace fileindexd

@@ -201,6 +201,10 @@ bool FindFacts(Session& session, const std::string& given, PathFacts& facts) {
     facts.pending = ReadPending(facts.share->name, facts.path);
   }
   facts.agreement = Compare(facts);
+  // Only now: the index has the kinds that names tell.
+  if (facts.in_index && facts.entry.kind == Kind::OTHER && facts.content.is_known) {
+    facts.entry.kind = facts.content.stored.content.kind;
+  }
   return true;
 }
 

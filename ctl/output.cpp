@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/output.h"
 
-#include <fcntl.h>
 #include <json/writer.h>
 #include <unistd.h>
 
@@ -16,6 +15,7 @@
 #include <memory>
 #include <sstream>
 
+#include "base/standard_streams.h"
 #include "base/utf8.h"
 #include "ctl/terminal/cells.h"
 
@@ -61,15 +61,7 @@ void Remember() {
 }  // namespace
 
 void PrepareStreams() {
-  for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
-    if (fcntl(fd, F_GETFD) >= 0) {
-      continue;
-    }
-
-    // Opened the wrong way round, so that using it still fails. The lowest number is the free one.
-    (void)open("/dev/null", fd == STDIN_FILENO ? O_WRONLY : O_RDONLY);
-  }
-
+  FillStandardStreams();
   (void)signal(SIGPIPE, SIG_IGN);
   (void)setvbuf(stdout, nullptr, _IOFBF, OUTPUT_BUFFER);
 }
@@ -91,6 +83,14 @@ int Fail(int code, const char* format, ...) {
   EraseProgress();
   (void)fprintf(stderr, "fileindexctl: %s\n", line.c_str());  // nowhere left to tell of a failure
   return code;
+}
+
+int FailAll(const std::vector<std::string>& failures) {
+  std::string text;
+  for (const std::string& failure : failures) {
+    text.append(text.empty() ? "" : "; ").append(failure);
+  }
+  return failures.empty() ? EXIT_DONE : Fail(EXIT_FAILED, "%s", text.c_str());
 }
 
 bool Put(std::string_view bytes) {

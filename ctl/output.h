@@ -26,6 +26,9 @@ void PrepareStreams();
 // OneLine elsewhere, so that a file's name cannot break the line.
 [[gnu::format(printf, 2, 3)]] int Fail(int code, const char* format, ...);
 
+// The same with one line for all of them. EXIT_FAILED, or EXIT_DONE where there are none.
+int FailAll(const std::vector<std::string>& failures);
+
 // Each is false once writing has failed: the caller may stop then. FinishOutput tells of it.
 bool Put(std::string_view bytes);
 bool PutLine(std::string_view bytes, char end = '\n');

@@ -196,10 +196,7 @@ int Search(const Arguments& arguments) {
   if (!arguments.json) {
     TellOfWords(*session.settings, question.shares);
   }
-  for (const std::string& failure : answer.failures) {
-    (void)Fail(EXIT_FAILED, "%s", failure.c_str());
-  }
-  return answer.failures.empty() ? EXIT_DONE : EXIT_FAILED;
+  return FailAll(answer.failures);
 }
 
 }  // namespace fileindexd

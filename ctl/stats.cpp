@@ -73,17 +73,15 @@ int Stats(const Arguments& arguments) {
     const Progress progress("counting");
     Gather(wish, statistics);
   }
-  if (arguments.json) {
+  const bool is_answered = statistics.failures.empty() || statistics.answered > 0;
+  if (is_answered && arguments.json) {
     (void)PutJson(StatisticsObject(wish, statistics));
-  } else {
+  } else if (is_answered) {
     for (const std::string& line : StatisticsLines(wish, statistics, FindScreen())) {
       (void)PutLine(line);
     }
   }
-  for (const std::string& failure : statistics.failures) {
-    (void)Fail(EXIT_FAILED, "%s", failure.c_str());
-  }
-  return statistics.failures.empty() ? EXIT_DONE : EXIT_FAILED;
+  return FailAll(statistics.failures);
 }
 
 }  // namespace fileindexd

@@ -63,11 +63,15 @@ int DaysInMonth(int year, int month) {
   return month == 2 && leap ? 29 : DAYS[month - 1];
 }
 
-bool TakeDate(Scanner& scanner, std::tm& time) {
+// `basic`: without separators.
+bool TakeDate(Scanner& scanner, std::tm& time, bool& basic) {
   int year = 0;
   int month = 0;
-  if (!scanner.TakeNumber(4, 1, 9999, year) || !scanner.Take('-') ||
-      !scanner.TakeNumber(2, 1, 12, month) || !scanner.Take('-') ||
+  if (!scanner.TakeNumber(4, 1, 9999, year)) {
+    return false;
+  }
+  basic = !scanner.Take('-');
+  if (!scanner.TakeNumber(2, 1, 12, month) || (!basic && !scanner.Take('-')) ||
       !scanner.TakeNumber(2, 1, DaysInMonth(year, month), time.tm_mday)) {
     return false;
   }
@@ -77,25 +81,39 @@ bool TakeDate(Scanner& scanner, std::tm& time) {
   return true;
 }
 
-bool TakeClock(Scanner& scanner, std::tm& time) {
-  if (!scanner.TakeNumber(2, 0, 23, time.tm_hour) || !scanner.Take(':') ||
-      !scanner.TakeNumber(2, 0, 59, time.tm_min)) {
-    return false;
-  }
-  if (!scanner.Take(':')) {
-    return true;
-  }
-
-  if (!scanner.TakeNumber(2, 0, 60, time.tm_sec)) {  // 60: a leap second
-    return false;
-  }
-  if (!scanner.Take('.')) {
+// `is_whole`: it is nothing but zeros, or there is none.
+bool TakeFraction(Scanner& scanner, bool& is_whole) {
+  is_whole = true;
+  if (!scanner.Take('.') && !scanner.Take(',')) {
     return true;
   }
 
   const size_t digits = std::min(scanner.rest.find_first_not_of("0123456789"), scanner.rest.size());
+  is_whole = scanner.rest.find_first_not_of('0') >= digits;
   scanner.rest.remove_prefix(digits);
   return digits > 0;
+}
+
+// 24 is the end of the day.
+bool TakeClock(Scanner& scanner, std::tm& time, bool basic) {
+  const auto goes_on = [&] {
+    return basic ? Scanner::IsDigits(scanner.rest.substr(0, 1)) : scanner.Take(':');
+  };
+  if (!scanner.TakeNumber(2, 0, 24, time.tm_hour)) {
+    return false;
+  }
+
+  bool is_whole = true;
+  if (goes_on()) {
+    if (!scanner.TakeNumber(2, 0, 59, time.tm_min)) {
+      return false;
+    }
+    if (goes_on() && (!scanner.TakeNumber(2, 0, 60, time.tm_sec) ||  // 60: a leap second
+                      !TakeFraction(scanner, is_whole))) {
+      return false;
+    }
+  }
+  return time.tm_hour < 24 || (time.tm_min == 0 && time.tm_sec == 0 && is_whole);
 }
 
 // The zone that ends the text: seconds east of Greenwich. The text is not empty.
@@ -130,13 +148,14 @@ std::optional<int64_t> ParseTime(std::string_view text) {
   Scanner scanner{text};
   std::tm time = {};
   time.tm_isdst = -1;
-  if (!TakeDate(scanner, time)) {
+  bool basic = false;
+  if (!TakeDate(scanner, time, basic)) {
     return std::nullopt;
   }
   if (scanner.rest.empty()) {
     return std::mktime(&time);
   }
-  if ((!scanner.Take('T') && !scanner.Take(' ')) || !TakeClock(scanner, time)) {
+  if ((!scanner.Take('T') && !scanner.Take(' ')) || !TakeClock(scanner, time, basic)) {
     return std::nullopt;
   }
   if (scanner.rest.empty()) {

@@ -12,10 +12,12 @@ namespace fileindexd {
 
 // Seconds since the epoch, as a number, or from ISO 8601:
 //
-//   YYYY-MM-DD [ ("T" | " ") HH:MM [ ":" SS [ "." digits ] ] [ "Z" | ("+" | "-") HH [ [":"] MM ] ]
-//   ]
+//   YYYY-MM-DD [ ("T" | " ") HH [ ":" MM [ ":" SS [ ("." | ",") digits ] ] ]
+//                [ "Z" | ("+" | "-") HH [ [":"] MM ] ] ]
 //
-// Without a zone the time is local; a date alone is its first second, local. Fractions are dropped.
+// or the same with a time behind the date, and neither "-" in the one nor ":" in the other: eight
+// digits alone are seconds. Without a zone the time is local; a date alone is its first second,
+// local, and 24:00:00 its end. Fractions are dropped.
 std::optional<int64_t> ParseTime(std::string_view text);
 
 // Seconds of "90s", "15m", "2h", "1d". At most 100,000 days, so that adding it to a time is safe.

@@ -125,11 +125,6 @@ int TellUnreadable(const Comparison& counts) {
   return Fail(EXIT_FAILED, "%s", text.c_str());
 }
 
-bool HasFolders(const Settings& settings, const Share& share) {
-  return std::any_of(settings.folders.begin(), settings.folders.end(),
-                     [&](const IndexedFolder& folder) { return folder.share == share.name; });
-}
-
 // All that belongs is missing: each folder is reindexed, and nothing in it is looked at here.
 int MakeIndex(const Settings& settings, const Share& share, const Arguments& arguments) {
   EntryReader none;
@@ -161,12 +156,8 @@ int Verify(const Arguments& arguments) {
   if (!comparer.Start()) {
     return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
   }
-  if (!comparer.has_index && HasFolders(*session.settings, *share)) {
-    return arguments.repair ? MakeIndex(*session.settings, *share, arguments)
-                            : Fail(EXIT_FAILED,
-                                   "share %s: there is no index yet; to have it made: fileindexctl "
-                                   "verify %s --repair",
-                                   share->name.c_str(), share->name.c_str());
+  if (!comparer.has_index && arguments.repair) {
+    return MakeIndex(*session.settings, *share, arguments);
   }
   (void)reader.Open(share->name);  // an index that is not there has nothing to count
   Repair repair(*session.settings, *share, reader);

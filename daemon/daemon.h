@@ -12,6 +12,7 @@
 
 #include <pthread.h>
 
+#include <atomic>
 #include <boost/system/error_code.hpp>
 #include <cstdint>
 #include <ctime>
@@ -86,6 +87,10 @@ class Daemon {
   // not paused. Written by the main thread only, and read by all, without a lock.
   int64_t resume_time = -1;
   std::map<std::string, Worker*> workers;  // owned, by share name
+
+  // The clean-up has come in a pause: its end is none for the Workers, which then end their threads
+  // instead of going on. Asked by them without a lock.
+  std::atomic<bool> ends_in_pause{false};
 
   // How many of platform_mutex, pause_mutex and pause_cond are initialised, in that order.
   int primitives = 0;

@@ -113,8 +113,10 @@ bool Daemon::CreateWorker(const std::string& share_name, bool run) {
     return true;
   }
 
+  // What the host takes as a name ends at its first NUL: it would answer with another share, which
+  // may have its Worker already.
   _tag_TALOSHARE* record = nullptr;
-  if (TALOShareGet(share_name.c_str(), &record) < 0) {
+  if (share_name.find('\0') != std::string::npos || TALOShareGet(share_name.c_str(), &record) < 0) {
     FI_LOG("TALOShareGet failed, share=%s", share_name.c_str());
     return false;
   }

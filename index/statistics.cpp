@@ -77,6 +77,7 @@ void Gather(const StatisticsWish& wish, Statistics& statistics) {
       shares.pop_back();
       continue;
     }
+    made.answered += needs_entries || open.has_contents ? 1 : 0;
     groups.Add(share.name, wish.by == GroupBy::FOLDER, scan.groups);
     born.Add(share.name, true, scan.born);
     KeepLargest(scan.largest, wish.largest, made.largest);

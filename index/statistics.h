@@ -98,6 +98,7 @@ struct Statistics {
   std::vector<LargeFile> largest;
   Duplicates duplicates;
   std::vector<EntryGroup> born;
+  uint64_t answered = 0;              // shares of which something is told here
   std::vector<std::string> failures;  // a line for each share that could not be read: left out
 };
 

@@ -13,6 +13,7 @@
 #include <string>
 
 #include "base/scoped_fd.h"
+#include "base/standard_streams.h"
 #include "notify/confinement.h"
 #include "notify/log.h"
 #include "notify/service.h"
@@ -129,6 +130,7 @@ int Serve(const CommandLine& chosen) {
 }  // namespace fileindexd
 
 int main(int argc, char** argv) {
+  fileindexd::FillStandardStreams();
   try {
     fileindexd::CommandLine chosen;
     int code = 0;

@@ -21,6 +21,7 @@
 #include <thread>
 #include <vector>
 
+#include "base/standard_streams.h"
 #include "search/content_loop.h"
 #include "search/log.h"
 #include "search/service.h"
@@ -42,6 +43,7 @@ int Complain(const std::string& error) {
 int OpenSignals() {
   (void)signal(SIGTERM, SIG_DFL);
   (void)signal(SIGINT, SIG_DFL);
+  (void)signal(SIGCHLD, SIG_DFL);  // what is ignored leaves no status of a helper's end
   (void)signal(SIGPIPE, SIG_IGN);
 
   sigset_t ending;
@@ -136,6 +138,7 @@ int Serve() {
 }  // namespace fileindexd
 
 int main(int argc, char** argv) {
+  fileindexd::FillStandardStreams();
   if (argc > 1) {
     (void)fprintf(stderr, "%s: %s: takes no arguments\n", fileindexd::SERVICE_PROGRAM, argv[1]);
     return 2;

@@ -13,7 +13,15 @@ namespace fileindexd {
 namespace {
 
 constexpr const char* DEFAULT_ROOT = "/var/lib/fileindexd";
-constexpr size_t MAX_SHARE_NAME = 64;  // bytes
+constexpr const char* ROOT_VARIABLE = "FILEINDEXD_STATE_DIR";
+constexpr const char* NOWHERE = "/dev/null";  // no folder, so nothing is found or made below it
+constexpr size_t MAX_SHARE_NAME = 64;         // bytes
+
+// As it is given; empty: nothing is.
+std::string WantedRoot() {
+  const char* wanted = getenv(ROOT_VARIABLE);  // NOLINT: nothing here calls setenv
+  return wanted == nullptr ? "" : wanted;
+}
 
 // The umask may be anything: it cannot add bits to 0700, and what it took away is put back.
 bool MakeFolder(const std::string& path, std::string& error) {
@@ -60,11 +68,11 @@ bool IsNormal(std::string_view path) {
 }  // namespace
 
 std::string StateRoot() {
-  const char* wanted = getenv("FILEINDEXD_STATE_DIR");  // NOLINT: nothing here calls setenv
-  if (wanted == nullptr || wanted[0] != '/') {
+  const std::string wanted = WantedRoot();
+  if (wanted.empty()) {
     return DEFAULT_ROOT;
   }
-  return NormalPath(wanted).value_or(wanted);
+  return wanted.front() == '/' ? NormalPath(wanted).value_or(wanted) : NOWHERE;
 }
 
 std::string StateDatabasePath() {
@@ -100,6 +108,12 @@ std::string DamagedContentsPath(const std::string& share_name) {
 }
 
 bool MakeStateRoot(std::string& error) {
+  // Whatever else it could be taken for would be the wrong one: what was meant is not known.
+  const std::string wanted = WantedRoot();
+  if (!wanted.empty() && wanted.front() != '/') {
+    error = std::string(ROOT_VARIABLE) + " is not an absolute path: " + wanted;
+    return false;
+  }
   const std::string root = StateRoot();
   return MakeFolderAndParents(root, error) && MakeFolder(root + "/shares", error);
 }
@@ -122,11 +136,14 @@ bool IsValidShareName(std::string_view name) {
   if (name.empty() || name.size() > MAX_SHARE_NAME || name.front() == '.') {
     return false;
   }
+  unsigned char before = 0;
   for (const char c : name) {
     const auto byte = static_cast<unsigned char>(c);
-    if (c == '/' || byte < 0x20 || byte == 0x7f) {
+    const bool is_second_half = before == 0xc2 && byte >= 0x80 && byte <= 0x9f;  // U+0080 to U+009F
+    if (c == '/' || byte < 0x20 || byte == 0x7f || is_second_half) {
       return false;
     }
+    before = byte;
   }
   return true;
 }

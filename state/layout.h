@@ -18,7 +18,9 @@ namespace fileindexd {
 
 constexpr const char* QUEUE_NAME = "TALO@file_index_queue";
 
-// FILEINDEXD_STATE_DIR if it holds an absolute path, else /var/lib/fileindexd. Read at each call.
+// FILEINDEXD_STATE_DIR, or /var/lib/fileindexd where that is not set or empty. Where it is no
+// absolute path there is no root: MakeStateRoot says so, and nothing stands below what this gives.
+// Read at each call.
 std::string StateRoot();
 
 std::string StateDatabasePath();

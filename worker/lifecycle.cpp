@@ -208,6 +208,11 @@ void Worker::WaitWhilePaused() {
     Cleaner(pause_mutex);
   }
 
+  // As a cancellation in the wait would: a drained copy stays, and nothing is committed. The state
+  // is left alone, by which the main thread knows that there is a thread to join.
+  if (daemon->ends_in_pause) {
+    pthread_exit(nullptr);
+  }
   AdoptFolders();
 }
 

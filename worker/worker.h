@@ -72,7 +72,8 @@ class Worker {
   // idle.
   void AwaitStart();
 
-  // Blocks while the daemon is paused; every operation on the index begins with it.
+  // Blocks while the daemon is paused; every operation on the index begins with it. Ends the thread
+  // when the daemon ends in that pause.
   void WaitWhilePaused();
 
   // One pass: drain, execute, commit. A PassResult.

@@ -97,6 +97,8 @@ pid_t Start(const char* const* arguments, bool detached) {
   ScopedFd writing(ends[1]);
   const rlimit descriptors = InheritedDescriptorLimit();
 
+  // Where whoever started us had it ignored, a child's end could not be waited for.
+  signal(SIGCHLD, SIG_DFL);  // NOLINT(concurrency-mt-unsafe): the C library's is safe
   const pid_t child = fork();
   if (child < 0) {
     return -1;

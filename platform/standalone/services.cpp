@@ -92,16 +92,19 @@ int CheckAlive(const char* pid_file) {
     (void)poll(nullptr, 0, LOCK_NAP_MS);
     taken = LockPidFile(pid_file, locked);
   }
-  if (taken < 0) {
-    return FI_FAIL();
-  }
   if (taken == 0) {
     return 1;
   }
 
+  // Also where the file could not be locked: another user may read whom it names.
+  const int reason = errno;
   const pid_t recorded = AliveByPidFile(pid_file, OwnProgram());
   if (recorded > 0 && recorded != getpid()) {
     return 1;
+  }
+  if (taken < 0) {
+    errno = reason;
+    return FI_FAIL();
   }
   pid_file_lock = locked.Release();
   return 0;

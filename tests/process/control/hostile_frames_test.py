@@ -8,6 +8,8 @@ from harness import MachineTest, control, main
 
 BOUND = 64 << 20  # bytes of a body that are taken
 DEEP = 100_000
+LOGGED = 32 << 10  # bytes of a line
+CUT = " [cut]"
 
 MALFORMED = [
     b"",
@@ -93,6 +95,26 @@ class HostileFramesTest(MachineTest):
 
         self.assertIn(reply, (-1, None))
         self.assert_not_logged("SetPaused: .*", after)
+
+    def test_line_that_is_too_long_for_the_log_is_cut_between_characters(self):
+        for size in (LOGGED - 100, LOGGED, 300_000, 5_000_000):
+            for shift in range(3):
+                with self.subTest(size=size, shift=shift):
+                    body = "x" * shift + "\N{EURO SIGN}" * (size // 3)
+                    after = self.log.mark()
+
+                    reply = control.exchange(control.frame(body.encode()))
+
+                    self.assertEqual(reply, -1)
+                    self.log.mark()
+                    (line,) = (t for t in self.log.texts(after) if t.startswith("Malformed"))
+                    shown = line.removeprefix("Malformed command: ")
+                    if size < LOGGED:
+                        self.assertEqual(shown, body)
+                        continue
+                    self.assertTrue(shown.endswith(CUT), shown[-20:])
+                    self.assertTrue(body.startswith(shown.removesuffix(CUT)))
+                    self.assertGreater(len(shown.encode()), LOGGED - 100)
 
     def test_lengths_out_of_bounds(self):
         for length in (0, BOUND + 1, 2**31, 2**32 - 1):

@@ -66,13 +66,16 @@ class NeverIndexedTest(IndexTest):
         self.assertEqual(self.ctl("verify", "alpha").out, b"")
         self.assertEqual(self.ctl("verify", "alpha", "--repair").out, b"")
 
-    def test_it_is_said_and_nothing_is_listed(self):
+    def test_all_that_belongs_is_missing(self):
         self.make_folders("in", "also")
 
         result = self.ctl("verify", "alpha", code=1)
 
-        self.assertEqual(result.out, b"")
-        self.assertIn(b"share alpha: there is no index yet", result.err)
+        names = ("also", "also/d.txt", "in", "in/a.txt", "in/b", "in/b/c.txt")
+        missing = [f"missing\t{self.root}/{name}" for name in names]
+        self.assertEqual(result.out.decode().splitlines(), missing)
+        self.assertEqual(result.err, b"")
+        self.assertFalse(os.path.exists(self.queue("alpha")))
 
     def test_repair_has_each_folder_indexed(self):
         self.make_folders("in", "in/b", "also", "out")

@@ -36,13 +36,16 @@ def _mount_points():
     return points
 
 
+def kind_of_name(path):
+    """What a file's name tells."""
+    name, dot, ending = os.path.basename(path).rpartition(b".")
+    return KIND_OF_ENDING.get(ending.lower(), "other") if name and dot else "other"
+
+
 def _kind(path, mode):
     if stat.S_ISDIR(mode):
         return "folder"
-    if stat.S_ISLNK(mode):
-        return "other"
-    name, dot, ending = os.path.basename(path).rpartition(b".")
-    return KIND_OF_ENDING.get(ending.lower(), "other") if name and dot else "other"
+    return "other" if stat.S_ISLNK(mode) else kind_of_name(path)
 
 
 def _describe(path, info):

@@ -2,13 +2,15 @@
 """One instance at a time: later starts, and starts at the same moment."""
 
 import os
+import shutil
 import subprocess
 
-from harness import MachineTest, control, main
+from harness import MachineTest, control, main, namespace
 from harness.awaiting import LIMIT
-from harness.machine import PID_FILE, environment, program
+from harness.machine import PID_FILE, SERVICE_PID_FILE, environment, program
 
 ROUNDS = 10
+NOBODY = 65534
 
 
 class SecondInstanceTest(MachineTest):
@@ -31,6 +33,28 @@ class SecondInstanceTest(MachineTest):
         self.launch(debug=False)
 
         self.assertEqual(self.log.texts(), [])
+
+    def test_second_start_by_another_user_leaves_the_first_alone(self):
+        pid = self.start()
+        self.await_file(SERVICE_PID_FILE)
+        os.mkdir(f"{namespace.RUN}/open")
+        copy = shutil.copy(program("fileindexd"), f"{namespace.RUN}/open")
+        after = self.log.mark()
+        try:
+            second = subprocess.Popen(
+                [copy],
+                env=environment(FILEINDEXD_LOG_LEVEL="debug"),
+                user=NOBODY,
+                cwd="/",
+            )
+        except OSError as error:  # where only one user is mapped
+            self.skipTest(f"no other user here: {error}")
+
+        self.assertEqual(second.wait(LIMIT), 0)
+
+        self.await_line("Daemon alive. No need to start", after)
+        self.assert_not_logged(r"Daemonized \.\.\.|Cleaning resource|Failed .*", after)
+        self.assertEqual(self.daemon_pid(), pid)
 
     def start_two(self):
         command = [program("fileindexd")]

@@ -9,6 +9,7 @@ from harness import IndexTest, control, main
 
 FILES = 1500
 TURNS = 50
+CREATE = 0x40
 REINDEX = 0x10000
 MOST_ROUNDS = 20  # whether a pause comes in the middle of a walk is up to the machine
 ADDED = re.compile(r"\[alpha\] Document\[.*\] added")
@@ -108,6 +109,27 @@ class PauseTest(IndexTest):
         self.start()
         self.await_drained("alpha")
         self.assert_index(root)
+
+    def test_sigterm_in_a_pause_leaves_what_is_queued(self):
+        roots = {share: self.make_share(share) for share in ("alpha", "beta")}
+        pid = self.start()
+        for share, root in roots.items():
+            self.await_drained(share)
+            names = [f"{n}.txt" for n in range(20)]
+            self.make_files(root, *names)
+            self.hold_in_pause(share, *({"event": CREATE, "path": f"{root}/{n}"} for n in names))
+        kept = {share: os.stat(self.queue(share)) for share in roots}
+        after = self.log.mark()
+
+        self.stop(pid)
+
+        self.assert_not_logged(r"\[.*\] Document\[.*\] added", after)
+        for share, before in kept.items():
+            self.assertTrue(os.path.samestat(os.stat(self.queue(share)), before))
+        self.start()
+        for share, root in roots.items():
+            self.await_drained(share)
+            self.assert_index(root, share)
 
     def test_stored_pause_holds_from_the_start(self):
         root = self.make_share(files=("a.txt",))

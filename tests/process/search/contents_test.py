@@ -3,6 +3,7 @@
 
 import contextlib
 import os
+import re
 import shutil
 import signal
 import sqlite3
@@ -142,6 +143,51 @@ class ContentsFollowTest(ScriptedTest):
         self.assertEqual(self.hits("lighthouse"), [])
         self.ctl("folder", "set", root, "--document=on")
         self.await_hits("lighthouse", ["one.txt"])
+
+    def shown_kinds(self, root, name):
+        """Of that file, as each command has it."""
+        path = f"{root}/{name}"
+        dumped = self.ctl("dump", "alpha", "--json").objects()
+        told = self.ctl("info", path).out.decode()
+        return [
+            next(entry["kind"] for entry in dumped if entry["path"] == path),
+            self.ctl("info", path, "--json").json()["entry"]["kind"],
+            re.search(r"^  kind +(\w+)$", told, re.MULTILINE)[1],
+            self.ctl("search", "--json", f"name:{name}").objects()[0]["kind"],
+        ]
+
+    def test_every_command_tells_the_kind_that_was_found_inside(self):
+        root = self.make_documents(one="lighthouse")
+        self.await_counts(done=1)
+        os.mkdir(f"{root}/plain")
+        self.ctl("folder", "add", f"{root}/plain")
+        for name in ("notes", "plain/notices"):
+            self.write(f"{root}/{name}", "harbour")
+            self.change(root, name)
+        self.await_hits("harbour", ["notes"])
+
+        self.assertEqual(self.shown_kinds(root, "notes"), ["document"] * 4)
+        self.assertEqual(self.ctl("info", f"{root}/notes", "--json").json()["state"], "current")
+        # Of what nobody looks into, only the name could tell.
+        self.await_drained("alpha")
+        path = f"{root}/plain/notices"
+        dumped = self.ctl("dump", "alpha", "--json").objects()
+        self.assertEqual([e["kind"] for e in dumped if e["path"] == path], ["other"])
+
+    def test_dump_tells_of_contents_that_cannot_be_read(self):
+        root = self.make_documents(one="lighthouse")
+        self.await_counts(done=1)
+        self.stop(self.daemon)
+        for beside in ("-wal", "-shm"):
+            with contextlib.suppress(FileNotFoundError):
+                os.unlink(self.contents() + beside)
+        self.write(self.contents(), "no database" * 1000)
+
+        result = self.ctl("dump", "alpha", "--json", code=1)
+
+        self.assertIn(f"{root}/one.txt", [entry["path"] for entry in result.objects()])
+        self.assertIn(b"share alpha: contents: ", result.err)
+        self.assertIn(f"{root}/one.txt".encode(), self.dump())
 
     def test_a_file_that_changes_while_it_is_read_is_read_again(self):
         root = self.make_documents(gate="lighthouse")
@@ -352,6 +398,20 @@ class QuarantineTest(ScriptedTest):
 
         self.await_hits("harbour", ["crash.txt"])
         self.assertEqual(sorted(self.failed()), ["bad.txt", "nonsense.txt"])
+
+
+class IgnoredSignalTest(ScriptedTest):
+    def test_service_that_was_to_ignore_the_ends_of_children_sees_those_of_its_helpers(self):
+        root = self.make_share(folders=())
+        self.write(f"{root}/crash.txt", "lighthouse")
+        self.start()
+        self.kill(self.service_pid())
+        self.start_service("env", "--ignore-signal=CHLD")
+
+        self.ctl("folder", "add", root, "--document")
+
+        self.await_counts(failed=1, waiting=0)
+        self.assertEqual(self.failed()["crash.txt"], ("the helper ended with SIGABRT", 2))
 
 
 if __name__ == "__main__":

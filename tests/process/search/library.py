@@ -56,11 +56,10 @@ class ContentsTest(IndexTest):
         with open(path, "w", encoding="utf-8") as file:
             file.write(text)
 
-    def start_service(self):
-        """By hand, as a service manager would after it was killed."""
-        path = program("talocontentsearchd")
-        return os.posix_spawn(path, [path], environment())
-
+    def start_service(self, *through):
+        """By hand, as a service manager would after it was killed; through such a command."""
+        command = [*through, program("talocontentsearchd")]
+        return os.posix_spawnp(command[0], command, environment())
 
     def use_own_programs(self):
         """Copies, with a place beside them for a helper: its path."""

@@ -46,6 +46,33 @@ TEST_F(ParseTimeTest, TakesATimeWithoutAZoneAsLocal) {
   EXPECT_EQ(ParseTime("2026-01-01"), NEW_YEAR + 3 * 3600 + 1800);
 }
 
+TEST_F(ParseTimeTest, TakesAnHourAlone) {
+  EXPECT_EQ(ParseTime("2026-01-01T00Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("2026-01-01T02+02"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("2026-01-01T01"), NEW_YEAR + 4 * 3600 + 1800);
+}
+
+TEST_F(ParseTimeTest, TakesTimesWithoutSeparators) {
+  EXPECT_EQ(ParseTime("20260101T000000Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20260101T000000.5Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20260101T0200+0200"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20260101T00Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20251231T203000"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20300101"), 20300101);  // seconds
+}
+
+TEST_F(ParseTimeTest, TakesFractionsBehindAComma) {
+  EXPECT_EQ(ParseTime("2026-01-01T00:00:00,999Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20260101T000000,1Z"), NEW_YEAR);
+}
+
+TEST_F(ParseTimeTest, TakesTheEndOfADay) {
+  EXPECT_EQ(ParseTime("2025-12-31T24:00:00Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("2025-12-31T24:00:00.00Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("20251231T24Z"), NEW_YEAR);
+  EXPECT_EQ(ParseTime("2025-12-30T24:00"), NEW_YEAR - 20 * 3600 - 1800);
+}
+
 TEST_F(ParseTimeTest, KnowsLeapYears) {
   EXPECT_EQ(ParseTime("2028-02-29T00:00Z"), 1835395200);
   EXPECT_FALSE(ParseTime("2027-02-29T00:00Z").has_value());
@@ -68,8 +95,23 @@ TEST_F(ParseTimeTest, RefusesEverythingElse) {
                              "2026-04-31",
                              "0000-01-01",
                              "2026-01-01T",
-                             "2026-01-01T24:00",
-                             "2026-01-01T12",
+                             "2026-01-01T25",
+                             "2026-01-01T24:01",
+                             "2026-01-01T24:00:01",
+                             "2026-01-01T24:00:00.5",
+                             "2026-01-01T12,5",
+                             "2026-01-01T12:",
+                             "2026-01-01T1200",
+                             "20260101T",
+                             "20260101T1",
+                             "20260101T12:00",
+                             "20260101T120",
+                             "20260101T12000",
+                             "20260131T120000.",
+                             "20260431T120000",
+                             "2026-0101T120000",
+                             "202601-01T120000",
+                             "20260101 ",
                              "2026-01-01T12:60",
                              "2026-01-01T12:00:61",
                              "2026-01-01T12:00:00.",

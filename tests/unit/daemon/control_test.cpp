@@ -183,6 +183,14 @@ TEST_F(ControlTest, AShareWorkerIsDroppedAndRevived) {
   EXPECT_THAT(Log(), ElementsAre("TALOShareGet failed, share=x", "CreateWorker failed, share=x"));
 }
 
+TEST_F(ControlTest, ANameWithANulIsThatOfNoShare) {
+  EXPECT_EQ(Command(R"({"type":"delete_share_worker","data":{"share_name":"a\u0000x"}})"), 0);
+  EXPECT_EQ(Command(R"({"type":"revive_share_worker","data":{"share_name":"a\u0000x"}})"), -1);
+
+  EXPECT_EQ(daemon.workers.size(), 1U);
+  EXPECT_THAT(Log(), ElementsAre("TALOShareGet failed, share=a", "CreateWorker failed, share=a"));
+}
+
 TEST_F(ControlTest, AConnectionThatCannotBeAcceptedIsTold) {
   const ScopedFd client(Connect(""));
   script.Answer("accept4", 1, EMFILE);

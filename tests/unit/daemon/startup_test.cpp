@@ -209,6 +209,43 @@ TEST_F(StartupTest, CleanUpEndsAPauseThatWorkersWaitInWithoutALine) {
   EXPECT_EQ(daemon.resume_time, -1);
 }
 
+TEST_F(StartupTest, CleanUpInAPauseLeavesTheQueuesAsTheyAre) {
+  ASSERT_TRUE(daemon.SetupInotify());
+  ASSERT_TRUE(daemon.SetupWorkers());
+  script.Run("pthread_cond_wait", EVERY_CALL, [] {});
+  daemon.resume_time = 0;
+  for (const char* share : {"a", "b"}) {
+    WriteQueue(share, SharePath(share) + "/gone");
+  }
+  daemon.RunWorkers();
+  ASSERT_TRUE(script.AwaitCount("pthread_cond_wait", 2));
+
+  daemon.CleanResource();
+
+  for (const char* share : {"a", "b"}) {
+    EXPECT_TRUE(Exists(QueuePath(share).c_str())) << share;
+  }
+  EXPECT_EQ(script.CallCount("DelFSDocument"), 0);
+}
+
+TEST_F(StartupTest, CleanUpInAPauseThatHoldsABatchLeavesTheRestInItsDrainedCopy) {
+  ASSERT_TRUE(daemon.SetupInotify());
+  ASSERT_TRUE(daemon.SetupWorkers());
+  script.Run("pthread_cond_wait", EVERY_CALL, [] {});
+  script.Run("DelFSDocument", 1, [this] { daemon.resume_time = 0; });
+  for (const char* name : {"/1", "/2", "/3"}) {
+    WriteQueue("a", SharePath("a") + name);
+  }
+  daemon.RunWorkers();
+  ASSERT_TRUE(script.AwaitCount("pthread_cond_wait", 1));
+
+  daemon.CleanResource();
+
+  EXPECT_EQ(script.CallCount("DelFSDocument"), 1);
+  EXPECT_TRUE(Exists((QueuePath("a") + ".tmp").c_str()));
+  EXPECT_EQ(script.CountLines("Failed to wait thread"), 0U);
+}
+
 TEST_F(StartupTest, CleanUpRestoresTheSignals) {
   signal(SIGTERM, HandleKill);
   signal(SIGINT, HandleKill);

@@ -2,6 +2,7 @@
 #include "state/layout.h"
 
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <cstdlib>
 
@@ -42,8 +43,9 @@ TEST(CoversTest, OnlyWholeComponentsCount) {
 }
 
 TEST(ShareNameTest, GoodOnes) {
-  for (const std::string& good : {std::string("a"), std::string("my share"), std::string("a.b"),
-                                  std::string("\xc3\xa4"), std::string(64, 'x')}) {
+  for (const std::string& good :
+       {std::string("a"), std::string("my share"), std::string("a.b"), std::string("\xc3\xa4"),
+        std::string("\xc2\xa0\xe2\x82\x80\x80\x9f"), std::string(64, 'x')}) {
     EXPECT_TRUE(IsValidShareName(good)) << good;
   }
 }
@@ -52,7 +54,10 @@ TEST(ShareNameTest, BadOnes) {
   for (const std::string& bad :
        {std::string(), std::string("."), std::string(".."), std::string(".a"), std::string("a/b"),
         std::string("/"), std::string("a\0b", 3), std::string("a\n"), std::string("\t"),
-        std::string("a\x7f"), std::string(65, 'x')}) {
+        std::string("a\x7f"), std::string("\xc2\x80"),
+        std::string("a\xc2\x9f"
+                    "b"),
+        std::string(65, 'x')}) {
     EXPECT_FALSE(IsValidShareName(bad)) << bad;
   }
 }
@@ -63,9 +68,20 @@ TEST_F(LayoutTest, RootComesFromTheEnvironmentIfItIsAbsolute) {
   EXPECT_EQ(QueuePath("s"), "/x/y/shares/s/TALO@file_index_queue");
   EXPECT_EQ(DrainedPath("s"), "/x/y/shares/s/TALO@file_index_queue.tmp");
   EXPECT_EQ(IndexPath("s"), "/x/y/shares/s/index");
-  for (const char* bad : {"", "relative", "./x"}) {
-    setenv("FILEINDEXD_STATE_DIR", bad, 1);
-    EXPECT_EQ(StateRoot(), "/var/lib/fileindexd");
+  setenv("FILEINDEXD_STATE_DIR", "", 1);
+  EXPECT_EQ(StateRoot(), "/var/lib/fileindexd");
+  unsetenv("FILEINDEXD_STATE_DIR");
+  EXPECT_EQ(StateRoot(), "/var/lib/fileindexd");
+}
+
+TEST_F(LayoutTest, RelativeRootIsNoRoot) {
+  for (const std::string bad : {"relative", "./x", "~/x"}) {
+    setenv("FILEINDEXD_STATE_DIR", bad.c_str(), 1);
+    std::string error;
+    EXPECT_FALSE(MakeStateRoot(error));
+    EXPECT_EQ(error, "FILEINDEXD_STATE_DIR is not an absolute path: " + bad);
+    EXPECT_NE(StateRoot(), "/var/lib/fileindexd");
+    EXPECT_NE(access(StateRoot().c_str(), F_OK | X_OK), 0);
   }
 }
 
