@@ -194,7 +194,7 @@ int Search(const Arguments& arguments) {
     TellNothingFound(answer, screen);
   }
   if (!arguments.json) {
-    TellOfWords(*session.settings, question.shares);
+    TellOfWords(*session.settings, answer);
   }
   return FailAll(answer.failures);
 }

@@ -10,6 +10,7 @@
 #include "ctl/output.h"
 #include "ctl/terminal/cells.h"
 #include "index/contents_reader.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
@@ -42,13 +43,17 @@ void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen)
   }
 }
 
-void TellOfWords(const Settings& settings, const std::vector<std::string>& shares) {
-  for (const std::string& name : shares) {
+void TellOfWords(const Settings& settings, const Answer& answer) {
+  for (const auto& [name, asked] : answer.words) {
     const Share* share = settings.ShareByName(name);
+    if (share == nullptr ||
+        (!asked.is_made_anew && asked.language == LanguageOfWords(share->language))) {
+      continue;
+    }
     ContentsReader reader;
     std::optional<WordsProgress> words;
-    if (share != nullptr && reader.Open(name) == IndexError::NONE &&
-        reader.FindWordsProgress(share->language, words) && words) {
+    if (reader.Open(name) == IndexError::NONE && reader.FindWordsProgress(share->language, words) &&
+        words) {
       const std::string note = "The words of share " + name + " are " + WordsText(*words) + ".";
       PutNote(isatty(STDERR_FILENO) == 1 ? Printable(note) : OneLine(note), std::nullopt);
     }

@@ -4,8 +4,6 @@
 #pragma once
 
 #include <optional>
-#include <string>
-#include <vector>
 
 #include "ctl/terminal/screen.h"
 #include "index/search.h"
@@ -18,7 +16,7 @@ namespace fileindexd {
 void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen);
 
 // On standard error: shares whose words are being made anew.
-void TellOfWords(const Settings& settings, const std::vector<std::string>& shares);
+void TellOfWords(const Settings& settings, const Answer& answer);
 
 // Nobody has said how many were wanted.
 void TellOfMore(uint64_t shown, const std::optional<Screen>& screen);

@@ -8,6 +8,7 @@
 
 #include "index/content_functions.h"
 #include "index/contents_reader.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
@@ -92,9 +93,15 @@ int AskedShare::Begin() {
   int code = Execute(statements, "BEGIN");
   code =
       code == SQLITE_OK ? Execute(statements, "SELECT entries FROM main.meta WHERE id = 1") : code;
-  return code == SQLITE_OK && has_contents
-             ? Execute(statements, "SELECT last_text FROM contents.meta WHERE id = 1")
+  Statement* meta = nullptr;
+  code = code == SQLITE_OK && has_contents
+             ? statements.Find("SELECT language, reworded FROM contents.meta WHERE id = 1", meta)
              : code;
+  if (code != SQLITE_OK || meta == nullptr) {
+    return code;
+  }
+  bool found = false;
+  return meta->ReadOne(found, [&] { words = {meta->Bytes(0), meta->Int(1) != ALL_WORDS}; });
 }
 
 int AskedShare::RunOnce(const Question& question, const Asked& asked, const HitOrder& order,
@@ -175,7 +182,8 @@ void AskedShare::Complete(std::vector<Hit>& shown, CutterPool& cutters) {
     return;
   }
   try {
-    const std::string language = LanguageOf(statements, has_contents);
+    const std::string known = has_contents ? LanguageName(words.language) : "";
+    const std::string language = known.empty() ? NO_LANGUAGE : known;
     std::unique_ptr<TextCutter> cutter = cutters.Lend(language);
     for (Hit& hit : shown) {
       if (hit.share == name) {

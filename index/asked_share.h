@@ -43,6 +43,7 @@ class AskedShare {
   std::vector<Hit> hits;          // in order
   uint64_t total = 0;
   std::vector<std::string> failures;
+  AskedWords words;  // where it has contents
 
  private:
   int RunOnce(const Question& question, const Asked& asked, const HitOrder& order, uint64_t wanted);

@@ -204,14 +204,4 @@ int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, Te
   return SQLITE_OK;
 }
 
-std::string LanguageOf(KeptStatements& statements, bool has_contents) {
-  Statement* read = nullptr;
-  const bool found =
-      has_contents &&
-      statements.Find("SELECT language FROM contents.meta WHERE id = 1", read) == SQLITE_OK &&
-      read->Step() == SQLITE_ROW;
-  const std::string name = found ? LanguageName(read->Bytes(0)) : "";
-  return name.empty() ? NO_LANGUAGE : name;
-}
-
 }  // namespace fileindexd

@@ -22,7 +22,4 @@ std::vector<Snippet::Mark> MarksInPath(const Asked& asked, const Entry& entry, N
 int AddSnippet(CandidateRows& rows, const Asked& asked, Candidate& candidate, TextCutter& cutter,
                Snippet& snippet);
 
-// Of the share's contents; NO_LANGUAGE where nothing tells.
-std::string LanguageOf(KeptStatements& statements, bool has_contents);
-
 }  // namespace fileindexd

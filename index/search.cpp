@@ -162,6 +162,9 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   BestHits best(wanted, order);
   for (AskedShare& share : shares) {
     made.total += share.total;
+    if (share.has_contents) {
+      made.words[share.name] = share.words;
+    }
     std::move(share.failures.begin(), share.failures.end(), std::back_inserter(made.failures));
     for (Hit& hit : share.hits) {
       best.Add(std::move(hit));

@@ -49,12 +49,19 @@ struct Hit {
   std::vector<Snippet::Mark> marks;  // bytes of entry.path that answer the question, in order
 };
 
+// The words of a share's contents that were asked.
+struct AskedWords {
+  std::string language;
+  bool is_made_anew = false;  // others are being made, for another language or by other rules
+};
+
 struct Answer {
-  std::vector<Hit> hits;              // best first, at most `limit`
-  uint64_t total = 0;                 // matching entries, whatever the limit
-  std::vector<std::string> failures;  // a line for each share that could not be asked
-  std::string suggestion;             // without any hit: the question in words that the index has
-  std::string word_like_field;        // without either: the first word like "type:pdf"
+  std::vector<Hit> hits;                    // best first, at most `limit`
+  uint64_t total = 0;                       // matching entries, whatever the limit
+  std::vector<std::string> failures;        // a line for each share that could not be asked
+  std::map<std::string, AskedWords> words;  // by share; none of those without contents
+  std::string suggestion;       // without any hit: the question in words that the index has
+  std::string word_like_field;  // without either: the first word like "type:pdf"
 };
 
 // False when the question makes no sense, and `error` then says why and where, in one line. Shares

@@ -11,10 +11,11 @@ import time
 from harness import namespace
 from harness.awaiting import IN_CLOSE, LIMIT, FolderWatch
 from harness.checks import IndexTest
+from harness.scale import IS_LONG
 
 IMAGE_SIZE = {"ext4": 512 << 20, "btrfs": 512 << 20, "xfs": 512 << 20}
 MAKE = {
-    "ext4": ["mkfs.ext4", "-q", "-F"],
+    "ext4": ["mkfs.ext4", "-q", "-F", *(["-N", "300000"] if IS_LONG else [])],  # inodes
     "btrfs": ["mkfs.btrfs", "-q", "-f"],
     "xfs": ["mkfs.xfs", "-q", "-f"],
 }

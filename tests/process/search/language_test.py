@@ -35,7 +35,7 @@ class LanguageTest(ContentsTest):
 
     def said_by_search(self):
         """On standard error."""
-        command = [program("fileindexctl"), "search", "text:walked"]
+        command = [program("fileindexctl"), "search", "text:walks"]
         done = subprocess.run(command, env=environment(), capture_output=True, check=True)
         return done.stderr
 

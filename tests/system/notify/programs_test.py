@@ -6,6 +6,7 @@ import shutil
 import subprocess
 
 from harness import main
+from harness.awaiting import LIMIT
 from harness.filesystems import on_each, run
 from harness.scale import IS_LONG
 from harness.watched_disks import (
@@ -160,7 +161,7 @@ class Programs:
             if number % 1000 == 0:
                 os.makedirs(os.path.dirname(name))
             os.close(os.open(name, os.O_CREAT | os.O_WRONLY))
-        self.sync(seconds=120)
+        self.sync(seconds=2 * int(LIMIT))
         self.follow("chmod -R go-r many; touch -d 2001-01-01 many/*/*7.txt")
 
 
