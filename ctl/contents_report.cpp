@@ -75,9 +75,8 @@ Json::Value WordsObject(const std::optional<WordsProgress>& words) {
 }
 
 std::string WordsText(const WordsProgress& words) {
-  return "made anew for " + words.wanted + ", " + std::to_string(words.done) + " of " +
-         std::to_string(words.total) + " texts done; until then those for " + words.language +
-         " are found";
+  return "not made anew for " + words.wanted + " yet, " + std::to_string(words.done) + " of " +
+         std::to_string(words.total) + " texts done; those for " + words.language + " are found";
 }
 
 std::string ContentsText(const ContentsReport& report) {

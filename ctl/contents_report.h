@@ -22,9 +22,9 @@ struct ContentsReport {
 // `wanted`: entries whose content is wanted; all of them wait where nothing was read yet.
 ContentsReport ReportContents(const Share& share, uint64_t wanted);
 
-// Sets the keys that begin with "contents".
+// Sets the keys that begin with "contents", and "words_made_anew".
 void AddContents(Json::Value& object, const ContentsReport& report);
-// "made anew for german, 5 of 10 texts done; until then those of english are found".
+// "not made anew for german yet, 5 of 10 texts done; those for english are found".
 std::string WordsText(const WordsProgress& words);
 Json::Value WordsObject(const std::optional<WordsProgress>& words);  // null: there are none
 // One line for people.

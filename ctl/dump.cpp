@@ -48,24 +48,21 @@ int Dump(const Arguments& arguments) {
 
   // Paths alone need nothing of what was read out of files.
   FoundKinds kinds;
-  const IndexError contents =
-      arguments.json ? kinds.Open(reader.database, share->name) : IndexError::PATH_NOT_FOUND;
-
+  if (arguments.json) {
+    kinds.Open(share->name);
+  }
   const Progress progress("reading the index of " + share->name);
   bool written = true;
-  bool told = true;
   const bool read = reader.ForEach(share->path, [&](const Entry& entry) {
-    Kind kind = entry.kind;
-    told = kinds.KindOf(entry, kind);
-    written = told && PutEntry(entry, kind, arguments);
+    written = PutEntry(entry, kinds.KindOf(entry), arguments);
     return written;
   });
-  if (!told || (!read && written)) {
+  if (!read && written) {
     return Fail(EXIT_FAILED, "%s: the index cannot be read", share->name.c_str());
   }
-  if (contents != IndexError::NONE && contents != IndexError::PATH_NOT_FOUND) {
+  if (kinds.error != IndexError::NONE && kinds.error != IndexError::PATH_NOT_FOUND) {
     return Fail(EXIT_FAILED, "share %s: contents: %s", share->name.c_str(),
-                IndexErrorText(contents));
+                IndexErrorText(kinds.error));
   }
   return EXIT_DONE;
 }

@@ -133,20 +133,25 @@ int Failed(const Arguments& arguments) {
   }
   std::vector<std::string> problems;
   for (const Share& share : shares) {
+    const uint64_t files = listing.files;
+    const Json::ArrayIndex listed = listing.list.size();
     std::string problem = ListFailed(share, listing);
     if (problem.empty() && arguments.retry) {
       problem = AskForRetry(session, share.name);
+      if (!problem.empty()) {  // none of them is tried
+        listing.files = files;
+        listing.list.resize(listed);
+      }
     }
     if (!problem.empty()) {
       problems.push_back(std::move(problem));
     }
   }
   // An empty list would say that nothing has failed: of no share could that be told.
-  const bool is_answered =
-      problems.empty() || problems.size() < shares.size() || !listing.list.empty();
-  if (arguments.json && is_answered) {
+  const bool is_answered = problems.empty() || problems.size() < shares.size();
+  if (arguments.json && (is_answered || !listing.list.empty())) {
     (void)PutJson(listing.list);
-  } else if (!arguments.json && arguments.retry && problems.empty()) {
+  } else if (!arguments.json && arguments.retry && is_answered) {
     (void)PutLine(RetryText(listing));
   }
   return FailAll(problems);

@@ -194,7 +194,7 @@ int Search(const Arguments& arguments) {
     TellNothingFound(answer, screen);
   }
   if (!arguments.json) {
-    TellOfWords(*session.settings, answer);
+    TellOfWords(*session.settings, answer, screen);
   }
   return FailAll(answer.failures);
 }

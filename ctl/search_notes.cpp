@@ -1,15 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/search_notes.h"
 
-#include <unistd.h>
-
 #include <cstdio>
 #include <string>
 
-#include "ctl/contents_report.h"
 #include "ctl/output.h"
 #include "ctl/terminal/cells.h"
-#include "index/contents_reader.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -43,19 +39,15 @@ void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen)
   }
 }
 
-void TellOfWords(const Settings& settings, const Answer& answer) {
+void TellOfWords(const Settings& settings, const Answer& answer,
+                 const std::optional<Screen>& screen) {
   for (const auto& [name, asked] : answer.words) {
     const Share* share = settings.ShareByName(name);
-    if (share == nullptr ||
-        (!asked.is_made_anew && asked.language == LanguageOfWords(share->language))) {
-      continue;
-    }
-    ContentsReader reader;
-    std::optional<WordsProgress> words;
-    if (reader.Open(name) == IndexError::NONE && reader.FindWordsProgress(share->language, words) &&
-        words) {
-      const std::string note = "The words of share " + name + " are " + WordsText(*words) + ".";
-      PutNote(isatty(STDERR_FILENO) == 1 ? Printable(note) : OneLine(note), std::nullopt);
+    const std::string wanted = share != nullptr ? LanguageOfWords(share->language) : "";
+    if (share != nullptr && asked.has_texts && asked.language != wanted) {
+      const std::string note = "The words of share " + name + " are not made anew for " + wanted +
+                               " yet: those for " + asked.language + " were looked for.";
+      PutNote(screen.has_value() ? Printable(note) : OneLine(note), screen);
     }
   }
 }

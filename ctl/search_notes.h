@@ -15,8 +15,9 @@ namespace fileindexd {
 // least that there is none.
 void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen);
 
-// On standard error: shares whose words are being made anew.
-void TellOfWords(const Settings& settings, const Answer& answer);
+// Shares whose words are not yet those of the language that is wanted.
+void TellOfWords(const Settings& settings, const Answer& answer,
+                 const std::optional<Screen>& screen);
 
 // Nobody has said how many were wanted.
 void TellOfMore(uint64_t shown, const std::optional<Screen>& screen);

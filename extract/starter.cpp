@@ -14,6 +14,7 @@
 #include <csignal>
 #include <cstring>
 #include <mutex>
+#include <new>
 #include <system_error>
 #include <thread>
 #include <utility>
@@ -150,7 +151,11 @@ void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
 
     pid_t pid = -1;
     std::string error;
-    (void)SpawnChild(program, std::move(arguments), placed, pid, error);
+    try {
+      (void)SpawnChild(program, std::move(arguments), placed, pid, error);
+    } catch (const std::bad_alloc&) {
+      error = "no memory";
+    }
     shared->End(Shared::Stage::STARTED, pid, error);
     files.clear();  // closing is asking, too
   }

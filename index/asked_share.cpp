@@ -95,13 +95,13 @@ int AskedShare::Begin() {
       code == SQLITE_OK ? Execute(statements, "SELECT entries FROM main.meta WHERE id = 1") : code;
   Statement* meta = nullptr;
   code = code == SQLITE_OK && has_contents
-             ? statements.Find("SELECT language, reworded FROM contents.meta WHERE id = 1", meta)
+             ? statements.Find("SELECT language, last_text FROM contents.meta WHERE id = 1", meta)
              : code;
   if (code != SQLITE_OK || meta == nullptr) {
     return code;
   }
   bool found = false;
-  return meta->ReadOne(found, [&] { words = {meta->Bytes(0), meta->Int(1) != ALL_WORDS}; });
+  return meta->ReadOne(found, [&] { words = {meta->Bytes(0), meta->Int(1) != 0}; });
 }
 
 int AskedShare::RunOnce(const Question& question, const Asked& asked, const HitOrder& order,

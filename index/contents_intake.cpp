@@ -131,7 +131,7 @@ int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, 
     return SQLITE_OK;
   }
   SettleKeptOut(now);
-  const int settled = table->SetReason(file.id, "");
+  const int settled = now.state == ContentState::DONE ? table->SetReason(file.id, "") : SQLITE_OK;
   return settled == SQLITE_OK ? table->SetContent(file, OfKind(file.found_kind), now) : settled;
 }
 

@@ -58,6 +58,7 @@ bool ContentsWriter::Impl::NextAgain(int64_t now, size_t limit, std::vector<Cont
   if (code != SQLITE_OK) {
     return Done(code);
   }
+  const bool more_are_due = !jobs.empty() && unread_due <= now;
   bool has_more = true;
   for (int i = 0; i < ROUNDS && has_more && jobs.size() < limit && !IsFull(); ++i) {
     round.dropped = false;
@@ -72,7 +73,7 @@ bool ContentsWriter::Impl::NextAgain(int64_t now, size_t limit, std::vector<Cont
       return Done(code);
     }
   }
-  more = has_more || jobs.size() >= limit;
+  more = has_more || more_are_due || jobs.size() >= limit;
   return true;
 }
 

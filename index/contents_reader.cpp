@@ -152,6 +152,12 @@ bool ContentsReader::FindWordsProgress(const std::string& share_language,
   if (found.wanted == found.language && !has_begun) {
     return true;
   }
+  // What was begun may be for a language that is not wanted any more.
+  Statement to_be;
+  const bool counts =
+      has_begun &&
+      (to_be.Prepare(entries.db, "SELECT language FROM contents.words_to_be") != SQLITE_OK ||
+       to_be.Step() != SQLITE_ROW || to_be.Bytes(0) == found.wanted);
   const auto count = [&texts](int64_t last, uint64_t& number) {
     texts.BindInt(1, last);
     bool is_counted = false;
@@ -159,7 +165,7 @@ bool ContentsReader::FindWordsProgress(const std::string& share_language,
            SQLITE_OK;
   };
   if (!count(has_begun ? words.Int(2) : ALL_WORDS, found.total) ||
-      (has_begun && !count(words.Int(1), found.done))) {
+      (counts && !count(words.Int(1), found.done))) {
     return false;
   }
   if (found.total > 0) {

@@ -16,6 +16,7 @@ namespace {
 #define ADDITIONS                                                                                \
   "CREATE TABLE later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);"                          \
   "CREATE INDEX later_by_due ON later(due);"                                                     \
+  "UPDATE files SET state = 1, tries = 0, reason = '' WHERE state = 2 AND extractor = 0;"        \
   "UPDATE counts SET waiting = 0, done = 0, failed = 0;"                                         \
   "INSERT OR IGNORE INTO counts VALUES(5, 0, 0, 0);"                                             \
   "INSERT INTO counts SELECT iif(state = 1 AND (extractor = 0 OR max(found_kind, kind) = 0), 5," \

@@ -85,11 +85,15 @@ int ContentsTable::UseWords(const std::string& language, const std::string& vers
   bool is_making = false;
   int code = ReadWordsToBe(to_be, is_making);
   code = code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
+  // Older versions made new words in the place of the old ones: what is there lacks some, and what
+  // is not there must not be taken out.
+  const bool is_partial = !is_making && meta.reworded != ALL_WORDS;
   if (code == SQLITE_OK && is_making && (to_be != wanted || current == wanted)) {
     code = DropNewWords();
     is_making = false;
   }
   if (code == SQLITE_OK && !is_making && (current != wanted || meta.reworded != ALL_WORDS)) {
+    meta.words_version = is_partial ? "" : meta.words_version;
     code = BeginWords(wanted);
   } else if (is_making) {
     new_language = language;

@@ -114,6 +114,9 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
         code = table->SetReason(file.id, "the content service ended over it again and again");
       }
       code = code == SQLITE_OK ? table->Update(left[i], file) : code;
+      if (code == SQLITE_OK && file.state == ContentState::UNREAD) {
+        code = table->SetDue(file.id, 0);  // its pause was put off while it was in flight
+      }
     }
   } while (code == SQLITE_OK && !left.empty());
   has_judged = has_judged || code == SQLITE_OK;

@@ -10,20 +10,23 @@
 
 namespace fileindexd {
 
-// For walks over all entries: it reads something only of those few that need it. Goes before the
-// connection that it was opened on.
+// For walks over all entries, however long they take: it reads something only of those few that
+// need it, each time what is there by then, and holds nothing of the contents' log in between.
 class FoundKinds {
  public:
-  // Attaches the share's contents to its open entries. PATH_NOT_FOUND: nothing was read out of the
-  // share's files yet. Whatever comes, the entries stay usable, and names alone tell.
-  IndexError Open(IndexDatabase& entries, const std::string& share_name);
+  // Without success names alone tell. PATH_NOT_FOUND: nothing was read out of the share's files
+  // yet.
+  void Open(const std::string& share_name);
 
-  // The entry's kind: by name, or by what was found inside where the name tells nothing. False when
-  // it cannot be read.
-  bool KindOf(const Entry& entry, Kind& kind);
+  // By name, or by what was found inside where the name tells nothing. Once that cannot be read,
+  // names alone tell.
+  Kind KindOf(const Entry& entry);
+
+  IndexError error = IndexError::PATH_NOT_FOUND;  // why only names tell; NONE: they do not
 
  private:
-  Statement found;
+  IndexDatabase contents;
+  Statement found;  // goes before its connection
 };
 
 }  // namespace fileindexd

@@ -49,10 +49,10 @@ struct Hit {
   std::vector<Snippet::Mark> marks;  // bytes of entry.path that answer the question, in order
 };
 
-// The words of a share's contents that were asked.
+// The words of a share's contents that were asked. Others may be in the making, or wanted.
 struct AskedWords {
   std::string language;
-  bool is_made_anew = false;  // others are being made, for another language or by other rules
+  bool has_texts = false;
 };
 
 struct Answer {

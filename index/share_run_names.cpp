@@ -96,6 +96,7 @@ int ShareRun::WalkNames(BestHits& best) {
   const size_t block_size = BlockSize(upper.names, NAMES);
   int code = NamesByRank(block_size, ids, rest);
   PromiseOrder others(rest, [this](int64_t id) { return sets.PromiseOfName(id); });
+  int64_t last = INT64_MAX;  // that was taken without one: downwards
   Block block;
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     if (i % block_size == 0) {
@@ -107,7 +108,8 @@ int ShareRun::WalkNames(BestHits& best) {
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 1.0);
     }
-    const int64_t id = i < ids.size() ? ids[i] : others.Next();
+    last = IsScored() ? last : rest.Previous(last);
+    const int64_t id = i < ids.size() ? ids[i] : IsScored() ? others.Next() : last;
     if (id < 0) {
       break;
     }

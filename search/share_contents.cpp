@@ -96,15 +96,20 @@ bool ShareContents::IsIdle() const {
 
 // When the disk is asked again for what it did not give. The writer may be closed meanwhile.
 void ShareContents::FollowUnread(Time now, int64_t wall) {
+  constexpr int64_t LONGEST = 3600;  // seconds: the clock may be set back meanwhile
   wall_time = wall;
+  const auto arm = [&](int64_t least) {
+    next_unread = unread_due == INT64_MAX
+                      ? Time::max()
+                      : now + seconds(std::clamp(unread_due - wall, least, LONGEST));
+  };
   if (writer.IsOpen() && writer.UnreadDue() != unread_due) {
     unread_due = writer.UnreadDue();
-    next_unread = unread_due == INT64_MAX ? Time::max()
-                                          : now + seconds(std::max<int64_t>(unread_due - wall, 0));
+    arm(0);
   }
   if (now >= next_unread) {
     again.may_have = true;
-    next_unread = Time::max();
+    arm(1);  // those of one moment are more than are given out at once
   }
 }
 
@@ -132,6 +137,10 @@ void ShareContents::Work(Time now, int64_t wall) {
     return;
   }
 
+  // What more there is to take in may be the words of all texts.
+  if (takes_more && !HasRoom(now)) {
+    return;
+  }
   const bool good =
       Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now) && Merge();
   if (!good) {
@@ -170,7 +179,7 @@ bool ShareContents::TakeIn(Time now) {
     return false;
   }
   MayHaveMore();
-  has_news = more;
+  has_news = takes_more = more;
   if (!more) {
     is_sweeping = true;
     taken_in = now;

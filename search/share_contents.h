@@ -163,6 +163,7 @@ class ShareContents {
   size_t looking = 0;             // at files that were read
   Time answered;                  // the time, for answers
   bool has_news = true;
+  bool takes_more = false;  // the last look at news did not see all
   bool look_at_all = true;
   bool is_missing = false;  // there were no entries at the last opening
   bool is_sweeping = false;

@@ -82,7 +82,8 @@ bool ShareContents::MayHaveJobs(Turn turn, Time now) const {
 
 bool ShareContents::IsNewWaiting(Time now) const {
   return writer.IsOpen() && CanWork(now) &&
-         (fresh.may_have || !fresh.ready.empty() || opening == Turn::NEW);
+         ((fresh.may_have && patient.size() < MOST_PATIENT) || !fresh.ready.empty() ||
+          opening == Turn::NEW);
 }
 
 bool ShareContents::TakesRoom(Time now) const {

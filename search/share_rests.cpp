@@ -155,7 +155,7 @@ void ShareContents::Forget() {
   first_change.reset();
   fresh.may_have = again.may_have = false;
   unread_due = INT64_MAX;
-  is_sweeping = false;
+  is_sweeping = takes_more = false;
   has_news = false;
   later_look = Time::max();
 }

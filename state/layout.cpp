@@ -136,16 +136,19 @@ bool IsValidShareName(std::string_view name) {
   if (name.empty() || name.size() > MAX_SHARE_NAME || name.front() == '.') {
     return false;
   }
-  unsigned char before = 0;
-  for (const char c : name) {
-    const auto byte = static_cast<unsigned char>(c);
-    const bool is_second_half = before == 0xc2 && byte >= 0x80 && byte <= 0x9f;  // U+0080 to U+009F
-    if (c == '/' || byte < 0x20 || byte == 0x7f || is_second_half) {
+  return std::none_of(name.begin(), name.end(), [](char c) {
+    return c == '/' || static_cast<unsigned char>(c) < 0x20 || c == 0x7f;
+  });
+}
+
+bool IsNewShareName(std::string_view name) {
+  constexpr char LEAD = '\xc2';  // of U+0080 to U+00BF
+  for (size_t at = name.find(LEAD); at < name.size(); at = name.find(LEAD, at + 1)) {
+    if (at + 1 < name.size() && static_cast<unsigned char>(name[at + 1]) < 0xa0) {
       return false;
     }
-    before = byte;
   }
-  return true;
+  return IsValidShareName(name);
 }
 
 std::optional<std::string> NormalPath(std::string_view path) {

@@ -189,6 +189,29 @@ class ContentsFollowTest(ScriptedTest):
         self.assertIn(b"share alpha: contents: ", result.err)
         self.assertIn(f"{root}/one.txt".encode(), self.dump())
 
+    def test_dump_lists_all_though_contents_turn_out_to_be_damaged_on_its_way(self):
+        root = self.make_documents(one="lighthouse")
+        self.await_counts(done=1)
+        for name in ("notes", "notices"):  # whose names tell no kind
+            self.write(f"{root}/{name}", "harbour")
+            self.change(root, name)
+        self.await_counts(done=3)
+        self.stop(self.daemon)
+        with contextlib.closing(sqlite3.connect(self.contents())) as contents:
+            contents.execute("PRAGMA wal_checkpoint(TRUNCATE)")
+            where = "SELECT rootpage FROM sqlite_master WHERE name = 'sqlite_autoindex_files_1'"
+            page = contents.execute(where).fetchone()[0]
+            size = contents.execute("PRAGMA page_size").fetchone()[0]
+        with open(self.contents(), "r+b") as file:
+            file.seek((page - 1) * size)
+            file.write(b"\xff" * size)
+
+        result = self.ctl("dump", "alpha", "--json", code=1)
+
+        paths = [entry["path"] for entry in result.objects()]
+        self.assertEqual(paths, [os.fsdecode(path) for path in self.dump()])
+        self.assertIn(b"share alpha: contents: ", result.err)
+
     def test_a_file_that_changes_while_it_is_read_is_read_again(self):
         root = self.make_documents(gate="lighthouse")
         self.await_given("gate.txt")

@@ -68,12 +68,12 @@ class LanguageTest(ContentsTest):
         self.assertEqual(self.hits("text:walked"), WALKS)
         words = {"language": "english", "wanted": "german", "done": 0, "total": len(TEXTS)}
         self.assertEqual(self.status()["words_made_anew"], words)
-        self.assertIn(b"made anew for german, 0 of 5", self.ctl("status").out)
+        self.assertIn(b"made anew for german yet, 0 of 5", self.ctl("status").out)
         path = f"{self.root}/walks.txt"
         self.assertEqual(self.ctl("info", path, "--json").json()["words_made_anew"], words)
-        self.assertIn(b"made anew for german, 0 of 5", self.ctl("info", path).out)
+        self.assertIn(b"made anew for german yet, 0 of 5", self.ctl("info", path).out)
         said = self.said_by_search()
-        self.assertIn(b"words of share alpha are made anew for german, 0 of 5", said)
+        self.assertIn(b"words of share alpha are not made anew for german yet: those for english", said)
         self.assertEqual(said.count(b"\n"), 1)
 
         self.start()

@@ -20,12 +20,12 @@ import time
 
 from harness import main, namespace
 from harness.awaiting import LIMIT, await_in_folder
-from harness.load import is_long
+from harness.scale import IS_LONG
 from harness.machine import SERVICE_PID_FILE
 from harness.watched_disks import WatchedDiskTest
 from harness.watching import ask_notifier
 
-SECONDS = float(os.environ.get("CONVERGENCE_SECONDS", "600" if is_long() else "120"))
+SECONDS = float(os.environ.get("CONVERGENCE_SECONDS", "600" if IS_LONG else "120"))
 SEED = int(os.environ.get("CONVERGENCE_SEED", "1"))
 SHARES = ("alpha", "beta", "gamma")
 GENERATORS = 3

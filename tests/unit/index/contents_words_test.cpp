@@ -64,6 +64,7 @@ TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndAllIsFoundMeanwhile) {
   EXPECT_EQ(Holding("houses"), 4);
   EXPECT_EQ(Holding("house"), 4) << "as in the old language";
   EXPECT_EQ(Progress("german"), "english german 2 of 4");
+  EXPECT_EQ(Progress("french"), "english french 0 of 4") << "what is done is of no use to it";
   WriteFile(At("new.txt"), "bytes");
   WriteFile(At("d.txt"), "other bytes");
   Add("new.txt");
