@@ -55,6 +55,41 @@ TEST_F(ContentsUnreadTest, ItIsListedAndCountedAndHoldsNothingUp) {
   EXPECT_FALSE(more_jobs);
 }
 
+TEST_F(ContentsUnreadTest, ThoseOfOneMomentAreAllTriedAgain) {
+  constexpr size_t FILES = 10;  // more than are given out at once
+  for (size_t i = 0; i < FILES; ++i) {
+    File("f" + std::to_string(i) + ".txt");
+  }
+  const Names all = Jobs();
+  ASSERT_EQ(all.size(), FILES);
+  for (const std::string& name : all) {
+    Unread(name);
+  }
+  (void)Pass();
+
+  size_t tried = 0;
+  while (tried < FILES) {
+    const size_t some = Jobs().size();
+    ASSERT_GT(some, 0U);
+    tried += some;
+    EXPECT_EQ(more_jobs, tried < FILES);
+  }
+}
+
+TEST_F(ContentsUnreadTest, AKillDoesNotPutATryOff) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  (void)Pass();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->BeginTries({JobOf("a.txt").file}));
+
+  OpenContents();
+
+  EXPECT_LE(contents->UnreadDue(), clock);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
 TEST_F(ContentsUnreadTest, ThePausesGrowToAnHour) {
   File("a.txt");
   ASSERT_EQ(Jobs(), Names({"a.txt"}));

@@ -88,6 +88,27 @@ TEST_F(ContentsWordsTest, LanguageChangesSliceBySliceAndAllIsFoundMeanwhile) {
   EXPECT_EQ(Holding("fresh"), 0);
 }
 
+// They made them in the place of the old ones.
+TEST_F(ContentsWordsTest, WordsThatOlderVersionsLeftInTheMakingAreMadeAndNothingIsLost) {
+  for (const char* name : {"a.txt", "b.txt", "c.txt"}) {
+    File(name);
+    Jobs();
+    Finish(name, "houses");
+  }
+  Change("INSERT INTO words(words) VALUES('delete-all'); UPDATE meta SET reworded = 0");
+  for (int round = 0; round < 2; ++round) {  // and ended again
+    OpenContents();
+    File("a.txt", "bytes " + std::to_string(round));
+    Jobs();
+    Finish("a.txt", "huts");
+    EXPECT_EQ(Number("SELECT count(*) FROM files WHERE text <> 0"), 3) << round;
+  }
+  TakeIn();
+
+  EXPECT_EQ(Holding("houses"), 2);
+  EXPECT_EQ(Holding("huts"), 1);
+}
+
 TEST_F(ContentsWordsTest, ALanguageThatIsTakenBackLeavesTheWordsAsTheyWere) {
   const std::string text(700000, ' ');
   for (const char* name : {"a.txt", "b.txt", "c.txt"}) {

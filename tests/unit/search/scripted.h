@@ -39,8 +39,9 @@ struct ScriptedContents {
   std::vector<std::string> calls;
   std::map<std::string, IndexError> failing;  // by the call's name: it fails so, until removed
   size_t pending_bytes = 0;
-  int unmerged = 0;     // so many times Merge says that there is more
-  bool unseen = false;  // the next NextJobs gives nothing, and says that there may be more
+  int unmerged = 0;              // so many times Merge says that there is more
+  size_t most_again = SIZE_MAX;  // NextAgain gives no more at once, and does not say that there are
+  bool unseen = false;           // the next NextJobs gives nothing, and says that there may be more
 };
 
 // Those of a share, which all its writers write to.

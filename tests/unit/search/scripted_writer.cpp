@@ -151,7 +151,7 @@ bool ContentsWriter::NextAgain(int64_t now, size_t limit, std::vector<ContentJob
   if (!impl->Call("NextAgain")) {
     return false;
   }
-  impl->Offer(limit, jobs, [now](const ScriptedFile& file) {
+  impl->Offer(std::min(limit, impl->contents->most_again), jobs, [now](const ScriptedFile& file) {
     return file.state == ScriptedFile::State::UNREAD
                ? file.due <= now
                : file.state == ScriptedFile::State::WAITS && file.is_old;

@@ -205,6 +205,31 @@ TEST_F(ShareContentsTest, WhatTheDiskDidNotGiveIsSaidAndReadWhenItIsDue) {
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
 }
 
+TEST_F(ShareContentsTest, ThoseThatAreDueInOneMomentAreAskedForUntilNoneIsLeft) {
+  constexpr int64_t FILES = 3;
+  for (int64_t row = 1; row <= FILES; ++row) {
+    AddFile(row);
+  }
+  Settle();
+  for (int64_t given = 0; given < FILES;) {
+    const auto ids = GiveOut();
+    ASSERT_FALSE(ids.empty());
+    for (const auto id : ids) {
+      End(id, ExtractOutcome::Result::UNREAD);
+      ++given;
+    }
+  }
+  Pass(milliseconds(500));
+  Scripted().most_again = 1;
+  Wait(UNREAD_PAUSE - 10);
+  Pass(seconds(9));
+
+  for (int64_t row = 1; row <= FILES; ++row) {
+    Pass(seconds(2));
+    EXPECT_EQ(GiveOut().size(), 1U) << row;
+  }
+}
+
 TEST_F(ShareContentsTest, WhatIsReadAgainDoesNotStandInTheWayOfWhatIsNew) {
   for (int64_t row = 1; row <= 3; ++row) {
     AddFile(row);
