@@ -45,8 +45,9 @@ void TellOfWords(const Settings& settings, const Answer& answer,
     const Share* share = settings.ShareByName(name);
     const std::string wanted = share != nullptr ? LanguageOfWords(share->language) : "";
     if (share != nullptr && asked.has_texts && asked.language != wanted) {
-      const std::string note = "The words of share " + name + " are not made anew for " + wanted +
-                               " yet: those for " + asked.language + " were looked for.";
+      std::string note = "The words of share ";
+      note.append(name).append(" are not made anew for ").append(wanted);
+      note.append(" yet: those for ").append(asked.language).append(" were looked for.");
       PutNote(screen.has_value() ? Printable(note) : OneLine(note), screen);
     }
   }
