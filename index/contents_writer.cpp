@@ -82,7 +82,8 @@ bool ContentsWriter::Impl::Done(int code) {
   return false;
 }
 
-bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
+// What was given out is taken back; of what is still the same file, it is put down what came of it.
+bool ContentsWriter::Impl::End(int64_t id, const Ending& put_down) {
   ContentFile file;
   bool found = false;
   bool current = false;
@@ -97,14 +98,19 @@ bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
   ContentFile now = file;
   now.begun = 0;
   now.unended = 0;
-  if (current) {
+  code = current ? put_down(file, now) : SQLITE_OK;
+  return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+}
+
+bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
+  return End(id, [&](const ContentFile& file, ContentFile& now) {
     now.state = ContentState::DONE;
     now.tries = 0;
-    code = Keep(file, content, now);
+    int code = Keep(file, content, now);
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
     table->done_now += IsNotKept(now) ? 0 : 1;
-  }
-  return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+    return code;
+  });
 }
 
 // What was found, if it turned out to be of a kind that is wanted.
@@ -131,21 +137,8 @@ void ContentsWriter::Impl::SettleKeptOut(ContentFile& file) {
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
                                 bool killed) {
-  ContentFile file;
-  bool found = false;
-  bool current = false;
-  if (!Ready()) {
-    return false;
-  }
-  int code = TakeBack(id, file, found, current);
-  if (code != SQLITE_OK || !found) {
-    return Done(code);
-  }
-
-  ContentFile now = file;
-  now.begun = 0;
-  now.unended = 0;
-  if (current) {
+  return End(id, [&](const ContentFile& file, ContentFile& now) {
+    int code = SQLITE_OK;
     now.tries = file.state == ContentState::UNREAD ? 1 : file.tries + 1;
     now.state = ContentState::WAITING;
     if (!killed || now.tries >= MOST_TRIES) {
@@ -157,28 +150,14 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
       SettleKeptOut(now);
     }
     const bool is_failure = now.state != ContentState::DONE;
-    code = code == SQLITE_OK ? table->SetReason(id, is_failure ? reason : "") : code;
-  }
-  return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+    return code == SQLITE_OK ? table->SetReason(id, is_failure ? reason : "") : code;
+  });
 }
 
 // Deaths that were on record before are forgotten: there is one number for both.
 bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t now) {
-  ContentFile file;
-  bool found = false;
-  bool current = false;
-  if (!Ready()) {
-    return false;
-  }
-  int code = TakeBack(id, file, found, current);
-  if (code != SQLITE_OK || !found) {
-    return Done(code);
-  }
-
-  ContentFile unread = file;
-  unread.begun = 0;
-  unread.unended = 0;
-  if (current) {
+  return End(id, [&](const ContentFile& file, ContentFile& unread) {
+    int code = SQLITE_OK;
     unread.tries = file.state == ContentState::UNREAD ? file.tries + 1 : 1;
     unread.state = ContentState::UNREAD;
     // These readers tried it; what stands there of others keeps their version. What may be of other
@@ -189,9 +168,8 @@ bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
     code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(unread.tries)) : code;
-    code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
-  }
-  return Done(code == SQLITE_OK ? table->Update(file, unread) : code);
+    return code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  });
 }
 
 bool ContentsWriter::Impl::Release(int64_t id) {

@@ -86,6 +86,8 @@ struct ContentsWriter::Impl {
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
   // contents_writer.cpp
+  using Ending = std::function<int(const ContentFile& file, ContentFile& now)>;
+  bool End(int64_t file, const Ending& put_down);
   bool Finish(int64_t file, const PreparedContent& content);
   int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
   static void SettleKeptOut(ContentFile& file);
