@@ -106,6 +106,23 @@ TEST_F(ShareContentsTest, ThoseThatAreDueInOneMomentAreAskedForUntilNoneIsLeft) 
   }
 }
 
+TEST_F(ShareContentsTest, ThousandsThatCannotBeOpenedYetKeepNobodyFromReadingAgain) {
+  const std::string path = AddFile(1);
+  for (int64_t row = 2; row <= 5000; ++row) {
+    AddEntry(row, path);
+  }
+  std::filesystem::rename(path, path + "x");
+  Settle();
+  EXPECT_TRUE(contents.IsNewWaiting(now));
+  for (int round = 0; round < 1000 && contents.MayHaveJobs(Turn::NEW, now); ++round) {
+    EXPECT_THAT(GiveOut(), IsEmpty());
+    Settle();
+  }
+
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
+  EXPECT_FALSE(contents.IsNewWaiting(now));
+}
+
 TEST_F(ShareContentsTest, WhatIsReadAgainDoesNotStandInTheWayOfWhatIsNew) {
   for (int64_t row = 1; row <= 3; ++row) {
     AddFile(row);
