@@ -72,6 +72,13 @@ std::string XfsIdentity(int folder) {
   return "xfs:" + Hex(geometry.uuid, sizeof geometry.uuid);
 }
 
+std::string KernelNumber(const struct statfs& fs) {
+  char text[32];
+  (void)snprintf(text, sizeof text, "%08x%08x", static_cast<unsigned>(fs.f_fsid.__val[0]),
+                 static_cast<unsigned>(fs.f_fsid.__val[1]));
+  return text;
+}
+
 // Climbs to the root of the mount. That asks no path, so a mount over it, or a root that this
 // process cannot name, does not mislead.
 std::string MountRootIdentity(int folder, uint64_t type) {
@@ -132,12 +139,16 @@ std::string FilesystemIdentity(const std::string& path) {
     return XfsIdentity(folder.fd);
   }
   if (type == EXT4_SUPER_MAGIC) {  // ext2 and ext3 as well; the number is made from the UUID
-    char text[32];
-    (void)snprintf(text, sizeof text, "ext:%08x%08x", static_cast<unsigned>(fs.f_fsid.__val[0]),
-                   static_cast<unsigned>(fs.f_fsid.__val[1]));
-    return text;
+    return "ext:" + KernelNumber(fs);
   }
-  return MountRootIdentity(folder.fd, type);
+  const std::string identity = MountRootIdentity(folder.fd, type);
+  // Each tmpfs has a number of its own; that of most others is their device's, which may change.
+  return type == TMPFS_MAGIC && !identity.empty() ? identity + ':' + KernelNumber(fs) : identity;
+}
+
+bool IsFilesystem(const std::string& recorded, const std::string& identity) {
+  return identity == recorded ||
+         (recorded.starts_with("type:") && identity.starts_with(recorded + ':'));
 }
 
 bool IsRealFilesystem(const std::string& path) {

@@ -10,8 +10,12 @@
 namespace fileindexd {
 
 // Identity of the file system that holds `path`, stable over remounts and restarts: UUID (and
-// subvolume), else type and inode of the mount's root. Empty, with errno, when it cannot be told.
+// subvolume), else type and inode of the mount's root, with the number that each tmpfs has. Empty,
+// with errno, when it cannot be told.
 std::string FilesystemIdentity(const std::string& path);
+
+// Whether `identity` is the one on record; older records of a tmpfs lack its number.
+bool IsFilesystem(const std::string& recorded, const std::string& identity);
 
 // False for proc, sysfs and the like, and when it cannot be told.
 bool IsRealFilesystem(const std::string& path);

@@ -30,7 +30,7 @@ RootState LookAtRoot(const Share& share) {
   if (identity.empty()) {
     return errno == ENOENT ? RootState::MISSING : RootState::UNKNOWN;
   }
-  return identity == share.filesystem ? RootState::SOUND : RootState::FOREIGN;
+  return IsFilesystem(share.filesystem, identity) ? RootState::SOUND : RootState::FOREIGN;
 }
 
 bool IsRootEmpty(const Share& share) {

@@ -123,5 +123,29 @@ class Accept(FilesystemTest):
             self.assertEqual(self.dump(), self.before)
 
 
+class AnotherTmpfs(FilesystemTest):
+    """It has the type and the root's inode number of the one before."""
+
+    def test_its_files_are_taken_in_once_it_is_accepted(self):
+        self.make_files(self.root, "a.txt", "in/b.txt")
+        self.add_share()
+        self.start()
+        self.await_drained("alpha")
+        before = self.dump()
+        self.unmount_disk()
+        self.mount_disk()
+        self.make_files(self.root, "new.txt")
+
+        self.event(CREATE, "new.txt")
+
+        self.assertEqual(self.dump(), before)
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertEqual(share["root"], "foreign")
+        after = self.log.mark()
+        self.ctl("share", "accept", "alpha")
+        self.await_line(ENDED, after)
+        self.check()
+
+
 if __name__ == "__main__":
     main()

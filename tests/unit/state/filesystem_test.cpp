@@ -52,6 +52,20 @@ TEST_F(FilesystemTest, OtherKindsAreToldByTheirTypeAndTheMountsRoot) {
   EXPECT_FALSE(FilesystemIdentity("/proc").empty());
 }
 
+TEST_F(FilesystemTest, OneTmpfsIsNotAnother) {
+  MountTmpfs(root);
+  const std::string first = FilesystemIdentity(root);
+  const std::string recorded_before = first.substr(0, first.rfind(':'));
+  EXPECT_TRUE(IsFilesystem(first, first));
+  EXPECT_TRUE(IsFilesystem(recorded_before, first));
+
+  MountTmpfs(root);
+
+  EXPECT_FALSE(IsFilesystem(first, FilesystemIdentity(root)));
+  EXPECT_FALSE(IsFilesystem("type:1", "type:12:1"));
+  EXPECT_FALSE(IsFilesystem("btrfs:1", "btrfs:1:5"));
+}
+
 TEST_F(FilesystemTest, WhatCannotBeToldIsEmpty) {
   EXPECT_EQ(FilesystemIdentity(root + "/none"), "");
   EXPECT_EQ(errno, ENOENT);
