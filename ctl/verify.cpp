@@ -125,17 +125,13 @@ int TellUnreadable(const Comparison& counts) {
   return Fail(EXIT_FAILED, "%s", text.c_str());
 }
 
-// All that belongs is missing: each folder is reindexed, and nothing in it is looked at here.
-int MakeIndex(const Settings& settings, const Share& share, const Arguments& arguments) {
-  EntryReader none;
-  Repair repair(settings, share, none);
+// For an index that is to be made: what is missing comes with its folder.
+void ReindexFolders(const Settings& settings, const Share& share, Repair& repair) {
   for (const IndexedFolder& folder : settings.folders) {
     if (folder.share == share.name && !IsDirectoryGone(folder.path)) {
-      (void)PutDifference(Difference::MISSING, folder.path, arguments);
       (void)repair.Add({Difference::MISSING, folder.path, Thing::NONE, Thing::DIRECTORY});
     }
   }
-  return QueueRepair(share.name, repair);
 }
 
 }  // namespace
@@ -156,17 +152,18 @@ int Verify(const Arguments& arguments) {
   if (!comparer.Start()) {
     return Fail(EXIT_FAILED, "%s", comparer.Error().c_str());
   }
-  if (!comparer.has_index && arguments.repair) {
-    return MakeIndex(*session.settings, *share, arguments);
-  }
   (void)reader.Open(share->name);  // an index that is not there has nothing to count
   Repair repair(*session.settings, *share, reader);
+  const bool mends_each = arguments.repair && comparer.has_index;
+  if (arguments.repair && !comparer.has_index) {
+    ReindexFolders(*session.settings, *share, repair);
+  }
 
   bool mended = true;
   bool written = true;
   const Comparer::Result result = CompareAll(comparer, share->name, [&](const Found& found) {
     written = PutDifference(found.difference, found.path, arguments);
-    mended = (!arguments.repair || repair.Add(found)) && mended;
+    mended = (!mends_each || repair.Add(found)) && mended;
     return written || arguments.repair;  // a mending goes on though nobody listens
   });
   if (result == Comparer::Result::FAILED) {

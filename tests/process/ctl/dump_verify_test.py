@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """dump and verify: the whole index, and what differs from the disk."""
 
+import json
 import os
 import shutil
 
@@ -77,16 +78,19 @@ class NeverIndexedTest(IndexTest):
         self.assertEqual(result.err, b"")
         self.assertFalse(os.path.exists(self.queue("alpha")))
 
-    def test_repair_has_each_folder_indexed(self):
+    def test_repair_says_the_same_and_has_each_folder_indexed(self):
         self.make_folders("in", "in/b", "also", "out")
         shutil.rmtree(f"{self.root}/out")
+        told = self.ctl("verify", "alpha", code=1)
 
         result = self.ctl("verify", "alpha", "--repair")
 
-        self.assertEqual(
-            result.out.splitlines(),
-            [f"missing\t{self.root}/{name}".encode() for name in ("also", "in", "in/b")],
-        )
+        self.assertEqual(len(told.out.splitlines()), 6)
+        self.assertEqual(result.out, told.out)
+        with open(self.queue("alpha"), encoding="utf-8") as queue:
+            paths = [json.loads(line)["path"] for line in queue]
+        # What is in them comes along.
+        self.assertEqual(paths, [f"{self.root}/{name}" for name in ("also", "in")])
         self.start()
         self.await_drained("alpha")
         self.assertEqual(
