@@ -61,8 +61,9 @@ int ShareRun::Run(BestHits& best, uint64_t& total) {
   }
   if (code == SQLITE_OK && !is_enough) {
     answered = 0;
+    settled = 0;
     code = upper.everything ? WalkRows(best) : WalkNames(best);
-    const bool needs_texts = question.count_all || !BestComeFirst() || answered_by_name < wanted;
+    const bool needs_texts = question.count_all || !BestComeFirst() || settled < wanted;
     if (code == SQLITE_OK && !upper.everything && needs_texts) {
       code = WalkTexts(best);
     }
@@ -91,10 +92,10 @@ int ShareRun::AddHit(Candidate& candidate, BestHits& best, Block& block) {
   Hit hit;
   const int code =
       IsScored() ? score.Score(candidate, block.of_texts, hit.score, hit.text) : SQLITE_OK;
-  answered_by_name += hit.score >= 1 ? 1 : 0;
-  if (hit.score >= 1 || block.of_texts) {
+  if (hit.score >= 1 || (block.of_texts && hit.score > 0)) {
     hit.score = std::min(hit.score, block.ceiling);
     block.floor = std::min(block.floor, hit.score);
+    ++settled;
   }
   hit.share = share;
   hit.entry = std::move(candidate.entry);
@@ -165,7 +166,7 @@ int ShareRun::WalkTexts(BestHits& best) {
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     // Only whole blocks, none above the one before: further pages change nothing in those before.
     if (i % block_size == 0) {
-      if (answered >= wanted && (wanted == 0 || (BestComeFirst() && i > 0))) {
+      if (settled >= wanted && (wanted == 0 || BestComeFirst())) {
         return question.count_all ? CountTexts(order) : SQLITE_OK;
       }
       block.ceiling = i == 0 ? block.ceiling : std::nextafter(block.floor, 0.0);

@@ -7,7 +7,8 @@
 // What answers for sure by its name is only counted, and looked at when it can be among the best.
 // Which are the best is told in two steps: for all of them by what the tables count on their way,
 // and block by block from the top by the full score. No score of a block is above those of the
-// blocks before it, so a page shows the same whatever was asked for before.
+// blocks before it, so a page shows the same whatever was asked for before. What no word of the
+// question speaks for has no place in that, and stands behind all blocks, by its age.
 #pragma once
 
 #include <cstdint>
@@ -84,7 +85,9 @@ class ShareRun {
   WordSet upper;
   IdSet lower;
   uint64_t answered = 0;  // hits so far
-  uint64_t answered_by_name = 0;
+  // Of them, those that none of the blocks to come stands above. What is come upon by its name and
+  // answers by its content, or by attributes alone, is not among them.
+  uint64_t settled = 0;
 };
 
 }  // namespace fileindexd

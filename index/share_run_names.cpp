@@ -100,7 +100,7 @@ int ShareRun::WalkNames(BestHits& best) {
   Block block;
   for (size_t i = 0; code == SQLITE_OK; ++i) {
     if (i % block_size == 0) {
-      if (answered_by_name >= wanted && (wanted == 0 || BestComeFirst())) {
+      if (settled >= wanted && (wanted == 0 || BestComeFirst())) {
         for (; i < ids.size(); ++i) {
           rest.Add(ids[i]);
         }

@@ -65,6 +65,34 @@ TEST_F(QueryAnswersTest, PagesOfContentsKeepTheirOrder) {
   EXPECT_EQ(pages, whole);
 }
 
+// However many of the others there are, and though they are come upon first.
+TEST_F(QueryAnswersTest, TextsStandAboveWhatAnswersByItsAttributesOnEachPage) {
+  std::map<std::string, Content> files;
+  for (int i = 0; i < 500; ++i) {
+    files.emplace("f" + std::to_string(i) + ".txt", TextContent("whale"));
+    if (files.size() == 50) {
+      Store(files);
+      files.clear();
+    }
+  }
+  Names others;
+  for (int i = 0; i < 200; ++i) {
+    others.push_back("f" + std::to_string(i) + ".md");
+  }
+  Empty(others);
+  question.count_all = false;
+  question.limit = 1000;
+  const Names whole = Hits("whale OR ext:md");
+  ASSERT_EQ(whole.size(), 700U);
+  EXPECT_TRUE(whole[499].ends_with(".txt")) << whole[499];
+
+  question.limit = 20;
+  for (question.offset = 0; question.offset < 700; question.offset += 20) {
+    const auto first = whole.begin() + static_cast<std::ptrdiff_t>(question.offset);
+    EXPECT_EQ(Hits("whale OR ext:md"), Names(first, first + 20)) << question.offset;
+  }
+}
+
 TEST_F(QueryAnswersTest, ANameThatAnswersAloneStandsAboveOthersWhateverItsContentHolds) {
   Content content;
   content.text = "an invoice";
