@@ -68,6 +68,8 @@ class RandomKillsTest(ScriptedTest):
 
 
 class RealHelperKillsTest(ContentsTest):
+    state_size = "2g" if IS_LONG else ContentsTest.state_size
+
     def helpers(self, service):
         """Processes of the service's own that read files."""
         pids = []
