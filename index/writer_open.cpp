@@ -46,7 +46,7 @@ IndexError EntryWriter::Impl::TryOpen(bool create) {
     error = Prepare();
   }
   if (error == IndexError::DAMAGED) {
-    if (!SetAside(path, "its tables are not whole")) {
+    if (!SetAside(path, IndexFlaw::DAMAGED, "its tables are not whole")) {
       return IndexError::IO;
     }
     error = create ? database.OpenForWriting(path, true) : IndexError::PATH_NOT_FOUND;
@@ -133,7 +133,7 @@ void EntryWriter::Impl::CloseAll() {
 // Set aside now, so that whoever opens next finds that there is none.
 void EntryWriter::Impl::CloseDamaged() {
   CloseAll();
-  (void)SetAside(IndexPath(share_name), "found at work");
+  (void)SetAside(IndexPath(share_name), IndexFlaw::DAMAGED, "found at work");
   open_error = IndexError::DAMAGED;
   next_open = MonotonicMs() + OPEN_INTERVAL_MS;
 }

@@ -20,7 +20,9 @@ PAGE = 4096
 ENDED = re.compile(
     r"Worker\[alpha\] (finished all task, stopping|stopped while processing command queue)"
 )
-SET_ASIDE = re.compile(r".*index damaged and (set aside|removed), path=.*")
+SET_ASIDE = re.compile(
+    r"index (damaged|made by another version|made by another program) and (set aside|removed), path=.*"
+)
 
 
 def remove(path):
@@ -105,9 +107,9 @@ DAMAGES = (
     ("all overwritten", lambda: (scribble_pages(0, None)), True),
     ("log overwritten", lambda: scribble(FILE + "-wal", 0, None), None),
     ("log's middle overwritten", lambda: scribble(FILE + "-wal", 9 * PAGE, 12 * PAGE), None),
-    ("older schema", lambda: set_version(0), False),
-    ("newer schema", lambda: set_version(99), False),
-    ("foreign database", lambda: replace(FILE, foreign_database), False),
+    ("older schema", lambda: set_version(0), True),
+    ("newer schema", lambda: set_version(99), True),
+    ("foreign database", lambda: replace(FILE, foreign_database), True),
     ("folder in its place", lambda: replace(FILE, make_full_folder), False),
     ("pipe in its place", lambda: replace(FILE, os.mkfifo), False),
     ("link into nowhere", lambda: replace(FILE, lambda path: os.symlink("gone", path)), False),
