@@ -271,6 +271,7 @@ void LimitCaches(int64_t bytes) {
 IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create,
                                          const DatabaseForm& form) {
   Close();
+  has_set_aside = false;
   std::optional<IndexFlaw> flaw;
   IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db, flaw);
   if (error == IndexError::NONE && HasLostCommits(db)) {
@@ -284,6 +285,7 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
     if (!SetAside(index_path, *flaw, "found at opening")) {
       return FromErrno();
     }
+    has_set_aside = true;
     error = IndexError::PATH_NOT_FOUND;
   }
   if (error == IndexError::PATH_NOT_FOUND && create) {

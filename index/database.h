@@ -69,6 +69,7 @@ class IndexDatabase {
   bool HasMoved() const;
 
   sqlite3* db = nullptr;
+  bool has_set_aside = false;  // the last OpenForWriting did, which the system log tells
 };
 
 }  // namespace fileindexd
