@@ -69,11 +69,12 @@ bool StateStore::Impl::Ready() {
   return (useful && !HasStateMoved(*connection)) || Open();
 }
 
-// SQLite opens a file that it may not write for reading only, and would stay with that for ever.
+// SQLite opens a file that it may not write for reading only, and would stay with that for ever. A
+// damaged one is put right by an opening, and by nothing else.
 bool StateStore::Impl::FailSql() {
   const int code = sqlite3_errcode(connection->db) & 0xff;
-  files_failed =
-      files_failed || code == SQLITE_IOERR || code == SQLITE_CANTOPEN || code == SQLITE_READONLY;
+  files_failed = files_failed || code == SQLITE_IOERR || code == SQLITE_CANTOPEN ||
+                 code == SQLITE_READONLY || code == SQLITE_CORRUPT || code == SQLITE_NOTADB;
   return Fail(StateError(*connection, "cannot use"));
 }
 
