@@ -56,6 +56,18 @@ bool StateStore::Impl::ReadVersion(int64_t& version) {
   return true;
 }
 
+// An opening would refuse it; what is open goes on: whoever upgrades a system while it runs starts
+// the programs anew.
+void StateStore::Impl::LookAtVersion() {
+  int64_t version = 0;
+  const bool newer = SchemaVersion(connection->db, version) == SQLITE_OK && version > STATE_VERSION;
+  if (newer && !newer_told) {
+    syslog(LOG_ERR, "%s:%d %s; it is used until this program ends", __FILE__, __LINE__,
+           NewerVersion(connection->path, version).c_str());
+  }
+  newer_told = newer;
+}
+
 // Several times for each document: where nothing was committed at all, two rounds of file locks are
 // spared.
 bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
@@ -219,6 +231,7 @@ bool StateStore::GetSettings(std::shared_ptr<const Settings>& settings) {
     if (!impl->Load(*loaded)) {
       return false;
     }
+    impl->LookAtVersion();
     impl->cached = loaded;
     impl->cached_version = version;
   }

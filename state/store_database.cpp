@@ -131,6 +131,10 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
     result = Exec(connection, "COMMIT");
   }
   if (result == SQLITE_OK) {
+    if (version > 0) {
+      syslog(LOG_ERR, "%s:%d %s is upgraded from version %d to %d", __FILE__, __LINE__,
+             connection.path.c_str(), static_cast<int>(version), STATE_VERSION);
+    }
     return Opened::GOOD;
   }
   const Opened outcome = Failed(connection, "cannot upgrade", result, error);
@@ -146,8 +150,7 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     return Failed(connection, "cannot read", result, error);
   }
   if (version > STATE_VERSION) {
-    error = connection.path + " has version " + std::to_string(version) +
-            ", made by a newer program; this one knows " + std::to_string(STATE_VERSION);
+    error = NewerVersion(connection.path, version);
     return Opened::FAILED;
   }
   // A copy exists only beside a database that had its tables: an empty one has lost them.
@@ -280,6 +283,11 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
 
 }  // namespace
 
+std::string NewerVersion(const std::string& path, int64_t version) {
+  return path + " has version " + std::to_string(version) +
+         ", made by a newer program; this one knows " + std::to_string(STATE_VERSION);
+}
+
 std::string StateError(const StateConnection& connection, const char* what) {
   return std::string(what) + " " + connection.path + ": " + sqlite3_errmsg(connection.db);
 }
@@ -346,7 +354,6 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     connection.reset();  // or its closing would write to what is put in place
     const std::string found = error;
     if (!PutCopyInPlace(path, lock, error)) {
-      syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, error.c_str());
       return nullptr;
     }
     syslog(LOG_ERR, "%s:%d %s; its last copy is used instead, and it is kept as %s.damaged",

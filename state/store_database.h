@@ -58,6 +58,9 @@ bool ReadLogHead(const StateConnection& connection, LogHead& head);
 // True when the open file is no longer the one at its path: it was set aside or removed.
 bool HasStateMoved(const StateConnection& connection);
 
+// That a database is of a version that this program does not know, in one line.
+std::string NewerVersion(const std::string& path, int64_t version);
+
 // The connection's last error in one line.
 std::string StateError(const StateConnection& connection, const char* what);
 
