@@ -85,8 +85,12 @@ bool StateStore::Impl::Ready() {
 // damaged one is put right by an opening, and by nothing else.
 bool StateStore::Impl::FailSql() {
   const int code = sqlite3_errcode(connection->db) & 0xff;
-  files_failed = files_failed || code == SQLITE_IOERR || code == SQLITE_CANTOPEN ||
-                 code == SQLITE_READONLY || code == SQLITE_CORRUPT || code == SQLITE_NOTADB;
+  const bool damaged = code == SQLITE_CORRUPT || code == SQLITE_NOTADB;
+  if (damaged) {
+    TidyOnClose(*connection, false);
+  }
+  files_failed = files_failed || damaged || code == SQLITE_IOERR || code == SQLITE_CANTOPEN ||
+                 code == SQLITE_READONLY;
   return Fail(StateError(*connection, "cannot use"));
 }
 

@@ -170,14 +170,6 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
   return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
 }
 
-// Whether closing writes the log back into the database and removes it. Off while the database is
-// not known to be sound: what is set aside must be what was found.
-void TidyOnClose(const StateConnection& connection, bool tidy) {
-  int keep_log = tidy ? 0 : 1;
-  sqlite3_db_config(connection.db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep_log, nullptr);
-  sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_PERSIST_WAL, &keep_log);
-}
-
 Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) {
   // No mutex of SQLite's own: the store serialises its users.
   constexpr int FLAGS = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX;
@@ -282,6 +274,12 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
 }
 
 }  // namespace
+
+void TidyOnClose(const StateConnection& connection, bool tidy) {
+  int keep_log = tidy ? 0 : 1;
+  sqlite3_db_config(connection.db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep_log, nullptr);
+  sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_PERSIST_WAL, &keep_log);
+}
 
 std::string NewerVersion(const std::string& path, int64_t version) {
   return path + " has version " + std::to_string(version) +

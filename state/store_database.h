@@ -44,6 +44,10 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 // `error` is what kept it from being opened. In store_unlogged.cpp.
 bool OpenFullState(StateConnection& connection, const std::string& error);
 
+// Whether closing writes the log back into the database and removes it. Not where the database is
+// not known to be sound: what is set aside must be what was found.
+void TidyOnClose(const StateConnection& connection, bool tidy);
+
 // Leaves a copy of what is committed beside the database. It is checked before it replaces the one
 // that is there. False on failure, and that one stays.
 bool LeaveStateCopy(const StateConnection& connection, std::string& error);

@@ -124,6 +124,8 @@ TEST_F(StoreDamageTest, AnOpenStoreMendsADatabaseThatWasOverwritten) {
     const auto store = OpenStore();
     ExpectAllThere(*store);
     Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
+    ASSERT_TRUE(OpenStore()->SetPause(static_cast<int64_t>(kept)));
+    const std::string log = ReadFile(database + "-wal");
     std::string damaged = ReadFile(database);
     damaged.replace(kept, damaged.size() - kept, damaged.size() - kept, '\x5a');
     WriteFile(database, damaged);
@@ -133,7 +135,8 @@ TEST_F(StoreDamageTest, AnOpenStoreMendsADatabaseThatWasOverwritten) {
 
     ASSERT_TRUE(store->GetStatus("a", status)) << kept << ": " << store->Error();
     ExpectAllThere(*store);
-    EXPECT_EQ(ReadFile(database + ".damaged"), damaged) << kept;
+    EXPECT_TRUE(ReadFile(database + ".damaged") == damaged) << kept;
+    EXPECT_TRUE(ReadFile(database + ".damaged-wal") == log) << kept;
   }
 }
 
