@@ -77,7 +77,7 @@ bool ContentsWriter::Impl::Done(int code) {
   error = (code & 0xff) == SQLITE_CONSTRAINT ? IndexError::DAMAGED : error;
   CloseDatabase();
   if (error == IndexError::DAMAGED) {
-    (void)SetAside(ContentsPath(share.name), "found at work");
+    (void)SetAside(ContentsPath(share.name), IndexFlaw::DAMAGED, "found at work");
   }
   return false;
 }

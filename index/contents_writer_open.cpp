@@ -34,8 +34,9 @@ IndexError ContentsWriter::Impl::Open(const Share& of_share, int64_t extractor_v
   error = TryOpen();
   if (error == IndexError::DAMAGED) {
     CloseAll();
-    error =
-        SetAside(ContentsPath(share.name), "its tables are not whole") ? TryOpen() : IndexError::IO;
+    error = SetAside(ContentsPath(share.name), IndexFlaw::DAMAGED, "its tables are not whole")
+                ? TryOpen()
+                : IndexError::IO;
   }
   if (error != IndexError::NONE) {
     CloseAll();

@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 
 #include <cerrno>
+#include <optional>
 #include <utility>
 
 #include "base/scoped_fd.h"
@@ -109,8 +110,25 @@ IndexError FindFile(const std::string& index_path, const std::string& file) {
                                                                           : IndexError::DAMAGED;
 }
 
-// Whether the open database of that name is ours. Cheap: two numbers and the schema's text.
-IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm& form) {
+// What a database is that is not ours, or not of this version. One without tables holds nothing.
+IndexError JudgeStranger(sqlite3* db, const std::string& name, bool other_program,
+                         std::optional<IndexFlaw>& flaw) {
+  int64_t tables = 0;
+  const int code = ReadNumber(db, "SELECT count(*) FROM " + name + ".sqlite_schema", tables);
+  if (code != SQLITE_OK) {
+    return FromSqlite(code);
+  }
+
+  if (tables > 0) {
+    flaw = other_program ? IndexFlaw::OTHER_PROGRAM : IndexFlaw::OTHER_VERSION;
+  }
+  return IndexError::PATH_NOT_FOUND;
+}
+
+// Whether the open database of that name is ours. Cheap: two numbers and the schema's text. `flaw`
+// is set for one that counts as none, and yet holds something.
+IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm& form,
+                       std::optional<IndexFlaw>& flaw) {
   int64_t application = 0;
   int64_t version = 0;
   int64_t answer = 0;
@@ -122,7 +140,7 @@ IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm&
     return FromSqlite(code);
   }
   if (application != form.application || version != form.version) {
-    return IndexError::PATH_NOT_FOUND;
+    return JudgeStranger(db, name, application != form.application, flaw);
   }
 
   code = ReadNumber(db, std::string("SELECT ") + form.probe + " FROM " + name + "." + form.probed,
@@ -132,7 +150,7 @@ IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm&
 }
 
 IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
-                        const char* pragmas, sqlite3*& db) {
+                        const char* pragmas, sqlite3*& db, std::optional<IndexFlaw>& flaw) {
   const std::string file = index_path + "/" + form.file;
   const IndexError found = FindFile(index_path, file);
   if (found != IndexError::NONE) {
@@ -142,7 +160,7 @@ IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
   IndexError error = FromSqlite(OpenFile(file, db));
   if (error == IndexError::NONE) {
     KeepLog(db, "main");
-    error = CheckSchema(db, "main", form);
+    error = CheckSchema(db, "main", form, flaw);
   }
   if (error == IndexError::NONE && form.prepare != nullptr) {
     error = FromSqlite(form.prepare(db));
@@ -253,21 +271,27 @@ void LimitCaches(int64_t bytes) {
 IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool create,
                                          const DatabaseForm& form) {
   Close();
-  IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db);
+  has_set_aside = false;
+  std::optional<IndexFlaw> flaw;
+  IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db, flaw);
   if (error == IndexError::NONE && HasLostCommits(db)) {
     Close();
     error = IndexError::DAMAGED;
   }
   if (error == IndexError::DAMAGED) {
-    if (!SetAside(index_path, "found at opening")) {
+    flaw = IndexFlaw::DAMAGED;
+  }
+  if (flaw.has_value()) {
+    if (!SetAside(index_path, *flaw, "found at opening")) {
       return FromErrno();
     }
+    has_set_aside = true;
     error = IndexError::PATH_NOT_FOUND;
   }
   if (error == IndexError::PATH_NOT_FOUND && create) {
     error = CreateDatabase(index_path, form);
     if (error == IndexError::NONE) {
-      error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db);
+      error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db, flaw);
     }
   }
 
@@ -279,7 +303,8 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
 
 IndexError IndexDatabase::OpenForReading(const std::string& index_path, const DatabaseForm& form) {
   Close();
-  return OpenExisting(index_path, form, PRAGMAS_FOR_READING, db);
+  std::optional<IndexFlaw> left;  // as it is: readers move nothing
+  return OpenExisting(index_path, form, PRAGMAS_FOR_READING, db, left);
 }
 
 // What is wrong with it is found out by opening it alone, and only then: that costs as much again.
@@ -304,7 +329,8 @@ IndexError IndexDatabase::Attach(const std::string& index_path, const char* name
     KeepLog(db, name);
     // A cache's size holds for one file of a connection.
     (void)Execute(db, (std::string("PRAGMA ") + name + ".cache_size = -8192").c_str());
-    error = CheckSchema(db, name, form);
+    std::optional<IndexFlaw> left;
+    error = CheckSchema(db, name, form, left);
     if (error == IndexError::NONE) {
       return error;
     }

@@ -51,9 +51,10 @@ class IndexDatabase {
   ~IndexDatabase() { Close(); }
 
   // For writing, exclusive of other writers by SQLite's own locks. With `create` a missing database
-  // is made, and one that is there and cannot be used (another schema version, damaged, a directory
-  // or a pipe in its place) is replaced. Without it these are PATH_NOT_FOUND, and a damaged one has
-  // been set aside, one copy, at most once an hour.
+  // is made, and one that is there and cannot be used (damaged, of another schema version or
+  // another program, without tables, a directory or a pipe in its place) is replaced. Without it
+  // these are PATH_NOT_FOUND. Either way what holds tables, or once did, has been set aside, one
+  // copy, at most once an hour.
   IndexError OpenForWriting(const std::string& index_path, bool create,
                             const DatabaseForm& form = ENTRIES_FORM);
   // For reading; never creates, moves or repairs anything.
@@ -68,6 +69,7 @@ class IndexDatabase {
   bool HasMoved() const;
 
   sqlite3* db = nullptr;
+  bool has_set_aside = false;  // the last OpenForWriting did, which the system log tells
 };
 
 }  // namespace fileindexd

@@ -27,6 +27,18 @@ bool RemoveAll(const std::string& path) {
   return true;
 }
 
+const char* FlawText(IndexFlaw flaw) {
+  switch (flaw) {
+    case IndexFlaw::DAMAGED:
+      return "damaged";
+    case IndexFlaw::OTHER_VERSION:
+      return "made by another version";
+    case IndexFlaw::OTHER_PROGRAM:
+      return "made by another program";
+  }
+  return "damaged";
+}
+
 bool HasFreshCopy(const std::string& damaged_path) {
   struct stat copy {};
   if (lstat(damaged_path.c_str(), &copy) != 0) {
@@ -40,11 +52,11 @@ bool HasFreshCopy(const std::string& damaged_path) {
 
 }  // namespace
 
-bool SetAside(const std::string& index_path, const char* reason) {
+bool SetAside(const std::string& index_path, IndexFlaw flaw, const char* reason) {
   const std::string damaged_path = index_path + ".damaged";
   if (HasFreshCopy(damaged_path)) {
-    syslog(LOG_ERR, "%s:%d index damaged and removed, path=%s, reason=%s", __FILE__, __LINE__,
-           index_path.c_str(), reason);
+    syslog(LOG_ERR, "%s:%d index %s and removed, path=%s, reason=%s", __FILE__, __LINE__,
+           FlawText(flaw), index_path.c_str(), reason);
     return RemoveAll(index_path);
   }
 
@@ -58,8 +70,8 @@ bool SetAside(const std::string& index_path, const char* reason) {
 
   // The copy's age counts from now, not from the last file that was made in it.
   (void)utimes(damaged_path.c_str(), nullptr);
-  syslog(LOG_ERR, "%s:%d index damaged and set aside, path=%s, copy=%s, reason=%s", __FILE__,
-         __LINE__, index_path.c_str(), damaged_path.c_str(), reason);
+  syslog(LOG_ERR, "%s:%d index %s and set aside, path=%s, copy=%s, reason=%s", __FILE__, __LINE__,
+         FlawText(flaw), index_path.c_str(), damaged_path.c_str(), reason);
   return true;
 }
 

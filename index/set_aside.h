@@ -6,10 +6,13 @@
 
 namespace fileindexd {
 
-// Moves a damaged index out of the way, to INDEX.damaged, and says so in the system log. One copy
-// is kept; one that is younger than an hour stays, and the index is removed instead. False, with
+// Why an index that holds something cannot be used.
+enum class IndexFlaw { DAMAGED, OTHER_VERSION, OTHER_PROGRAM };
+
+// Moves such an index out of the way, to INDEX.damaged, and says so in the system log. One copy is
+// kept; one that is younger than an hour stays, and the index is removed instead. False, with
 // errno, when it is still there.
-bool SetAside(const std::string& index_path, const char* reason);
+bool SetAside(const std::string& index_path, IndexFlaw flaw, const char* reason);
 
 // Makes INDEX an empty folder, mode 0700, whatever stands there. False with errno.
 bool MakeEmptyIndex(const std::string& index_path);

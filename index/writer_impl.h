@@ -80,6 +80,7 @@ struct EntryWriter::Impl {
   IndexError replay_error = IndexError::NONE;
   IndexError passed_error = IndexError::IO;  // of the operation that was last passed over
   bool reindex_owed = false;                 // the share's flag could not be set yet
+  bool loss_told = false;                    // the system log says why the database is gone
 
  private:
   IndexError TryOpen(bool create);

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Opening the writer's database, and what is recorded about it.
+#include <syslog.h>
+
 #include <ctime>
+#include <utility>
 
 #include "index/set_aside.h"
 #include "index/writer_impl.h"
@@ -42,13 +45,15 @@ IndexError EntryWriter::Impl::TryOpen(bool create) {
   }
 
   IndexError error = database.OpenForWriting(path, create);
+  loss_told = loss_told || database.has_set_aside;
   if (error == IndexError::NONE) {
     error = Prepare();
   }
   if (error == IndexError::DAMAGED) {
-    if (!SetAside(path, "its tables are not whole")) {
+    if (!SetAside(path, IndexFlaw::DAMAGED, "its tables are not whole")) {
       return IndexError::IO;
     }
+    loss_told = true;
     error = create ? database.OpenForWriting(path, true) : IndexError::PATH_NOT_FOUND;
     if (error == IndexError::NONE) {
       error = Prepare();
@@ -73,7 +78,9 @@ IndexError EntryWriter::Impl::OpenFirst() {
   ShareStatus status;
   const bool create = store.GetStatus(share_name, status) && status.rebuild_wanted;
   const IndexError error = TryOpen(create);
-  if (error == IndexError::PATH_NOT_FOUND) {
+  if (error == IndexError::NONE) {
+    loss_told = false;  // what was lost earlier is made good
+  } else if (error == IndexError::PATH_NOT_FOUND) {
     next_open = 0;  // told once: the first operation may make it anew
   }
   return error;
@@ -111,6 +118,10 @@ IndexError EntryWriter::Impl::Reopen() {
 
   const IndexError error = TryOpen(true);
   if (error == IndexError::NONE) {
+    if (!std::exchange(loss_told, false)) {
+      syslog(LOG_ERR, "%s:%d index missing and made anew, path=%s", __FILE__, __LINE__,
+             IndexPath(share_name).c_str());
+    }
     std::string ignored;  // the flag stands, and whoever touches stale queues helps
     (void)AppendToQueue(share_name, {}, ignored);
   } else if (!stood) {
@@ -133,7 +144,7 @@ void EntryWriter::Impl::CloseAll() {
 // Set aside now, so that whoever opens next finds that there is none.
 void EntryWriter::Impl::CloseDamaged() {
   CloseAll();
-  (void)SetAside(IndexPath(share_name), "found at work");
+  loss_told = SetAside(IndexPath(share_name), IndexFlaw::DAMAGED, "found at work");
   open_error = IndexError::DAMAGED;
   next_open = MonotonicMs() + OPEN_INTERVAL_MS;
 }

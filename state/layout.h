@@ -7,7 +7,7 @@
 //   ROOT/shares/NAME/TALO@file_index_queue.tmp  its drained copy
 //   ROOT/shares/NAME/index/                     entries
 //   ROOT/shares/NAME/contents/                  what was read out of files
-//   ROOT/shares/NAME/index.damaged/             a damaged database, set aside
+//   ROOT/shares/NAME/index.damaged/             a database that could not be used, set aside
 #pragma once
 
 #include <optional>

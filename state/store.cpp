@@ -56,6 +56,18 @@ bool StateStore::Impl::ReadVersion(int64_t& version) {
   return true;
 }
 
+// An opening would refuse it; what is open goes on: whoever upgrades a system while it runs starts
+// the programs anew.
+void StateStore::Impl::LookAtVersion() {
+  int64_t version = 0;
+  const bool newer = SchemaVersion(connection->db, version) == SQLITE_OK && version > STATE_VERSION;
+  if (newer && !newer_told) {
+    syslog(LOG_ERR, "%s:%d %s; it is used until this program ends", __FILE__, __LINE__,
+           NewerVersion(connection->path, version).c_str());
+  }
+  newer_told = newer;
+}
+
 // Several times for each document: where nothing was committed at all, two rounds of file locks are
 // spared.
 bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
@@ -69,11 +81,16 @@ bool StateStore::Impl::Ready() {
   return (useful && !HasStateMoved(*connection)) || Open();
 }
 
-// SQLite opens a file that it may not write for reading only, and would stay with that for ever.
+// SQLite opens a file that it may not write for reading only, and would stay with that for ever. A
+// damaged one is put right by an opening, and by nothing else.
 bool StateStore::Impl::FailSql() {
   const int code = sqlite3_errcode(connection->db) & 0xff;
-  files_failed =
-      files_failed || code == SQLITE_IOERR || code == SQLITE_CANTOPEN || code == SQLITE_READONLY;
+  const bool damaged = code == SQLITE_CORRUPT || code == SQLITE_NOTADB;
+  if (damaged) {
+    TidyOnClose(*connection, false);
+  }
+  files_failed = files_failed || damaged || code == SQLITE_IOERR || code == SQLITE_CANTOPEN ||
+                 code == SQLITE_READONLY;
   return Fail(StateError(*connection, "cannot use"));
 }
 
@@ -218,6 +235,7 @@ bool StateStore::GetSettings(std::shared_ptr<const Settings>& settings) {
     if (!impl->Load(*loaded)) {
       return false;
     }
+    impl->LookAtVersion();
     impl->cached = loaded;
     impl->cached_version = version;
   }

@@ -131,6 +131,10 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
     result = Exec(connection, "COMMIT");
   }
   if (result == SQLITE_OK) {
+    if (version > 0) {
+      syslog(LOG_ERR, "%s:%d %s is upgraded from version %d to %d", __FILE__, __LINE__,
+             connection.path.c_str(), static_cast<int>(version), STATE_VERSION);
+    }
     return Opened::GOOD;
   }
   const Opened outcome = Failed(connection, "cannot upgrade", result, error);
@@ -146,8 +150,7 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     return Failed(connection, "cannot read", result, error);
   }
   if (version > STATE_VERSION) {
-    error = connection.path + " has version " + std::to_string(version) +
-            ", made by a newer program; this one knows " + std::to_string(STATE_VERSION);
+    error = NewerVersion(connection.path, version);
     return Opened::FAILED;
   }
   // A copy exists only beside a database that had its tables: an empty one has lost them.
@@ -165,14 +168,6 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     return Opened::DAMAGED;
   }
   return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
-}
-
-// Whether closing writes the log back into the database and removes it. Off while the database is
-// not known to be sound: what is set aside must be what was found.
-void TidyOnClose(const StateConnection& connection, bool tidy) {
-  int keep_log = tidy ? 0 : 1;
-  sqlite3_db_config(connection.db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep_log, nullptr);
-  sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_PERSIST_WAL, &keep_log);
 }
 
 Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) {
@@ -280,6 +275,17 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
 
 }  // namespace
 
+void TidyOnClose(const StateConnection& connection, bool tidy) {
+  int keep_log = tidy ? 0 : 1;
+  sqlite3_db_config(connection.db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep_log, nullptr);
+  sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_PERSIST_WAL, &keep_log);
+}
+
+std::string NewerVersion(const std::string& path, int64_t version) {
+  return path + " has version " + std::to_string(version) +
+         ", made by a newer program; this one knows " + std::to_string(STATE_VERSION);
+}
+
 std::string StateError(const StateConnection& connection, const char* what) {
   return std::string(what) + " " + connection.path + ": " + sqlite3_errmsg(connection.db);
 }
@@ -346,7 +352,6 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     connection.reset();  // or its closing would write to what is put in place
     const std::string found = error;
     if (!PutCopyInPlace(path, lock, error)) {
-      syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, error.c_str());
       return nullptr;
     }
     syslog(LOG_ERR, "%s:%d %s; its last copy is used instead, and it is kept as %s.damaged",

@@ -44,6 +44,10 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 // `error` is what kept it from being opened. In store_unlogged.cpp.
 bool OpenFullState(StateConnection& connection, const std::string& error);
 
+// Whether closing writes the log back into the database and removes it. Not where the database is
+// not known to be sound: what is set aside must be what was found.
+void TidyOnClose(const StateConnection& connection, bool tidy);
+
 // Leaves a copy of what is committed beside the database. It is checked before it replaces the one
 // that is there. False on failure, and that one stays.
 bool LeaveStateCopy(const StateConnection& connection, std::string& error);
@@ -57,6 +61,9 @@ bool ReadLogHead(const StateConnection& connection, LogHead& head);
 
 // True when the open file is no longer the one at its path: it was set aside or removed.
 bool HasStateMoved(const StateConnection& connection);
+
+// That a database is of a version that this program does not know, in one line.
+std::string NewerVersion(const std::string& path, int64_t version);
 
 // The connection's last error in one line.
 std::string StateError(const StateConnection& connection, const char* what);

@@ -45,6 +45,8 @@ struct StateStore::Impl {
   Outcome Done(bool good) { return good ? Outcome::CHANGED : Outcome::FAILED; }
 
   bool ReadVersion(int64_t& version);
+  // Says it once when another program has made the open database one of a newer version.
+  void LookAtVersion();
   bool IsCacheGood(const std::optional<LogHead>& head);
 
   // True with `found` when the text that is bound to column 1 has a row.
@@ -66,6 +68,7 @@ struct StateStore::Impl {
   std::unique_ptr<StateConnection> connection;
   bool files_failed = false;              // of this connection
   bool full_told = false;                 // that the disk is full, since it last was not
+  bool newer_told = false;                // of the version, since it last was ours
   std::optional<Statement> data_version;  // goes before the connection
   int64_t cached_version = 0;
   std::optional<LogHead> cached_head;      // of the log, before `cached_version` was asked for

@@ -20,6 +20,7 @@ struct Environment {
   std::mutex mutex;
   std::unique_ptr<StateStore> store;
   bool open_failure_told = false;
+  std::set<std::string> failing;  // what the store does not give or take, and a log line has told
   std::shared_ptr<const Settings> settings = std::make_shared<Settings>();
   std::map<std::string, bool> commits;  // by share: whether the last one was good
   std::set<std::string> reopening;      // shares with a good commit and no opening since
@@ -53,6 +54,17 @@ void RaiseDescriptorLimit(rlimit& before) {
   rlimit raised = before;
   raised.rlim_cur = raised.rlim_max;
   (void)setrlimit(RLIMIT_NOFILE, &raised);  // as good as it gets
+}
+
+// Whether a failure is the first since the same last went well. Each pass asks many times.
+bool IsNews(const std::string& what, bool good) {
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  if (good) {
+    process.failing.erase(what);
+    return false;
+  }
+  return process.failing.insert(what).second;
 }
 
 }  // namespace
@@ -91,7 +103,7 @@ std::shared_ptr<const Settings> CurrentSettings() {
   StateStore* store = Store();
   std::shared_ptr<const Settings> settings;
   const bool read = store != nullptr && store->GetSettings(settings);
-  if (store != nullptr && !read) {
+  if (store != nullptr && IsNews("settings", read)) {
     FI_LOG("Failed to read settings: %s", store->Error().c_str());
   }
 
@@ -106,7 +118,7 @@ std::shared_ptr<const Settings> CurrentSettings() {
 ShareStatus StatusOf(const std::string& share) {
   ShareStatus status;
   StateStore* store = Store();
-  if (store != nullptr && !store->GetStatus(share, status)) {
+  if (store != nullptr && IsNews("status of " + share, store->GetStatus(share, status))) {
     FI_LOG("Failed to read status of share[%s]: %s", share.c_str(), store->Error().c_str());
   }
   return status;
@@ -117,11 +129,11 @@ bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus
   if (store == nullptr) {
     return false;
   }
-  if (!store->UpdateStatus(share, change)) {
+  const bool changed = store->UpdateStatus(share, change);
+  if (IsNews("change of " + share, changed)) {
     FI_LOG("Failed to store status of share[%s]: %s", share.c_str(), store->Error().c_str());
-    return false;
   }
-  return true;
+  return changed;
 }
 
 bool RequestReindex(const std::string& share) {

@@ -17,10 +17,12 @@ namespace fileindexd {
 // it cannot be opened; the next call tries again.
 StateStore* Store();
 
+// What follows tells a failure once, until the same goes well again.
+
 // The settings in force. When they cannot be read, the last ones that could, or empty ones.
 std::shared_ptr<const Settings> CurrentSettings();
 
-// The share's status; the default, after a log line, when it cannot be read.
+// The share's status; the default when it cannot be read.
 ShareStatus StatusOf(const std::string& share);
 bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus&)>& change);
 

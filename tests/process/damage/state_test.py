@@ -1,7 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """A state database that was damaged, removed or replaced: its copy is used, or all say what is wrong."""
 
-import contextlib
+import ctypes
 import os
 import re
 import shutil
@@ -13,6 +13,12 @@ CREATE = 0x40
 FILE = f"{namespace.STATE}/state.db"
 COPY = f"{FILE}.copy"
 USED = re.compile(r".*state\.db.*its last copy is used instead, and it is kept as .*\.damaged")
+NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")
+UPGRADED = re.compile(r".*state\.db is upgraded from version 1 to \d+")
+UNREAD = re.compile(r"Failed to (read|store) .*")
+REINDEX = 0x10000
+AT_FDCWD = -100
+RENAME_EXCHANGE = 2
 
 
 def remove(path):
@@ -23,7 +29,7 @@ def remove(path):
 
 
 def remove_all_of(path):
-    for ending in ("", "-wal", "-shm"):
+    for ending in ("-wal", "-shm", ""):  # the last is what programs look for, and make anew
         remove(path + ending)
 
 
@@ -38,12 +44,13 @@ def truncate(part):
 
 
 def make_full_folder(path):
-    os.makedirs(f"{path}.folder/in/its/place")
-    while True:
-        remove(path)
-        with contextlib.suppress(NotADirectoryError):  # a program has made it anew meanwhile
-            os.rename(f"{path}.folder", path)
-            return
+    made = f"{path}.folder"
+    os.makedirs(f"{made}/in/its/place")
+    libc = ctypes.CDLL(None, use_errno=True)
+    names = (AT_FDCWD, os.fsencode(made), AT_FDCWD, os.fsencode(path))
+    if libc.renameat2(*names, RENAME_EXCHANGE) != 0:
+        raise OSError(ctypes.get_errno(), "renameat2", path)
+    os.unlink(made)
 
 
 def make_pipe(path):
@@ -51,10 +58,46 @@ def make_pipe(path):
     os.rename(f"{path}.pipe", path)  # programs make the file anew where it is missing
 
 
+def copy_log_back():
+    """So that the main file alone holds the state, for those too who have it open."""
+    with sqlite3.connect(FILE) as db:
+        while db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] != 0:
+            pass  # a reader was in the way
+    db.close()
+
+
 def set_version(number):
     with sqlite3.connect(FILE) as db:
         db.execute(f"PRAGMA user_version = {number}")
     db.close()
+
+
+# As the first version made it, with what the share and its folder are now.
+VERSION_1 = """
+CREATE TABLE old.share(name BLOB PRIMARY KEY, path BLOB NOT NULL UNIQUE, filesystem TEXT NOT NULL)
+    WITHOUT ROWID;
+CREATE TABLE old.folder(path BLOB PRIMARY KEY, share BLOB NOT NULL, document INT NOT NULL,
+    audio INT NOT NULL, video INT NOT NULL, photo INT NOT NULL) WITHOUT ROWID;
+CREATE TABLE old.status(share BLOB PRIMARY KEY, needs_reindex INT NOT NULL,
+    reindex_begun INT NOT NULL, no_space INT NOT NULL, missing INT NOT NULL,
+    rebuild_wanted INT NOT NULL) WITHOUT ROWID;
+CREATE TABLE old.number(name TEXT PRIMARY KEY, value INT NOT NULL) WITHOUT ROWID;
+CREATE TABLE old.marker(name BLOB PRIMARY KEY) WITHOUT ROWID;
+INSERT INTO old.share SELECT name, path, filesystem FROM share;
+INSERT INTO old.folder SELECT path, share, document, audio, video, photo FROM folder;
+INSERT INTO old.marker SELECT name FROM marker;
+PRAGMA old.user_version = 1;
+"""
+
+
+def replace_by_version_1():
+    with sqlite3.connect(FILE) as db:
+        db.execute("ATTACH ? AS old", (f"{FILE}.old",))
+        db.executescript(VERSION_1)
+    db.close()
+    remove_all_of(FILE)
+    remove(COPY)
+    os.rename(f"{FILE}.old", FILE)
 
 
 # The copy makes these good.
@@ -69,6 +112,13 @@ DAMAGES = (
     ("folder in its place", lambda: make_full_folder(FILE)),
     ("pipe in its place", lambda: make_pipe(FILE)),
 )
+# These too, in the file that the programs have open: each finds out by itself.
+IN_PLACE = (
+    ("truncated to nothing", lambda: os.truncate(FILE, 0)),
+    ("truncated to half", lambda: truncate(0.5)),
+    ("header overwritten", lambda: scribble(FILE)),
+    ("middle overwritten", lambda: scribble(FILE, 4096)),
+)
 
 
 class StateTest(IndexTest):
@@ -76,6 +126,14 @@ class StateTest(IndexTest):
         self.root = self.make_share(files=("a.txt", "d/b.txt"))
         self.pid = self.start()
         self.await_drained("alpha")
+        self.log.program, daemon = "talocontentsearchd", self.log.program
+        self.await_line("reads")  # nobody opens the database meanwhile
+        self.log.program = daemon
+
+    def told(self, pattern, after):
+        """The lines that match, of all programs."""
+        self.log.mark()
+        return [line for line in self.log.lines[after:] if pattern.fullmatch(line.text)]
 
     def assert_all_said(self, pattern):
         """Every tool ends with one line that tells."""
@@ -107,18 +165,33 @@ class StateTest(IndexTest):
         after = self.log.mark()
         self.start()
 
-        told = [text for text in self.log.texts(after) if USED.fullmatch(text)]
-        self.assertEqual(len(told), 1)
+        self.assertEqual(len(self.told(USED, after)), 1)
         self.check_works()
 
     def damaged_while_running(self, damage):
         self.prepare()
+        after = self.log.mark()
         damage()
 
         self.check_works()
 
         self.stop(self.pid)
         self.start()
+        self.check_works()
+        self.assertEqual(len(self.told(USED, after)), 1)
+
+    def damaged_in_place(self, damage):
+        self.prepare()
+        copy_log_back()
+        after = self.log.mark()
+        damage()
+
+        # No tool comes to its help.
+        self.append("alpha", {"event": REINDEX, "path": self.root})
+        self.await_drained("alpha")
+
+        self.assertEqual(len(self.told(USED, after)), 1)
+        self.assertLessEqual(len(self.told(UNREAD, after)), 1)
         self.check_works()
 
     def test_newer_version_is_refused_by_name(self):
@@ -135,6 +208,53 @@ class StateTest(IndexTest):
         self.assert_all_said(r"state\.db has version 99")
         with open(FILE, "rb") as file:
             self.assertEqual(file.read(), before)
+
+    def test_newer_version_while_running_is_told_once_and_used_until_the_end(self):
+        self.prepare()
+        after = self.log.mark()
+        set_version(99)
+
+        for name in ("first.txt", "second.txt"):
+            self.make_files(self.root, name)
+            self.append("alpha", {"event": CREATE, "path": f"{self.root}/{name}"})
+            self.await_drained("alpha")
+
+        told = [line for line in self.told(NEWER, after) if line.program == "fileindexd"]
+        self.assertEqual(len(told), 1)
+        self.assert_all_said(r"state\.db has version 99")
+        self.stop(self.pid)
+        set_version(4)
+        self.start()
+        self.assert_index(self.root)
+
+    def test_older_version_is_upgraded_and_told_once(self):
+        self.prepare()
+        self.stop(self.pid)
+        replace_by_version_1()
+        after = self.log.mark()
+
+        self.start()
+
+        self.check_works()
+        self.assertEqual(len(self.told(UPGRADED, after)), 1)
+        self.assertEqual(self.told(USED, after), [])
+
+    def test_both_damaged_while_running_is_told_once(self):
+        self.prepare()
+        copy_log_back()
+        after = self.log.mark()
+        scribble(COPY)
+        scribble(FILE)
+
+        for _ in range(2):
+            ended = self.log.mark()
+            self.append("alpha", {"event": REINDEX, "path": self.root})
+            self.await_line("Worker[alpha] failed to commit db", ended)
+
+        told = [line.text for line in self.told(UNREAD, after) if line.program == "fileindexd"]
+        self.assertGreater(len(told), 0)
+        self.assertEqual(len(set(text.split(":")[0] for text in told)), len(told), told)
+        self.assert_all_said(r"state\.db.*no sound copy")
 
     def test_both_damaged(self):
         self.prepare()
@@ -179,6 +299,12 @@ def add_cases():
 
             words = re.sub(r"\W+", "_", name)
             setattr(StateTest, f"test_{words}_while_{state}", test)
+    for name, damage in IN_PLACE:
+        def test_in_place(self, damage=damage):
+            self.damaged_in_place(damage)
+
+        words = re.sub(r"\W+", "_", name)
+        setattr(StateTest, f"test_{words}_in_place_while_running", test_in_place)
 
 
 add_cases()

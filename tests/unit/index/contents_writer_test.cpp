@@ -346,6 +346,18 @@ TEST_F(ContentsWriterTest, DamagedContentsAreSetAsideAndMadeAnew) {
   EXPECT_EQ(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
 }
 
+TEST_F(ContentsWriterTest, ContentsOfAnotherVersionAreSetAsideAndMadeAnew) {
+  File("a.txt");
+  Read();
+  contents.reset();
+  Run("sqlite3 " + ContentsPath("s") + "/contents.db 'PRAGMA user_version = 99'");
+
+  OpenContents();
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  EXPECT_EQ(access((ContentsPath("s") + ".damaged/contents.db").c_str(), F_OK), 0);
+}
+
 // Every question that the writer asks of the entries meets a page that is not whole.
 TEST_F(ContentsWriterTest, DamagedEntriesTakeNothingFromTheContents) {
   File("a.txt");

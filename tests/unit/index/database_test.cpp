@@ -9,6 +9,7 @@
 #include <filesystem>
 
 #include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -45,6 +46,20 @@ class DatabaseTest : public IndexTest {
     EXPECT_FALSE(Status().rebuild_wanted);
     AddAll();
     EXPECT_EQ(Differences(), Names());
+  }
+
+  // Of a table of the database in that folder; -1: it cannot be asked.
+  int64_t RowsIn(const std::string& place, const std::string& table) {
+    sqlite3* db = nullptr;
+    int64_t rows = -1;
+    Statement ask;
+    if (sqlite3_open((place + "/entries.db").c_str(), &db) == SQLITE_OK &&
+        ask.Prepare(db, ("SELECT count(*) FROM " + table).c_str()) == SQLITE_OK &&
+        ask.Step() == SQLITE_ROW) {
+      rows = ask.Int(0);
+    }
+    sqlite3_close_v2(db);
+    return rows;
   }
 
   std::string index;
@@ -125,17 +140,40 @@ TEST_F(DatabaseTest, PipeInPlaceOfTheFolderIsMissedThenRebuilt) {
   ExpectMissedThenRebuilt();
 }
 
-TEST_F(DatabaseTest, OtherSchemaIsMissedThenRebuilt) {
+TEST_F(DatabaseTest, DatabaseOfAnotherVersionIsSetAsideThenRebuilt) {
+  for (const char* version : {"0", "99"}) {
+    writer.reset();
+    RemoveTree(DamagedIndexPath("s"));
+    Run("sqlite3 " + file + " 'PRAGMA user_version = " + version + "'");
+    ExpectMissedThenRebuilt();
+    EXPECT_EQ(RowsIn(DamagedIndexPath("s"), "entries"), 2) << version;
+  }
+}
+
+TEST_F(DatabaseTest, DatabaseOfAnotherProgramIsSetAsideThenRebuilt) {
+  RemoveTree(index);
+  MakeFolder(index);
+  Run("sqlite3 " + file + " 'CREATE TABLE t(a); INSERT INTO t VALUES(1)'");
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(RowsIn(DamagedIndexPath("s"), "t"), 1);
+}
+
+TEST_F(DatabaseTest, DatabaseWithoutAnyTableIsMissedThenRebuilt) {
+  RemoveTree(index);
+  MakeFolder(index);
   Run("sqlite3 " + file + " 'PRAGMA user_version = 99'");
   ExpectMissedThenRebuilt();
   EXPECT_FALSE(Exists(DamagedIndexPath("s")));
 }
 
-TEST_F(DatabaseTest, ForeignDatabaseIsMissedThenRebuilt) {
-  RemoveTree(index);
-  MakeFolder(index);
-  Run("sqlite3 " + file + " 'CREATE TABLE t(a)'");
-  ExpectMissedThenRebuilt();
+TEST_F(DatabaseTest, DatabaseOfAnotherVersionIsSetAsideByARebuildToo) {
+  Run("sqlite3 " + file + " 'PRAGMA user_version = 99'");
+  WantRebuild();
+
+  OpenWriter();
+
+  ASSERT_TRUE(writer->IsOpen()) << IndexErrorText(writer->last_error);
+  EXPECT_EQ(RowsIn(DamagedIndexPath("s"), "entries"), 2);
 }
 
 TEST_F(DatabaseTest, GarbageIsSetAsideThenRebuilt) {
@@ -200,6 +238,15 @@ TEST_F(DatabaseTest, ReadingRepairsAndMovesNothing) {
 
   EXPECT_EQ(reader.Open("s"), IndexError::DAMAGED);
   EXPECT_EQ(ReadFile(file), std::string(9000, 'x'));
+  EXPECT_FALSE(Exists(DamagedIndexPath("s")));
+}
+
+TEST_F(DatabaseTest, ReadingLeavesWhatIsOfAnotherVersion) {
+  Run("sqlite3 " + file + " 'PRAGMA user_version = 99'");
+  EntryReader reader;
+
+  EXPECT_EQ(reader.Open("s"), IndexError::PATH_NOT_FOUND);
+  EXPECT_EQ(RowsIn(index, "entries"), 2);
   EXPECT_FALSE(Exists(DamagedIndexPath("s")));
 }
 

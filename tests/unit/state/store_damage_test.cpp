@@ -118,6 +118,28 @@ TEST_F(StoreDamageTest, AnOpenStoreFollowsADatabaseThatWasReplaced) {
   EXPECT_EQ(settings->folders.size(), 2U);
 }
 
+// Written over in place: no other program says so by putting another file there.
+TEST_F(StoreDamageTest, AnOpenStoreMendsADatabaseThatWasOverwritten) {
+  for (const size_t kept : {0, 4096, 5000}) {
+    const auto store = OpenStore();
+    ExpectAllThere(*store);
+    Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
+    ASSERT_TRUE(OpenStore()->SetPause(static_cast<int64_t>(kept)));
+    const std::string log = ReadFile(database + "-wal");
+    std::string damaged = ReadFile(database);
+    damaged.replace(kept, damaged.size() - kept, damaged.size() - kept, '\x5a');
+    WriteFile(database, damaged);
+
+    ShareStatus status;
+    (void)store->GetStatus("a", status);  // this one may be told that it failed
+
+    ASSERT_TRUE(store->GetStatus("a", status)) << kept << ": " << store->Error();
+    ExpectAllThere(*store);
+    EXPECT_TRUE(ReadFile(database + ".damaged") == damaged) << kept;
+    EXPECT_TRUE(ReadFile(database + ".damaged-wal") == log) << kept;
+  }
+}
+
 TEST_F(StoreDamageTest, TheCopyHoldsTheLastChangeAndStandsAlone) {
   const auto store = OpenStore();
   ASSERT_TRUE(store->SetPause(1234));
