@@ -8,14 +8,7 @@ import subprocess
 from harness import main, namespace
 from harness.awaiting import LIMIT
 from harness.batch_load import ENDED
-from harness.filesystems import (
-    CREATE,
-    REINDEX,
-    FilesystemTest,
-    can_use_loop_devices,
-    run,
-    unmount,
-)
+from harness.filesystems import CREATE, REINDEX, FilesystemTest, need_loop_devices, run, unmount
 
 IMAGE_SIZE = 64 << 20
 FSCK_MENDED = 1
@@ -97,8 +90,7 @@ class ReadOnlyDiskTest(ReadOnlyState, FilesystemTest):
     """The kernel found an error of the file system, and lets nobody write there any more."""
 
     def make_state_disk(self):
-        if not can_use_loop_devices():
-            self.skipTest("no loop devices here")
+        need_loop_devices(self)
         self.state_image = f"{namespace.RUN}/state.image"
         with open(self.state_image, "wb") as file:
             file.truncate(IMAGE_SIZE)
