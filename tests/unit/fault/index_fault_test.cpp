@@ -10,8 +10,10 @@
 #include <string>
 #include <vector>
 
+#include "platform/log.h"
 #include "state/layout.h"
 #include "unit/fault/each.h"
+#include "unit/fault/operations.h"
 #include "unit/fault/world.h"
 
 namespace fileindexd::fault {
@@ -31,6 +33,7 @@ void ExpectLogged(const std::vector<std::string>& any_of) {
 }
 
 void Live(const Fault& fault, int nth) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
   World world;
   Arm(fault, nth);
   // A Worker whose making fails is made by the next start, or by who asks for it.
@@ -48,6 +51,7 @@ void Live(const Fault& fault, int nth) {
   world.Touch();
   world.Burst();
   world.ExpectWhole();
+  ExpectEachOperationLogged();
 }
 
 }  // namespace
