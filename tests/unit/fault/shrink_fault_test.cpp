@@ -79,12 +79,15 @@ TEST_P(ShrinkFaultTest, NextTouchMakesGood) {
   ForEachCall(fault, [&fault](int nth) { Shrink(fault, nth); });
 }
 
-INSTANTIATE_TEST_SUITE_P(Shrink, ShrinkFaultTest,
-                         testing::Values(Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE,
-                                               Target::ENTRIES},
-                                         Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES},
-                                         Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES},
-                                         Fault{Call::STATEMENT, SQLITE_IOERR, Target::ENTRIES},
-                                         Fault{Call::MEMORY, SQLITE_NOMEM}));
+INSTANTIATE_TEST_SUITE_P(
+    Shrink, ShrinkFaultTest,
+    testing::Values(Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::ENTRIES},
+                    Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::ENTRIES, FOR_EVER},
+                    Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES},
+                    Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES},
+                    Fault{Call::STATEMENT, SQLITE_IOERR, Target::ENTRIES},
+                    Fault{Call::MEMORY, SQLITE_NOMEM},
+                    Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES, FOR_EVER},
+                    Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES, FOR_EVER}));
 
 }  // namespace fileindexd::fault
