@@ -27,7 +27,6 @@ namespace {
 constexpr uint64_t EVENTS = 1000000;
 constexpr uint64_t IN_A_FOLDER = 100;
 constexpr size_t LINES = 5000;  // in one queue file
-constexpr int FLOODS = 3;       // not as many rounds as elsewhere: each makes all its files anew
 
 std::string FolderName(const std::string& root, uint64_t folder) {
   char name[64];
@@ -135,7 +134,7 @@ int main(int argc, char** argv) {
   std::vector<double> ours;
   std::vector<double> bare;
   std::vector<double> ours_of_few;
-  for (int flood = 0; flood < FLOODS; ++flood) {
+  for (int flood = 0; flood < ROUNDS; ++flood) {
     const std::string number = std::to_string(flood);
     ours_of_few.push_back(MeasureFlood(daemon, scratch.path, "few-" + number, few).ours);
     const Flood measured = MeasureFlood(daemon, scratch.path, "many-" + number, events);

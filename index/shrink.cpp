@@ -99,9 +99,12 @@ class Shrinker {
       return false;
     }
     bool copied = false;
-    if (!CopyLogBack(db, copied) || !copied) {
-      reader_in_the_way = !copied;
-      return reader_in_the_way;
+    if (!CopyLogBack(db, copied)) {
+      return false;
+    }
+    if (!copied) {
+      reader_in_the_way = true;
+      return true;
     }
     done = true;
     return RunAlone(db, "UPDATE meta SET removed = 0 WHERE id = 1");

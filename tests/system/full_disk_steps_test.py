@@ -13,7 +13,7 @@ from harness.filesystems import (
     REINDEX,
     RENAME,
     FilesystemTest,
-    can_use_loop_devices,
+    need_loop_devices,
     run,
 )
 from harness.scale import IS_LONG
@@ -142,8 +142,7 @@ class FullExt4StepsTest(FullDiskSteps, FilesystemTest):
 
     def setUp(self):
         super().setUp()
-        if not can_use_loop_devices():
-            self.skipTest("no loop devices here")
+        need_loop_devices(self)
         image = f"{namespace.RUN}/state.image"
         with open(image, "wb") as file:
             file.truncate(SIZE)

@@ -5,13 +5,7 @@ import os
 import re
 
 from harness import main, namespace
-from harness.filesystems import (
-    CREATE,
-    REINDEX,
-    FilesystemTest,
-    can_use_loop_devices,
-    run,
-)
+from harness.filesystems import CREATE, REINDEX, FilesystemTest, need_loop_devices, run
 from harness.machine import PID_FILE
 
 FILES = 2000
@@ -42,8 +36,7 @@ class FailingStateDiskTest(FilesystemTest):
 
     def setUp(self):
         super().setUp()
-        if not can_use_loop_devices():
-            self.skipTest("no loop devices here")
+        need_loop_devices(self)
         os.mkdir(BELOW)
         namespace.mount("tmpfs", BELOW, "tmpfs", options="size=128m")
         image = f"{BELOW}/image"
@@ -149,8 +142,7 @@ class FullExt4AtTheStartTest(FullAtTheStart, FilesystemTest):
 
     def setUp(self):
         super().setUp()
-        if not can_use_loop_devices():
-            self.skipTest("no loop devices here")
+        need_loop_devices(self)
         image = f"{namespace.RUN}/state.image"
         with open(image, "wb") as file:
             file.truncate(16 << 20)

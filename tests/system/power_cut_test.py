@@ -17,7 +17,7 @@ import signal
 
 from harness import LoadTest, main, namespace
 from harness.awaiting import children
-from harness.filesystems import CREATE, REINDEX, can_use_loop_devices, on_each, run
+from harness.filesystems import CREATE, REINDEX, need_loop_devices, on_each, run
 from harness.scale import IS_LONG
 
 CUTS = 34 if IS_LONG else 4
@@ -47,8 +47,7 @@ def clone(source, target):
 class PowerCut(LoadTest):
     def setUp(self):
         super().setUp()
-        if not can_use_loop_devices():
-            self.skipTest("no loop devices here")
+        need_loop_devices(self)
         make_file(f"{namespace.RUN}/carrier.image", 2 << 30)
         run(*MAKE["btrfs"], f"{namespace.RUN}/carrier.image")
         os.mkdir(CARRIER)

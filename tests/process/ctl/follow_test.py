@@ -3,6 +3,7 @@
 
 import contextlib
 import json
+import math
 import os
 import pty
 import select
@@ -284,6 +285,79 @@ class ProgressTest(IndexTest):
         self.stop(pid)
 
         self.assertFalse(os.path.lexists(self.path()))
+
+
+class ComparisonTest(IndexTest):
+    """A comparison that cannot go on while nobody reads what it found."""
+
+    FILES = 3000
+    NAME = "name of a file that is longer than most " * 4
+    PART = 8192
+
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(files=[f"{i} {self.NAME}" for i in range(self.FILES)])
+        pid = self.start(debug=False)
+        self.await_drained("alpha")
+        self.stop(pid)
+        for name in os.listdir(self.root):
+            os.utime(f"{self.root}/{name}", (0, 0))
+
+    def begin(self):
+        return subprocess.Popen(
+            [program("fileindexctl"), "verify", "alpha"],
+            env=environment(),
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.PIPE,
+        )
+
+    def read_until_it_is_shown(self, stdout):
+        """It says how far it is when a second is over: so long it gets little to go on."""
+        path = f"{namespace.STATE}/shares/alpha/comparison"
+
+        def is_written():
+            return os.path.lexists(path) and os.path.getsize(path) > 0
+
+        while not await_in_folder(path, is_written, 0.1):
+            self.assertNotEqual(os.read(stdout.fileno(), self.PART), b"", "ended and never shown")
+        with open(path, encoding="utf-8") as file:
+            return json.loads(file.read())
+
+    def test_it_is_shown_with_its_rate_and_its_time_left(self):
+        follower = Follower("--json")
+        with self.begin() as verify:
+            said = self.read_until_it_is_shown(verify.stdout)
+            status = follower.await_status(lambda one: one["shares"][0]["progress"] is not None)
+            text = self.ctl("status").out.decode()
+            before = len(follower.statuses())
+            verify.stdout.read()
+        follower.await_status(
+            lambda one: one["shares"][0]["progress"] is None
+            and one in follower.statuses()[before:]
+        )
+
+        self.assertEqual(verify.returncode, 1)
+        self.assertEqual((said["what"], said["total"]), ("comparison", self.FILES + 1))
+        exact = said["done"] * 1000 / (said["updated"] - said["began"])
+        rate = math.floor(exact + 0.5)
+        left = math.ceil((said["total"] - said["done"]) / exact)
+        self.assertGreater(left, 0)
+        self.assertEqual(
+            status["shares"][0]["progress"],
+            {
+                "what": "comparison",
+                "done": said["done"],
+                "total": said["total"],
+                "rate": rate,
+                "seconds_left": left,
+            },
+        )
+        self.assertIn(
+            f"comparison, {said['done']} of about {said['total']} entries, "
+            f"{rate} a second, about {left} s left\n",
+            text,
+        )
+        self.assertEqual(follower.stop(), (0, b""))
 
 
 class MissingIndexTest(IndexTest):

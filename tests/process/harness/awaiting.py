@@ -15,6 +15,10 @@ IN_CHANGE = 0x00000FC2  # the same without opening and closing: what a look itse
 IN_CLOSE = 0x00000018
 IN_CLOEXEC = 0o2000000
 
+FUTEX = 202  # the number of the call, on amd64
+FUTEX_COMMAND = 0x7F
+FUTEX_WAIT_BITSET = 9  # of a condition; that of a mutex is another
+
 _libc = ctypes.CDLL(None, use_errno=True)
 
 
@@ -101,3 +105,16 @@ def children():
         if int(text.rpartition(")")[2].split()[1]) == os.getpid():
             found[int(name)] = text.partition("(")[2].rpartition(")")[0]
     return found
+
+
+def waits_on_condition(pid):
+    """Whether a thread of the process waits on a condition."""
+    for thread in os.listdir(f"/proc/{pid}/task"):
+        try:
+            with open(f"/proc/{pid}/task/{thread}/syscall", encoding="ascii") as file:
+                call = file.read().split()
+        except OSError:
+            continue  # it has ended meanwhile
+        if call[0] == str(FUTEX) and int(call[2], 16) & FUTEX_COMMAND == FUTEX_WAIT_BITSET:
+            return True
+    return False

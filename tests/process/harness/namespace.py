@@ -11,6 +11,8 @@ import stat
 import subprocess
 import sys
 
+from harness.scale import IS_LONG
+
 SKIPPED = 77  # the exit status that ctest counts as "skipped"
 
 RUN = "/run"
@@ -27,6 +29,11 @@ LOOP_DEVICES = 64
 _MARK = "FILEINDEXD_TEST_INSIDE"
 _libc = ctypes.CDLL(None, use_errno=True)
 _world_mounted = False
+
+
+def has_loop_devices():
+    """Whoever is root of a namespace of its own alone has none."""
+    return os.access("/dev/loop-control", os.R_OK | os.W_OK)
 
 
 def mount(source, target, kind="none", flags=0, options=""):
@@ -52,8 +59,8 @@ def enter():
     if os.geteuid() != 0:
         command += ["--user", "--map-root-user"]
     if subprocess.run([*command, "true"], check=False).returncode != 0:
-        print("no private namespaces here: skipped")
-        sys.exit(SKIPPED)
+        print("no private namespaces here" + ("" if IS_LONG else ": skipped"))
+        sys.exit(1 if IS_LONG else SKIPPED)
 
     os.environ[_MARK] = "1"
     os.environ["FILEINDEXD_BIN_DIR"] = os.path.abspath(os.environ["FILEINDEXD_BIN_DIR"])
@@ -79,7 +86,7 @@ def _make_dev():
         os.close(fd)
     for number in range(LOOP_DEVICES):
         path = f"/dev/loop{number}"
-        if os.geteuid() == 0 and "loop-control" in devices and not os.path.exists(path):
+        if has_loop_devices() and not os.path.exists(path):
             os.mknod(path, stat.S_IFBLK | 0o600, os.makedev(LOOP_MAJOR, number))
     os.symlink("/proc/self/fd", "/dev/fd")
     os.mkdir("/dev/pts")

@@ -93,9 +93,10 @@ class SystemLog:
         with self.changed:
             return self.changed.wait_for(lambda: not self.reading.is_set(), limit)
 
-    def go_on(self):
+    def go_on(self, wanted=None, count=0):
+        """Reading goes on; with a line given, until the next hold."""
         with self.changed:
-            self.hold_behind = None
+            self.hold_behind = (wanted, count) if count > 0 else None
             self.reading.set()
 
     def close(self):

@@ -1,7 +1,9 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """A known file is found at every moment while its share is indexed again or repaired."""
 
+import itertools
 import os
+import re
 
 from harness import main
 from harness.sampling import SamplingTest
@@ -10,6 +12,11 @@ from harness.scale import IS_LONG
 FILES = 200_000 if IS_LONG else 3_000
 IN_A_FOLDER = 500
 EACH = FILES // 30  # every so many files, one is known
+STALE = 2_400  # of the others
+NEW = 6_000
+MOST_LINES = 5_000  # that a repair queues
+MOMENTS = 3  # of a work, at which it is held for a question
+CHANGED = re.compile(r"\[alpha\] Document\[.*\] (added|updated)")
 
 
 class ReindexTest(SamplingTest):
@@ -24,44 +31,73 @@ class ReindexTest(SamplingTest):
         word = "keepsake" if number % EACH == 0 else "other"
         return f"d{number // IN_A_FOLDER}/{word} {number}.txt"
 
-    def check_while_worked_on(self):
+    def check_while(self, begin, changes):
+        """Asks while what `begin` queues is worked off: so many documents, or more.
+
+        At a few moments the work waits until a question is answered, as nobody reads its log.
+        """
+        self.ctl("log-level", "debug")
+        hold = (CHANGED, changes // (MOMENTS + 1))
+        self.log.hold_at(*hold)
+        held = 0
+        begin()
+
         def sample(_):
+            nonlocal held
+            is_held = self.log.await_held(0)
             self.assertEqual(sorted(self.found("keepsake")), self.known)
+            if not is_held:
+                return
+            self.assertFalse(self.is_drained())  # answered before its end
+            held += 1
+            if held < MOMENTS:
+                self.log.go_on(*hold)
+            else:
+                self.log.go_on()
+                self.ctl("log-level", "error")
 
         count = self.sample_until_drained(sample)
         print(f"{count} questions meanwhile, each found all {len(self.known)} known files")
+        self.assertEqual(held, MOMENTS)
+        self.assert_index(self.root)
 
     def damage(self):
         """Changes the disk without an event, beside the known files."""
         for number in range(1, FILES, EACH):
             os.rename(f"{self.root}/{self.name(number)}", f"{self.root}/moved {number}.txt")
             os.unlink(f"{self.root}/{self.name(number + 1)}")
+        others = (number for number in range(FILES) if number % EACH > 2)
+        for number in itertools.islice(others, STALE):
+            os.utime(f"{self.root}/{self.name(number)}", (0, 0))
 
     def test_share_is_indexed_again(self):
         self.damage()
-
-        self.append("alpha", {"event": 0x10000, "path": self.root})
-
-        self.check_while_worked_on()
-        self.assert_index(self.root)
+        self.check_while(lambda: self.append("alpha", {"event": 0x10000, "path": self.root}), FILES)
 
     def test_share_is_indexed_again_after_it_was_flagged(self):
         self.damage()
+        self.check_while(lambda: self.append("alpha", {"event": 0x200, "path": self.root}), FILES)
 
-        self.append("alpha", {"event": 0x200, "path": self.root})
-
-        self.check_while_worked_on()
-        self.assert_index(self.root)
+    def repair(self):
+        """The number of differences that it found."""
+        return self.ctl("verify", "--repair", "alpha").out.count(b"\n")
 
     def test_share_is_repaired(self):
-        if b"--repair" not in self.ctl("verify", "--help").out:
-            self.skipTest("verify cannot repair")
         self.damage()
 
-        self.ctl("verify", "--repair", "alpha")
+        def begin():
+            differences = self.repair()
+            self.assertGreater(differences, STALE)
+            self.assertLess(differences, MOST_LINES)
 
-        self.check_while_worked_on()
-        self.assert_index(self.root)
+        self.check_while(begin, STALE)
+
+    def test_share_is_repaired_where_too_much_differs_for_a_line_each(self):
+        self.damage()
+        names = (f"d{number % (FILES // IN_A_FOLDER)}/new {number}.txt" for number in range(NEW))
+        self.make_files(self.root, *names)
+
+        self.check_while(lambda: self.assertGreater(self.repair(), MOST_LINES), NEW)
 
 
 if __name__ == "__main__":

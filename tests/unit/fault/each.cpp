@@ -26,6 +26,9 @@ constexpr int DID_NOT_STRIKE = 2;
 constexpr size_t AT_ONCE = 4;  // the test is not alone on the machine
 constexpr int USUAL_SCALE = 8;
 constexpr int USUAL_SCALE_OF_LASTING = 3;  // a Worker waits in between
+// Of the stories one in so many, or a single one, may end before its call: how often a Worker looks
+// at something varies a little with the time that it is given.
+constexpr int ONE_MAY_MISS_IN = 10;
 
 bool IsLong() {
   const char* scale = getenv("FILEINDEXD_TEST_SCALE");  // NOLINT(concurrency-mt-unsafe): read only
@@ -146,8 +149,10 @@ void ForEachCall(const Fault& fault, const std::function<void(int)>& story) {
 
   const int usual = fault.times == FOR_EVER ? USUAL_SCALE_OF_LASTING : USUAL_SCALE;
   const int step = IsLong() ? 1 : std::max(1, count / usual);
+  int told = 0;
   for (int nth = 1; nth <= count; nth += step) {
     runs.Start(nth);
+    ++told;
     if (runs.running.size() >= AT_ONCE) {
       runs.AwaitOne();
     }
@@ -156,8 +161,12 @@ void ForEachCall(const Fault& fault, const std::function<void(int)>& story) {
     runs.AwaitOne();
   }
   EXPECT_EQ(runs.found, "");
-  EXPECT_TRUE(runs.struck > 0 || !runs.found.empty());
+  if (runs.found.empty()) {
+    EXPECT_GT(runs.struck, 0);
+    EXPECT_GE(runs.struck, told - std::max(1, told / ONE_MAY_MISS_IN));
+  }
   testing::Test::RecordProperty("calls", count);
+  testing::Test::RecordProperty("told", told);
   testing::Test::RecordProperty("struck", runs.struck);
 }
 

@@ -10,8 +10,10 @@
 #include <string>
 #include <vector>
 
+#include "platform/log.h"
 #include "state/layout.h"
 #include "unit/fault/each.h"
+#include "unit/fault/operations.h"
 #include "unit/fault/world.h"
 
 namespace fileindexd::fault {
@@ -31,6 +33,7 @@ void ExpectLogged(const std::vector<std::string>& any_of) {
 }
 
 void Live(const Fault& fault, int nth) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
   World world;
   Arm(fault, nth);
   // A Worker whose making fails is made by the next start, or by who asks for it.
@@ -48,6 +51,7 @@ void Live(const Fault& fault, int nth) {
   world.Touch();
   world.Burst();
   world.ExpectWhole();
+  ExpectEachOperationLogged();
 }
 
 }  // namespace
@@ -67,6 +71,7 @@ INSTANTIATE_TEST_SUITE_P(
                     Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES},
                     Fault{Call::HALF_WRITE, SQLITE_FULL, Target::ENTRIES},
                     Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES},
+                    Fault{Call::SHORT_READ, SQLITE_IOERR_SHORT_READ, Target::ENTRIES},
                     Fault{Call::SIZE, SQLITE_IOERR_FSTAT, Target::ENTRIES},
                     Fault{Call::LOCK, SQLITE_IOERR_LOCK, Target::ENTRIES},
                     Fault{Call::SHARED_MEMORY, SQLITE_IOERR_SHMMAP, Target::ENTRIES},
@@ -85,6 +90,7 @@ INSTANTIATE_TEST_SUITE_P(
                     Fault{Call::WRITE, SQLITE_FULL, Target::STATE},
                     Fault{Call::HALF_WRITE, SQLITE_FULL, Target::STATE},
                     Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::STATE},
+                    Fault{Call::SHORT_READ, SQLITE_IOERR_SHORT_READ, Target::STATE},
                     Fault{Call::SIZE, SQLITE_IOERR_FSTAT, Target::STATE},
                     Fault{Call::LOCK, SQLITE_IOERR_LOCK, Target::STATE},
                     Fault{Call::SHARED_MEMORY, SQLITE_IOERR_SHMMAP, Target::STATE},

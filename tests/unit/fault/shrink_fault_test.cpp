@@ -1,0 +1,93 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// An index file that is to shrink, with one call of its work failing: nothing is lost, and what the
+// fault kept from being cut off is cut off later.
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+
+#include <cstdint>
+#include <ostream>
+
+#include "index/schema.h"
+#include "platform/log.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
+#include "unit/fault/each.h"
+#include "unit/fault/operations.h"
+#include "unit/fault/world.h"
+
+namespace fileindexd::fault {
+
+void PrintTo(const Fault& fault, std::ostream* stream);
+
+namespace {
+
+// The only row that tells how much there is to cut off.
+class RemovedCount {
+ public:
+  RemovedCount() {
+    const std::string path = IndexPath("s") + "/" + ENTRIES_FILE;
+    EXPECT_EQ(sqlite3_open(path.c_str(), &db), SQLITE_OK) << path;
+  }
+  ~RemovedCount() { sqlite3_close_v2(db); }
+  RemovedCount(const RemovedCount&) = delete;
+  RemovedCount& operator=(const RemovedCount&) = delete;
+
+  void Set(int64_t count) {
+    const std::string sql = "UPDATE meta SET removed = " + std::to_string(count);
+    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr), SQLITE_OK);
+  }
+  int64_t Get() {
+    Statement statement;
+    EXPECT_EQ(statement.Prepare(db, "SELECT removed FROM meta"), SQLITE_OK);
+    EXPECT_EQ(statement.Step(), SQLITE_ROW);
+    return statement.Int(0);
+  }
+
+ private:
+  sqlite3* db = nullptr;
+};
+
+void Shrink(const Fault& fault, int nth) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  World world;
+  ASSERT_TRUE(world.HaveWorker());
+  world.Burst();
+  world.daemon.DeleteWorker("s");
+  constexpr int64_t MANY = 1'000'000;
+  RemovedCount().Set(MANY);
+  ASSERT_TRUE(world.HaveWorker());
+  world.ChangeFiles();
+
+  Arm(fault, nth);
+  world.Burst();
+  Disarm();
+
+  EXPECT_TRUE(world.HaveWorker());
+  world.Touch();
+  world.Burst();
+  world.ExpectWhole();
+  ExpectEachOperationLogged();
+  EXPECT_LT(RemovedCount().Get(), MANY);
+}
+
+}  // namespace
+
+class ShrinkFaultTest : public testing::TestWithParam<Fault> {};
+
+TEST_P(ShrinkFaultTest, NextTouchMakesGood) {
+  const Fault fault = GetParam();
+  ForEachCall(fault, [&fault](int nth) { Shrink(fault, nth); });
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Shrink, ShrinkFaultTest,
+    testing::Values(Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::ENTRIES},
+                    Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::ENTRIES, FOR_EVER},
+                    Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES},
+                    Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES},
+                    Fault{Call::STATEMENT, SQLITE_IOERR, Target::ENTRIES},
+                    Fault{Call::MEMORY, SQLITE_NOMEM},
+                    Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES, FOR_EVER},
+                    Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES, FOR_EVER}));
+
+}  // namespace fileindexd::fault
