@@ -4,10 +4,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstring>
 
 #include "extract/error_text.h"
 #include "extract/helper_codes.h"
+#include "extract/passed_files.h"
 #include "extract/slot.h"
 
 namespace fileindexd {
@@ -65,21 +65,8 @@ bool Slot::Send(int file, const std::string& name) {
     return false;
   }
 
-  std::string frame = EncodeJob({static_cast<uint32_t>(options.text_cap), name});
-  iovec bytes = {frame.data(), frame.size()};
-  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  cmsghdr* head = CMSG_FIRSTHDR(&message);
-  head->cmsg_level = SOL_SOCKET;
-  head->cmsg_type = SCM_RIGHTS;
-  head->cmsg_len = CMSG_LEN(sizeof(int));
-  memcpy(CMSG_DATA(head), &file, sizeof(file));
-  return sendmsg(socket.fd, &message, MSG_DONTWAIT | MSG_NOSIGNAL) ==
-         static_cast<ssize_t>(frame.size());
+  const std::string frame = EncodeJob({static_cast<uint32_t>(options.text_cap), name});
+  return SendWithFiles(socket.fd, frame, {&file, 1}, MSG_DONTWAIT);
 }
 
 void Slot::Receive(Clock::time_point now) {

@@ -8,27 +8,28 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <chrono>
 #include <condition_variable>
 #include <csignal>
-#include <cstring>
 #include <mutex>
 #include <new>
+#include <span>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "extract/error_text.h"
+#include "extract/passed_files.h"
 
 namespace fileindexd {
 
 namespace {
 
 constexpr std::chrono::seconds PATIENCE(10);
-constexpr size_t MOST_FILES = 3;
 
-std::vector<int> Those(const ChildFiles& files) {
+std::vector<int> Given(const ChildFiles& files) {
   std::vector<int> there;
   for (const int file : {files.input, files.output, files.socket}) {
     if (file >= 0) {
@@ -39,36 +40,15 @@ std::vector<int> Those(const ChildFiles& files) {
 }
 
 // In the place of those that are there, others, in the same order.
-ChildFiles InPlace(const ChildFiles& files, const std::vector<ScopedFd>& others) {
+ChildFiles InPlace(const ChildFiles& files, std::span<const ScopedFd> others) {
   ChildFiles placed = files;
   size_t next = 0;
   for (int* file : {&placed.input, &placed.output, &placed.socket}) {
     if (*file >= 0) {
-      *file = next < others.size() ? others[next++].fd : -1;
+      *file = others[next++].fd;
     }
   }
   return placed;
-}
-
-// Along with a byte.
-bool SendFiles(int socket, const std::vector<int>& files) {
-  char byte = 0;
-  iovec bytes = {&byte, 1};
-  alignas(cmsghdr) char control[CMSG_SPACE(MOST_FILES * sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  if (!files.empty()) {
-    const size_t size = files.size() * sizeof(int);
-    message.msg_control = control;
-    message.msg_controllen = CMSG_SPACE(size);
-    cmsghdr* head = CMSG_FIRSTHDR(&message);
-    head->cmsg_level = SOL_SOCKET;
-    head->cmsg_type = SCM_RIGHTS;
-    head->cmsg_len = CMSG_LEN(size);
-    memcpy(CMSG_DATA(head), files.data(), size);
-  }
-  return sendmsg(socket, &message, MSG_NOSIGNAL) == 1;
 }
 
 // But for the standard ones. The asker's end among them: or its closing would never be seen. Files
@@ -80,30 +60,6 @@ void CloseOthers(int kept) {
     (void)close_range(first, number - 1, 0);
   }
   (void)close_range(std::max(number + 1, first), ~0U, 0);
-}
-
-// False at the end.
-bool ReceiveFiles(int socket, std::vector<ScopedFd>& files) {
-  char byte = 0;
-  iovec bytes = {&byte, 1};
-  alignas(cmsghdr) char control[CMSG_SPACE(MOST_FILES * sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  if (recvmsg(socket, &message, MSG_CMSG_CLOEXEC) <= 0) {  // all signals are blocked
-    return false;
-  }
-
-  const cmsghdr* head = CMSG_FIRSTHDR(&message);
-  const size_t count = head == nullptr ? 0 : (head->cmsg_len - CMSG_LEN(0)) / sizeof(int);
-  std::vector<ScopedFd> received(count);
-  for (size_t i = 0; i < count; ++i) {
-    memcpy(&received[i].fd, CMSG_DATA(head) + i * sizeof(int), sizeof(int));
-  }
-  files.swap(received);
-  return true;
 }
 
 }  // namespace
@@ -141,8 +97,9 @@ void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
   CloseOthers(asked);
   shared->End(Shared::Stage::FREE, -1, "");
 
-  std::vector<ScopedFd> files;
-  while (ReceiveFiles(socket.fd, files)) {
+  std::array<ScopedFd, MOST_PASSED_FILES> files;
+  char byte = 0;
+  while (ReceiveWithFiles(socket.fd, {&byte, 1}, files) > 0) {  // all signals are blocked
     std::unique_lock lock(shared->mutex);
     const std::string program = shared->program;
     std::vector<std::string> arguments = shared->arguments;
@@ -157,7 +114,7 @@ void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
       error = "no memory";
     }
     shared->End(Shared::Stage::STARTED, pid, error);
-    files.clear();  // closing is asking, too
+    std::for_each(files.begin(), files.end(), [](ScopedFd& file) { file.Close(); });
   }
 }
 
@@ -204,7 +161,7 @@ bool Starter::Start(const std::string& program, std::vector<std::string> argumen
     shared->program = program;
     shared->arguments = std::move(arguments);
     shared->files = files;
-    if (!SendFiles(asking.fd, Those(files))) {
+    if (!SendWithFiles(asking.fd, {"", 1}, Given(files))) {
       shared->stage = Shared::Stage::FREE;
       error = program + ": " + ErrorText(errno);
       return false;
