@@ -64,18 +64,26 @@ void CloseOthers(int kept) {
 
 }  // namespace
 
+struct Starter::Asked {
+  std::string program;
+  std::vector<std::string> arguments;
+  ChildFiles files;  // as the asker calls them
+};
+
 // All under the mutex.
 struct Starter::Shared {
   enum class Stage { OPENING, FREE, STARTING, STARTED };
   std::mutex mutex;
   std::condition_variable ended;
   Stage stage = Stage::OPENING;
-  std::string program;
-  std::vector<std::string> arguments;
-  ChildFiles files;   // as the asker calls them
+  Asked asked;
   pid_t pid = -1;     // STARTED: -1 where it could not be
   std::string error;  // then; and of an opening that failed
 
+  Asked TakeAsked() {
+    const std::lock_guard lock(mutex);
+    return std::exchange(asked, {});
+  }
   void End(Stage next, pid_t started, std::string why) {
     const std::lock_guard lock(mutex);
     stage = next;
@@ -85,7 +93,7 @@ struct Starter::Shared {
   }
 };
 
-void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
+void Starter::Run(const std::shared_ptr<Shared>& shared, int end) {
   sigset_t all;
   sigfillset(&all);
   (void)pthread_sigmask(SIG_BLOCK, &all, nullptr);
@@ -93,28 +101,32 @@ void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
     shared->End(Shared::Stage::FREE, -1, "unshare: " + ErrorText(errno));
     return;
   }
-  const ScopedFd socket(asked);
-  CloseOthers(asked);
+  const ScopedFd socket(end);
+  CloseOthers(end);
   shared->End(Shared::Stage::FREE, -1, "");
 
-  std::array<ScopedFd, MOST_PASSED_FILES> files;
-  char byte = 0;
-  while (ReceiveWithFiles(socket.fd, {&byte, 1}, files) > 0) {  // all signals are blocked
-    std::unique_lock lock(shared->mutex);
-    const std::string program = shared->program;
-    std::vector<std::string> arguments = shared->arguments;
-    const ChildFiles placed = InPlace(shared->files, files);
-    lock.unlock();
-
+  while (true) {
+    std::array<ScopedFd, MOST_PASSED_FILES> files;  // closed when that is told: it is asking, too
+    char byte = 0;
+    const ssize_t length = ReceiveWithFiles(socket.fd, {&byte, 1}, files);
+    const int failure = length < 0 ? errno : 0;  // of the files: all signals are blocked
+    if (length == 0) {
+      return;
+    }
+    Asked asked = shared->TakeAsked();
     pid_t pid = -1;
     std::string error;
     try {
-      (void)SpawnChild(program, std::move(arguments), placed, pid, error);
+      if (failure == 0) {
+        (void)SpawnChild(asked.program, std::move(asked.arguments), InPlace(asked.files, files),
+                         pid, error);
+      } else {
+        error = asked.program + ": " + ErrorText(failure);
+      }
     } catch (const std::bad_alloc&) {
       error = "no memory";
     }
-    shared->End(Shared::Stage::STARTED, pid, error);
-    std::for_each(files.begin(), files.end(), [](ScopedFd& file) { file.Close(); });
+    shared->End(Shared::Stage::STARTED, pid, std::move(error));
   }
 }
 
@@ -158,9 +170,7 @@ bool Starter::Start(const std::string& program, std::vector<std::string> argumen
   }
   if (shared->stage != Shared::Stage::STARTING) {
     shared->stage = Shared::Stage::STARTING;
-    shared->program = program;
-    shared->arguments = std::move(arguments);
-    shared->files = files;
+    shared->asked = {program, std::move(arguments), files};
     if (!SendWithFiles(asking.fd, {"", 1}, Given(files))) {
       shared->stage = Shared::Stage::FREE;
       error = program + ": " + ErrorText(errno);

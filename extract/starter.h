@@ -35,8 +35,9 @@ class Starter {
              const ChildFiles& files, Child& child, std::string& error);
 
  private:
+  struct Asked;
   struct Shared;
-  static void Run(const std::shared_ptr<Shared>& shared, int asked);
+  static void Run(const std::shared_ptr<Shared>& shared, int end);
 
   std::shared_ptr<Shared> shared;  // with the thread; none: not open
   ScopedFd asking;
