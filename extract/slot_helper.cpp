@@ -48,7 +48,8 @@ bool Slot::Start(std::string& error) {
 
   ScopedFd ours(ends[0]);
   const ScopedFd theirs(ends[1]);
-  if (!starter.Start(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
+  helper_start = starter.Ask(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, error);
+  if (helper_start == 0) {
     return false;
   }
   socket.Swap(ours);
@@ -87,6 +88,9 @@ void Slot::Receive(Clock::time_point now) {
 }
 
 void Slot::DropHelper() {
+  if (helper_start != 0) {
+    starter.Drop(std::exchange(helper_start, 0), helper);
+  }
   Kill(helper);
   if (helper.IsThere()) {
     dying.emplace_back().Swap(helper);
