@@ -16,6 +16,7 @@
 #include <mutex>
 #include <new>
 #include <span>
+#include <string_view>
 #include <system_error>
 #include <thread>
 #include <utility>
@@ -29,6 +30,7 @@ namespace {
 
 // While the thread hangs: what is asked for keeps its files open.
 constexpr int MOST_DROPPED = 4;
+constexpr std::string_view BYTE = ".";  // of a message that says nothing else
 
 std::vector<int> Given(const ChildFiles& files) {
   std::vector<int> there;
@@ -106,7 +108,7 @@ struct Starter::Shared {
     std::unique_lock lock(mutex);
     if (start.stage == Stage::ASKED) {
       start.stage = Stage::ENDED;
-      (void)send(socket, "", 1, MSG_DONTWAIT | MSG_NOSIGNAL);  // fails when the asker is gone
+      (void)SendWithFiles(socket, BYTE, {}, MSG_DONTWAIT);  // fails when the asker is gone
       return;
     }
     lock.unlock();
@@ -202,7 +204,7 @@ uint64_t Starter::Ask(const std::string& program, std::vector<std::string> argum
   start.program = program;
   start.arguments = std::move(arguments);
   start.files = files;
-  if (!SendWithFiles(asking.fd, {"", 1}, given, MSG_DONTWAIT)) {
+  if (!SendWithFiles(asking.fd, BYTE, given, MSG_DONTWAIT)) {
     error = program + ": " + ErrorText(errno);
     shared->starts.pop_back();
     return 0;
