@@ -11,6 +11,7 @@
 #include "ctl/places.h"
 #include "index/contents_reader.h"
 #include "state/content_service.h"
+#include "state/pause.h"
 #include "state/pid_file.h"
 
 namespace fileindexd {
@@ -92,7 +93,7 @@ bool LookAtService(Session& session, Retry& retry) {
     return false;
   }
   retry.runs = AliveByPidFile(SERVICE_PID_FILE, SERVICE_PROGRAM) > 0;
-  retry.is_paused = resume_time == 0 || resume_time > time(nullptr);
+  retry.is_paused = IsPaused(resume_time, time(nullptr));
   return true;
 }
 

@@ -127,7 +127,7 @@ bool RecordAcceptance(StateStore& store, const Share& share, bool reindex) {
 }  // namespace
 
 int ShareAdd(const Arguments& arguments) {
-  if (!IsNewShareName(arguments.share)) {
+  if (!CanNameNewShare(arguments.share)) {
     return Fail(EXIT_USAGE,
                 "%s: not a share's name: 1 to 64 bytes, no '/', no control characters, no '.' in "
                 "front",

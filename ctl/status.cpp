@@ -12,6 +12,7 @@
 #include "ctl/watches.h"
 #include "state/layout.h"
 #include "state/left_out.h"
+#include "state/pause.h"
 #include "state/pid_file.h"
 #include "state/queue_writer.h"
 
@@ -84,10 +85,7 @@ bool ReportShare(Session& session, const Share& share, pid_t daemon, ShareReport
 
 // None: not paused. 0: without end.
 std::optional<int64_t> PausedUntil(int64_t resume_time) {
-  if (resume_time != 0 && resume_time <= std::time(nullptr)) {
-    return std::nullopt;
-  }
-  return resume_time;
+  return IsPaused(resume_time, std::time(nullptr)) ? std::optional(resume_time) : std::nullopt;
 }
 
 // Whether the share went away while it was being looked at.

@@ -33,6 +33,7 @@
 #include "state/belonging.h"
 #include "state/layout.h"
 #include "state/notifier.h"
+#include "state/pause.h"
 #include "state/pid_file.h"
 
 namespace fileindexd {
@@ -232,8 +233,7 @@ std::string Waiter::Reason() const {
     return "its path lies on another file system than before";
   }
   int64_t resume_time = -1;
-  if (session.store->GetPause(resume_time) &&
-      (resume_time == 0 || resume_time > std::time(nullptr))) {
+  if (session.store->GetPause(resume_time) && IsPaused(resume_time, std::time(nullptr))) {
     return "indexing is paused";
   }
   return first.files.empty() ? "it is being indexed again" : "lines wait in its queue";

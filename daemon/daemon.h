@@ -25,6 +25,7 @@ class Worker;
 
 constexpr const char* SOCKET_PATH = "/var/run/fileindexd.sock";
 constexpr const char* PID_FILE_NAME = "fileindexd.pid";
+// As state/content_service.h has it, which the daemon may not include: they change together.
 constexpr const char* SEARCH_SERVICE = "talocontentsearchd";
 
 // Both error categories exist from start-up on, before there is any thread.

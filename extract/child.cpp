@@ -54,23 +54,38 @@ class SpawnPlan {
   }
 
   void Files(const ChildFiles& files) {
-    Give(files.input, STDIN_FILENO);
-    Give(files.output, STDOUT_FILENO);
+    // All are out of the way before the first number is given away.
+    const int input = OutOfTheWay(files.input, moved[0]);
+    const int output = OutOfTheWay(files.output, moved[1]);
+    const int socket = OutOfTheWay(files.socket, moved[2]);
+    Give(input, STDIN_FILENO);
+    Give(output, STDOUT_FILENO);
     if (!IS_SANITIZED) {
       Give(-1, STDERR_FILENO);
     }
     if (files.socket >= 0) {
-      Give(files.socket, HELPER_SOCKET);
+      Give(socket, HELPER_SOCKET);
     }
     Note(posix_spawn_file_actions_addclosefrom_np(
         &actions, files.socket >= 0 ? HELPER_SOCKET + 1 : HELPER_SOCKET));
     Note(posix_spawn_file_actions_addchdir_np(&actions, "/"));
   }
 
+  // A file whose number the plan gives away first would be lost.
+  int OutOfTheWay(int file, ScopedFd& copy) {
+    if (file < 0 || file > HELPER_SOCKET) {
+      return file;
+    }
+    copy.fd = fcntl(file, F_DUPFD_CLOEXEC, HELPER_SOCKET + 1);
+    Note(copy.fd < 0 ? errno : 0);
+    return copy.fd;
+  }
+
   void Note(int result) { failure = failure == 0 ? result : failure; }
 
   posix_spawn_file_actions_t actions = {};
   posix_spawnattr_t attributes = {};
+  ScopedFd moved[3];
   int failure = 0;
 };
 
@@ -98,16 +113,6 @@ std::vector<char*> Pointers(std::vector<std::string>& texts) {
   return pointers;
 }
 
-// A file whose number the plan gives away first would be lost: they are moved out of the way.
-int OutOfTheWay(int file, ScopedFd& moved) {
-  if (file < 0 || file > HELPER_SOCKET) {
-    return file;
-  }
-  ScopedFd copy(fcntl(file, F_DUPFD_CLOEXEC, HELPER_SOCKET + 1));
-  moved.Swap(copy);
-  return moved.fd;
-}
-
 }  // namespace
 
 bool SpawnChild(const std::string& program, std::vector<std::string> arguments,
@@ -117,11 +122,9 @@ bool SpawnChild(const std::string& program, std::vector<std::string> arguments,
     return false;
   };
 
-  ScopedFd moved[3];
   SpawnPlan plan;
   plan.Signals();
-  plan.Files({OutOfTheWay(files.input, moved[0]), OutOfTheWay(files.output, moved[1]),
-              OutOfTheWay(files.socket, moved[2])});
+  plan.Files(files);
   if (plan.failure != 0) {
     return fail(plan.failure);
   }

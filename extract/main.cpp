@@ -29,6 +29,7 @@
 #include "extract/error_text.h"
 #include "extract/format.h"
 #include "extract/helper_codes.h"
+#include "extract/passed_files.h"
 #include "extract/run_time_files.h"
 #include "extract/sample.h"
 
@@ -59,23 +60,10 @@ bool SendAll(std::string_view bytes) {
 // None when the service has closed its end, or what it says is no job.
 std::optional<JobOrder> ReceiveJob(ScopedFd& file) {
   std::string frame(MAX_JOB_NAME + 64, '\0');
-  iovec bytes = {frame.data(), frame.size()};
-  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  const ssize_t length = recvmsg(HELPER_SOCKET, &message, MSG_CMSG_CLOEXEC);
-  const cmsghdr* head = length > 0 ? CMSG_FIRSTHDR(&message) : nullptr;
-  if (head == nullptr || head->cmsg_type != SCM_RIGHTS) {
+  const ssize_t length = ReceiveWithFiles(HELPER_SOCKET, frame, {&file, 1});
+  if (length <= 0 || file.fd < 0) {
     return std::nullopt;
   }
-
-  int received = -1;
-  memcpy(&received, CMSG_DATA(head), sizeof(received));
-  ScopedFd taken(received);
-  file.Swap(taken);
   frame.resize(static_cast<size_t>(length));
   return DecodeJob(frame);
 }

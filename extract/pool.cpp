@@ -95,6 +95,7 @@ void ExtractPool::Submit(ExtractJob&& job) {
 }
 
 void ExtractPool::AddPolled(std::vector<pollfd>& polled) const {
+  polled.push_back({impl->starter.Descriptor(), POLLIN, 0});
   for (const std::unique_ptr<Slot>& slot : impl->slots) {
     slot->AddPolled(polled);
   }

@@ -76,7 +76,11 @@ std::optional<ExtractOutcome> Slot::Begin() {
 
 std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
   std::optional<ExtractOutcome> outcome;
-  if (stage == Stage::CONVERTING) {
+  if (helper_start != 0) {
+    outcome = AwaitStart(helper_start, helper);
+  } else if (converter_start != 0) {
+    outcome = AwaitStart(converter_start, converter);
+  } else if (stage == Stage::CONVERTING) {
     outcome = AwaitConverter();
   }
   if (!outcome && helper.IsThere()) {
@@ -100,6 +104,22 @@ std::optional<ExtractOutcome> Slot::Work(Clock::time_point now) {
     outcome = Overdue(now);
   }
   return outcome;
+}
+
+std::optional<ExtractOutcome> Slot::AwaitStart(uint64_t& start, Child& child) {
+  std::string error;
+  const std::optional<bool> is_started = starter.Take(start, child, error);
+  if (!is_started) {
+    return std::nullopt;
+  }
+  start = 0;
+  if (*is_started) {
+    return std::nullopt;
+  }
+  if (!helper.IsThere()) {
+    DropHelper();  // closes its socket
+  }
+  return End(Result::LOST, error);
 }
 
 std::optional<ExtractOutcome> Slot::TakeFrames() {
@@ -196,8 +216,9 @@ std::optional<ExtractOutcome> Slot::StartConverter(const std::string& name) {
   if (made.fd < 0 || lseek(current.file->fd, 0, SEEK_SET) != 0) {
     return End(Result::LOST, name + ": " + ErrorText(errno));
   }
-  if (!starter.Start(options.program, {CONVERT_MODE, name}, {current.file->fd, made.fd, -1},
-                     converter, error)) {
+  converter_start =
+      starter.Ask(options.program, {CONVERT_MODE, name}, {current.file->fd, made.fd, -1}, error);
+  if (converter_start == 0) {
     return End(Result::LOST, error);
   }
   result.Swap(made);
@@ -290,7 +311,8 @@ std::optional<ExtractOutcome> Slot::Overdue(Clock::time_point now) {
                                ? "took longer than " + std::to_string(limit / 1000) + " s"
                                : "took longer than " + std::to_string(limit) + " ms";
   if (stage == Stage::CONVERTING) {
-    return End(Result::FAILED, converter_name + ": " + took);
+    return converter_start == 0 ? End(Result::FAILED, converter_name + ": " + took)
+                                : End(Result::LOST, converter_name + ": does not start in time");
   }
   DropHelper();
   if (!has_begun) {
@@ -309,6 +331,9 @@ std::optional<ExtractOutcome> Slot::Nonsense(const std::string& what) {
 }
 
 void Slot::DropConverter() {
+  if (converter_start != 0) {
+    starter.Drop(std::exchange(converter_start, 0), converter);
+  }
   Kill(converter);
   if (converter.IsThere()) {
     dying.emplace_back().Swap(converter);

@@ -50,6 +50,7 @@ class Slot {
  private:
   enum class Stage { IDLE, READING, CONVERTING, READING_RESULT };
 
+  // Of a helper; its jobs can be sent at once.
   bool Start(std::string& error);
   // The file, from its beginning, to the helper that is there. False, with errno, on failure:
   // nothing has gone out.
@@ -63,6 +64,8 @@ class Slot {
   // Begins the job, or begins it again.
   std::optional<ExtractOutcome> Begin();
   void Receive(Clock::time_point now);
+  // Of one that is being started: `start` is its number as long as it is.
+  std::optional<ExtractOutcome> AwaitStart(uint64_t& start, Child& child);
   std::optional<ExtractOutcome> TakeFrames();
   std::optional<ExtractOutcome> Take(Answer& answer);
   std::optional<ExtractOutcome> TakeAnswer(Answer& answer);
@@ -84,8 +87,9 @@ class Slot {
   std::string& left_out;
   std::list<Child>& dying;  // killed, not reaped yet
 
+  uint64_t helper_start = 0;  // the starter's number for it; 0: it is there, or there is none
   Child helper;
-  ScopedFd socket;
+  ScopedFd socket;  // of a helper that is being started, too
   std::string received;
   bool is_ready = false;    // its doors are closed
   bool is_closing = false;  // its socket is closed, its end not seen yet
@@ -100,6 +104,7 @@ class Slot {
   std::chrono::nanoseconds used_before{0};  // the helper's processor time, when it had begun
   int lost_helpers = 0;                     // at this job, by no fault of its own
   Content found;                            // by the first reading
+  uint64_t converter_start = 0;             // as the helper's
   Child converter;
   std::string converter_name;
   std::string converter_fault;

@@ -4,10 +4,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstring>
 
 #include "extract/error_text.h"
 #include "extract/helper_codes.h"
+#include "extract/passed_files.h"
 #include "extract/slot.h"
 
 namespace fileindexd {
@@ -48,7 +48,8 @@ bool Slot::Start(std::string& error) {
 
   ScopedFd ours(ends[0]);
   const ScopedFd theirs(ends[1]);
-  if (!starter.Start(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, helper, error)) {
+  helper_start = starter.Ask(options.program, {SERVE_MODE}, {-1, -1, theirs.fd}, error);
+  if (helper_start == 0) {
     return false;
   }
   socket.Swap(ours);
@@ -65,21 +66,8 @@ bool Slot::Send(int file, const std::string& name) {
     return false;
   }
 
-  std::string frame = EncodeJob({static_cast<uint32_t>(options.text_cap), name});
-  iovec bytes = {frame.data(), frame.size()};
-  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  cmsghdr* head = CMSG_FIRSTHDR(&message);
-  head->cmsg_level = SOL_SOCKET;
-  head->cmsg_type = SCM_RIGHTS;
-  head->cmsg_len = CMSG_LEN(sizeof(int));
-  memcpy(CMSG_DATA(head), &file, sizeof(file));
-  return sendmsg(socket.fd, &message, MSG_DONTWAIT | MSG_NOSIGNAL) ==
-         static_cast<ssize_t>(frame.size());
+  const std::string frame = EncodeJob({static_cast<uint32_t>(options.text_cap), name});
+  return SendWithFiles(socket.fd, frame, {&file, 1}, MSG_DONTWAIT);
 }
 
 void Slot::Receive(Clock::time_point now) {
@@ -100,6 +88,9 @@ void Slot::Receive(Clock::time_point now) {
 }
 
 void Slot::DropHelper() {
+  if (helper_start != 0) {
+    starter.Drop(std::exchange(helper_start, 0), helper);
+  }
   Kill(helper);
   if (helper.IsThere()) {
     dying.emplace_back().Swap(helper);

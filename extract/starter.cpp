@@ -8,27 +8,31 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
-#include <chrono>
 #include <condition_variable>
 #include <csignal>
-#include <cstring>
+#include <list>
 #include <mutex>
 #include <new>
+#include <span>
+#include <string_view>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "extract/error_text.h"
+#include "extract/passed_files.h"
 
 namespace fileindexd {
 
 namespace {
 
-constexpr std::chrono::seconds PATIENCE(10);
-constexpr size_t MOST_FILES = 3;
+// While the thread hangs: what is asked for keeps its files open.
+constexpr int MOST_DROPPED = 4;
+constexpr std::string_view BYTE = ".";  // of a message that says nothing else
 
-std::vector<int> Those(const ChildFiles& files) {
+std::vector<int> Given(const ChildFiles& files) {
   std::vector<int> there;
   for (const int file : {files.input, files.output, files.socket}) {
     if (file >= 0) {
@@ -39,36 +43,15 @@ std::vector<int> Those(const ChildFiles& files) {
 }
 
 // In the place of those that are there, others, in the same order.
-ChildFiles InPlace(const ChildFiles& files, const std::vector<ScopedFd>& others) {
+ChildFiles InPlace(const ChildFiles& files, std::span<const ScopedFd> others) {
   ChildFiles placed = files;
   size_t next = 0;
   for (int* file : {&placed.input, &placed.output, &placed.socket}) {
     if (*file >= 0) {
-      *file = next < others.size() ? others[next++].fd : -1;
+      *file = others[next++].fd;
     }
   }
   return placed;
-}
-
-// Along with a byte.
-bool SendFiles(int socket, const std::vector<int>& files) {
-  char byte = 0;
-  iovec bytes = {&byte, 1};
-  alignas(cmsghdr) char control[CMSG_SPACE(MOST_FILES * sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  if (!files.empty()) {
-    const size_t size = files.size() * sizeof(int);
-    message.msg_control = control;
-    message.msg_controllen = CMSG_SPACE(size);
-    cmsghdr* head = CMSG_FIRSTHDR(&message);
-    head->cmsg_level = SOL_SOCKET;
-    head->cmsg_type = SCM_RIGHTS;
-    head->cmsg_len = CMSG_LEN(size);
-    memcpy(CMSG_DATA(head), files.data(), size);
-  }
-  return sendmsg(socket, &message, MSG_NOSIGNAL) == 1;
 }
 
 // But for the standard ones. The asker's end among them: or its closing would never be seen. Files
@@ -82,82 +65,95 @@ void CloseOthers(int kept) {
   (void)close_range(std::max(number + 1, first), ~0U, 0);
 }
 
-// False at the end.
-bool ReceiveFiles(int socket, std::vector<ScopedFd>& files) {
-  char byte = 0;
-  iovec bytes = {&byte, 1};
-  alignas(cmsghdr) char control[CMSG_SPACE(MOST_FILES * sizeof(int))] = {};
-  msghdr message = {};
-  message.msg_iov = &bytes;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  if (recvmsg(socket, &message, MSG_CMSG_CLOEXEC) <= 0) {  // all signals are blocked
-    return false;
-  }
-
-  const cmsghdr* head = CMSG_FIRSTHDR(&message);
-  const size_t count = head == nullptr ? 0 : (head->cmsg_len - CMSG_LEN(0)) / sizeof(int);
-  std::vector<ScopedFd> received(count);
-  for (size_t i = 0; i < count; ++i) {
-    memcpy(&received[i].fd, CMSG_DATA(head) + i * sizeof(int), sizeof(int));
-  }
-  files.swap(received);
-  return true;
-}
-
 }  // namespace
 
-// All under the mutex.
+// All under the mutex, but for what of a start only the thread or nobody changes.
 struct Starter::Shared {
-  enum class Stage { OPENING, FREE, STARTING, STARTED };
+  enum class Stage { ASKED, ENDED, DROPPED };
+  struct Start {
+    uint64_t id = 0;
+    std::string program;
+    std::vector<std::string> arguments;
+    ChildFiles files;  // as the asker calls them
+    Stage stage = Stage::ASKED;
+    pid_t pid = -1;     // ENDED: -1 where it could not be
+    std::string error;  // then
+  };
   std::mutex mutex;
-  std::condition_variable ended;
-  Stage stage = Stage::OPENING;
-  std::string program;
-  std::vector<std::string> arguments;
-  ChildFiles files;   // as the asker calls them
-  pid_t pid = -1;     // STARTED: -1 where it could not be
-  std::string error;  // then; and of an opening that failed
+  std::condition_variable opened;
+  bool is_open = false;
+  std::string error;  // of an opening that failed
+  // In the order of their messages in the socket. One byte comes back for each that has ended.
+  std::list<Start> starts;
 
-  void End(Stage next, pid_t started, std::string why) {
+  std::list<Start>::iterator Find(uint64_t id) {
+    return std::find_if(starts.begin(), starts.end(),
+                        [id](const Start& start) { return start.id == id; });
+  }
+  void EndOpening(std::string why) {
     const std::lock_guard lock(mutex);
-    stage = next;
-    pid = started;
+    is_open = true;
     error = std::move(why);
-    ended.notify_one();
+    opened.notify_one();
+  }
+  // The one that the message asks for. It stays where it is; the asker changes its stage alone.
+  Start& Next(bool& is_wanted) {
+    const std::lock_guard lock(mutex);
+    Start& next = *std::find_if(starts.begin(), starts.end(),
+                                [](const Start& start) { return start.stage != Stage::ENDED; });
+    is_wanted = next.stage == Stage::ASKED;
+    return next;
+  }
+  void End(Start& start, int socket) {
+    std::unique_lock lock(mutex);
+    if (start.stage == Stage::ASKED) {
+      start.stage = Stage::ENDED;
+      (void)SendWithFiles(socket, BYTE, {}, MSG_DONTWAIT);  // fails when the asker is gone
+      return;
+    }
+    lock.unlock();
+    if (start.pid > 0) {
+      (void)kill(start.pid, SIGKILL);
+      (void)waitpid(start.pid, nullptr, 0);
+    }
+    lock.lock();
+    starts.remove_if([&](const Start& one) { return &one == &start; });
   }
 };
 
-void Starter::Run(const std::shared_ptr<Shared>& shared, int asked) {
+void Starter::Run(const std::shared_ptr<Shared>& shared, int end) {
   sigset_t all;
   sigfillset(&all);
   (void)pthread_sigmask(SIG_BLOCK, &all, nullptr);
   if (unshare(CLONE_FILES) != 0) {
-    shared->End(Shared::Stage::FREE, -1, "unshare: " + ErrorText(errno));
+    shared->EndOpening("unshare: " + ErrorText(errno));
     return;
   }
-  const ScopedFd socket(asked);
-  CloseOthers(asked);
-  shared->End(Shared::Stage::FREE, -1, "");
+  const ScopedFd socket(end);
+  CloseOthers(end);
+  shared->EndOpening("");
 
-  std::vector<ScopedFd> files;
-  while (ReceiveFiles(socket.fd, files)) {
-    std::unique_lock lock(shared->mutex);
-    const std::string program = shared->program;
-    std::vector<std::string> arguments = shared->arguments;
-    const ChildFiles placed = InPlace(shared->files, files);
-    lock.unlock();
-
-    pid_t pid = -1;
-    std::string error;
-    try {
-      (void)SpawnChild(program, std::move(arguments), placed, pid, error);
-    } catch (const std::bad_alloc&) {
-      error = "no memory";
+  while (true) {
+    std::array<ScopedFd, MOST_PASSED_FILES> files;  // closed when that is told: it is asking, too
+    char byte = 0;
+    const ssize_t length = ReceiveWithFiles(socket.fd, {&byte, 1}, files);
+    const int failure = length < 0 ? errno : 0;  // of the files: all signals are blocked
+    if (length == 0 || (failure != 0 && failure != EMFILE)) {
+      return;
     }
-    shared->End(Shared::Stage::STARTED, pid, error);
-    files.clear();  // closing is asking, too
+    bool is_wanted = false;
+    Shared::Start& start = shared->Next(is_wanted);
+    try {
+      if (failure != 0) {
+        start.error = start.program + ": " + ErrorText(failure);
+      } else if (is_wanted) {
+        (void)SpawnChild(start.program, std::move(start.arguments), InPlace(start.files, files),
+                         start.pid, start.error);
+      }
+    } catch (const std::bad_alloc&) {
+      start.error = "no memory";
+    }
+    shared->End(start, socket.fd);
   }
 }
 
@@ -181,7 +177,7 @@ bool Starter::Open(std::string& error) {
     return false;
   }
   std::unique_lock lock(made->mutex);
-  made->ended.wait(lock, [&] { return made->stage != Shared::Stage::OPENING; });
+  made->opened.wait(lock, [&] { return made->is_open; });
   if (!made->error.empty()) {
     error = made->error;
     return false;
@@ -191,36 +187,59 @@ bool Starter::Open(std::string& error) {
   return true;
 }
 
-bool Starter::Start(const std::string& program, std::vector<std::string> arguments,
-                    const ChildFiles& files, Child& child, std::string& error) {
-  std::unique_lock lock(shared->mutex);
-  if (shared->stage == Shared::Stage::STARTED && shared->pid > 0) {  // it came too late
-    (void)kill(shared->pid, SIGKILL);
-    (void)waitpid(shared->pid, nullptr, 0);
-    shared->pid = -1;
-  }
-  if (shared->stage != Shared::Stage::STARTING) {
-    shared->stage = Shared::Stage::STARTING;
-    shared->program = program;
-    shared->arguments = std::move(arguments);
-    shared->files = files;
-    if (!SendFiles(asking.fd, Those(files))) {
-      shared->stage = Shared::Stage::FREE;
-      error = program + ": " + ErrorText(errno);
-      return false;
-    }
-    shared->ended.wait_for(lock, PATIENCE,
-                           [this] { return shared->stage == Shared::Stage::STARTED; });
-  }
-  if (shared->stage == Shared::Stage::STARTING) {
+uint64_t Starter::Ask(const std::string& program, std::vector<std::string> arguments,
+                      const ChildFiles& files, std::string& error) {
+  const std::vector<int> given = Given(files);
+  const std::lock_guard lock(shared->mutex);
+  const auto dropped = std::count_if(
+      shared->starts.begin(), shared->starts.end(),
+      [](const Shared::Start& start) { return start.stage == Shared::Stage::DROPPED; });
+  if (dropped >= MOST_DROPPED) {
     error = program + ": does not start";
-    return false;
+    return 0;
   }
 
-  shared->stage = Shared::Stage::FREE;
-  error = shared->error;
-  const pid_t pid = std::exchange(shared->pid, -1);
-  return pid > 0 && WatchChild(pid, program, child, error);
+  Shared::Start& start = shared->starts.emplace_back();
+  start.id = ++last_id;
+  start.program = program;
+  start.arguments = std::move(arguments);
+  start.files = files;
+  if (!SendWithFiles(asking.fd, BYTE, given, MSG_DONTWAIT)) {
+    error = program + ": " + ErrorText(errno);
+    shared->starts.pop_back();
+    return 0;
+  }
+  return last_id;
+}
+
+std::optional<bool> Starter::Take(uint64_t id, Child& child, std::string& error) {
+  Shared::Start taken;
+  {
+    const std::lock_guard lock(shared->mutex);
+    const auto start = shared->Find(id);
+    if (start->stage != Shared::Stage::ENDED) {
+      return std::nullopt;
+    }
+    taken = std::move(*start);
+    shared->starts.erase(start);
+    char byte = 0;
+    (void)recv(asking.fd, &byte, 1, MSG_DONTWAIT);
+  }
+  error = taken.error;
+  return taken.pid > 0 && WatchChild(taken.pid, taken.program, child, error);
+}
+
+void Starter::Drop(uint64_t id, Child& child) {
+  {
+    const std::lock_guard lock(shared->mutex);
+    const auto start = shared->Find(id);
+    if (start->stage == Shared::Stage::ASKED) {
+      start->stage = Shared::Stage::DROPPED;
+      return;
+    }
+  }
+  std::string error;
+  (void)Take(id, child, error);
 }
 
 }  // namespace fileindexd

@@ -6,13 +6,17 @@
 // answers, and whoever starts the child waits for it. So the files that the service holds open are
 // none of the starter's: it gets those alone that the child is to have.
 //
-//   Start   program, descriptors  ->  thread: starts it  -> its process
+//   Ask   program, descriptors  ->  thread: starts it
+//   Take                              its process
+//   Drop                              nobody's process: thread kills it
 //
-// One thread beside that. What a child gets may hang the starter all the same: that is waited for
-// a while, and until it comes back nothing else can be started.
+// One thread beside the asker's. What a child gets may hang it all the same: nothing else can be
+// started until it comes back, but the asker goes on meanwhile.
 #pragma once
 
+#include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -30,15 +34,23 @@ class Starter {
 
   // Before any file is open that may not answer. False, and `error` then says why, on failure.
   bool Open(std::string& error);
-  // As SpawnChild.
-  bool Start(const std::string& program, std::vector<std::string> arguments,
-             const ChildFiles& files, Child& child, std::string& error);
+  // Asks for what SpawnChild does, and gives a number to take it by. 0, and `error` then says why,
+  // on failure. What is asked for is to be taken or dropped.
+  uint64_t Ask(const std::string& program, std::vector<std::string> arguments,
+               const ChildFiles& files, std::string& error);
+  // None as long as it is not known what came of it; then as SpawnChild and WatchChild, once.
+  std::optional<bool> Take(uint64_t id, Child& child, std::string& error);
+  // Nobody will take it. What is started later is killed; what has been is `child`.
+  void Drop(uint64_t id, Child& child);
+  // Readable as long as there is something to take.
+  int Descriptor() const { return asking.fd; }
 
  private:
   struct Shared;
-  static void Run(const std::shared_ptr<Shared>& shared, int asked);
+  static void Run(const std::shared_ptr<Shared>& shared, int end);
 
   std::shared_ptr<Shared> shared;  // with the thread; none: not open
+  uint64_t last_id = 0;
   ScopedFd asking;
 };
 

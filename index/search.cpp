@@ -98,6 +98,7 @@ struct Asker::Impl {
   bool AskAll(const Question& question, Answer& answer, std::string& error);
   bool HasHits(Question question, const std::string& text);
   void Choose(const Question& question);
+  Answer Gather(const HitOrder& order, uint64_t offset, uint64_t wanted);
   void Complete(std::vector<Hit>& hits);
 };
 
@@ -139,6 +140,27 @@ bool Asker::Impl::HasHits(Question question, const std::string& text) {
   return AskAll(question, answer, error) && !answer.hits.empty();
 }
 
+// What all shares have found, but for the first `offset` hits.
+Answer Asker::Impl::Gather(const HitOrder& order, uint64_t offset, uint64_t wanted) {
+  Answer made;
+  BestHits best(wanted, order);
+  for (AskedShare& share : shares) {
+    made.total += share.total;
+    if (share.has_contents) {
+      made.words[share.name] = share.words;
+    }
+    std::move(share.failures.begin(), share.failures.end(), std::back_inserter(made.failures));
+    for (Hit& hit : share.hits) {
+      best.Add(std::move(hit));
+    }
+  }
+  best.Cut();
+  const auto skipped = static_cast<std::ptrdiff_t>(std::min<uint64_t>(offset, best.hits.size()));
+  made.hits.assign(std::make_move_iterator(best.hits.begin() + skipped),
+                   std::make_move_iterator(best.hits.end()));
+  return made;
+}
+
 bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& error) {
   Asked asked;
   if (!asked.Read(question, names, error)) {
@@ -158,22 +180,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   // A slow share holds up no other.
   side_by_side.Run(shares.size(), [&](size_t i) { shares[i].Ask(question, asked, order, wanted); });
 
-  Answer made;
-  BestHits best(wanted, order);
-  for (AskedShare& share : shares) {
-    made.total += share.total;
-    if (share.has_contents) {
-      made.words[share.name] = share.words;
-    }
-    std::move(share.failures.begin(), share.failures.end(), std::back_inserter(made.failures));
-    for (Hit& hit : share.hits) {
-      best.Add(std::move(hit));
-    }
-  }
-  best.Cut();
-  const auto skipped = static_cast<std::ptrdiff_t>(std::min<uint64_t>(offset, best.hits.size()));
-  made.hits.assign(std::make_move_iterator(best.hits.begin() + skipped),
-                   std::make_move_iterator(best.hits.end()));
+  Answer made = Gather(order, offset, wanted);
   if (question.shows) {
     Complete(made.hits);
   }

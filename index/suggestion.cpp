@@ -5,7 +5,6 @@
 #include <array>
 #include <cstdlib>
 #include <map>
-#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -47,16 +46,21 @@ class NearestWords {
     words.push_back({frequency, std::move(word)});
   }
 
-  // The most frequent; empty: there is none. Stems, which stand in for many words and are none
-  // themselves, go behind what goes on from them.
-  std::string Best() const {
+  // The most frequent, and of those the first; empty: there is none. Stems, which stand in for many
+  // words and are none themselves, go behind what goes on from them.
+  std::string Best() {
+    // What goes on from a word stands right behind it then.
+    std::sort(words.begin(), words.end(),
+              [](const Word& one, const Word& other) { return one.text < other.text; });
     const Word* best = nullptr;
-    for (const Word& word : words) {
-      const bool is_stem = std::any_of(words.begin(), words.end(), [&](const Word& other) {
-        return other.text.size() > word.text.size() && other.text.starts_with(word.text);
-      });
-      if (!is_stem && (best == nullptr || std::make_tuple(-word.frequency, word.text) <
-                                              std::make_tuple(-best->frequency, best->text))) {
+    const Word* next = nullptr;  // the first behind that is another
+    for (size_t i = words.size(); i-- > 0;) {
+      const Word& word = words[i];
+      if (i + 1 < words.size() && words[i + 1].text != word.text) {
+        next = &words[i + 1];
+      }
+      const bool is_stem = next != nullptr && next->text.starts_with(word.text);
+      if (!is_stem && (best == nullptr || word.frequency >= best->frequency)) {
         best = &word;
       }
     }

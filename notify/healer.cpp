@@ -28,6 +28,7 @@
 #include "notify/pressure.h"
 #include "notify/share_comparison.h"
 #include "notify/thread.h"
+#include "state/pause.h"
 
 namespace fileindexd {
 
@@ -60,9 +61,9 @@ struct Running {
   bool dropped = false;  // its outcome is not wanted any more
 };
 
-bool IsPaused(StateStore& store) {
+bool IsIndexingPaused(StateStore& store) {
   int64_t resume_time = -1;
-  return store.GetPause(resume_time) && (resume_time == 0 || resume_time > std::time(nullptr));
+  return store.GetPause(resume_time) && IsPaused(resume_time, std::time(nullptr));
 }
 
 // The healer's and its threads'. The descriptor and `pressure_folder` never change; the mutex
@@ -166,7 +167,7 @@ bool Shared::AwaitTurn(Urgency urgency, StateStore& store) {
     }
 
     lock.unlock();
-    const bool paused = IsPaused(store);
+    const bool paused = IsIndexingPaused(store);
     lock.lock();
     if (paused) {
       changed.wait_for(lock, PAUSE_LOOK, [&] { return IsOver(urgency); });

@@ -46,6 +46,7 @@ bool NeedsTouch(const std::string& share, const ShareStatus& status, int64_t now
          (LookAtFile(DrainedPath(share), stx) && IsStaleFile(stx, now));
 }
 
+// In its last second, too: the daemon itself ends it only after that.
 bool IsPauseInForce(int64_t resume_time, int64_t now) {
   return resume_time == 0 || resume_time >= now;
 }

@@ -11,6 +11,7 @@
 #include <ctime>
 
 #include "state/daemon_socket.h"
+#include "state/pause.h"
 #include "state/pid_file.h"
 
 namespace fileindexd {
@@ -37,7 +38,7 @@ bool Permission::Look(StateStore& store, std::string& error) {
     resume.Close();  // what has come true once would be told of without end
     return false;
   }
-  paused = resume_time == 0 || resume_time > time(nullptr);
+  paused = IsPaused(resume_time, time(nullptr));
   return AwaitResume(paused ? resume_time : 0, error) && is_good;
 }
 

@@ -4,6 +4,7 @@
 
 namespace fileindexd {
 
+// Started under that name by the daemon, which has it in daemon/daemon.h: they change together.
 constexpr const char* SERVICE_PROGRAM = "talocontentsearchd";
 constexpr const char* SERVICE_PID_FILE = "/var/run/talocontentsearchd.pid";
 

@@ -141,7 +141,7 @@ bool IsValidShareName(std::string_view name) {
   });
 }
 
-bool IsNewShareName(std::string_view name) {
+bool CanNameNewShare(std::string_view name) {
   constexpr char LEAD = '\xc2';  // of U+0080 to U+00BF
   for (size_t at = name.find(LEAD); at < name.size(); at = name.find(LEAD, at + 1)) {
     if (at + 1 < name.size() && static_cast<unsigned char>(name[at + 1]) < 0xa0) {

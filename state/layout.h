@@ -41,8 +41,8 @@ bool MakeShareFolder(const std::string& share_name, std::string& error);
 // 1 to 64 bytes; no '/', no NUL, no leading '.', no control characters of ASCII: what can be the
 // name of a share that there is.
 bool IsValidShareName(std::string_view name);
-// What a share can be called from now on: no other control characters (U+0080 to U+009F) either.
-bool IsNewShareName(std::string_view name);
+// As a share may be called from now on: no other control characters (U+0080 to U+009F) either.
+bool CanNameNewShare(std::string_view name);
 
 // The one form in which paths are kept and compared: repeated and trailing slashes dropped. None
 // for a path that is relative or empty, holds a NUL, or has a "." or ".." component.

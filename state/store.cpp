@@ -246,7 +246,7 @@ bool StateStore::GetSettings(std::shared_ptr<const Settings>& settings) {
 
 bool StateStore::AddShare(const Share& share) {
   const std::lock_guard guard(impl->mutex);
-  if (!IsNewShareName(share.name)) {
+  if (!CanNameNewShare(share.name)) {
     return impl->Fail("not a valid share name: " + share.name);
   }
   if (NormalPath(share.path) != share.path) {

@@ -37,14 +37,12 @@
 //                  makes an order to answer with words
 #include <dirent.h>
 #include <fcntl.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <csignal>
 #include <cstdlib>
-#include <cstring>
 #include <ctime>
 #include <map>
 #include <string>
@@ -52,6 +50,7 @@
 #include "extract/answer.h"
 #include "extract/child.h"
 #include "extract/helper_codes.h"
+#include "extract/passed_files.h"
 #include "extract/sanitized.h"
 
 namespace fileindexd {
@@ -216,21 +215,13 @@ int Serve() {
   Say(EncodeAnswer(Ready()));
   for (int count = 1;; ++count) {
     char frame[8192];
-    iovec bytes = {frame, sizeof(frame)};
-    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
-    msghdr message = {};
-    message.msg_iov = &bytes;
-    message.msg_iovlen = 1;
-    message.msg_control = control;
-    message.msg_controllen = sizeof(control);
-    const ssize_t length = recvmsg(HELPER_SOCKET, &message, MSG_CMSG_CLOEXEC);
+    ScopedFd passed;
+    const ssize_t length = ReceiveWithFiles(HELPER_SOCKET, frame, {&passed, 1});
     const auto job = length > 0 ? DecodeJob({frame, static_cast<size_t>(length)}) : std::nullopt;
-    const cmsghdr* head = job ? CMSG_FIRSTHDR(&message) : nullptr;
-    if (head == nullptr) {
+    const int file = passed.fd;
+    if (!job || file < 0) {
       return 0;
     }
-    int file = -1;
-    memcpy(&file, CMSG_DATA(head), sizeof(file));
     const std::string order = job->name == "converted.txt" ? ContentOf(file) : job->name;
     if (order == "never" || (order == "refuse" && count > 1)) {
       _exit(5);  // ends over it without having begun
@@ -244,7 +235,6 @@ int Serve() {
     const size_t blank = order.find(' ');
     Do(order.substr(0, blank), blank == std::string::npos ? "" : order.substr(blank + 1), file,
        count);
-    close(file);
   }
 }
 

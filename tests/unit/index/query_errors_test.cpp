@@ -2,37 +2,15 @@
 // What people are told of a question that makes no sense.
 #include "base/utf8.h"
 #include "tests/unit/index/query_parse_fixture.h"
+#include "tests/unit/repeated.h"
 
 namespace fileindexd {
-
-namespace {
-
-std::string LineOf(const std::string& text) {
-  QueryNode query;
-  QueryError error;
-  EXPECT_FALSE(ParseQuery(text, NOW, query, error)) << text;
-  return error.Line(text);
-}
-
-std::string Times(const std::string& text, size_t count) {
-  std::string times;
-  for (size_t i = 0; i < count; ++i) {
-    times += text;
-  }
-  return times;
-}
-
-}  // namespace
 
 class QueryErrorsTest : public QueryParseTest {};
 
 TEST_F(QueryErrorsTest, ShowTheCharacterAndWhatStandsThere) {
   const std::string text = "\u00fcber size:1X und mehr";
-  QueryNode query;
-  QueryError error;
-
-  ASSERT_FALSE(ParseQuery(text, NOW, query, error));
-  EXPECT_EQ(error.Line(text),
+  EXPECT_EQ(LineOf(text),
             text + ": '1X' is not a size like 500K, 10M or 1.5G (character 11, at: 1X und mehr)");
 }
 
@@ -69,26 +47,23 @@ TEST_F(QueryErrorsTest, AreLinesForPeople) {
        "(character 6, at: 1,2,0)"},
   };
   for (const Case& one : cases) {
-    QueryNode query;
-    QueryError error;
-    EXPECT_FALSE(ParseQuery(one.text, NOW, query, error)) << one.text;
-    EXPECT_EQ(error.Line(one.text), (one.text.empty() ? "" : one.text + ": ") + one.parsed);
+    EXPECT_EQ(LineOf(one.text), (one.text.empty() ? "" : one.text + ": ") + one.parsed);
   }
 }
 
 // What is shown of a long question is what stands around the place.
 TEST_F(QueryErrorsTest, OfLongQuestionsShowAPieceOfThem) {
-  const std::string many = Times("\u00fc", 1500);
+  const std::string many = Repeated("\u00fc", 1500);
   const std::string what = ": 'x' is not a size like 500K, 10M or 1.5G (character ";
   EXPECT_EQ(LineOf(many + " size:x"),
-            "\u2026" + Times("\u00fc", 53) + " size:x" + what + "1507, at: x)");
-  EXPECT_EQ(LineOf("size:x " + many), "size:x " + Times("\u00fc", 53) + "\u2026" + what +
-                                          "6, at: x " + Times("\u00fc", 28) + "\u2026)");
-  EXPECT_EQ(LineOf(many + " size:x " + Times("\u00fc", 100)),
-            "\u2026" + Times("\u00fc", 14) + " size:x " + Times("\u00fc", 38) + "\u2026" + what +
-                "1507, at: x " + Times("\u00fc", 28) + "\u2026)");
+            "\u2026" + Repeated("\u00fc", 53) + " size:x" + what + "1507, at: x)");
+  EXPECT_EQ(LineOf("size:x " + many), "size:x " + Repeated("\u00fc", 53) + "\u2026" + what +
+                                          "6, at: x " + Repeated("\u00fc", 28) + "\u2026)");
+  EXPECT_EQ(LineOf(many + " size:x " + Repeated("\u00fc", 100)),
+            "\u2026" + Repeated("\u00fc", 14) + " size:x " + Repeated("\u00fc", 38) + "\u2026" +
+                what + "1507, at: x " + Repeated("\u00fc", 28) + "\u2026)");
   EXPECT_EQ(LineOf(many + " ("),
-            "\u2026" + Times("\u00fc", 58) +
+            "\u2026" + Repeated("\u00fc", 58) +
                 " (: something to find is missing here (character 1503, at the end)");
   EXPECT_EQ(LineOf(std::string(5000, 'a')), "\u2026" + std::string(20, 'a') + std::string(40, 'a') +
                                                 "\u2026: the question is too long (character "
@@ -97,11 +72,11 @@ TEST_F(QueryErrorsTest, OfLongQuestionsShowAPieceOfThem) {
 }
 
 TEST_F(QueryErrorsTest, CiteNoMoreOfAValueThanShowsWhichItIs) {
-  const std::string many = Times("\u00fc", 1500);
+  const std::string many = Repeated("\u00fc", 1500);
   for (const std::string& text :
        {"size:" + many, "kind:" + many, "owner:" + many, "under:" + many, "share:/" + many,
         "near:" + many, "ext:/" + many, "is:" + many, "has:" + many, "content:" + many,
-        "text:" + Times("+", 3000), "size>" + many, "title=\"" + many + "\"",
+        "text:" + Repeated("+", 3000), "size>" + many, "title=\"" + many + "\"",
         std::string(3000, 'q') + ":>1", "modified:" + many + ".." + many, "year:" + many}) {
     const std::string line = LineOf(text);
     EXPECT_LT(line.size(), 600U) << line;

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // The files of a small office and of those who work there, questions to them, and what people would
-// expect to see first: written down before it was measured.
+// expect to see first.
 #include <algorithm>
 
 #include "tests/unit/index/question_fixture.h"

@@ -29,6 +29,18 @@ inline std::string Parsed(const std::string& text) {
   return "?" + std::to_string(error.at);
 }
 
+// What is wrong with a question that makes no sense.
+inline QueryError ErrorOf(const std::string& text) {
+  QueryNode query;
+  QueryError error;
+  EXPECT_FALSE(ParseQuery(text, NOW, query, error)) << text;
+  return error;
+}
+
+inline std::string LineOf(const std::string& text) {
+  return ErrorOf(text).Line(text);
+}
+
 struct Case {
   std::string text;
   std::string parsed;

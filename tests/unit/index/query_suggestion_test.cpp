@@ -66,6 +66,20 @@ TEST_F(QuerySuggestionTest, WordsThatStandElsewhereAreNotSuggested) {
   }
 }
 
+// Of words as near as each other the most frequent one, and of those as frequent the first.
+TEST_F(QuerySuggestionTest, WhatOthersGoOnFromIsNotSuggestedHoweverOftenItStands) {
+  Store({{"abcdefgoz.txt", TextContent("abcdefgoz abcdefgozh")},
+         {"a abcdefgoz.txt", TextContent("abcdefgoz abcdefguz")},
+         {"b abcdefgoz.txt", TextContent("abcdefgoz abcdefgoq abcdefgoqh")}});
+  EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgoqh");
+  EXPECT_EQ(Suggested("abcdefgh"), "abcdefgoqh");
+  EXPECT_EQ(Suggested("name:abcdefgh"), "name:abcdefgoz");
+
+  Store({{"c.txt", TextContent("abcdefgozh")}});
+  EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgozh");
+  EXPECT_EQ(Suggested("abcdefgh"), "abcdefgozh");
+}
+
 // Each costs a look through the vocabularies.
 TEST_F(QuerySuggestionTest, QuestionsFullOfSlipsGetNoSuggestion) {
   std::string text;

@@ -46,7 +46,7 @@ TEST(ShareNameTest, GoodOnes) {
   for (const std::string& good :
        {std::string("a"), std::string("my share"), std::string("a.b"), std::string("\xc3\xa4"),
         std::string("\xc2\xa0\xe2\x82\x80\x80\x9f"), std::string(64, 'x')}) {
-    EXPECT_TRUE(IsNewShareName(good)) << good;
+    EXPECT_TRUE(CanNameNewShare(good)) << good;
     EXPECT_TRUE(IsValidShareName(good)) << good;
   }
 }
@@ -57,14 +57,14 @@ TEST(ShareNameTest, BadOnes) {
         std::string("/"), std::string("a\0b", 3), std::string("a\n"), std::string("\t"),
         std::string("a\x7f"), std::string(65, 'x')}) {
     EXPECT_FALSE(IsValidShareName(bad)) << bad;
-    EXPECT_FALSE(IsNewShareName(bad)) << bad;
+    EXPECT_FALSE(CanNameNewShare(bad)) << bad;
   }
 }
 
 TEST(ShareNameTest, ThoseThatWereTakenOnceStayUsable) {
   for (const std::string& old : {std::string("\xc2\x80"), std::string("a\xc2\x9f"
                                                                       "b")}) {
-    EXPECT_FALSE(IsNewShareName(old)) << old;
+    EXPECT_FALSE(CanNameNewShare(old)) << old;
     EXPECT_TRUE(IsValidShareName(old)) << old;
   }
 }

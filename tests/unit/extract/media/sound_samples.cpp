@@ -21,6 +21,7 @@
 
 #include "tests/unit/extract/media/bytes.h"
 #include "tests/unit/extract/media/film_samples.h"
+#include "tests/unit/repeated.h"
 
 namespace fileindexd {
 
@@ -55,14 +56,6 @@ std::string Tagged(const std::string& plain, Rest... rest) {
     }
   }
   return {stream.data()->data(), stream.data()->size()};
-}
-
-std::string Repeated(const std::string& part, size_t times) {
-  std::string bytes;
-  for (size_t i = 0; i < times; i++) {
-    bytes += part;
-  }
-  return bytes;
 }
 
 constexpr int LAST_PAGE = 4;
