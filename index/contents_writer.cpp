@@ -2,7 +2,6 @@
 #include "index/contents_writer.h"
 
 #include <algorithm>
-#include <ctime>
 #include <exception>
 #include <utility>
 
@@ -15,10 +14,6 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t MOST_TRIES = 2;
-
-int64_t Now() {
-  return static_cast<int64_t>(time(nullptr));
-}
 
 int64_t PauseAfter(int64_t tries) {
   int64_t pause = SHORTEST_PAUSE;

@@ -10,6 +10,7 @@
 // for: the outcome of the old bytes is thrown away.
 #pragma once
 
+#include <ctime>
 #include <functional>
 #include <map>
 #include <memory>
@@ -27,6 +28,11 @@ namespace fileindexd {
 // Between two tries to have a file's bytes from the disk, in seconds.
 constexpr int64_t SHORTEST_PAUSE = 2;
 constexpr int64_t LONGEST_PAUSE = 60 * 60;
+
+// Seconds since the epoch.
+inline int64_t Now() {
+  return static_cast<int64_t>(time(nullptr));
+}
 
 inline Content OfKind(Kind kind) {
   Content content;

@@ -1,7 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Opening the contents, and what is put right before the first job.
-#include <ctime>
-
 #include "index/contents_writer_impl.h"
 #include "index/set_aside.h"
 #include "index/text_tokenizer.h"
@@ -15,10 +13,6 @@ namespace {
 constexpr int64_t SLICE = 1000;
 // Somebody who kills services means no file, and may well do so twice.
 constexpr int64_t MOST_DEATHS = 5;
-
-int64_t Now() {
-  return static_cast<int64_t>(time(nullptr));
-}
 
 }  // namespace
 
