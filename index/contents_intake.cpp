@@ -91,7 +91,7 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
   }
   now.reread = std::max(file.reread, entry.reread);
   now.ctime = std::max(now.ctime, entry.ctime);
-  now.unreferred_since = 0;
+  RegainEntry(file, now);
   if (file.kind == Kind::OTHER && entry.kind != Kind::OTHER) {
     now.kind = entry.kind;
     again = again || (file.state == ContentState::DONE && file.found_kind == Kind::OTHER);
@@ -112,6 +112,16 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
   const bool same = now.ctime == file.ctime && now.kind == file.kind && !again &&
                     file.unreferred_since == 0 && now.extractor == file.extractor;
   return same ? SQLITE_OK : table->Update(file, now);
+}
+
+// An entry refers to it. What older readers read while none did was passed over when all else was
+// read anew.
+void ContentsWriter::Impl::RegainEntry(const ContentFile& file, ContentFile& now) {
+  if (file.unreferred_since != 0 && IsAged(file)) {
+    table->meta.extractor = file.extractor;
+    renewed = std::min(renewed, file.id - 1);
+  }
+  now.unreferred_since = 0;
 }
 
 // Of a file whose name tells no kind, settings may want what was found by now, or not any more.
@@ -224,7 +234,7 @@ int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
 
   ContentFile changed = file;
   if (reference == Reference::WANTED) {
-    changed.unreferred_since = 0;
+    RegainEntry(file, changed);
   } else if (file.unreferred_since == 0 || file.unreferred_since > now) {
     changed.unreferred_since = now;
   } else if (now - file.unreferred_since >= DAY) {

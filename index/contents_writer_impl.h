@@ -70,6 +70,7 @@ struct ContentsWriter::Impl {
   int TakeInEntry(const FollowedEntry& entry);
   int TakeInKnown(const FollowedEntry& entry, const ContentFile& file);
   int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
+  void RegainEntry(const ContentFile& file, ContentFile& now);
   int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
   int IsKept(const ContentFile& file, Kind found, bool& is_kept);
   int DropUnwanted(const ContentFile& file);

@@ -3,6 +3,10 @@
 #include <gmock/gmock.h>
 #include <unistd.h>
 
+#include "index/contents_schema.h"
+#include "index/contents_table.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/contents_fixture.h"
 
 namespace fileindexd {
@@ -20,6 +24,31 @@ class ContentsRenewalTest : public ContentsTest {
   void BeginAndDie(const std::string& name, int64_t extractor) {
     ASSERT_TRUE(contents->BeginTries({JobOf(name).file}));
     OpenContents(extractor);
+  }
+  // While another one, and all that there is, is read anew.
+  void BeAwayMeanwhile(const std::string& name) {
+    ReadOldFile(name, 3000);
+    ReadOldFile("other.txt", 2000);
+    TakeAway(name);
+    contents->LookAtAll();
+    TakeIn();
+    Sweep(clock);
+    OpenContents(2);
+    ASSERT_EQ(Read(), Names({"other.txt"}));
+    ASSERT_EQ(Jobs(), Names());
+    ASSERT_TRUE(contents->Commit());
+    ASSERT_EQ(Number("SELECT extractor FROM meta"), 2);
+  }
+  // Out of the share, and into it.
+  void TakeAway(const std::string& name) {
+    ASSERT_EQ(rename(At(name).c_str(), (root + "/../" + name).c_str()), 0);
+    Delete(name);
+    Commit();
+  }
+  void BringBack(const std::string& name) {
+    ASSERT_EQ(rename((root + "/../" + name).c_str(), At(name).c_str()), 0);
+    Add(name);
+    Commit();
   }
 };
 
@@ -186,22 +215,26 @@ TEST_F(ContentsRenewalTest, WhatWasUndoneIsRenewedAllTheSame) {
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
 }
 
-TEST_F(ContentsRenewalTest, WithoutAnEntryItWaitsForOne) {
-  ReadOldFile("a.txt", 3000);
-  ReadOldFile("b.txt", 2000);
-  OpenContents(2);
-  ASSERT_EQ(rename(At("a.txt").c_str(), (root + "/../a.txt").c_str()), 0);
-  Delete("a.txt");
-  Commit();
+TEST_F(ContentsRenewalTest, WhatWasAwayWhileAllElseWasReadAnewIsReadWhenItIsBack) {
+  BeAwayMeanwhile("a.txt");
+  BringBack("a.txt");
 
-  EXPECT_EQ(Read(), Names({"b.txt"}));
-  EXPECT_EQ(Jobs(), Names());
-
-  ASSERT_EQ(rename((root + "/../a.txt").c_str(), At("a.txt").c_str()), 0);
-  Add("a.txt");
-  Commit();
   TakeIn();
-  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+
+  EXPECT_EQ(Holding("olda"), 1);
+  EXPECT_EQ(Read(), Names({"a.txt"}));
+  EXPECT_EQ(Jobs(), Names());
+}
+
+TEST_F(ContentsRenewalTest, SoItIsWhoeverSeesFirstThatItIsBack) {
+  BeAwayMeanwhile("a.txt");
+  BringBack("a.txt");
+  contents->LookAtAll();
+
+  Sweep(clock);
+  TakeIn();
+
+  EXPECT_EQ(Read(), Names({"a.txt"}));
 }
 
 TEST_F(ContentsRenewalTest, AFileThatChangedMeanwhileWaitsAsEver) {
