@@ -67,7 +67,7 @@ bool ContentsWriter::Impl::NextAgain(int64_t now, size_t limit, std::vector<Cont
     code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
     has_more = round.dropped;
     if (code == SQLITE_OK && !round.dropped && !round.held && jobs.size() < limit) {
-      code = Renew(has_more);
+      code = Renew(now, has_more);
     }
     if (code != SQLITE_OK) {
       return Done(code);
@@ -122,8 +122,8 @@ int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round
 }
 
 // Makes a few of what older readers read, or failed at, wait: no other ones do. What was read
-// stays, and is found, until it is read anew.
-int ContentsWriter::Impl::Renew(bool& more) {
+// stays, and is found, until it is read anew. What has no entry may be about to get one back.
+int ContentsWriter::Impl::Renew(int64_t now, bool& more) {
   more = false;
   if (table->meta.extractor == extractor) {
     return SQLITE_OK;
@@ -134,11 +134,7 @@ int ContentsWriter::Impl::Renew(bool& more) {
   for (size_t i = 0; i < files.size() && code == SQLITE_OK && begun < MOST_RENEWED; ++i) {
     renewed = files[i].id;
     if (IsAged(files[i]) && files[i].unreferred_since == 0) {
-      ContentFile now = files[i];
-      now.state = ContentState::WAITING;
-      now.tries = 0;
-      now.unended = 0;
-      code = table->Update(files[i], now);
+      code = RenewFile(files[i], now);
       ++begun;
     }
   }
@@ -148,6 +144,23 @@ int ContentsWriter::Impl::Renew(bool& more) {
   }
   more = !files.empty();
   return code;
+}
+
+int ContentsWriter::Impl::RenewFile(const ContentFile& file, int64_t now) {
+  Reference reference = Reference::NONE;
+  const int code = entries.Refer(file.identity, reference);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  ContentFile changed = file;
+  if (reference == Reference::WANTED) {
+    changed.state = ContentState::WAITING;
+    changed.tries = 0;
+    changed.unended = 0;
+  } else {
+    changed.unreferred_since = now;
+  }
+  return table->Update(file, changed);
 }
 
 ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
@@ -182,8 +195,22 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
   FollowedEntry latest;
   bool found = false;
   code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);
+  if (code == SQLITE_OK && !found && WasReadByOlder(file)) {
+    return PutAside(file);
+  }
   code = code == SQLITE_OK ? Remove(file) : code;
   return code == SQLITE_OK && found ? TakeInEntry(latest) : code;
+}
+
+// Its entry may be about to come back, and then what was read stands for it until it is read anew.
+int ContentsWriter::Impl::PutAside(const ContentFile& file) {
+  released.erase(file.id);
+  ContentFile aside = file;
+  aside.state = ContentState::DONE;
+  aside.tries = 0;
+  aside.unended = 0;
+  aside.unreferred_since = Now();
+  return table->Update(file, aside);
 }
 
 int ContentsWriter::Impl::Remove(const ContentFile& file) {

@@ -84,8 +84,10 @@ struct ContentsWriter::Impl {
   Round BeginRound(size_t limit) const;
   int OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs);
   int OfferSome(std::vector<ContentFile>& rows, Round& round, std::vector<ContentJob>& jobs);
-  int Renew(bool& more);
+  int Renew(int64_t now, bool& more);
+  int RenewFile(const ContentFile& file, int64_t now);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
+  int PutAside(const ContentFile& file);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
   int Remove(const ContentFile& file);
@@ -111,12 +113,15 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
+  bool WasReadByOlder(const ContentFile& file) const {
+    return file.extractor != KEPT_OUT && file.extractor < extractor;
+  }
   // Read by older readers, or what those failed at.
   bool IsAged(const ContentFile& file) const {
-    const bool is_kept = file.state == ContentState::DONE && file.extractor != KEPT_OUT;
     const bool has_failed =
         file.state == ContentState::FAILED || file.state == ContentState::QUARANTINED;
-    return (is_kept || has_failed) && file.extractor < extractor;
+    return (file.state == ContentState::DONE && WasReadByOlder(file)) ||
+           (has_failed && file.extractor < extractor);
   }
   bool IsFull() const { return table->pending_bytes >= ENOUGH_PENDING; }
 

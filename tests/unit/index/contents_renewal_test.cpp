@@ -215,6 +215,64 @@ TEST_F(ContentsRenewalTest, WhatWasUndoneIsRenewedAllTheSame) {
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
 }
 
+// Entries may be made anew just now: what was read stays until they are there again.
+TEST_F(ContentsRenewalTest, WithoutAnEntryItIsKeptAndWaitsForOne) {
+  ReadOldFile("a.txt", 3000);
+  ReadOldFile("b.txt", 2000);
+  OpenContents(2);
+  TakeAway("a.txt");
+
+  EXPECT_EQ(Read(), Names({"b.txt"}));
+  EXPECT_EQ(Jobs(), Names());
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Holding("olda"), 1);
+  EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 0);
+
+  BringBack("a.txt");
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsRenewalTest, WhatLosesItsEntryWhileItWaitsIsKeptAndWaitsForAnother) {
+  ReadOldFile("a.txt", 3000);
+  ReadOldFile("b.txt", 2000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(1), Names({"a.txt"}));
+  ASSERT_TRUE(contents->Commit());
+  ASSERT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 2);
+  TakeAway("b.txt");
+
+  EXPECT_EQ(Jobs(), Names());
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Holding("oldb"), 1);
+  EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 1);
+
+  BringBack("b.txt");
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"b.txt"}));
+  Finish("b.txt", "anew");
+  EXPECT_EQ(Number("SELECT count(*) FROM files"), 2);
+}
+
+TEST_F(ContentsRenewalTest, WhatTheDiskDoesNotGiveIsKeptWithoutAnEntryToo) {
+  ReadOldFile("a.txt", 3000);
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->Unread(JobOf("a.txt").file, "cannot be read", clock));
+  ASSERT_TRUE(contents->Commit());
+  TakeAway("a.txt");
+  clock = contents->UnreadDue();
+
+  EXPECT_EQ(Jobs(), Names());
+  ASSERT_TRUE(contents->Commit());
+  EXPECT_EQ(Holding("olda"), 1);
+  EXPECT_EQ(contents->UnreadDue(), INT64_MAX);
+
+  BringBack("a.txt");
+  TakeIn();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
 TEST_F(ContentsRenewalTest, WhatWasAwayWhileAllElseWasReadAnewIsReadWhenItIsBack) {
   BeAwayMeanwhile("a.txt");
   BringBack("a.txt");
