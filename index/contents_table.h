@@ -96,6 +96,8 @@ class ContentsTable {
   // In place of what was stored. Sets `text`, `length` and `found_kind` of `file`, which Update
   // then writes; `before` is the row as it stands.
   int SetContent(const ContentFile& before, const PreparedContent& prepared, ContentFile& file);
+  // Whether it has a text, a number, or what files that are alike are known by.
+  int HoldsAny(int64_t id, bool& holds);
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 
@@ -157,7 +159,7 @@ class ContentsTable {
   bool merging = false;
   Statement find, find_by_id, waiting_new, waiting_again, unread_due, failed, left_begun,
       unreferred, slice;
-  Statement insert, update, set_reason, set_content, remove;
+  Statement insert, update, set_reason, set_content, holds_any, remove;
   Statement set_due, drop_due, limit_due, next_due;
   Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
   Statement insert_new_words, remove_new_words;

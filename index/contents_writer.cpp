@@ -122,6 +122,23 @@ int ContentsWriter::Impl::Keep(const ContentFile& file, const PreparedContent& c
                  : table->SetContent(file, OfKind(kind), now);
 }
 
+// What was found before in the same bytes, by older readers or in another try, stays. Who does not
+// even tell the kind has nothing to put in its place.
+int ContentsWriter::Impl::KeepOfFailure(const ContentFile& file, const Content& content,
+                                        ContentFile& now) {
+  const bool is_same = file.extractor != KEPT_OUT;
+  bool is_known = is_same && content.kind == Kind::OTHER;
+  int code = SQLITE_OK;
+  if (is_same && !is_known) {
+    code = table->HoldsAny(file.id, is_known);
+  }
+  if (code != SQLITE_OK || !is_known) {
+    return code == SQLITE_OK ? Keep(file, content, now) : code;
+  }
+  now.extractor = extractor;
+  return SQLITE_OK;
+}
+
 // What is of no kind that is wanted has not failed: nobody wants to know what is in it.
 void ContentsWriter::Impl::SettleKeptOut(ContentFile& file) {
   if (file.extractor == KEPT_OUT && file.state == ContentState::FAILED) {
@@ -138,10 +155,7 @@ bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Con
     now.state = ContentState::WAITING;
     if (!killed || now.tries >= MOST_TRIES) {
       now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
-      // What was found before in the same bytes, by older readers or in another try, stays.
-      const bool is_known = file.text != 0 && file.extractor != KEPT_OUT;
-      now.extractor = extractor;
-      code = is_known ? SQLITE_OK : Keep(file, content, now);
+      code = KeepOfFailure(file, content, now);
       SettleKeptOut(now);
     }
     const bool is_failure = now.state != ContentState::DONE;

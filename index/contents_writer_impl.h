@@ -99,6 +99,7 @@ struct ContentsWriter::Impl {
   bool End(int64_t file, const Ending& put_down);
   bool Finish(int64_t file, const PreparedContent& content);
   int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
+  int KeepOfFailure(const ContentFile& file, const Content& content, ContentFile& now);
   static void SettleKeptOut(ContentFile& file);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Unread(int64_t file, const std::string& reason, int64_t now);

@@ -295,6 +295,50 @@ TEST_F(ContentsRenewalTest, SoItIsWhoeverSeesFirstThatItIsBack) {
   EXPECT_EQ(Read(), Names({"a.txt"}));
 }
 
+TEST_F(ContentsRenewalTest, AFailureTakesNoNumbersAway) {
+  OldFile("a.jpg", 3000);
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({"a.jpg"}));
+  Content found;
+  found.kind = Kind::PHOTO;
+  found.numbers = {{ContentField::WIDTH, 640}};
+  found.sample = 7;
+  ASSERT_TRUE(contents->Finish(JobOf("a.jpg").file, found));
+  ASSERT_TRUE(contents->Commit());
+  ASSERT_EQ(Number("SELECT text FROM files"), 0);
+
+  Content part;
+  part.kind = Kind::PHOTO;
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.jpg"}));
+  ASSERT_TRUE(contents->Fail(JobOf("a.jpg").file, "damaged", part, false));
+  ASSERT_TRUE(contents->RetryFailed());
+  for (int death = 0; death < 2; ++death) {
+    ASSERT_EQ(Jobs(), Names({"a.jpg"}));
+    ASSERT_TRUE(contents->Fail(JobOf("a.jpg").file, "killed", {}, true));
+  }
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Number("SELECT state FROM files"), 3);
+  EXPECT_EQ(Number("SELECT width FROM files"), 640);
+  EXPECT_EQ(Number("SELECT sample FROM files"), 7);
+  EXPECT_EQ(Number("SELECT found_kind FROM files"), static_cast<int64_t>(Kind::PHOTO));
+}
+
+TEST_F(ContentsRenewalTest, WhereNothingWasKnownPartIsKept) {
+  OldFile("a.txt", 3000);
+  TakeIn();
+  for (int64_t version = 1; version < 3; ++version) {
+    OpenContents(version);
+    ASSERT_EQ(Jobs(), Names({"a.txt"}));
+    const Content found = version == 1 ? Content() : TextContent("half");
+    ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "damaged", found, false));
+    ASSERT_TRUE(contents->Commit());
+  }
+
+  EXPECT_EQ(Holding("half"), 1);
+}
+
 TEST_F(ContentsRenewalTest, AFileThatChangedMeanwhileWaitsAsEver) {
   ReadOldFile("a.txt", 3000);
   OpenContents(2);
