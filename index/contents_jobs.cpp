@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What waits is handed out, and taken back when it ended.
 #include <algorithm>
+#include <utility>
 
 #include "index/contents_writer_impl.h"
 
@@ -15,7 +16,7 @@ constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file a
 constexpr int ROUNDS = 8;
 constexpr int64_t MOST_LOOKED = 1000;  // rows in one go
 constexpr size_t MOST_RENEWED = 64;    // at once
-constexpr int64_t MOST_UNREAD = 4;     // at once
+constexpr size_t MOST_UNREAD = 4;      // at once
 
 }  // namespace
 
@@ -86,16 +87,21 @@ ContentsWriter::Impl::Round ContentsWriter::Impl::BeginRound(size_t limit) const
   return round;
 }
 
-// A few of those that are due: each may hold its reader up for long. Until it is known what became
-// of one, it is not due again.
+// A few of those that are due: each may hold its reader up for long. What is handed out stays due
+// on disk: a kill must not put it off.
 int ContentsWriter::Impl::OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs) {
   std::vector<ContentFile> rows;
-  int code = unread_due <= now ? table->UnreadDue(now, MOST_UNREAD, rows) : SQLITE_OK;
+  const auto most = static_cast<int64_t>(MOST_UNREAD + out.size());
+  int code = unread_due <= now ? table->UnreadDue(now, most, rows) : SQLITE_OK;
+  const size_t limit = std::exchange(round.limit, std::min(round.limit, MOST_UNREAD));
   code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
-  for (size_t i = 0; i < jobs.size() && code == SQLITE_OK; ++i) {
-    code = table->SetDue(jobs[i].file, now + LONGEST_PAUSE);
-  }
-  return code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  round.limit = limit;
+  return code == SQLITE_OK ? FollowUnread() : code;
+}
+
+// Until it is known what became of one that is handed out, it is not due again.
+int ContentsWriter::Impl::FollowUnread() {
+  return table->NextDue([this](int64_t file) { return out.contains(file); }, unread_due);
 }
 
 int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round,

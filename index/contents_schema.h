@@ -33,8 +33,7 @@
 //             copy, so deleting needs what was inserted. Made by the writer, as the share's
 //             language is among its arguments
 //   later     files whose bytes the disk did not give, and when the next try is due, in seconds
-//   since
-//             the epoch. While one is with a helper that is far away
+//             since the epoch
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
 //             failed; and under NOT_KEPT, as done, those that were looked into and left: of no kind
 //             that is read, or of one that is not wanted

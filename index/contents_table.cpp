@@ -105,7 +105,7 @@ int ContentsTable::Prepare(sqlite3* db) {
        "INSERT INTO later VALUES(?1, ?2) ON CONFLICT(file) DO UPDATE SET due = excluded.due"},
       {&drop_due, "DELETE FROM later WHERE file = ?1"},
       {&limit_due, "UPDATE later SET due = ?1 WHERE due > ?1"},
-      {&next_due, "SELECT min(due) FROM later"},
+      {&next_due, "SELECT due, file FROM later ORDER BY due"},
       {&write_meta,
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
        "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
@@ -355,21 +355,22 @@ int ContentsTable::SetDue(int64_t id, int64_t due) {
   return code == SQLITE_OK ? set_due.Run() : code;
 }
 
+// Where there is none, nothing is begun.
 int ContentsTable::LimitDue(int64_t latest) {
   int64_t due = 0;
   limit_due.BindInt(1, latest);
-  const int code = NextDue(due);
+  const int code = NextDue([](int64_t) { return false; }, due);
   return code == SQLITE_OK && due != INT64_MAX ? limit_due.Run() : code;
 }
 
-int ContentsTable::NextDue(int64_t& due) {
-  due = INT64_MAX;
-  bool found = false;
-  return next_due.ReadOne(found, [&] {
-    if (sqlite3_column_type(next_due.handle, 0) != SQLITE_NULL) {
-      due = next_due.Int(0);
-    }
-  });
+int ContentsTable::NextDue(const std::function<bool(int64_t file)>& is_left_out, int64_t& due) {
+  int code = next_due.Step();
+  while (code == SQLITE_ROW && is_left_out(next_due.Int(1))) {
+    code = next_due.Step();
+  }
+  due = code == SQLITE_ROW ? next_due.Int(0) : INT64_MAX;
+  next_due.Reset();
+  return StepError(code);
 }
 
 int ContentsTable::SetReason(int64_t id, const std::string& reason) {

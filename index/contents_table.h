@@ -9,6 +9,7 @@
 
 #include <array>
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -91,8 +92,8 @@ class ContentsTable {
   int SetDue(int64_t id, int64_t due);
   // None is due later than that: the clock may have been set back.
   int LimitDue(int64_t latest);
-  // The next one; INT64_MAX if there is none.
-  int NextDue(int64_t& due);
+  // When the next one is, of those that are not left out; INT64_MAX if there is none.
+  int NextDue(const std::function<bool(int64_t file)>& is_left_out, int64_t& due);
   // In place of what was stored. Sets `text`, `length` and `found_kind` of `file`, which Update
   // then writes; `before` is the row as it stands.
   int SetContent(const ContentFile& before, const PreparedContent& prepared, ContentFile& file);

@@ -177,7 +177,7 @@ bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
     code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(unread.tries)) : code;
-    return code == SQLITE_OK ? table->NextDue(unread_due) : code;
+    return code == SQLITE_OK ? FollowUnread() : code;
   });
 }
 
@@ -189,10 +189,7 @@ bool ContentsWriter::Impl::Release(int64_t id) {
     return false;
   }
   int code = TakeBack(id, file, found, current);
-  if (code == SQLITE_OK && found && file.state == ContentState::UNREAD) {
-    unread_due = 0;
-    code = table->SetDue(id, unread_due);
-  }
+  code = code == SQLITE_OK ? FollowUnread() : code;
   if (code != SQLITE_OK || !found) {
     return Done(code);
   }

@@ -83,6 +83,7 @@ struct ContentsWriter::Impl {
   bool NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs, bool& more);
   Round BeginRound(size_t limit) const;
   int OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs);
+  int FollowUnread();
   int OfferSome(std::vector<ContentFile>& rows, Round& round, std::vector<ContentJob>& jobs);
   int Renew(int64_t now, bool& more);
   int RenewFile(const ContentFile& file, int64_t now);

@@ -82,7 +82,7 @@ int ContentsWriter::Impl::Own() {
     renewed = 0;  // see Renew, which also ends it
   }
   code = code == SQLITE_OK ? table->LimitDue(Now() + LONGEST_PAUSE) : code;
-  code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  code = code == SQLITE_OK ? FollowUnread() : code;
   return code == SQLITE_OK ? table->Commit(Now()) : code;
 }
 
@@ -108,9 +108,6 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
         code = table->SetReason(file.id, "the content service ended over it again and again");
       }
       code = code == SQLITE_OK ? table->Update(left[i], file) : code;
-      if (code == SQLITE_OK && file.state == ContentState::UNREAD) {
-        code = table->SetDue(file.id, 0);  // its pause was put off while it was in flight
-      }
     }
   } while (code == SQLITE_OK && !left.empty());
   has_judged = has_judged || code == SQLITE_OK;

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Files whose bytes the disk does not give.
 #include <gmock/gmock.h>
+#include <sys/stat.h>
 
 #include <ctime>
 
@@ -88,6 +89,43 @@ TEST_F(ContentsUnreadTest, AKillDoesNotPutATryOff) {
 
   EXPECT_LE(contents->UnreadDue(), clock);
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, AKillWhileItIsBeingOpenedDoesNotPutATryOffEither) {
+  clock = time(nullptr);
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  (void)Pass();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  File("b.txt");  // a commit in between
+
+  OpenContents();
+
+  EXPECT_LE(contents->UnreadDue(), clock);
+  EXPECT_EQ(NewJobs(), Names({"b.txt"}));
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, WhatIsWithAHelperHidesNoneThatIsDue) {
+  constexpr size_t FILES = 30;  // many times as many as are given out at once
+  for (size_t i = 0; i < FILES; ++i) {
+    File("f" + std::to_string(i) + ".txt");
+  }
+  for (const std::string& name : Jobs()) {
+    Unread(name);
+    ++clock;
+  }
+  clock += HOUR;
+
+  size_t given = 0;
+  for (Names some = Jobs(); !some.empty(); some = Jobs()) {
+    EXPECT_LE(some.size(), 4U);
+    given += some.size();
+    EXPECT_EQ(contents->UnreadDue() <= clock, given < FILES);
+  }
+  EXPECT_EQ(given, FILES);
+  EXPECT_EQ(contents->UnreadDue(), INT64_MAX);
 }
 
 TEST_F(ContentsUnreadTest, ThePausesGrowToAnHour) {
