@@ -126,8 +126,8 @@ void ContentsWriter::Impl::RegainEntry(const ContentFile& file, ContentFile& now
 
 // Of a file whose name tells no kind, settings may want what was found by now, or not any more.
 int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, bool& again) {
-  const bool waits = file.state == ContentState::WAITING;
-  if (waits && file.text == 0) {
+  const bool waits = file.state == ContentState::WAITING || file.state == ContentState::UNREAD;
+  if (waits && file.text == 0 && file.extractor == KEPT_OUT) {
     return SQLITE_OK;
   }
   bool is_kept = true;

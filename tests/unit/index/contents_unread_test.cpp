@@ -128,6 +128,32 @@ TEST_F(ContentsUnreadTest, WhatIsWithAHelperHidesNoneThatIsDue) {
   EXPECT_EQ(contents->UnreadDue(), INT64_MAX);
 }
 
+TEST_F(ContentsUnreadTest, AfterAWriteThatHidItselfItsPausesGoOnWhateverElseChanges) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+  WriteFile(At("a.txt"), "bytea");
+  SetTime(At("a.txt"), 1000);
+  Add("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  const int64_t due = contents->UnreadDue();
+
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+
+  EXPECT_EQ(NewJobs(), Names());
+  EXPECT_EQ(contents->UnreadDue(), due);
+  (void)Pass();
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
 TEST_F(ContentsUnreadTest, ThePausesGrowToAnHour) {
   File("a.txt");
   ASSERT_EQ(Jobs(), Names({"a.txt"}));
