@@ -82,8 +82,7 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 // smallest. An index has these expressions.
 #define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
 
-// What databases of this version lack that were made before it was thought of. Whoever only reads
-// needs none of it.
+// What databases made by earlier builds of this version lack. Whoever only reads needs none of it.
 extern const char* const CONTENTS_ADDITIONS;
 
 // The columns of the number fields, in their order, separated by ", ".

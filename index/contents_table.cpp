@@ -14,6 +14,12 @@ constexpr int64_t FREE_PAGES_KEPT = 256;
   "id, inode, birth_time, size, mtime, ctime, kind, found_kind, state, extractor, " \
   "tries, unended, begun, unreferred_since, reread, text, length"
 
+// Of those readers. Two of these are merged by the expressions that they end with.
+#define WAITING_FILES                      \
+  "SELECT " FILE_COLUMNS                   \
+  ", tries + unended, mtime / 60000000000" \
+  " FROM files WHERE state = 0 AND extractor = "
+
 void ReadFile(const Statement& row, ContentFile& file) {
   file.id = row.Int(0);
   file.identity.inode = static_cast<uint64_t>(row.Int(1));
@@ -64,7 +70,7 @@ bool IsNotKept(const ContentFile& file) {
 
 int ContentsTable::Complete() {
   bool is_complete = false;
-  const int code = HasTable("later", is_complete);
+  const int code = Exists("files_to_read", is_complete);
   return code != SQLITE_OK || is_complete ? code : Execute(handle, CONTENTS_ADDITIONS);
 }
 
@@ -77,12 +83,11 @@ int ContentsTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&find, "SELECT " FILE_COLUMNS " FROM files WHERE inode = ?1 AND birth_time = ?2"},
       {&find_by_id, "SELECT " FILE_COLUMNS " FROM files WHERE id = ?1"},
-      {&waiting_new,
-       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND (extractor = 0 OR extractor >= ?2)"
-       " ORDER BY " WAITING_ORDER " LIMIT ?1"},
+      {&waiting_new, WAITING_FILES "0 UNION ALL " WAITING_FILES "?2"
+                                   " ORDER BY " WAITING_ORDER " LIMIT ?1"},
       {&waiting_again,
-       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND extractor <> 0 AND extractor < ?2"
-       " ORDER BY " WAITING_ORDER " LIMIT ?1"},
+       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND extractor > 0 AND extractor <> ?2"
+       " ORDER BY extractor, " WAITING_ORDER " LIMIT ?1"},
       {&unread_due, "SELECT " FILE_COLUMNS " FROM later CROSS JOIN files ON files.id = later.file"
                     " WHERE later.due <= ?2 ORDER BY later.due LIMIT ?1"},
       {&failed,

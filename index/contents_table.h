@@ -75,7 +75,7 @@ class ContentsTable {
   int Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found);
   int FindById(int64_t id, ContentFile& file, bool& found);
   // Each of these gives up to `limit` rows.
-  // Of those that wait, first what was never read, or only by these readers; then what older ones
+  // Of those that wait, first what was never read, or only by these readers; then what other ones
   // had read or failed at.
   int WaitingNew(int64_t limit, int64_t extractor, std::vector<ContentFile>& files);
   int WaitingAgain(int64_t limit, int64_t extractor, std::vector<ContentFile>& files);
@@ -125,7 +125,7 @@ class ContentsTable {
 
   int Complete();  // see CONTENTS_ADDITIONS
   int PrepareTexts();
-  int HasTable(const char* name, bool& has);
+  int Exists(const char* name, bool& has);
   struct Words {
     std::string language;
     std::string version;

@@ -31,7 +31,7 @@ int Execute(sqlite3* db, const std::string& sql) {
 
 }  // namespace
 
-int ContentsTable::HasTable(const char* name, bool& has) {
+int ContentsTable::Exists(const char* name, bool& has) {
   Statement statement;
   has = false;
   int code = statement.Prepare(handle, "SELECT 1 FROM sqlite_master WHERE name = ?1");
@@ -65,7 +65,7 @@ int ContentsTable::PrepareWords() {
 }
 
 int ContentsTable::ReadWordsToBe(Words& to_be, bool& found) {
-  int code = HasTable("words_to_be", found);
+  int code = Exists("words_to_be", found);
   if (code != SQLITE_OK || !found) {
     return code;
   }
@@ -84,7 +84,7 @@ int ContentsTable::UseWords(const std::string& language, const std::string& vers
   Words to_be;
   bool is_making = false;
   int code = ReadWordsToBe(to_be, is_making);
-  code = code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
+  code = code == SQLITE_OK ? Exists(OLD_WORDS, has_old_words) : code;
   // Older versions made new words in the place of the old ones: what is there lacks some, and what
   // is not there must not be taken out.
   const bool is_partial = !is_making && meta.reworded != ALL_WORDS;
@@ -106,7 +106,7 @@ int ContentsTable::UseWords(const std::string& language, const std::string& vers
 int ContentsTable::BeginWords(const Words& to_be) {
   bool has_words = false;
   int code = Begin();
-  code = code == SQLITE_OK ? HasTable("words", has_words) : code;
+  code = code == SQLITE_OK ? Exists("words", has_words) : code;
   if (code != SQLITE_OK) {
     return code;
   }

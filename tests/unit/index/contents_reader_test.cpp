@@ -104,7 +104,7 @@ TEST_F(ContentsReaderTest, WhatWasCountedInAnotherWayIsCountedAnew) {
   ASSERT_TRUE(contents->Commit());
   contents->Close();
   Run("sqlite3 " + ContentsPath("s") +
-      "/contents.db 'DROP TABLE later; DELETE FROM counts WHERE kind = 5;"
+      "/contents.db 'DROP TABLE later; DROP INDEX files_to_read; DELETE FROM counts WHERE kind = 5;"
       " UPDATE counts SET done = 1 WHERE kind = 0'");
 
   OpenContents();

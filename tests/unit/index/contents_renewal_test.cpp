@@ -354,6 +354,45 @@ TEST_F(ContentsRenewalTest, AFileThatChangedMeanwhileWaitsAsEver) {
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
 }
 
+// However much waits that older readers read, what is new is found without looking at it.
+TEST_F(ContentsRenewalTest, WhatWaitsIsFoundByAnIndexInItsOrder) {
+  ASSERT_TRUE(contents->Commit());
+  IndexDatabase database;
+  ASSERT_EQ(database.OpenForWriting(ContentsPath("s"), false, CONTENTS_FORM), IndexError::NONE);
+  ContentsTable table;
+  ASSERT_EQ(table.Prepare(database.db), SQLITE_OK);
+
+  int looked = 0;
+  for (sqlite3_stmt* one = nullptr; (one = sqlite3_next_stmt(database.db, one)) != nullptr;) {
+    const std::string sql = sqlite3_sql(one);
+    if (sql.find("state = 0") == std::string::npos) {
+      continue;
+    }
+    ++looked;
+    Statement plan;
+    ASSERT_EQ(plan.Prepare(database.db, ("EXPLAIN QUERY PLAN " + sql).c_str()), SQLITE_OK);
+    ASSERT_EQ(plan.ReadAll([&] {
+      EXPECT_THAT(plan.Bytes(3), testing::Not(testing::HasSubstr("SCAN"))) << sql;
+      EXPECT_THAT(plan.Bytes(3), testing::Not(testing::HasSubstr("TEMP B-TREE"))) << sql;
+    }),
+              SQLITE_OK);
+  }
+  EXPECT_EQ(looked, 2);
+}
+
+TEST_F(ContentsRenewalTest, WhatTheseReadersFailedAtAndIsTriedOnceMoreStandsAmongWhatIsNew) {
+  OldFile("failed.txt", 3000);
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({"failed.txt"}));
+  ASSERT_TRUE(contents->Fail(JobOf("failed.txt").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->RetryFailed());
+  OldFile("older.txt", 2000);
+  OldFile("newer.txt", 4000);
+  TakeIn();
+
+  EXPECT_EQ(NewJobs(), Names({"newer.txt", "failed.txt", "older.txt"}));
+}
+
 TEST_F(ContentsRenewalTest, ManyAreReadInBatchesToTheEnd) {
   constexpr int FILES = 150;
   for (int i = 0; i < FILES; ++i) {

@@ -272,11 +272,15 @@ TEST_F(ContentsUnreadTest, AnOpeningDoesNotForgetIt) {
 
 TEST_F(ContentsUnreadTest, DatabasesThatWereMadeBeforeAreCompleted) {
   contents->Close();
-  Run("sqlite3 " + ContentsPath("s") + "/contents.db 'DROP TABLE later'");
+  Run("sqlite3 " + ContentsPath("s") +
+      "/contents.db 'DROP TABLE later; DROP INDEX files_to_read;'"
+      "'CREATE INDEX files_waiting ON files(size) WHERE state = 0'");
 
   OpenContents();
 
   EXPECT_EQ(Number("SELECT count(*) FROM later"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_waiting'"), 0);
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_to_read'"), 1);
 }
 
 }  // namespace fileindexd
