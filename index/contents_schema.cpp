@@ -20,7 +20,7 @@ namespace {
   "CREATE INDEX files_to_read ON files(extractor, " WAITING_ORDER                                \
   ") WHERE state = 0;"                                                                           \
   "UPDATE files SET state = 1, tries = 0, reason = ''"                                           \
-  " WHERE state = 2 AND extractor = 0;"                                           \
+  " WHERE state >= 2 AND state = 2 AND extractor = 0;"                                           \
   "UPDATE counts SET waiting = 0, done = 0, failed = 0;"                                         \
   "INSERT OR IGNORE INTO counts VALUES(5, 0, 0, 0);"                                             \
   "INSERT INTO counts SELECT iif(state = 1 AND (extractor = 0 OR max(found_kind, kind) = 0), 5," \
