@@ -47,7 +47,7 @@
 //             were merged
 //   new_words what `words` becomes once it holds all texts: questions ask the old ones until then
 //   words_to_be  one row while that is made: the language and the version of what is made
-//   old_words what `words` was, while it is taken away
+//   old_words what `words` was, while it is taken away; with a number, what comes after it
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.

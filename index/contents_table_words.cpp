@@ -13,11 +13,14 @@ constexpr size_t REWORD_BYTES = size_t{1} << 20;
 constexpr size_t REWORD_ROW = 500;  // a text is not free, however short
 constexpr const char* NEW_WORDS = "new_words";
 constexpr const char* OLD_WORDS = "old_words";
-constexpr const char* NEW_TO_OLD = "ALTER TABLE new_words RENAME TO old_words";
 // Pages of the old table, from its end: 2 MiB. Its first rows tell what it holds, and go with it.
 constexpr const char* REMOVE_OLD_PAGES =
     "DELETE FROM old_words_data WHERE id IN "
     "(SELECT id FROM old_words_data WHERE id > 10 ORDER BY id DESC LIMIT 512)";
+// Its parts have such names, too, and are no virtual tables.
+constexpr const char* OTHER_OLD_WORDS =
+    "SELECT name FROM sqlite_master WHERE name GLOB 'old_words[0-9]*'"
+    " AND sql LIKE 'CREATE VIRTUAL%' LIMIT 1";
 
 // Pages of one step: some hundredths of a second.
 constexpr const char* MERGE_PAGES = "INSERT INTO words(words, rank) VALUES('merge', -256)";
@@ -134,12 +137,19 @@ int ContentsTable::BeginWords(const Words& to_be) {
   return code;
 }
 
-// What was made is taken away in slices (see Reword), as of many texts it would take long; but for
-// one such table, the others at once.
+// What was made is taken away in slices (see Reword), as of many texts it would take long; where
+// there is such a table, behind it.
 int ContentsTable::DropNewWords() {
   int code = Begin();
-  const char* const away = has_old_words ? "DROP TABLE new_words" : NEW_TO_OLD;
-  code = code == SQLITE_OK ? Execute(handle, std::string(away) + ";DROP TABLE words_to_be") : code;
+  std::string aside = OLD_WORDS;
+  bool taken = has_old_words;
+  for (int number = 2; code == SQLITE_OK && taken; ++number) {
+    aside = OLD_WORDS + std::to_string(number);
+    code = Exists(aside.c_str(), taken);
+  }
+  code = code == SQLITE_OK ? Execute(handle, "ALTER TABLE new_words RENAME TO " + aside +
+                                                 ";DROP TABLE words_to_be")
+                           : code;
   has_old_words = true;
   new_language.clear();
   meta.reworded = ALL_WORDS;
@@ -168,12 +178,18 @@ int ContentsTable::ReplaceWords() {
 }
 
 int ContentsTable::RemoveOldWords() {
-  int code = sqlite3_exec(handle, REMOVE_OLD_PAGES, nullptr, nullptr, nullptr);
-  if (code == SQLITE_OK && sqlite3_changes(handle) == 0) {
-    code = Execute(handle, "DROP TABLE old_words");
-    has_old_words = code != SQLITE_OK;
+  int code = Execute(handle, REMOVE_OLD_PAGES);
+  if (code != SQLITE_OK || sqlite3_changes(handle) != 0) {
+    return code;
   }
-  return code;
+  code = Execute(handle, "DROP TABLE old_words");
+  Statement others;
+  code = code == SQLITE_OK ? others.Prepare(handle, OTHER_OLD_WORDS) : code;
+  std::string next;
+  code = code == SQLITE_OK ? others.ReadOne(has_old_words, [&] { next = others.Bytes(0); }) : code;
+  return code == SQLITE_OK && has_old_words
+             ? Execute(handle, "ALTER TABLE " + next + " RENAME TO old_words")
+             : code;
 }
 
 int ContentsTable::Reword(bool& more) {
