@@ -11,13 +11,6 @@ namespace {
 
 constexpr int64_t DAY = 24 * 60 * 60;
 
-// Begins to wait, as if nothing had been tried.
-void WaitAnew(ContentFile& file) {
-  file.state = ContentState::WAITING;
-  file.tries = 0;
-  file.unended = 0;
-}
-
 }  // namespace
 
 bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {

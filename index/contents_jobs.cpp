@@ -160,9 +160,7 @@ int ContentsWriter::Impl::RenewFile(const ContentFile& file, int64_t now) {
   }
   ContentFile changed = file;
   if (reference == Reference::WANTED) {
-    changed.state = ContentState::WAITING;
-    changed.tries = 0;
-    changed.unended = 0;
+    WaitAnew(changed);
   } else {
     changed.unreferred_since = now;
   }

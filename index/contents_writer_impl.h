@@ -34,6 +34,13 @@ inline int64_t Now() {
   return static_cast<int64_t>(time(nullptr));
 }
 
+// Begins to wait, as if nothing had been tried.
+inline void WaitAnew(ContentFile& file) {
+  file.state = ContentState::WAITING;
+  file.tries = 0;
+  file.unended = 0;
+}
+
 inline Content OfKind(Kind kind) {
   Content content;
   content.kind = kind;

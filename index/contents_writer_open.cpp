@@ -123,9 +123,7 @@ int ContentsWriter::Impl::RetryAll() {
     for (size_t i = 0; i < failed.size() && code == SQLITE_OK; ++i) {
       ContentFile file = failed[i];
       after = file.id;
-      file.state = ContentState::WAITING;
-      file.tries = 0;
-      file.unended = 0;
+      WaitAnew(file);
       code = table->Update(failed[i], file);
     }
   } while (code == SQLITE_OK && !failed.empty());
