@@ -57,10 +57,6 @@ Kind KindOf(const ContentFile& file) {
   return file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
 }
 
-int Execute(sqlite3* db, const std::string& sql) {
-  return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
-}
-
 }  // namespace
 
 bool IsNotKept(const ContentFile& file) {

@@ -28,10 +28,6 @@ constexpr int MERGED = 2;  // rows that change though nothing was left to merge:
 // Below that the segments are few or small.
 constexpr int64_t LEAST_TO_MERGE = 256;
 
-int Execute(sqlite3* db, const std::string& sql) {
-  return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
-}
-
 }  // namespace
 
 int ContentsTable::Exists(const char* name, bool& has) {
@@ -119,11 +115,12 @@ int ContentsTable::BeginWords(const Words& to_be) {
     meta.reworded = ALL_WORDS;
     meta.merged = 0;
     // With texts and without words it is not whole.
-    return meta.last_text == 0 ? Execute(handle, WordsSchema("words", to_be.language))
+    return meta.last_text == 0 ? Execute(handle, WordsSchema("words", to_be.language).c_str())
                                : SQLITE_ERROR;
   }
-  code = Execute(handle, WordsSchema(NEW_WORDS, to_be.language) +
-                             ";CREATE TABLE words_to_be(language TEXT, version TEXT)");
+  const std::string make = WordsSchema(NEW_WORDS, to_be.language) +
+                           ";CREATE TABLE words_to_be(language TEXT, version TEXT)";
+  code = Execute(handle, make.c_str());
   Statement note;
   code = code == SQLITE_OK ? note.Prepare(handle, "INSERT INTO words_to_be VALUES(?1, ?2)") : code;
   if (code == SQLITE_OK) {
@@ -147,9 +144,8 @@ int ContentsTable::DropNewWords() {
     aside = OLD_WORDS + std::to_string(number);
     code = Exists(aside.c_str(), taken);
   }
-  code = code == SQLITE_OK ? Execute(handle, "ALTER TABLE new_words RENAME TO " + aside +
-                                                 ";DROP TABLE words_to_be")
-                           : code;
+  const std::string rename = "ALTER TABLE new_words RENAME TO " + aside + ";DROP TABLE words_to_be";
+  code = code == SQLITE_OK ? Execute(handle, rename.c_str()) : code;
   has_old_words = true;
   new_language.clear();
   meta.reworded = ALL_WORDS;
@@ -187,9 +183,8 @@ int ContentsTable::RemoveOldWords() {
   code = code == SQLITE_OK ? others.Prepare(handle, OTHER_OLD_WORDS) : code;
   std::string next;
   code = code == SQLITE_OK ? others.ReadOne(has_old_words, [&] { next = others.Bytes(0); }) : code;
-  return code == SQLITE_OK && has_old_words
-             ? Execute(handle, "ALTER TABLE " + next + " RENAME TO old_words")
-             : code;
+  next = "ALTER TABLE " + next + " RENAME TO old_words";
+  return code == SQLITE_OK && has_old_words ? Execute(handle, next.c_str()) : code;
 }
 
 int ContentsTable::Reword(bool& more) {
@@ -244,7 +239,7 @@ int ContentsTable::MergeWords(bool& more) {
 
   int code = Begin();
   const int before = sqlite3_total_changes(handle);
-  code = code == SQLITE_OK ? sqlite3_exec(handle, MERGE_PAGES, nullptr, nullptr, nullptr) : code;
+  code = code == SQLITE_OK ? Execute(handle, MERGE_PAGES) : code;
   if (code == SQLITE_OK && sqlite3_total_changes(handle) - before < MERGED) {
     meta.merged = meta.last_text;
     merging = false;

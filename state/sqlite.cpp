@@ -12,6 +12,10 @@ const char* BytesOf(std::string_view bytes) {
 
 }  // namespace
 
+int Execute(sqlite3* db, const char* sql) {
+  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
+}
+
 int Statement::Prepare(sqlite3* db, const char* sql) {
   sqlite3_finalize(handle);
   handle = nullptr;

@@ -16,6 +16,9 @@ inline int StepError(int code) {
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
+// Statements separated by ';', whose rows nobody wants.
+int Execute(sqlite3* db, const char* sql);
+
 // A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
 class Statement {
  public:
