@@ -181,10 +181,9 @@ int ContentsTable::WriteCounts(int64_t now) {
   int code = SQLITE_OK;
   for (size_t kind = 0; kind < counted.size() && code == SQLITE_OK; ++kind) {
     if (!counted[kind].IsZero()) {
-      write_counts.BindInt(1, static_cast<int64_t>(kind));
-      write_counts.BindInt(2, counted[kind].waiting);
-      write_counts.BindInt(3, counted[kind].done);
-      write_counts.BindInt(4, counted[kind].failed);
+      const CountOfKind& count = counted[kind];
+      write_counts.BindInts(
+          {static_cast<int64_t>(kind), count.waiting, count.done, count.failed});
       code = write_counts.Run();
     }
   }
@@ -193,8 +192,7 @@ int ContentsTable::WriteCounts(int64_t now) {
   }
 
   cut_rate.BindInt(1, now);
-  write_rate.BindInt(1, now);
-  write_rate.BindInt(2, done_now);
+  write_rate.BindInts({now, done_now});
   code = cut_rate.Run();
   return code == SQLITE_OK ? write_rate.Run() : code;
 }
@@ -240,8 +238,7 @@ void ContentsTable::Rollback() {
 }
 
 int ContentsTable::Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found) {
-  find.BindInt(1, static_cast<int64_t>(inode));
-  find.BindInt(2, birth_time);
+  find.BindInts({static_cast<int64_t>(inode), birth_time});
   return find.ReadOne(found, [&] { ReadFile(find, file); });
 }
 
@@ -250,50 +247,39 @@ int ContentsTable::FindById(int64_t id, ContentFile& file, bool& found) {
   return find_by_id.ReadOne(found, [&] { ReadFile(find_by_id, file); });
 }
 
-int ContentsTable::ReadFiles(Statement& statement, std::vector<ContentFile>& files) {
+int ContentsTable::ReadFiles(Statement& statement, std::initializer_list<int64_t> bound,
+                             std::vector<ContentFile>& files) {
   files.clear();
+  statement.BindInts(bound);
   return statement.ReadAll([&] { ReadFile(statement, files.emplace_back()); });
 }
 
 int ContentsTable::WaitingNew(int64_t limit, int64_t extractor, std::vector<ContentFile>& files) {
-  waiting_new.BindInt(1, limit);
-  waiting_new.BindInt(2, extractor);
-  return ReadFiles(waiting_new, files);
+  return ReadFiles(waiting_new, {limit, extractor}, files);
 }
 
 int ContentsTable::WaitingAgain(int64_t limit, int64_t extractor, std::vector<ContentFile>& files) {
-  waiting_again.BindInt(1, limit);
-  waiting_again.BindInt(2, extractor);
-  return ReadFiles(waiting_again, files);
+  return ReadFiles(waiting_again, {limit, extractor}, files);
 }
 
 int ContentsTable::UnreadDue(int64_t now, int64_t limit, std::vector<ContentFile>& files) {
-  unread_due.BindInt(1, limit);
-  unread_due.BindInt(2, now);
-  return ReadFiles(unread_due, files);
+  return ReadFiles(unread_due, {limit, now}, files);
 }
 
 int ContentsTable::Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
-  failed.BindInt(1, after);
-  failed.BindInt(2, limit);
-  return ReadFiles(failed, files);
+  return ReadFiles(failed, {after, limit}, files);
 }
 
 int ContentsTable::LeftBegun(int64_t limit, std::vector<ContentFile>& files) {
-  left_begun.BindInt(1, limit);
-  return ReadFiles(left_begun, files);
+  return ReadFiles(left_begun, {limit}, files);
 }
 
 int ContentsTable::Unreferred(int64_t until, int64_t limit, std::vector<ContentFile>& files) {
-  unreferred.BindInt(1, until);
-  unreferred.BindInt(2, limit);
-  return ReadFiles(unreferred, files);
+  return ReadFiles(unreferred, {until, limit}, files);
 }
 
 int ContentsTable::Slice(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
-  slice.BindInt(1, after);
-  slice.BindInt(2, limit);
-  return ReadFiles(slice, files);
+  return ReadFiles(slice, {after, limit}, files);
 }
 
 void ContentsTable::Count(const ContentFile& file, int64_t number) {
@@ -351,8 +337,7 @@ int ContentsTable::DropDue(int64_t id) {
 
 int ContentsTable::SetDue(int64_t id, int64_t due) {
   const int code = Begin();
-  set_due.BindInt(1, id);
-  set_due.BindInt(2, due);
+  set_due.BindInts({id, due});
   return code == SQLITE_OK ? set_due.Run() : code;
 }
 

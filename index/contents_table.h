@@ -10,6 +10,7 @@
 #include <array>
 #include <cstdint>
 #include <functional>
+#include <initializer_list>
 #include <string>
 #include <vector>
 
@@ -146,7 +147,8 @@ class ContentsTable {
   int WriteMeta();
   int WriteCounts(int64_t now);
   void Count(const ContentFile& file, int64_t number);
-  int ReadFiles(Statement& statement, std::vector<ContentFile>& files);
+  int ReadFiles(Statement& statement, std::initializer_list<int64_t> bound,
+                std::vector<ContentFile>& files);
   static int RunWords(Statement& statement, int64_t text, const ContentWords& words);
   int AddWords(int64_t text, ContentWords& words, const PreparedContent& prepared);
   int RemoveWords();

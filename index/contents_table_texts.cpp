@@ -54,10 +54,8 @@ int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& 
   }
 
   file.found_kind = content.kind;
-  set_content.BindInt(1, before.id);
-  set_content.BindInt(2, content.is_cut ? 1 : 0);
-  set_content.BindInt(3, static_cast<int64_t>(content.sample));
-  set_content.BindInt(4, FieldBits(content));
+  set_content.BindInts({before.id, content.is_cut ? 1 : 0, static_cast<int64_t>(content.sample),
+                        FieldBits(content)});
   for (size_t i = 0; i < NUMBER_FIELD_COUNT; ++i) {
     sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 5);
   }

@@ -201,8 +201,7 @@ int ContentsTable::Reword(bool& more) {
 }
 
 int ContentsTable::MakeNewWords(bool& more) {
-  next_texts.BindInt(1, meta.reworded);
-  next_texts.BindInt(2, meta.reword_end);
+  next_texts.BindInts({meta.reworded, meta.reword_end});
   int code = next_texts.Step();
   more = code == SQLITE_ROW;
   for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {

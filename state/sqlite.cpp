@@ -22,6 +22,13 @@ int Statement::Prepare(sqlite3* db, const char* sql) {
   return sqlite3_prepare_v3(db, sql, -1, SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
 }
 
+void Statement::BindInts(std::initializer_list<int64_t> values) {
+  int column = 1;
+  for (const int64_t value : values) {
+    BindInt(column++, value);
+  }
+}
+
 void Statement::BindText(int column, std::string_view text) {
   sqlite3_bind_text64(handle, column, BytesOf(text), text.size(), SQLITE_STATIC, SQLITE_UTF8);
 }
