@@ -79,8 +79,8 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
   ContentFile now = file;
   bool again = entry.reread > file.reread;
   if (again) {
-    now.extractor =
-        0;  // its bytes may be others: what was read of them goes if they cannot be read
+    // Its bytes may be others: what was read of them goes if they cannot be read.
+    now.extractor = KEPT_OUT;
   }
   now.reread = std::max(file.reread, entry.reread);
   now.ctime = std::max(now.ctime, entry.ctime);

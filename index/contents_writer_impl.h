@@ -103,11 +103,11 @@ struct ContentsWriter::Impl {
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
   // contents_writer.cpp
-  using Ending = std::function<int(const ContentFile& file, ContentFile& now)>;
+  using Ending = std::function<int(const ContentFile& file, ContentFile& ended)>;
   bool End(int64_t file, const Ending& put_down);
   bool Finish(int64_t file, const PreparedContent& content);
-  int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
-  int KeepOfFailure(const ContentFile& file, const Content& content, ContentFile& now);
+  int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& ended);
+  int KeepOfFailure(const ContentFile& file, const Content& content, ContentFile& ended);
   static void SettleKeptOut(ContentFile& file);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Unread(int64_t file, const std::string& reason, int64_t now);

@@ -78,9 +78,6 @@ int ContentsWriter::Impl::Own() {
   }
   code = code == SQLITE_OK ? table->UseWords(language, version) : code;
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
-  if (code == SQLITE_OK && table->meta.extractor != extractor) {
-    renewed = 0;  // see Renew, which also ends it
-  }
   code = code == SQLITE_OK ? table->LimitDue(Now() + LONGEST_PAUSE) : code;
   code = code == SQLITE_OK ? FollowUnread() : code;
   return code == SQLITE_OK ? table->Commit(Now()) : code;
