@@ -5,7 +5,6 @@
 
 #include <ctime>
 
-#include "index/contents_reader.h"
 #include "state/layout.h"
 #include "tests/unit/index/contents_fixture.h"
 
@@ -27,16 +26,6 @@ class ContentsUnreadTest : public ContentsTest {
     const int64_t pause = contents->UnreadDue() - clock;
     clock += pause;
     return pause;
-  }
-  static std::vector<FailedContent> Listed() {
-    std::vector<FailedContent> listed;
-    ContentsReader reader;
-    EXPECT_EQ(reader.Open("s"), IndexError::NONE);
-    EXPECT_TRUE(reader.ForEachFailed([&](const FailedContent& failed) {
-      listed.push_back(failed);
-      return true;
-    }));
-    return listed;
   }
 };
 
