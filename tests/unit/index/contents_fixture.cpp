@@ -125,6 +125,13 @@ void ContentsTest::Finish(const std::string& name, const std::string& text) {
   EXPECT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
 }
 
+void ContentsTest::ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes) {
+  OldFile(name, mtime, bytes);
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({name}));
+  Finish(name, "old" + name);
+}
+
 Names ContentsTest::Read() {
   const Names names = Jobs();
   for (const std::string& name : names) {

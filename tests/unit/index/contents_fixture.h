@@ -32,6 +32,8 @@ class ContentsTest : public IndexTest {
   void File(const std::string& name, const std::string& bytes = "bytes");
   // The same but for taking it in, old enough that nothing else has that time.
   void OldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes");
+  // The same, taken in and read, with "old" and its name as its text.
+  void ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes");
   static void SetTime(const std::string& path, time_t mtime);
   void Finish(const std::string& name, const std::string& text);
   // Hands out all that waits, and finishes each with its own name as its text.

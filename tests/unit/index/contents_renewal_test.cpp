@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What older readers read well is read anew by newer ones, behind all else.
 #include <gmock/gmock.h>
-#include <unistd.h>
 
 #include "index/contents_schema.h"
 #include "index/contents_table.h"
@@ -15,40 +14,9 @@ namespace {
 
 class ContentsRenewalTest : public ContentsTest {
  protected:
-  void ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes") {
-    OldFile(name, mtime, bytes);
-    TakeIn();
-    ASSERT_EQ(Jobs(), Names({name}));
-    Finish(name, "old" + name);
-  }
   void BeginAndDie(const std::string& name, int64_t extractor) {
     ASSERT_TRUE(contents->BeginTries({JobOf(name).file}));
     OpenContents(extractor);
-  }
-  // While another one, and all that there is, is read anew.
-  void BeAwayMeanwhile(const std::string& name) {
-    ReadOldFile(name, 3000);
-    ReadOldFile("other.txt", 2000);
-    TakeAway(name);
-    contents->LookAtAll();
-    TakeIn();
-    Sweep(clock);
-    OpenContents(2);
-    ASSERT_EQ(Read(), Names({"other.txt"}));
-    ASSERT_EQ(Jobs(), Names());
-    ASSERT_TRUE(contents->Commit());
-    ASSERT_EQ(Number("SELECT extractor FROM meta"), 2);
-  }
-  // Out of the share, and into it.
-  void TakeAway(const std::string& name) {
-    ASSERT_EQ(rename(At(name).c_str(), (root + "/../" + name).c_str()), 0);
-    Delete(name);
-    Commit();
-  }
-  void BringBack(const std::string& name) {
-    ASSERT_EQ(rename((root + "/../" + name).c_str(), At(name).c_str()), 0);
-    Add(name);
-    Commit();
   }
 };
 
@@ -213,86 +181,6 @@ TEST_F(ContentsRenewalTest, WhatWasUndoneIsRenewedAllTheSame) {
   ASSERT_EQ(contents->Open(TheShare(), 2), IndexError::NONE);
 
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
-}
-
-// Entries may be made anew just now: what was read stays until they are there again.
-TEST_F(ContentsRenewalTest, WithoutAnEntryItIsKeptAndWaitsForOne) {
-  ReadOldFile("a.txt", 3000);
-  ReadOldFile("b.txt", 2000);
-  OpenContents(2);
-  TakeAway("a.txt");
-
-  EXPECT_EQ(Read(), Names({"b.txt"}));
-  EXPECT_EQ(Jobs(), Names());
-  ASSERT_TRUE(contents->Commit());
-  EXPECT_EQ(Holding("olda"), 1);
-  EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 0);
-
-  BringBack("a.txt");
-  TakeIn();
-  EXPECT_EQ(Jobs(), Names({"a.txt"}));
-}
-
-TEST_F(ContentsRenewalTest, WhatLosesItsEntryWhileItWaitsIsKeptAndWaitsForAnother) {
-  ReadOldFile("a.txt", 3000);
-  ReadOldFile("b.txt", 2000);
-  OpenContents(2);
-  ASSERT_EQ(Jobs(1), Names({"a.txt"}));
-  ASSERT_TRUE(contents->Commit());
-  ASSERT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 2);
-  TakeAway("b.txt");
-
-  EXPECT_EQ(Jobs(), Names());
-  ASSERT_TRUE(contents->Commit());
-  EXPECT_EQ(Holding("oldb"), 1);
-  EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 1);
-
-  BringBack("b.txt");
-  TakeIn();
-  EXPECT_EQ(Jobs(), Names({"b.txt"}));
-  Finish("b.txt", "anew");
-  EXPECT_EQ(Number("SELECT count(*) FROM files"), 2);
-}
-
-TEST_F(ContentsRenewalTest, WhatTheDiskDoesNotGiveIsKeptWithoutAnEntryToo) {
-  ReadOldFile("a.txt", 3000);
-  OpenContents(2);
-  ASSERT_EQ(Jobs(), Names({"a.txt"}));
-  ASSERT_TRUE(contents->Unread(JobOf("a.txt").file, "cannot be read", clock));
-  ASSERT_TRUE(contents->Commit());
-  TakeAway("a.txt");
-  clock = contents->UnreadDue();
-
-  EXPECT_EQ(Jobs(), Names());
-  ASSERT_TRUE(contents->Commit());
-  EXPECT_EQ(Holding("olda"), 1);
-  EXPECT_EQ(contents->UnreadDue(), INT64_MAX);
-
-  BringBack("a.txt");
-  TakeIn();
-  EXPECT_EQ(Jobs(), Names({"a.txt"}));
-}
-
-TEST_F(ContentsRenewalTest, WhatWasAwayWhileAllElseWasReadAnewIsReadWhenItIsBack) {
-  BeAwayMeanwhile("a.txt");
-  BringBack("a.txt");
-
-  TakeIn();
-
-  EXPECT_EQ(Holding("olda"), 1);
-  EXPECT_EQ(Read(), Names({"a.txt"}));
-  EXPECT_EQ(Jobs(), Names());
-}
-
-TEST_F(ContentsRenewalTest, SoItIsWhoeverSeesFirstThatItIsBack) {
-  BeAwayMeanwhile("a.txt");
-  BringBack("a.txt");
-  contents->LookAtAll();
-
-  Sweep(clock);
-  TakeIn();
-
-  EXPECT_EQ(Read(), Names({"a.txt"}));
 }
 
 TEST_F(ContentsRenewalTest, AFailureTakesNoNumbersAway) {
