@@ -182,8 +182,7 @@ int ContentsTable::WriteCounts(int64_t now) {
   for (size_t kind = 0; kind < counted.size() && code == SQLITE_OK; ++kind) {
     if (!counted[kind].IsZero()) {
       const CountOfKind& count = counted[kind];
-      write_counts.BindInts(
-          {static_cast<int64_t>(kind), count.waiting, count.done, count.failed});
+      write_counts.BindInts({static_cast<int64_t>(kind), count.waiting, count.done, count.failed});
       code = write_counts.Run();
     }
   }

@@ -67,8 +67,8 @@ void ReadEntry(const Statement& statement, Entry& entry) {
 }
 
 void BindIdentity(Statement& statement, const FileIdentity& identity) {
-  statement.BindInts({static_cast<int64_t>(identity.inode), identity.birth_time, identity.size,
-                      identity.mtime});
+  statement.BindInts(
+      {static_cast<int64_t>(identity.inode), identity.birth_time, identity.size, identity.mtime});
 }
 
 int EntryTable::Prepare(sqlite3* db) {

@@ -102,8 +102,8 @@ class ContentLoop {
   bool pool_told = false;               // that it rests
   std::optional<std::string> left_out;  // as it was told
   uint64_t last_job = 0;                // id
-  std::map<uint64_t, Owner> owner;  // by job
-  std::string last_share;           // that was given a turn
+  std::map<uint64_t, Owner> owner;      // by job
+  std::string last_share;               // that was given a turn
   Time next_listen;
   Time next_reload = Time::max();
   Time next_look;  // where something could not be watched
