@@ -260,16 +260,22 @@ TEST_F(ContentsUnreadTest, AnOpeningDoesNotForgetIt) {
 }
 
 TEST_F(ContentsUnreadTest, DatabasesThatWereMadeBeforeAreCompleted) {
-  contents->Close();
-  Run("sqlite3 " + ContentsPath("s") +
-      "/contents.db 'DROP TABLE later; DROP INDEX files_to_read;'"
-      "'CREATE INDEX files_waiting ON files(size) WHERE state = 0'");
+  File("a.txt");
+  for (const char* lacking : {"DROP INDEX files_to_read",
+                              "DROP INDEX files_to_read; "
+                              "DROP TABLE later"}) {
+    contents->Close();
+    Run("sqlite3 " + ContentsPath("s") + "/contents.db '" + lacking +
+        "; CREATE INDEX files_waiting ON files(size) WHERE state = 0'");
 
-  OpenContents();
+    OpenContents();
 
-  EXPECT_EQ(Number("SELECT count(*) FROM later"), 0);
-  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_waiting'"), 0);
-  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_to_read'"), 1);
+    EXPECT_EQ(Number("SELECT count(*) FROM later"), 0) << lacking;
+    EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_waiting'"), 0);
+    EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_to_read'"), 1);
+    EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 1);
+    EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  }
 }
 
 }  // namespace fileindexd
