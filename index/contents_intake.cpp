@@ -11,13 +11,6 @@ namespace {
 
 constexpr int64_t DAY = 24 * 60 * 60;
 
-// Begins to wait, as if nothing had been tried.
-void WaitAnew(ContentFile& file) {
-  file.state = ContentState::WAITING;
-  file.tries = 0;
-  file.unended = 0;
-}
-
 }  // namespace
 
 bool ContentsWriter::Impl::TakeIn(size_t limit, bool& more) {
@@ -86,12 +79,12 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
   ContentFile now = file;
   bool again = entry.reread > file.reread;
   if (again) {
-    now.extractor =
-        0;  // its bytes may be others: what was read of them goes if they cannot be read
+    // Its bytes may be others: what was read of them goes if they cannot be read.
+    now.extractor = KEPT_OUT;
   }
   now.reread = std::max(file.reread, entry.reread);
   now.ctime = std::max(now.ctime, entry.ctime);
-  now.unreferred_since = 0;
+  RegainEntry(file, now);
   if (file.kind == Kind::OTHER && entry.kind != Kind::OTHER) {
     now.kind = entry.kind;
     again = again || (file.state == ContentState::DONE && file.found_kind == Kind::OTHER);
@@ -114,10 +107,20 @@ int ContentsWriter::Impl::TakeInKnown(const FollowedEntry& entry, const ContentF
   return same ? SQLITE_OK : table->Update(file, now);
 }
 
+// An entry refers to it. What older readers read while none did was passed over when all else was
+// read anew.
+void ContentsWriter::Impl::RegainEntry(const ContentFile& file, ContentFile& now) {
+  if (file.unreferred_since != 0 && IsAged(file)) {
+    table->meta.extractor = file.extractor;
+    renewed = std::min(renewed, file.id - 1);
+  }
+  now.unreferred_since = 0;
+}
+
 // Of a file whose name tells no kind, settings may want what was found by now, or not any more.
 int ContentsWriter::Impl::JudgeFound(const ContentFile& file, ContentFile& now, bool& again) {
-  const bool waits = file.state == ContentState::WAITING;
-  if (waits && file.text == 0) {
+  const bool waits = file.state == ContentState::WAITING || file.state == ContentState::UNREAD;
+  if (waits && file.text == 0 && file.extractor == KEPT_OUT) {
     return SQLITE_OK;
   }
   bool is_kept = true;
@@ -224,7 +227,7 @@ int ContentsWriter::Impl::SweepFile(const ContentFile& file, int64_t now) {
 
   ContentFile changed = file;
   if (reference == Reference::WANTED) {
-    changed.unreferred_since = 0;
+    RegainEntry(file, changed);
   } else if (file.unreferred_since == 0 || file.unreferred_since > now) {
     changed.unreferred_since = now;
   } else if (now - file.unreferred_since >= DAY) {

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What waits is handed out, and taken back when it ended.
 #include <algorithm>
+#include <utility>
 
 #include "index/contents_writer_impl.h"
 
@@ -15,7 +16,7 @@ constexpr int64_t SLACK = 64;  // rows that wait and turn out to be of no file a
 constexpr int ROUNDS = 8;
 constexpr int64_t MOST_LOOKED = 1000;  // rows in one go
 constexpr size_t MOST_RENEWED = 64;    // at once
-constexpr int64_t MOST_UNREAD = 4;     // at once
+constexpr size_t MOST_UNREAD = 4;      // at once
 
 }  // namespace
 
@@ -67,7 +68,7 @@ bool ContentsWriter::Impl::NextAgain(int64_t now, size_t limit, std::vector<Cont
     code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
     has_more = round.dropped;
     if (code == SQLITE_OK && !round.dropped && !round.held && jobs.size() < limit) {
-      code = Renew(has_more);
+      code = Renew(now, has_more);
     }
     if (code != SQLITE_OK) {
       return Done(code);
@@ -86,16 +87,21 @@ ContentsWriter::Impl::Round ContentsWriter::Impl::BeginRound(size_t limit) const
   return round;
 }
 
-// A few of those that are due: each may hold its reader up for long. Until it is known what became
-// of one, it is not due again.
+// A few of those that are due: each may hold its reader up for long. What is handed out stays due
+// on disk: a kill must not put it off.
 int ContentsWriter::Impl::OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs) {
   std::vector<ContentFile> rows;
-  int code = unread_due <= now ? table->UnreadDue(now, MOST_UNREAD, rows) : SQLITE_OK;
+  const auto most = static_cast<int64_t>(MOST_UNREAD + out.size());
+  int code = unread_due <= now ? table->UnreadDue(now, most, rows) : SQLITE_OK;
+  const size_t limit = std::exchange(round.limit, std::min(round.limit, MOST_UNREAD));
   code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
-  for (size_t i = 0; i < jobs.size() && code == SQLITE_OK; ++i) {
-    code = table->SetDue(jobs[i].file, now + LONGEST_PAUSE);
-  }
-  return code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  round.limit = limit;
+  return code == SQLITE_OK ? FollowUnread() : code;
+}
+
+// Until it is known what became of one that is handed out, it is not due again.
+int ContentsWriter::Impl::FollowUnread() {
+  return table->NextDue([this](int64_t file) { return out.contains(file); }, unread_due);
 }
 
 int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round,
@@ -122,8 +128,8 @@ int ContentsWriter::Impl::OfferSome(std::vector<ContentFile>& rows, Round& round
 }
 
 // Makes a few of what older readers read, or failed at, wait: no other ones do. What was read
-// stays, and is found, until it is read anew.
-int ContentsWriter::Impl::Renew(bool& more) {
+// stays, and is found, until it is read anew. What has no entry may be about to get one back.
+int ContentsWriter::Impl::Renew(int64_t now, bool& more) {
   more = false;
   if (table->meta.extractor == extractor) {
     return SQLITE_OK;
@@ -134,11 +140,7 @@ int ContentsWriter::Impl::Renew(bool& more) {
   for (size_t i = 0; i < files.size() && code == SQLITE_OK && begun < MOST_RENEWED; ++i) {
     renewed = files[i].id;
     if (IsAged(files[i]) && files[i].unreferred_since == 0) {
-      ContentFile now = files[i];
-      now.state = ContentState::WAITING;
-      now.tries = 0;
-      now.unended = 0;
-      code = table->Update(files[i], now);
+      code = RenewFile(files[i], now);
       ++begun;
     }
   }
@@ -148,6 +150,21 @@ int ContentsWriter::Impl::Renew(bool& more) {
   }
   more = !files.empty();
   return code;
+}
+
+int ContentsWriter::Impl::RenewFile(const ContentFile& file, int64_t now) {
+  Reference reference = Reference::NONE;
+  const int code = entries.Refer(file.identity, reference);
+  if (code != SQLITE_OK) {
+    return code;
+  }
+  ContentFile changed = file;
+  if (reference == Reference::WANTED) {
+    WaitAnew(changed);
+  } else {
+    changed.unreferred_since = now;
+  }
+  return table->Update(file, changed);
 }
 
 ContentsWriter::Impl::Company ContentsWriter::Impl::Begun() const {
@@ -182,8 +199,22 @@ int ContentsWriter::Impl::Offer(const ContentFile& file, std::vector<ContentJob>
   FollowedEntry latest;
   bool found = false;
   code = entries.Latest(file.identity.inode, file.identity.birth_time, latest, found);
+  if (code == SQLITE_OK && !found && WasReadByOlder(file)) {
+    return PutAside(file);
+  }
   code = code == SQLITE_OK ? Remove(file) : code;
   return code == SQLITE_OK && found ? TakeInEntry(latest) : code;
+}
+
+// Its entry may be about to come back, and then what was read stands for it until it is read anew.
+int ContentsWriter::Impl::PutAside(const ContentFile& file) {
+  released.erase(file.id);
+  ContentFile aside = file;
+  aside.state = ContentState::DONE;
+  aside.tries = 0;
+  aside.unended = 0;
+  aside.unreferred_since = Now();
+  return table->Update(file, aside);
 }
 
 int ContentsWriter::Impl::Remove(const ContentFile& file) {

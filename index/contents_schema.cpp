@@ -14,9 +14,13 @@ static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
 namespace {
 
 #define ADDITIONS                                                                                \
-  "CREATE TABLE later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);"                          \
-  "CREATE INDEX later_by_due ON later(due);"                                                     \
-  "UPDATE files SET state = 1, tries = 0, reason = '' WHERE state = 2 AND extractor = 0;"        \
+  "CREATE TABLE IF NOT EXISTS later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);"            \
+  "CREATE INDEX IF NOT EXISTS later_by_due ON later(due);"                                       \
+  "DROP INDEX IF EXISTS files_waiting;"                                                          \
+  "CREATE INDEX files_to_read ON files(extractor, " WAITING_ORDER                                \
+  ") WHERE state = 0;"                                                                           \
+  "UPDATE files SET state = 1, tries = 0, reason = ''"                                           \
+  " WHERE state >= 2 AND state = 2 AND extractor = 0;"                                           \
   "UPDATE counts SET waiting = 0, done = 0, failed = 0;"                                         \
   "INSERT OR IGNORE INTO counts VALUES(5, 0, 0, 0);"                                             \
   "INSERT INTO counts SELECT iif(state = 1 AND (extractor = 0 OR max(found_kind, kind) = 0), 5," \
@@ -53,7 +57,6 @@ CREATE TABLE files(
   track INTEGER, duration INTEGER, bit_rate INTEGER, width INTEGER, height INTEGER,
   latitude INTEGER, longitude INTEGER, rating INTEGER,
   UNIQUE(inode, birth_time));
-CREATE INDEX files_waiting ON files()sql" WAITING_ORDER R"sql() WHERE state = 0;
 CREATE INDEX files_failed ON files(id) WHERE state >= 2;
 CREATE INDEX files_begun ON files(id) WHERE begun <> 0;
 CREATE INDEX files_unreferred ON files(unreferred_since) WHERE unreferred_since <> 0;

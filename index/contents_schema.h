@@ -33,8 +33,7 @@
 //             copy, so deleting needs what was inserted. Made by the writer, as the share's
 //             language is among its arguments
 //   later     files whose bytes the disk did not give, and when the next try is due, in seconds
-//   since
-//             the epoch. While one is with a helper that is far away
+//             since the epoch
 //   counts    for each kind (the found one, where it is known) how many files wait, are done and
 //             failed; and under NOT_KEPT, as done, those that were looked into and left: of no kind
 //             that is read, or of one that is not wanted
@@ -48,7 +47,7 @@
 //             were merged
 //   new_words what `words` becomes once it holds all texts: questions ask the old ones until then
 //   words_to_be  one row while that is made: the language and the version of what is made
-//   old_words what `words` was, while it is taken away
+//   old_words what `words` was, while it is taken away; with a number, what comes after it
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.
@@ -83,8 +82,7 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 // smallest. An index has these expressions.
 #define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
 
-// What databases of this version lack that were made before it was thought of. Whoever only reads
-// needs none of it.
+// What databases made by earlier builds of this version lack. Whoever only reads needs none of it.
 extern const char* const CONTENTS_ADDITIONS;
 
 // The columns of the number fields, in their order, separated by ", ".

@@ -14,6 +14,12 @@ constexpr int64_t FREE_PAGES_KEPT = 256;
   "id, inode, birth_time, size, mtime, ctime, kind, found_kind, state, extractor, " \
   "tries, unended, begun, unreferred_since, reread, text, length"
 
+// Of those readers. Two of these are merged by the expressions that they end with.
+#define WAITING_FILES                      \
+  "SELECT " FILE_COLUMNS                   \
+  ", tries + unended, mtime / 60000000000" \
+  " FROM files WHERE state = 0 AND extractor = "
+
 void ReadFile(const Statement& row, ContentFile& file) {
   file.id = row.Int(0);
   file.identity.inode = static_cast<uint64_t>(row.Int(1));
@@ -51,10 +57,6 @@ Kind KindOf(const ContentFile& file) {
   return file.found_kind != Kind::OTHER ? file.found_kind : file.kind;
 }
 
-int Execute(sqlite3* db, const std::string& sql) {
-  return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
-}
-
 }  // namespace
 
 bool IsNotKept(const ContentFile& file) {
@@ -64,7 +66,7 @@ bool IsNotKept(const ContentFile& file) {
 
 int ContentsTable::Complete() {
   bool is_complete = false;
-  const int code = HasTable("later", is_complete);
+  const int code = Exists("files_to_read", is_complete);
   return code != SQLITE_OK || is_complete ? code : Execute(handle, CONTENTS_ADDITIONS);
 }
 
@@ -77,12 +79,11 @@ int ContentsTable::Prepare(sqlite3* db) {
   const std::pair<Statement*, const char*> statements[] = {
       {&find, "SELECT " FILE_COLUMNS " FROM files WHERE inode = ?1 AND birth_time = ?2"},
       {&find_by_id, "SELECT " FILE_COLUMNS " FROM files WHERE id = ?1"},
-      {&waiting_new,
-       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND (extractor = 0 OR extractor >= ?2)"
-       " ORDER BY " WAITING_ORDER " LIMIT ?1"},
+      {&waiting_new, WAITING_FILES "0 UNION ALL " WAITING_FILES "?2"
+                                   " ORDER BY " WAITING_ORDER " LIMIT ?1"},
       {&waiting_again,
-       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND extractor <> 0 AND extractor < ?2"
-       " ORDER BY " WAITING_ORDER " LIMIT ?1"},
+       "SELECT " FILE_COLUMNS " FROM files WHERE state = 0 AND extractor > 0 AND extractor <> ?2"
+       " ORDER BY extractor, " WAITING_ORDER " LIMIT ?1"},
       {&unread_due, "SELECT " FILE_COLUMNS " FROM later CROSS JOIN files ON files.id = later.file"
                     " WHERE later.due <= ?2 ORDER BY later.due LIMIT ?1"},
       {&failed,
@@ -105,7 +106,7 @@ int ContentsTable::Prepare(sqlite3* db) {
        "INSERT INTO later VALUES(?1, ?2) ON CONFLICT(file) DO UPDATE SET due = excluded.due"},
       {&drop_due, "DELETE FROM later WHERE file = ?1"},
       {&limit_due, "UPDATE later SET due = ?1 WHERE due > ?1"},
-      {&next_due, "SELECT min(due) FROM later"},
+      {&next_due, "SELECT due, file FROM later ORDER BY due"},
       {&write_meta,
        "UPDATE meta SET filesystem = ?1, language = ?2, extractor = ?3, "
        "entries_made = ?4, seen = ?5, last_text = ?6, reworded = ?7, reword_end = ?8, "
@@ -180,10 +181,8 @@ int ContentsTable::WriteCounts(int64_t now) {
   int code = SQLITE_OK;
   for (size_t kind = 0; kind < counted.size() && code == SQLITE_OK; ++kind) {
     if (!counted[kind].IsZero()) {
-      write_counts.BindInt(1, static_cast<int64_t>(kind));
-      write_counts.BindInt(2, counted[kind].waiting);
-      write_counts.BindInt(3, counted[kind].done);
-      write_counts.BindInt(4, counted[kind].failed);
+      const CountOfKind& count = counted[kind];
+      write_counts.BindInts({static_cast<int64_t>(kind), count.waiting, count.done, count.failed});
       code = write_counts.Run();
     }
   }
@@ -192,8 +191,7 @@ int ContentsTable::WriteCounts(int64_t now) {
   }
 
   cut_rate.BindInt(1, now);
-  write_rate.BindInt(1, now);
-  write_rate.BindInt(2, done_now);
+  write_rate.BindInts({now, done_now});
   code = cut_rate.Run();
   return code == SQLITE_OK ? write_rate.Run() : code;
 }
@@ -239,8 +237,7 @@ void ContentsTable::Rollback() {
 }
 
 int ContentsTable::Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found) {
-  find.BindInt(1, static_cast<int64_t>(inode));
-  find.BindInt(2, birth_time);
+  find.BindInts({static_cast<int64_t>(inode), birth_time});
   return find.ReadOne(found, [&] { ReadFile(find, file); });
 }
 
@@ -249,50 +246,39 @@ int ContentsTable::FindById(int64_t id, ContentFile& file, bool& found) {
   return find_by_id.ReadOne(found, [&] { ReadFile(find_by_id, file); });
 }
 
-int ContentsTable::ReadFiles(Statement& statement, std::vector<ContentFile>& files) {
+int ContentsTable::ReadFiles(Statement& statement, std::initializer_list<int64_t> bound,
+                             std::vector<ContentFile>& files) {
   files.clear();
+  statement.BindInts(bound);
   return statement.ReadAll([&] { ReadFile(statement, files.emplace_back()); });
 }
 
 int ContentsTable::WaitingNew(int64_t limit, int64_t extractor, std::vector<ContentFile>& files) {
-  waiting_new.BindInt(1, limit);
-  waiting_new.BindInt(2, extractor);
-  return ReadFiles(waiting_new, files);
+  return ReadFiles(waiting_new, {limit, extractor}, files);
 }
 
 int ContentsTable::WaitingAgain(int64_t limit, int64_t extractor, std::vector<ContentFile>& files) {
-  waiting_again.BindInt(1, limit);
-  waiting_again.BindInt(2, extractor);
-  return ReadFiles(waiting_again, files);
+  return ReadFiles(waiting_again, {limit, extractor}, files);
 }
 
 int ContentsTable::UnreadDue(int64_t now, int64_t limit, std::vector<ContentFile>& files) {
-  unread_due.BindInt(1, limit);
-  unread_due.BindInt(2, now);
-  return ReadFiles(unread_due, files);
+  return ReadFiles(unread_due, {limit, now}, files);
 }
 
 int ContentsTable::Failed(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
-  failed.BindInt(1, after);
-  failed.BindInt(2, limit);
-  return ReadFiles(failed, files);
+  return ReadFiles(failed, {after, limit}, files);
 }
 
 int ContentsTable::LeftBegun(int64_t limit, std::vector<ContentFile>& files) {
-  left_begun.BindInt(1, limit);
-  return ReadFiles(left_begun, files);
+  return ReadFiles(left_begun, {limit}, files);
 }
 
 int ContentsTable::Unreferred(int64_t until, int64_t limit, std::vector<ContentFile>& files) {
-  unreferred.BindInt(1, until);
-  unreferred.BindInt(2, limit);
-  return ReadFiles(unreferred, files);
+  return ReadFiles(unreferred, {until, limit}, files);
 }
 
 int ContentsTable::Slice(int64_t after, int64_t limit, std::vector<ContentFile>& files) {
-  slice.BindInt(1, after);
-  slice.BindInt(2, limit);
-  return ReadFiles(slice, files);
+  return ReadFiles(slice, {after, limit}, files);
 }
 
 void ContentsTable::Count(const ContentFile& file, int64_t number) {
@@ -350,26 +336,26 @@ int ContentsTable::DropDue(int64_t id) {
 
 int ContentsTable::SetDue(int64_t id, int64_t due) {
   const int code = Begin();
-  set_due.BindInt(1, id);
-  set_due.BindInt(2, due);
+  set_due.BindInts({id, due});
   return code == SQLITE_OK ? set_due.Run() : code;
 }
 
+// Where there is none, nothing is begun.
 int ContentsTable::LimitDue(int64_t latest) {
   int64_t due = 0;
   limit_due.BindInt(1, latest);
-  const int code = NextDue(due);
+  const int code = NextDue([](int64_t) { return false; }, due);
   return code == SQLITE_OK && due != INT64_MAX ? limit_due.Run() : code;
 }
 
-int ContentsTable::NextDue(int64_t& due) {
-  due = INT64_MAX;
-  bool found = false;
-  return next_due.ReadOne(found, [&] {
-    if (sqlite3_column_type(next_due.handle, 0) != SQLITE_NULL) {
-      due = next_due.Int(0);
-    }
-  });
+int ContentsTable::NextDue(const std::function<bool(int64_t file)>& is_left_out, int64_t& due) {
+  int code = next_due.Step();
+  while (code == SQLITE_ROW && is_left_out(next_due.Int(1))) {
+    code = next_due.Step();
+  }
+  due = code == SQLITE_ROW ? next_due.Int(0) : INT64_MAX;
+  next_due.Reset();
+  return StepError(code);
 }
 
 int ContentsTable::SetReason(int64_t id, const std::string& reason) {

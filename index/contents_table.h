@@ -9,6 +9,8 @@
 
 #include <array>
 #include <cstdint>
+#include <functional>
+#include <initializer_list>
 #include <string>
 #include <vector>
 
@@ -74,7 +76,7 @@ class ContentsTable {
   int Find(uint64_t inode, int64_t birth_time, ContentFile& file, bool& found);
   int FindById(int64_t id, ContentFile& file, bool& found);
   // Each of these gives up to `limit` rows.
-  // Of those that wait, first what was never read, or only by these readers; then what older ones
+  // Of those that wait, first what was never read, or only by these readers; then what other ones
   // had read or failed at.
   int WaitingNew(int64_t limit, int64_t extractor, std::vector<ContentFile>& files);
   int WaitingAgain(int64_t limit, int64_t extractor, std::vector<ContentFile>& files);
@@ -91,11 +93,13 @@ class ContentsTable {
   int SetDue(int64_t id, int64_t due);
   // None is due later than that: the clock may have been set back.
   int LimitDue(int64_t latest);
-  // The next one; INT64_MAX if there is none.
-  int NextDue(int64_t& due);
+  // When the next one is, of those that are not left out; INT64_MAX if there is none.
+  int NextDue(const std::function<bool(int64_t file)>& is_left_out, int64_t& due);
   // In place of what was stored. Sets `text`, `length` and `found_kind` of `file`, which Update
   // then writes; `before` is the row as it stands.
   int SetContent(const ContentFile& before, const PreparedContent& prepared, ContentFile& file);
+  // Whether it has a text, a number, or what files that are alike are known by.
+  int HoldsAny(int64_t id, bool& holds);
   int RemoveContent(ContentFile& file);  // sets `text` and `length`
   int Remove(const ContentFile& file);
 
@@ -122,7 +126,7 @@ class ContentsTable {
 
   int Complete();  // see CONTENTS_ADDITIONS
   int PrepareTexts();
-  int HasTable(const char* name, bool& has);
+  int Exists(const char* name, bool& has);
   struct Words {
     std::string language;
     std::string version;
@@ -143,7 +147,8 @@ class ContentsTable {
   int WriteMeta();
   int WriteCounts(int64_t now);
   void Count(const ContentFile& file, int64_t number);
-  int ReadFiles(Statement& statement, std::vector<ContentFile>& files);
+  int ReadFiles(Statement& statement, std::initializer_list<int64_t> bound,
+                std::vector<ContentFile>& files);
   static int RunWords(Statement& statement, int64_t text, const ContentWords& words);
   int AddWords(int64_t text, ContentWords& words, const PreparedContent& prepared);
   int RemoveWords();
@@ -157,7 +162,7 @@ class ContentsTable {
   bool merging = false;
   Statement find, find_by_id, waiting_new, waiting_again, unread_due, failed, left_begun,
       unreferred, slice;
-  Statement insert, update, set_reason, set_content, remove;
+  Statement insert, update, set_reason, set_content, holds_any, remove;
   Statement set_due, drop_due, limit_due, next_due;
   Statement insert_text, read_text, next_texts, remove_text, insert_words, remove_words;
   Statement insert_new_words, remove_new_words;

@@ -22,8 +22,12 @@ std::string SetContentSql() {
 
 int ContentsTable::PrepareTexts() {
   const std::string content_sql = SetContentSql();
+  const std::string holds_sql = std::string("SELECT 1 FROM files WHERE id = ?1 AND") +
+                                " (text <> 0 OR sample <> 0 OR coalesce(" + NUMBER_COLUMNS +
+                                ") IS NOT NULL)";
   const std::pair<Statement*, const char*> statements[] = {
       {&set_content, content_sql.c_str()},
+      {&holds_any, holds_sql.c_str()},
       {&insert_text, "INSERT INTO texts(id, packed) VALUES(?1, ?2)"},
       {&read_text, "SELECT packed FROM texts WHERE id = ?1"},
       {&next_texts, "SELECT id, packed FROM texts WHERE id > ?1 AND id <= ?2 ORDER BY id"},
@@ -50,10 +54,8 @@ int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& 
   }
 
   file.found_kind = content.kind;
-  set_content.BindInt(1, before.id);
-  set_content.BindInt(2, content.is_cut ? 1 : 0);
-  set_content.BindInt(3, static_cast<int64_t>(content.sample));
-  set_content.BindInt(4, FieldBits(content));
+  set_content.BindInts({before.id, content.is_cut ? 1 : 0, static_cast<int64_t>(content.sample),
+                        FieldBits(content)});
   for (size_t i = 0; i < NUMBER_FIELD_COUNT; ++i) {
     sqlite3_bind_null(set_content.handle, static_cast<int>(i) + 5);
   }
@@ -81,6 +83,11 @@ int ContentsTable::SetContent(const ContentFile& before, const PreparedContent& 
   insert_text.BindBlob(2, packed);
   code = insert_text.Run();
   return code == SQLITE_OK ? AddWords(file.text, words, prepared) : code;
+}
+
+int ContentsTable::HoldsAny(int64_t id, bool& holds) {
+  holds_any.BindInt(1, id);
+  return holds_any.ReadOne(holds, [] {});
 }
 
 int ContentsTable::RemoveContent(ContentFile& file) {

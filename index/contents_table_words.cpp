@@ -13,11 +13,14 @@ constexpr size_t REWORD_BYTES = size_t{1} << 20;
 constexpr size_t REWORD_ROW = 500;  // a text is not free, however short
 constexpr const char* NEW_WORDS = "new_words";
 constexpr const char* OLD_WORDS = "old_words";
-constexpr const char* NEW_TO_OLD = "ALTER TABLE new_words RENAME TO old_words";
 // Pages of the old table, from its end: 2 MiB. Its first rows tell what it holds, and go with it.
 constexpr const char* REMOVE_OLD_PAGES =
     "DELETE FROM old_words_data WHERE id IN "
     "(SELECT id FROM old_words_data WHERE id > 10 ORDER BY id DESC LIMIT 512)";
+// Its parts have such names, too, and are no virtual tables.
+constexpr const char* OTHER_OLD_WORDS =
+    "SELECT name FROM sqlite_master WHERE name GLOB 'old_words[0-9]*'"
+    " AND sql LIKE 'CREATE VIRTUAL%' LIMIT 1";
 
 // Pages of one step: some hundredths of a second.
 constexpr const char* MERGE_PAGES = "INSERT INTO words(words, rank) VALUES('merge', -256)";
@@ -25,13 +28,9 @@ constexpr int MERGED = 2;  // rows that change though nothing was left to merge:
 // Below that the segments are few or small.
 constexpr int64_t LEAST_TO_MERGE = 256;
 
-int Execute(sqlite3* db, const std::string& sql) {
-  return sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr);
-}
-
 }  // namespace
 
-int ContentsTable::HasTable(const char* name, bool& has) {
+int ContentsTable::Exists(const char* name, bool& has) {
   Statement statement;
   has = false;
   int code = statement.Prepare(handle, "SELECT 1 FROM sqlite_master WHERE name = ?1");
@@ -65,7 +64,7 @@ int ContentsTable::PrepareWords() {
 }
 
 int ContentsTable::ReadWordsToBe(Words& to_be, bool& found) {
-  int code = HasTable("words_to_be", found);
+  int code = Exists("words_to_be", found);
   if (code != SQLITE_OK || !found) {
     return code;
   }
@@ -84,7 +83,7 @@ int ContentsTable::UseWords(const std::string& language, const std::string& vers
   Words to_be;
   bool is_making = false;
   int code = ReadWordsToBe(to_be, is_making);
-  code = code == SQLITE_OK ? HasTable(OLD_WORDS, has_old_words) : code;
+  code = code == SQLITE_OK ? Exists(OLD_WORDS, has_old_words) : code;
   // Older versions made new words in the place of the old ones: what is there lacks some, and what
   // is not there must not be taken out.
   const bool is_partial = !is_making && meta.reworded != ALL_WORDS;
@@ -106,7 +105,7 @@ int ContentsTable::UseWords(const std::string& language, const std::string& vers
 int ContentsTable::BeginWords(const Words& to_be) {
   bool has_words = false;
   int code = Begin();
-  code = code == SQLITE_OK ? HasTable("words", has_words) : code;
+  code = code == SQLITE_OK ? Exists("words", has_words) : code;
   if (code != SQLITE_OK) {
     return code;
   }
@@ -116,11 +115,12 @@ int ContentsTable::BeginWords(const Words& to_be) {
     meta.reworded = ALL_WORDS;
     meta.merged = 0;
     // With texts and without words it is not whole.
-    return meta.last_text == 0 ? Execute(handle, WordsSchema("words", to_be.language))
+    return meta.last_text == 0 ? Execute(handle, WordsSchema("words", to_be.language).c_str())
                                : SQLITE_ERROR;
   }
-  code = Execute(handle, WordsSchema(NEW_WORDS, to_be.language) +
-                             ";CREATE TABLE words_to_be(language TEXT, version TEXT)");
+  const std::string make = WordsSchema(NEW_WORDS, to_be.language) +
+                           ";CREATE TABLE words_to_be(language TEXT, version TEXT)";
+  code = Execute(handle, make.c_str());
   Statement note;
   code = code == SQLITE_OK ? note.Prepare(handle, "INSERT INTO words_to_be VALUES(?1, ?2)") : code;
   if (code == SQLITE_OK) {
@@ -134,12 +134,18 @@ int ContentsTable::BeginWords(const Words& to_be) {
   return code;
 }
 
-// What was made is taken away in slices (see Reword), as of many texts it would take long; but for
-// one such table, the others at once.
+// What was made is taken away in slices (see Reword), as of many texts it would take long; where
+// there is such a table, behind it.
 int ContentsTable::DropNewWords() {
   int code = Begin();
-  const char* const away = has_old_words ? "DROP TABLE new_words" : NEW_TO_OLD;
-  code = code == SQLITE_OK ? Execute(handle, std::string(away) + ";DROP TABLE words_to_be") : code;
+  std::string aside = OLD_WORDS;
+  bool taken = has_old_words;
+  for (int number = 2; code == SQLITE_OK && taken; ++number) {
+    aside = OLD_WORDS + std::to_string(number);
+    code = Exists(aside.c_str(), taken);
+  }
+  const std::string rename = "ALTER TABLE new_words RENAME TO " + aside + ";DROP TABLE words_to_be";
+  code = code == SQLITE_OK ? Execute(handle, rename.c_str()) : code;
   has_old_words = true;
   new_language.clear();
   meta.reworded = ALL_WORDS;
@@ -168,12 +174,17 @@ int ContentsTable::ReplaceWords() {
 }
 
 int ContentsTable::RemoveOldWords() {
-  int code = sqlite3_exec(handle, REMOVE_OLD_PAGES, nullptr, nullptr, nullptr);
-  if (code == SQLITE_OK && sqlite3_changes(handle) == 0) {
-    code = Execute(handle, "DROP TABLE old_words");
-    has_old_words = code != SQLITE_OK;
+  int code = Execute(handle, REMOVE_OLD_PAGES);
+  if (code != SQLITE_OK || sqlite3_changes(handle) != 0) {
+    return code;
   }
-  return code;
+  code = Execute(handle, "DROP TABLE old_words");
+  Statement others;
+  code = code == SQLITE_OK ? others.Prepare(handle, OTHER_OLD_WORDS) : code;
+  std::string next;
+  code = code == SQLITE_OK ? others.ReadOne(has_old_words, [&] { next = others.Bytes(0); }) : code;
+  next = "ALTER TABLE " + next + " RENAME TO old_words";
+  return code == SQLITE_OK && has_old_words ? Execute(handle, next.c_str()) : code;
 }
 
 int ContentsTable::Reword(bool& more) {
@@ -190,8 +201,7 @@ int ContentsTable::Reword(bool& more) {
 }
 
 int ContentsTable::MakeNewWords(bool& more) {
-  next_texts.BindInt(1, meta.reworded);
-  next_texts.BindInt(2, meta.reword_end);
+  next_texts.BindInts({meta.reworded, meta.reword_end});
   int code = next_texts.Step();
   more = code == SQLITE_ROW;
   for (size_t bytes = 0; code == SQLITE_ROW && bytes < REWORD_BYTES;) {
@@ -228,7 +238,7 @@ int ContentsTable::MergeWords(bool& more) {
 
   int code = Begin();
   const int before = sqlite3_total_changes(handle);
-  code = code == SQLITE_OK ? sqlite3_exec(handle, MERGE_PAGES, nullptr, nullptr, nullptr) : code;
+  code = code == SQLITE_OK ? Execute(handle, MERGE_PAGES) : code;
   if (code == SQLITE_OK && sqlite3_total_changes(handle) - before < MERGED) {
     meta.merged = meta.last_text;
     merging = false;

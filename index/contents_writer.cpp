@@ -2,7 +2,6 @@
 #include "index/contents_writer.h"
 
 #include <algorithm>
-#include <ctime>
 #include <exception>
 #include <utility>
 
@@ -15,10 +14,6 @@ namespace fileindexd {
 namespace {
 
 constexpr int64_t MOST_TRIES = 2;
-
-int64_t Now() {
-  return static_cast<int64_t>(time(nullptr));
-}
 
 int64_t PauseAfter(int64_t tries) {
   int64_t pause = SHORTEST_PAUSE;
@@ -95,36 +90,53 @@ bool ContentsWriter::Impl::End(int64_t id, const Ending& put_down) {
     return Done(code);
   }
 
-  ContentFile now = file;
-  now.begun = 0;
-  now.unended = 0;
-  code = current ? put_down(file, now) : SQLITE_OK;
-  return Done(code == SQLITE_OK ? table->Update(file, now) : code);
+  ContentFile ended = file;
+  ended.begun = 0;
+  ended.unended = 0;
+  code = current ? put_down(file, ended) : SQLITE_OK;
+  return Done(code == SQLITE_OK ? table->Update(file, ended) : code);
 }
 
 bool ContentsWriter::Impl::Finish(int64_t id, const PreparedContent& content) {
-  return End(id, [&](const ContentFile& file, ContentFile& now) {
-    now.state = ContentState::DONE;
-    now.tries = 0;
-    int code = Keep(file, content, now);
+  return End(id, [&](const ContentFile& file, ContentFile& ended) {
+    ended.state = ContentState::DONE;
+    ended.tries = 0;
+    int code = Keep(file, content, ended);
     code = code == SQLITE_OK ? table->SetReason(id, "") : code;
-    table->done_now += IsNotKept(now) ? 0 : 1;
+    table->done_now += IsNotKept(ended) ? 0 : 1;
     return code;
   });
 }
 
 // What was found, if it turned out to be of a kind that is wanted.
 int ContentsWriter::Impl::Keep(const ContentFile& file, const PreparedContent& content,
-                               ContentFile& now) {
+                               ContentFile& ended) {
   const Kind kind = content.content.kind;
   bool is_kept = true;
   const int code = IsKept(file, kind, is_kept);
-  now.extractor = is_kept ? extractor : KEPT_OUT;
+  ended.extractor = is_kept ? extractor : KEPT_OUT;
   if (code != SQLITE_OK) {
     return code;
   }
-  return is_kept ? table->SetContent(file, content, now)
-                 : table->SetContent(file, OfKind(kind), now);
+  return is_kept ? table->SetContent(file, content, ended)
+                 : table->SetContent(file, OfKind(kind), ended);
+}
+
+// What was found before in the same bytes, by older readers or in another try, stays. Who does not
+// even tell the kind has nothing to put in its place.
+int ContentsWriter::Impl::KeepOfFailure(const ContentFile& file, const Content& content,
+                                        ContentFile& ended) {
+  const bool is_same = file.extractor != KEPT_OUT;
+  bool is_known = is_same && content.kind == Kind::OTHER;
+  int code = SQLITE_OK;
+  if (is_same && !is_known) {
+    code = table->HoldsAny(file.id, is_known);
+  }
+  if (code != SQLITE_OK || !is_known) {
+    return code == SQLITE_OK ? Keep(file, content, ended) : code;
+  }
+  ended.extractor = extractor;
+  return SQLITE_OK;
 }
 
 // What is of no kind that is wanted has not failed: nobody wants to know what is in it.
@@ -137,38 +149,35 @@ void ContentsWriter::Impl::SettleKeptOut(ContentFile& file) {
 
 bool ContentsWriter::Impl::Fail(int64_t id, const std::string& reason, const Content& content,
                                 bool killed) {
-  return End(id, [&](const ContentFile& file, ContentFile& now) {
+  return End(id, [&](const ContentFile& file, ContentFile& ended) {
     int code = SQLITE_OK;
-    now.tries = file.state == ContentState::UNREAD ? 1 : file.tries + 1;
-    now.state = ContentState::WAITING;
-    if (!killed || now.tries >= MOST_TRIES) {
-      now.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
-      // What was found before in the same bytes, by older readers or in another try, stays.
-      const bool is_known = file.text != 0 && file.extractor != KEPT_OUT;
-      now.extractor = extractor;
-      code = is_known ? SQLITE_OK : Keep(file, content, now);
-      SettleKeptOut(now);
+    ended.tries = file.state == ContentState::UNREAD ? 1 : file.tries + 1;
+    ended.state = ContentState::WAITING;
+    if (!killed || ended.tries >= MOST_TRIES) {
+      ended.state = killed ? ContentState::QUARANTINED : ContentState::FAILED;
+      code = KeepOfFailure(file, content, ended);
+      SettleKeptOut(ended);
     }
-    const bool is_failure = now.state != ContentState::DONE;
+    const bool is_failure = ended.state != ContentState::DONE;
     return code == SQLITE_OK ? table->SetReason(id, is_failure ? reason : "") : code;
   });
 }
 
 // Deaths that were on record before are forgotten: there is one number for both.
 bool ContentsWriter::Impl::Unread(int64_t id, const std::string& reason, int64_t now) {
-  return End(id, [&](const ContentFile& file, ContentFile& unread) {
+  return End(id, [&](const ContentFile& file, ContentFile& ended) {
     int code = SQLITE_OK;
-    unread.tries = file.state == ContentState::UNREAD ? file.tries + 1 : 1;
-    unread.state = ContentState::UNREAD;
+    ended.tries = file.state == ContentState::UNREAD ? file.tries + 1 : 1;
+    ended.state = ContentState::UNREAD;
     // These readers tried it; what stands there of others keeps their version. What may be of other
     // bytes goes, unless there is a text to be found.
     if (file.text == 0 && file.extractor == KEPT_OUT) {
-      unread.extractor = extractor;
-      code = table->SetContent(file, OfKind(file.found_kind), unread);
+      ended.extractor = extractor;
+      code = table->SetContent(file, OfKind(file.found_kind), ended);
     }
     code = code == SQLITE_OK ? table->SetReason(id, reason) : code;
-    code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(unread.tries)) : code;
-    return code == SQLITE_OK ? table->NextDue(unread_due) : code;
+    code = code == SQLITE_OK ? table->SetDue(id, now + PauseAfter(ended.tries)) : code;
+    return code == SQLITE_OK ? FollowUnread() : code;
   });
 }
 
@@ -180,10 +189,7 @@ bool ContentsWriter::Impl::Release(int64_t id) {
     return false;
   }
   int code = TakeBack(id, file, found, current);
-  if (code == SQLITE_OK && found && file.state == ContentState::UNREAD) {
-    unread_due = 0;
-    code = table->SetDue(id, unread_due);
-  }
+  code = code == SQLITE_OK ? FollowUnread() : code;
   if (code != SQLITE_OK || !found) {
     return Done(code);
   }
@@ -191,9 +197,9 @@ bool ContentsWriter::Impl::Release(int64_t id) {
   if (file.begun == 0) {
     return true;
   }
-  ContentFile now = file;
-  now.begun = 0;
-  return Done(table->Update(file, now));
+  ContentFile ended = file;
+  ended.begun = 0;
+  return Done(table->Update(file, ended));
 }
 
 void ContentsWriter::Impl::LookAtAll() {

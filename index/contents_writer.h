@@ -59,9 +59,10 @@ class ContentsWriter {
   // What is new and waits, newest and smallest first, without what is handed out and not ended.
   // `more`: there may be others, though these are less than `limit`.
   bool NextJobs(size_t limit, std::vector<ContentJob>& jobs, bool& more);
-  // The same of what is read again, and comes behind all that is new: what the disk did not give
-  // and is due, and what an older extractor read or failed at, of which a few at a time begin to
-  // wait. What is stored is kept until that. `now`: seconds since the epoch.
+  // What is read again, and comes behind all that is new: first a few of those that the disk did
+  // not give and that are due; then what an older extractor read or failed at. Of that a few at a
+  // time begin to wait, in the order in which they became known; of these few the newest and
+  // smallest come first. What is stored is kept until that. `now`: seconds since the epoch.
   bool NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs, bool& more);
   // When the next file is due that the disk did not give; INT64_MAX: there is none.
   int64_t UnreadDue() const;

@@ -10,6 +10,7 @@
 // for: the outcome of the old bytes is thrown away.
 #pragma once
 
+#include <ctime>
 #include <functional>
 #include <map>
 #include <memory>
@@ -27,6 +28,18 @@ namespace fileindexd {
 // Between two tries to have a file's bytes from the disk, in seconds.
 constexpr int64_t SHORTEST_PAUSE = 2;
 constexpr int64_t LONGEST_PAUSE = 60 * 60;
+
+// Seconds since the epoch.
+inline int64_t Now() {
+  return static_cast<int64_t>(time(nullptr));
+}
+
+// Begins to wait, as if nothing had been tried.
+inline void WaitAnew(ContentFile& file) {
+  file.state = ContentState::WAITING;
+  file.tries = 0;
+  file.unended = 0;
+}
 
 inline Content OfKind(Kind kind) {
   Content content;
@@ -64,6 +77,7 @@ struct ContentsWriter::Impl {
   int TakeInEntry(const FollowedEntry& entry);
   int TakeInKnown(const FollowedEntry& entry, const ContentFile& file);
   int TakeInChanged(const FollowedEntry& entry, const ContentFile& file);
+  void RegainEntry(const ContentFile& file, ContentFile& now);
   int JudgeFound(const ContentFile& file, ContentFile& now, bool& again);
   int IsKept(const ContentFile& file, Kind found, bool& is_kept);
   int DropUnwanted(const ContentFile& file);
@@ -76,9 +90,12 @@ struct ContentsWriter::Impl {
   bool NextAgain(int64_t now, size_t limit, std::vector<ContentJob>& jobs, bool& more);
   Round BeginRound(size_t limit) const;
   int OfferUnread(int64_t now, Round& round, std::vector<ContentJob>& jobs);
+  int FollowUnread();
   int OfferSome(std::vector<ContentFile>& rows, Round& round, std::vector<ContentJob>& jobs);
-  int Renew(bool& more);
+  int Renew(int64_t now, bool& more);
+  int RenewFile(const ContentFile& file, int64_t now);
   int Offer(const ContentFile& file, std::vector<ContentJob>& jobs, bool& dropped);
+  int PutAside(const ContentFile& file);
   bool BeginTries(const std::vector<int64_t>& files);
   int MarkBegun(int64_t id, int64_t begun);
   int Remove(const ContentFile& file);
@@ -86,10 +103,11 @@ struct ContentsWriter::Impl {
   int TakeBack(int64_t id, ContentFile& file, bool& found, bool& current);
 
   // contents_writer.cpp
-  using Ending = std::function<int(const ContentFile& file, ContentFile& now)>;
+  using Ending = std::function<int(const ContentFile& file, ContentFile& ended)>;
   bool End(int64_t file, const Ending& put_down);
   bool Finish(int64_t file, const PreparedContent& content);
-  int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& now);
+  int Keep(const ContentFile& file, const PreparedContent& content, ContentFile& ended);
+  int KeepOfFailure(const ContentFile& file, const Content& content, ContentFile& ended);
   static void SettleKeptOut(ContentFile& file);
   bool Fail(int64_t file, const std::string& reason, const Content& found, bool killed);
   bool Unread(int64_t file, const std::string& reason, int64_t now);
@@ -104,12 +122,15 @@ struct ContentsWriter::Impl {
   bool Ready();  // sets the error where nothing is open
   bool ReadyToFollow();
   bool Done(int code);
+  bool WasReadByOlder(const ContentFile& file) const {
+    return file.extractor != KEPT_OUT && file.extractor < extractor;
+  }
   // Read by older readers, or what those failed at.
   bool IsAged(const ContentFile& file) const {
-    const bool is_kept = file.state == ContentState::DONE && file.extractor != KEPT_OUT;
     const bool has_failed =
         file.state == ContentState::FAILED || file.state == ContentState::QUARANTINED;
-    return (is_kept || has_failed) && file.extractor < extractor;
+    return (file.state == ContentState::DONE && WasReadByOlder(file)) ||
+           (has_failed && file.extractor < extractor);
   }
   bool IsFull() const { return table->pending_bytes >= ENOUGH_PENDING; }
 

@@ -1,7 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Opening the contents, and what is put right before the first job.
-#include <ctime>
-
 #include "index/contents_writer_impl.h"
 #include "index/set_aside.h"
 #include "index/text_tokenizer.h"
@@ -15,10 +13,6 @@ namespace {
 constexpr int64_t SLICE = 1000;
 // Somebody who kills services means no file, and may well do so twice.
 constexpr int64_t MOST_DEATHS = 5;
-
-int64_t Now() {
-  return static_cast<int64_t>(time(nullptr));
-}
 
 }  // namespace
 
@@ -85,11 +79,8 @@ int ContentsWriter::Impl::Own() {
   }
   code = code == SQLITE_OK ? table->UseWords(language, version) : code;
   code = code == SQLITE_OK ? JudgeLeftBegun() : code;
-  if (code == SQLITE_OK && table->meta.extractor != extractor) {
-    renewed = 0;  // see Renew, which also ends it
-  }
   code = code == SQLITE_OK ? table->LimitDue(Now() + LONGEST_PAUSE) : code;
-  code = code == SQLITE_OK ? table->NextDue(unread_due) : code;
+  code = code == SQLITE_OK ? FollowUnread() : code;
   return code == SQLITE_OK ? table->Commit(Now()) : code;
 }
 
@@ -115,9 +106,6 @@ int ContentsWriter::Impl::JudgeLeftBegun() {
         code = table->SetReason(file.id, "the content service ended over it again and again");
       }
       code = code == SQLITE_OK ? table->Update(left[i], file) : code;
-      if (code == SQLITE_OK && file.state == ContentState::UNREAD) {
-        code = table->SetDue(file.id, 0);  // its pause was put off while it was in flight
-      }
     }
   } while (code == SQLITE_OK && !left.empty());
   has_judged = has_judged || code == SQLITE_OK;
@@ -133,9 +121,7 @@ int ContentsWriter::Impl::RetryAll() {
     for (size_t i = 0; i < failed.size() && code == SQLITE_OK; ++i) {
       ContentFile file = failed[i];
       after = file.id;
-      file.state = ContentState::WAITING;
-      file.tries = 0;
-      file.unended = 0;
+      WaitAnew(file);
       code = table->Update(failed[i], file);
     }
   } while (code == SQLITE_OK && !failed.empty());

@@ -47,10 +47,6 @@ int CutLongLog(void* /*unused*/, sqlite3* db, const char* name, int frames) {
   return SQLITE_OK;
 }
 
-int Execute(sqlite3* db, const char* sql) {
-  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
-}
-
 int ReadNumber(sqlite3* db, const std::string& sql, int64_t& number) {
   Statement statement;
   int code = statement.Prepare(db, sql.c_str());

@@ -87,8 +87,7 @@ void EntryFollower::Close() {
 
 int EntryFollower::Next(int64_t written, int64_t limit, std::vector<FollowedEntry>& entries) {
   entries.clear();
-  next.BindInt(1, written);
-  next.BindInt(2, limit);
+  next.BindInts({written, limit});
   int code = next.Step();
   for (; code == SQLITE_ROW; code = next.Step()) {
     ReadFollowed(next, entries.emplace_back());
@@ -98,8 +97,7 @@ int EntryFollower::Next(int64_t written, int64_t limit, std::vector<FollowedEntr
 
 int EntryFollower::Refer(const FileIdentity& identity, Reference& reference) {
   reference = Reference::NONE;
-  of_inode.BindInt(1, static_cast<int64_t>(identity.inode));
-  of_inode.BindInt(2, identity.birth_time);
+  of_inode.BindInts({static_cast<int64_t>(identity.inode), identity.birth_time});
   int code = of_inode.Step();
   for (; code == SQLITE_ROW && reference != Reference::WANTED; code = of_inode.Step()) {
     Reference found = Reference::UNWANTED;
@@ -113,8 +111,7 @@ int EntryFollower::Refer(const FileIdentity& identity, Reference& reference) {
 }
 
 int EntryFollower::Latest(uint64_t inode, int64_t birth_time, FollowedEntry& entry, bool& found) {
-  latest_of.BindInt(1, static_cast<int64_t>(inode));
-  latest_of.BindInt(2, birth_time);
+  latest_of.BindInts({static_cast<int64_t>(inode), birth_time});
   const int code = latest_of.Step();
   found = code == SQLITE_ROW;
   if (found) {

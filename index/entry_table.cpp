@@ -67,10 +67,8 @@ void ReadEntry(const Statement& statement, Entry& entry) {
 }
 
 void BindIdentity(Statement& statement, const FileIdentity& identity) {
-  statement.BindInt(1, static_cast<int64_t>(identity.inode));
-  statement.BindInt(2, identity.birth_time);
-  statement.BindInt(3, identity.size);
-  statement.BindInt(4, identity.mtime);
+  statement.BindInts(
+      {static_cast<int64_t>(identity.inode), identity.birth_time, identity.size, identity.mtime});
 }
 
 int EntryTable::Prepare(sqlite3* db) {
@@ -141,10 +139,7 @@ int EntryTable::Begin() {
 }
 
 int EntryTable::Commit(int64_t now) {
-  write_meta.BindInt(1, entries);
-  write_meta.BindInt(2, now);
-  write_meta.BindInt(3, removed);
-  write_meta.BindInt(4, last_written);
+  write_meta.BindInts({entries, now, removed, last_written});
   int code = write_meta.Run();
   if (code == SQLITE_OK) {
     code = GiveBackPages();

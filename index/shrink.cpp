@@ -27,10 +27,6 @@ constexpr const char* MERGE_NAMES = "INSERT INTO names(names, rank) VALUES('merg
 constexpr const char* MERGE_PARTS = "INSERT INTO parts(parts, rank) VALUES('merge', -200)";
 constexpr const char* CUT_PAGES = "PRAGMA incremental_vacuum(200)";
 
-int Execute(sqlite3* db, const char* sql) {
-  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
-}
-
 // -1 when it could not be read.
 int64_t ReadNumber(sqlite3* db, const char* sql) {
   Statement statement;

@@ -62,6 +62,11 @@ class ContentLoop {
     ShareContents contents;
     std::string folders;  // that are indexed, and what of them, as a text to be compared
   };
+  // Of a job.
+  struct Owner {
+    std::string share;
+    ShareContents::Turn turn = ShareContents::Turn::NEW;
+  };
 
   void Listen(Time now);
   // Those of the shares that are followed; `names` is empty then.
@@ -97,12 +102,8 @@ class ContentLoop {
   bool pool_told = false;               // that it rests
   std::optional<std::string> left_out;  // as it was told
   uint64_t last_job = 0;                // id
-  struct Owner {
-    std::string share;
-    ShareContents::Turn turn = ShareContents::Turn::NEW;
-  };
-  std::map<uint64_t, Owner> owner;  // by job
-  std::string last_share;           // that was given a turn
+  std::map<uint64_t, Owner> owner;      // by job
+  std::string last_share;               // that was given a turn
   Time next_listen;
   Time next_reload = Time::max();
   Time next_look;  // where something could not be watched

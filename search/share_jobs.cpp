@@ -57,14 +57,18 @@ struct ShareContents::Batch {
   }
   void Open(File& one) const {
     for (const std::string& path : one.job.paths) {
-      const Opening opened = OpenFile(share, path, one.job.identity, one.file, one.reason);
+      std::string reason;
+      const Opening opened = OpenFile(share, path, one.job.identity, one.file, reason);
       if (opened == Opening::DONE) {
         one.opening = opened;
         one.path = path;
         return;
       }
       // Of all its names, the one that promises most.
-      one.opening = std::max(one.opening, opened);
+      if (opened > one.opening) {
+        one.opening = opened;
+        one.reason = std::move(reason);
+      }
     }
   }
 

@@ -12,10 +12,21 @@ const char* BytesOf(std::string_view bytes) {
 
 }  // namespace
 
+int Execute(sqlite3* db, const char* sql) {
+  return sqlite3_exec(db, sql, nullptr, nullptr, nullptr);
+}
+
 int Statement::Prepare(sqlite3* db, const char* sql) {
   sqlite3_finalize(handle);
   handle = nullptr;
   return sqlite3_prepare_v3(db, sql, -1, SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
+}
+
+void Statement::BindInts(std::initializer_list<int64_t> values) {
+  int column = 1;
+  for (const int64_t value : values) {
+    BindInt(column++, value);
+  }
 }
 
 void Statement::BindText(int column, std::string_view text) {

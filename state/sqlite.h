@@ -5,6 +5,7 @@
 #include <sqlite3.h>
 
 #include <cstdint>
+#include <initializer_list>
 #include <string>
 #include <string_view>
 
@@ -15,6 +16,9 @@ namespace fileindexd {
 inline int StepError(int code) {
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
+
+// Statements separated by ';', whose rows nobody wants.
+int Execute(sqlite3* db, const char* sql);
 
 // A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
 class Statement {
@@ -27,6 +31,7 @@ class Statement {
   int Prepare(sqlite3* db, const char* sql);
   // Numbered from 1. Bytes are bound without a copy: they must outlive the step.
   void BindInt(int column, int64_t value) { sqlite3_bind_int64(handle, column, value); }
+  void BindInts(std::initializer_list<int64_t> values);  // the first ones
   void BindText(int column, std::string_view text);
   void BindBlob(int column, std::string_view bytes);
   int Step() { return sqlite3_step(handle); }

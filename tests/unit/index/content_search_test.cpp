@@ -1,5 +1,4 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include <algorithm>
 #include <filesystem>
 
 #include "base/utf8.h"
@@ -24,12 +23,6 @@ class ContentSearchTest : public ContentsTest {
     for (const auto& [name, text] : files) {
       Finish(name, text);
     }
-  }
-
-  Names Sorted(const std::string& text) {
-    Names names = Hits(text);
-    std::sort(names.begin(), names.end());
-    return names;
   }
 };
 
@@ -210,18 +203,19 @@ TEST_F(ContentSearchTest, ShareWithoutContentsAnswersByNames) {
 TEST_F(ContentSearchTest, BrokenContentsDoNotHideNames) {
   Stored({{"whale.txt", "x"}});
   contents.reset();
+  question.shares = {"s"};
   const std::string file = ContentsPath("s") + "/contents.db";
   std::filesystem::remove(file + "-wal");
   WriteFile(file, std::string(9000, 'x'));
 
-  EXPECT_EQ(Hits("whale"), Names({"whale.txt"}));
+  EXPECT_EQ(Paths("whale"), Names({At("whale.txt")}));
   ASSERT_EQ(answer.failures.size(), 1U);
   EXPECT_NE(answer.failures[0].find("share s: contents: "), std::string::npos)
       << answer.failures[0];
 
   std::filesystem::remove(file);
   std::filesystem::create_directory(file);
-  EXPECT_EQ(Hits("whale"), Names({"whale.txt"}));
+  EXPECT_EQ(Paths("whale"), Names({At("whale.txt")}));
 }
 
 TEST_F(ContentSearchTest, ChangedLanguageMakesTheWordsAnew) {
@@ -263,12 +257,9 @@ TEST_F(ContentSearchTest, ReaderTellsStatesAndCounts) {
   EXPECT_EQ(counts.all.failed, 1U);
   EXPECT_EQ(counts.kinds[1].done, 1U);
   EXPECT_EQ(counts.done_last_minute, 1U);
-  Names lines;
-  ASSERT_TRUE(reader.ForEachFailed([&](const FailedContent& content) {
-    lines.push_back(content.path + " " + content.reason);
-    return true;
-  }));
-  EXPECT_EQ(lines, Names({At(failed) + " damaged"}));
+  const std::vector<FailedContent> listed = Listed();
+  ASSERT_EQ(listed.size(), 1U);
+  EXPECT_EQ(listed[0].path + " " + listed[0].reason, At(failed) + " damaged");
 
   StoredContent stored;
   ASSERT_EQ(reader.Find(ContentsTest::Find(failed), stored), IndexError::NONE);

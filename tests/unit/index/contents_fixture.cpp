@@ -4,6 +4,8 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
+
 #include "index/contents_schema.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
@@ -123,6 +125,13 @@ void ContentsTest::Finish(const std::string& name, const std::string& text) {
   EXPECT_TRUE(contents->Commit()) << IndexErrorText(contents->Error());
 }
 
+void ContentsTest::ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes) {
+  OldFile(name, mtime, bytes);
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({name}));
+  Finish(name, "old" + name);
+}
+
 Names ContentsTest::Read() {
   const Names names = Jobs();
   for (const std::string& name : names) {
@@ -131,16 +140,47 @@ Names ContentsTest::Read() {
   return names;
 }
 
-Names ContentsTest::Hits(const std::string& text) {
+Names ContentsTest::Paths(const std::string& text) {
   question.text = text;
-  question.shares = {"s"};
   std::string error;
-  EXPECT_TRUE(Ask(question, answer, error)) << error;
-  Names names;
+  if (!Ask(question, answer, error)) {
+    return {"error: " + error};
+  }
+  Names paths;
   for (const Hit& hit : answer.hits) {
-    names.push_back(hit.entry.path.substr(root.size() + 1));
+    paths.push_back(hit.entry.path);
+  }
+  return paths;
+}
+
+Names ContentsTest::Hits(const std::string& text) {
+  question.shares = {"s"};
+  answer.failures.clear();
+  Names names = Paths(text);
+  EXPECT_EQ(answer.failures, Names()) << text;
+  for (std::string& name : names) {
+    if (Covers(root, name)) {
+      name.erase(0, name == root ? root.size() : root.size() + 1);
+    }
   }
   return names;
+}
+
+Names ContentsTest::Sorted(const std::string& text) {
+  Names names = Hits(text);
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+std::vector<FailedContent> ContentsTest::Listed() {
+  std::vector<FailedContent> listed;
+  ContentsReader reader;
+  EXPECT_EQ(reader.Open("s"), IndexError::NONE);
+  EXPECT_TRUE(reader.ForEachFailed([&](const FailedContent& failed) {
+    listed.push_back(failed);
+    return true;
+  }));
+  return listed;
 }
 
 int64_t ContentsTest::Number(const std::string& sql) {

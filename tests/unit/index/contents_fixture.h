@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "index/contents_reader.h"
 #include "index/contents_writer.h"
 #include "index/search.h"
 #include "tests/unit/index/fixture.h"
@@ -31,11 +32,18 @@ class ContentsTest : public IndexTest {
   void File(const std::string& name, const std::string& bytes = "bytes");
   // The same but for taking it in, old enough that nothing else has that time.
   void OldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes");
+  // The same, taken in and read, with "old" and its name as its text.
+  void ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes");
   static void SetTime(const std::string& path, time_t mtime);
   void Finish(const std::string& name, const std::string& text);
   // Hands out all that waits, and finishes each with its own name as its text.
   Names Read();
-  Names Hits(const std::string& text);     // of `question`, with that text
+  // Whole paths of the hits of `question` with that text, in order; "error: " as below.
+  Names Paths(const std::string& text);
+  // Relative paths of the hits, in order; "error: " and the reason when it was refused.
+  Names Hits(const std::string& text);
+  Names Sorted(const std::string& text);  // the same, by name
+  static std::vector<FailedContent> Listed();
   int64_t Number(const std::string& sql);  // an answer of the contents database
   // How many stored files hold that word.
   int64_t Holding(const std::string& word);

@@ -14,13 +14,6 @@
 
 namespace fileindexd {
 
-namespace {
-
-constexpr int64_t NOW = 2'000'000'000;
-constexpr int64_t DAY = 86400;
-
-}  // namespace
-
 class ContentsIntakeTest : public ContentsTest {
  protected:
   // The kinds that the administrator wants from now on.
@@ -319,48 +312,6 @@ TEST_F(ContentsIntakeTest, PartOfAnUnwantedKindIsNotKeptEither) {
   EXPECT_EQ(Jobs(), Names());
 }
 
-TEST_F(ContentsIntakeTest, WhatNoEntryRefersToIsSweptAfterADay) {
-  File("a.txt");
-  File("b.txt");
-  Read();
-  ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
-  Delete("a.txt");
-  Commit();
-
-  contents->LookAtAll();
-  TakeIn();
-  Sweep(NOW);
-  EXPECT_EQ(Number("SELECT count(*) FROM files"), 2);
-  Sweep(NOW + DAY - 1);
-  EXPECT_EQ(Number("SELECT count(*) FROM files"), 2);
-  Sweep(NOW + DAY);
-
-  EXPECT_EQ(Number("SELECT count(*) FROM files"), 1);
-  EXPECT_EQ(Number("SELECT count(*) FROM texts"), 1);
-  EXPECT_EQ(Holding("b"), 1);
-  EXPECT_EQ(Number("SELECT sum(done) FROM counts"), 1);
-}
-
-TEST_F(ContentsIntakeTest, WhatComesBackWithinADayIsKept) {
-  File("a.txt");
-  Read();
-  ASSERT_EQ(rename(At("a.txt").c_str(), (folder + "/aside").c_str()), 0);
-  Delete("a.txt");
-  Commit();
-  contents->LookAtAll();
-  TakeIn();
-  Sweep(NOW);
-
-  ASSERT_EQ(rename((folder + "/aside").c_str(), At("b.txt").c_str()), 0);
-  Add("b.txt");
-  Commit();
-  TakeIn();
-  Sweep(NOW + 2 * DAY);
-
-  EXPECT_EQ(Jobs(), Names());
-  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE state = 1"), 1);
-}
-
 TEST_F(ContentsIntakeTest, ABacklogOfMoreThanOneSliceIsTakenInAndHandedOutOnce) {
   constexpr size_t FILES = 1500;
   constexpr size_t SLICE = 1000;
@@ -387,25 +338,6 @@ TEST_F(ContentsIntakeTest, ABacklogOfMoreThanOneSliceIsTakenInAndHandedOutOnce) 
     }
   }
   EXPECT_EQ(seen.size(), FILES);
-}
-
-TEST_F(ContentsIntakeTest, PassesThatWereUndoneBeginAnew) {
-  File("a.txt");
-  Read();
-  ASSERT_EQ(unlink(At("a.txt").c_str()), 0);
-  Delete("a.txt");
-  Commit();
-  contents->LookAtAll();
-  bool more = false;
-  ASSERT_TRUE(contents->TakeIn(100, more));
-  ASSERT_TRUE(contents->Sweep(NOW, 100, more));
-
-  contents->Close();  // nothing of it is on disk
-  ASSERT_EQ(contents->Open(TheShare(), 1), IndexError::NONE);
-  TakeIn();
-  Sweep(NOW);
-
-  EXPECT_EQ(Number("SELECT unreferred_since FROM files"), NOW);
 }
 
 }  // namespace fileindexd

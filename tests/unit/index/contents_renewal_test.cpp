@@ -1,8 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What older readers read well is read anew by newer ones, behind all else.
 #include <gmock/gmock.h>
-#include <unistd.h>
 
+#include "index/contents_schema.h"
+#include "index/contents_table.h"
+#include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/contents_fixture.h"
 
 namespace fileindexd {
@@ -11,12 +14,6 @@ namespace {
 
 class ContentsRenewalTest : public ContentsTest {
  protected:
-  void ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes") {
-    OldFile(name, mtime, bytes);
-    TakeIn();
-    ASSERT_EQ(Jobs(), Names({name}));
-    Finish(name, "old" + name);
-  }
   void BeginAndDie(const std::string& name, int64_t extractor) {
     ASSERT_TRUE(contents->BeginTries({JobOf(name).file}));
     OpenContents(extractor);
@@ -186,22 +183,48 @@ TEST_F(ContentsRenewalTest, WhatWasUndoneIsRenewedAllTheSame) {
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
 }
 
-TEST_F(ContentsRenewalTest, WithoutAnEntryItWaitsForOne) {
-  ReadOldFile("a.txt", 3000);
-  ReadOldFile("b.txt", 2000);
-  OpenContents(2);
-  ASSERT_EQ(rename(At("a.txt").c_str(), (root + "/../a.txt").c_str()), 0);
-  Delete("a.txt");
-  Commit();
-
-  EXPECT_EQ(Read(), Names({"b.txt"}));
-  EXPECT_EQ(Jobs(), Names());
-
-  ASSERT_EQ(rename((root + "/../a.txt").c_str(), At("a.txt").c_str()), 0);
-  Add("a.txt");
-  Commit();
+TEST_F(ContentsRenewalTest, AFailureTakesNoNumbersAway) {
+  OldFile("a.jpg", 3000);
   TakeIn();
-  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_EQ(Jobs(), Names({"a.jpg"}));
+  Content found;
+  found.kind = Kind::PHOTO;
+  found.numbers = {{ContentField::WIDTH, 640}};
+  found.sample = 7;
+  ASSERT_TRUE(contents->Finish(JobOf("a.jpg").file, found));
+  ASSERT_TRUE(contents->Commit());
+  ASSERT_EQ(Number("SELECT text FROM files"), 0);
+
+  Content part;
+  part.kind = Kind::PHOTO;
+  OpenContents(2);
+  ASSERT_EQ(Jobs(), Names({"a.jpg"}));
+  ASSERT_TRUE(contents->Fail(JobOf("a.jpg").file, "damaged", part, false));
+  ASSERT_TRUE(contents->RetryFailed());
+  for (int death = 0; death < 2; ++death) {
+    ASSERT_EQ(Jobs(), Names({"a.jpg"}));
+    ASSERT_TRUE(contents->Fail(JobOf("a.jpg").file, "killed", {}, true));
+  }
+  ASSERT_TRUE(contents->Commit());
+
+  EXPECT_EQ(Number("SELECT state FROM files"), 3);
+  EXPECT_EQ(Number("SELECT width FROM files"), 640);
+  EXPECT_EQ(Number("SELECT sample FROM files"), 7);
+  EXPECT_EQ(Number("SELECT found_kind FROM files"), static_cast<int64_t>(Kind::PHOTO));
+}
+
+TEST_F(ContentsRenewalTest, WhereNothingWasKnownPartIsKept) {
+  OldFile("a.txt", 3000);
+  TakeIn();
+  for (int64_t version = 1; version < 3; ++version) {
+    OpenContents(version);
+    ASSERT_EQ(Jobs(), Names({"a.txt"}));
+    const Content found = version == 1 ? Content() : TextContent("half");
+    ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "damaged", found, false));
+    ASSERT_TRUE(contents->Commit());
+  }
+
+  EXPECT_EQ(Holding("half"), 1);
 }
 
 TEST_F(ContentsRenewalTest, AFileThatChangedMeanwhileWaitsAsEver) {
@@ -217,6 +240,45 @@ TEST_F(ContentsRenewalTest, AFileThatChangedMeanwhileWaitsAsEver) {
   EXPECT_EQ(Holding("stale"), 0);
   EXPECT_EQ(Number("SELECT state FROM files"), 0);
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+// However much waits that older readers read, what is new is found without looking at it.
+TEST_F(ContentsRenewalTest, WhatWaitsIsFoundByAnIndexInItsOrder) {
+  ASSERT_TRUE(contents->Commit());
+  IndexDatabase database;
+  ASSERT_EQ(database.OpenForWriting(ContentsPath("s"), false, CONTENTS_FORM), IndexError::NONE);
+  ContentsTable table;
+  ASSERT_EQ(table.Prepare(database.db), SQLITE_OK);
+
+  int looked = 0;
+  for (sqlite3_stmt* one = nullptr; (one = sqlite3_next_stmt(database.db, one)) != nullptr;) {
+    const std::string sql = sqlite3_sql(one);
+    if (sql.find("state = 0") == std::string::npos) {
+      continue;
+    }
+    ++looked;
+    Statement plan;
+    ASSERT_EQ(plan.Prepare(database.db, ("EXPLAIN QUERY PLAN " + sql).c_str()), SQLITE_OK);
+    ASSERT_EQ(plan.ReadAll([&] {
+      EXPECT_THAT(plan.Bytes(3), testing::Not(testing::HasSubstr("SCAN"))) << sql;
+      EXPECT_THAT(plan.Bytes(3), testing::Not(testing::HasSubstr("TEMP B-TREE"))) << sql;
+    }),
+              SQLITE_OK);
+  }
+  EXPECT_EQ(looked, 2);
+}
+
+TEST_F(ContentsRenewalTest, WhatTheseReadersFailedAtAndIsTriedOnceMoreStandsAmongWhatIsNew) {
+  OldFile("failed.txt", 3000);
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({"failed.txt"}));
+  ASSERT_TRUE(contents->Fail(JobOf("failed.txt").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->RetryFailed());
+  OldFile("older.txt", 2000);
+  OldFile("newer.txt", 4000);
+  TakeIn();
+
+  EXPECT_EQ(NewJobs(), Names({"newer.txt", "failed.txt", "older.txt"}));
 }
 
 TEST_F(ContentsRenewalTest, ManyAreReadInBatchesToTheEnd) {

@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Files whose bytes the disk does not give.
 #include <gmock/gmock.h>
+#include <sys/stat.h>
 
 #include <ctime>
 
-#include "index/contents_reader.h"
 #include "state/layout.h"
 #include "tests/unit/index/contents_fixture.h"
 
@@ -26,16 +26,6 @@ class ContentsUnreadTest : public ContentsTest {
     const int64_t pause = contents->UnreadDue() - clock;
     clock += pause;
     return pause;
-  }
-  static std::vector<FailedContent> Listed() {
-    std::vector<FailedContent> listed;
-    ContentsReader reader;
-    EXPECT_EQ(reader.Open("s"), IndexError::NONE);
-    EXPECT_TRUE(reader.ForEachFailed([&](const FailedContent& failed) {
-      listed.push_back(failed);
-      return true;
-    }));
-    return listed;
   }
 };
 
@@ -87,6 +77,69 @@ TEST_F(ContentsUnreadTest, AKillDoesNotPutATryOff) {
   OpenContents();
 
   EXPECT_LE(contents->UnreadDue(), clock);
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, AKillWhileItIsBeingOpenedDoesNotPutATryOffEither) {
+  clock = time(nullptr);
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  (void)Pass();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  File("b.txt");  // a commit in between
+
+  OpenContents();
+
+  EXPECT_LE(contents->UnreadDue(), clock);
+  EXPECT_EQ(NewJobs(), Names({"b.txt"}));
+  EXPECT_EQ(Jobs(), Names({"a.txt"}));
+}
+
+TEST_F(ContentsUnreadTest, WhatIsWithAHelperHidesNoneThatIsDue) {
+  constexpr size_t FILES = 30;  // many times as many as are given out at once
+  for (size_t i = 0; i < FILES; ++i) {
+    File("f" + std::to_string(i) + ".txt");
+  }
+  for (const std::string& name : Jobs()) {
+    Unread(name);
+    ++clock;
+  }
+  clock += HOUR;
+
+  size_t given = 0;
+  for (Names some = Jobs(); !some.empty(); some = Jobs()) {
+    EXPECT_LE(some.size(), 4U);
+    given += some.size();
+    EXPECT_EQ(contents->UnreadDue() <= clock, given < FILES);
+  }
+  EXPECT_EQ(given, FILES);
+  EXPECT_EQ(contents->UnreadDue(), INT64_MAX);
+}
+
+TEST_F(ContentsUnreadTest, AfterAWriteThatHidItselfItsPausesGoOnWhateverElseChanges) {
+  OldFile("a.txt", 1000);
+  TakeIn();
+  ASSERT_EQ(Read(), Names({"a.txt"}));
+  WriteFile(At("a.txt"), "bytea");
+  SetTime(At("a.txt"), 1000);
+  Add("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  Unread("a.txt");
+  const int64_t due = contents->UnreadDue();
+
+  ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
+  Refresh("a.txt");
+  Commit();
+  contents->LookAtAll();
+  TakeIn();
+
+  EXPECT_EQ(NewJobs(), Names());
+  EXPECT_EQ(contents->UnreadDue(), due);
+  (void)Pass();
   EXPECT_EQ(Jobs(), Names({"a.txt"}));
 }
 
@@ -207,12 +260,22 @@ TEST_F(ContentsUnreadTest, AnOpeningDoesNotForgetIt) {
 }
 
 TEST_F(ContentsUnreadTest, DatabasesThatWereMadeBeforeAreCompleted) {
-  contents->Close();
-  Run("sqlite3 " + ContentsPath("s") + "/contents.db 'DROP TABLE later'");
+  File("a.txt");
+  for (const char* lacking : {"DROP INDEX files_to_read",
+                              "DROP INDEX files_to_read; "
+                              "DROP TABLE later"}) {
+    contents->Close();
+    Run("sqlite3 " + ContentsPath("s") + "/contents.db '" + lacking +
+        "; CREATE INDEX files_waiting ON files(size) WHERE state = 0'");
 
-  OpenContents();
+    OpenContents();
 
-  EXPECT_EQ(Number("SELECT count(*) FROM later"), 0);
+    EXPECT_EQ(Number("SELECT count(*) FROM later"), 0) << lacking;
+    EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_waiting'"), 0);
+    EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name = 'files_to_read'"), 1);
+    EXPECT_EQ(Number("SELECT waiting FROM counts WHERE kind = 1"), 1);
+    EXPECT_EQ(Jobs(), Names({"a.txt"}));
+  }
 }
 
 }  // namespace fileindexd

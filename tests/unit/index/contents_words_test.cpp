@@ -240,6 +240,30 @@ TEST_F(ContentsWordsTest, OldWordsAreTakenAwaySliceBySlice) {
   EXPECT_EQ(Holding("txt"), 3);
 }
 
+TEST_F(ContentsWordsTest, EachTableThatIsWantedNoMoreIsTakenAwayInSlices) {
+  const auto left = [this] {
+    return Number(
+        "SELECT count(*) FROM sqlite_master WHERE name LIKE 'old_words%' AND sql LIKE "
+        "'CREATE VIRTUAL%'");
+  };
+  File("a.txt");
+  Read();
+  for (const char* language : {"german", "english", "german", "french", "english"}) {
+    ASSERT_TRUE(store->SetShareLanguage("s", language)) << store->Error();
+    OpenContents();
+  }
+  EXPECT_EQ(left(), 3) << "none was dropped at once";
+
+  bool more = true;
+  for (int64_t before = 3; more; before = left()) {
+    ASSERT_TRUE(contents->TakeIn(100, more)) << IndexErrorText(contents->Error());
+    ASSERT_TRUE(contents->Commit());
+    EXPECT_GE(left(), before - 1);
+  }
+  EXPECT_EQ(Number("SELECT count(*) FROM sqlite_master WHERE name LIKE 'old_words%'"), 0);
+  EXPECT_EQ(Holding("txt"), 1);
+}
+
 TEST_F(ContentsWordsTest, ManyNewWordsAreMergedStepByStepIntoLessRoom) {
   std::string text;
   for (int word = 0; word < 600; ++word) {

@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "tests/unit/index/question_fixture.h"
 
-#include <algorithm>
-
 #include "index/entry_table.h"
 #include "state/layout.h"
 
@@ -56,38 +54,6 @@ bool QuestionTest::TryToFill(const std::string& share, const Names& names) {
 
 void QuestionTest::Fill(const std::string& share, const Names& names) {
   ASSERT_TRUE(TryToFill(share, names));
-}
-
-Names QuestionTest::Paths(const std::string& text) {
-  question.text = text;
-  std::string error;
-  if (!Ask(question, answer, error)) {
-    return {"error: " + error};
-  }
-  Names paths;
-  for (const Hit& hit : answer.hits) {
-    paths.push_back(hit.entry.path);
-  }
-  return paths;
-}
-
-Names QuestionTest::Hits(const std::string& text) {
-  question.shares = {"s"};
-  answer.failures.clear();
-  Names names = Paths(text);
-  EXPECT_EQ(answer.failures, Names()) << text;
-  for (std::string& name : names) {
-    if (Covers(root, name)) {
-      name.erase(0, name == root ? root.size() : root.size() + 1);
-    }
-  }
-  return names;
-}
-
-Names QuestionTest::Sorted(const std::string& text) {
-  Names names = Hits(text);
-  std::sort(names.begin(), names.end());
-  return names;
 }
 
 std::string QuestionTest::Suggested(const std::string& text) {

@@ -22,19 +22,12 @@ class QuestionTest : public ContentsTest {
   static bool TryToFill(const std::string& share, const Names& names);
   static void Fill(const std::string& share, const Names& names);
 
-  // Whole paths of the hits of the question's shares, in order; "error: " as below.
-  Names Paths(const std::string& text);
-  // Relative paths of the hits, in order; "error: " and the reason when it was refused.
-  Names Hits(const std::string& text);
-  Names Sorted(const std::string& text);  // the same, by name
   std::string Suggested(const std::string& text);
   // Bytes of the hits' names that are marked, joined by '|'.
   std::string Marked(const std::string& text);
   // "part: where" of each reason, "-part" where it does not match.
   Names Reasons(const std::string& name, const std::string& text);
 
-  Question question;
-  Answer answer;
   Explanation explanation;
 };
 
