@@ -9,10 +9,13 @@ from search.library import ContentsTest
 
 LARGE, SMALL = (500, 20000) if IS_LONG else (40, 400)  # files; each large one beyond the text's cap
 SHARES = 6
+IN_EACH = 60 if IS_LONG else 20  # large files, all words of which are new
 WORDS = "lighthouse keepers number their lamps "
 
 
 class BoundsTest(ContentsTest):
+    state_size = "4g" if IS_LONG else ContentsTest.state_size
+
     def highest_memory(self, pid):
         """KiB."""
         with open(f"/proc/{pid}/status", encoding="utf-8") as file:
@@ -39,7 +42,7 @@ class BoundsTest(ContentsTest):
         names = [f"share{number}" for number in range(SHARES)]
         roots = [self.make_share(name, folders=()) for name in names]
         for name, root in zip(names, roots):
-            for number in range(LARGE // 2):
+            for number in range(IN_EACH):
                 text = "".join(f"{WORDS} {name}x{number}y{word} " for word in range(12000))
                 self.write(f"{root}/large{number}.txt", text)
         self.start()
@@ -48,7 +51,7 @@ class BoundsTest(ContentsTest):
             self.ctl("folder", "add", root, "--document")
 
         for name in names:
-            self.await_counts(name, done=LARGE // 2, waiting=0, failed=0)
+            self.await_counts(name, done=IN_EACH, waiting=0, failed=0)
 
         self.assertLess(self.highest_memory(service), 64 * 1024)
 
