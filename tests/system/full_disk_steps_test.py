@@ -21,6 +21,7 @@ from harness.scale import IS_LONG
 KIB = 1 << 10
 MIB = 1 << 20
 PIECE = 4 * MIB
+SMALLEST_PIECE = 4 * KIB
 SIZE = 16 * MIB
 STEP = (32 if IS_LONG else 256) * KIB  # while commits fail
 WIDE_STEP = (128 if IS_LONG else 512) * KIB  # while the daemon stops for too little space
@@ -41,17 +42,20 @@ def leave_free(path, count):
     """Takes all space of the file system at `path` but `count` bytes; the file that holds it."""
     filler = f"{path}/filler"
     with open(filler, "wb") as file:
-        # In pieces: the map of a large file takes space of its own.
+        # In pieces: the map of a large file takes space of its own, and others write meanwhile.
+        piece = PIECE
         while True:
             space = os.statvfs(path)
             excess = space.f_bfree * space.f_frsize - count
             if excess <= 0:
                 return filler
-            size = min(excess, PIECE)
+            size = min(excess, piece)
             try:
                 os.posix_fallocate(file.fileno(), os.fstat(file.fileno()).st_size, size)
             except OSError:
-                return filler
+                if size <= SMALLEST_PIECE:
+                    return filler
+                piece = max(piece // 2, SMALLEST_PIECE)
 
 
 class FullDiskSteps:

@@ -96,7 +96,7 @@ class WatchedTest(IndexTest):
         self.assertTrue(reply["ok"], reply)
         return next(told for told in reply["shares"] if told["name"] == share)
 
-    def sync(self, *shares, seconds=60):
+    def sync(self, *shares, seconds=int(LIMIT)):
         """Until all that happened before is in the index."""
         for share in shares or ("alpha",):
             self.ctl("search", "--share", share, "--wait", "--timeout", str(seconds), "--count", "x")
