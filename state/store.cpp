@@ -62,7 +62,7 @@ void StateStore::Impl::LookAtVersion() {
   int64_t version = 0;
   const bool newer = SchemaVersion(connection->db, version) == SQLITE_OK && version > STATE_VERSION;
   if (newer && !newer_told) {
-    syslog(LOG_ERR, "%s:%d %s; it is used until this program ends", __FILE__, __LINE__,
+    syslog(LOG_ERR, "%s:%d %s; it is used until it is opened anew", __FILE__, __LINE__,
            NewerVersion(connection->path, version).c_str());
   }
   newer_told = newer;

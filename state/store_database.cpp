@@ -84,8 +84,12 @@ bool IsFileOrNothing(const std::string& path) {
   return lstat(path.c_str(), &st) != 0 || S_ISREG(st.st_mode);
 }
 
-// In the place of what was set aside before; a rename alone cannot put a file in a folder's place.
+// In the place of what was set aside before, which stays where there is nothing to set aside. A
+// rename alone cannot put a file in a folder's place.
 bool MoveAside(const std::string& path, const std::string& aside) {
+  if (!Exists(path)) {
+    return true;
+  }
   std::error_code ignored;  // what is in the way still makes the renaming fail
   std::filesystem::remove_all(aside, ignored);
   return rename(path.c_str(), aside.c_str()) == 0 || errno == ENOENT;
@@ -257,11 +261,11 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
   }
   const std::string aside = path + ".damaged";
   if (!MoveAside(path, aside)) {
-    error = Reason("cannot set aside", path);
+    error += "; " + Reason("cannot set aside", path);
     return false;
   }
   if (!MoveAside(path + "-wal", aside + "-wal")) {
-    error = Reason("cannot set aside the log of", path);
+    error += "; " + Reason("cannot set aside the log of", path);
     return false;
   }
   std::error_code ignored;
@@ -351,11 +355,12 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
 
     connection.reset();  // or its closing would write to what is put in place
     const std::string found = error;
+    const std::string kept = Exists(path) ? ", and it is kept as " + path + ".damaged" : "";
     if (!PutCopyInPlace(path, lock, error)) {
       return nullptr;
     }
-    syslog(LOG_ERR, "%s:%d %s; its last copy is used instead, and it is kept as %s.damaged",
-           __FILE__, __LINE__, found.c_str(), path.c_str());
+    syslog(LOG_ERR, "%s:%d %s; its last copy is used instead%s", __FILE__, __LINE__, found.c_str(),
+           kept.c_str());
     recovered = true;
   }
 }
