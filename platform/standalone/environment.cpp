@@ -7,6 +7,7 @@
 #include <map>
 #include <mutex>
 #include <set>
+#include <utility>
 
 #include "platform/log.h"
 #include "state/belonging.h"
@@ -20,7 +21,7 @@ struct Environment {
   std::mutex mutex;
   std::unique_ptr<StateStore> store;
   bool open_failure_told = false;
-  std::set<std::string> failing;  // what the store does not give or take, and a log line has told
+  std::map<std::string, std::string> failing;  // by what the store does not give or take: told why
   std::shared_ptr<const Settings> settings = std::make_shared<Settings>();
   std::map<std::string, bool> commits;  // by share: whether the last one was good
   std::set<std::string> reopening;      // shares with a good commit and no opening since
@@ -56,15 +57,17 @@ void RaiseDescriptorLimit(rlimit& before) {
   (void)setrlimit(RLIMIT_NOFILE, &raised);  // as good as it gets
 }
 
-// Whether a failure is the first since the same last went well. Each pass asks many times.
-bool IsNews(const std::string& what, bool good) {
+// Whether a failure is another one than the last, if the same did not go well since. Each pass asks
+// many times.
+bool IsNews(const std::string& what, bool good, StateStore& store) {
   Environment& process = Process();
   const std::lock_guard guard(process.mutex);
   if (good) {
     process.failing.erase(what);
     return false;
   }
-  return process.failing.insert(what).second;
+  const std::string reason = store.Error();
+  return std::exchange(process.failing[what], reason) != reason;
 }
 
 }  // namespace
@@ -103,7 +106,7 @@ std::shared_ptr<const Settings> CurrentSettings() {
   StateStore* store = Store();
   std::shared_ptr<const Settings> settings;
   const bool read = store != nullptr && store->GetSettings(settings);
-  if (store != nullptr && IsNews("settings", read)) {
+  if (store != nullptr && IsNews("settings", read, *store)) {
     FI_LOG("Failed to read settings: %s", store->Error().c_str());
   }
 
@@ -118,7 +121,7 @@ std::shared_ptr<const Settings> CurrentSettings() {
 ShareStatus StatusOf(const std::string& share) {
   ShareStatus status;
   StateStore* store = Store();
-  if (store != nullptr && IsNews("status of " + share, store->GetStatus(share, status))) {
+  if (store != nullptr && IsNews("status of " + share, store->GetStatus(share, status), *store)) {
     FI_LOG("Failed to read status of share[%s]: %s", share.c_str(), store->Error().c_str());
   }
   return status;
@@ -130,7 +133,7 @@ bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus
     return false;
   }
   const bool changed = store->UpdateStatus(share, change);
-  if (IsNews("change of " + share, changed)) {
+  if (IsNews("change of " + share, changed, *store)) {
     FI_LOG("Failed to store status of share[%s]: %s", share.c_str(), store->Error().c_str());
   }
   return changed;

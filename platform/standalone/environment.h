@@ -17,7 +17,7 @@ namespace fileindexd {
 // it cannot be opened; the next call tries again.
 StateStore* Store();
 
-// What follows tells a failure once, until the same goes well again.
+// Of the three below, each tells a failure once, until the same goes well again or fails otherwise.
 
 // The settings in force. When they cannot be read, the last ones that could, or empty ones.
 std::shared_ptr<const Settings> CurrentSettings();
