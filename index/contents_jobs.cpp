@@ -59,7 +59,7 @@ bool ContentsWriter::Impl::NextAgain(int64_t now, size_t limit, std::vector<Cont
   if (code != SQLITE_OK) {
     return Done(code);
   }
-  const bool more_are_due = !jobs.empty() && unread_due <= now;
+  const bool more_are_due = (!jobs.empty() || round.dropped) && unread_due <= now;
   bool has_more = true;
   for (int i = 0; i < ROUNDS && has_more && jobs.size() < limit && !IsFull(); ++i) {
     round.dropped = false;
@@ -94,6 +94,7 @@ int ContentsWriter::Impl::OfferUnread(int64_t now, Round& round, std::vector<Con
   const auto most = static_cast<int64_t>(MOST_UNREAD + out.size());
   int code = unread_due <= now ? table->UnreadDue(now, most, rows) : SQLITE_OK;
   const size_t limit = std::exchange(round.limit, std::min(round.limit, MOST_UNREAD));
+  round.dropped = false;
   code = code == SQLITE_OK ? OfferSome(rows, round, jobs) : code;
   round.limit = limit;
   return code == SQLITE_OK ? FollowUnread() : code;
@@ -214,7 +215,8 @@ int ContentsWriter::Impl::PutAside(const ContentFile& file) {
   aside.tries = 0;
   aside.unended = 0;
   aside.unreferred_since = Now();
-  return table->Update(file, aside);
+  const int code = table->SetReason(file.id, "");
+  return code == SQLITE_OK ? table->Update(file, aside) : code;
 }
 
 int ContentsWriter::Impl::Remove(const ContentFile& file) {

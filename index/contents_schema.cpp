@@ -13,12 +13,9 @@ static_assert(CONTENTS_APPLICATION == 1179206479 && CONTENTS_VERSION == 3 &&
 
 namespace {
 
-#define ADDITIONS                                                                                \
+#define LATER                                                                                    \
   "CREATE TABLE IF NOT EXISTS later(file INTEGER PRIMARY KEY, due INTEGER NOT NULL);"            \
   "CREATE INDEX IF NOT EXISTS later_by_due ON later(due);"                                       \
-  "DROP INDEX IF EXISTS files_waiting;"                                                          \
-  "CREATE INDEX files_to_read ON files(extractor, " WAITING_ORDER                                \
-  ") WHERE state = 0;"                                                                           \
   "UPDATE files SET state = 1, tries = 0, reason = ''"                                           \
   " WHERE state >= 2 AND state = 2 AND extractor = 0;"                                           \
   "UPDATE counts SET waiting = 0, done = 0, failed = 0;"                                         \
@@ -28,6 +25,10 @@ namespace {
   " sum(state = 0), sum(state = 1), sum(state >= 2) FROM files WHERE true GROUP BY counted"      \
   " ON CONFLICT(kind) DO UPDATE SET"                                                             \
   " waiting = excluded.waiting, done = excluded.done, failed = excluded.failed;"
+
+#define TO_READ                         \
+  "DROP INDEX IF EXISTS files_waiting;" \
+  "CREATE INDEX files_to_read ON files(extractor, " WAITING_ORDER ") WHERE state = 0;"
 
 // AUTOINCREMENT: what was handed out and ends after its row is gone must not meet another file.
 constexpr const char* CONTENTS_SCHEMA = R"sql(
@@ -85,7 +86,7 @@ CREATE TABLE meta(
 INSERT INTO meta VALUES(1, '', '', 0, 0, 0, 0, 9223372036854775807, 0, '', 0);
 PRAGMA application_id = 1179206479;
 PRAGMA user_version = 3;
-)sql" ADDITIONS;
+)sql" LATER TO_READ;
 
 }  // namespace
 
@@ -99,7 +100,9 @@ const DatabaseForm CONTENTS_FORM = {
     .prepare = RegisterTextTokenizer,
 };
 
-const char* const CONTENTS_ADDITIONS = "BEGIN IMMEDIATE;" ADDITIONS "COMMIT";
+const std::array<ContentsAddition, 2> CONTENTS_ADDITIONS = {
+    {{"later", "BEGIN IMMEDIATE;" LATER "COMMIT"},
+     {"files_to_read", "BEGIN IMMEDIATE;" TO_READ "COMMIT"}}};
 
 const char* const NUMBER_COLUMNS =
     "pages, created, sent, taken, recorded, year, track, duration, bit_rate, width, height, "

@@ -47,7 +47,8 @@
 //             were merged
 //   new_words what `words` becomes once it holds all texts: questions ask the old ones until then
 //   words_to_be  one row while that is made: the language and the version of what is made
-//   old_words what `words` was, while it is taken away; with a number, what comes after it
+//   old_words words that nobody wants any more, while they are taken away; with a number, those
+//             whose turn comes later
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizer, or of the text that is given to it is a new version.
@@ -82,8 +83,13 @@ constexpr int64_t ALL_WORDS = INT64_MAX;  // meta.reworded when nothing is being
 // smallest. An index has these expressions.
 #define WAITING_ORDER "tries + unended, mtime / 60000000000 DESC, size"
 
-// What databases made by earlier builds of this version lack. Whoever only reads needs none of it.
-extern const char* const CONTENTS_ADDITIONS;
+// What databases made by earlier builds of this version lack: what there is of that name where it
+// was added, and the statements that add it. Whoever only reads needs none of it.
+struct ContentsAddition {
+  const char* name;
+  const char* sql;
+};
+extern const std::array<ContentsAddition, 2> CONTENTS_ADDITIONS;
 
 // The columns of the number fields, in their order, separated by ", ".
 extern const char* const NUMBER_COLUMNS;

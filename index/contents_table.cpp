@@ -65,9 +65,13 @@ bool IsNotKept(const ContentFile& file) {
 }
 
 int ContentsTable::Complete() {
-  bool is_complete = false;
-  const int code = Exists("files_to_read", is_complete);
-  return code != SQLITE_OK || is_complete ? code : Execute(handle, CONTENTS_ADDITIONS);
+  int code = SQLITE_OK;
+  for (const ContentsAddition& addition : CONTENTS_ADDITIONS) {
+    bool is_there = false;
+    code = code == SQLITE_OK ? Exists(addition.name, is_there) : code;
+    code = code == SQLITE_OK && !is_there ? Execute(handle, addition.sql) : code;
+  }
+  return code;
 }
 
 int ContentsTable::Prepare(sqlite3* db) {

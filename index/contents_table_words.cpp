@@ -196,7 +196,7 @@ int ContentsTable::Reword(bool& more) {
   }
   bool has_texts = false;
   code = MakeNewWords(has_texts);
-  // There is one table of old words at most.
+  // The name that its words go by then has to be free.
   return code == SQLITE_OK && !has_texts && !has_old_words ? ReplaceWords() : code;
 }
 

@@ -37,8 +37,8 @@ class ContentsWriter {
   ~ContentsWriter();
 
   // Opens the share's contents beside its entries, and makes them where they are missing, of
-  // another schema or another file system, or damaged (then a copy is set aside). Entries that are
-  // missing are PATH_NOT_FOUND.
+  // another file system, or of another schema or damaged (then a copy is set aside). Entries that
+  // are missing are PATH_NOT_FOUND.
   IndexError Open(const Share& share, int64_t extractor_version);
   void Close();
   bool IsOpen() const;

@@ -112,7 +112,7 @@ IndexError JudgeStranger(sqlite3* db, const std::string& name, bool other_progra
   int64_t tables = 0;
   const int code = ReadNumber(db, "SELECT count(*) FROM " + name + ".sqlite_schema", tables);
   if (code != SQLITE_OK) {
-    return FromSqlite(code);
+    return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
   }
 
   if (tables > 0) {

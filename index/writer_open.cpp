@@ -98,6 +98,7 @@ IndexError EntryWriter::Impl::EnsureOpen(bool at_once) {
   }
 
   const IndexError error = TryOpen(false);
+  loss_told = loss_told && error != IndexError::NONE;
   return error == IndexError::PATH_NOT_FOUND ? Reopen() : error;
 }
 
