@@ -11,9 +11,9 @@ namespace fileindexd::fault {
 
 // Runs `story` in a process and a folder of its own for every call of the kind that it makes, with
 // that call failing; it arms and disarms by itself, with the number that it is given. A process
-// that dies, hangs, or has a failed expectation fails the test, and so does it when more than a
-// tenth of the stories end before their call. Where all would be too many for the usual scale, so
-// many are taken at even distances.
+// that dies, hangs, or has a failed expectation fails the test, and so does it when a story ends
+// before its call, but for the last quarter of them. Where all would be too many for the usual
+// scale, so many are taken at even distances.
 void ForEachCall(const Fault& fault, const std::function<void(int nth)>& story);
 
 }  // namespace fileindexd::fault
