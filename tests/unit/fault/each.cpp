@@ -26,7 +26,8 @@ constexpr int FAILED = 1;
 constexpr int DID_NOT_STRIKE = 2;
 constexpr size_t AT_ONCE = 4;  // the test is not alone on the machine
 constexpr int USUAL_SCALE = 8;
-constexpr int USUAL_SCALE_OF_LASTING = 3;  // a Worker waits in between
+constexpr int USUAL_SCALE_OF_LASTING = 3;   // a Worker waits in between
+constexpr int LONG_SCALE_OF_MEMORY = 2000;  // of tens of thousands: all would take hours
 // Of the last quarter of the calls, some may not come: how often a Worker looks at something varies
 // with the time that it is given.
 constexpr int QUARTERS_THAT_COME = 3;
@@ -34,6 +35,13 @@ constexpr int QUARTERS_THAT_COME = 3;
 bool IsLong() {
   const char* scale = getenv("FILEINDEXD_TEST_SCALE");  // NOLINT(concurrency-mt-unsafe): read only
   return scale != nullptr && std::string_view(scale) == "long";
+}
+
+int MostStories(const Fault& fault) {
+  if (IsLong()) {
+    return fault.call == Call::MEMORY ? LONG_SCALE_OF_MEMORY : INT_MAX;
+  }
+  return fault.times == FOR_EVER ? USUAL_SCALE_OF_LASTING : USUAL_SCALE;
 }
 
 // In memory where there is a place for it: these stories sync a lot.
@@ -150,8 +158,7 @@ void ForEachCall(const Fault& fault, const std::function<void(int)>& story) {
   const int count = runs.Count();
   ASSERT_GT(count, 0) << "the story makes no such call";
 
-  const int usual = fault.times == FOR_EVER ? USUAL_SCALE_OF_LASTING : USUAL_SCALE;
-  const int step = IsLong() ? 1 : std::max(1, count / usual);
+  const int step = std::max(1, count / MostStories(fault));
   int told = 0;
   for (int nth = 1; nth <= count; nth += step) {
     runs.Start(nth);
