@@ -47,10 +47,7 @@ void Live(const Fault& fault, int nth) {
   world.Burst();
   Disarm();
 
-  EXPECT_TRUE(world.HaveWorker());
-  world.Touch();
-  world.Burst();
-  world.ExpectWhole();
+  world.ExpectMadeGoodByATouch();
   ExpectEachOperationLogged();
 }
 

@@ -62,10 +62,7 @@ void Shrink(const Fault& fault, int nth) {
   world.Burst();
   Disarm();
 
-  EXPECT_TRUE(world.HaveWorker());
-  world.Touch();
-  world.Burst();
-  world.ExpectWhole();
+  world.ExpectMadeGoodByATouch();
   ExpectEachOperationLogged();
   EXPECT_LT(RemovedCount().Get(), MANY);
 }

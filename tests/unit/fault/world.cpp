@@ -160,6 +160,13 @@ void World::AskForReindex() {
   Touch();
 }
 
+void World::ExpectMadeGoodByATouch() {
+  EXPECT_TRUE(HaveWorker());
+  Touch();
+  Burst();
+  ExpectWhole();
+}
+
 void World::ExpectWhole() {
   ExpectStatusClear();
   ExpectNoDifference();

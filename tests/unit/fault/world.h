@@ -30,6 +30,8 @@ class World {
 
   // Index, queue and status are as they have to be once all is done.
   void ExpectWhole();
+  // After a fault has passed.
+  void ExpectMadeGoodByATouch();
 
   std::string root;
   std::string state_root;

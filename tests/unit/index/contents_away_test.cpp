@@ -157,6 +157,7 @@ TEST_F(ContentsAwayTest, WhatTheDiskDoesNotGiveIsKeptWithoutAnEntryToo) {
   ASSERT_TRUE(contents->Commit());
   EXPECT_EQ(Holding("olda"), 1);
   EXPECT_EQ(contents->UnreadDue(), INT64_MAX);
+  EXPECT_EQ(Number("SELECT count(*) FROM files WHERE reason <> ''"), 0) << "it is done";
 
   BringBack("a.txt");
   TakeIn();

@@ -119,6 +119,12 @@ void ContentsTest::SetTime(const std::string& path, time_t mtime) {
   ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
 }
 
+void ContentsTest::WriteHidden(const std::string& name) {
+  WriteFile(At(name), "bytea");
+  SetTime(At(name), 1000);
+  Add(name);
+}
+
 void ContentsTest::Finish(const std::string& name, const std::string& text) {
   EXPECT_TRUE(contents->Finish(JobOf(name).file, TextContent(text)))
       << IndexErrorText(contents->Error());

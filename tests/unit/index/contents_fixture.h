@@ -35,6 +35,8 @@ class ContentsTest : public IndexTest {
   // The same, taken in and read, with "old" and its name as its text.
   void ReadOldFile(const std::string& name, time_t mtime, const std::string& bytes = "bytes");
   static void SetTime(const std::string& path, time_t mtime);
+  // Other bytes in what OldFile(name, 1000) made, with the same size and time; added.
+  void WriteHidden(const std::string& name);
   void Finish(const std::string& name, const std::string& text);
   // Hands out all that waits, and finishes each with its own name as its text.
   Names Read();

@@ -113,9 +113,7 @@ TEST_F(ContentsIntakeTest, AddWithAnotherChangeTimeReadsAnewAnUpdateOnlyStoresIt
   TakeIn();
   EXPECT_EQ(Jobs(), Names()) << "updated";
 
-  WriteFile(At("a.txt"), "bytea");
-  SetTime(At("a.txt"), 1000);
-  Add("a.txt");
+  WriteHidden("a.txt");
   Commit();
   contents->LookAtAll();
   TakeIn();
@@ -134,9 +132,7 @@ TEST_F(ContentsIntakeTest, WriteThatIsHiddenBehindAChangeOfModeIsReadAnew) {
   TakeIn();
   ASSERT_EQ(Read(), Names({"a.txt"}));
 
-  WriteFile(At("a.txt"), "bytea");
-  SetTime(At("a.txt"), 1000);
-  Add("a.txt");
+  WriteHidden("a.txt");
   Commit();
   ASSERT_EQ(chmod(At("a.txt").c_str(), 0640), 0);
   Refresh("a.txt");
@@ -201,9 +197,7 @@ TEST_F(ContentsIntakeTest, WritesAreSeenWhateverSliceTheyFallInto) {
   TakeIn();
   ASSERT_EQ(Read().size(), names.size());
   for (const std::string& name : names) {
-    WriteFile(At(name), "bytea");
-    SetTime(At(name), 1000);
-    Add(name);
+    WriteHidden(name);
   }
   for (const std::string& name : names) {
     ASSERT_EQ(chmod(At(name).c_str(), 0640), 0);

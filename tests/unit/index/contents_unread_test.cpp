@@ -2,6 +2,7 @@
 // Files whose bytes the disk does not give.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <ctime>
 
@@ -66,6 +67,33 @@ TEST_F(ContentsUnreadTest, ThoseOfOneMomentAreAllTriedAgain) {
   }
 }
 
+TEST_F(ContentsUnreadTest, ThoseThatLostTheirEntriesHoldNoneUpThatIsDue) {
+  constexpr size_t FILES = 10;  // more than are given out at once
+  for (size_t i = 0; i < FILES; ++i) {
+    File("f" + std::to_string(i) + ".txt");
+  }
+  Names all = Jobs();
+  ASSERT_EQ(all.size(), FILES);
+  for (const std::string& name : all) {
+    Unread(name);
+    ++clock;
+  }
+  clock += HOUR;
+  const std::string last = all.back();
+  all.pop_back();
+  for (const std::string& name : all) {
+    ASSERT_EQ(unlink(At(name).c_str()), 0);
+    Delete(name);
+  }
+  Commit();
+
+  Names given = Jobs();
+  while (given.empty() && more_jobs) {
+    given = Jobs();
+  }
+  EXPECT_EQ(given, Names({last}));
+}
+
 TEST_F(ContentsUnreadTest, AKillDoesNotPutATryOff) {
   File("a.txt");
   ASSERT_EQ(Jobs(), Names({"a.txt"}));
@@ -121,9 +149,7 @@ TEST_F(ContentsUnreadTest, AfterAWriteThatHidItselfItsPausesGoOnWhateverElseChan
   OldFile("a.txt", 1000);
   TakeIn();
   ASSERT_EQ(Read(), Names({"a.txt"}));
-  WriteFile(At("a.txt"), "bytea");
-  SetTime(At("a.txt"), 1000);
-  Add("a.txt");
+  WriteHidden("a.txt");
   Commit();
   contents->LookAtAll();
   TakeIn();

@@ -158,6 +158,17 @@ TEST_F(DatabaseTest, DatabaseOfAnotherProgramIsSetAsideThenRebuilt) {
   EXPECT_EQ(RowsIn(DamagedIndexPath("s"), "t"), 1);
 }
 
+TEST_F(DatabaseTest, DatabaseOfAnotherProgramThatCannotBeReadIsSetAsideThenRebuilt) {
+  RemoveTree(index);
+  MakeFolder(index);
+  Run("sqlite3 " + file + " 'CREATE TABLE t(a); INSERT INTO t VALUES(1)'");
+  std::string bytes = ReadFile(file);
+  bytes[47] = 99;  // the schema's format, which no SQLite knows
+  WriteFile(file, bytes);
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(ReadFile(DamagedIndexPath("s") + "/entries.db"), bytes);
+}
+
 TEST_F(DatabaseTest, DatabaseWithoutAnyTableIsMissedThenRebuilt) {
   RemoveTree(index);
   MakeFolder(index);

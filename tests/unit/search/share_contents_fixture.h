@@ -57,6 +57,13 @@ class ShareContentsTest : public StateTest {
   int64_t Wall() const {
     return WALL + std::chrono::duration_cast<std::chrono::seconds>(now - BEGIN).count();
   }
+  void ReadTheOne() {
+    const auto ids = GiveOut();
+    ASSERT_EQ(ids.size(), 1U);
+    End(ids[0], ExtractOutcome::Result::DONE);
+    Pass(std::chrono::seconds(1));
+    EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+  }
   // Second by second, with nothing to read.
   void Wait(int seconds_long) {
     for (int second = 0; second < seconds_long; ++second) {
