@@ -57,17 +57,21 @@ void RaiseDescriptorLimit(rlimit& before) {
   (void)setrlimit(RLIMIT_NOFILE, &raised);  // as good as it gets
 }
 
-// Whether a failure is another one than the last, if the same did not go well since. Each pass asks
-// many times.
-bool IsNews(const std::string& what, bool good, StateStore& store) {
+// Whether a failure is another one than the last, if the same did not go well since. Asked several
+// times for each file.
+bool IsNews(const char* what, const std::string& share, bool good, StateStore& store) {
   Environment& process = Process();
   const std::lock_guard guard(process.mutex);
+  if (good && process.failing.empty()) {
+    return false;
+  }
+  const std::string name = what + share;
   if (good) {
-    process.failing.erase(what);
+    process.failing.erase(name);
     return false;
   }
   const std::string reason = store.Error();
-  return std::exchange(process.failing[what], reason) != reason;
+  return std::exchange(process.failing[name], reason) != reason;
 }
 
 }  // namespace
@@ -106,7 +110,7 @@ std::shared_ptr<const Settings> CurrentSettings() {
   StateStore* store = Store();
   std::shared_ptr<const Settings> settings;
   const bool read = store != nullptr && store->GetSettings(settings);
-  if (store != nullptr && IsNews("settings", read, *store)) {
+  if (store != nullptr && IsNews("settings", "", read, *store)) {
     FI_LOG("Failed to read settings: %s", store->Error().c_str());
   }
 
@@ -121,7 +125,7 @@ std::shared_ptr<const Settings> CurrentSettings() {
 ShareStatus StatusOf(const std::string& share) {
   ShareStatus status;
   StateStore* store = Store();
-  if (store != nullptr && IsNews("status of " + share, store->GetStatus(share, status), *store)) {
+  if (store != nullptr && IsNews("status of ", share, store->GetStatus(share, status), *store)) {
     FI_LOG("Failed to read status of share[%s]: %s", share.c_str(), store->Error().c_str());
   }
   return status;
@@ -133,7 +137,7 @@ bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus
     return false;
   }
   const bool changed = store->UpdateStatus(share, change);
-  if (IsNews("change of " + share, changed, *store)) {
+  if (IsNews("change of ", share, changed, *store)) {
     FI_LOG("Failed to store status of share[%s]: %s", share.c_str(), store->Error().c_str());
   }
   return changed;
