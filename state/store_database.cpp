@@ -260,6 +260,10 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
     return false;
   }
   const std::string aside = path + ".damaged";
+  std::error_code ignored;
+  if (Exists(path)) {
+    std::filesystem::remove_all(aside + "-wal", ignored);  // of what was set aside before
+  }
   if (!MoveAside(path, aside)) {
     error += "; " + Reason("cannot set aside", path);
     return false;
@@ -268,7 +272,6 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
     error += "; " + Reason("cannot set aside the log of", path);
     return false;
   }
-  std::error_code ignored;
   std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
   if (!WriteSafely(path, image, error)) {
     return false;

@@ -216,6 +216,19 @@ class StateTest(IndexTest):
         with open(FILE + ".damaged", "rb") as file:
             self.assertEqual(file.read(), damaged)
 
+    def test_a_log_that_was_set_aside_does_not_stay_beside_another_database(self):
+        self.prepare()
+        self.stop(self.pid)
+        remove(FILE + "-wal")
+        scribble(FILE)
+        with open(FILE + ".damaged-wal", "wb") as log:
+            log.write(b"of an older one")
+
+        self.ctl("share", "list")
+
+        self.assertTrue(os.path.exists(FILE + ".damaged"))
+        self.assertFalse(os.path.exists(FILE + ".damaged-wal"))
+
     def test_newer_version_is_refused_by_name(self):
         self.prepare()
         self.stop(self.pid)
