@@ -39,6 +39,7 @@ const DatabaseForm BARE_FORM = {
     .schema = BARE_SCHEMA,
     .probe = "count(*)",
     .probed = "entries WHERE id < 0",
+    .stamp = nullptr,
     .prepare = RegisterTextTokenizer,
 };
 

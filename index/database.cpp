@@ -8,10 +8,13 @@
 #include <sys/stat.h>
 
 #include <cerrno>
+#include <filesystem>
 #include <optional>
+#include <system_error>
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "index/last_commit.h"
 #include "index/log_check.h"
 #include "index/schema.h"
 #include "index/set_aside.h"
@@ -87,6 +90,24 @@ bool IsFileOrNothing(const std::string& path) {
   return lstat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
 }
 
+// Whether what stands in a database's place, and is none, holds something all the same: a file in
+// that of its folder, a folder with something in it, a log beside an empty file.
+bool HoldsSomething(const std::string& index_path, const std::string& file) {
+  struct stat status {};
+  if (lstat(index_path.c_str(), &status) == 0 && S_ISREG(status.st_mode)) {
+    return status.st_size > 0;
+  }
+  if (lstat(file.c_str(), &status) != 0) {
+    return false;
+  }
+  if (S_ISDIR(status.st_mode)) {
+    std::error_code error;
+    return !std::filesystem::is_empty(file, error) && !error;
+  }
+  return S_ISREG(status.st_mode) && lstat((file + "-wal").c_str(), &status) == 0 &&
+         S_ISREG(status.st_mode) && status.st_size > 0;
+}
+
 // NONE when a regular file stands where the database should be, and nothing but files beside it.
 IndexError FindFile(const std::string& index_path, const std::string& file) {
   struct stat status {};
@@ -121,6 +142,10 @@ IndexError JudgeStranger(sqlite3* db, const std::string& name, bool other_progra
   return IndexError::PATH_NOT_FOUND;
 }
 
+std::string Ask(const char* what, const std::string& name, const DatabaseForm& form) {
+  return std::string("SELECT ") + what + " FROM " + name + "." + form.probed;
+}
+
 // Whether the open database of that name is ours. Cheap: two numbers and the schema's text. `flaw`
 // is set for one that counts as none, and yet holds something.
 IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm& form,
@@ -139,8 +164,7 @@ IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm&
     return JudgeStranger(db, name, application != form.application, flaw);
   }
 
-  code = ReadNumber(db, std::string("SELECT ") + form.probe + " FROM " + name + "." + form.probed,
-                    answer);
+  code = ReadNumber(db, Ask(form.probe, name, form), answer);
   // Our numbers without our tables: somebody's knife.
   return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }
@@ -149,6 +173,9 @@ IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
                         const char* pragmas, sqlite3*& db, std::optional<IndexFlaw>& flaw) {
   const std::string file = index_path + "/" + form.file;
   const IndexError found = FindFile(index_path, file);
+  if (found == IndexError::PATH_NOT_FOUND && HoldsSomething(index_path, file)) {
+    flaw = IndexFlaw::DAMAGED;
+  }
   if (found != IndexError::NONE) {
     return found;
   }
@@ -168,6 +195,23 @@ IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
     sqlite3_close_v2(std::exchange(db, nullptr));
   }
   return error;
+}
+
+// Whether commits are missing from what was opened for writing.
+IndexError CheckCommits(sqlite3* db, const std::string& file, const DatabaseForm& form) {
+  if (HasLostCommits(db)) {
+    return IndexError::DAMAGED;
+  }
+  if (form.stamp == nullptr) {
+    return IndexError::NONE;
+  }
+
+  int64_t last = 0;
+  const int code = ReadNumber(db, Ask(form.stamp, "main", form), last);
+  if (code != SQLITE_OK) {
+    return FromSqlite(code);
+  }
+  return LacksNotedCommit(file, last) ? IndexError::DAMAGED : IndexError::NONE;
 }
 
 IndexError FromErrno() {
@@ -270,9 +314,11 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
   has_set_aside = false;
   std::optional<IndexFlaw> flaw;
   IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db, flaw);
-  if (error == IndexError::NONE && HasLostCommits(db)) {
-    Close();
-    error = IndexError::DAMAGED;
+  if (error == IndexError::NONE) {
+    error = CheckCommits(db, index_path + "/" + form.file, form);
+    if (error != IndexError::NONE) {
+      Close();
+    }
   }
   if (error == IndexError::DAMAGED) {
     flaw = IndexFlaw::DAMAGED;

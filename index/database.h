@@ -33,6 +33,7 @@ struct DatabaseForm {
   const char* schema;           // makes the tables in an empty database, and sets both numbers
   const char* probe;            // a number that only our tables give, and
   const char* probed;           // the rows to ask for it
+  const char* stamp;            // of these: what each commit lets grow; null: no note is kept of it
   int (*prepare)(sqlite3* db);  // what the tables need of a connection; null: nothing
 };
 
@@ -53,8 +54,8 @@ class IndexDatabase {
   // For writing, exclusive of other writers by SQLite's own locks. With `create` a missing database
   // is made, and one that is there and cannot be used (damaged, of another schema version or
   // another program, without tables, a directory or a pipe in its place) is replaced. Without it
-  // these are PATH_NOT_FOUND. Either way what holds tables, or once did, has been set aside, one
-  // copy, at most once an hour.
+  // these are PATH_NOT_FOUND. Either way what holds something has been set aside, one copy, at most
+  // once an hour.
   IndexError OpenForWriting(const std::string& index_path, bool create,
                             const DatabaseForm& form = ENTRIES_FORM);
   // For reading; never creates, moves or repairs anything.

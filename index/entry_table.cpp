@@ -139,7 +139,7 @@ int EntryTable::Begin() {
 }
 
 int EntryTable::Commit(int64_t now) {
-  write_meta.BindInts({entries, now, removed, last_written});
+  write_meta.BindInts({entries, now, removed, NextStamp()});  // larger also after removals alone
   int code = write_meta.Run();
   if (code == SQLITE_OK) {
     code = GiveBackPages();

@@ -47,6 +47,7 @@ class EntryTable {
   int Begin();
   // Writes the number of entries and the time into `meta`, and commits.
   int Commit(int64_t now);
+  int64_t LastStamp() const { return last_written; }
   void Rollback();
 
   int Find(const std::string& path, Entry& entry, bool& found);
@@ -90,7 +91,7 @@ class EntryTable {
   Statement insert_name, insert_part, remove_name, remove_part;
   NameFolder folder;
   int64_t removed = 0;       // rows since room was last given back, the same
-  int64_t last_written = 0;  // of all rows there ever were, the same
+  int64_t last_written = 0;  // of all rows there ever were, and of commits, the same
 };
 
 }  // namespace fileindexd

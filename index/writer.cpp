@@ -6,6 +6,7 @@
 #include <exception>
 #include <utility>
 
+#include "index/last_commit.h"
 #include "index/shrink.h"
 #include "index/writer_impl.h"
 #include "state/belonging.h"
@@ -277,7 +278,11 @@ IndexError EntryWriter::Impl::CommitTransaction() {
   }
 
   const int code = table->Commit(static_cast<int64_t>(time(nullptr)));
-  return code == SQLITE_OK ? IndexError::NONE : FailSql(FromSqlite(code));
+  if (code != SQLITE_OK) {
+    return FailSql(FromSqlite(code));
+  }
+  NoteLastCommit(sqlite3_db_filename(database.db, "main"), table->LastStamp());
+  return IndexError::NONE;
 }
 
 IndexError EntryWriter::Impl::Commit() {

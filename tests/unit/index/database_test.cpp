@@ -116,16 +116,41 @@ TEST_F(DatabaseTest, EmptyFileIsMissedThenRebuilt) {
   ExpectMissedThenRebuilt();
 }
 
-TEST_F(DatabaseTest, PlainFileInPlaceOfTheFolderIsMissedThenRebuilt) {
+TEST_F(DatabaseTest, EmptyFileBesideAFullLogIsSetAsideThenRebuilt) {
+  const std::string log = ReadFile(file + "-wal");
+  ASSERT_FALSE(log.empty());
+  WriteFile(file, "");
+  ExpectMissedThenRebuilt();
+  EXPECT_TRUE(ReadFile(DamagedIndexPath("s") + "/entries.db-wal") == log);
+}
+
+TEST_F(DatabaseTest, PlainFileInPlaceOfTheFolderIsSetAsideThenRebuilt) {
   RemoveTree(index);
   WriteFile(index, "x");
   ExpectMissedThenRebuilt();
+  EXPECT_EQ(ReadFile(DamagedIndexPath("s")), "x");
+}
+
+TEST_F(DatabaseTest, EmptyFileInPlaceOfTheFolderIsMissedThenRebuilt) {
+  RemoveTree(index);
+  WriteFile(index, "");
+  ExpectMissedThenRebuilt();
+  EXPECT_FALSE(Exists(DamagedIndexPath("s")));
 }
 
 TEST_F(DatabaseTest, DirectoryInPlaceOfTheFileIsMissedThenRebuilt) {
   RemoveTree(file);
-  MakeFolder(file + "/x");
+  MakeFolder(file);
   ExpectMissedThenRebuilt();
+  EXPECT_FALSE(Exists(DamagedIndexPath("s")));
+}
+
+TEST_F(DatabaseTest, FullDirectoryInPlaceOfTheFileIsSetAsideThenRebuilt) {
+  RemoveTree(file);
+  MakeFolder(file);
+  WriteFile(file + "/x", "y");
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(ReadFile(DamagedIndexPath("s") + "/entries.db/x"), "y");
 }
 
 TEST_F(DatabaseTest, PipeInPlaceOfTheFileIsMissedThenRebuilt) {
@@ -205,6 +230,56 @@ TEST_F(DatabaseTest, DatabaseWithoutItsTablesIsSetAsideThenRebuilt) {
   Run("sqlite3 " + file + " 'DROP TABLE entries'");
   ExpectMissedThenRebuilt();
   EXPECT_TRUE(Exists(DamagedIndexPath("s")));
+}
+
+// What is left is sound, and of an earlier moment.
+TEST_F(DatabaseTest, DatabaseWhoseLogIsGoneIsSetAsideThenRebuilt) {
+  RemoveTree(file + "-wal");
+  const std::string left = ReadFile(file);
+  ExpectMissedThenRebuilt();
+  EXPECT_TRUE(ReadFile(DamagedIndexPath("s") + "/entries.db") == left);
+}
+
+TEST_F(DatabaseTest, DatabaseWhoseLogLostItsLastCommitIsSetAsideThenRebuilt) {
+  const auto before = static_cast<off_t>(std::filesystem::file_size(file + "-wal"));
+  OpenWriter();
+  WriteFile(At("b"), "");
+  AddAll();
+  writer.reset();
+  ASSERT_GT(static_cast<off_t>(std::filesystem::file_size(file + "-wal")), before);
+  ASSERT_EQ(truncate((file + "-wal").c_str(), before), 0);
+  ExpectMissedThenRebuilt();
+  EXPECT_EQ(RowsIn(DamagedIndexPath("s"), "entries"), 2);
+}
+
+// The log was copied back before it went, as other programs do when they close the database.
+TEST_F(DatabaseTest, DatabaseWhoseLogWasCopiedBackGoesOn) {
+  Run("sqlite3 " + file + " 'PRAGMA wal_checkpoint(TRUNCATE)'");
+  RemoveTree(file + "-wal");
+  RemoveTree(file + "-shm");
+  OpenWriter();
+  ASSERT_TRUE(writer->IsOpen()) << IndexErrorText(writer->last_error);
+  EXPECT_EQ(Held(), Names({"", "a"}));
+}
+
+TEST_F(DatabaseTest, NoteOfTheLastCommitThatIsNoneCountsForNothing) {
+  const std::string note = file + "-last";
+  const std::string good = ReadFile(note);
+  ASSERT_EQ(good.size(), 20U);
+  for (const std::string& text : {std::string(), std::string("9999999999999999999\n"),
+                                  good.substr(0, 19), std::string(20, '\0'), good + "x"}) {
+    WriteFile(note, text);
+    OpenWriter();
+    ASSERT_TRUE(writer->IsOpen()) << text;
+    writer.reset();
+  }
+  RemoveTree(note);
+  ASSERT_EQ(mkfifo(note.c_str(), 0600), 0);
+  OpenWriter();
+  ASSERT_TRUE(writer->IsOpen());
+  WriteFile(At("b"), "");
+  AddAll();
+  EXPECT_EQ(Held(), Names({"", "a", "b"}));
 }
 
 TEST_F(DatabaseTest, SecondDamageWithinTheHourKeepsTheFirstCopy) {
