@@ -84,12 +84,6 @@ void KeepLog(sqlite3* db, const char* name) {
   sqlite3_file_control(db, name, SQLITE_FCNTL_PERSIST_WAL, &persist);
 }
 
-// SQLite would wait for ever in a pipe, and fails without end at a folder.
-bool IsFileOrNothing(const std::string& path) {
-  struct stat status {};
-  return lstat(path.c_str(), &status) != 0 || S_ISREG(status.st_mode);
-}
-
 // Whether what stands in a database's place, and is none, holds something all the same: a file in
 // that of its folder, a folder with something in it, a log beside an empty file.
 bool HoldsSomething(const std::string& index_path, const std::string& file) {

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "state/sqlite.h"
 
+#include <sys/stat.h>
+
 namespace fileindexd {
 
 namespace {
@@ -51,6 +53,11 @@ std::string Statement::Bytes(int column) const {
     return {};
   }
   return {static_cast<const char*>(bytes), static_cast<size_t>(size)};
+}
+
+bool IsFileOrNothing(const std::string& path) {
+  struct stat st {};
+  return lstat(path.c_str(), &st) != 0 || S_ISREG(st.st_mode);
 }
 
 int QuickCheck(sqlite3* db, bool& ok) {

@@ -20,6 +20,10 @@ inline int StepError(int code) {
 // Statements separated by ';', whose rows nobody wants.
 int Execute(sqlite3* db, const char* sql);
 
+// Whether a regular file or nothing stands there. SQLite would wait for ever in a pipe, and fails
+// without end at a folder.
+bool IsFileOrNothing(const std::string& path);
+
 // A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
 class Statement {
  public:

@@ -5,6 +5,7 @@
 #include <cstdlib>
 
 #include "state/layout.h"
+#include "state/store_copy.h"
 #include "state/store_impl.h"
 
 namespace fileindexd {

@@ -2,29 +2,21 @@
 #include "state/store_database.h"
 
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <syslog.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
-#include <cstring>
-#include <filesystem>
-#include <system_error>
-#include <thread>
 
 #include "base/scoped_fd.h"
 #include "state/layout.h"
+#include "state/store_copy.h"
 
 namespace fileindexd {
 
 namespace {
 
 constexpr int BUSY_WAIT_MS = 5000;
-constexpr std::chrono::milliseconds LOCK_WAIT(BUSY_WAIT_MS);
-constexpr std::chrono::milliseconds LOCK_NAP(5);
 
 // UPGRADES[n] leads from version n to n + 1. Paths and names are bytes, hence BLOB.
 constexpr const char* UPGRADES[STATE_VERSION] = {
@@ -46,53 +38,8 @@ constexpr const char* UPGRADES[STATE_VERSION] = {
 
 enum class Opened { GOOD, DAMAGED, FAILED };
 
-std::string Reason(const std::string& what, const std::string& path) {
-  return what + " " + path + ": " + strerror(errno);  // NOLINT: glibc's is safe
-}
-
 bool IsDamage(int result) {
   return (result & 0xff) == SQLITE_CORRUPT || (result & 0xff) == SQLITE_NOTADB;
-}
-
-// The lock on the state root, waited for 5 s at most.
-bool LockRoot(const std::string& root, ScopedFd& lock, std::string& error) {
-  ScopedFd folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (folder.fd < 0) {
-    error = Reason("cannot open", root);
-    return false;
-  }
-  const auto deadline = std::chrono::steady_clock::now() + LOCK_WAIT;
-  while (flock(folder.fd, LOCK_EX | LOCK_NB) != 0) {
-    if ((errno != EWOULDBLOCK && errno != EINTR) || std::chrono::steady_clock::now() >= deadline) {
-      error = Reason("cannot lock", root);
-      return false;
-    }
-    std::this_thread::sleep_for(LOCK_NAP);
-  }
-  lock.Swap(folder);
-  return true;
-}
-
-bool Exists(const std::string& path) {
-  struct stat st {};
-  return lstat(path.c_str(), &st) == 0;
-}
-
-// SQLite would wait for ever in a pipe.
-bool IsFileOrNothing(const std::string& path) {
-  struct stat st {};
-  return lstat(path.c_str(), &st) != 0 || S_ISREG(st.st_mode);
-}
-
-// In the place of what was set aside before, which stays where there is nothing to set aside. A
-// rename alone cannot put a file in a folder's place.
-bool MoveAside(const std::string& path, const std::string& aside) {
-  if (!Exists(path)) {
-    return true;
-  }
-  std::error_code ignored;  // what is in the way still makes the renaming fail
-  std::filesystem::remove_all(aside, ignored);
-  return rename(path.c_str(), aside.c_str()) == 0 || errno == ENOENT;
 }
 
 // SQLite would make the file with the mode that the umask leaves. Its log and its shared memory
@@ -103,18 +50,14 @@ bool MakeFile(const std::string& path, std::string& error) {
     if (errno == EEXIST) {
       return true;
     }
-    error = Reason("cannot create", path);
+    error = StateFileError("cannot create", path);
     return false;
   }
   if (fchmod(file.fd, 0600) != 0) {
-    error = Reason("cannot set the mode of", path);
+    error = StateFileError("cannot set the mode of", path);
     return false;
   }
   return true;
-}
-
-int Exec(const StateConnection& connection, const char* sql) {
-  return sqlite3_exec(connection.db, sql, nullptr, nullptr, nullptr);
 }
 
 Opened Failed(const StateConnection& connection, const char* what, int result, std::string& error) {
@@ -123,16 +66,16 @@ Opened Failed(const StateConnection& connection, const char* what, int result, s
 }
 
 Opened Upgrade(const StateConnection& connection, int64_t version, std::string& error) {
-  int result = Exec(connection, "BEGIN IMMEDIATE");
+  int result = Execute(connection.db, "BEGIN IMMEDIATE");
   for (int64_t at = version; result == SQLITE_OK && at < STATE_VERSION; ++at) {
-    result = Exec(connection, UPGRADES[at]);
+    result = Execute(connection.db, UPGRADES[at]);
   }
   if (result == SQLITE_OK) {
     const std::string mark = "PRAGMA user_version=" + std::to_string(STATE_VERSION);
-    result = Exec(connection, mark.c_str());
+    result = Execute(connection.db, mark.c_str());
   }
   if (result == SQLITE_OK) {
-    result = Exec(connection, "COMMIT");
+    result = Execute(connection.db, "COMMIT");
   }
   if (result == SQLITE_OK) {
     if (version > 0) {
@@ -142,7 +85,7 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
     return Opened::GOOD;
   }
   const Opened outcome = Failed(connection, "cannot upgrade", result, error);
-  (void)Exec(connection, "ROLLBACK");  // the failure may have done it already
+  (void)Execute(connection.db, "ROLLBACK");  // the failure may have done it already
   return outcome;
 }
 
@@ -188,96 +131,12 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
   if (outcome != Opened::GOOD) {
     return outcome;
   }
-  result = Exec(connection, "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL");
+  result = Execute(connection.db, "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL");
   if (result != SQLITE_OK) {
     return Failed(connection, "cannot set up", result, error);
   }
   TidyOnClose(connection, true);
   return Opened::GOOD;
-}
-
-bool ReadAll(const std::string& path, std::string& bytes) {
-  const ScopedFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-  char buffer[16384];
-  for (;;) {
-    const ssize_t length = file.fd < 0 ? -1 : read(file.fd, buffer, sizeof buffer);
-    if (length <= 0) {
-      return length == 0;
-    }
-    bytes.append(buffer, static_cast<size_t>(length));
-  }
-}
-
-// Whether the bytes are a sound database with tables of ours, in the form of a copy.
-bool IsSoundImage(std::string image) {
-  StateConnection memory;
-  auto* bytes = reinterpret_cast<unsigned char*>(image.data());
-  const auto size = static_cast<sqlite3_int64>(image.size());
-  if (image.empty() || sqlite3_open(":memory:", &memory.db) != SQLITE_OK ||
-      sqlite3_deserialize(memory.db, "main", bytes, size, size, SQLITE_DESERIALIZE_READONLY) !=
-          SQLITE_OK) {
-    return false;
-  }
-  int64_t version = 0;
-  bool ok = false;
-  const bool sound = SchemaVersion(memory.db, version) == SQLITE_OK && version > 0 &&
-                     QuickCheck(memory.db, ok) == SQLITE_OK && ok;
-  sqlite3_close(memory.db);  // before the bytes go
-  memory.db = nullptr;
-  return sound;
-}
-
-bool WriteSafely(const std::string& path, const std::string& bytes, std::string& error) {
-  const std::string temporary = path + ".new";
-  (void)unlink(temporary.c_str());  // left by a program that was killed
-  ScopedFd file(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
-  bool good = file.fd >= 0 && fchmod(file.fd, 0600) == 0;
-  for (size_t at = 0; good && at < bytes.size();) {
-    const ssize_t written = write(file.fd, bytes.data() + at, bytes.size() - at);
-    good = written > 0 || (written < 0 && errno == EINTR);
-    at += written > 0 ? static_cast<size_t>(written) : 0;
-  }
-  good = good && fsync(file.fd) == 0 && rename(temporary.c_str(), path.c_str()) == 0;
-  if (!good) {
-    error = Reason("cannot write", path);
-    (void)unlink(temporary.c_str());
-  }
-  return good;
-}
-
-// What was renamed is to be found under its new name after a power failure.
-void SyncFolder(const ScopedFd& folder) {
-  (void)fsync(folder.fd);
-}
-
-// Sets the database aside and puts the copy in its place. The database goes first: a program that
-// is stopped in between leaves none, and the next one finds the copy beside the gap. Its log must
-// not stay: it would be played into the copy.
-bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error) {
-  std::string image;
-  if (!ReadAll(path + ".copy", image) || !IsSoundImage(image)) {
-    error += "; and there is no sound copy of it";
-    return false;
-  }
-  const std::string aside = path + ".damaged";
-  std::error_code ignored;
-  if (Exists(path)) {
-    std::filesystem::remove_all(aside + "-wal", ignored);  // of what was set aside before
-  }
-  if (!MoveAside(path, aside)) {
-    error += "; " + Reason("cannot set aside", path);
-    return false;
-  }
-  if (!MoveAside(path + "-wal", aside + "-wal")) {
-    error += "; " + Reason("cannot set aside the log of", path);
-    return false;
-  }
-  std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
-  if (!WriteSafely(path, image, error)) {
-    return false;
-  }
-  SyncFolder(root);
-  return true;
 }
 
 }  // namespace
@@ -324,17 +183,17 @@ bool HasStateMoved(const StateConnection& connection) {
 
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
   ScopedFd lock;
-  if (!MakeStateRoot(error) || !LockRoot(StateRoot(), lock, error)) {
+  if (!MakeStateRoot(error) || !LockStateRoot(StateRoot(), lock, error)) {
     return nullptr;
   }
   const std::string path = StateDatabasePath();
-  const bool has_copy = Exists(path + ".copy");
+  const bool has_copy = StateFileExists(path + ".copy");
   bool recovered = false;
   for (;;) {
     auto connection = std::make_unique<StateConnection>();
     connection->path = path;
     Opened outcome = Opened::DAMAGED;
-    if (has_copy && !Exists(path)) {
+    if (has_copy && !StateFileExists(path)) {
       error = path + " is missing";
     } else if (!IsFileOrNothing(path) || !IsFileOrNothing(path + "-wal") ||
                !IsFileOrNothing(path + "-shm")) {
@@ -358,7 +217,8 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
 
     connection.reset();  // or its closing would write to what is put in place
     const std::string found = error;
-    const std::string kept = Exists(path) ? ", and it is kept as " + path + ".damaged" : "";
+    const std::string kept =
+        StateFileExists(path) ? ", and it is kept as " + path + ".damaged" : "";
     if (!PutCopyInPlace(path, lock, error)) {
       return nullptr;
     }
@@ -366,37 +226,6 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
            kept.c_str());
     recovered = true;
   }
-}
-
-bool LeaveStateCopy(const StateConnection& connection, std::string& error) {
-  // The lock keeps an older copy from replacing a newer one of another program.
-  ScopedFd lock;
-  const std::string root = connection.path.substr(0, connection.path.rfind('/'));
-  if (!LockRoot(root, lock, error)) {
-    return false;
-  }
-  sqlite3_int64 size = 0;
-  unsigned char* bytes = sqlite3_serialize(connection.db, "main", &size, 0);
-  if (bytes == nullptr || size < 100) {
-    sqlite3_free(bytes);
-    error = StateError(connection, "cannot copy");
-    return false;
-  }
-  std::string image(reinterpret_cast<char*>(bytes), static_cast<size_t>(size));
-  sqlite3_free(bytes);
-
-  // A copy stands alone: these two bytes of the header say that there is no log beside it.
-  image[18] = 1;
-  image[19] = 1;
-  if (!IsSoundImage(image)) {
-    error = connection.path + " is damaged; the copy beside it is left as it was";
-    return false;
-  }
-  if (!WriteSafely(connection.path + ".copy", image, error)) {
-    return false;
-  }
-  SyncFolder(lock);
-  return true;
 }
 
 }  // namespace fileindexd

@@ -48,10 +48,6 @@ bool OpenFullState(StateConnection& connection, const std::string& error);
 // not known to be sound: what is set aside must be what was found.
 void TidyOnClose(const StateConnection& connection, bool tidy);
 
-// Leaves a copy of what is committed beside the database. It is checked before it replaces the one
-// that is there. False on failure, and that one stays.
-bool LeaveStateCopy(const StateConnection& connection, std::string& error);
-
 // What the head of the log's index says: it differs after each commit of whatever program.
 using LogHead = std::array<unsigned char, 96>;
 

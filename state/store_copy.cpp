@@ -1,0 +1,180 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "state/store_copy.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+#include <system_error>
+#include <thread>
+
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+namespace {
+
+constexpr std::chrono::seconds LOCK_WAIT(5);
+constexpr std::chrono::milliseconds LOCK_NAP(5);
+
+// In the place of what was set aside before, which stays where there is nothing to set aside. A
+// rename alone cannot put a file in a folder's place.
+bool MoveAside(const std::string& path, const std::string& aside) {
+  if (!StateFileExists(path)) {
+    return true;
+  }
+  std::error_code ignored;  // what is in the way still makes the renaming fail
+  std::filesystem::remove_all(aside, ignored);
+  return rename(path.c_str(), aside.c_str()) == 0 || errno == ENOENT;
+}
+
+bool ReadAll(const std::string& path, std::string& bytes) {
+  const ScopedFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  char buffer[16384];
+  for (;;) {
+    const ssize_t length = file.fd < 0 ? -1 : read(file.fd, buffer, sizeof buffer);
+    if (length <= 0) {
+      return length == 0;
+    }
+    bytes.append(buffer, static_cast<size_t>(length));
+  }
+}
+
+// Whether the bytes are a sound database with tables of ours, in the form of a copy.
+bool IsSoundImage(std::string image) {
+  StateConnection memory;
+  auto* bytes = reinterpret_cast<unsigned char*>(image.data());
+  const auto size = static_cast<sqlite3_int64>(image.size());
+  if (image.empty() || sqlite3_open(":memory:", &memory.db) != SQLITE_OK ||
+      sqlite3_deserialize(memory.db, "main", bytes, size, size, SQLITE_DESERIALIZE_READONLY) !=
+          SQLITE_OK) {
+    return false;
+  }
+  int64_t version = 0;
+  bool ok = false;
+  const bool sound = SchemaVersion(memory.db, version) == SQLITE_OK && version > 0 &&
+                     QuickCheck(memory.db, ok) == SQLITE_OK && ok;
+  sqlite3_close(memory.db);  // before the bytes go
+  memory.db = nullptr;
+  return sound;
+}
+
+bool WriteSafely(const std::string& path, const std::string& bytes, std::string& error) {
+  const std::string temporary = path + ".new";
+  (void)unlink(temporary.c_str());  // left by a program that was killed
+  ScopedFd file(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+  bool good = file.fd >= 0 && fchmod(file.fd, 0600) == 0;
+  for (size_t at = 0; good && at < bytes.size();) {
+    const ssize_t written = write(file.fd, bytes.data() + at, bytes.size() - at);
+    good = written > 0 || (written < 0 && errno == EINTR);
+    at += written > 0 ? static_cast<size_t>(written) : 0;
+  }
+  good = good && fsync(file.fd) == 0 && rename(temporary.c_str(), path.c_str()) == 0;
+  if (!good) {
+    error = StateFileError("cannot write", path);
+    (void)unlink(temporary.c_str());
+  }
+  return good;
+}
+
+// What was renamed is to be found under its new name after a power failure.
+void SyncFolder(const ScopedFd& folder) {
+  (void)fsync(folder.fd);
+}
+
+}  // namespace
+
+std::string StateFileError(const std::string& what, const std::string& path) {
+  return what + " " + path + ": " + strerror(errno);  // NOLINT: glibc's is safe
+}
+
+bool StateFileExists(const std::string& path) {
+  struct stat st {};
+  return lstat(path.c_str(), &st) == 0;
+}
+
+bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error) {
+  ScopedFd folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (folder.fd < 0) {
+    error = StateFileError("cannot open", root);
+    return false;
+  }
+  const auto deadline = std::chrono::steady_clock::now() + LOCK_WAIT;
+  while (flock(folder.fd, LOCK_EX | LOCK_NB) != 0) {
+    if ((errno != EWOULDBLOCK && errno != EINTR) || std::chrono::steady_clock::now() >= deadline) {
+      error = StateFileError("cannot lock", root);
+      return false;
+    }
+    std::this_thread::sleep_for(LOCK_NAP);
+  }
+  lock.Swap(folder);
+  return true;
+}
+
+// The database goes first: a program that is stopped in between leaves none, and the next one finds
+// the copy beside the gap. Its log must not stay: it would be played into the copy.
+bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error) {
+  std::string image;
+  if (!ReadAll(path + ".copy", image) || !IsSoundImage(image)) {
+    error += "; and there is no sound copy of it";
+    return false;
+  }
+  const std::string aside = path + ".damaged";
+  std::error_code ignored;
+  if (StateFileExists(path)) {
+    std::filesystem::remove_all(aside + "-wal", ignored);  // of what was set aside before
+  }
+  if (!MoveAside(path, aside)) {
+    error += "; " + StateFileError("cannot set aside", path);
+    return false;
+  }
+  if (!MoveAside(path + "-wal", aside + "-wal")) {
+    error += "; " + StateFileError("cannot set aside the log of", path);
+    return false;
+  }
+  std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
+  if (!WriteSafely(path, image, error)) {
+    return false;
+  }
+  SyncFolder(root);
+  return true;
+}
+
+bool LeaveStateCopy(const StateConnection& connection, std::string& error) {
+  // The lock keeps an older copy from replacing a newer one of another program.
+  ScopedFd lock;
+  const std::string root = connection.path.substr(0, connection.path.rfind('/'));
+  if (!LockStateRoot(root, lock, error)) {
+    return false;
+  }
+  sqlite3_int64 size = 0;
+  unsigned char* bytes = sqlite3_serialize(connection.db, "main", &size, 0);
+  if (bytes == nullptr || size < 100) {
+    sqlite3_free(bytes);
+    error = StateError(connection, "cannot copy");
+    return false;
+  }
+  std::string image(reinterpret_cast<char*>(bytes), static_cast<size_t>(size));
+  sqlite3_free(bytes);
+
+  // A copy stands alone: these two bytes of the header say that there is no log beside it.
+  image[18] = 1;
+  image[19] = 1;
+  if (!IsSoundImage(image)) {
+    error = connection.path + " is damaged; the copy beside it is left as it was";
+    return false;
+  }
+  if (!WriteSafely(connection.path + ".copy", image, error)) {
+    return false;
+  }
+  SyncFolder(lock);
+  return true;
+}
+
+}  // namespace fileindexd

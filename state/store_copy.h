@@ -1,0 +1,29 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// The sound copy beside the state database, and its use in the place of a damaged one. Nothing
+// throws. Functions that fail set `error` to one line that names the file.
+#pragma once
+
+#include <string>
+
+#include "base/scoped_fd.h"
+#include "state/store_database.h"
+
+namespace fileindexd {
+
+// The lock on the state root under which opening and copying are done, waited for 5 s at most.
+bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error);
+
+// Leaves a copy of what is committed beside the database. It is checked before it replaces the one
+// that is there. False on failure, and that one stays.
+bool LeaveStateCopy(const StateConnection& connection, std::string& error);
+
+// Sets the database aside and puts the copy in its place, under the lock `root`. Without a sound
+// copy nothing is touched. On failure `error`, which says what is wrong, is added to.
+bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error);
+
+// What is wrong with a file, by errno.
+std::string StateFileError(const std::string& what, const std::string& path);
+
+bool StateFileExists(const std::string& path);
+
+}  // namespace fileindexd
