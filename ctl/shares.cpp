@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
+#include <system_error>
 
 #include "base/utf8.h"
 #include "ctl/client.h"
@@ -41,11 +42,24 @@ bool CanBeShare(const std::string& path) {
   return true;
 }
 
+// Out of the way first: a program that has not seen yet that the share is gone makes nothing more
+// there. What a removal that was cut short left goes too. No share's name begins with a dot.
 bool RemoveShareFolder(const std::string& name) {
+  const std::string folder = ShareFolder(name);
+  const std::string removed = ShareFolder("." + name + ".removed");
   std::error_code error;
-  (void)std::filesystem::remove_all(ShareFolder(name), error);
+  (void)std::filesystem::remove_all(removed, error);
+  if (!error) {
+    std::filesystem::rename(folder, removed, error);
+  }
+  if (error == std::errc::no_such_file_or_directory) {
+    error.clear();
+  }
+  if (!error) {
+    (void)std::filesystem::remove_all(removed, error);
+  }
   if (error) {
-    (void)Fail(EXIT_FAILED, "%s: %s", ShareFolder(name).c_str(), error.message().c_str());
+    (void)Fail(EXIT_FAILED, "%s: %s", folder.c_str(), error.message().c_str());
     return false;
   }
 

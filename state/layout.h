@@ -8,6 +8,7 @@
 //   ROOT/shares/NAME/index/                     entries
 //   ROOT/shares/NAME/contents/                  what was read out of files
 //   ROOT/shares/NAME/index.damaged/             a database that could not be used, set aside
+//   ROOT/shares/.NAME.removed/                  what is being removed, where that was cut short
 #pragma once
 
 #include <optional>

@@ -2,8 +2,19 @@
 """share add, remove, set, list."""
 
 import os
+import subprocess
 
 from harness import IndexTest, main, namespace
+
+# Makes files until their folder is gone.
+WRITER = """
+import itertools, os, sys
+for number in itertools.count():
+    try:
+        os.close(os.open(f"{sys.argv[1]}{number}", os.O_CREAT))
+    except FileNotFoundError:
+        break
+"""
 
 
 class SharesTest(IndexTest):
@@ -129,6 +140,19 @@ class SharesTest(IndexTest):
         self.check_remove()
 
         self.await_line("Worker[alpha] deleted")
+
+    def test_remove_while_another_program_still_writes_there(self):
+        self.make_share(files=("a.txt",))
+        folder = f"{namespace.STATE}/shares/alpha"
+        writers = [subprocess.Popen(("python3", "-c", WRITER, f"{folder}/{name}")) for name in "ab"]
+        for writer, name in zip(writers, "ab"):
+            self.addCleanup(writer.kill)
+            self.await_file(f"{folder}/{name}2000")
+
+        self.check_remove()
+
+        for writer in writers:
+            self.assertEqual(writer.wait(), 0)
 
     def test_removed_share_can_be_added_again(self):
         self.make_share(files=("a.txt",))
