@@ -65,6 +65,15 @@ bool IsSoundImage(std::string image) {
   return sound;
 }
 
+// 0 where it cannot be asked, or is older than the counting.
+int64_t CountedChanges(const StateConnection& connection) {
+  Statement ask;
+  const bool counted =
+      ask.Prepare(connection.db, "SELECT value FROM number WHERE name = 'changes'") == SQLITE_OK &&
+      ask.Step() == SQLITE_ROW;
+  return counted ? ask.Int(0) : 0;
+}
+
 bool WriteSafely(const std::string& path, const std::string& bytes, std::string& error) {
   const std::string temporary = path + ".new";
   (void)unlink(temporary.c_str());  // left by a program that was killed
@@ -144,6 +153,17 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
   }
   SyncFolder(root);
   return true;
+}
+
+bool LacksChangesOfCopy(const StateConnection& connection) {
+  StateConnection copy;
+  copy.path = connection.path + ".copy";
+  if (!IsFileOrNothing(copy.path) || !OpenUnlogged(copy) ||
+      CountedChanges(copy) <= CountedChanges(connection)) {
+    return false;
+  }
+  std::string image;
+  return ReadAll(copy.path, image) && IsSoundImage(image);
 }
 
 bool LeaveStateCopy(const StateConnection& connection, std::string& error) {

@@ -17,6 +17,10 @@ bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error);
 // that is there. False on failure, and that one stays.
 bool LeaveStateCopy(const StateConnection& connection, std::string& error);
 
+// Whether a sound copy has counted more changes than the open database: what the log held is gone,
+// or an older database was put there.
+bool LacksChangesOfCopy(const StateConnection& connection);
+
 // Sets the database aside and puts the copy in its place, under the lock `root`. Without a sound
 // copy nothing is touched. On failure `error`, which says what is wrong, is added to.
 bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error);

@@ -60,6 +60,11 @@ bool MakeFile(const std::string& path, std::string& error) {
   return true;
 }
 
+ino_t LogInode(const StateConnection& connection) {
+  struct stat log {};
+  return lstat((connection.path + "-wal").c_str(), &log) == 0 ? log.st_ino : 0;
+}
+
 Opened Failed(const StateConnection& connection, const char* what, int result, std::string& error) {
   error = StateError(connection, what);
   return IsDamage(result) ? Opened::DAMAGED : Opened::FAILED;
@@ -84,7 +89,10 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
     }
     return Opened::GOOD;
   }
-  const Opened outcome = Failed(connection, "cannot upgrade", result, error);
+  Opened outcome = Failed(connection, "cannot upgrade", result, error);
+  if ((result & 0xff) == SQLITE_ERROR) {
+    outcome = Opened::DAMAGED;  // its tables are not those of its version
+  }
   (void)Execute(connection.db, "ROLLBACK");  // the failure may have done it already
   return outcome;
 }
@@ -114,6 +122,10 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     error = connection.path + " is damaged";
     return Opened::DAMAGED;
   }
+  if (has_copy && LacksChangesOfCopy(connection)) {
+    error = connection.path + " has lost its last changes";
+    return Opened::DAMAGED;
+  }
   return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
 }
 
@@ -136,6 +148,7 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
     return Failed(connection, "cannot set up", result, error);
   }
   TidyOnClose(connection, true);
+  connection.log_inode = LogInode(connection);
   return Opened::GOOD;
 }
 
@@ -178,7 +191,8 @@ bool ReadLogHead(const StateConnection& connection, LogHead& head) {
 bool HasStateMoved(const StateConnection& connection) {
   int moved = 0;
   const int result = sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_HAS_MOVED, &moved);
-  return result == SQLITE_OK && moved != 0;
+  return (result == SQLITE_OK && moved != 0) ||
+         (connection.log_inode != 0 && LogInode(connection) != connection.log_inode);
 }
 
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {

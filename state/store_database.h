@@ -10,6 +10,7 @@
 #pragma once
 
 #include <sqlite3.h>
+#include <sys/types.h>
 
 #include <array>
 #include <memory>
@@ -21,6 +22,10 @@ namespace fileindexd {
 
 constexpr int STATE_VERSION = 4;  // of the schema
 
+// Part of each change. A database that has counted fewer than its copy has lost some.
+constexpr const char* COUNT_CHANGE =
+    "INSERT INTO number VALUES('changes', 1) ON CONFLICT DO UPDATE SET value = value + 1";
+
 // Owns a connection.
 class StateConnection {
  public:
@@ -31,18 +36,24 @@ class StateConnection {
 
   sqlite3* db = nullptr;
   std::string path;
+  ino_t log_inode = 0;  // of the log that it uses; 0: none
   // Why it is for reading only, and sees no later change: the disk is full. Else empty.
   std::string read_only;
 };
 
 // Opens the database: makes it where there is none, upgrades an older one, refuses a newer one, and
-// puts the copy in the place of a damaged one. On a full disk, which has no room for the log and
-// the shared memory, the connection may be one for reading only. Null on failure.
+// puts the copy in the place of one that is damaged or lacks changes that the copy has. On a full
+// disk, which has no room for the log and the shared memory, the connection may be one for reading
+// only. Null on failure.
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 
 // The second half of that: opens `connection` for reading what was closed properly, on a full disk.
 // `error` is what kept it from being opened. In store_unlogged.cpp.
 bool OpenFullState(StateConnection& connection, const std::string& error);
+
+// Opens a database for reading that has no log, or whose log is to be passed over. In
+// store_unlogged.cpp.
+bool OpenUnlogged(StateConnection& connection);
 
 // Whether closing writes the log back into the database and removes it. Not where the database is
 // not known to be sound: what is set aside must be what was found.
@@ -55,7 +66,7 @@ using LogHead = std::array<unsigned char, 96>;
 // connection must have read something before, so that the log is open. False where there is none.
 bool ReadLogHead(const StateConnection& connection, LogHead& head);
 
-// True when the open file is no longer the one at its path: it was set aside or removed.
+// True when the open file or its log is no longer the one at its path: it was set aside or removed.
 bool HasStateMoved(const StateConnection& connection);
 
 // That a database is of a version that this program does not know, in one line.

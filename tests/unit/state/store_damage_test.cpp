@@ -140,6 +140,90 @@ TEST_F(StoreDamageTest, AnOpenStoreMendsADatabaseThatWasOverwritten) {
   }
 }
 
+// As a program leaves them that is killed: the changes are in the log alone.
+TEST_F(StoreDamageTest, AChangeThatWentWithTheLogComesBackFromTheCopy) {
+  for (const size_t kept : {0, 32, 2000, -1}) {  // of the log; -1: not even its file
+    auto killed = OpenStore();
+    Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
+    ASSERT_TRUE(killed->SetPause(static_cast<int64_t>(kept + 100)));
+    const std::string main_file = ReadFile(database);
+    const std::string log = ReadFile(database + "-wal");
+    killed.reset();
+    WriteFile(database, main_file);
+    if (kept != static_cast<size_t>(-1)) {
+      WriteFile(database + "-wal", log.substr(0, kept) + std::string(log.size() - kept, 'x'));
+    }
+
+    const auto store = OpenStore();
+
+    int64_t resume_time = 0;
+    ASSERT_TRUE(store->GetPause(resume_time)) << store->Error();
+    EXPECT_EQ(resume_time, static_cast<int64_t>(kept + 100));
+    ExpectAllThere(*store);
+    EXPECT_TRUE(ReadFile(database + ".damaged") == main_file);
+  }
+}
+
+TEST_F(StoreDamageTest, AnOlderDatabaseGivesWayToTheCopy) {
+  const std::string older = ReadFile(database);
+  ASSERT_TRUE(OpenStore()->AddFolder("/v/a/new", {}));
+  WriteFile(database, older);
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_EQ(settings->folders.size(), 2U);
+  EXPECT_TRUE(ReadFile(database + ".damaged") == older);
+}
+
+TEST_F(StoreDamageTest, ACopyThatIsOlderOrDamagedOrAPipeIsPassedOver) {
+  const std::string older = ReadFile(copy);
+  ASSERT_TRUE(OpenStore()->SetPause(5));
+  Sql(copy, "UPDATE number SET value = 1000 WHERE name = 'changes'");
+  std::string damaged = ReadFile(copy);
+  damaged.replace(4096, 4096, 4096, '\x5a');
+  for (const std::string& bytes : {older, damaged, std::string()}) {
+    std::filesystem::remove(copy);
+    bytes.empty() ? (void)mkfifo(copy.c_str(), 0600) : WriteFile(copy, bytes);
+
+    int64_t resume_time = 0;
+    ASSERT_TRUE(OpenStore()->GetPause(resume_time));
+    EXPECT_EQ(resume_time, 5);
+    EXPECT_FALSE(std::filesystem::exists(database + ".damaged"));
+  }
+}
+
+TEST_F(StoreDamageTest, AVersionThatIsNotThatOfItsTablesGivesWayToTheCopy) {
+  for (const char* sql :
+       {"PRAGMA user_version=1", "PRAGMA user_version=2", "PRAGMA user_version=3"}) {
+    Sql(database, sql);
+    const std::string found = ReadFile(database);
+
+    ExpectAllThere(*OpenStore());
+
+    EXPECT_TRUE(ReadFile(database + ".damaged") == found) << sql;
+  }
+}
+
+TEST_F(StoreDamageTest, AnOpenStoreLosesNothingWithItsLog) {
+  const auto store = OpenStore();
+  ASSERT_TRUE(store->SetPause(5));
+  std::filesystem::remove(database + "-wal");
+
+  ASSERT_TRUE(store->UpdateStatus("a", [](ShareStatus& status) { status.missing = true; }))
+      << store->Error();
+
+  int64_t resume_time = 0;
+  ShareStatus status;
+  const auto other = OpenStore();
+  ASSERT_TRUE(other->GetPause(resume_time)) << other->Error();
+  EXPECT_EQ(resume_time, 5);
+  ASSERT_TRUE(other->GetStatus("a", status));
+  EXPECT_TRUE(status.missing);
+  ASSERT_TRUE(other->SetPause(6));
+  ASSERT_TRUE(store->GetPause(resume_time)) << store->Error();
+  EXPECT_EQ(resume_time, 6);
+}
+
 TEST_F(StoreDamageTest, TheCopyHoldsTheLastChangeAndStandsAlone) {
   const auto store = OpenStore();
   ASSERT_TRUE(store->SetPause(1234));
