@@ -13,6 +13,7 @@ The share's own disk stays as it is.
 import contextlib
 import fcntl
 import os
+import re
 import signal
 
 from harness import LoadTest, main, namespace
@@ -26,6 +27,8 @@ FIRST_CUTS = 4 if IS_LONG else 1
 CARRIER = f"{namespace.RUN}/carrier"
 FICLONE = 0x40049409
 IMAGE_SIZE = 320 << 20  # xfs wants 300 MB
+# What any program tells of a database that it cannot use, or that is gone.
+LOST = re.compile(r"index .* and (set aside|removed), .*|index missing .*|.*copy is used instead.*")
 MAKE = {
     "ext4": ["mkfs.ext4", "-q", "-F"],
     "xfs": ["mkfs.xfs", "-q", "-f"],
@@ -80,24 +83,51 @@ class PowerCut(LoadTest):
         os.unlink(self.image)
         self.image = copy
         self.mount_image()
+        self.sent = self.cut_at = self.log.mark()
 
     def change_state(self):
-        """A change that is acknowledged by the end of the command."""
+        """Changes that are acknowledged by the end of their command."""
         name = f"s{len(self.shares)}"
         path = f"{namespace.DATA}/{name}"
         os.mkdir(path)
         self.ctl("share", "add", name, path)
+        self.ctl("folder", "add", path)
         self.shares.append(name)
 
     def assert_opens(self):
-        """What was acknowledged is there before anything runs."""
+        """What was acknowledged is there, whether the daemon has opened it yet or nothing runs."""
+        names = sorted(["alpha", *self.shares])
         shown = [share["name"] for share in self.ctl("share", "list", "--json").json()]
-        self.assertEqual(shown, sorted(["alpha", *self.shares]))
+        self.assertEqual(shown, names)
+        folders = [folder["path"] for folder in self.ctl("folder", "list", "--json").json()]
+        self.assertEqual(folders, [f"{namespace.DATA}/{name}" for name in names])
         for share in self.ctl("status", "--json").json()["shares"]:
             self.assertNotIn("index_problem", share)
         self.assert_acknowledged()
-        for name in os.listdir(f"{namespace.STATE}/shares/alpha"):
-            self.assertNotRegex(name, "damaged")
+
+    def commit_to_each(self):
+        """Only who writes to an index sets aside what is left of it."""
+        for name in ("alpha", *self.shares):
+            path = f"{namespace.DATA}/{name}/after cut {self.cuts}.txt"
+            self.make_files(os.path.dirname(path), os.path.basename(path))
+            self.append(name, {"event": CREATE, "path": path})
+        for name in ("alpha", *self.shares):
+            self.await_drained(name)
+        for name in self.shares:
+            self.assert_index(f"{namespace.DATA}/{name}", name)
+
+    def assert_nothing_was_lost(self):
+        """By no program, since the cut."""
+        damaged = [
+            os.path.join(folder, name)
+            for folder, folders, files in os.walk(namespace.STATE)
+            for name in folders + files
+            if "damaged" in name
+        ]
+        self.assertEqual(damaged, [])
+        self.log.mark()
+        told = [line.text for line in self.log.lines[self.cut_at :] if LOST.fullmatch(line.text)]
+        self.assertEqual(told, [])
 
     def sync_queue(self):
         """As a writer does whose lines shall outlive the cut."""
@@ -129,12 +159,14 @@ class PowerCut(LoadTest):
             self.cut()
 
             self.assert_opens()
-            self.sent = self.log.mark()
             self.start()
+            self.assert_opens()
             self.settle()
             if not synced:  # lines of the queue may be lost: their writer compares
                 self.touch(REINDEX)
+            self.commit_to_each()
             self.assert_index(self.root)
+            self.assert_nothing_was_lost()
 
     def test_at_the_first_index_of_all(self):
         for number in range(FIRST_CUTS):
@@ -151,10 +183,12 @@ class PowerCut(LoadTest):
 
                 self.assert_opens()
                 self.start()
+                self.assert_opens()
                 self.settle()
                 self.make_files(root, "late.txt")
                 self.touch(CREATE, "late.txt")
                 self.assert_index(self.root)
+                self.assert_nothing_was_lost()
 
 
 if __name__ == "__main__":
