@@ -41,6 +41,16 @@ def remove(path):
         os.unlink(path)
 
 
+def contents(path):
+    """Bytes of a file, {name: contents} of a folder; None where neither is."""
+    if os.path.isdir(path):
+        return {name: contents(f"{path}/{name}") for name in os.listdir(path)}
+    if not os.path.isfile(path):
+        return None
+    with open(path, "rb") as file:
+        return file.read()
+
+
 def remove_log():
     remove(FILE + "-wal")
     remove(FILE + "-shm")
@@ -51,6 +61,11 @@ def copy_log_back():
     with sqlite3.connect(FILE) as db:
         db.execute("PRAGMA wal_checkpoint(TRUNCATE)")
     db.close()
+
+
+def cut_off(size):
+    copy_log_back()
+    os.truncate(FILE, size)
 
 
 def truncate(part):
@@ -97,33 +112,41 @@ def foreign_database(path):
     db.close()
 
 
-# Name, what is done, whether a copy has to be kept (None: when it is noticed decides).
+# What becomes of an index that was damaged: it is kept, and told of as set aside; it is told of as
+# missing, since nothing is there to be kept; it is whole without anybody's doing.
+KEPT = "kept"
+GONE = "gone"
+UNSEEN = "unseen"  # of its shared memory alone, which SQLite makes anew
+
+# Name, what is done, what becomes of it while the daemon is stopped and while it runs.
 DAMAGES = (
-    ("file removed", lambda: remove(FILE), False),
-    ("file and log removed", lambda: (remove(FILE), remove_log()), False),
-    ("truncated to nothing", lambda: truncate(0), None),
-    ("truncated to half", lambda: truncate(0.5), True),
-    ("truncated to a page", lambda: os.truncate(FILE, PAGE), None),
-    ("truncated inside a page", lambda: (copy_log_back(), os.truncate(FILE, 5 * PAGE + 77)), True),
-    ("header overwritten", lambda: scribble_pages(0, 100), True),
-    ("first page overwritten", lambda: scribble_pages(0, PAGE), True),
-    ("middle overwritten", lambda: scribble_pages(4 * PAGE, None), True),
-    ("all overwritten", lambda: (scribble_pages(0, None)), True),
-    ("log overwritten", lambda: scribble(FILE + "-wal", 0, None), None),
-    ("log's middle overwritten", lambda: scribble(FILE + "-wal", 9 * PAGE, 12 * PAGE), None),
-    ("older schema", lambda: set_version(0), True),
-    ("newer schema", lambda: set_version(99), True),
-    ("foreign database", lambda: replace(FILE, foreign_database), True),
-    ("folder in its place", lambda: replace(FILE, make_full_folder), False),
-    ("pipe in its place", lambda: replace(FILE, os.mkfifo), False),
-    ("link into nowhere", lambda: replace(FILE, lambda path: os.symlink("gone", path)), False),
-    ("index removed", lambda: remove(FOLDER), False),
-    ("file in the index's place", lambda: replace(FOLDER, write_file), None),
-    ("pipe in the index's place", lambda: replace(FOLDER, os.mkfifo), False),
-    ("log replaced by a folder", lambda: replace(FILE + "-wal", make_full_folder), None),
-    ("log replaced by a pipe", lambda: replace(FILE + "-wal", os.mkfifo), None),
-    ("shared memory replaced by a folder", lambda: replace(FILE + "-shm", make_full_folder), None),
-    ("shared memory overwritten", lambda: scribble(FILE + "-shm", 0, None), None),
+    ("file removed", lambda: remove(FILE), GONE, GONE),
+    ("file and log removed", lambda: (remove(FILE), remove_log()), GONE, GONE),
+    ("truncated to nothing", lambda: truncate(0), GONE, KEPT),
+    ("truncated to half", lambda: truncate(0.5), KEPT, KEPT),
+    ("truncated to a page", lambda: os.truncate(FILE, PAGE), KEPT, KEPT),
+    ("truncated inside a page", lambda: cut_off(5 * PAGE + 77), KEPT, KEPT),
+    ("header overwritten", lambda: scribble_pages(0, 100), KEPT, KEPT),
+    ("first page overwritten", lambda: scribble_pages(0, PAGE), KEPT, KEPT),
+    ("middle overwritten", lambda: scribble_pages(4 * PAGE, None), KEPT, KEPT),
+    ("all overwritten", lambda: (scribble_pages(0, None)), KEPT, KEPT),
+    ("log removed", remove_log, KEPT, KEPT),
+    ("empty folder in its place", lambda: replace(FILE, os.mkdir), GONE, GONE),
+    ("log overwritten", lambda: scribble(FILE + "-wal", 0, None), KEPT, KEPT),
+    ("log's middle overwritten", lambda: scribble(FILE + "-wal", 9 * PAGE, 12 * PAGE), KEPT, KEPT),
+    ("older schema", lambda: set_version(0), KEPT, KEPT),
+    ("newer schema", lambda: set_version(99), KEPT, KEPT),
+    ("foreign database", lambda: replace(FILE, foreign_database), KEPT, KEPT),
+    ("folder in its place", lambda: replace(FILE, make_full_folder), KEPT, KEPT),
+    ("pipe in its place", lambda: replace(FILE, os.mkfifo), GONE, GONE),
+    ("link into nowhere", lambda: replace(FILE, lambda path: os.symlink("gone", path)), GONE, GONE),
+    ("index removed", lambda: remove(FOLDER), GONE, GONE),
+    ("file in the index's place", lambda: replace(FOLDER, write_file), KEPT, KEPT),
+    ("pipe in the index's place", lambda: replace(FOLDER, os.mkfifo), GONE, GONE),
+    ("log replaced by a folder", lambda: replace(FILE + "-wal", make_full_folder), KEPT, KEPT),
+    ("log replaced by a pipe", lambda: replace(FILE + "-wal", os.mkfifo), KEPT, KEPT),
+    ("memory replaced by a folder", lambda: replace(FILE + "-shm", make_full_folder), KEPT, KEPT),
+    ("memory overwritten", lambda: scribble(FILE + "-shm", 0, None), UNSEEN, UNSEEN),
 )
 
 
@@ -170,32 +193,55 @@ class DamagedIndexTest(IndexTest):
         self.ctl("event", "alpha", str(CREATE), f"{self.root}/touched.txt")
         self.settle(after)
 
-    def assert_told_once(self, after, kept):
-        """What was made anew is told of once, by whoever noticed; what was not, by nobody."""
+    def assert_told_once(self, after, fate, begun):
+        """By whoever noticed: a Worker that has begun since, or one that was at work."""
         self.log.mark()
         texts = self.log.texts(after)
-        aside = [text for text in texts if SET_ASIDE.fullmatch(text)]
-        if kept is not None:
-            self.assertEqual(len(aside), int(kept))
-            self.assertEqual(os.path.exists(COPY), kept)
-        anew = [text for text in texts if MADE_ANEW.fullmatch(text)]
-        told = aside + anew or [text for text in texts if text == NOT_FOUND]
-        self.assertEqual(len(told), int(self.is_made_anew()), told)
-        self.assertLessEqual(len(glob.glob(f"{FOLDER}.*")), 1)
+        told = {
+            "set aside": len(list(filter(SET_ASIDE.fullmatch, texts))),
+            "made anew": len(list(filter(MADE_ANEW.fullmatch, texts))),
+            "not found": texts.count(NOT_FOUND),
+        }
+        is_lost = fate != UNSEEN
+        wanted = {
+            "set aside": int(fate == KEPT),
+            "made anew": int(fate == GONE and not begun),
+            "not found": int(is_lost and begun),
+        }
+        self.assertEqual(told, wanted, texts)
+        self.assertIs(self.is_made_anew(), is_lost)
+
+    def assert_kept(self, fate, found):
+        """What is kept is what was found, to the byte; a log may have grown behind it."""
+        self.assertEqual(glob.glob(f"{FOLDER}.*"), [COPY] if fate == KEPT else [])
+        if fate != KEPT:
+            return
+        kept = contents(COPY)
+        if isinstance(found, bytes):
+            self.assertEqual(kept, found)
+            return
+        self.assertEqual(kept["entries.db"], found["entries.db"])
+        log = found.get("entries.db-wal")
+        if isinstance(log, bytes):
+            self.assertEqual(kept["entries.db-wal"][: len(log)], log)
+        elif log is not None:
+            self.assertEqual(kept["entries.db-wal"], log)
 
     def is_made_anew(self):
         """The first one is held open: no other can have its number."""
         return not os.path.samestat(os.fstat(self.first.fileno()), os.stat(FILE))
 
-    def check(self, after, kept):
+    def check(self, after, fate, begun=True, found=None):
         self.assert_index(self.root)
-        self.assert_told_once(after, kept)
+        self.assert_told_once(after, fate, begun)
+        self.assert_kept(fate, found)
         (share,) = self.ctl("status", "--json").json()["shares"]
         self.assertNotIn("index_problem", share)
 
-    def damaged_while_stopped(self, damage, kept):
+    def damaged_while_stopped(self, damage, fate):
         self.stop(self.make_index())
         damage()
+        found = contents(FOLDER)
         self.ask()
         after = self.log.mark()
 
@@ -203,12 +249,13 @@ class DamagedIndexTest(IndexTest):
         self.settle(after)
         self.touch()
 
-        self.check(after, kept)
+        self.check(after, fate, True, found)
 
-    def damaged_while_running(self, damage, kept):
+    def damaged_while_running(self, damage, fate):
         self.make_index()
         after = self.log.mark()
         damage()
+        found = contents(FOLDER)
         self.ask()
 
         self.touch()
@@ -218,7 +265,7 @@ class DamagedIndexTest(IndexTest):
             self.ctl("reindex", self.root)
             self.settle(asked)
 
-        self.check(after, kept)
+        self.check(after, fate, False, found)
 
     def make_read_only(self, folder):
         namespace.mount(folder, folder, flags=namespace.MS_BIND)
@@ -238,10 +285,10 @@ class DamagedIndexTest(IndexTest):
         self.ctl("event", "alpha", str(CREATE), f"{self.root}/missed.txt")
         self.touch()
 
-        self.check(after, False)
+        self.check(after, UNSEEN)
 
     def test_removed_folder_of_the_share_while_stopped(self):
-        self.damaged_while_stopped(lambda: remove(os.path.dirname(FOLDER)), False)
+        self.damaged_while_stopped(lambda: remove(os.path.dirname(FOLDER)), GONE)
 
     def test_removed_folder_of_the_share_while_running_is_healed_by_a_new_worker(self):
         self.make_index()
@@ -255,14 +302,14 @@ class DamagedIndexTest(IndexTest):
         self.ctl("worker", "revive", "alpha")
         self.touch()
 
-        self.check(after, False)
+        self.check(after, GONE)
 
 
 def add_cases():
-    for name, damage, kept in DAMAGES:
-        for state in ("stopped", "running"):
-            def test(self, damage=damage, kept=kept, state=state):
-                getattr(self, f"damaged_while_{state}")(damage, kept)
+    for name, damage, stopped, running in DAMAGES:
+        for state, fate in (("stopped", stopped), ("running", running)):
+            def test(self, damage=damage, fate=fate, state=state):
+                getattr(self, f"damaged_while_{state}")(damage, fate)
 
             words = re.sub(r"\W+", "_", name)
             setattr(DamagedIndexTest, f"test_{words}_while_{state}", test)
