@@ -7,14 +7,13 @@ import subprocess
 
 from harness import main, namespace
 from harness.awaiting import LIMIT
-from harness.batch_load import ENDED
+from harness.batch_load import CHANGED, ENDED
 from harness.filesystems import CREATE, REINDEX, FilesystemTest, need_loop_devices, run, unmount
 
 IMAGE_SIZE = 64 << 20
 FSCK_MENDED = 1
 FILES = 600
 FIRST_CHANGES = 50  # are logged while the disk can still be written to
-CHANGED = re.compile(r"\[alpha\] Document\[.*\] (added|updated)")
 KEPT = re.compile(r"Kept, as its changes are not stored: .*\.tmp")
 
 

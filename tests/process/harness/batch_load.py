@@ -20,6 +20,7 @@ RENAME = 0x100
 
 MOST_FILES = 40  # of one new folder
 MOST_FOLDERS = 30
+CHANGED = re.compile(r"\[alpha\] Document\[.*\] (added|updated)")
 COMMITTED = "Worker[alpha] fileindex db committed"
 WORK = re.compile(r"TREE COMMAND .*|\[alpha\] (Document|Directory)\[.*", re.S)
 ENDED = re.compile(

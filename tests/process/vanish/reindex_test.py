@@ -3,20 +3,18 @@
 
 import itertools
 import os
-import re
 
 from harness import main
-from harness.sampling import SamplingTest
+from harness.oracle import expected_entries
+from harness.sampling import SamplingTest, moments_of
 from harness.scale import IS_LONG
 
 FILES = 200_000 if IS_LONG else 3_000
 IN_A_FOLDER = 500
 EACH = FILES // 30  # every so many files, one is known
-STALE = 2_400  # of the others
+STALE = 2_700  # of the others
 NEW = 6_000
 MOST_LINES = 5_000  # that a repair queues
-MOMENTS = 3  # of a work, at which it is held for a question
-CHANGED = re.compile(r"\[alpha\] Document\[.*\] (added|updated)")
 
 
 class ReindexTest(SamplingTest):
@@ -31,34 +29,31 @@ class ReindexTest(SamplingTest):
         word = "keepsake" if number % EACH == 0 else "other"
         return f"d{number // IN_A_FOLDER}/{word} {number}.txt"
 
-    def check_while(self, begin, changes):
-        """Asks while what `begin` queues is worked off: so many documents, or more.
+    def undone(self):
+        """How many paths the index does not have as the disk has them."""
+        wanted, held = expected_entries(self.root), self.entries()
+        return sum(wanted.get(path) != held.get(path) for path in wanted.keys() | held.keys())
 
-        At a few moments the work waits until a question is answered, as nobody reads its log.
+    def check_while(self, begin, changes):
+        """Asks while what `begin` queues is worked off: about so many changes.
+
+        At chosen moments it is seen that the index is as it was, or half done.
         """
-        self.ctl("log-level", "debug")
-        hold = (CHANGED, changes // (MOMENTS + 1))
-        self.log.hold_at(*hold)
-        held = 0
+        at_first = self.undone()
+        undone = []  # at the moments
+        self.hold_at(*moments_of(changes))
         begin()
 
         def sample(_):
-            nonlocal held
-            is_held = self.log.await_held(0)
             self.assertEqual(sorted(self.found("keepsake")), self.known)
-            if not is_held:
-                return
-            self.assertFalse(self.is_drained())  # answered before its end
-            held += 1
-            if held < MOMENTS:
-                self.log.go_on(*hold)
-            else:
-                self.log.go_on()
-                self.ctl("log-level", "error")
+            if self.is_held:
+                undone.append(self.undone())
 
         count = self.sample_until_drained(sample)
         print(f"{count} questions meanwhile, each found all {len(self.known)} known files")
-        self.assertEqual(held, MOMENTS)
+        self.assertEqual(undone[0], at_first)
+        self.assertEqual(undone, sorted(undone, reverse=True))
+        self.assertIn(undone[-1], range(1, at_first))
         self.assert_index(self.root)
 
     def damage(self):
@@ -97,7 +92,7 @@ class ReindexTest(SamplingTest):
         names = (f"d{number % (FILES // IN_A_FOLDER)}/new {number}.txt" for number in range(NEW))
         self.make_files(self.root, *names)
 
-        self.check_while(lambda: self.assertGreater(self.repair(), MOST_LINES), NEW)
+        self.check_while(lambda: self.assertGreater(self.repair(), MOST_LINES), NEW + STALE)
 
 
 if __name__ == "__main__":

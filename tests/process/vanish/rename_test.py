@@ -1,14 +1,15 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """After a rename of a folder nothing is found under both paths, whatever order its events come in.
 
-How long a file is found under neither is printed: only while the events are worked on.
+Asked is at moments before and behind the first commit of what the events need, too. How long a file
+is found under neither path is printed: only while the events are worked on.
 """
 
 import os
 import time
 
 from harness import main
-from harness.sampling import SamplingTest
+from harness.sampling import SamplingTest, moments_of
 from harness.scale import IS_LONG
 
 FILES = 200_000 if IS_LONG else 3_000
@@ -40,8 +41,18 @@ class RenameTest(SamplingTest):
     def event(self, code, below, **more):
         return {"event": code, "path": self.at(below), **more}
 
-    def check(self, old, new, *lines, over=True):
-        """Appends the lines and asks until they are worked off. `over`: they tell everything."""
+    def indexed(self, top):
+        """How many entries the index has at and below the path."""
+        top = os.fsencode(self.at(top))
+        return sum(path == top or path.startswith(top + b"/") for path in self.dump())
+
+    def check(self, old, new, *lines, over=True, changes=FILES):
+        """Appends the lines and asks until they are worked off.
+
+        `over`: they tell everything. `changes`: about so many documents are added; where it is
+        none, the work has one commit, and is not held.
+        """
+        indexed = []  # under the new path, at the moments
         left = {}  # file: when it was last found under its old path
         arrived = {}  # file: when it was first found under its new path
 
@@ -57,6 +68,8 @@ class RenameTest(SamplingTest):
                 for top in (old, new)
             }
             self.assertEqual(under[old] & under[new], set(), "found under both paths")
+            if self.is_held:
+                indexed.append(self.indexed(new))
             if not self.has_begun():
                 self.assertEqual(under[old] | under[new], self.known, "gone before its pass")
             if drained and over:
@@ -65,8 +78,14 @@ class RenameTest(SamplingTest):
             for file in under[new] - arrived.keys():
                 arrived[file] = time.monotonic()
 
+        before = self.indexed(new)
+        if changes > 0:
+            self.hold_at(*moments_of(changes))
         self.append("alpha", *lines)
         count = self.sample_until_drained(sample)
+        if changes > 0:
+            self.assertEqual(indexed[0], before)
+            self.assertGreater(indexed[1], before)
         gaps = [arrived[file] - left[file] for file in arrived.keys() & left.keys()]
         longest = max(gaps, default=0)
         print(f"{count} questions, at most {longest:.3f} s under neither path", flush=True)
@@ -92,13 +111,13 @@ class RenameTest(SamplingTest):
     def test_addition_comes_a_pass_earlier(self):
         self.move("n")
         self.check("m", "n", self.event(REINDEX, "n"))
-        self.check("m", "n", self.event(DELETE, "m"))
+        self.check("m", "n", self.event(DELETE, "m"), changes=0)
         self.assert_index(self.root)
 
     def test_files_come_one_by_one_before_the_folder_is_told(self):
         self.move("n")
         files = (self.event(CREATE, f"n/{file}") for file in sorted(self.known))
-        self.check("m", "n", *files, over=False)
+        self.check("m", "n", *files, over=False, changes=0)
         self.check("m", "n", self.event(RENAME, "n", path_old=self.at("m")))
         self.assert_index(self.root)
 
