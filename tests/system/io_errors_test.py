@@ -3,6 +3,7 @@
 
 import os
 import re
+import sqlite3
 
 from harness import main, namespace
 from harness.filesystems import CREATE, REINDEX, FilesystemTest, need_loop_devices, run
@@ -10,6 +11,7 @@ from harness.machine import PID_FILE
 
 FILES = 2000
 IMAGE_SIZE = 64 << 20
+STATE_FILE = f"{namespace.STATE}/state.db"
 BELOW = "/run/below"  # what the image lies on
 FULL_STATE = re.compile(
     r"cannot .*state\.db: .*; its disk is full: nothing is changed there until it has space|"
@@ -71,7 +73,15 @@ class FailingStateDiskTest(FilesystemTest):
 
 
 class FullAtTheStart:
-    """The daemon serves without a Worker, and says why; the share comes back with the space."""
+    """The daemon serves without a Worker and says why once; the share comes back with the space."""
+
+    def assert_full_told(self, times, after):
+        """By the daemon, which asks for the state each time that it is to revive the Worker."""
+        for _ in range(3):
+            self.ctl("worker", "revive", "alpha", code=1)
+            self.log.mark()
+            said = self.log.texts(after)
+            self.assertEqual(len(list(filter(FULL_STATE.fullmatch, said))), times, said)
 
     def assert_lives_and_heals(self):
         filler = fill(self.state_disk)
@@ -80,12 +90,13 @@ class FullAtTheStart:
         self.start()
 
         self.await_line("CreateWorker failed, share=alpha", after)
-        said = self.log.texts(after)
-        self.assertIn("Share[alpha] is running out space", said)
-        self.assertTrue([text for text in said if FULL_STATE.fullmatch(text)], said)
+        self.assertIn("Share[alpha] is running out space", self.log.texts(after))
+        self.assert_full_told(1, after)
         (share,) = self.ctl("status", "--json").json()["shares"]
         self.assertEqual(share["entries"], 2)
-        self.ctl("worker", "revive", "alpha", code=1)
+        self.assert_heals(filler)
+
+    def assert_heals(self, filler):
         os.unlink(filler)
         self.ctl("worker", "revive", "alpha")
         self.make_files(self.root, "late.txt")
@@ -103,7 +114,25 @@ class FullAtTheStart:
     def tidy(self):
         """The last program that closes the state database takes its log away."""
         self.ctl("share", "list")
-        self.assertFalse(os.path.exists(f"{namespace.STATE}/state.db-wal"))
+        self.assertFalse(os.path.exists(STATE_FILE + "-wal"))
+
+    def fill_and_lose_log(self):
+        """Another program puts the state in its own place, without a log. The disk's filler.
+
+        What was there keeps its space, or whoever closes it could make the new one's log.
+        """
+        spare = f"{namespace.STATE}/spare.db"
+        with sqlite3.connect(STATE_FILE) as old, sqlite3.connect(spare) as new:
+            old.backup(new)
+        old.close()
+        new.close()
+        for ending in ("-wal", "-shm", ""):
+            self.enterContext(open(STATE_FILE + ending, "rb"))
+        filler = fill(self.state_disk)
+        for ending in ("-wal", "-shm"):
+            os.unlink(STATE_FILE + ending)
+        os.rename(spare, STATE_FILE)
+        return filler
 
     def test_without_a_log_of_the_state(self):
         self.prepare()
@@ -112,10 +141,24 @@ class FullAtTheStart:
 
         self.assert_lives_and_heals()
 
+    def test_full_again_while_running_is_told_again(self):
+        self.prepare()
+        self.stop(self.pid)
+        self.tidy()
+        filler = fill(self.state_disk)
+        after = self.log.mark()
+        self.start()
+        self.assert_full_told(1, after)
+        self.assert_heals(filler)
+
+        filler = self.fill_and_lose_log()
+        self.assert_full_told(2, after)
+        self.assert_heals(filler)
+
     def test_with_a_log_of_the_state(self):
         self.prepare()
         self.stop(self.pid)
-        self.assertTrue(os.path.exists(f"{namespace.STATE}/state.db-wal"))
+        self.assertTrue(os.path.exists(STATE_FILE + "-wal"))
 
         self.assert_lives_and_heals()
 

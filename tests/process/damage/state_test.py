@@ -244,19 +244,28 @@ class StateTest(IndexTest):
         with open(FILE, "rb") as file:
             self.assertEqual(file.read(), before)
 
+    def assert_newer_told(self, times, after):
+        """By the daemon: after each of several batches, in each of which it reads the settings."""
+        for number in range(3):
+            name = f"{version()} {times} {number}.txt"
+            self.make_files(self.root, name)
+            self.append("alpha", {"event": CREATE, "path": f"{self.root}/{name}"})
+            self.await_drained("alpha")
+            told = [line for line in self.told(NEWER, after) if line.program == "fileindexd"]
+            self.assertEqual(len(told), times)
+
     def test_newer_version_while_running_is_told_once_and_used_until_the_end(self):
         self.prepare()
         after = self.log.mark()
         current = version()
+
         set_version(99)
+        self.assert_newer_told(1, after)
+        set_version(current)
+        self.assert_newer_told(1, after)
+        set_version(99)
+        self.assert_newer_told(2, after)
 
-        for name in ("first.txt", "second.txt"):
-            self.make_files(self.root, name)
-            self.append("alpha", {"event": CREATE, "path": f"{self.root}/{name}"})
-            self.await_drained("alpha")
-
-        told = [line for line in self.told(NEWER, after) if line.program == "fileindexd"]
-        self.assertEqual(len(told), 1)
         self.assert_all_said(r"state\.db has version 99")
         self.stop(self.pid)
         set_version(current)
