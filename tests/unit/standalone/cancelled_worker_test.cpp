@@ -75,7 +75,7 @@ class CancelledWorkerTest : public MountTest {
     MountTmpfs(folder);
     MakeFolder(root);
     log = std::make_unique<ReadLog>();
-    ASSERT_TRUE(log->ready);
+    ASSERT_TRUE(log->socket.ready);
     store = OpenStore();
     ASSERT_NE(store, nullptr);
     ASSERT_TRUE(store->AddShare({"s", root, FilesystemIdentity(root)})) << store->Error();

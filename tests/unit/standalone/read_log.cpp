@@ -15,6 +15,7 @@ namespace fileindexd {
 namespace {
 
 constexpr sockaddr_un LOG_ADDRESS = {AF_UNIX, "/dev/log"};
+constexpr size_t LONGEST_LINE = 8192;
 
 bool HideDevices() {
   return mount("tmpfs", "/dev", "tmpfs", 0, nullptr) == 0 &&
@@ -24,17 +25,36 @@ bool HideDevices() {
 
 }  // namespace
 
-ReadLog::ReadLog() : socket_fd(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
+LogSocket::LogSocket() : fd(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
   const auto* address = reinterpret_cast<const sockaddr*>(&LOG_ADDRESS);
-  ready = HideDevices() && bind(socket_fd.fd, address, sizeof(LOG_ADDRESS)) == 0;
-  if (!ready) {
+  ready = HideDevices() && bind(fd.fd, address, sizeof(LOG_ADDRESS)) == 0;
+}
+
+LogSocket::~LogSocket() {
+  if (ready) {
+    umount2("/dev", MNT_DETACH);
+  }
+}
+
+std::vector<std::string> LogSocket::Take() {
+  std::vector<std::string> lines;
+  char line[LONGEST_LINE];
+  ssize_t length = 0;
+  while ((length = recv(fd.fd, line, sizeof(line), MSG_DONTWAIT)) > 0) {
+    lines.emplace_back(line, static_cast<size_t>(length));
+  }
+  return lines;
+}
+
+ReadLog::ReadLog() {
+  if (!socket.ready) {
     return;
   }
 
   reader = std::thread([this] {
-    char line[8192];
+    char line[LONGEST_LINE];
     while (!end) {
-      if (recv(socket_fd.fd, line, sizeof(line), 0) > 0) {
+      if (recv(socket.fd.fd, line, sizeof(line), 0) > 0) {
         ++lines;
       }
     }
@@ -42,15 +62,14 @@ ReadLog::ReadLog() : socket_fd(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
 }
 
 ReadLog::~ReadLog() {
-  if (!ready) {
+  if (!socket.ready) {
     return;
   }
   end = true;
-  const ScopedFd last(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  const ScopedFd last(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   const auto* address = reinterpret_cast<const sockaddr*>(&LOG_ADDRESS);
   (void)sendto(last.fd, "", 0, 0, address, sizeof(LOG_ADDRESS));
   reader.join();
-  umount2("/dev", MNT_DETACH);
 }
 
 }  // namespace fileindexd
