@@ -31,9 +31,11 @@ using Microseconds = std::chrono::microseconds;
 
 constexpr int JOIN_LIMIT = 120;  // seconds; far beyond what a pass takes
 constexpr int FOLDERS = 12;
-constexpr int FILES = 20;         // in each folder
-constexpr int EVENTS = 60;        // of a round
-constexpr int DRAIN_EVERY = 4;    // rounds; between them, Workers find what cancelled ones left
+constexpr int FILES = 20;   // in each folder
+constexpr int EVENTS = 60;  // of a round
+// Rounds. Between them, Workers find what cancelled ones left: to drain after each would leave them
+// nothing to find.
+constexpr int DRAIN_EVERY = 4;
 constexpr int REINDEX_EVERY = 5;  // rounds
 constexpr Microseconds SHORTEST_LIMIT{100};
 // The allocator's own lists grow for some hundred rounds. Bytes.
@@ -220,6 +222,11 @@ class CancelledWorkerTest : public MountTest {
     return found;
   }
 
+  // What is amiss though no Worker has anything left to do.
+  std::vector<std::string> Lost() {
+    return HasWork() ? std::vector<std::string>() : Differences();
+  }
+
   Worker& TheWorker() {
     return *daemon.workers.at("s");
   }
@@ -253,6 +260,7 @@ TEST_F(CancelledWorkerTest, AtRandomMomentsLosesAndLeaksNothing) {
   Microseconds limit = WarmUp();
   const int wanted = Wanted();
   int round = 0;
+  int left_work = 0;  // rounds that did
   size_t heap = 0;
 
   while (cancelled < wanted) {
@@ -262,6 +270,8 @@ TEST_F(CancelledWorkerTest, AtRandomMomentsLosesAndLeaksNothing) {
     ASSERT_NO_FATAL_FAILURE(MakeWork(round));
     ASSERT_NO_FATAL_FAILURE(CancelWithin(limit));
     ASSERT_NO_FATAL_FAILURE(Revive());
+    left_work += HasWork() ? 1 : 0;
+    ASSERT_EQ(Lost(), std::vector<std::string>());
     if (round % DRAIN_EVERY == 0 || cancelled == wanted) {
       Drain();
       ASSERT_EQ(Differences(), std::vector<std::string>());
@@ -271,7 +281,8 @@ TEST_F(CancelledWorkerTest, AtRandomMomentsLosesAndLeaksNothing) {
     }
   }
 
-  printf("%d cancelled in %d rounds\n", cancelled, round);
+  printf("%d cancelled in %d rounds, %d of which left work\n", cancelled, round, left_work);
+  EXPECT_GT(left_work, 0);
   EXPECT_GT(log->lines, round);
   EXPECT_LT(mallinfo2().uordblks, heap + HEAP_SLACK);
 }
