@@ -13,6 +13,7 @@
 #include <filesystem>
 #include <system_error>
 #include <thread>
+#include <vector>
 
 #include "state/sqlite.h"
 
@@ -65,13 +66,56 @@ bool IsSoundImage(std::string image) {
   return sound;
 }
 
-// 0 where it cannot be asked, or is older than the counting.
-int64_t CountedChanges(const StateConnection& connection) {
+// What a database holds, as it was at one moment.
+struct Holding {
+  int64_t version = 0;
+  int64_t changes = 0;  // that were counted; 0: it is older than the counting
+  std::string rows;     // of all tables, whatever pages they are on
+};
+
+int ReadRows(sqlite3* db, const std::string& table, std::string& rows) {
   Statement ask;
-  const bool counted =
-      ask.Prepare(connection.db, "SELECT value FROM number WHERE name = 'changes'") == SQLITE_OK &&
-      ask.Step() == SQLITE_ROW;
-  return counted ? ask.Int(0) : 0;
+  const int result = ask.Prepare(db, ("SELECT * FROM " + table).c_str());
+  return result != SQLITE_OK ? result : ask.ReadAll([&] {
+    for (int column = 0; column < sqlite3_column_count(ask.handle); ++column) {
+      const std::string bytes = ask.Bytes(column);
+      rows.append(table + " " + std::to_string(bytes.size()) + " ").append(bytes);
+    }
+  });
+}
+
+int ReadHolding(sqlite3* db, Holding& holding) {
+  int result = SchemaVersion(db, holding.version);
+  Statement count;
+  if (result == SQLITE_OK) {
+    result = count.Prepare(db, "SELECT value FROM number WHERE name = 'changes'");
+  }
+  bool found = false;
+  if (result == SQLITE_OK) {
+    result = count.ReadOne(found, [&] { holding.changes = count.Int(0); });
+  }
+  std::vector<std::string> tables;
+  Statement names;
+  if (result == SQLITE_OK) {
+    result = names.Prepare(db, "SELECT name FROM sqlite_schema WHERE type = 'table' ORDER BY name");
+  }
+  if (result == SQLITE_OK) {
+    result = names.ReadAll([&] { tables.push_back(names.Bytes(0)); });
+  }
+  for (const std::string& table : tables) {
+    result = result == SQLITE_OK ? ReadRows(db, table, holding.rows) : result;
+  }
+  return result;
+}
+
+// Another program may change the database meanwhile.
+int ReadHoldingAtOnce(const StateConnection& connection, Holding& holding) {
+  int result = Execute(connection.db, "BEGIN");
+  if (result == SQLITE_OK) {
+    result = ReadHolding(connection.db, holding);
+    (void)Execute(connection.db, "ROLLBACK");  // nothing was written
+  }
+  return result;
 }
 
 bool WriteSafely(const std::string& path, const std::string& bytes, std::string& error) {
@@ -155,15 +199,27 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
   return true;
 }
 
-bool LacksChangesOfCopy(const StateConnection& connection) {
+int LacksChangesOfCopy(const StateConnection& connection, bool& lacks) {
+  lacks = false;
   StateConnection copy;
   copy.path = connection.path + ".copy";
+  Holding left;
   if (!IsFileOrNothing(copy.path) || !OpenUnlogged(copy) ||
-      CountedChanges(copy) <= CountedChanges(connection)) {
-    return false;
+      ReadHoldingAtOnce(copy, left) != SQLITE_OK) {
+    return SQLITE_OK;
   }
+  Holding held;
+  const int result = ReadHoldingAtOnce(connection, held);
+  if (result != SQLITE_OK) {
+    return result;
+  }
+  // An upgrade leaves no copy.
+  const bool differs =
+      left.changes == held.changes && left.version == held.version && left.rows != held.rows;
   std::string image;
-  return ReadAll(copy.path, image) && IsSoundImage(image);
+  lacks =
+      (left.changes > held.changes || differs) && ReadAll(copy.path, image) && IsSoundImage(image);
+  return SQLITE_OK;
 }
 
 bool LeaveStateCopy(const StateConnection& connection, std::string& error) {

@@ -18,8 +18,9 @@ bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error);
 bool LeaveStateCopy(const StateConnection& connection, std::string& error);
 
 // Whether a sound copy has counted more changes than the open database: what the log held is gone,
-// or an older database was put there.
-bool LacksChangesOfCopy(const StateConnection& connection);
+// or an older database was put there. Where that came below a log that has the last change, both
+// have counted as many, and hold something else. SQLITE_OK, or why the database could not be read.
+int LacksChangesOfCopy(const StateConnection& connection, bool& lacks);
 
 // Sets the database aside and puts the copy in its place, under the lock `root`. Without a sound
 // copy nothing is touched. On failure `error`, which says what is wrong, is added to.

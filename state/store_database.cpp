@@ -70,6 +70,13 @@ Opened Failed(const StateConnection& connection, const char* what, int result, s
   return IsDamage(result) ? Opened::DAMAGED : Opened::FAILED;
 }
 
+// Tables that are not those of their version are damage, too.
+Opened FailedAtTables(const StateConnection& connection, const char* what, int result,
+                      std::string& error) {
+  const Opened outcome = Failed(connection, what, result, error);
+  return (result & 0xff) == SQLITE_ERROR ? Opened::DAMAGED : outcome;
+}
+
 Opened Upgrade(const StateConnection& connection, int64_t version, std::string& error) {
   int result = Execute(connection.db, "BEGIN IMMEDIATE");
   for (int64_t at = version; result == SQLITE_OK && at < STATE_VERSION; ++at) {
@@ -89,10 +96,7 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
     }
     return Opened::GOOD;
   }
-  Opened outcome = Failed(connection, "cannot upgrade", result, error);
-  if ((result & 0xff) == SQLITE_ERROR) {
-    outcome = Opened::DAMAGED;  // its tables are not those of its version
-  }
+  const Opened outcome = FailedAtTables(connection, "cannot upgrade", result, error);
   (void)Execute(connection.db, "ROLLBACK");  // the failure may have done it already
   return outcome;
 }
@@ -122,8 +126,13 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     error = connection.path + " is damaged";
     return Opened::DAMAGED;
   }
-  if (has_copy && LacksChangesOfCopy(connection)) {
-    error = connection.path + " has lost its last changes";
+  bool lacks = false;
+  result = has_copy ? LacksChangesOfCopy(connection, lacks) : SQLITE_OK;
+  if (result != SQLITE_OK) {
+    return FailedAtTables(connection, "cannot read", result, error);
+  }
+  if (lacks) {
+    error = connection.path + " has lost changes";
     return Opened::DAMAGED;
   }
   return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;

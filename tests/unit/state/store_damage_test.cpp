@@ -175,6 +175,26 @@ TEST_F(StoreDamageTest, AnOlderDatabaseGivesWayToTheCopy) {
   EXPECT_TRUE(ReadFile(database + ".damaged") == older);
 }
 
+// As whoever puts it back leaves it that does not know of the log: each table is that of the log if
+// that has it, else the older one.
+TEST_F(StoreDamageTest, AnOlderDatabaseBelowANewerLogGivesWayToTheCopy) {
+  const std::string older = ReadFile(database);
+  auto killed = OpenStore();
+  ASSERT_TRUE(killed->SetShareLanguage("a", "german"));
+  Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
+  ASSERT_TRUE(killed->AddFolder("/v/a/new", {}));
+  const std::string log = ReadFile(database + "-wal");
+  killed.reset();
+  WriteFile(database, older);
+  WriteFile(database + "-wal", log);
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_EQ(settings->folders.size(), 2U);
+  EXPECT_EQ(settings->shares[0].language, "german");
+  EXPECT_TRUE(ReadFile(database + ".damaged") == older);
+}
+
 TEST_F(StoreDamageTest, ACopyThatIsOlderOrDamagedOrAPipeIsPassedOver) {
   const std::string older = ReadFile(copy);
   ASSERT_TRUE(OpenStore()->SetPause(5));
