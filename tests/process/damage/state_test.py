@@ -1,69 +1,31 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """A state database that was damaged, removed or replaced: its copy is used, or all say what is wrong."""
 
-import ctypes
 import os
 import re
 import shutil
 import sqlite3
 
-from harness import IndexTest, main, namespace
+from damaged_state import (
+    COPY,
+    CREATE,
+    FILE,
+    USED,
+    StateDamageTest,
+    copy_log_back,
+    make_full_folder,
+    make_pipe,
+    remove,
+    remove_all_of,
+    scribble,
+    truncate,
+)
+from harness import main, namespace
 
-CREATE = 0x40
-FILE = f"{namespace.STATE}/state.db"
-COPY = f"{FILE}.copy"
-USED = re.compile(r".*state\.db.*its last copy is used instead.*")
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")
 UPGRADED = re.compile(r".*state\.db is upgraded from version 1 to \d+")
 UNREAD = re.compile(r"Failed to (read|store) .*")
 REINDEX = 0x10000
-AT_FDCWD = -100
-RENAME_EXCHANGE = 2
-
-
-def remove(path):
-    if os.path.isdir(path) and not os.path.islink(path):
-        shutil.rmtree(path)
-    elif os.path.lexists(path):
-        os.unlink(path)
-
-
-def remove_all_of(path):
-    for ending in ("-wal", "-shm", ""):  # the last is what programs look for, and make anew
-        remove(path + ending)
-
-
-def scribble(path, start=0):
-    with open(path, "r+b") as file:
-        file.seek(start)
-        file.write(b"\xa5" * max(os.fstat(file.fileno()).st_size - start, 5000))
-
-
-def truncate(part):
-    os.truncate(FILE, int(os.path.getsize(FILE) * part))
-
-
-def make_full_folder(path):
-    made = f"{path}.folder"
-    os.makedirs(f"{made}/in/its/place")
-    libc = ctypes.CDLL(None, use_errno=True)
-    names = (AT_FDCWD, os.fsencode(made), AT_FDCWD, os.fsencode(path))
-    if libc.renameat2(*names, RENAME_EXCHANGE) != 0:
-        raise OSError(ctypes.get_errno(), "renameat2", path)
-    os.unlink(made)
-
-
-def make_pipe(path):
-    os.mkfifo(f"{path}.pipe")
-    os.rename(f"{path}.pipe", path)  # programs make the file anew where it is missing
-
-
-def copy_log_back():
-    """So that the main file alone holds the state, for those too who have it open."""
-    with sqlite3.connect(FILE) as db:
-        while db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] != 0:
-            pass  # a reader was in the way
-    db.close()
 
 
 def version():
@@ -128,20 +90,7 @@ IN_PLACE = (
 )
 
 
-class StateTest(IndexTest):
-    def prepare(self):
-        self.root = self.make_share(files=("a.txt", "d/b.txt"))
-        self.pid = self.start()
-        self.await_drained("alpha")
-        self.log.program, daemon = "talocontentsearchd", self.log.program
-        self.await_line("reads")  # nobody opens the database meanwhile
-        self.log.program = daemon
-
-    def told(self, pattern, after):
-        """The lines that match, of all programs."""
-        self.log.mark()
-        return [line for line in self.log.lines[after:] if pattern.fullmatch(line.text)]
-
+class StateTest(StateDamageTest):
     def assert_all_said(self, pattern):
         """Every tool ends with one line that tells."""
         for command in (
@@ -155,37 +104,6 @@ class StateTest(IndexTest):
             ("event", "alpha", str(CREATE), self.root),
         ):
             self.assertRegex(self.ctl(*command, code=1).err.decode(), pattern)
-
-    def check_works(self):
-        self.make_files(self.root, "touched.txt")
-        self.ctl("event", "alpha", str(CREATE), f"{self.root}/touched.txt")
-        self.await_drained("alpha")
-        self.assert_index(self.root)
-        (share,) = self.ctl("share", "list", "--json").json()
-        self.assertEqual(share["name"], "alpha")
-
-    def damaged_while_stopped(self, damage):
-        self.prepare()
-        self.stop(self.pid)
-        damage()
-
-        after = self.log.mark()
-        self.start()
-
-        self.assertEqual(len(self.told(USED, after)), 1)
-        self.check_works()
-
-    def damaged_while_running(self, damage):
-        self.prepare()
-        after = self.log.mark()
-        damage()
-
-        self.check_works()
-
-        self.stop(self.pid)
-        self.start()
-        self.check_works()
-        self.assertEqual(len(self.told(USED, after)), 1)
 
     def damaged_in_place(self, damage):
         self.prepare()

@@ -68,14 +68,7 @@ class MachineTest(unittest.TestCase):
         self.prefixed = True  # every line of the daemon has its source in front
 
     def tearDown(self):
-        for pid in children():
-            with contextlib.suppress(ProcessLookupError):
-                os.kill(pid, signal.SIGKILL)
-        while left := children():  # whose children come to us in turn
-            for pid in left:
-                with contextlib.suppress(ProcessLookupError):
-                    os.kill(pid, signal.SIGKILL)
-                os.waitpid(pid, 0)
+        self.kill_all()
         self.log.close()
         self._check_reports()
         self._check_lines()
@@ -169,6 +162,17 @@ class MachineTest(unittest.TestCase):
     def kill(self, pid):
         os.kill(pid, signal.SIGKILL)
         self.assertEqual(self.await_exit(pid), -signal.SIGKILL)
+
+    def kill_all(self):
+        """Every program that runs."""
+        for pid in children():
+            with contextlib.suppress(ProcessLookupError):
+                os.kill(pid, signal.SIGKILL)
+        while left := children():  # whose children come to us in turn
+            for pid in left:
+                with contextlib.suppress(ProcessLookupError):
+                    os.kill(pid, signal.SIGKILL)
+                os.waitpid(pid, 0)
 
     # Its log.
 
