@@ -234,8 +234,15 @@ IndexError Converger::RefreshTwins(const std::string& path, const Look& look, bo
     if (twin_look.verdict == Verdict::UNKNOWN) {
       return IndexError::IO;
     }
-    if (twin_look.verdict != Verdict::BELONGS) {
-      error = RemoveAt(twin, true);
+    Entry known;
+    bool found = false;
+    error = Sql(table.Find(twin, known, found));
+    if (error != IndexError::NONE) {
+      return error;
+    }
+    // The number may have been that of another thing, perhaps of a folder with much below it.
+    if (twin_look.verdict != Verdict::BELONGS || IsOtherThing(known, EntryOf(twin, twin_look))) {
+      other_paths.push_back(twin);
       continue;
     }
     Outcome ignored = Outcome::SAME;

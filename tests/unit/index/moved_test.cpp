@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // What was renamed is found under its new path alone, whatever order the events come in.
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstdio>
 
+#include "state/layout.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -69,6 +71,25 @@ TEST_P(MovedTest, RenamingOntoAnotherLeavesOneOfThem) {
   Refresh("a");
   Commit();
   EXPECT_EQ(Held(), Names({"", "a"}));
+  EXPECT_EQ(Differences(), Names());
+}
+
+// A file may get the inode number of a folder that is gone.
+TEST_P(MovedTest, LinkInThePlaceOfAFolderWithTheSameNumberLeavesNothingOfIt) {
+  Folder("d/in", {"f"});
+  AddAll();
+  RemoveTree(At("d"));
+  WriteFile(At("new"), "x");
+  Link("new", "d");
+  struct stat status {};
+  ASSERT_EQ(stat(At("new").c_str(), &status), 0);
+  writer.reset();
+  Run("sqlite3 " + IndexPath("s") + "/entries.db 'UPDATE entries SET inode = " +
+      std::to_string(status.st_ino) + " WHERE path = CAST(\"" + At("d") + "\" AS BLOB)'");
+  OpenWriter();
+  Add("new");
+  Commit();
+  EXPECT_EQ(Held(), Names({"", "d", "new"}));
   EXPECT_EQ(Differences(), Names());
 }
 
