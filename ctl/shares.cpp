@@ -42,21 +42,33 @@ bool CanBeShare(const std::string& path) {
   return true;
 }
 
-// Out of the way first: a program that has not seen yet that the share is gone makes nothing more
-// there. What a removal that was cut short left goes too. No share's name begins with a dot.
+constexpr int MOST_TRIES = 100;
+
+// Again where a program that was just making a file there made it a moment too late.
+void RemoveAll(const std::string& path, std::error_code& error) {
+  for (int i = 0; i == 0 || (i < MOST_TRIES && error == std::errc::directory_not_empty); ++i) {
+    error.clear();
+    (void)std::filesystem::remove_all(path, error);
+  }
+}
+
+// Out of the way first: what has not seen yet that the share is gone makes nothing more there,
+// unless it makes the folder itself. What a removal that was cut short left goes too. No share's
+// name begins with a dot.
 bool RemoveShareFolder(const std::string& name) {
   const std::string folder = ShareFolder(name);
   const std::string removed = ShareFolder("." + name + ".removed");
   std::error_code error;
-  (void)std::filesystem::remove_all(removed, error);
+  RemoveAll(removed, error);
   if (!error) {
     std::filesystem::rename(folder, removed, error);
+    // Where folders cannot be renamed (a mount point, a lower layer of an overlay): as it stands.
+    const bool stands = error && error != std::errc::no_such_file_or_directory;
+    RemoveAll(stands ? folder : removed, error);
   }
-  if (error == std::errc::no_such_file_or_directory) {
-    error.clear();
-  }
-  if (!error) {
-    (void)std::filesystem::remove_all(removed, error);
+  std::error_code ignored;
+  if (error == std::errc::device_or_resource_busy && std::filesystem::is_empty(folder, ignored)) {
+    error.clear();  // a mount point itself stays
   }
   if (error) {
     (void)Fail(EXIT_FAILED, "%s: %s", folder.c_str(), error.message().c_str());

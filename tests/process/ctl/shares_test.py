@@ -5,6 +5,7 @@ import os
 import subprocess
 
 from harness import IndexTest, main, namespace
+from harness.awaiting import LIMIT
 
 # Makes files until their folder is gone.
 WRITER = """
@@ -152,7 +153,22 @@ class SharesTest(IndexTest):
         self.check_remove()
 
         for writer in writers:
-            self.assertEqual(writer.wait(), 0)
+            self.assertEqual(writer.wait(LIMIT), 0)
+
+    def test_remove_where_the_share_s_folder_is_a_mount_point(self):
+        self.make_share(files=("a.txt",))
+        folder = f"{namespace.STATE}/shares/alpha"
+        namespace.mount("tmpfs", folder, "tmpfs")
+        with open(f"{folder}/left", "wb"):
+            pass
+
+        self.ctl("share", "remove", "alpha")
+
+        self.assertEqual(os.listdir(folder), [])
+        self.make_share(files=("b.txt",))
+        self.start()
+        self.await_drained("alpha")
+        self.assert_index(self.root)
 
     def test_removed_share_can_be_added_again(self):
         self.make_share(files=("a.txt",))
