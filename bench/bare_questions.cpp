@@ -39,7 +39,7 @@ const DatabaseForm BARE_FORM = {
     .schema = BARE_SCHEMA,
     .probe = "count(*)",
     .probed = "entries WHERE id < 0",
-    .stamp = nullptr,
+    .last_commit = nullptr,
     .prepare = RegisterTextTokenizer,
 };
 

@@ -41,11 +41,7 @@ void AskedShare::Fail(const std::string& what) {
 
 // A database that was made anew, or contents that have come since, are opened.
 bool AskedShare::IsInPlace() const {
-  int moved = 0;
-  return reader.database.IsOpen() && !reader.database.HasMoved() && has_contents &&
-         sqlite3_file_control(reader.database.db, "contents", SQLITE_FCNTL_HAS_MOVED, &moved) ==
-             SQLITE_OK &&
-         moved == 0;
+  return reader.database.IsOpen() && has_contents && !reader.database.HasMoved();
 }
 
 void AskedShare::Release() {

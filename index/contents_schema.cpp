@@ -97,7 +97,7 @@ const DatabaseForm CONTENTS_FORM = {
     .schema = CONTENTS_SCHEMA,
     .probe = "last_text",
     .probed = "meta WHERE id = 1",
-    .stamp = nullptr,  // a text that is missing is read again
+    .last_commit = nullptr,  // a text that is missing is read again
     .prepare = RegisterTextTokenizer,
 };
 

@@ -7,13 +7,13 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cerrno>
-#include <filesystem>
 #include <optional>
-#include <system_error>
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "index/database_place.h"
 #include "index/last_commit.h"
 #include "index/log_check.h"
 #include "index/schema.h"
@@ -84,43 +84,6 @@ void KeepLog(sqlite3* db, const char* name) {
   sqlite3_file_control(db, name, SQLITE_FCNTL_PERSIST_WAL, &persist);
 }
 
-// Whether what stands in a database's place, and is none, holds something all the same: a file in
-// that of its folder, a folder with something in it, a log beside an empty file.
-bool HoldsSomething(const std::string& index_path, const std::string& file) {
-  struct stat status {};
-  if (lstat(index_path.c_str(), &status) == 0 && S_ISREG(status.st_mode)) {
-    return status.st_size > 0;
-  }
-  if (lstat(file.c_str(), &status) != 0) {
-    return false;
-  }
-  if (S_ISDIR(status.st_mode)) {
-    std::error_code error;
-    return !std::filesystem::is_empty(file, error) && !error;
-  }
-  return S_ISREG(status.st_mode) && lstat((file + "-wal").c_str(), &status) == 0 &&
-         S_ISREG(status.st_mode) && status.st_size > 0;
-}
-
-// NONE when a regular file stands where the database should be, and nothing but files beside it.
-IndexError FindFile(const std::string& index_path, const std::string& file) {
-  struct stat status {};
-  if (lstat(index_path.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
-    const bool absent = errno == ENOENT || errno == ENOTDIR;
-    return absent || status.st_mode != 0 ? IndexError::PATH_NOT_FOUND : IndexError::IO;
-  }
-  if (lstat(file.c_str(), &status) != 0) {
-    return errno == ENOENT ? IndexError::PATH_NOT_FOUND : IndexError::IO;
-  }
-
-  // An empty file is a valid database to SQLite, without a schema.
-  if (!S_ISREG(status.st_mode) || status.st_size == 0) {
-    return IndexError::PATH_NOT_FOUND;
-  }
-  return IsFileOrNothing(file + "-wal") && IsFileOrNothing(file + "-shm") ? IndexError::NONE
-                                                                          : IndexError::DAMAGED;
-}
-
 // What a database is that is not ours, or not of this version. One without tables holds nothing.
 IndexError JudgeStranger(sqlite3* db, const std::string& name, bool other_program,
                          std::optional<IndexFlaw>& flaw) {
@@ -134,6 +97,11 @@ IndexError JudgeStranger(sqlite3* db, const std::string& name, bool other_progra
     flaw = other_program ? IndexFlaw::OTHER_PROGRAM : IndexFlaw::OTHER_VERSION;
   }
   return IndexError::PATH_NOT_FOUND;
+}
+
+// Our numbers without our tables: somebody's knife.
+IndexError FromTables(int code) {
+  return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }
 
 std::string Ask(const char* what, const std::string& name, const DatabaseForm& form) {
@@ -159,8 +127,7 @@ IndexError CheckSchema(sqlite3* db, const std::string& name, const DatabaseForm&
   }
 
   code = ReadNumber(db, Ask(form.probe, name, form), answer);
-  // Our numbers without our tables: somebody's knife.
-  return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
+  return FromTables(code);
 }
 
 IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
@@ -192,20 +159,21 @@ IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
 }
 
 // Whether commits are missing from what was opened for writing.
-IndexError CheckCommits(sqlite3* db, const std::string& file, const DatabaseForm& form) {
+IndexError CheckCommits(sqlite3* db, const std::string& index_path, const DatabaseForm& form) {
   if (HasLostCommits(db)) {
     return IndexError::DAMAGED;
   }
-  if (form.stamp == nullptr) {
+  if (form.last_commit == nullptr) {
     return IndexError::NONE;
   }
 
+  const int64_t noted = NotedCommit(index_path);
   int64_t last = 0;
-  const int code = ReadNumber(db, Ask(form.stamp, "main", form), last);
+  const int code = ReadNumber(db, Ask(form.last_commit, "main", form), last);
   if (code != SQLITE_OK) {
-    return FromSqlite(code);
+    return FromTables(code);
   }
-  return LacksNotedCommit(file, last) ? IndexError::DAMAGED : IndexError::NONE;
+  return noted > last ? IndexError::DAMAGED : IndexError::NONE;
 }
 
 IndexError FromErrno() {
@@ -309,7 +277,7 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
   std::optional<IndexFlaw> flaw;
   IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db, flaw);
   if (error == IndexError::NONE) {
-    error = CheckCommits(db, index_path + "/" + form.file, form);
+    error = CheckCommits(db, index_path, form);
     if (error != IndexError::NONE) {
       Close();
     }
@@ -333,6 +301,7 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
 
   if (error == IndexError::NONE) {
     sqlite3_wal_hook(db, CutLongLog, nullptr);
+    Remember("main", index_path + "/" + form.file);
   }
   return error;
 }
@@ -340,7 +309,11 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
 IndexError IndexDatabase::OpenForReading(const std::string& index_path, const DatabaseForm& form) {
   Close();
   std::optional<IndexFlaw> left;  // as it is: readers move nothing
-  return OpenExisting(index_path, form, PRAGMAS_FOR_READING, db, left);
+  const IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_READING, db, left);
+  if (error == IndexError::NONE) {
+    Remember("main", index_path + "/" + form.file);
+  }
+  return error;
 }
 
 // What is wrong with it is found out by opening it alone, and only then: that costs as much again.
@@ -368,6 +341,7 @@ IndexError IndexDatabase::Attach(const std::string& index_path, const char* name
     std::optional<IndexFlaw> left;
     error = CheckSchema(db, name, form, left);
     if (error == IndexError::NONE) {
+      Remember(name, file);
       return error;
     }
     (void)Execute(db, (std::string("DETACH ") + name).c_str());  // nothing is under way in it
@@ -378,14 +352,22 @@ IndexError IndexDatabase::Attach(const std::string& index_path, const char* name
   return found == IndexError::NONE ? error : found;
 }
 
+void IndexDatabase::Remember(const char* name, const std::string& file) {
+  files.push_back({name, file, LogInode(file)});
+}
+
 void IndexDatabase::Close() {
+  files.clear();
   sqlite3_close_v2(std::exchange(db, nullptr));
 }
 
 bool IndexDatabase::HasMoved() const {
-  int moved = 0;
-  const int code = sqlite3_file_control(db, "main", SQLITE_FCNTL_HAS_MOVED, &moved);
-  return code == SQLITE_OK && moved != 0;
+  return std::any_of(files.begin(), files.end(), [this](const OpenedFile& opened) {
+    int moved = 0;
+    const int code = sqlite3_file_control(db, opened.name.c_str(), SQLITE_FCNTL_HAS_MOVED, &moved);
+    return (code == SQLITE_OK && moved != 0) ||
+           (opened.log != 0 && LogInode(opened.file) != opened.log);
+  });
 }
 
 }  // namespace fileindexd

@@ -3,9 +3,11 @@
 #pragma once
 
 #include <sqlite3.h>
+#include <sys/types.h>
 
 #include <cstdint>
 #include <string>
+#include <vector>
 
 namespace fileindexd {
 
@@ -33,7 +35,8 @@ struct DatabaseForm {
   const char* schema;           // makes the tables in an empty database, and sets both numbers
   const char* probe;            // a number that only our tables give, and
   const char* probed;           // the rows to ask for it
-  const char* stamp;            // of these: what each commit lets grow; null: no note is kept of it
+  const char* last_commit;      // a column there that grows with each commit, which is noted beside
+                                // the database as well (see last_commit.h); null: there is none
   int (*prepare)(sqlite3* db);  // what the tables need of a connection; null: nothing
 };
 
@@ -66,11 +69,21 @@ class IndexDatabase {
   void Close();
 
   bool IsOpen() const { return db != nullptr; }
-  // True when the file is no longer the one at its path.
+  // True when a file that is open here, or its log, is no longer the one at its path.
   bool HasMoved() const;
 
   sqlite3* db = nullptr;
   bool has_set_aside = false;  // the last OpenForWriting did, which the system log tells
+
+ private:
+  struct OpenedFile {
+    std::string name;  // in this connection
+    std::string file;
+    ino_t log;  // 0: there was none
+  };
+  void Remember(const char* name, const std::string& file);
+
+  std::vector<OpenedFile> files;
 };
 
 }  // namespace fileindexd

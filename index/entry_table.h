@@ -45,9 +45,8 @@ class EntryTable {
   int Prepare(sqlite3* db);
 
   int Begin();
-  // Writes the number of entries and the time into `meta`, and commits.
+  // Writes the number of entries and the time into `meta`, lets `last_written` grow, and commits.
   int Commit(int64_t now);
-  int64_t LastStamp() const { return last_written; }
   void Rollback();
 
   int Find(const std::string& path, Entry& entry, bool& found);
@@ -73,9 +72,10 @@ class EntryTable {
   // which a directory was read, nearly each removal would write one.
   int RemoveAll(std::vector<const Entry*> leaving);
 
-  uint64_t changes = 0;  // rows changed since Prepare
-  int64_t entries = 0;   // rows, as this transaction sees them
-  int64_t inserted = 0;  // `id` of the row that Insert made last
+  uint64_t changes = 0;      // rows changed since Prepare
+  int64_t entries = 0;       // rows, as this transaction sees them
+  int64_t inserted = 0;      // `id` of the row that Insert made last
+  int64_t last_written = 0;  // greater than each `written`; of the last commit, once it is made
   sqlite3* handle = nullptr;
 
  private:
@@ -90,8 +90,7 @@ class EntryTable {
   Statement insert, update, remove;
   Statement insert_name, insert_part, remove_name, remove_part;
   NameFolder folder;
-  int64_t removed = 0;       // rows since room was last given back, the same
-  int64_t last_written = 0;  // of all rows there ever were, and of commits, the same
+  int64_t removed = 0;  // rows since room was last given back, the same
 };
 
 }  // namespace fileindexd

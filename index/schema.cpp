@@ -63,7 +63,7 @@ const DatabaseForm ENTRIES_FORM = {
     .schema = ENTRIES_SCHEMA,
     .probe = "entries",
     .probed = "meta WHERE id = 1",
-    .stamp = "last_written",
+    .last_commit = "last_written",
     .prepare = nullptr,
 };
 

@@ -2,6 +2,7 @@
 // Schema of the entries database, shared by all who read or write it.
 //
 //   INDEX/entries.db
+//   INDEX/last-commit    see last_commit.h
 //
 //   entries      one row for each thing that belongs
 //     id              rowid; the same number in `names` and `parts`
@@ -22,12 +23,12 @@
 //                     attributes: its bytes may differ from those that were there before, even if
 //                     size and mtime do not; 0: none
 //   names        words of the last path component as NameRow gives them; no stored copy, so
-//   deleting
-//                needs the text that was inserted
+//                deleting needs the text that was inserted
 //   parts        the folded name by trigrams, for substrings
 //   meta         one row: number of rows in `entries`, when the last commit was made (seconds), how
-//                many rows were removed since room was last given back, the greatest `written`, and
-//                a random number that tells this database from the one that was there before it
+//                many rows were removed since room was last given back, a number that is greater
+//                than each `written` and grows with each commit, and a random number that tells
+//                this database from the one that was there before it
 //
 // application_id tells that a database is ours, user_version which schema it holds. A change of the
 // tables, of the tokenizers or of the text that is given to them is a new version.

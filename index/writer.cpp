@@ -193,8 +193,9 @@ IndexError EntryWriter::Impl::Fail(IndexError error) {
   replay_needed = !list.empty();
   if (error == IndexError::DAMAGED) {
     CloseDamaged();
-  } else if (sqlite3_get_autocommit(database.db) == 0) {
-    // The rollback failed too, for want of memory: closing undoes what was half done.
+  } else if (error == IndexError::OTHER || sqlite3_get_autocommit(database.db) == 0) {
+    // Somebody has changed the tables, and an opening sees it; or the rollback failed too, for want
+    // of memory, and closing undoes what was half done.
     CloseAll();
     next_open = 0;
   }
@@ -278,11 +279,8 @@ IndexError EntryWriter::Impl::CommitTransaction() {
   }
 
   const int code = table->Commit(static_cast<int64_t>(time(nullptr)));
-  if (code != SQLITE_OK) {
-    return FailSql(FromSqlite(code));
-  }
-  NoteLastCommit(sqlite3_db_filename(database.db, "main"), table->LastStamp());
-  return IndexError::NONE;
+  to_note = code == SQLITE_OK ? table->last_written : 0;
+  return code == SQLITE_OK ? IndexError::NONE : FailSql(FromSqlite(code));
 }
 
 IndexError EntryWriter::Impl::Commit() {
@@ -294,6 +292,7 @@ IndexError EntryWriter::Impl::Commit() {
         replay_needed || std::any_of(list.begin(), list.end(),
                                      [](const auto& operation) { return !operation.applied; });
     error = EnsureApplied(true);
+    to_note = 0;
     if (error == IndexError::NONE) {
       error = CommitTransaction();
     }
@@ -304,6 +303,9 @@ IndexError EntryWriter::Impl::Commit() {
   }
   if (error != IndexError::NONE) {
     return error;
+  }
+  if (to_note != 0) {
+    NoteLastCommit(IndexPath(share_name), std::exchange(to_note, 0));
   }
 
   std::erase_if(list, [](const EntryOperation& operation) { return operation.applied; });

@@ -74,6 +74,7 @@ struct EntryWriter::Impl {
   std::vector<EntryOperation> list;
   bool replay_needed = false;  // something on the list is not applied, for no fault of its own
   uint64_t changes_begun = 0;  // table->changes when the transaction began
+  int64_t to_note = 0;         // the last commit, until it is noted; 0: it is
   int64_t next_open = 0;       // monotonic milliseconds
   int64_t next_replay = 0;     // the same
   IndexError open_error = IndexError::NONE;

@@ -60,6 +60,11 @@ bool IsFileOrNothing(const std::string& path) {
   return lstat(path.c_str(), &st) != 0 || S_ISREG(st.st_mode);
 }
 
+ino_t LogInode(const std::string& database) {
+  struct stat log {};
+  return lstat((database + "-wal").c_str(), &log) == 0 ? log.st_ino : 0;
+}
+
 int QuickCheck(sqlite3* db, bool& ok) {
   Statement check;
   int result = check.Prepare(db, "PRAGMA quick_check(1)");

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <sqlite3.h>
+#include <sys/types.h>
 
 #include <cstdint>
 #include <initializer_list>
@@ -23,6 +24,10 @@ int Execute(sqlite3* db, const char* sql);
 // Whether a regular file or nothing stands there. SQLite would wait for ever in a pipe, and fails
 // without end at a folder.
 bool IsFileOrNothing(const std::string& path);
+
+// The log that stands beside a database; 0: none. While a connection is open nobody but SQLite's
+// users removes it, and none of them does: another number says that it went all the same.
+ino_t LogInode(const std::string& database);
 
 // A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
 class Statement {

@@ -60,11 +60,6 @@ bool MakeFile(const std::string& path, std::string& error) {
   return true;
 }
 
-ino_t LogInode(const StateConnection& connection) {
-  struct stat log {};
-  return lstat((connection.path + "-wal").c_str(), &log) == 0 ? log.st_ino : 0;
-}
-
 Opened Failed(const StateConnection& connection, const char* what, int result, std::string& error) {
   error = StateError(connection, what);
   return IsDamage(result) ? Opened::DAMAGED : Opened::FAILED;
@@ -157,7 +152,7 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
     return Failed(connection, "cannot set up", result, error);
   }
   TidyOnClose(connection, true);
-  connection.log_inode = LogInode(connection);
+  connection.log_inode = LogInode(connection.path);
   return Opened::GOOD;
 }
 
@@ -201,7 +196,7 @@ bool HasStateMoved(const StateConnection& connection) {
   int moved = 0;
   const int result = sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_HAS_MOVED, &moved);
   return (result == SQLITE_OK && moved != 0) ||
-         (connection.log_inode != 0 && LogInode(connection) != connection.log_inode);
+         (connection.log_inode != 0 && LogInode(connection.path) != connection.log_inode);
 }
 
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {

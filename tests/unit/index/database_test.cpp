@@ -263,7 +263,7 @@ TEST_F(DatabaseTest, DatabaseWhoseLogWasCopiedBackGoesOn) {
 }
 
 TEST_F(DatabaseTest, NoteOfTheLastCommitThatIsNoneCountsForNothing) {
-  const std::string note = file + "-last";
+  const std::string note = index + "/last-commit";
   const std::string good = ReadFile(note);
   ASSERT_EQ(good.size(), 20U);
   for (const std::string& text : {std::string(), std::string("9999999999999999999\n"),
