@@ -18,6 +18,11 @@ inline int StepError(int code) {
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
+// Whether a code says that the database is damaged, or none at all.
+inline bool IsDamage(int code) {
+  return (code & 0xff) == SQLITE_CORRUPT || (code & 0xff) == SQLITE_NOTADB;
+}
+
 // Statements separated by ';', whose rows nobody wants.
 int Execute(sqlite3* db, const char* sql);
 

@@ -86,7 +86,7 @@ bool StateStore::Impl::Ready() {
 // damaged one is put right by an opening, and by nothing else.
 bool StateStore::Impl::FailSql() {
   const int code = sqlite3_errcode(connection->db) & 0xff;
-  const bool damaged = code == SQLITE_CORRUPT || code == SQLITE_NOTADB;
+  const bool damaged = IsDamage(code);
   if (damaged) {
     TidyOnClose(*connection, false);
   }

@@ -13,6 +13,7 @@
 #include <filesystem>
 #include <system_error>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "state/sqlite.h"
@@ -45,25 +46,6 @@ bool ReadAll(const std::string& path, std::string& bytes) {
     }
     bytes.append(buffer, static_cast<size_t>(length));
   }
-}
-
-// Whether the bytes are a sound database with tables of ours, in the form of a copy.
-bool IsSoundImage(std::string image) {
-  StateConnection memory;
-  auto* bytes = reinterpret_cast<unsigned char*>(image.data());
-  const auto size = static_cast<sqlite3_int64>(image.size());
-  if (image.empty() || sqlite3_open(":memory:", &memory.db) != SQLITE_OK ||
-      sqlite3_deserialize(memory.db, "main", bytes, size, size, SQLITE_DESERIALIZE_READONLY) !=
-          SQLITE_OK) {
-    return false;
-  }
-  int64_t version = 0;
-  bool ok = false;
-  const bool sound = SchemaVersion(memory.db, version) == SQLITE_OK && version > 0 &&
-                     QuickCheck(memory.db, ok) == SQLITE_OK && ok;
-  sqlite3_close(memory.db);  // before the bytes go
-  memory.db = nullptr;
-  return sound;
 }
 
 // What a database holds, as it was at one moment.
@@ -116,6 +98,37 @@ int ReadHoldingAtOnce(const StateConnection& connection, Holding& holding) {
     (void)Execute(connection.db, "ROLLBACK");  // nothing was written
   }
   return result;
+}
+
+// Whether the bytes are a sound database with tables of ours, in the form of a copy, and what it
+// holds. SQLITE_OK, or what kept that from being seen.
+int LookInto(std::string image, bool& sound, Holding& holding) {
+  sound = false;
+  StateConnection memory;  // closed before the bytes go
+  auto* bytes = reinterpret_cast<unsigned char*>(image.data());
+  const auto size = static_cast<sqlite3_int64>(image.size());
+  int result = image.empty() ? SQLITE_NOTADB : sqlite3_open(":memory:", &memory.db);
+  if (result == SQLITE_OK && sqlite3_deserialize(memory.db, "main", bytes, size, size,
+                                                 SQLITE_DESERIALIZE_READONLY) != SQLITE_OK) {
+    result = SQLITE_NOMEM;  // the bytes are not looked at yet
+  }
+  bool ok = false;
+  if (result == SQLITE_OK) {
+    result = QuickCheck(memory.db, ok);
+  }
+  if (result == SQLITE_OK && ok) {
+    result = ReadHolding(memory.db, holding);
+  }
+  sound = result == SQLITE_OK && ok && holding.version > 0;
+  // One that cannot be opened asks for a log of its own.
+  const bool unsound = IsDamage(result) || result == SQLITE_ERROR || result == SQLITE_CANTOPEN;
+  return unsound ? SQLITE_OK : result;
+}
+
+bool IsSoundImage(const std::string& image) {
+  bool sound = false;
+  Holding holding;
+  return LookInto(image, sound, holding) == SQLITE_OK && sound;
 }
 
 bool WriteSafely(const std::string& path, const std::string& bytes, std::string& error) {
@@ -199,26 +212,34 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
   return true;
 }
 
-int LacksChangesOfCopy(const StateConnection& connection, bool& lacks) {
+int LacksChangesOfCopy(const StateConnection& connection, bool& lacks, std::string& error) {
   lacks = false;
-  StateConnection copy;
-  copy.path = connection.path + ".copy";
-  Holding left;
-  if (!IsFileOrNothing(copy.path) || !OpenUnlogged(copy) ||
-      ReadHoldingAtOnce(copy, left) != SQLITE_OK) {
+  const std::string path = connection.path + ".copy";
+  if (!IsFileOrNothing(path)) {
     return SQLITE_OK;
   }
-  Holding held;
-  const int result = ReadHoldingAtOnce(connection, held);
+  std::string image;
+  if (!ReadAll(path, image)) {
+    error = StateFileError("cannot read", path);
+    return SQLITE_IOERR;
+  }
+  bool sound = false;
+  Holding left;
+  int result = LookInto(std::move(image), sound, left);
   if (result != SQLITE_OK) {
+    error = "cannot read " + path + ": " + sqlite3_errstr(result);
+    return result;
+  }
+  Holding held;
+  result = ReadHoldingAtOnce(connection, held);
+  if (result != SQLITE_OK) {
+    error = StateError(connection, "cannot read");
     return result;
   }
   // An upgrade leaves no copy.
   const bool differs =
       left.changes == held.changes && left.version == held.version && left.rows != held.rows;
-  std::string image;
-  lacks =
-      (left.changes > held.changes || differs) && ReadAll(copy.path, image) && IsSoundImage(image);
+  lacks = sound && (left.changes > held.changes || differs);
   return SQLITE_OK;
 }
 

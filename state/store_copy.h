@@ -19,8 +19,9 @@ bool LeaveStateCopy(const StateConnection& connection, std::string& error);
 
 // Whether a sound copy has counted more changes than the open database: what the log held is gone,
 // or an older database was put there. Where that came below a log that has the last change, both
-// have counted as many, and hold something else. SQLITE_OK, or why the database could not be read.
-int LacksChangesOfCopy(const StateConnection& connection, bool& lacks);
+// have counted as many, and hold something else. A copy that is damaged has nothing to say; one
+// that cannot be read now may have. SQLITE_OK, or what kept one of the two from being read.
+int LacksChangesOfCopy(const StateConnection& connection, bool& lacks, std::string& error);
 
 // Sets the database aside and puts the copy in its place, under the lock `root`. Without a sound
 // copy nothing is touched. On failure `error`, which says what is wrong, is added to.

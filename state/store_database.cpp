@@ -38,10 +38,6 @@ constexpr const char* UPGRADES[STATE_VERSION] = {
 
 enum class Opened { GOOD, DAMAGED, FAILED };
 
-bool IsDamage(int result) {
-  return (result & 0xff) == SQLITE_CORRUPT || (result & 0xff) == SQLITE_NOTADB;
-}
-
 // SQLite would make the file with the mode that the umask leaves. Its log and its shared memory
 // take the mode of the database.
 bool MakeFile(const std::string& path, std::string& error) {
@@ -66,10 +62,8 @@ Opened Failed(const StateConnection& connection, const char* what, int result, s
 }
 
 // Tables that are not those of their version are damage, too.
-Opened FailedAtTables(const StateConnection& connection, const char* what, int result,
-                      std::string& error) {
-  const Opened outcome = Failed(connection, what, result, error);
-  return (result & 0xff) == SQLITE_ERROR ? Opened::DAMAGED : outcome;
+Opened FailedAtTables(int result) {
+  return IsDamage(result) || (result & 0xff) == SQLITE_ERROR ? Opened::DAMAGED : Opened::FAILED;
 }
 
 Opened Upgrade(const StateConnection& connection, int64_t version, std::string& error) {
@@ -91,9 +85,9 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
     }
     return Opened::GOOD;
   }
-  const Opened outcome = FailedAtTables(connection, "cannot upgrade", result, error);
+  error = StateError(connection, "cannot upgrade");
   (void)Execute(connection.db, "ROLLBACK");  // the failure may have done it already
-  return outcome;
+  return FailedAtTables(result);
 }
 
 // The version is looked at before anything else is believed: a newer one may hold anything.
@@ -122,9 +116,9 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     return Opened::DAMAGED;
   }
   bool lacks = false;
-  result = has_copy ? LacksChangesOfCopy(connection, lacks) : SQLITE_OK;
+  result = has_copy ? LacksChangesOfCopy(connection, lacks, error) : SQLITE_OK;
   if (result != SQLITE_OK) {
-    return FailedAtTables(connection, "cannot read", result, error);
+    return FailedAtTables(result);
   }
   if (lacks) {
     error = connection.path + " has lost changes";

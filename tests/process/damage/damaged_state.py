@@ -5,6 +5,7 @@ import ctypes
 import os
 import re
 import shutil
+import signal
 import sqlite3
 
 from harness import IndexTest, namespace
@@ -65,6 +66,12 @@ def copy_log_back():
     db.close()
 
 
+def thread_states(pid):
+    for thread in os.listdir(f"/proc/{pid}/task"):
+        with open(f"/proc/{pid}/task/{thread}/stat", encoding="utf-8") as file:
+            yield file.read().rpartition(") ")[2]
+
+
 class StateDamageTest(IndexTest):
     def prepare(self):
         self.root = self.make_share(files=("a.txt", "d/b.txt"))
@@ -98,10 +105,19 @@ class StateDamageTest(IndexTest):
         self.assertEqual(len(self.told(USED, after)), 1)
         self.check_works()
 
+    def at_once(self, damage):
+        """In one step, to the content service: it opens the database when it likes."""
+        service = self.service_pid()
+        os.kill(service, signal.SIGSTOP)
+        while not all(state.startswith("T") for state in thread_states(service)):
+            os.sched_yield()
+        damage()
+        os.kill(service, signal.SIGCONT)
+
     def damaged_while_running(self, damage):
         self.prepare()
         after = self.log.mark()
-        damage()
+        self.at_once(damage)
 
         self.check_works()
 

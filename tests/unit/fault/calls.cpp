@@ -176,6 +176,11 @@ int open64(const char* path, int flags, ...) {
   return fileindexd::fault::StrikesFile(Call::FILE_OPEN, path) ? -1 : hidden(path, flags, mode);
 }
 
+ssize_t read(int fd, void* buffer, size_t size) {
+  static auto* const hidden = fileindexd::fault::Hidden<ssize_t(int, void*, size_t)>("read");
+  return fileindexd::fault::StrikesDescriptor(Call::FILE_READ, fd) ? -1 : hidden(fd, buffer, size);
+}
+
 ssize_t write(int fd, const void* buffer, size_t size) {
   static auto* const hidden = fileindexd::fault::Hidden<ssize_t(int, const void*, size_t)>("write");
   return fileindexd::fault::StrikesDescriptor(Call::FILE_WRITE, fd) ? -1 : hidden(fd, buffer, size);
@@ -208,9 +213,28 @@ int unlink(const char* path) {
   return fileindexd::fault::StrikesFile(Call::FILE_REMOVE, path) ? -1 : hidden(path);
 }
 
+int remove(const char* path) {
+  static auto* const hidden = fileindexd::fault::Hidden<int(const char*)>("remove");
+  return fileindexd::fault::StrikesFile(Call::FILE_REMOVE, path) ? -1 : hidden(path);
+}
+
+// What is removed with all that is in it: the folder tells whose it is.
+int unlinkat(int folder, const char* path, int flags) {
+  static auto* const hidden = fileindexd::fault::Hidden<int(int, const char*, int)>("unlinkat");
+  const bool strikes = path[0] == '/'
+                           ? fileindexd::fault::StrikesFile(Call::FILE_REMOVE, path)
+                           : fileindexd::fault::StrikesDescriptor(Call::FILE_REMOVE, folder);
+  return strikes ? -1 : hidden(folder, path, flags);
+}
+
 int fchmod(int fd, mode_t mode) {
   static auto* const hidden = fileindexd::fault::Hidden<int(int, mode_t)>("fchmod");
   return fileindexd::fault::StrikesDescriptor(Call::FILE_MODE, fd) ? -1 : hidden(fd, mode);
+}
+
+int chmod(const char* path, mode_t mode) {
+  static auto* const hidden = fileindexd::fault::Hidden<int(const char*, mode_t)>("chmod");
+  return fileindexd::fault::StrikesFile(Call::FILE_MODE, path) ? -1 : hidden(path, mode);
 }
 
 int mkdir(const char* path, mode_t mode) {

@@ -28,6 +28,7 @@ enum class Call {
   PREPARE,
   // The state folder's own files, whoever calls; `code` is an errno. Queue files do not count.
   FILE_OPEN,
+  FILE_READ,
   FILE_WRITE,
   FILE_SYNC,
   FILE_RENAME,

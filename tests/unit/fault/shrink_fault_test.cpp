@@ -6,6 +6,7 @@
 
 #include <cstdint>
 #include <ostream>
+#include <string>
 
 #include "index/schema.h"
 #include "platform/log.h"
@@ -21,29 +22,39 @@ void PrintTo(const Fault& fault, std::ostream* stream);
 
 namespace {
 
-// The only row that tells how much there is to cut off.
-class RemovedCount {
+constexpr int64_t FREE_PAGES_KEPT = 16;
+
+// What tells how much there is to cut off.
+class Removed {
  public:
-  RemovedCount() {
+  Removed() {
     const std::string path = IndexPath("s") + "/" + ENTRIES_FILE;
     EXPECT_EQ(sqlite3_open(path.c_str(), &db), SQLITE_OK) << path;
   }
-  ~RemovedCount() { sqlite3_close_v2(db); }
-  RemovedCount(const RemovedCount&) = delete;
-  RemovedCount& operator=(const RemovedCount&) = delete;
+  ~Removed() { sqlite3_close_v2(db); }
+  Removed(const Removed&) = delete;
+  Removed& operator=(const Removed&) = delete;
 
-  void Set(int64_t count) {
-    const std::string sql = "UPDATE meta SET removed = " + std::to_string(count);
-    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr), SQLITE_OK);
+  void SetCount(int64_t count) { Run("UPDATE meta SET removed = " + std::to_string(count)); }
+  int64_t Count() { return Number("SELECT removed FROM meta"); }
+  void MakeFreePages() {
+    Run("CREATE TABLE large(bytes); INSERT INTO large VALUES(randomblob(2000000))");
+    Run("DROP TABLE large");
   }
-  int64_t Get() {
+  int64_t FreePages() { return Number("PRAGMA freelist_count"); }
+
+ private:
+  void Run(const std::string& sql) {
+    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr), SQLITE_OK)
+        << sqlite3_errmsg(db);
+  }
+  int64_t Number(const char* sql) {
     Statement statement;
-    EXPECT_EQ(statement.Prepare(db, "SELECT removed FROM meta"), SQLITE_OK);
+    EXPECT_EQ(statement.Prepare(db, sql), SQLITE_OK);
     EXPECT_EQ(statement.Step(), SQLITE_ROW);
     return statement.Int(0);
   }
 
- private:
   sqlite3* db = nullptr;
 };
 
@@ -54,7 +65,9 @@ void Shrink(const Fault& fault, int nth) {
   world.Burst();
   world.daemon.DeleteWorker("s");
   constexpr int64_t MANY = 1'000'000;
-  RemovedCount().Set(MANY);
+  Removed().SetCount(MANY);
+  Removed().MakeFreePages();
+  ASSERT_GT(Removed().FreePages(), 2 * 200);  // that many in one transaction
   ASSERT_TRUE(world.HaveWorker());
   world.ChangeFiles();
 
@@ -64,7 +77,8 @@ void Shrink(const Fault& fault, int nth) {
 
   world.ExpectMadeGoodByATouch();
   ExpectEachOperationLogged();
-  EXPECT_LT(RemovedCount().Get(), MANY);
+  EXPECT_LT(Removed().Count(), MANY);
+  EXPECT_LE(Removed().FreePages(), FREE_PAGES_KEPT);
 }
 
 }  // namespace
@@ -80,7 +94,9 @@ INSTANTIATE_TEST_SUITE_P(
     Shrink, ShrinkFaultTest,
     testing::Values(Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::ENTRIES},
                     Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::ENTRIES, FOR_EVER},
+                    Fault{Call::READ, SQLITE_IOERR_READ, Target::ENTRIES},
                     Fault{Call::WRITE, SQLITE_FULL, Target::ENTRIES},
+                    Fault{Call::HALF_WRITE, SQLITE_FULL, Target::ENTRIES},
                     Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::ENTRIES},
                     Fault{Call::STATEMENT, SQLITE_IOERR, Target::ENTRIES},
                     Fault{Call::MEMORY, SQLITE_NOMEM},

@@ -8,6 +8,7 @@
 #include <filesystem>
 #include <functional>
 #include <ostream>
+#include <utility>
 #include <vector>
 
 #include "state/store.h"
@@ -90,19 +91,32 @@ void ExpectClaimsHold(const std::vector<bool>& claims) {
   }
 }
 
-void ChangeAll(const Fault& fault, int nth) {
+// As the daemon does, or as programs do that open the database for one change and close it.
+enum class By { ONE_STORE, STORES_OF_THEIR_OWN };
+
+bool MakeAlone(const Change& change) {
+  std::string error;
+  const auto store = StateStore::Open(error);
+  return store != nullptr && change.make(*store);
+}
+
+void ChangeAll(const Fault& fault, int nth, By by) {
   auto store = OpenStore();
   ASSERT_TRUE(store->AddShare({"a", "/a", "here"}) && store->AddShare({"gone", "/gone", ""}) &&
               store->AddFolder("/a/old", {}))
       << store->Error();
   std::vector<bool> claims;
+  if (by == By::STORES_OF_THEIR_OWN) {
+    store.reset();
+  }
   Arm(fault, nth);
   for (const Change& change : Changes()) {
-    claims.push_back(change.make(*store));
+    claims.push_back(store != nullptr ? change.make(*store) : MakeAlone(change));
   }
   Disarm();
 
   ExpectClaimsHold(claims);
+  store = store != nullptr ? std::move(store) : OpenStore();
   for (size_t i = 0; i < claims.size(); ++i) {
     const bool made = Changes()[i].is_made(*store);
     EXPECT_TRUE(made || Changes()[i].make(*store)) << Changes()[i].name << store->Error();
@@ -117,7 +131,14 @@ class StoreFaultTest : public testing::TestWithParam<Fault> {};
 
 TEST_P(StoreFaultTest, ClaimsHold) {
   const Fault fault = GetParam();
-  ForEachCall(fault, [&fault](int nth) { ChangeAll(fault, nth); });
+  ForEachCall(fault, [&fault](int nth) { ChangeAll(fault, nth, By::ONE_STORE); });
+}
+
+class OwnStoreFaultTest : public testing::TestWithParam<Fault> {};
+
+TEST_P(OwnStoreFaultTest, ClaimsHold) {
+  const Fault fault = GetParam();
+  ForEachCall(fault, [&fault](int nth) { ChangeAll(fault, nth, By::STORES_OF_THEIR_OWN); });
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -129,6 +150,16 @@ INSTANTIATE_TEST_SUITE_P(
                     Fault{Call::PREPARE, SQLITE_NOMEM}, Fault{Call::MEMORY, SQLITE_NOMEM},
                     Fault{Call::FILE_OPEN, EIO}, Fault{Call::FILE_WRITE, ENOSPC},
                     Fault{Call::FILE_SYNC, EIO}, Fault{Call::FILE_RENAME, EROFS}));
+
+// Whoever closes the database last writes the log back, and cuts or removes it.
+INSTANTIATE_TEST_SUITE_P(
+    Own, OwnStoreFaultTest,
+    testing::Values(Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::STATE},
+                    Fault{Call::REMOVE, SQLITE_IOERR_DELETE, Target::STATE},
+                    Fault{Call::WRITE, SQLITE_FULL, Target::STATE},
+                    Fault{Call::SYNC, SQLITE_IOERR_FSYNC, Target::STATE},
+                    Fault{Call::TRUNCATE, SQLITE_IOERR_TRUNCATE, Target::STATE, FOR_EVER},
+                    Fault{Call::REMOVE, SQLITE_IOERR_DELETE, Target::STATE, FOR_EVER}));
 
 INSTANTIATE_TEST_SUITE_P(
     Lasting, StoreFaultTest,
