@@ -96,6 +96,16 @@ bool StateStore::Impl::FailSql() {
 }
 
 bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
+  bool is_lost = false;
+  bool good = ChangeOnce(body, is_lost);
+  if (is_lost) {
+    good = ChangeOnce(body, is_lost);
+  }
+  return is_lost ? Fail(connection->path + " was replaced twice meanwhile") : good;
+}
+
+bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is_lost) {
+  is_lost = false;
   if (!Ready()) {
     return false;
   }
@@ -115,7 +125,8 @@ bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
 
   std::string reason;
   if (!LeaveStateCopy(*connection, reason)) {
-    // The change itself is safe.
+    // The change itself is safe, but where another program has put the copy in this file's place.
+    is_lost = IsSetAside(*connection);
     syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, reason.c_str());
   }
   return true;

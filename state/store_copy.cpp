@@ -131,7 +131,8 @@ bool IsSoundImage(const std::string& image) {
   return LookInto(image, sound, holding) == SQLITE_OK && sound;
 }
 
-bool WriteSafely(const std::string& path, const std::string& bytes, std::string& error) {
+// As PATH.new, on the disk.
+bool WriteNew(const std::string& path, const std::string& bytes, std::string& error) {
   const std::string temporary = path + ".new";
   (void)unlink(temporary.c_str());  // left by a program that was killed
   ScopedFd file(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
@@ -141,12 +142,21 @@ bool WriteSafely(const std::string& path, const std::string& bytes, std::string&
     good = written > 0 || (written < 0 && errno == EINTR);
     at += written > 0 ? static_cast<size_t>(written) : 0;
   }
-  good = good && fsync(file.fd) == 0 && rename(temporary.c_str(), path.c_str()) == 0;
+  good = good && fsync(file.fd) == 0;
   if (!good) {
     error = StateFileError("cannot write", path);
     (void)unlink(temporary.c_str());
   }
   return good;
+}
+
+bool TakeNew(const std::string& path, std::string& error) {
+  if (rename((path + ".new").c_str(), path.c_str()) == 0) {
+    return true;
+  }
+  error = StateFileError("cannot write", path);
+  (void)unlink((path + ".new").c_str());
+  return false;
 }
 
 // What was renamed is to be found under its new name after a power failure.
@@ -183,12 +193,16 @@ bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error) 
   return true;
 }
 
-// The database goes first: a program that is stopped in between leaves none, and the next one finds
-// the copy beside the gap. Its log must not stay: it would be played into the copy.
+// The database goes once the other is on the disk: a program that is stopped in between leaves
+// none, and the next one finds the copy beside the gap. Its log must not stay: it would be played
+// into the copy.
 bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error) {
   std::string image;
   if (!ReadAll(path + ".copy", image) || !IsSoundImage(image)) {
     error += "; and there is no sound copy of it";
+    return false;
+  }
+  if (!WriteNew(path, image, error)) {
     return false;
   }
   const std::string aside = path + ".damaged";
@@ -205,7 +219,8 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
     return false;
   }
   std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
-  if (!WriteSafely(path, image, error)) {
+  SyncFolder(root);
+  if (!TakeNew(path, error)) {
     return false;
   }
   SyncFolder(root);
@@ -236,10 +251,11 @@ int LacksChangesOfCopy(const StateConnection& connection, bool& lacks, std::stri
     error = StateError(connection, "cannot read");
     return result;
   }
-  // An upgrade leaves no copy.
-  const bool differs =
-      left.changes == held.changes && left.version == held.version && left.rows != held.rows;
-  lacks = sound && (left.changes > held.changes || differs);
+  // An upgrade leaves no copy, and programs before the counting may have left none.
+  const bool differs = left.changes == held.changes && left.changes > 0 &&
+                       left.version == held.version && left.rows != held.rows;
+  // One that a newer program made could not be used.
+  lacks = sound && left.version <= STATE_VERSION && (left.changes > held.changes || differs);
   return SQLITE_OK;
 }
 
@@ -248,6 +264,10 @@ bool LeaveStateCopy(const StateConnection& connection, std::string& error) {
   ScopedFd lock;
   const std::string root = connection.path.substr(0, connection.path.rfind('/'));
   if (!LockStateRoot(root, lock, error)) {
+    return false;
+  }
+  if (IsSetAside(connection)) {
+    error = connection.path + " was replaced; the copy is that of the other one";
     return false;
   }
   sqlite3_int64 size = 0;
@@ -267,7 +287,8 @@ bool LeaveStateCopy(const StateConnection& connection, std::string& error) {
     error = connection.path + " is damaged; the copy beside it is left as it was";
     return false;
   }
-  if (!WriteSafely(connection.path + ".copy", image, error)) {
+  const std::string copy = connection.path + ".copy";
+  if (!WriteNew(copy, image, error) || !TakeNew(copy, error)) {
     return false;
   }
   SyncFolder(lock);

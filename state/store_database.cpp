@@ -186,10 +186,14 @@ bool ReadLogHead(const StateConnection& connection, LogHead& head) {
   return true;
 }
 
-bool HasStateMoved(const StateConnection& connection) {
+bool IsSetAside(const StateConnection& connection) {
   int moved = 0;
   const int result = sqlite3_file_control(connection.db, "main", SQLITE_FCNTL_HAS_MOVED, &moved);
-  return (result == SQLITE_OK && moved != 0) ||
+  return result == SQLITE_OK && moved != 0;
+}
+
+bool HasStateMoved(const StateConnection& connection) {
+  return IsSetAside(connection) ||
          (connection.log_inode != 0 && LogInode(connection.path) != connection.log_inode);
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// The state database's file: its opening, its schema, the sound copy beside it.
+// The state database's file: its opening and its schema. For the copy beside it see store_copy.h.
 //
 //   state.db          the database (SQLite, WAL)
 //   state.db.copy     as it was after the last change
@@ -65,6 +65,9 @@ using LogHead = std::array<unsigned char, 96>;
 // Reads it from the memory that all users of the database share: no call of the system. The
 // connection must have read something before, so that the log is open. False where there is none.
 bool ReadLogHead(const StateConnection& connection, LogHead& head);
+
+// True when the open file is no longer the one at its path.
+bool IsSetAside(const StateConnection& connection);
 
 // True when the open file or its log is no longer the one at its path: it was set aside or removed.
 bool HasStateMoved(const StateConnection& connection);

@@ -26,8 +26,8 @@ struct StateStore::Impl {
   bool FailSql();
 
   bool Open();
-  // Opens anew where another program set the file aside (changes to it would be lost), and where
-  // the connection is of no use any more, or was for reading only.
+  // Opens anew where another program set the file aside or its log is gone (changes would be lost),
+  // and where the connection is of no use any more, or was for reading only.
   bool Ready();
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
@@ -40,6 +40,7 @@ struct StateStore::Impl {
   enum class Outcome { CHANGED, UNCHANGED, FAILED };
   // Runs `body` in one transaction that is undone unless it answers CHANGED.
   bool Change(const std::function<Outcome()>& body);
+  bool ChangeOnce(const std::function<Outcome()>& body, bool& is_lost);
   // The same for what GetSettings shows.
   bool ChangeSettings(const std::function<Outcome()>& body);
   Outcome Done(bool good) { return good ? Outcome::CHANGED : Outcome::FAILED; }

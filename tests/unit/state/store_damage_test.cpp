@@ -212,6 +212,30 @@ TEST_F(StoreDamageTest, ACopyThatIsOlderOrDamagedOrAPipeIsPassedOver) {
   }
 }
 
+TEST_F(StoreDamageTest, ACopyOfANewerProgramIsPassedOver) {
+  Sql(copy, "UPDATE number SET value = 1000 WHERE name = 'changes'; PRAGMA user_version=99");
+  ExpectAllThere(*OpenStore());
+  EXPECT_FALSE(std::filesystem::exists(database + ".damaged"));
+}
+
+// Another program puts the copy in its place just before the commit.
+TEST_F(StoreDamageTest, AChangeToAFileThatIsSetAsideMeanwhileIsMadeAgain) {
+  const auto store = OpenStore();
+  int times = 0;
+  ASSERT_TRUE(store->UpdateStatus("a", [&](ShareStatus& status) {
+    status.missing = true;
+    if (++times == 1) {
+      std::filesystem::rename(database, database + ".aside");
+      std::filesystem::copy_file(copy, database);
+    }
+  })) << store->Error();
+
+  EXPECT_EQ(times, 2);
+  ShareStatus status;
+  ASSERT_TRUE(OpenStore()->GetStatus("a", status));
+  EXPECT_TRUE(status.missing);
+}
+
 TEST_F(StoreDamageTest, AVersionThatIsNotThatOfItsTablesGivesWayToTheCopy) {
   for (const char* sql :
        {"PRAGMA user_version=1", "PRAGMA user_version=2", "PRAGMA user_version=3"}) {
