@@ -24,8 +24,6 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int BUSY_TIMEOUT_MS = 5000;
-
 // auto_vacuum counts only before the first table. The tables are made before the log is: so the
 // main file's own first page tells from the beginning whose it is.
 constexpr const char* PRAGMAS_FOR_CREATING =

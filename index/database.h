@@ -42,6 +42,8 @@ struct DatabaseForm {
 
 extern const DatabaseForm ENTRIES_FORM;
 
+constexpr int BUSY_TIMEOUT_MS = 5000;  // of every connection, but where it is said to be another
+
 // Of the whole process: where all connections together hold so much memory, their page caches grow
 // no further.
 void LimitCaches(int64_t bytes);

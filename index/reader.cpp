@@ -139,6 +139,34 @@ IndexError EntryReader::Find(const std::string& path, std::optional<Entry>& entr
   return IndexError::NONE;
 }
 
+// There is one writer at a time: once anybody has committed, or nobody writes at this moment, the
+// one of then has ended. Nothing is written here.
+bool EntryReader::HasWriterEnded(int milliseconds) {
+  sqlite3* db = database.db;
+  Statement ask;
+  int64_t version = 0;
+  bool found = false;
+  const int code = ask.Prepare(db, "PRAGMA data_version");
+  if (code != SQLITE_OK || ask.ReadOne(found, [&] { version = ask.Int(0); }) != SQLITE_OK ||
+      !found) {
+    return true;
+  }
+  if (first_version.value_or(version) != version) {
+    return true;
+  }
+  first_version = version;
+
+  sqlite3_busy_timeout(db, milliseconds);
+  (void)Execute(db, "PRAGMA query_only = 0");
+  const int begun = Execute(db, "BEGIN IMMEDIATE");
+  if (begun == SQLITE_OK) {
+    (void)Execute(db, "ROLLBACK");
+  }
+  (void)Execute(db, "PRAGMA query_only = 1");
+  sqlite3_busy_timeout(db, BUSY_TIMEOUT_MS);
+  return (begun & 0xff) != SQLITE_BUSY;
+}
+
 bool EntryReader::CountBelow(const std::string& directory, uint64_t limit, uint64_t& below) {
   Statement statement;
   if (statement.Prepare(database.db,

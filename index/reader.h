@@ -45,11 +45,19 @@ class EntryReader {
   // reading failed.
   bool ForEachOfInode(uint64_t inode, const std::function<bool(const Entry&)>& visit);
 
+  // Whether what was being written when this reader was first asked has ended since, committed or
+  // not: what its writer saw on the disk before that is in what is read from now on. Waits for it
+  // that long. True where it cannot be told.
+  bool HasWriterEnded(int milliseconds);
+
   // How many entries lie below normal path `directory`, counted up to `limit`, which reads their
   // part of an index. False when reading failed.
   bool CountBelow(const std::string& directory, uint64_t limit, uint64_t& below);
 
   IndexDatabase database;
+
+ private:
+  std::optional<int64_t> first_version;  // of the data, when HasWriterEnded was first asked
 };
 
 }  // namespace fileindexd

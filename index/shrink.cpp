@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <utility>
 
+#include "index/database.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -19,7 +20,6 @@ constexpr int64_t FREE_PAGES_KEPT = 16;  // for the next entries
 constexpr int STEPS = 40;
 // A reader that stays longer is come back to, pass after pass.
 constexpr int READER_TIMEOUT_MS = 2000;
-constexpr int BUSY_TIMEOUT_MS = 5000;  // as the connection had it
 
 // Negative: all segments are merged into one, which is where records that cancel others end. Both
 // numbers are pages for one transaction.

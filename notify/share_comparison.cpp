@@ -20,6 +20,7 @@ constexpr std::chrono::milliseconds PIECE_TIME(100);
 constexpr uint64_t FIRST_PIECE = 500;
 constexpr uint64_t LONGEST_PIECE = 5000;
 constexpr uint64_t SHORTEST_PIECE = 20;
+constexpr int WRITER_PATIENCE_MS = 100;  // before the next one is given its turn
 
 }  // namespace
 
@@ -42,6 +43,14 @@ void ShareComparison::Finish() {
   progress.End();
   healing.counts = comparer.counts;
   healing.ended = std::time(nullptr);
+}
+
+// A transaction that has not ended may take away what was gone for a moment before anybody watched:
+// the comparison would still find it in the index, and in order.
+bool ShareComparison::HasWriterEnded() {
+  const bool is_open = reader.database.IsOpen() && !reader.database.HasMoved();
+  return (!is_open && reader.Open(healing.share) != IndexError::NONE) ||
+         reader.HasWriterEnded(WRITER_PATIENCE_MS);
 }
 
 bool ShareComparison::Begin() {
@@ -68,6 +77,9 @@ bool ShareComparison::Begin() {
 }
 
 bool ShareComparison::GoOn() {
+  if (repair == nullptr && !HasWriterEnded()) {
+    return true;
+  }
   if (repair == nullptr && !Begin()) {
     return false;
   }

@@ -29,6 +29,7 @@ class ShareComparison {
   Healing healing;
 
  private:
+  bool HasWriterEnded();
   bool Begin();
   bool Fail(const std::string& why);
   void Finish();

@@ -17,6 +17,7 @@
 #include "state/layout.h"
 #include "state/progress.h"
 #include "state/queue_writer.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -321,6 +322,64 @@ TEST_F(HealerTest, StopEndsWhatWaitsAndWhatRuns) {
 
   EXPECT_FALSE(IsReadable(0));
   EXPECT_TRUE(healer.Take().empty());
+}
+
+// Somebody writes, who has taken "a" away because it was gone for a moment; it is back since.
+class WrittenMeanwhileTest : public HealerTest {
+ protected:
+  void SetUp() override {
+    HealerTest::SetUp();
+    if (IsSkipped()) {
+      return;
+    }
+    WriteFile(At("a"), "");
+    AddAll();
+    writer.reset();
+    const std::string file = IndexPath("s") + "/entries.db";
+    ASSERT_EQ(sqlite3_open(file.c_str(), &other), SQLITE_OK);
+    int keep = 1;
+    sqlite3_file_control(other, "main", SQLITE_FCNTL_PERSIST_WAL, &keep);
+    const std::string sql =
+        "BEGIN IMMEDIATE; DELETE FROM entries WHERE path = CAST('" + At("a") + "' AS BLOB)";
+    ASSERT_EQ(Execute(other, sql.c_str()), SQLITE_OK);
+  }
+  ~WrittenMeanwhileTest() override { sqlite3_close(other); }
+
+  Names Compare(ShareComparison& comparison) {
+    while (comparison.GoOn()) {
+    }
+    EXPECT_TRUE(comparison.healing.done) << comparison.healing.error;
+    return Lines(comparison.healing);
+  }
+
+  const Names missing{std::to_string(QLIB_NOTIFY_MODIFY) + " a"};
+  sqlite3* other = nullptr;
+};
+
+TEST_F(WrittenMeanwhileTest, ComparisonBeginsWhenThatIsCommitted) {
+  ShareComparison comparison(*store, "s");
+  for (int i = 0; i < 3; ++i) {
+    ASSERT_TRUE(comparison.GoOn());
+  }
+  ASSERT_EQ(Execute(other, "COMMIT"), SQLITE_OK);
+
+  EXPECT_EQ(Compare(comparison), missing);
+}
+
+TEST_F(WrittenMeanwhileTest, ComparisonBeginsWhenThatIsCommittedThoughMoreIsWrittenSince) {
+  ShareComparison comparison(*store, "s");
+  ASSERT_TRUE(comparison.GoOn());
+  ASSERT_EQ(Execute(other, "COMMIT; BEGIN IMMEDIATE"), SQLITE_OK);
+
+  EXPECT_EQ(Compare(comparison), missing);
+}
+
+TEST_F(WrittenMeanwhileTest, ComparisonBeginsWhenThatIsGivenUp) {
+  ShareComparison comparison(*store, "s");
+  ASSERT_TRUE(comparison.GoOn());
+  ASSERT_EQ(Execute(other, "ROLLBACK"), SQLITE_OK);
+
+  EXPECT_EQ(Compare(comparison), Names());
 }
 
 // A FUSE file system of which nobody answers.
