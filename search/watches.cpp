@@ -60,7 +60,6 @@ void Watches::Set(const Settings& settings) {
   for (const Share& share : settings.shares) {
     Add(ShareFolder(share.name), {Target::SHARE, share.name}, kept);
     Add(IndexPath(share.name), {Target::INDEX, share.name}, kept);
-    Add(ContentsPath(share.name), {Target::CONTENTS, share.name}, kept);
   }
   told = refused && told;
 
@@ -142,7 +141,7 @@ void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hi
       hints.everything = true;
       break;
     case Target::SHARE:
-      hints.everything = hints.everything || name == "index" || name == "contents";
+      hints.everything = hints.everything || name == "index";
       if (name == "index" || (name == "contents" && (mask & WENT) != 0)) {
         hints.remade.insert(target.share);
       }
@@ -156,11 +155,6 @@ void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hi
         }
       } else if (IsDatabaseFile(name, "entries.db")) {
         hints.shares.insert(target.share);
-      }
-      break;
-    case Target::CONTENTS:
-      if ((name == "contents.db" || name == "contents.db-wal") && (mask & WENT) != 0) {
-        hints.remade.insert(target.share);
       }
       break;
     case Target::RUN:

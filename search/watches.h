@@ -3,9 +3,8 @@
 //
 //   ROOT                      state.db changed, "shares" appeared
 //   ROOT/shares               a share's folder came or went
-//   ROOT/shares/NAME          its "index" or "contents" came or went
+//   ROOT/shares/NAME          its "index" came or went, its "contents" went
 //   ROOT/shares/NAME/index    a commit; the database came or went
-//   ROOT/shares/NAME/contents the database, or its log, went
 //   /var/run                  the daemon began
 //
 // One thread. Events are hints: whoever gets one looks at what is there.
@@ -49,8 +48,8 @@ class Watches {
 
  private:
   struct Target {
-    enum { ROOT, SHARES, SHARE, INDEX, CONTENTS, RUN } place;
-    std::string share;  // name; of SHARE, INDEX and CONTENTS
+    enum { ROOT, SHARES, SHARE, INDEX, RUN } place;
+    std::string share;  // name; of SHARE and INDEX
   };
 
   void Add(const std::string& path, const Target& target, std::map<int, Target>& kept);
