@@ -44,10 +44,22 @@ int EntryFollower::End(Statement& statement, int code) {
   return StepError(code);
 }
 
+// Opening would make a log anew in a folder that somebody is removing with all that is in it. The
+// one who writes next makes another one, or another database.
+bool EntryFollower::IsBeingRemoved(const std::string& share_name) {
+  const bool is_gone = LogInode(IndexPath(share_name) + "/" + ENTRIES_FORM.file) == 0;
+  log_went = (log_went || database.IsOpen()) && is_gone;
+  return log_went;
+}
+
 IndexError EntryFollower::EnsureOpen(const std::string& share_name) {
   failed = false;
   if (database.IsOpen() && !database.HasMoved()) {
     return IndexError::NONE;
+  }
+  if (IsBeingRemoved(share_name)) {
+    Close();
+    return IndexError::PATH_NOT_FOUND;
   }
   Close();
   IndexError error = database.OpenForReading(IndexPath(share_name));

@@ -50,8 +50,10 @@ class EntryFollower {
 
  private:
   int End(Statement& statement, int code);
+  bool IsBeingRemoved(const std::string& share_name);
   IndexDatabase database;
   Statement next, of_inode, latest_of, paths_of;
+  bool log_went = false;  // from under the open database, and did not come back
 };
 
 }  // namespace fileindexd
