@@ -1,28 +1,18 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """What is done to a state database, and what has to become of it."""
 
-import ctypes
 import os
 import re
-import shutil
 import signal
 import sqlite3
 
 from harness import IndexTest, namespace
+from standing_in import remove
 
 CREATE = 0x40
 FILE = f"{namespace.STATE}/state.db"
 COPY = f"{FILE}.copy"
 USED = re.compile(r".*state\.db.*its last copy is used instead.*")
-AT_FDCWD = -100
-RENAME_EXCHANGE = 2
-
-
-def remove(path):
-    if os.path.isdir(path) and not os.path.islink(path):
-        shutil.rmtree(path)
-    elif os.path.lexists(path):
-        os.unlink(path)
 
 
 def remove_all_of(path):
@@ -38,24 +28,6 @@ def scribble(path, start=0):
 
 def truncate(part):
     os.truncate(FILE, int(os.path.getsize(FILE) * part))
-
-
-def make_full_folder(path):
-    made = f"{path}.folder"
-    os.makedirs(f"{made}/in/its/place")
-    if not os.path.lexists(path):
-        os.rename(made, path)
-        return
-    libc = ctypes.CDLL(None, use_errno=True)
-    names = (AT_FDCWD, os.fsencode(made), AT_FDCWD, os.fsencode(path))
-    if libc.renameat2(*names, RENAME_EXCHANGE) != 0:
-        raise OSError(ctypes.get_errno(), "renameat2", path)
-    os.unlink(made)
-
-
-def make_pipe(path):
-    os.mkfifo(f"{path}.pipe")
-    os.rename(f"{path}.pipe", path)  # programs make the file anew where it is missing
 
 
 def copy_log_back():

@@ -1,21 +1,17 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """An index that was damaged, removed or replaced: it is noticed, told once, and made anew."""
 
-import ctypes
-import errno
 import glob
 import os
 import re
-import shutil
 import sqlite3
 
 from harness import IndexTest, main, namespace
+from standing_in import make_full_folder, remove, replace
 
 CREATE = 0x40
 MS_RDONLY = 1
 MS_REMOUNT = 32
-AT_FDCWD = -100
-RENAME_EXCHANGE = 2
 FOLDER = f"{namespace.STATE}/shares/alpha/index"
 FILE = f"{FOLDER}/entries.db"
 COPY = f"{FOLDER}.damaged"
@@ -30,18 +26,6 @@ SET_ASIDE = re.compile(
 )
 MADE_ANEW = re.compile(r"index missing and made anew, path=.*")
 NOT_FOUND = "Failed to initiate indexer due to path not found, try re-create db"
-
-
-def remove(path):
-    if os.path.isdir(path) and not os.path.islink(path):
-        while os.path.isdir(path):
-            try:
-                shutil.rmtree(path)
-            except OSError as error:  # the content service may be making a folder there
-                if error.errno not in (errno.ENOTEMPTY, errno.ENOENT):
-                    raise
-    elif os.path.lexists(path):
-        os.unlink(path)
 
 
 def contents(path):
@@ -105,24 +89,9 @@ def set_version(number):
     db.close()
 
 
-def replace(path, make):
-    """At once: programs make what is missing anew."""
-    made = f"{path}.made"
-    make(made)
-    names = (AT_FDCWD, os.fsencode(made), AT_FDCWD, os.fsencode(path))
-    if ctypes.CDLL(None).renameat2(*names, RENAME_EXCHANGE) == 0:
-        remove(made)
-    else:  # nothing stands there
-        os.rename(made, path)
-
-
 def write_file(path):
     with open(path, "wb") as file:
         file.write(b"no database" * 1000)
-
-
-def make_full_folder(path):
-    os.makedirs(f"{path}/in/its/place")
 
 
 def foreign_database(path):

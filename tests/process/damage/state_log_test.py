@@ -10,12 +10,10 @@ from damaged_state import (
     USED,
     StateDamageTest,
     copy_log_back,
-    make_full_folder,
-    make_pipe,
-    remove,
     scribble,
 )
 from harness import main, namespace
+from standing_in import make_full_folder, remove, replace
 
 LOG = FILE + "-wal"
 MEMORY = FILE + "-shm"
@@ -32,10 +30,10 @@ def put_older():
 
 
 STANDING_IN = (
-    ("log replaced by a folder", lambda: make_full_folder(LOG)),
-    ("log replaced by a pipe", lambda: make_pipe(LOG)),
-    ("memory replaced by a folder", lambda: make_full_folder(MEMORY)),
-    ("memory replaced by a pipe", lambda: make_pipe(MEMORY)),
+    ("log replaced by a folder", lambda: replace(LOG, make_full_folder)),
+    ("log replaced by a pipe", lambda: replace(LOG, os.mkfifo)),
+    ("memory replaced by a folder", lambda: replace(MEMORY, make_full_folder)),
+    ("memory replaced by a pipe", lambda: replace(MEMORY, os.mkfifo)),
 )
 OLDER_ONES = (
     ("older one in its place", put_older),

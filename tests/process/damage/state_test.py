@@ -13,14 +13,12 @@ from damaged_state import (
     USED,
     StateDamageTest,
     copy_log_back,
-    make_full_folder,
-    make_pipe,
-    remove,
     remove_all_of,
     scribble,
     truncate,
 )
 from harness import main, namespace
+from standing_in import make_full_folder, remove, replace
 
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")
 UPGRADED = re.compile(r".*state\.db is upgraded from version 1 to \d+")
@@ -78,8 +76,8 @@ DAMAGES = (
     ("truncated inside a page", lambda: (remove(FILE + "-wal"), os.truncate(FILE, 4096 * 2 + 77))),
     ("header overwritten", lambda: (remove(FILE + "-wal"), scribble(FILE))),
     ("middle overwritten", lambda: (remove(FILE + "-wal"), scribble(FILE, 4096))),
-    ("folder in its place", lambda: make_full_folder(FILE)),
-    ("pipe in its place", lambda: make_pipe(FILE)),
+    ("folder in its place", lambda: replace(FILE, make_full_folder)),
+    ("pipe in its place", lambda: replace(FILE, os.mkfifo)),
 )
 # These too, in the file that the programs have open: each finds out by itself.
 IN_PLACE = (
@@ -235,7 +233,7 @@ class StateTest(StateDamageTest):
 
     def test_copy_that_is_damaged_is_made_anew_by_the_next_change(self):
         self.prepare()
-        for damage in (lambda: scribble(COPY), lambda: remove(COPY), lambda: make_pipe(COPY)):
+        for damage in (lambda: scribble(COPY), lambda: remove(COPY), lambda: replace(COPY, os.mkfifo)):
             damage()
             self.ctl("pause")
             self.ctl("resume")
