@@ -136,7 +136,7 @@ class LoadTest(IndexTest):
                 break
             if not os.path.lexists(queue) and not os.path.lexists(queue + ".tmp"):
                 break
-            self._touch_queues()
+            self.touch_queues()
         # Nothing is awaited: the moment is what the test puts in.
         time.sleep(self.choice.random() * 0.01 * self.choice.randrange(2))
 

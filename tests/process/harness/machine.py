@@ -185,21 +185,24 @@ class MachineTest(unittest.TestCase):
             position = self.log.find(wanted, after, count, NUDGE_SECONDS)
             if position is not None:
                 return position
-            self._touch_queues()
+            self.touch_queues()
         return self.fail(f"not logged within {LIMIT} s: {wanted!r}")
 
-    def _touch_queues(self):
+    def touch_queues(self):
         """As the notification service does with queues that nobody takes."""
         for path in glob.glob(f"{namespace.STATE}/shares/*/{QUEUE}"):
-            with contextlib.suppress(OSError):  # taken meanwhile
-                os.close(os.open(path, os.O_WRONLY | os.O_APPEND | os.O_NONBLOCK))
+            self.touch_queue(path)
+
+    def touch_queue(self, queue):
+        with contextlib.suppress(OSError):  # taken meanwhile; a new one would be a pass of its own
+            os.close(os.open(queue, os.O_WRONLY | os.O_APPEND | os.O_NONBLOCK))
 
     def await_held(self):
         """Until the log is held, see SystemLog.hold_at. Queues are touched as above."""
         for _ in range(int(LIMIT / NUDGE_SECONDS)):
             if self.log.await_held(NUDGE_SECONDS):
                 return
-            self._touch_queues()
+            self.touch_queues()
         self.fail(f"the log was not held within {LIMIT} s")
 
     def await_lines(self, wanted, after=0):
@@ -216,7 +219,12 @@ class MachineTest(unittest.TestCase):
     # Files.
 
     def await_file(self, path):
-        self.assertTrue(await_in_folder(path, lambda: os.path.lexists(path)), f"no {path}")
+        """Until it is there. Queues are touched meanwhile, as in await_line."""
+        for _ in range(int(LIMIT / NUDGE_SECONDS)):
+            if await_in_folder(path, lambda: os.path.lexists(path), NUDGE_SECONDS):
+                return
+            self.touch_queues()
+        self.fail(f"no {path}")
 
     def await_gone(self, path):
         gone = await_in_folder(path, lambda: not os.path.lexists(path))
@@ -276,8 +284,7 @@ class MachineTest(unittest.TestCase):
         for _ in range(int(LIMIT / NUDGE_SECONDS)):
             if await_in_folder(queue, gone, NUDGE_SECONDS):
                 return
-            if os.path.lexists(queue):
-                self.append_bytes(share, b"")
+            self.touch_queue(queue)
         self.fail(f"not drained: {os.listdir(os.path.dirname(queue))}")
 
     # fileindexctl.
