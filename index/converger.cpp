@@ -131,7 +131,7 @@ IndexError Converger::Settle(const std::string& path, const Look& look, const Co
   const bool is_new = outcome == Outcome::NEW || outcome == Outcome::NEW_ABOVE;
   if (error == IndexError::NONE && look.links > 1 && look.thing == Thing::FILE &&
       outcome != Outcome::SAME) {
-    error = RefreshTwins(path, look, is_new);
+    error = NoteTwins(path, look, is_new);
   }
   if (error != IndexError::NONE) {
     return error;
@@ -219,36 +219,11 @@ IndexError Converger::Change(const Entry& known, const Look& look, const Content
   return error;
 }
 
-IndexError Converger::RefreshTwins(const std::string& path, const Look& look, bool is_new) {
-  if (is_new && look.links > MANY_LINKS) {
-    return IndexError::NONE;
-  }
-
-  std::vector<std::string> paths;
-  IndexError error = Sql(table.StaleTwins(EntryOf(path, look), paths));
-  for (const std::string& twin : paths) {
-    if (error != IndexError::NONE) {
-      return error;
-    }
-    const Look twin_look = LookAt(*settings, twin);
-    if (twin_look.verdict == Verdict::UNKNOWN) {
-      return IndexError::IO;
-    }
-    Entry known;
-    bool found = false;
-    error = Sql(table.Find(twin, known, found));
-    if (error != IndexError::NONE) {
-      return error;
-    }
-    // The number may have been that of another thing, perhaps of a folder with much below it.
-    if (twin_look.verdict != Verdict::BELONGS || IsOtherThing(known, EntryOf(twin, twin_look))) {
-      other_paths.push_back(twin);
-      continue;
-    }
-    Outcome ignored = Outcome::SAME;
-    error = Put(twin, twin_look, settings->FolderOfPath(twin)->wanted, {}, ignored);
-  }
-  return error;
+// Other names of the file, whose rows tell something else. The number may also have been that of
+// another thing, perhaps of a folder with much below it: each is settled like a former path.
+IndexError Converger::NoteTwins(const std::string& path, const Look& look, bool is_new) {
+  const bool too_many = is_new && look.links > MANY_LINKS;
+  return too_many ? IndexError::NONE : Sql(table.StaleTwins(EntryOf(path, look), other_paths));
 }
 
 // Where the same thing is known under other paths, it may have been renamed. A link that was added

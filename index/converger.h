@@ -50,8 +50,8 @@ class Converger {
                  const ContentFlags& decide, Outcome& outcome);
   IndexError Change(const Entry& known, const Look& look, const ContentFlags& wanted,
                     const ContentFlags& decide, Outcome& outcome);
-  IndexError RefreshTwins(const std::string& path, const Look& look, bool is_new);
 
+  IndexError NoteTwins(const std::string& path, const Look& look, bool is_new);
   IndexError NoteOtherPaths(const Entry& entry, const Look& look);
   IndexError SettleOtherPaths();
 
@@ -77,7 +77,7 @@ class Converger {
   bool mount_known = false;
   uint64_t mount_id = 0;  // last mount and device that were seen below a sound root
   uint64_t device = 0;
-  std::vector<std::string> other_paths;  // of what the operation added or removed
+  std::vector<std::string> other_paths;  // of what the operation added, changed or removed
   std::set<std::string> looked_at;       // subtrees, where the file system has no birth times
 };
 
