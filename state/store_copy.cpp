@@ -2,28 +2,22 @@
 #include "state/store_copy.h"
 
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
-#include <chrono>
 #include <cstdio>
-#include <cstring>
 #include <filesystem>
 #include <system_error>
-#include <thread>
 #include <utility>
 #include <vector>
 
 #include "state/sqlite.h"
+#include "state/state_files.h"
 
 namespace fileindexd {
 
 namespace {
-
-constexpr std::chrono::seconds LOCK_WAIT(5);
-constexpr std::chrono::milliseconds LOCK_NAP(5);
 
 // In the place of what was set aside before, which stays where there is nothing to set aside. A
 // rename alone cannot put a file in a folder's place.
@@ -165,33 +159,6 @@ void SyncFolder(const ScopedFd& folder) {
 }
 
 }  // namespace
-
-std::string StateFileError(const std::string& what, const std::string& path) {
-  return what + " " + path + ": " + strerror(errno);  // NOLINT: glibc's is safe
-}
-
-bool StateFileExists(const std::string& path) {
-  struct stat st {};
-  return lstat(path.c_str(), &st) == 0;
-}
-
-bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error) {
-  ScopedFd folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (folder.fd < 0) {
-    error = StateFileError("cannot open", root);
-    return false;
-  }
-  const auto deadline = std::chrono::steady_clock::now() + LOCK_WAIT;
-  while (flock(folder.fd, LOCK_EX | LOCK_NB) != 0) {
-    if ((errno != EWOULDBLOCK && errno != EINTR) || std::chrono::steady_clock::now() >= deadline) {
-      error = StateFileError("cannot lock", root);
-      return false;
-    }
-    std::this_thread::sleep_for(LOCK_NAP);
-  }
-  lock.Swap(folder);
-  return true;
-}
 
 // The database goes once the other is on the disk: a program that is stopped in between leaves
 // none, and the next one finds the copy beside the gap. Its log must not stay: it would be played

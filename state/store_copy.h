@@ -10,9 +10,6 @@
 
 namespace fileindexd {
 
-// The lock on the state root under which opening and copying are done, waited for 5 s at most.
-bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error);
-
 // Leaves a copy of what is committed beside the database. It is checked before it replaces the one
 // that is there. False on failure, and that one stays.
 bool LeaveStateCopy(const StateConnection& connection, std::string& error);
@@ -26,10 +23,5 @@ int LacksChangesOfCopy(const StateConnection& connection, bool& lacks, std::stri
 // Sets the database aside and puts the copy in its place, under the lock `root`. Without a sound
 // copy nothing is touched. On failure `error`, which says what is wrong, is added to.
 bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error);
-
-// What is wrong with a file, by errno.
-std::string StateFileError(const std::string& what, const std::string& path);
-
-bool StateFileExists(const std::string& path);
 
 }  // namespace fileindexd

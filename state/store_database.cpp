@@ -10,6 +10,7 @@
 
 #include "base/scoped_fd.h"
 #include "state/layout.h"
+#include "state/state_files.h"
 #include "state/store_copy.h"
 
 namespace fileindexd {

@@ -51,10 +51,6 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
 // `error` is what kept it from being opened. In store_unlogged.cpp.
 bool OpenFullState(StateConnection& connection, const std::string& error);
 
-// Opens a database for reading that has no log, or whose log is to be passed over. In
-// store_unlogged.cpp.
-bool OpenUnlogged(StateConnection& connection);
-
 // Whether closing writes the log back into the database and removes it. Not where the database is
 // not known to be sound: what is set aside must be what was found.
 void TidyOnClose(const StateConnection& connection, bool tidy);

@@ -26,26 +26,24 @@ std::string Uri(const std::string& path, const char* options) {
   return uri + options;
 }
 
-bool IsSoundAndOfOurVersion(const StateConnection& connection) {
+// True when it is sound, and of our version.
+bool OpenUnlogged(StateConnection& connection) {
+  const std::string uri = Uri(connection.path, "?immutable=1");
+  constexpr int FLAGS = SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_URI;
   int64_t version = 0;
   bool ok = false;
-  return SchemaVersion(connection.db, version) == SQLITE_OK && version == STATE_VERSION &&
+  return sqlite3_open_v2(uri.c_str(), &connection.db, FLAGS, nullptr) == SQLITE_OK &&
+         SchemaVersion(connection.db, version) == SQLITE_OK && version == STATE_VERSION &&
          QuickCheck(connection.db, ok) == SQLITE_OK && ok;
 }
 
 }  // namespace
 
-bool OpenUnlogged(StateConnection& connection) {
-  const std::string uri = Uri(connection.path, "?immutable=1");
-  constexpr int FLAGS = SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_URI;
-  return sqlite3_open_v2(uri.c_str(), &connection.db, FLAGS, nullptr) == SQLITE_OK;
-}
-
 bool OpenFullState(StateConnection& connection, const std::string& error) {
   struct stat log {};
   const std::string log_path = connection.path + "-wal";
   if (HasSpace(StateRoot(), false) || (lstat(log_path.c_str(), &log) == 0 && log.st_size > 0) ||
-      !OpenUnlogged(connection) || !IsSoundAndOfOurVersion(connection)) {
+      !OpenUnlogged(connection)) {
     return false;
   }
   connection.read_only = error + "; its disk is full";
