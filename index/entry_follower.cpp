@@ -47,7 +47,7 @@ int EntryFollower::End(Statement& statement, int code) {
 // Opening would make a log anew in a folder that somebody is removing with all that is in it. The
 // one who writes next makes another one, or another database.
 bool EntryFollower::IsBeingRemoved(const std::string& share_name) {
-  const bool is_gone = LogInode(IndexPath(share_name) + "/" + ENTRIES_FORM.file) == 0;
+  const bool is_gone = LogFilesOf(IndexPath(share_name) + "/" + ENTRIES_FORM.file).log == 0;
   log_went = (log_went || database.IsOpen()) && is_gone;
   return log_went;
 }

@@ -60,9 +60,13 @@ bool IsFileOrNothing(const std::string& path) {
   return lstat(path.c_str(), &st) != 0 || S_ISREG(st.st_mode);
 }
 
-ino_t LogInode(const std::string& database) {
-  struct stat log {};
-  return lstat((database + "-wal").c_str(), &log) == 0 ? log.st_ino : 0;
+ino_t InodeOf(const std::string& path) {
+  struct stat st {};
+  return lstat(path.c_str(), &st) == 0 ? st.st_ino : 0;
+}
+
+LogFiles LogFilesOf(const std::string& database) {
+  return {InodeOf(database + "-wal"), InodeOf(database + "-shm")};
 }
 
 int QuickCheck(sqlite3* db, bool& ok) {

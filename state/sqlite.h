@@ -30,9 +30,19 @@ int Execute(sqlite3* db, const char* sql);
 // without end at a folder.
 bool IsFileOrNothing(const std::string& path);
 
-// The log that stands beside a database; 0: none. While a connection is open nobody but SQLite's
-// users removes it, and none of them does: another number says that it went all the same.
-ino_t LogInode(const std::string& database);
+// The inode of what stands there, a link itself; 0: nothing.
+ino_t InodeOf(const std::string& path);
+
+// The inodes of the log that stands beside a database, and of the memory that its users share; 0:
+// none. While a connection is open nobody but SQLite's users removes them, and none of them does:
+// another number says that one went all the same.
+struct LogFiles {
+  ino_t log = 0;
+  ino_t memory = 0;
+
+  bool operator==(const LogFiles&) const = default;
+};
+LogFiles LogFilesOf(const std::string& database);
 
 // A prepared statement. Bind, then Step until it is not SQLITE_ROW, then Reset.
 class Statement {

@@ -3,6 +3,7 @@
 
 #include <climits>
 #include <cstdlib>
+#include <utility>
 
 #include "state/layout.h"
 #include "state/store_copy.h"
@@ -123,10 +124,28 @@ bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is
     return outcome == Outcome::UNCHANGED;
   }
 
+  return LeaveCopy(is_lost);
+}
+
+// The change itself is safe, but where the copy takes this file's place: another program has put it
+// there, or this one does because what it has just read is damaged.
+bool StateStore::Impl::LeaveCopy(bool& is_lost) {
   std::string reason;
-  if (!LeaveStateCopy(*connection, reason)) {
-    // The change itself is safe, but where another program has put the copy in this file's place.
+  const CopyLeft left = LeaveStateCopy(*connection, reason);
+  if (left == CopyLeft::DAMAGED) {
+    const std::string path = connection->path;
+    const ino_t written = InodeOf(path);
+    TidyOnClose(*connection, false);
+    if (!Open()) {
+      return false;
+    }
+    is_lost = InodeOf(path) != written;
+  } else if (left == CopyLeft::FAILED) {
     is_lost = IsSetAside(*connection);
+  }
+  if (left == CopyLeft::GOOD || is_lost) {
+    copy_failure.clear();
+  } else if (std::exchange(copy_failure, reason) != reason) {
     syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, reason.c_str());
   }
   return true;

@@ -5,7 +5,7 @@
 // threads: it serialises its users. Nothing throws. Every operation returns false on failure and
 // then Error() tells what and why, in one line that names the file; out-parameters are set only on
 // success. It is upgraded in place, never rebuilt: one of a newer version is refused, a damaged one
-// is replaced by the sound copy that every change leaves beside it.
+// is replaced by the sound copy that changes leave beside it.
 #pragma once
 
 #include <cstdint>
@@ -67,7 +67,8 @@ class StateStore {
   // Both fail for a share that is not registered.
   bool GetStatus(const std::string& share, ShareStatus& status);
   // Changes what `change` changes, in one transaction; writes nothing when it changes nothing.
-  // `change` is called at most once, under the store's mutex: it must not use the store.
+  // `change` is called under the store's mutex: it must not use the store. It is called again where
+  // the database was replaced meanwhile.
   bool UpdateStatus(const std::string& share, const std::function<void(ShareStatus&)>& change);
 
   // Seconds since the epoch, 0 without end, -1 not paused (as on first use).

@@ -31,6 +31,7 @@ bool MoveAside(const std::string& path, const std::string& aside) {
 }
 
 bool ReadAll(const std::string& path, std::string& bytes) {
+  bytes.clear();
   const ScopedFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
   char buffer[16384];
   for (;;) {
@@ -40,6 +41,18 @@ bool ReadAll(const std::string& path, std::string& bytes) {
     }
     bytes.append(buffer, static_cast<size_t>(length));
   }
+}
+
+// One on a bad sector gives the same answer for ever, and is as good as none: nothing is read of it.
+bool ReadCopy(const std::string& path, std::string& bytes) {
+  constexpr int TRIES = 2;
+  for (int tries = 0; tries < TRIES; ++tries) {
+    if (ReadAll(path, bytes)) {
+      return true;
+    }
+  }
+  bytes.clear();
+  return errno == ENOENT || errno == EIO || errno == EUCLEAN || errno == EBADMSG;
 }
 
 // What a database holds, as it was at one moment.
@@ -119,16 +132,11 @@ int LookInto(std::string image, bool& sound, Holding& holding) {
   return unsound ? SQLITE_OK : result;
 }
 
-bool IsSoundImage(const std::string& image) {
-  bool sound = false;
-  Holding holding;
-  return LookInto(image, sound, holding) == SQLITE_OK && sound;
-}
-
 // As PATH.new, on the disk.
 bool WriteNew(const std::string& path, const std::string& bytes, std::string& error) {
   const std::string temporary = path + ".new";
-  (void)unlink(temporary.c_str());  // left by a program that was killed
+  std::error_code ignored;
+  std::filesystem::remove_all(temporary, ignored);  // left by a program that was killed
   ScopedFd file(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
   bool good = file.fd >= 0 && fchmod(file.fd, 0600) == 0;
   for (size_t at = 0; good && at < bytes.size();) {
@@ -145,12 +153,53 @@ bool WriteNew(const std::string& path, const std::string& bytes, std::string& er
 }
 
 bool TakeNew(const std::string& path, std::string& error) {
-  if (rename((path + ".new").c_str(), path.c_str()) == 0) {
-    return true;
+  const std::string temporary = path + ".new";
+  bool taken = rename(temporary.c_str(), path.c_str()) == 0;
+  if (!taken && errno == EISDIR) {
+    taken = MoveAside(path, path + ".damaged") && rename(temporary.c_str(), path.c_str()) == 0;
   }
-  error = StateFileError("cannot write", path);
-  (void)unlink((path + ".new").c_str());
-  return false;
+  if (!taken) {
+    error = StateFileError("cannot write", path);
+    (void)unlink(temporary.c_str());
+  }
+  return taken;
+}
+
+// Whatever of the database would be played into the one that comes in its place goes with it.
+bool SetStateAside(const std::string& path, std::string& error) {
+  const std::string aside = path + ".damaged";
+  std::error_code ignored;
+  for (const char* ending : {"-wal", "-journal"}) {
+    if (StateFileExists(path)) {
+      std::filesystem::remove_all(aside + ending, ignored);  // of what was set aside before
+    }
+  }
+  if (!MoveAside(path, aside)) {
+    error = StateFileError("cannot set aside", path);
+    return false;
+  }
+  for (const char* ending : {"-wal", "-journal"}) {
+    if (!MoveAside(path + ending, aside + ending)) {
+      error = StateFileError("cannot set aside", path + ending);
+      return false;
+    }
+  }
+  std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
+  return true;
+}
+
+CopyAge Compare(const Holding& copy, const Holding& database) {
+  if (copy.version > STATE_VERSION) {
+    return CopyAge::LEVEL;  // of a newer program, which may want it: it could not be used here
+  }
+  if (copy.changes > database.changes) {
+    return CopyAge::AHEAD;
+  }
+  if (copy.changes < database.changes || copy.version < database.version) {
+    return CopyAge::BEHIND;
+  }
+  // Programs before the counting may have left none.
+  return copy.changes > 0 && copy.rows != database.rows ? CopyAge::AHEAD : CopyAge::LEVEL;
 }
 
 // What was renamed is to be found under its new name after a power failure.
@@ -165,43 +214,35 @@ void SyncFolder(const ScopedFd& folder) {
 // into the copy.
 bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& error) {
   std::string image;
-  if (!ReadAll(path + ".copy", image) || !IsSoundImage(image)) {
-    error += "; and there is no sound copy of it";
+  bool sound = false;
+  Holding ignored;
+  const std::string copy = path + ".copy";
+  const int result = ReadAll(copy, image) ? LookInto(image, sound, ignored) : SQLITE_OK;
+  if (result != SQLITE_OK || !sound) {
+    error += result == SQLITE_OK
+                 ? "; and there is no sound copy of it"
+                 : "; and " + copy + " cannot be read: " + sqlite3_errstr(result);
     return false;
   }
-  if (!WriteNew(path, image, error)) {
+  std::string reason;
+  if (!WriteNew(path, image, reason) || !SetStateAside(path, reason)) {
+    error += "; " + reason;
     return false;
   }
-  const std::string aside = path + ".damaged";
-  std::error_code ignored;
-  if (StateFileExists(path)) {
-    std::filesystem::remove_all(aside + "-wal", ignored);  // of what was set aside before
-  }
-  if (!MoveAside(path, aside)) {
-    error += "; " + StateFileError("cannot set aside", path);
-    return false;
-  }
-  if (!MoveAside(path + "-wal", aside + "-wal")) {
-    error += "; " + StateFileError("cannot set aside the log of", path);
-    return false;
-  }
-  std::filesystem::remove_all(path + "-shm", ignored);  // no use without the log, and made anew
   SyncFolder(root);
-  if (!TakeNew(path, error)) {
+  if (!TakeNew(path, reason)) {
+    error += "; " + reason;
     return false;
   }
   SyncFolder(root);
   return true;
 }
 
-int LacksChangesOfCopy(const StateConnection& connection, bool& lacks, std::string& error) {
-  lacks = false;
+int CompareWithCopy(const StateConnection& connection, CopyAge& age, std::string& error) {
+  age = CopyAge::BEHIND;
   const std::string path = connection.path + ".copy";
-  if (!IsFileOrNothing(path)) {
-    return SQLITE_OK;
-  }
   std::string image;
-  if (!ReadAll(path, image)) {
+  if (IsFileOrNothing(path) && !ReadCopy(path, image)) {
     error = StateFileError("cannot read", path);
     return SQLITE_IOERR;
   }
@@ -218,31 +259,32 @@ int LacksChangesOfCopy(const StateConnection& connection, bool& lacks, std::stri
     error = StateError(connection, "cannot read");
     return result;
   }
-  // An upgrade leaves no copy, and programs before the counting may have left none.
-  const bool differs = left.changes == held.changes && left.changes > 0 &&
-                       left.version == held.version && left.rows != held.rows;
-  // One that a newer program made could not be used.
-  lacks = sound && left.version <= STATE_VERSION && (left.changes > held.changes || differs);
+  if (sound) {
+    age = Compare(left, held);
+  }
   return SQLITE_OK;
 }
 
-bool LeaveStateCopy(const StateConnection& connection, std::string& error) {
-  // The lock keeps an older copy from replacing a newer one of another program.
+// The lock keeps an older copy from replacing a newer one of another program.
+CopyLeft LeaveStateCopy(const StateConnection& connection, std::string& error) {
   ScopedFd lock;
   const std::string root = connection.path.substr(0, connection.path.rfind('/'));
-  if (!LockStateRoot(root, lock, error)) {
-    return false;
-  }
+  return LockStateRoot(root, lock, error) ? LeaveStateCopy(connection, lock, error)
+                                          : CopyLeft::FAILED;
+}
+
+CopyLeft LeaveStateCopy(const StateConnection& connection, const ScopedFd& root,
+                        std::string& error) {
   if (IsSetAside(connection)) {
     error = connection.path + " was replaced; the copy is that of the other one";
-    return false;
+    return CopyLeft::FAILED;
   }
   sqlite3_int64 size = 0;
   unsigned char* bytes = sqlite3_serialize(connection.db, "main", &size, 0);
   if (bytes == nullptr || size < 100) {
     sqlite3_free(bytes);
     error = StateError(connection, "cannot copy");
-    return false;
+    return CopyLeft::FAILED;
   }
   std::string image(reinterpret_cast<char*>(bytes), static_cast<size_t>(size));
   sqlite3_free(bytes);
@@ -250,16 +292,23 @@ bool LeaveStateCopy(const StateConnection& connection, std::string& error) {
   // A copy stands alone: these two bytes of the header say that there is no log beside it.
   image[18] = 1;
   image[19] = 1;
-  if (!IsSoundImage(image)) {
+  bool sound = false;
+  Holding ignored;
+  const int result = LookInto(image, sound, ignored);
+  if (result != SQLITE_OK) {
+    error = "cannot check " + connection.path + ": " + sqlite3_errstr(result);
+    return CopyLeft::FAILED;
+  }
+  if (!sound) {
     error = connection.path + " is damaged; the copy beside it is left as it was";
-    return false;
+    return CopyLeft::DAMAGED;
   }
   const std::string copy = connection.path + ".copy";
   if (!WriteNew(copy, image, error) || !TakeNew(copy, error)) {
-    return false;
+    return CopyLeft::FAILED;
   }
-  SyncFolder(lock);
-  return true;
+  SyncFolder(root);
+  return CopyLeft::GOOD;
 }
 
 }  // namespace fileindexd

@@ -92,7 +92,8 @@ Opened Upgrade(const StateConnection& connection, int64_t version, std::string& 
 }
 
 // The version is looked at before anything else is believed: a newer one may hold anything.
-Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::string& error) {
+Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, CopyAge& age,
+                       std::string& error) {
   int64_t version = 0;
   int result = SchemaVersion(connection.db, version);
   if (result != SQLITE_OK) {
@@ -116,19 +117,22 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, std::st
     error = connection.path + " is damaged";
     return Opened::DAMAGED;
   }
-  bool lacks = false;
-  result = has_copy ? LacksChangesOfCopy(connection, lacks, error) : SQLITE_OK;
+  result = has_copy ? CompareWithCopy(connection, age, error) : SQLITE_OK;
   if (result != SQLITE_OK) {
     return FailedAtTables(result);
   }
-  if (lacks) {
+  if (age == CopyAge::AHEAD) {
     error = connection.path + " has lost changes";
     return Opened::DAMAGED;
   }
-  return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
+  if (version == STATE_VERSION) {
+    return Opened::GOOD;
+  }
+  age = CopyAge::BEHIND;
+  return Upgrade(connection, version, error);
 }
 
-Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) {
+Opened OpenFile(StateConnection& connection, bool has_copy, CopyAge& age, std::string& error) {
   // No mutex of SQLite's own: the store serialises its users.
   constexpr int FLAGS = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX;
   int result = sqlite3_open_v2(connection.path.c_str(), &connection.db, FLAGS, nullptr);
@@ -138,17 +142,47 @@ Opened OpenFile(StateConnection& connection, bool has_copy, std::string& error) 
   sqlite3_extended_result_codes(connection.db, 1);
   sqlite3_busy_timeout(connection.db, BUSY_WAIT_MS);
   TidyOnClose(connection, false);
-  const Opened outcome = CheckAndUpgrade(connection, has_copy, error);
+  const Opened outcome = CheckAndUpgrade(connection, has_copy, age, error);
   if (outcome != Opened::GOOD) {
     return outcome;
   }
-  result = Execute(connection.db, "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL");
+  // The log is opened by the first that reads.
+  result = Execute(connection.db,
+                   "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL;"
+                   "SELECT 1 FROM sqlite_schema LIMIT 1");
   if (result != SQLITE_OK) {
     return Failed(connection, "cannot set up", result, error);
   }
   TidyOnClose(connection, true);
-  connection.log_inode = LogInode(connection.path);
+  connection.log = LogFilesOf(connection.path);
   return Opened::GOOD;
+}
+
+// What is no regular file is damage: SQLite would wait for ever in a pipe.
+bool AreFilesOrNothing(const std::string& path) {
+  return IsFileOrNothing(path) && IsFileOrNothing(path + "-wal") &&
+         IsFileOrNothing(path + "-shm") && IsFileOrNothing(path + "-journal");
+}
+
+// A disk that fails for a moment looks like damage: it is looked at twice, from the beginning.
+Opened OpenTwice(std::unique_ptr<StateConnection>& connection, bool has_copy, const ScopedFd& root,
+                 std::string& error) {
+  const std::string path = connection->path;
+  CopyAge age = CopyAge::BEHIND;
+  Opened outcome = OpenFile(*connection, has_copy, age, error);
+  if (outcome == Opened::DAMAGED) {
+    connection = std::make_unique<StateConnection>();
+    connection->path = path;
+    age = CopyAge::BEHIND;
+    outcome = OpenFile(*connection, has_copy, age, error);
+  }
+  // Left by a program that was killed, or met a full disk. Where it still cannot be, the next
+  // change says so.
+  if (outcome == Opened::GOOD && age == CopyAge::BEHIND) {
+    std::string ignored;
+    (void)LeaveStateCopy(*connection, root, ignored);
+  }
+  return outcome;
 }
 
 }  // namespace
@@ -194,8 +228,7 @@ bool IsSetAside(const StateConnection& connection) {
 }
 
 bool HasStateMoved(const StateConnection& connection) {
-  return IsSetAside(connection) ||
-         (connection.log_inode != 0 && LogInode(connection.path) != connection.log_inode);
+  return IsSetAside(connection) || LogFilesOf(connection.path) != connection.log;
 }
 
 std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
@@ -212,13 +245,12 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
     Opened outcome = Opened::DAMAGED;
     if (has_copy && !StateFileExists(path)) {
       error = path + " is missing";
-    } else if (!IsFileOrNothing(path) || !IsFileOrNothing(path + "-wal") ||
-               !IsFileOrNothing(path + "-shm")) {
+    } else if (!AreFilesOrNothing(path)) {
       error = path + " or its log is no regular file";
     } else if (!MakeFile(path, error)) {
       return nullptr;
     } else {
-      outcome = OpenFile(*connection, has_copy, error);
+      outcome = OpenTwice(connection, has_copy, lock, error);
     }
     if (outcome == Opened::GOOD) {
       return connection;

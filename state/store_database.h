@@ -2,7 +2,7 @@
 // The state database's file: its opening and its schema. For the copy beside it see store_copy.h.
 //
 //   state.db          the database (SQLite, WAL)
-//   state.db.copy     as it was after the last change
+//   state.db.copy     as it was after the last change, if it could be left
 //   state.db.damaged  what was set aside last
 //
 // Opening and copying are one program's at a time, under a lock on the state root. Nothing throws.
@@ -10,7 +10,6 @@
 #pragma once
 
 #include <sqlite3.h>
-#include <sys/types.h>
 
 #include <array>
 #include <memory>
@@ -36,7 +35,7 @@ class StateConnection {
 
   sqlite3* db = nullptr;
   std::string path;
-  ino_t log_inode = 0;  // of the log that it uses; 0: none
+  LogFiles log;  // that it uses
   // Why it is for reading only, and sees no later change: the disk is full. Else empty.
   std::string read_only;
 };

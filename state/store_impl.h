@@ -26,8 +26,8 @@ struct StateStore::Impl {
   bool FailSql();
 
   bool Open();
-  // Opens anew where another program set the file aside or its log is gone (changes would be lost),
-  // and where the connection is of no use any more, or was for reading only.
+  // Opens anew where another program set the file aside or its log or shared memory is gone (changes
+  // would be lost), and where the connection is of no use any more, or was for reading only.
   bool Ready();
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
@@ -41,6 +41,7 @@ struct StateStore::Impl {
   // Runs `body` in one transaction that is undone unless it answers CHANGED.
   bool Change(const std::function<Outcome()>& body);
   bool ChangeOnce(const std::function<Outcome()>& body, bool& is_lost);
+  bool LeaveCopy(bool& is_lost);
   // The same for what GetSettings shows.
   bool ChangeSettings(const std::function<Outcome()>& body);
   Outcome Done(bool good) { return good ? Outcome::CHANGED : Outcome::FAILED; }
@@ -70,6 +71,7 @@ struct StateStore::Impl {
   bool files_failed = false;              // of this connection
   bool full_told = false;                 // that the disk is full, since it last was not
   bool newer_told = false;                // of the version, since it last was ours
+  std::string copy_failure;               // that was told, since a copy was last left
   std::optional<Statement> data_version;  // goes before the connection
   int64_t cached_version = 0;
   std::optional<LogHead> cached_head;      // of the log, before `cached_version` was asked for

@@ -4,9 +4,13 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <fstream>
+#include <functional>
+#include <vector>
 
 #include "state/store.h"
 #include "tests/unit/state/fixture.h"
+#include "tests/unit/state/version_1.h"
 
 namespace fileindexd {
 namespace {
@@ -285,14 +289,140 @@ TEST_F(StoreDamageTest, TheCopyHoldsTheLastChangeAndStandsAlone) {
   ExpectAllThere(*second);
 }
 
-TEST_F(StoreDamageTest, ACopyThatCannotBeLeftDoesNotFailTheChange) {
+TEST_F(StoreDamageTest, AFolderInTheCopysPlaceIsSetAside) {
+  const auto store = OpenStore();
   std::filesystem::remove(copy);
   std::filesystem::create_directories(copy + "/in/its/place");
-  const auto store = OpenStore();
+  std::filesystem::create_directories(copy + ".new/in/its/place");
+
   EXPECT_TRUE(store->SetPause(5)) << store->Error();
+
+  EXPECT_TRUE(std::filesystem::is_regular_file(copy));
+  EXPECT_TRUE(std::filesystem::exists(copy + ".damaged/in/its/place"));
+  EXPECT_FALSE(Exists(copy + ".new"));
+}
+
+// Without it the next damage would take what was changed last.
+TEST_F(StoreDamageTest, AnOpeningLeavesACopyWhereOneLacks) {
+  const std::string older = ReadFile(copy);
+  ASSERT_TRUE(OpenStore()->SetPause(5));
+  const std::vector<std::function<void()>> lacks = {
+      [&] { std::filesystem::remove(copy); },
+      [&] { WriteFile(copy, older); },
+      [&] { WriteFile(copy, std::string(10'000, 'x')); },
+      [&] {
+        std::filesystem::remove(copy);
+        mkfifo(copy.c_str(), 0600);
+      },
+      [&] {
+        std::filesystem::remove(copy);
+        std::filesystem::create_directories(copy + "/in/its/place");
+      }};
+  for (const auto& make : lacks) {
+    make();
+    ExpectAllThere(*OpenStore());
+
+    WriteFile(database, std::string(10'000, 'x'));
+    int64_t resume_time = 0;
+    ASSERT_TRUE(OpenStore()->GetPause(resume_time));
+    EXPECT_EQ(resume_time, 5);
+  }
+}
+
+TEST_F(StoreDamageTest, AnUpgradeLeavesACopy) {
+  std::filesystem::remove(copy);
+  std::filesystem::remove(database);
+  Sql(database, VERSION_1);
+  (void)OpenStore();
+  std::filesystem::remove(database);
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_EQ(settings->shares.size(), 1U);
+}
+
+// Two programs with a memory of their own would write over each other's changes.
+TEST_F(StoreDamageTest, AnOpenStoreLosesNothingWithItsSharedMemory) {
+  const auto store = OpenStore();
+  ASSERT_TRUE(store->SetPause(5));
+  std::filesystem::remove(database + "-shm");
+  const auto other = OpenStore();
+  ASSERT_TRUE(other->AddFolder("/v/a/b", {})) << other->Error();
+
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(store->GetSettings(settings)) << store->Error();
+  EXPECT_EQ(settings->folders.size(), 2U);
+  ASSERT_TRUE(store->SetPause(6)) << store->Error();
+  ASSERT_TRUE(other->GetSettings(settings)) << other->Error();
+  EXPECT_EQ(settings->folders.size(), 2U);
   int64_t resume_time = 0;
-  ASSERT_TRUE(store->GetPause(resume_time));
+  ASSERT_TRUE(other->GetPause(resume_time)) << other->Error();
+  EXPECT_EQ(resume_time, 6);
+}
+
+TEST_F(StoreDamageTest, TheFirstStoreNoticesThatItsLogWent) {
+  std::filesystem::remove_all(state_root);
+  const auto store = OpenStore();
+  ASSERT_TRUE(store->AddShare({"a", "/v/a", ""})) << store->Error();
+  Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
+  std::filesystem::remove(database + "-wal");
+  ASSERT_TRUE(OpenStore()->AddFolder("/v/a", {}));
+
+  ExpectAllThere(*store);
+}
+
+// In a page that the change does not touch, so that only the copy that is to be left tells.
+TEST_F(StoreDamageTest, AChangeToAnOpenDatabaseThatIsDamagedIsMadeAgainInTheCopy) {
+  const auto store = OpenStore();
+  ASSERT_TRUE(store->SetMarker("m"));
+  Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
+  std::string bytes = ReadFile(database);
+  int64_t page = 0;
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open(database.c_str(), &db), SQLITE_OK);
+  const auto take = [](void* number, int, char** row, char**) {
+    *static_cast<int64_t*>(number) = std::stoll(row[0]);
+    return 0;
+  };
+  sqlite3_exec(db, "SELECT rootpage FROM sqlite_schema WHERE name = 'marker'", take, &page,
+               nullptr);
+  sqlite3_close(db);
+  ASSERT_GT(page, 1);
+  std::fstream file(database, std::ios::in | std::ios::out | std::ios::binary);
+  file.seekp((page - 1) * 4096);
+  file << std::string(4096, '\x55');
+  file.close();
+
+  ASSERT_TRUE(store->SetPause(5)) << store->Error();
+
+  const auto other = OpenStore();
+  int64_t resume_time = 0;
+  ASSERT_TRUE(other->GetPause(resume_time));
   EXPECT_EQ(resume_time, 5);
+  bool has = false;
+  EXPECT_TRUE(other->HasMarker("m", has) && has) << other->Error();
+  EXPECT_TRUE(Exists(database + ".damaged"));
+}
+
+TEST_F(StoreDamageTest, WhatStandsInTheJournalsPlaceIsSetAside) {
+  ASSERT_TRUE(OpenStore()->SetPause(5));
+  const std::string journal = database + "-journal";
+  for (const bool folder_there : {true, false}) {
+    folder_there ? (void)std::filesystem::create_directories(journal + "/in/its/place")
+                 : (void)mkfifo(journal.c_str(), 0600);
+
+    int64_t resume_time = 0;
+    ASSERT_TRUE(OpenStore()->GetPause(resume_time));
+    EXPECT_EQ(resume_time, 5);
+    EXPECT_TRUE(Exists(database + ".damaged-journal"));
+  }
+}
+
+// A folder that somebody made must not keep everybody out.
+TEST_F(StoreDamageTest, AFolderInTheWayOfPuttingTheCopyInPlaceIsRemoved) {
+  std::filesystem::remove(database);
+  std::filesystem::create_directories(database + ".new/in/its/place");
+  ExpectAllThere(*OpenStore());
 }
 
 }  // namespace
