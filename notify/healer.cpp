@@ -39,6 +39,9 @@ using Clock = std::chrono::steady_clock;
 
 constexpr milliseconds PAUSE_LOOK(1000);  // between two looks at the stored pause
 constexpr milliseconds END_PATIENCE(500);
+// With what writes, which may be stopped, before the share is compared all the same, and once more
+// later.
+constexpr milliseconds WRITER_PATIENCE(10000);
 
 // Percent. A comparison raises the pressure itself, above all on a disk that has to seek; one at
 // idle priority thereby keeps to about this share of it.
@@ -146,7 +149,8 @@ Healing Shared::Compare(Urgency urgency, const std::string& share) {
     return failed;
   }
 
-  ShareComparison comparison(*store, share);
+  ShareComparison comparison(*store, share,
+                             urgency == Urgency::IDLE ? milliseconds::max() : WRITER_PATIENCE);
   while (AwaitTurn(urgency, *store)) {
     const Clock::time_point began = Clock::now();
     if (!comparison.GoOn()) {

@@ -15,8 +15,10 @@
 namespace fileindexd {
 
 enum class Urgency {
-  NOW,    // the index may differ
-  IDLE,   // it should not: at idle priority, and only while nothing urgent waits
+  NOW,  // the index may differ
+  // It should not: at idle priority, only while nothing urgent waits, and once what is being
+  // written has ended, however long that takes.
+  IDLE,
   APART,  // as NOW, of a file system that may hang: it keeps none of the others waiting
 };
 
@@ -25,6 +27,7 @@ struct Healing {
   std::string share;
   bool done = false;  // false: `error` says why it could not be made
   std::string error;
+  bool early = false;  // it began while something was being written, which it may have missed
   Comparison counts;
   std::vector<QueueLine> lines;         // that mend what was found, sorted
   int64_t began = 0;                    // seconds since the epoch

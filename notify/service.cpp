@@ -179,6 +179,9 @@ void Service::TakeHealings() {
     }
     FedShare& share = *known->second;
     share.rest_until = Clock::now() + std::min(healing.worked, LONGEST_REST);
+    if (healing.early) {
+      healer.Request(healing.share, Urgency::IDLE);
+    }
     const bool is_last = !healer.IsPending(healing.share) && !share.compare_at.has_value();
     const std::string& name = known->first;
     if (healing.done) {

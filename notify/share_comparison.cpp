@@ -20,12 +20,14 @@ constexpr std::chrono::milliseconds PIECE_TIME(100);
 constexpr uint64_t FIRST_PIECE = 500;
 constexpr uint64_t LONGEST_PIECE = 5000;
 constexpr uint64_t SHORTEST_PIECE = 20;
-constexpr int WRITER_PATIENCE_MS = 100;  // before the next one is given its turn
+constexpr std::chrono::milliseconds WRITER_TIME(100);  // before the next one is given its turn
 
 }  // namespace
 
-ShareComparison::ShareComparison(StateStore& state, const std::string& share_name)
+ShareComparison::ShareComparison(StateStore& state, const std::string& share_name,
+                                 std::chrono::milliseconds patience)
     : store(state),
+      writer_patience(patience),
       comparer(state, share_name),
       progress(ComparisonProgressPath(share_name)),
       piece(FIRST_PIECE) {
@@ -50,7 +52,17 @@ void ShareComparison::Finish() {
 bool ShareComparison::HasWriterEnded() {
   const bool is_open = reader.database.IsOpen() && !reader.database.HasMoved();
   return (!is_open && reader.Open(healing.share) != IndexError::NONE) ||
-         reader.HasWriterEnded(WRITER_PATIENCE_MS);
+         reader.HasWriterEnded(static_cast<int>(WRITER_TIME.count()));
+}
+
+// A writer may be stopped for long: other shares wait behind this one.
+bool ShareComparison::MayBegin() {
+  if (HasWriterEnded()) {
+    return true;
+  }
+  healing.early = writer_patience <= WRITER_TIME;
+  writer_patience -= WRITER_TIME;
+  return healing.early;
 }
 
 bool ShareComparison::Begin() {
@@ -77,7 +89,7 @@ bool ShareComparison::Begin() {
 }
 
 bool ShareComparison::GoOn() {
-  if (repair == nullptr && !HasWriterEnded()) {
+  if (repair == nullptr && !MayBegin()) {
     return true;
   }
   if (repair == nullptr && !Begin()) {

@@ -18,7 +18,9 @@ namespace fileindexd {
 // One thread. The store outlives it.
 class ShareComparison {
  public:
-  ShareComparison(StateStore& state, const std::string& share_name);
+  // `patience`: how long it waits for what is being written to end.
+  ShareComparison(StateStore& state, const std::string& share_name,
+                  std::chrono::milliseconds patience = std::chrono::milliseconds::max());
   ShareComparison(const ShareComparison&) = delete;
   ShareComparison& operator=(const ShareComparison&) = delete;
 
@@ -29,12 +31,14 @@ class ShareComparison {
   Healing healing;
 
  private:
+  bool MayBegin();
   bool HasWriterEnded();
   bool Begin();
   bool Fail(const std::string& why);
   void Finish();
 
   StateStore& store;
+  std::chrono::milliseconds writer_patience;  // that is left
   Comparer comparer;
   std::shared_ptr<const Settings> settings;  // outlives `repair`, as does `reader`
   EntryReader reader;                        // counts for the repair, beside the comparison's own

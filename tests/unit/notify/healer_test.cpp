@@ -382,6 +382,20 @@ TEST_F(WrittenMeanwhileTest, ComparisonBeginsWhenThatIsGivenUp) {
   EXPECT_EQ(Compare(comparison), Names());
 }
 
+TEST_F(WrittenMeanwhileTest, ComparisonThatWaitsNoLongerSaysSo) {
+  ShareComparison comparison(*store, "s", std::chrono::milliseconds(200));
+  ASSERT_TRUE(comparison.GoOn());
+
+  EXPECT_EQ(Compare(comparison), Names());
+  EXPECT_TRUE(comparison.healing.early);
+
+  ShareComparison later(*store, "s");
+  ASSERT_TRUE(later.GoOn());
+  ASSERT_EQ(Execute(other, "COMMIT"), SQLITE_OK);
+  EXPECT_EQ(Compare(later), missing);
+  EXPECT_FALSE(later.healing.early);
+}
+
 // A FUSE file system of which nobody answers.
 TEST_F(HealerTest, OneThatHangsKeepsNobodyElseWaiting) {
   WriteFile(At("a"), "");
