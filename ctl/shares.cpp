@@ -52,26 +52,46 @@ void RemoveAll(const std::string& path, std::error_code& error) {
   }
 }
 
-// Out of the way first: what has not seen yet that the share is gone makes nothing more there,
-// unless it makes the folder itself. What a removal that was cut short left goes too. No share's
-// name begins with a dot.
-bool RemoveShareFolder(const std::string& name) {
-  const std::string folder = ShareFolder(name);
-  const std::string removed = ShareFolder("." + name + ".removed");
+// No share's name begins with a dot.
+std::string RemovedFolder(const std::string& name) {
+  return ShareFolder("." + name + ".removed");
+}
+
+// What removals of whatever share left that were cut short.
+void SweepRemoved() {
+  const std::string ending = ".removed";
   std::error_code error;
-  RemoveAll(removed, error);
-  if (!error) {
-    std::filesystem::rename(folder, removed, error);
-    // Where folders cannot be renamed (a mount point, a lower layer of an overlay): as it stands.
-    const bool stands = error && error != std::errc::no_such_file_or_directory;
-    RemoveAll(stands ? folder : removed, error);
+  std::filesystem::directory_iterator folders(
+      std::filesystem::path(ShareFolder("name")).parent_path(), error);
+  for (; !error && folders != std::filesystem::directory_iterator(); folders.increment(error)) {
+    const std::string name = folders->path().filename();
+    if (name.starts_with('.') && name.ends_with(ending)) {
+      std::error_code ignored;  // the next one tries again
+      RemoveAll(folders->path(), ignored);
+    }
   }
+}
+
+// Out of the way first: what has not seen yet that the share is gone makes nothing more there,
+// unless it makes the folder itself.
+bool RemoveShareFolder(const std::string& name) {
+  SweepRemoved();
+  const std::string folder = ShareFolder(name);
+  const std::string removed = RemovedFolder(name);
+  std::error_code error;
+  std::filesystem::rename(folder, removed, error);
+  if (error == std::errc::no_such_file_or_directory) {
+    return true;
+  }
+  // Where folders cannot be renamed (a mount point, a lower layer of an overlay): as it stands.
+  const std::string& left = error ? folder : removed;
+  RemoveAll(left, error);
   std::error_code ignored;
   if (error == std::errc::device_or_resource_busy && std::filesystem::is_empty(folder, ignored)) {
     error.clear();  // a mount point itself stays
   }
   if (error) {
-    (void)Fail(EXIT_FAILED, "%s: %s", folder.c_str(), error.message().c_str());
+    (void)Fail(EXIT_FAILED, "%s: %s", left.c_str(), error.message().c_str());
     return false;
   }
 

@@ -181,6 +181,15 @@ class SharesTest(IndexTest):
         self.await_drained("alpha")
         self.assert_index(self.root)
 
+    def test_what_a_removal_left_that_was_cut_short_goes_with_the_next_one(self):
+        self.make_share(files=("a.txt",))
+        left = f"{namespace.STATE}/shares/.other.removed"
+        os.makedirs(f"{left}/index")
+
+        self.ctl("share", "remove", "alpha")
+
+        self.assertEqual(os.listdir(f"{namespace.STATE}/shares"), [])
+
     def test_remove_of_an_unknown_share(self):
         self.ctl("share", "remove", "nope", code=1)
 
