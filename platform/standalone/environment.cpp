@@ -20,7 +20,7 @@ namespace {
 struct Environment {
   std::mutex mutex;
   std::unique_ptr<StateStore> store;
-  bool open_failure_told = false;
+  std::string open_failure;                    // that was told, since it last went well
   std::map<std::string, std::string> failing;  // by what the store does not give or take: told why
   std::shared_ptr<const Settings> settings = std::make_shared<Settings>();
   std::map<std::string, bool> commits;  // by share: whether the last one was good
@@ -92,14 +92,13 @@ StateStore* Store() {
     opened.reset();
   }
   if (opened == nullptr) {
-    if (!process.open_failure_told) {
+    if (std::exchange(process.open_failure, error) != error) {
       FI_LOG("Failed to open the state database: %s", error.c_str());
     }
-    process.open_failure_told = true;
     return nullptr;
   }
 
-  process.open_failure_told = false;
+  process.open_failure.clear();
   process.store = std::move(opened);
   RaiseDescriptorLimit(process.descriptors);
   ShareOneHeap();
