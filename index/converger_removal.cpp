@@ -49,7 +49,7 @@ IndexError Converger::NoteLinks(const Entry& removed) {
     return IndexError::NONE;
   }
   const size_t before = other_paths.size();
-  const IndexError error = Sql(table.OtherPaths(removed, false, other_paths));
+  const IndexError error = Sql(table.OtherPaths(removed, false, other_paths, MOST_LINKS + 1));
   if (other_paths.size() - before > MOST_LINKS) {
     other_paths.resize(before);
   }

@@ -93,7 +93,7 @@ int EntryTable::Prepare(sqlite3* db) {
        "OR owner <> ?5 OR grp <> ?6 OR mode <> ?7)"},
       {&other_paths,
        "SELECT path FROM entries WHERE inode = ?1 AND id <> ?2 "
-       "AND (birth_time = ?3 OR birth_time = 0 OR ?3 = 0) AND (?4 = 0 OR ctime <> ?5)"},
+       "AND (birth_time = ?3 OR birth_time = 0 OR ?3 = 0) AND (?4 = 0 OR ctime <> ?5) LIMIT ?6"},
       {&insert,
        "INSERT INTO entries(path, thing, kind, content_wanted, inode, size, mtime, ctime, "
        "birth_time, first_seen, owner, grp, mode, written, reread) VALUES(?1, ?2, ?3, ?4, ?5, ?6, "
@@ -212,12 +212,14 @@ int EntryTable::CollectPaths(Statement& statement, std::vector<std::string>& pat
   return statement.ReadAll([&] { paths.push_back(statement.Bytes(0)); });
 }
 
-int EntryTable::OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths) {
+int EntryTable::OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths,
+                           int64_t most) {
   other_paths.BindInt(1, static_cast<int64_t>(entry.inode));
   other_paths.BindInt(2, entry.id);
   other_paths.BindInt(3, entry.birth_time);
   other_paths.BindInt(4, changed ? 1 : 0);
   other_paths.BindInt(5, entry.ctime);
+  other_paths.BindInt(6, most);
   return CollectPaths(other_paths, paths);
 }
 

@@ -60,8 +60,9 @@ class EntryTable {
   // Other paths of the same inode whose attributes differ from those of `entry`.
   int StaleTwins(const Entry& entry, std::vector<std::string>& paths);
   // Paths of other entries with the same inode and birth time; which one is another, `id` tells.
-  // `changed`: only those that were seen with another change time.
-  int OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths);
+  // `changed`: only those that were seen with another change time. `most`: -1 for all of them.
+  int OtherPaths(const Entry& entry, bool changed, std::vector<std::string>& paths,
+                 int64_t most = -1);
 
   int Insert(const Entry& entry);  // `id` does not count
   // By `id`; the path does not change. `reread`: somebody wrote to it: the content may be another.

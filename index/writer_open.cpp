@@ -140,6 +140,7 @@ void EntryWriter::Impl::CloseAll() {
     operation.applied = false;
   }
   replay_needed = !list.empty();
+  to_note = 0;
 }
 
 // Set aside now, so that whoever opens next finds that there is none.
