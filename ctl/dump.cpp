@@ -5,6 +5,7 @@
 #include "ctl/places.h"
 #include "index/found_kind.h"
 #include "index/reader.h"
+#include "index/suspicion.h"
 
 namespace fileindexd {
 
@@ -58,6 +59,7 @@ int Dump(const Arguments& arguments) {
     return written;
   });
   if (!read && written) {
+    TellWriter(share->name, FromSqlite(sqlite3_errcode(reader.database.db)));
     return Fail(EXIT_FAILED, "%s: the index cannot be read", share->name.c_str());
   }
   if (kinds.error != IndexError::NONE && kinds.error != IndexError::PATH_NOT_FOUND) {

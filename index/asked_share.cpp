@@ -8,6 +8,7 @@
 
 #include "index/content_functions.h"
 #include "index/contents_reader.h"
+#include "index/suspicion.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -166,6 +167,7 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
       of_contents = error;
     }
     if (tries == TRIES || error == IndexError::PATH_NOT_FOUND) {
+      TellWriter(name, error);
       Fail(IndexErrorText(error));
       return;
     }

@@ -15,6 +15,7 @@
 #include "index/entry_stream.h"
 #include "index/entry_table.h"
 #include "index/reader.h"
+#include "index/suspicion.h"
 
 namespace fileindexd {
 
@@ -112,7 +113,7 @@ bool Comparer::OpenIndex() {
   if (has_index) {
     EntryReader::Summary summary;
     if (!side->reader.Summarise(summary)) {
-      return Refuse("share " + share_name + ": the index cannot be read");
+      return RefuseUnreadable();
     }
     estimate = summary.entries;
     return true;
@@ -127,7 +128,13 @@ bool Comparer::OpenIndex() {
     estimate = 0;
     return true;
   }
+  TellWriter(share_name, opened);
   return Refuse("share " + share_name + ": " + IndexErrorText(opened));
+}
+
+bool Comparer::RefuseUnreadable() {
+  TellWriter(share_name, FromSqlite(sqlite3_errcode(side->reader.database.db)));
+  return Refuse("share " + share_name + ": the index cannot be read");
 }
 
 // An unmounted disk must not be told as a thousand files that are gone. Where its empty mount point
@@ -146,7 +153,7 @@ bool Comparer::CheckRoot() {
   const Entry* entry = nullptr;
   do {
     if (!entries.Next(entry)) {
-      return Refuse("share " + share_name + ": the index cannot be read");
+      return RefuseUnreadable();
     }
   } while (entry != nullptr && side->settings->FolderAt(entry->path) != nullptr);
   if (entry == nullptr || EmptyIsAccepted(store, share_name)) {
@@ -218,7 +225,7 @@ bool Comparer::Tell(const Report& report, Difference difference, const std::stri
 
 bool Comparer::NextEntry() {
   if (!side->entries.Next(side->entry)) {
-    return Refuse("share " + share_name + ": the index cannot be read");
+    return RefuseUnreadable();
   }
   counts.entries += side->entry != nullptr ? 1 : 0;
   return true;

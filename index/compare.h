@@ -99,6 +99,7 @@ class Comparer {
   bool OpenIndex();
   bool CheckRoot();
   bool Refuse(const std::string& why);
+  bool RefuseUnreadable();
 
   StateStore& store;
   const std::string share_name;

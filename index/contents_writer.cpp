@@ -7,6 +7,7 @@
 
 #include "index/contents_writer_impl.h"
 #include "index/set_aside.h"
+#include "index/suspicion.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -66,6 +67,7 @@ bool ContentsWriter::Impl::Done(int code) {
   }
   error = FromSqlite(code);
   if (std::exchange(entries.failed, false)) {
+    TellWriter(share.name, error);
     CloseAll();
     return false;
   }
@@ -325,6 +327,10 @@ bool ContentsWriter::Sweep(int64_t now, size_t limit, bool& more) {
 
 bool ContentsWriter::Merge(bool& more) {
   return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->table->MergeWords(more)); });
+}
+
+bool ContentsWriter::AreEntriesBeingRemoved() const {
+  return impl->entries.IsBeingRemoved(impl->share.name);
 }
 
 bool ContentsWriter::HasChanges() const {

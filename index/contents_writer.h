@@ -6,6 +6,7 @@
 // Commit; a failure undoes all since the last one, and the caller closes and opens anew.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <string>
@@ -42,6 +43,10 @@ class ContentsWriter {
   IndexError Open(const Share& share, int64_t extractor_version);
   void Close();
   bool IsOpen() const;
+  // Whether the last opening did not find the entries because they seem to be going at this moment.
+  // Their log may have gone alone: the next opening after LONGEST_REMOVAL tells.
+  bool AreEntriesBeingRemoved() const;
+  static constexpr std::chrono::seconds LONGEST_REMOVAL{2};
 
   // Whose folders tell which kinds are wanted of files whose names tell none: what was found to be
   // of another kind is not kept. Until it is called, all are. When they changed: LookAtAll.

@@ -18,6 +18,7 @@
 #include "index/log_check.h"
 #include "index/schema.h"
 #include "index/set_aside.h"
+#include "index/suspicion.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -156,13 +157,14 @@ IndexError OpenExisting(const std::string& index_path, const DatabaseForm& form,
   return error;
 }
 
-// Whether commits are missing from what was opened for writing.
-IndexError CheckCommits(sqlite3* db, const std::string& index_path, const DatabaseForm& form) {
+// Whether what was opened for writing is damaged, or lacks commits.
+IndexError CheckSound(sqlite3* db, const std::string& index_path, const DatabaseForm& form) {
   if (HasLostCommits(db)) {
     return IndexError::DAMAGED;
   }
-  if (form.last_commit == nullptr) {
-    return IndexError::NONE;
+  const IndexError suspected = CheckSuspected(db, index_path);
+  if (suspected != IndexError::NONE || form.last_commit == nullptr) {
+    return suspected;
   }
 
   const int64_t noted = NotedCommit(index_path);
@@ -275,7 +277,7 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
   std::optional<IndexFlaw> flaw;
   IndexError error = OpenExisting(index_path, form, PRAGMAS_FOR_WRITING, db, flaw);
   if (error == IndexError::NONE) {
-    error = CheckCommits(db, index_path, form);
+    error = CheckSound(db, index_path, form);
     if (error != IndexError::NONE) {
       Close();
     }

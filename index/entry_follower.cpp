@@ -44,12 +44,16 @@ int EntryFollower::End(Statement& statement, int code) {
   return StepError(code);
 }
 
-// Opening would make a log anew in a folder that somebody is removing with all that is in it. The
-// one who writes next makes another one, or another database.
+// Opening would make a log anew in a folder that somebody is removing with all that is in it.
 bool EntryFollower::IsBeingRemoved(const std::string& share_name) {
   const bool is_gone = LogFilesOf(IndexPath(share_name) + "/" + ENTRIES_FORM.file).log == 0;
-  log_went = (log_went || database.IsOpen()) && is_gone;
-  return log_went;
+  const auto now = std::chrono::steady_clock::now();
+  if (!is_gone) {
+    log_went.reset();
+  } else if (database.IsOpen() && !log_went.has_value()) {
+    log_went = now;
+  }
+  return log_went.has_value() && now - *log_went < ContentsWriter::LONGEST_REMOVAL;
 }
 
 IndexError EntryFollower::EnsureOpen(const std::string& share_name) {

@@ -3,7 +3,9 @@
 // what file they stand for. Reads alone; results are SQLite's codes.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -45,15 +47,19 @@ class EntryFollower {
   // Of wanted entries with that identity, a few of them.
   int Paths(const FileIdentity& identity, std::vector<std::string>& paths);
 
+  // Whether somebody seems to be removing the index at this moment, for
+  // ContentsWriter::LONGEST_REMOVAL at most: EnsureOpen opens nothing meanwhile.
+  bool IsBeingRemoved(const std::string& share_name);
+
   int64_t made = 0;     // tells one entries database from another
   bool failed = false;  // whether the last operation did: the entries are to blame
 
  private:
   int End(Statement& statement, int code);
-  bool IsBeingRemoved(const std::string& share_name);
   IndexDatabase database;
   Statement next, of_inode, latest_of, paths_of;
-  bool log_went = false;  // from under the open database, and did not come back
+  // When the log went from under the open database, if it did not come back.
+  std::optional<std::chrono::steady_clock::time_point> log_went;
 };
 
 }  // namespace fileindexd

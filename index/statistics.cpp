@@ -7,6 +7,7 @@
 
 #include "index/alike_files.h"
 #include "index/statistics_scan.h"
+#include "index/suspicion.h"
 
 namespace fileindexd {
 
@@ -73,6 +74,7 @@ void Gather(const StatisticsWish& wish, Statistics& statistics) {
     StatisticsScan scan(wish, open);
     const int code = needs_entries ? scan.Run() : SQLITE_OK;
     if (code != SQLITE_OK) {
+      TellWriter(share.name, FromSqlite(code));
       made.failures.push_back("share " + share.name + ": " + IndexErrorText(FromSqlite(code)));
       shares.pop_back();
       continue;

@@ -39,9 +39,13 @@ void ShareContents::Open(Time now) {
 
   const IndexError opened = writer.Open(share, EXTRACTOR_VERSION);
   if (opened == IndexError::PATH_NOT_FOUND) {
-    is_missing = true;  // until the daemon has made them
-    has_news = false;
     look_at_all = true;
+    has_news = writer.AreEntriesBeingRemoved();
+    if (has_news) {
+      rest_until = now + ContentsWriter::LONGEST_REMOVAL;
+    } else {
+      is_missing = true;  // until the daemon has made them
+    }
     return;
   }
   if (opened != IndexError::NONE) {

@@ -38,6 +38,7 @@ struct ScriptedContents {
   std::map<int64_t, ScriptedFile> now;
   std::vector<std::string> calls;
   std::map<std::string, IndexError> failing;  // by the call's name: it fails so, until removed
+  bool entries_go = false;                    // where Open does not find them
   size_t pending_bytes = 0;
   int unmerged = 0;              // so many times Merge says that there is more
   size_t most_again = SIZE_MAX;  // NextAgain gives no more at once, and does not say that there are

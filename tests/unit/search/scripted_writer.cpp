@@ -15,6 +15,7 @@ struct ContentsWriter::Impl {
   ScriptedContents* contents = nullptr;  // null: closed
   int64_t extractor = 0;
   bool changed = false;
+  bool entries_go = false;
   std::set<int64_t> out;  // given out and not ended
   IndexError error = IndexError::NONE;
 
@@ -90,6 +91,7 @@ ContentsWriter::~ContentsWriter() = default;
 IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
   impl->contents = &Scripted(share.name);
   if (!impl->Call("Open")) {
+    impl->entries_go = impl->contents->entries_go;
     impl->contents = nullptr;
     return impl->error;
   }
@@ -112,6 +114,10 @@ void ContentsWriter::Close() {
 
 bool ContentsWriter::IsOpen() const {
   return impl->contents != nullptr;
+}
+
+bool ContentsWriter::AreEntriesBeingRemoved() const {
+  return impl->entries_go;
 }
 
 void ContentsWriter::UseSettings(std::shared_ptr<const Settings> /*in_force*/) {}

@@ -32,6 +32,19 @@ TEST_F(ShareContentsTest, WithoutEntriesItWaitsForThem) {
   EXPECT_EQ(GiveOut().size(), 1U);
 }
 
+// Their log alone may have gone, and nobody may write to them for long.
+TEST_F(ShareContentsTest, EntriesThatSeemToGoAreLookedForOnceMore) {
+  AddFile(1);
+  Scripted().failing["Open"] = IndexError::PATH_NOT_FOUND;
+  Scripted().entries_go = true;
+  Settle();
+  EXPECT_EQ(Count("Open"), 1U);
+
+  Scripted().failing.clear();
+  Pass(ContentsWriter::LONGEST_REMOVAL);
+  EXPECT_EQ(GiveOut().size(), 1U);
+}
+
 TEST_F(ShareContentsTest, AMissingRootIsNotTakenForMissingFiles) {
   AddFile(1);
   Settle();
