@@ -61,7 +61,7 @@ IndexError CheckSuspected(sqlite3* db, const std::string& index_path) {
     return IndexError::NONE;
   }
   bool ok = false;
-  int code = QuickCheck(db, ok);
+  int code = FullCheck(db, ok);
   if (code == SQLITE_OK && !ok) {
     return IndexError::DAMAGED;
   }

@@ -12,6 +12,20 @@ const char* BytesOf(std::string_view bytes) {
   return bytes.empty() ? "" : bytes.data();
 }
 
+int Check(sqlite3* db, const char* pragma, bool& ok) {
+  Statement check;
+  int result = check.Prepare(db, pragma);
+  if (result != SQLITE_OK) {
+    return result;
+  }
+  result = check.Step();
+  if (result != SQLITE_ROW) {
+    return result == SQLITE_DONE ? SQLITE_CORRUPT : result;
+  }
+  ok = check.Bytes(0) == "ok";
+  return SQLITE_OK;
+}
+
 }  // namespace
 
 int Execute(sqlite3* db, const char* sql) {
@@ -70,17 +84,11 @@ LogFiles LogFilesOf(const std::string& database) {
 }
 
 int QuickCheck(sqlite3* db, bool& ok) {
-  Statement check;
-  int result = check.Prepare(db, "PRAGMA quick_check(1)");
-  if (result != SQLITE_OK) {
-    return result;
-  }
-  result = check.Step();
-  if (result != SQLITE_ROW) {
-    return result == SQLITE_DONE ? SQLITE_CORRUPT : result;
-  }
-  ok = check.Bytes(0) == "ok";
-  return SQLITE_OK;
+  return Check(db, "PRAGMA quick_check(1)", ok);
+}
+
+int FullCheck(sqlite3* db, bool& ok) {
+  return Check(db, "PRAGMA integrity_check(1)", ok);
 }
 
 int SchemaVersion(sqlite3* db, int64_t& version) {

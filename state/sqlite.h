@@ -91,8 +91,10 @@ class Statement {
   sqlite3_stmt* handle = nullptr;
 };
 
-// Whether the database is sound. SQLITE_OK and `ok`, or SQLite's reason.
+// Whether the database is sound: its pages, or with its indexes, which takes many times as long.
+// SQLITE_OK and `ok`, or SQLite's reason.
 int QuickCheck(sqlite3* db, bool& ok);
+int FullCheck(sqlite3* db, bool& ok);
 
 // The number that a program of ours left in the database; 0 where none did.
 int SchemaVersion(sqlite3* db, int64_t& version);

@@ -4,6 +4,7 @@
 import glob
 import os
 import re
+import shutil
 import sqlite3
 
 from harness import IndexTest, main, namespace
@@ -58,7 +59,8 @@ def drop_column():
 def copy_log_back():
     """So that the main file alone holds the index."""
     with sqlite3.connect(FILE) as db:
-        db.execute("PRAGMA wal_checkpoint(TRUNCATE)")
+        while db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] != 0:
+            pass  # a reader was in the way
     db.close()
 
 
@@ -303,6 +305,26 @@ class DamagedIndexTest(IndexTest):
 
     def test_rows_that_only_statistics_read_are_told_of_and_made_anew(self):
         self.damaged_and_only_asked(lambda: scribble_leaf("entries"), ("stats",))
+
+    def test_an_older_file_below_its_log_is_told_of_by_whoever_reads_it(self):
+        pid = self.make_index()
+        shutil.copyfile(FILE, f"{namespace.RUN}/older.db")
+        self.make_files(self.root, *(f"later/{i}.txt" for i in range(200)))
+        self.ctl("reindex", self.root)
+        self.await_drained("alpha")
+        copy_log_back()
+        self.touch()
+        self.stop(pid)
+        shutil.copyfile(f"{namespace.RUN}/older.db", FILE)
+        found = contents(FOLDER)
+        after = self.log.mark()
+
+        self.start()
+        self.ask()
+        self.settle(after)
+        self.touch()
+
+        self.check(after, KEPT, None, found)
 
     def test_words_that_only_a_search_reads_are_told_of_and_made_anew(self):
         self.damaged_and_only_asked(lambda: scribble_leaf("names_data"), ("search", "txt"))
