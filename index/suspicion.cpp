@@ -34,8 +34,8 @@ int CheckWords(sqlite3* db) {
   int code = names.Prepare(db, "SELECT name FROM sqlite_schema WHERE sql LIKE '%USING fts5(%'");
   code = code == SQLITE_OK ? names.ReadAll([&] { tables.push_back(names.Bytes(0)); }) : code;
   for (const std::string& table : tables) {
-    const std::string check =
-        "INSERT INTO \"" + table + "\"(\"" + table + "\") VALUES('integrity-check')";
+    std::string check = "INSERT INTO ";
+    check.append(table).append("(").append(table).append(") VALUES('integrity-check')");
     code = code == SQLITE_OK ? Execute(db, check.c_str()) : code;
   }
   return code;

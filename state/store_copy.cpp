@@ -43,7 +43,8 @@ bool ReadAll(const std::string& path, std::string& bytes) {
   }
 }
 
-// One on a bad sector gives the same answer for ever, and is as good as none: nothing is read of it.
+// One on a bad sector gives the same answer for ever, and is as good as none: nothing is read of
+// it.
 bool ReadCopy(const std::string& path, std::string& bytes) {
   constexpr int TRIES = 2;
   for (int tries = 0; tries < TRIES; ++tries) {
@@ -219,9 +220,8 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
   const std::string copy = path + ".copy";
   const int result = ReadAll(copy, image) ? LookInto(image, sound, ignored) : SQLITE_OK;
   if (result != SQLITE_OK || !sound) {
-    error += result == SQLITE_OK
-                 ? "; and there is no sound copy of it"
-                 : "; and " + copy + " cannot be read: " + sqlite3_errstr(result);
+    error += result == SQLITE_OK ? "; and there is no sound copy of it"
+                                 : "; and " + copy + " cannot be read: " + sqlite3_errstr(result);
     return false;
   }
   std::string reason;

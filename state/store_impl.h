@@ -26,8 +26,9 @@ struct StateStore::Impl {
   bool FailSql();
 
   bool Open();
-  // Opens anew where another program set the file aside or its log or shared memory is gone (changes
-  // would be lost), and where the connection is of no use any more, or was for reading only.
+  // Opens anew where another program set the file aside or its log or shared memory is gone
+  // (changes would be lost), and where the connection is of no use any more, or was for reading
+  // only.
   bool Ready();
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();

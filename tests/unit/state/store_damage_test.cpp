@@ -307,8 +307,7 @@ TEST_F(StoreDamageTest, AnOpeningLeavesACopyWhereOneLacks) {
   const std::string older = ReadFile(copy);
   ASSERT_TRUE(OpenStore()->SetPause(5));
   const std::vector<std::function<void()>> lacks = {
-      [&] { std::filesystem::remove(copy); },
-      [&] { WriteFile(copy, older); },
+      [&] { std::filesystem::remove(copy); }, [&] { WriteFile(copy, older); },
       [&] { WriteFile(copy, std::string(10'000, 'x')); },
       [&] {
         std::filesystem::remove(copy);
