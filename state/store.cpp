@@ -130,11 +130,12 @@ bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is
 // The change itself is safe, but where the copy takes this file's place: another program has put it
 // there, or this one does because what it has just read is damaged.
 bool StateStore::Impl::LeaveCopy(bool& is_lost) {
+  const std::string path = connection->path;
+  const ino_t written =
+      InodeOf(path);  // where it was replaced before that, there is no copy to leave
   std::string reason;
   const CopyLeft left = LeaveStateCopy(*connection, reason);
   if (left == CopyLeft::DAMAGED) {
-    const std::string path = connection->path;
-    const ino_t written = InodeOf(path);
     TidyOnClose(*connection, false);
     if (!Open()) {
       return false;
@@ -143,7 +144,7 @@ bool StateStore::Impl::LeaveCopy(bool& is_lost) {
   } else if (left == CopyLeft::FAILED) {
     is_lost = IsSetAside(*connection);
   }
-  if (left == CopyLeft::GOOD || is_lost) {
+  if (left != CopyLeft::FAILED || is_lost) {
     copy_failure.clear();
   } else if (std::exchange(copy_failure, reason) != reason) {
     syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, reason.c_str());

@@ -191,7 +191,7 @@ bool SetStateAside(const std::string& path, std::string& error) {
 
 CopyAge Compare(const Holding& copy, const Holding& database) {
   if (copy.version > STATE_VERSION) {
-    return CopyAge::LEVEL;  // of a newer program, which may want it: it could not be used here
+    return CopyAge::LEVEL;  // of a newer program: it could not be used here
   }
   if (copy.changes > database.changes) {
     return CopyAge::AHEAD;

@@ -187,6 +187,13 @@ Opened OpenTwice(std::unique_ptr<StateConnection>& connection, bool has_copy, co
 
 }  // namespace
 
+StateConnection::~StateConnection() {
+  if (db != nullptr && HasStateMoved(*this)) {
+    TidyOnClose(*this, false);
+  }
+  sqlite3_close_v2(db);
+}
+
 void TidyOnClose(const StateConnection& connection, bool tidy) {
   int keep_log = tidy ? 0 : 1;
   sqlite3_db_config(connection.db, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, keep_log, nullptr);

@@ -25,13 +25,14 @@ constexpr int STATE_VERSION = 4;  // of the schema
 constexpr const char* COUNT_CHANGE =
     "INSERT INTO number VALUES('changes', 1) ON CONFLICT DO UPDATE SET value = value + 1";
 
-// Owns a connection.
+// Owns a connection. Where the database was set aside, or its log or shared memory removed, closing
+// leaves it as it stands: what others have committed since is not known here.
 class StateConnection {
  public:
   StateConnection() = default;
   StateConnection(const StateConnection&) = delete;
   StateConnection& operator=(const StateConnection&) = delete;
-  ~StateConnection() { sqlite3_close_v2(db); }
+  ~StateConnection();
 
   sqlite3* db = nullptr;
   std::string path;

@@ -233,7 +233,8 @@ class StateTest(StateDamageTest):
 
     def test_copy_that_is_damaged_is_made_anew_by_the_next_change(self):
         self.prepare()
-        for damage in (lambda: scribble(COPY), lambda: remove(COPY), lambda: replace(COPY, os.mkfifo)):
+        pipe = lambda: replace(COPY, os.mkfifo)
+        for damage in (lambda: scribble(COPY), lambda: remove(COPY), pipe):
             damage()
             self.ctl("pause")
             self.ctl("resume")

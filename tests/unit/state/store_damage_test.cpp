@@ -345,18 +345,23 @@ TEST_F(StoreDamageTest, AnOpenStoreLosesNothingWithItsSharedMemory) {
   const auto store = OpenStore();
   ASSERT_TRUE(store->SetPause(5));
   std::filesystem::remove(database + "-shm");
-  const auto other = OpenStore();
+  auto other = OpenStore();
   ASSERT_TRUE(other->AddFolder("/v/a/b", {})) << other->Error();
+  other.reset();
+  ASSERT_GT(std::filesystem::file_size(database + "-wal"), 0U);
+  std::filesystem::remove(copy);  // nothing comes out of it
 
   std::shared_ptr<const Settings> settings;
   ASSERT_TRUE(store->GetSettings(settings)) << store->Error();
   EXPECT_EQ(settings->folders.size(), 2U);
   ASSERT_TRUE(store->SetPause(6)) << store->Error();
+  other = OpenStore();
   ASSERT_TRUE(other->GetSettings(settings)) << other->Error();
   EXPECT_EQ(settings->folders.size(), 2U);
   int64_t resume_time = 0;
   ASSERT_TRUE(other->GetPause(resume_time)) << other->Error();
   EXPECT_EQ(resume_time, 6);
+  EXPECT_FALSE(Exists(database + ".damaged"));
 }
 
 TEST_F(StoreDamageTest, TheFirstStoreNoticesThatItsLogWent) {
@@ -368,6 +373,7 @@ TEST_F(StoreDamageTest, TheFirstStoreNoticesThatItsLogWent) {
   ASSERT_TRUE(OpenStore()->AddFolder("/v/a", {}));
 
   ExpectAllThere(*store);
+  EXPECT_FALSE(Exists(database + ".damaged"));
 }
 
 // In a page that the change does not touch, so that only the copy that is to be left tells.
