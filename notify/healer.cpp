@@ -39,8 +39,7 @@ using Clock = std::chrono::steady_clock;
 
 constexpr milliseconds PAUSE_LOOK(1000);  // between two looks at the stored pause
 constexpr milliseconds END_PATIENCE(500);
-// With what writes, which may be stopped, before the share is compared all the same, and once more
-// later.
+// With what writes, which may be stopped, before the share is compared all the same.
 constexpr milliseconds WRITER_PATIENCE(10000);
 
 // Percent. A comparison raises the pressure itself, above all on a disk that has to seek; one at
@@ -149,8 +148,7 @@ Healing Shared::Compare(Urgency urgency, const std::string& share) {
     return failed;
   }
 
-  ShareComparison comparison(*store, share,
-                             urgency == Urgency::IDLE ? milliseconds::max() : WRITER_PATIENCE);
+  ShareComparison comparison(*store, share, WRITER_PATIENCE);
   while (AwaitTurn(urgency, *store)) {
     const Clock::time_point began = Clock::now();
     if (!comparison.GoOn()) {

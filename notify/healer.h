@@ -15,10 +15,8 @@
 namespace fileindexd {
 
 enum class Urgency {
-  NOW,  // the index may differ
-  // It should not: at idle priority, only while nothing urgent waits, and once what is being
-  // written has ended, however long that takes.
-  IDLE,
+  NOW,    // the index may differ
+  IDLE,   // it should not: at idle priority, and only while nothing urgent waits
   APART,  // as NOW, of a file system that may hang: it keeps none of the others waiting
 };
 
@@ -27,7 +25,7 @@ struct Healing {
   std::string share;
   bool done = false;  // false: `error` says why it could not be made
   std::string error;
-  bool early = false;  // it began while something was being written, which it may have missed
+  bool early = false;  // it did not await the end of what was being written, and may have missed it
   Comparison counts;
   std::vector<QueueLine> lines;         // that mend what was found, sorted
   int64_t began = 0;                    // seconds since the epoch

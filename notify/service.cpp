@@ -179,15 +179,15 @@ void Service::TakeHealings() {
     }
     FedShare& share = *known->second;
     share.rest_until = Clock::now() + std::min(healing.worked, LONGEST_REST);
-    if (healing.early) {
-      healer.Request(healing.share, Urgency::IDLE);
-    }
     const bool is_last = !healer.IsPending(healing.share) && !share.compare_at.has_value();
+    const bool is_sure = healing.done && !healing.early;
     const std::string& name = known->first;
     if (healing.done) {
       LogDebug("share %s: %llu differences", name.c_str(),
                static_cast<unsigned long long>(healing.counts.differences));
       share.feed.AddLines(*settings, healing.lines);
+    }
+    if (is_sure) {
       const bool is_watched = watches.shares.at(name).by != WatchedBy::COMPARISON;
       if (is_last) {
         share.differs = false;
