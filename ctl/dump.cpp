@@ -59,7 +59,7 @@ int Dump(const Arguments& arguments) {
     return written;
   });
   if (!read && written) {
-    TellWriter(share->name, FromSqlite(sqlite3_errcode(reader.database.db)));
+    TellWriter(share->name, reader.read_error);
     return Fail(EXIT_FAILED, "%s: the index cannot be read", share->name.c_str());
   }
   if (kinds.error != IndexError::NONE && kinds.error != IndexError::PATH_NOT_FOUND) {

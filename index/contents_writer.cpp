@@ -330,7 +330,7 @@ bool ContentsWriter::Merge(bool& more) {
 }
 
 bool ContentsWriter::AreEntriesBeingRemoved() const {
-  return impl->entries.IsBeingRemoved(impl->share.name);
+  return impl->entries.is_going;
 }
 
 bool ContentsWriter::HasChanges() const {

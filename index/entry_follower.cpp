@@ -58,10 +58,12 @@ bool EntryFollower::IsBeingRemoved(const std::string& share_name) {
 
 IndexError EntryFollower::EnsureOpen(const std::string& share_name) {
   failed = false;
+  is_going = false;
   if (database.IsOpen() && !database.HasMoved()) {
     return IndexError::NONE;
   }
   if (IsBeingRemoved(share_name)) {
+    is_going = true;
     Close();
     return IndexError::PATH_NOT_FOUND;
   }
@@ -90,6 +92,7 @@ IndexError EntryFollower::EnsureOpen(const std::string& share_name) {
     Close();
     return code == SQLITE_DONE ? IndexError::DAMAGED : FromSqlite(code);
   }
+  log_went.reset();
   return IndexError::NONE;
 }
 

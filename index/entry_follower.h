@@ -47,15 +47,15 @@ class EntryFollower {
   // Of wanted entries with that identity, a few of them.
   int Paths(const FileIdentity& identity, std::vector<std::string>& paths);
 
-  // Whether somebody seems to be removing the index at this moment, for
-  // ContentsWriter::LONGEST_REMOVAL at most: EnsureOpen opens nothing meanwhile.
-  bool IsBeingRemoved(const std::string& share_name);
-
   int64_t made = 0;     // tells one entries database from another
   bool failed = false;  // whether the last operation did: the entries are to blame
+  // The last EnsureOpen opened nothing, because somebody seems to be removing the index: for
+  // ContentsWriter::LONGEST_REMOVAL at most.
+  bool is_going = false;
 
  private:
   int End(Statement& statement, int code);
+  bool IsBeingRemoved(const std::string& share_name);
   IndexDatabase database;
   Statement next, of_inode, latest_of, paths_of;
   // When the log went from under the open database, if it did not come back.

@@ -98,6 +98,7 @@ bool EntryReader::ForEach(const std::string& under,
       below.Prepare(database.db,
                     "SELECT " FILEINDEX_ENTRY_COLUMNS
                     " FROM entries WHERE path > ?2 AND path < ?3 ORDER BY path") != SQLITE_OK) {
+    read_error = FromSqlite(sqlite3_errcode(database.db));
     return false;
   }
 
@@ -106,6 +107,7 @@ bool EntryReader::ForEach(const std::string& under,
   range.Bind(below);
   bool going = true;
   const bool read = VisitAll(at, visit, going) && VisitAll(below, visit, going);
+  read_error = FromSqlite(read ? SQLITE_OK : sqlite3_errcode(database.db));
   at.Reset();
   below.Reset();
   return read;

@@ -37,6 +37,7 @@ class EntryReader {
   // Calls `visit` with each entry at or below normal path `under` in byte order of the paths, until
   // it returns false. False when reading failed.
   bool ForEach(const std::string& under, const std::function<bool(const Entry&)>& visit);
+  IndexError read_error = IndexError::NONE;  // of the last ForEach
 
   // The entry at exactly that path, if there is one. NONE, or why that cannot be told.
   IndexError Find(const std::string& path, std::optional<Entry>& entry);

@@ -2,8 +2,11 @@
 #include "index/suspicion.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
+#include <cstdlib>
+#include <ctime>
 #include <exception>
 #include <vector>
 
@@ -16,15 +19,22 @@ namespace fileindexd {
 
 namespace {
 
+constexpr time_t WAKE_INTERVAL = 60;  // seconds, while a note lies there
+
 std::string NotePath(const std::string& index_path) {
   return index_path + "/suspected";
 }
 
-// False where it is there already.
+// False where it is there already, and whoever left it woke the Worker not long ago.
 bool LeaveNote(const std::string& index_path) {
-  constexpr int FLAGS = O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW;
-  const ScopedFd note(open(NotePath(index_path).c_str(), FLAGS, 0600));
-  return note.fd >= 0;
+  constexpr int FLAGS = O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
+  const std::string path = NotePath(index_path);
+  struct stat left {};
+  if (lstat(path.c_str(), &left) == 0 && std::abs(time(nullptr) - left.st_mtime) < WAKE_INTERVAL) {
+    return false;
+  }
+  const ScopedFd note(open(path.c_str(), FLAGS, 0600));
+  return note.fd >= 0 && futimens(note.fd, nullptr) == 0;
 }
 
 // The words' tables can be damaged in pages that are sound.
@@ -45,9 +55,12 @@ int CheckWords(sqlite3* db) {
 
 void TellWriter(const std::string& share_name, IndexError error) {
   try {
-    const bool wakes =
-        error == IndexError::DAMAGED ? LeaveNote(IndexPath(share_name)) : error == IndexError::IO;
-    std::string ignored;  // whoever reads next tells again
+    const std::string path = IndexPath(share_name);
+    if (access(path.c_str(), F_OK) != 0) {
+      return;  // the share was removed: nothing of it is made anew
+    }
+    const bool wakes = error == IndexError::DAMAGED ? LeaveNote(path) : error == IndexError::IO;
+    std::string ignored;  // whoever reads later tells again
     if (wakes) {
       (void)AppendToQueue(share_name, {}, ignored);
     }
@@ -60,8 +73,12 @@ IndexError CheckSuspected(sqlite3* db, const std::string& index_path) {
   if (access(note.c_str(), F_OK) != 0) {
     return IndexError::NONE;
   }
+  // A page that cannot be read for a moment looks like damage: twice, then.
   bool ok = false;
-  int code = FullCheck(db, ok);
+  int code = SQLITE_OK;
+  for (int looks = 0; looks < 2 && code == SQLITE_OK && !ok; ++looks) {
+    code = FullCheck(db, ok);
+  }
   if (code == SQLITE_OK && !ok) {
     return IndexError::DAMAGED;
   }
@@ -69,7 +86,7 @@ IndexError CheckSuspected(sqlite3* db, const std::string& index_path) {
   if (code == SQLITE_OK) {
     (void)unlink(note.c_str());
   }
-  return FromSqlite(code);
+  return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }
 
 }  // namespace fileindexd

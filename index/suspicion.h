@@ -14,7 +14,7 @@ namespace fileindexd {
 
 // Called with what a read of the share's entries ended with. Of damage it leaves a note. Then, and
 // where the disk failed, which may be a log that was taken away, it wakes the share's Worker, which
-// opens the database anew; of damage once, until that was done.
+// opens the database anew; of damage once a minute at most, until that was done.
 void TellWriter(const std::string& share_name, IndexError error);
 
 // Looks at the whole database if there is a note: NONE, DAMAGED, or what kept it from being read.

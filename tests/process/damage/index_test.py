@@ -278,8 +278,9 @@ class DamagedIndexTest(IndexTest):
 
         self.touch()
         # What the daemon does not look at is told by whoever reads it.
-        if self.try_ctl("verify", "alpha").code != 0:
-            self.await_line(TOLD, after)
+        asked = self.log.mark()
+        if self.try_ctl("dump", "alpha").code != 0:
+            self.await_line(TOLD, asked)
             self.touch()
 
         self.check(after, fate, None, found)
