@@ -102,10 +102,9 @@ bool Follower::Open() {
 
 // Watching again what is watched changes nothing. What is not there is told of by its folder.
 void Follower::Watch(const Settings& settings) {
-  const std::string root = StateRoot();
   (void)inotify_add_watch(changes.fd, PID_FOLDER, FOLDER);
-  (void)inotify_add_watch(changes.fd, root.c_str(), FOLDER);
-  (void)inotify_add_watch(changes.fd, (root + "/shares").c_str(), ENTRIES);
+  (void)inotify_add_watch(changes.fd, StateRoot().c_str(), FOLDER);
+  (void)inotify_add_watch(changes.fd, SharesFolder().c_str(), ENTRIES);
   for (const Share& share : settings.shares) {
     (void)inotify_add_watch(changes.fd, ShareFolder(share.name).c_str(), FOLDER);
     (void)inotify_add_watch(changes.fd, IndexPath(share.name).c_str(), FOLDER);

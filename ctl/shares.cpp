@@ -52,20 +52,16 @@ void RemoveAll(const std::string& path, std::error_code& error) {
   }
 }
 
-// No share's name begins with a dot.
-std::string RemovedFolder(const std::string& name) {
-  return ShareFolder("." + name + ".removed");
-}
+// Of a folder that is being removed. It begins with a dot, as no share's name does.
+constexpr const char* REMOVED = ".removed";
 
 // What removals of whatever share left that were cut short.
 void SweepRemoved() {
-  const std::string ending = ".removed";
   std::error_code error;
-  std::filesystem::directory_iterator folders(
-      std::filesystem::path(ShareFolder("name")).parent_path(), error);
+  std::filesystem::directory_iterator folders(SharesFolder(), error);
   for (; !error && folders != std::filesystem::directory_iterator(); folders.increment(error)) {
     const std::string name = folders->path().filename();
-    if (name.starts_with('.') && name.ends_with(ending)) {
+    if (name.starts_with('.') && name.ends_with(REMOVED)) {
       std::error_code ignored;  // the next one tries again
       RemoveAll(folders->path(), ignored);
     }
@@ -77,7 +73,7 @@ void SweepRemoved() {
 bool RemoveShareFolder(const std::string& name) {
   SweepRemoved();
   const std::string folder = ShareFolder(name);
-  const std::string removed = RemovedFolder(name);
+  const std::string removed = ShareFolder("." + name + REMOVED);
   std::error_code error;
   std::filesystem::rename(folder, removed, error);
   if (error == std::errc::no_such_file_or_directory) {

@@ -56,7 +56,7 @@ void Watches::Set(const Settings& settings) {
   refused = false;
   Add(PID_FOLDER, {Target::RUN, ""}, kept);
   Add(StateRoot(), {Target::ROOT, ""}, kept);
-  Add(StateRoot() + "/shares", {Target::SHARES, ""}, kept);
+  Add(SharesFolder(), {Target::SHARES, ""}, kept);
   for (const Share& share : settings.shares) {
     Add(ShareFolder(share.name), {Target::SHARE, share.name}, kept);
     Add(IndexPath(share.name), {Target::INDEX, share.name}, kept);

@@ -79,8 +79,12 @@ std::string StateDatabasePath() {
   return StateRoot() + "/state.db";
 }
 
+std::string SharesFolder() {
+  return StateRoot() + "/shares";
+}
+
 std::string ShareFolder(const std::string& share_name) {
-  return StateRoot() + "/shares/" + share_name;
+  return SharesFolder() + "/" + share_name;
 }
 
 std::string QueuePath(const std::string& share_name) {
@@ -115,7 +119,7 @@ bool MakeStateRoot(std::string& error) {
     return false;
   }
   const std::string root = StateRoot();
-  return MakeFolderAndParents(root, error) && MakeFolder(root + "/shares", error);
+  return MakeFolderAndParents(root, error) && MakeFolder(SharesFolder(), error);
 }
 
 bool MakeShareFolder(const std::string& share_name, std::string& error) {

@@ -25,6 +25,7 @@ constexpr const char* QUEUE_NAME = "TALO@file_index_queue";
 std::string StateRoot();
 
 std::string StateDatabasePath();
+std::string SharesFolder();
 std::string ShareFolder(const std::string& share_name);
 std::string QueuePath(const std::string& share_name);
 std::string DrainedPath(const std::string& share_name);
