@@ -353,7 +353,7 @@ IndexError IndexDatabase::Attach(const std::string& index_path, const char* name
 }
 
 void IndexDatabase::Remember(const char* name, const std::string& file) {
-  files.push_back({name, file, LogFilesOf(file).log});
+  files.push_back({name, file, LogInode(file)});
 }
 
 void IndexDatabase::Close() {
@@ -366,7 +366,7 @@ bool IndexDatabase::HasMoved() const {
     int moved = 0;
     const int code = sqlite3_file_control(db, opened.name.c_str(), SQLITE_FCNTL_HAS_MOVED, &moved);
     return (code == SQLITE_OK && moved != 0) ||
-           (opened.log != 0 && LogFilesOf(opened.file).log != opened.log);
+           (opened.log != 0 && LogInode(opened.file) != opened.log);
   });
 }
 

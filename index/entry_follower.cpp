@@ -46,7 +46,7 @@ int EntryFollower::End(Statement& statement, int code) {
 
 // Opening would make a log anew in a folder that somebody is removing with all that is in it.
 bool EntryFollower::IsBeingRemoved(const std::string& share_name) {
-  const bool is_gone = LogFilesOf(IndexPath(share_name) + "/" + ENTRIES_FORM.file).log == 0;
+  const bool is_gone = LogInode(IndexPath(share_name) + "/" + ENTRIES_FORM.file) == 0;
   const auto now = std::chrono::steady_clock::now();
   if (!is_gone) {
     log_went.reset();

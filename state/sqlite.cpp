@@ -80,7 +80,7 @@ ino_t InodeOf(const std::string& path) {
 }
 
 LogFiles LogFilesOf(const std::string& database) {
-  return {InodeOf(database + "-wal"), InodeOf(database + "-shm")};
+  return {LogInode(database), InodeOf(database + "-shm")};
 }
 
 int QuickCheck(sqlite3* db, bool& ok) {

@@ -33,6 +33,11 @@ bool IsFileOrNothing(const std::string& path);
 // The inode of what stands there, a link itself; 0: nothing.
 ino_t InodeOf(const std::string& path);
 
+// Of the log that stands beside a database.
+inline ino_t LogInode(const std::string& database) {
+  return InodeOf(database + "-wal");
+}
+
 // The inodes of the log that stands beside a database, and of the memory that its users share; 0:
 // none. While a connection is open nobody but SQLite's users removes them, and none of them does:
 // another number says that one went all the same.

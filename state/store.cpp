@@ -131,8 +131,7 @@ bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is
 // there, or this one does because what it has just read is damaged.
 bool StateStore::Impl::LeaveCopy(bool& is_lost) {
   const std::string path = connection->path;
-  const ino_t written =
-      InodeOf(path);  // where it was replaced before that, there is no copy to leave
+  const ino_t written = InodeOf(path);  // looked at first: what is found replaced leaves no copy
   std::string reason;
   const CopyLeft left = LeaveStateCopy(*connection, reason);
   if (left == CopyLeft::DAMAGED) {

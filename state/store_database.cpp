@@ -117,7 +117,7 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, CopyAge
     error = connection.path + " is damaged";
     return Opened::DAMAGED;
   }
-  result = has_copy ? CompareWithCopy(connection, age, error) : SQLITE_OK;
+  result = CompareWithCopy(connection, age, error);
   if (result != SQLITE_OK) {
     return FailedAtTables(result);
   }
@@ -168,12 +168,11 @@ bool AreFilesOrNothing(const std::string& path) {
 Opened OpenTwice(std::unique_ptr<StateConnection>& connection, bool has_copy, const ScopedFd& root,
                  std::string& error) {
   const std::string path = connection->path;
-  CopyAge age = CopyAge::BEHIND;
+  CopyAge age = CopyAge::LEVEL;
   Opened outcome = OpenFile(*connection, has_copy, age, error);
   if (outcome == Opened::DAMAGED) {
     connection = std::make_unique<StateConnection>();
     connection->path = path;
-    age = CopyAge::BEHIND;
     outcome = OpenFile(*connection, has_copy, age, error);
   }
   // Left by a program that was killed, or met a full disk. Where it still cannot be, the next
