@@ -125,11 +125,7 @@ Opened CheckAndUpgrade(const StateConnection& connection, bool has_copy, CopyAge
     error = connection.path + " has lost changes";
     return Opened::DAMAGED;
   }
-  if (version == STATE_VERSION) {
-    return Opened::GOOD;
-  }
-  age = CopyAge::BEHIND;
-  return Upgrade(connection, version, error);
+  return version < STATE_VERSION ? Upgrade(connection, version, error) : Opened::GOOD;
 }
 
 Opened OpenFile(StateConnection& connection, bool has_copy, CopyAge& age, std::string& error) {
