@@ -418,6 +418,13 @@ TEST_F(StoreDamageTest, TheFirstStoreNoticesThatItsLogWent) {
   EXPECT_FALSE(Exists(database + ".damaged"));
 }
 
+TEST_F(StoreDamageTest, TheFirstStoreEndsWithoutLeavingALog) {
+  std::filesystem::remove_all(state_root);
+  ASSERT_TRUE(OpenStore()->AddShare({"a", "/v/a", ""}));
+
+  EXPECT_FALSE(Exists(database + "-wal"));
+}
+
 // In a page that the change does not touch, so that only the copy that is to be left tells.
 TEST_F(StoreDamageTest, AChangeToAnOpenDatabaseThatIsDamagedIsMadeAgainInTheCopy) {
   const auto store = OpenStore();
