@@ -60,4 +60,8 @@ void BestHits::Cut() {
   are_full = hits.size() == wanted;
 }
 
+bool BestHits::AreYounger(int64_t mtime) const {
+  return are_full && wanted > 0 && mtime < hits[wanted - 1].entry.mtime;
+}
+
 }  // namespace fileindexd

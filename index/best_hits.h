@@ -23,6 +23,8 @@ class BestHits {
 
   void Add(Hit&& hit);
   void Cut();  // to those that are wanted, in order
+  // Where age alone decides: whether as many as are wanted are younger than that.
+  bool AreYounger(int64_t mtime) const;
 
   std::vector<Hit> hits;
   HitOrder order;

@@ -55,7 +55,7 @@ void ReadEntry(const Statement& statement, Entry& entry) {
   entry.content_wanted = statement.Int(4) == 1;
   entry.inode = static_cast<uint64_t>(statement.Int(5));
   entry.size = statement.Int(6);
-  entry.mtime = statement.Int(7);
+  entry.mtime = statement.Int(ENTRY_COLUMN_MTIME);
   entry.ctime = statement.Int(8);
   entry.birth_time = statement.Int(9);
   entry.first_seen = statement.Int(10);

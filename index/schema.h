@@ -52,6 +52,7 @@ extern const char* const ENTRIES_SCHEMA;
   "entries.first_seen, entries.owner, entries.grp, entries.mode, entries.written, " \
   "entries.reread"
 
+constexpr int ENTRY_COLUMN_MTIME = 7;
 constexpr int ENTRY_COLUMN_COUNT = 16;
 
 // What the indexes by size and by time hold: a statement that is to use one has to say the same.

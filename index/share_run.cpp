@@ -54,10 +54,9 @@ int ShareRun::Run(BestHits& best, uint64_t& total) {
 
   bool is_enough = false;
   const bool all_alike = IsScored() && !HasPositiveLeaf(asked);
-  const std::string ordered = OrderedSql(all_alike ? SortBy::MODIFIED : question.sort);
-  if (!question.count_all && !question.reverse && !ordered.empty() && wanted > 0 &&
+  if (!question.count_all && !question.reverse && wanted > 0 &&
       (upper.everything || upper.Count() > FEW)) {
-    code = WalkInOrder(ordered, best, is_enough);
+    code = WalkInOrder(all_alike ? SortBy::MODIFIED : question.sort, best, is_enough);
   }
   if (code == SQLITE_OK && !is_enough) {
     answered = 0;
@@ -218,8 +217,13 @@ int ShareRun::WalkRows(BestHits& best) {
 }
 
 // From the top, until there is enough and what comes next stands lower. Rows of one key come in no
-// order.
-int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough) {
+// order: of a week that many thousands were written in, most are older than enough others, and are
+// not even read.
+int ShareRun::WalkInOrder(SortBy order, BestHits& best, bool& is_enough) {
+  const std::string sql = OrderedSql(order);
+  if (sql.empty()) {
+    return SQLITE_OK;
+  }
   Statement* read = nullptr;
   int code = rows.statements.Find(sql, read);
   if (code != SQLITE_OK) {
@@ -237,6 +241,9 @@ int ShareRun::WalkInOrder(const std::string& sql, BestHits& best, bool& is_enoug
     }
     last_key = key;
     ++walked;
+    if (order == SortBy::MODIFIED && found.AreYounger(read->Int(ENTRY_COLUMN_MTIME))) {
+      continue;
+    }
     Candidate candidate;
     ReadEntry(*read, candidate.entry);
     bool answers = false;

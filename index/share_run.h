@@ -60,7 +60,7 @@ class ShareRun {
   int WalkTexts(BestHits& best);
   int CountTexts(const PromiseOrder& order);
   int WalkRows(BestHits& best);
-  int WalkInOrder(const std::string& sql, BestHits& best, bool& is_enough);
+  int WalkInOrder(SortBy order, BestHits& best, bool& is_enough);
   std::string BeginningsQuery() const;
   int RankByLength(const std::string& query, std::vector<int64_t>& ids, IdSet& rest);
   int NamesByRank(size_t block_size, std::vector<int64_t>& ids, IdSet& rest);
