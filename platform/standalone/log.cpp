@@ -19,9 +19,9 @@ int InitialLogLevel() {
   return level != nullptr && std::string_view(level) == "debug" ? LOG_LEVEL_DEBUG : LOG_LEVEL_ERROR;
 }
 
-// What is longer goes to nobody: the system log takes a line as one datagram, which by default may
-// have some 200 KiB. Other people's limits are lower.
-constexpr size_t LONGEST_LINE = size_t{32} << 10;
+// What is much longer goes to nobody: the system log takes a line as one datagram, which by default
+// may have some 160 KiB, or 200 on a host of 64 bits.
+constexpr size_t LONGEST_LINE = size_t{128} << 10;
 constexpr std::string_view CUT_MARK = " [cut]";
 constexpr size_t LONGEST_CHARACTER = 4;  // bytes
 

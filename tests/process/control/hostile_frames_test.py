@@ -8,7 +8,7 @@ from harness import MachineTest, control, main
 
 BOUND = 64 << 20  # bytes of a body that are taken
 DEEP = 100_000
-LOGGED = 32 << 10  # bytes of a line
+LOGGED = 128 << 10  # bytes of a line
 CUT = " [cut]"
 
 MALFORMED = [
