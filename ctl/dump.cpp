@@ -44,6 +44,7 @@ int Dump(const Arguments& arguments) {
     return EXIT_DONE;
   }
   if (opened != IndexError::NONE) {
+    TellWriter(share->name, opened);
     return Fail(EXIT_FAILED, "%s: index: %s", share->name.c_str(), IndexErrorText(opened));
   }
 
@@ -63,6 +64,7 @@ int Dump(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s: the index cannot be read", share->name.c_str());
   }
   if (kinds.error != IndexError::NONE && kinds.error != IndexError::PATH_NOT_FOUND) {
+    TellContentsWriter(share->name, kinds.error);
     return Fail(EXIT_FAILED, "share %s: contents: %s", share->name.c_str(),
                 IndexErrorText(kinds.error));
   }

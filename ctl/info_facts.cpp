@@ -14,6 +14,7 @@
 #include "index/compare.h"
 #include "index/entry_table.h"
 #include "index/reader.h"
+#include "index/suspicion.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
 
@@ -117,6 +118,7 @@ void AskIndex(const Settings& settings, PathFacts& facts) {
     return;
   }
   if (opened != IndexError::NONE) {
+    TellWriter(facts.share->name, opened);
     facts.index_read = false;
     facts.index_problem = std::string("the index cannot be read: ") + IndexErrorText(opened);
     return;

@@ -10,6 +10,7 @@
 #include "ctl/root_problem.h"
 #include "ctl/status_report.h"
 #include "ctl/watches.h"
+#include "index/suspicion.h"
 #include "state/layout.h"
 #include "state/left_out.h"
 #include "state/pause.h"
@@ -33,6 +34,7 @@ void ReadIndex(ShareReport& report) {
     return;
   }
   if (opened != IndexError::NONE) {
+    TellWriter(report.share.name, opened);
     report.index_problem = IndexErrorText(opened);
     return;
   }

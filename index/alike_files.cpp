@@ -7,6 +7,7 @@
 
 #include "index/entry_table.h"
 #include "index/schema.h"
+#include "index/suspicion.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -223,6 +224,7 @@ void FindAlikeFiles(std::deque<OpenShare>& shares, Duplicates& duplicates,
   // Only now: a path may be asked for when its stream has come to its end.
   for (const SampleStream& stream : streams) {
     if (stream.HasFailed()) {
+      TellContentsWriter(stream.share.share.name, FromSqlite(stream.code));
       failures.push_back("share " + stream.share.share.name +
                          ": contents: " + IndexErrorText(FromSqlite(stream.code)));
     }

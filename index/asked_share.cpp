@@ -143,6 +143,7 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
         error == IndexError::NONE ? RunOnce(question, asked, order, wanted) : SQLITE_OK;
     if (error == IndexError::NONE && code == SQLITE_OK) {
       of_contents = with_contents ? contents_error : of_contents;
+      TellContentsWriter(name, of_contents);
       if (of_contents != IndexError::NONE && of_contents != IndexError::PATH_NOT_FOUND) {
         Fail(std::string("contents: ") + IndexErrorText(of_contents));
       }
@@ -185,7 +186,7 @@ void AskedShare::Complete(std::vector<Hit>& shown, CutterPool& cutters) {
     std::unique_ptr<TextCutter> cutter = cutters.Lend(language);
     for (Hit& hit : shown) {
       if (hit.share == name) {
-        (void)run->Complete(hit, *cutter);
+        TellContentsWriter(name, FromSqlite(run->Complete(hit, *cutter)));
       }
     }
     cutters.TakeBack(language, std::move(cutter));

@@ -10,6 +10,7 @@
 #include "index/contents_schema.h"
 #include "index/entry_table.h"
 #include "index/schema.h"
+#include "index/suspicion.h"
 #include "index/text_tokenizer.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
@@ -94,8 +95,20 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
 }
 
 IndexError ContentsReader::Open(const std::string& share_name) {
-  const IndexError error = entries.OpenForReading(IndexPath(share_name));
-  return error == IndexError::NONE ? AttachContents(entries, share_name) : error;
+  share = share_name;
+  IndexError error = entries.OpenForReading(IndexPath(share_name));
+  if (error != IndexError::NONE) {
+    TellWriter(share, error);
+    return error;
+  }
+  error = AttachContents(entries, share_name);
+  TellContentsWriter(share, error);
+  return error;
+}
+
+IndexError ContentsReader::Failed(int code) {
+  TellContentsWriter(share, FromSqlite(code));
+  return FromSqlite(code);
 }
 
 bool ContentsReader::Count(ContentCounts& counts) {
@@ -189,7 +202,7 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
       return true;
     }
   }
-  return code == SQLITE_DONE;
+  return code == SQLITE_DONE || Failed(code) == IndexError::NONE;
 }
 
 IndexError ContentsReader::Find(const Entry& entry, StoredContent& stored) {
@@ -212,7 +225,7 @@ IndexError ContentsReader::Find(const Entry& entry, StoredContent& stored) {
     const std::string language = LanguageName(row.Bytes(9));
     found.language = language.empty() ? NO_LANGUAGE : language;
   } else if (code != SQLITE_DONE) {
-    return FromSqlite(code);
+    return Failed(code);
   }
   stored = std::move(found);
   return IndexError::NONE;

@@ -70,6 +70,11 @@ class ContentsReader {
   IndexError Find(const Entry& entry, StoredContent& stored);
 
   IndexDatabase entries;  // with the contents attached as "contents"
+
+ private:
+  IndexError Failed(int code);
+
+  std::string share;
 };
 
 }  // namespace fileindexd

@@ -43,9 +43,18 @@ bool ContentsWriter::Impl::Ready() {
   return table.has_value();
 }
 
+// Of what is gone or cannot be opened nothing is told: somebody may be removing it.
+IndexError ContentsWriter::Impl::FollowEntries() {
+  const IndexError opened = entries.EnsureOpen(share.name);
+  if (opened == IndexError::DAMAGED) {
+    TellWriter(share.name, opened);
+  }
+  return opened;
+}
+
 // The entries database may have been made anew; it is then looked at from its beginning.
 bool ContentsWriter::Impl::ReadyToFollow() {
-  error = entries.EnsureOpen(share.name);
+  error = FollowEntries();
   if (error != IndexError::NONE) {
     return false;
   }

@@ -120,6 +120,7 @@ struct ContentsWriter::Impl {
   // Runs one operation. Memory that runs out undoes what a failure undoes.
   bool Guarded(const std::function<bool()>& step);
   bool Ready();  // sets the error where nothing is open
+  IndexError FollowEntries();
   bool ReadyToFollow();
   bool Done(int code);
   bool WasReadByOlder(const ContentFile& file) const {

@@ -20,7 +20,7 @@ IndexError ContentsWriter::Impl::Open(const Share& of_share, int64_t extractor_v
   CloseAll();
   share = of_share;
   extractor = extractor_version;
-  error = entries.EnsureOpen(share.name);
+  error = FollowEntries();
   if (error != IndexError::NONE) {
     return error;
   }

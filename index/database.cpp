@@ -353,7 +353,7 @@ IndexError IndexDatabase::Attach(const std::string& index_path, const char* name
 }
 
 void IndexDatabase::Remember(const char* name, const std::string& file) {
-  files.push_back({name, file, LogInode(file)});
+  files.push_back({name, file, LogFilesOf(file)});
 }
 
 void IndexDatabase::Close() {
@@ -365,8 +365,10 @@ bool IndexDatabase::HasMoved() const {
   return std::any_of(files.begin(), files.end(), [this](const OpenedFile& opened) {
     int moved = 0;
     const int code = sqlite3_file_control(db, opened.name.c_str(), SQLITE_FCNTL_HAS_MOVED, &moved);
+    const LogFiles log = LogFilesOf(opened.file);
     return (code == SQLITE_OK && moved != 0) ||
-           (opened.log != 0 && LogInode(opened.file) != opened.log);
+           (opened.log.log != 0 && log.log != opened.log.log) ||
+           (opened.log.memory != 0 && log.memory != opened.log.memory);
   });
 }
 

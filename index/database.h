@@ -9,6 +9,8 @@
 #include <string>
 #include <vector>
 
+#include "state/sqlite.h"
+
 namespace fileindexd {
 
 // What an opening, or an operation on an index, ended with. Numbers are shown in log lines.
@@ -71,7 +73,8 @@ class IndexDatabase {
   void Close();
 
   bool IsOpen() const { return db != nullptr; }
-  // True when a file that is open here, or its log, is no longer the one at its path.
+  // True when a file that is open here, or its log, or the memory that its users share, is no
+  // longer the one at its path.
   bool HasMoved() const;
 
   sqlite3* db = nullptr;
@@ -81,7 +84,7 @@ class IndexDatabase {
   struct OpenedFile {
     std::string name;  // in this connection
     std::string file;
-    ino_t log;  // 0: there was none
+    LogFiles log;
   };
   void Remember(const char* name, const std::string& file);
 

@@ -74,8 +74,9 @@ void Gather(const StatisticsWish& wish, Statistics& statistics) {
     StatisticsScan scan(wish, open);
     const int code = needs_entries ? scan.Run() : SQLITE_OK;
     if (code != SQLITE_OK) {
-      if (!open.has_contents) {  // which may be to blame
-        TellWriter(share.name, FromSqlite(code));
+      TellWriter(share.name, FromSqlite(code));
+      if (open.has_contents) {  // which may be to blame
+        TellContentsWriter(share.name, FromSqlite(code));
       }
       made.failures.push_back("share " + share.name + ": " + IndexErrorText(FromSqlite(code)));
       shares.pop_back();

@@ -7,6 +7,7 @@
 #include "index/contents_reader.h"
 #include "index/entry_table.h"
 #include "index/schema.h"
+#include "index/suspicion.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -40,12 +41,14 @@ bool OpenShare::Open(bool with_contents, std::vector<std::string>& failures) {
   }
   const IndexError error = reader.OpenOnceMade(share.name);
   if (error != IndexError::NONE) {
+    TellWriter(share.name, error);
     fail("", error);
     return false;
   }
   if (with_contents) {
     const IndexError attached = AttachContents(reader.database, share.name);
     has_contents = attached == IndexError::NONE;
+    TellContentsWriter(share.name, attached);
     if (!has_contents && attached != IndexError::PATH_NOT_FOUND) {
       fail("contents: ", attached);
     }

@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <ctime>
 #include <exception>
+#include <filesystem>
 #include <vector>
 
 #include "base/scoped_fd.h"
@@ -22,16 +23,25 @@ namespace {
 constexpr time_t WAKE_INTERVAL = 60;  // seconds, while a note lies there
 
 std::string NotePath(const std::string& index_path) {
-  return index_path + "/suspected";
+  return index_path + "/" + SUSPICION_NOTE;
 }
 
-// False where it is there already, and whoever left it woke the Worker not long ago.
+// Whatever somebody put in its place.
+void RemoveNote(const std::string& path) {
+  std::error_code ignored;  // the database is looked at again
+  std::filesystem::remove_all(path, ignored);
+}
+
+// False where it is there already, and whoever left it woke the writer not long ago.
 bool LeaveNote(const std::string& index_path) {
   constexpr int FLAGS = O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
   const std::string path = NotePath(index_path);
   struct stat left {};
   if (lstat(path.c_str(), &left) == 0 && std::abs(time(nullptr) - left.st_mtime) < WAKE_INTERVAL) {
     return false;
+  }
+  if (!IsFileOrNothing(path)) {
+    RemoveNote(path);
   }
   const ScopedFd note(open(path.c_str(), FLAGS, 0600));
   return note.fd >= 0 && futimens(note.fd, nullptr) == 0;
@@ -59,10 +69,21 @@ void TellWriter(const std::string& share_name, IndexError error) {
     if (access(path.c_str(), F_OK) != 0) {
       return;  // the share was removed: nothing of it is made anew
     }
-    const bool wakes = error == IndexError::DAMAGED ? LeaveNote(path) : error == IndexError::IO;
+    const bool wakes = error == IndexError::DAMAGED
+                           ? LeaveNote(path)
+                           : error == IndexError::IO || error == IndexError::PATH_NOT_FOUND;
     std::string ignored;  // whoever reads later tells again
     if (wakes) {
       (void)AppendToQueue(share_name, {}, ignored);
+    }
+  } catch (const std::exception&) {  // no memory
+  }
+}
+
+void TellContentsWriter(const std::string& share_name, IndexError error) {
+  try {
+    if (error == IndexError::DAMAGED) {
+      (void)LeaveNote(ContentsPath(share_name));
     }
   } catch (const std::exception&) {  // no memory
   }
@@ -84,7 +105,7 @@ IndexError CheckSuspected(sqlite3* db, const std::string& index_path) {
   }
   code = code == SQLITE_OK ? CheckWords(db) : code;
   if (code == SQLITE_OK) {
-    (void)unlink(note.c_str());
+    RemoveNote(note);
   }
   return code == SQLITE_ERROR ? IndexError::DAMAGED : FromSqlite(code);
 }

@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // A reader can meet damage in pages that the writer does not touch for months. It leaves a note in
-// the database's folder, and whoever next opens the database for writing looks at all of it, sets
-// it aside if it is damaged, and otherwise takes the note away. Nothing throws.
+// the folder of the entries or of the contents, and whoever next opens the database for writing
+// looks at all of it, sets it aside if it is damaged, and otherwise takes the note away. Nothing
+// throws.
 #pragma once
 
 #include <sqlite3.h>
@@ -12,10 +13,16 @@
 
 namespace fileindexd {
 
-// Called with what a read of the share's entries ended with. Of damage it leaves a note. Then, and
-// where the disk failed, which may be a log that was taken away, it wakes the share's Worker, which
-// opens the database anew; of damage once a minute at most, until that was done.
+constexpr const char* SUSPICION_NOTE = "suspected";  // a file in the database's folder
+
+// Called with what a read of the share's entries ended with. Of damage it leaves a note. Then,
+// where the disk failed, which may be a log that was taken away, and where there is no database, it
+// wakes the share's Worker, which opens the database anew; of damage once a minute at most, until
+// that was done.
 void TellWriter(const std::string& share_name, IndexError error);
+
+// The same of contents, of damage alone: the content service watches for the note.
+void TellContentsWriter(const std::string& share_name, IndexError error);
 
 // Looks at the whole database if there is a note: NONE, DAMAGED, or what kept it from being read.
 IndexError CheckSuspected(sqlite3* db, const std::string& index_path);

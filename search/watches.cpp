@@ -9,6 +9,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "index/suspicion.h"
 #include "search/log.h"
 #include "state/daemon_socket.h"
 #include "state/layout.h"
@@ -25,6 +26,10 @@ constexpr uint32_t CHANGED = CAME_OR_WENT | IN_MODIFY;
 constexpr uint32_t CHANGED_OR_CLOSED = CHANGED | IN_CLOSE_WRITE;
 
 constexpr uint32_t WENT = IN_DELETE | IN_MOVED_FROM;
+
+// Of the contents nothing else is watched: it is us who write them. The note's time is set each
+// time it is left.
+constexpr uint32_t SUSPECTED = IN_ATTRIB;
 
 constexpr const char* PID_FOLDER = "/var/run";
 constexpr std::string_view DAEMON_PID_NAME =
@@ -60,6 +65,7 @@ void Watches::Set(const Settings& settings) {
   for (const Share& share : settings.shares) {
     Add(ShareFolder(share.name), {Target::SHARE, share.name}, kept);
     Add(IndexPath(share.name), {Target::INDEX, share.name}, kept);
+    Add(ContentsPath(share.name), {Target::CONTENTS, share.name}, kept);
   }
   told = refused && told;
 
@@ -73,9 +79,10 @@ void Watches::Set(const Settings& settings) {
 
 void Watches::Add(const std::string& path, const Target& target, std::map<int, Target>& kept) {
   const bool is_given = target.place == Target::ROOT || target.place == Target::RUN;
-  const uint32_t wanted = target.place == Target::INDEX ? CHANGED_OR_CLOSED
-                          : is_given                    ? CHANGED
-                                                        : CAME_OR_WENT;
+  const uint32_t wanted = target.place == Target::INDEX      ? CHANGED_OR_CLOSED
+                          : target.place == Target::CONTENTS ? SUSPECTED
+                          : is_given                         ? CHANGED
+                                                             : CAME_OR_WENT;
   // The state root, and the folder of pid files, may be named by a link.
   const uint32_t mask = wanted | IN_ONLYDIR | (is_given ? 0U : IN_DONT_FOLLOW);
   const int watch = inotify_add_watch(inotify.fd, path.c_str(), mask);
@@ -141,7 +148,7 @@ void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hi
       hints.everything = true;
       break;
     case Target::SHARE:
-      hints.everything = hints.everything || name == "index";
+      hints.everything = hints.everything || name == "index" || name == "contents";
       if (name == "index" || (name == "contents" && (mask & WENT) != 0)) {
         hints.remade.insert(target.share);
       }
@@ -155,6 +162,11 @@ void Watches::Judge(int watch, unsigned mask, const std::string& name, Hints& hi
         }
       } else if (IsDatabaseFile(name, "entries.db")) {
         hints.shares.insert(target.share);
+      }
+      break;
+    case Target::CONTENTS:
+      if (name == SUSPICION_NOTE) {
+        hints.remade.insert(target.share);
       }
       break;
     case Target::RUN:

@@ -5,6 +5,7 @@
 //   ROOT/shares               a share's folder came or went
 //   ROOT/shares/NAME          its "index" came or went, its "contents" went
 //   ROOT/shares/NAME/index    a commit; the database came or went
+//   ROOT/shares/NAME/contents somebody has met damage in the database
 //   /var/run                  the daemon began
 //
 // One thread. Events are hints: whoever gets one looks at what is there.
@@ -24,7 +25,7 @@ struct Hints {
   bool everything = false;       // shares, folders, flags, the pause or the daemon may be others
   std::set<std::string> shares;  // a commit that has begun at least, by the share's name
   std::set<std::string> closed;  // somebody has closed the entries, as the daemon does after each
-  std::set<std::string> remade;  // a database came or went, by the share's name
+  std::set<std::string> remade;  // a database came or went, or is suspected, by the share's name
 
   bool Any() const { return everything || !shares.empty() || !closed.empty() || !remade.empty(); }
 };
@@ -48,8 +49,8 @@ class Watches {
 
  private:
   struct Target {
-    enum { ROOT, SHARES, SHARE, INDEX, RUN } place;
-    std::string share;  // name; of SHARE and INDEX
+    enum { ROOT, SHARES, SHARE, INDEX, CONTENTS, RUN } place;
+    std::string share;  // name; of SHARE, INDEX and CONTENTS
   };
 
   void Add(const std::string& path, const Target& target, std::map<int, Target>& kept);

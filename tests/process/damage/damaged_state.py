@@ -4,7 +4,6 @@
 import os
 import re
 import signal
-import sqlite3
 
 from harness import IndexTest, namespace
 from standing_in import remove
@@ -28,14 +27,6 @@ def scribble(path, start=0):
 
 def truncate(part):
     os.truncate(FILE, int(os.path.getsize(FILE) * part))
-
-
-def copy_log_back():
-    """So that the main file alone holds the state, for those too who have it open."""
-    with sqlite3.connect(FILE) as db:
-        while db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] != 0:
-            pass  # a reader was in the way
-    db.close()
 
 
 def thread_states(pid):

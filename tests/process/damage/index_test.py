@@ -8,6 +8,7 @@ import shutil
 import sqlite3
 
 from harness import IndexTest, main, namespace
+from pages import PAGE, copy_log_back, scribble, scribble_leaf
 from standing_in import make_full_folder, remove, replace
 
 CREATE = 0x40
@@ -16,7 +17,6 @@ MS_REMOUNT = 32
 FOLDER = f"{namespace.STATE}/shares/alpha/index"
 FILE = f"{FOLDER}/entries.db"
 COPY = f"{FOLDER}.damaged"
-PAGE = 4096
 ENDED = re.compile(
     r"Worker\[alpha\] (finished all task, stopping|stopped while processing command queue)"
 )
@@ -56,54 +56,19 @@ def drop_column():
     db.close()
 
 
-def copy_log_back():
-    """So that the main file alone holds the index."""
-    with sqlite3.connect(FILE) as db:
-        while db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] != 0:
-            pass  # a reader was in the way
-    db.close()
-
-
 def cut_off(size):
-    copy_log_back()
+    copy_log_back(FILE)
     os.truncate(FILE, size)
 
 
 def truncate(part):
-    copy_log_back()
+    copy_log_back(FILE)
     os.truncate(FILE, int(os.path.getsize(FILE) * part))
 
 
-def scribble(path, start, end):
-    with open(path, "r+b") as file:
-        size = os.fstat(file.fileno()).st_size
-        file.seek(start)
-        file.write(b"\xa5" * ((size if end is None else min(end, size)) - start))
-
-
 def scribble_pages(start, end):
-    copy_log_back()
+    copy_log_back(FILE)
     scribble(FILE, start, end)
-
-
-def scribble_leaf(table):
-    """In the middle of the table's rows, where nobody looks who does not read them all."""
-    copy_log_back()
-    with sqlite3.connect(FILE) as db:
-        query = "SELECT rootpage FROM sqlite_schema WHERE name = ?"
-        page = db.execute(query, (table,)).fetchone()[0]
-    db.close()
-    with open(FILE, "rb") as file:
-        while True:
-            file.seek((page - 1) * PAGE)
-            data = file.read(PAGE)
-            if data[0] in (10, 13):  # leaves of an index, and of a table
-                break
-            cells = int.from_bytes(data[3:5], "big")
-            cell = 12 + cells // 2 * 2
-            place = int.from_bytes(data[cell : cell + 2], "big")
-            page = int.from_bytes(data[place : place + 4], "big")
-    scribble(FILE, (page - 1) * PAGE, page * PAGE)
 
 
 def set_version(number):
@@ -171,7 +136,7 @@ class DamagedIndexTest(IndexTest):
         pid = self.start()
         self.await_drained("alpha")
         # A log of its own on top of a file that is whole.
-        copy_log_back()
+        copy_log_back(FILE)
         self.make_files(self.root, *(f"late/{i}.txt" for i in range(100)))
         self.ctl("reindex", self.root)
         self.await_drained("alpha")
@@ -285,7 +250,7 @@ class DamagedIndexTest(IndexTest):
 
         self.check(after, fate, None, found)
 
-    def damaged_and_only_asked(self, damage, asked):
+    def damaged_and_only_asked(self, damage, asked, fate=KEPT):
         self.make_index()
         after = self.log.mark()
         damage()
@@ -295,17 +260,17 @@ class DamagedIndexTest(IndexTest):
         self.await_line(TOLD, after)
         self.settle(after)
 
-        self.check(after, KEPT, None, found)
+        self.check(after, fate, None, found)
         self.assertFalse(os.path.exists(f"{FOLDER}/suspected"))
 
     def test_rows_that_only_a_comparison_reads_are_told_of_and_made_anew(self):
-        self.damaged_and_only_asked(lambda: scribble_leaf("entries"), ("verify", "alpha"))
+        self.damaged_and_only_asked(lambda: scribble_leaf(FILE, "entries"), ("verify", "alpha"))
 
     def test_rows_that_only_a_dump_reads_are_told_of_and_made_anew(self):
-        self.damaged_and_only_asked(lambda: scribble_leaf("entries"), ("dump", "alpha"))
+        self.damaged_and_only_asked(lambda: scribble_leaf(FILE, "entries"), ("dump", "alpha"))
 
     def test_rows_that_only_statistics_read_are_told_of_and_made_anew(self):
-        self.damaged_and_only_asked(lambda: scribble_leaf("entries"), ("stats",))
+        self.damaged_and_only_asked(lambda: scribble_leaf(FILE, "entries"), ("stats",))
 
     def test_an_older_file_below_its_log_is_told_of_by_whoever_reads_it(self):
         pid = self.make_index()
@@ -313,7 +278,7 @@ class DamagedIndexTest(IndexTest):
         self.make_files(self.root, *(f"later/{i}.txt" for i in range(200)))
         self.ctl("reindex", self.root)
         self.await_drained("alpha")
-        copy_log_back()
+        copy_log_back(FILE)
         self.touch()
         self.stop(pid)
         shutil.copyfile(f"{namespace.RUN}/older.db", FILE)
@@ -328,21 +293,33 @@ class DamagedIndexTest(IndexTest):
         self.check(after, KEPT, None, found)
 
     def test_words_that_only_a_search_reads_are_told_of_and_made_anew(self):
-        self.damaged_and_only_asked(lambda: scribble_leaf("names_data"), ("search", "txt"))
+        self.damaged_and_only_asked(lambda: scribble_leaf(FILE, "names_data"), ("search", "txt"))
 
     def test_a_log_that_went_is_told_of_by_a_search_alone(self):
         self.damaged_and_only_asked(lambda: remove(FILE + "-wal"), ("search", "txt"))
 
+    def test_a_database_that_went_is_told_of_by_a_search_alone(self):
+        self.damaged_and_only_asked(lambda: remove(FILE), ("search", "txt"), GONE)
+
     def test_an_index_that_only_seemed_damaged_is_kept(self):
         self.make_index()
-        with open(f"{FOLDER}/suspected", "wb"):
-            pass
-        after = self.log.mark()
+        note = f"{FOLDER}/suspected"
+        for suspect in (lambda: open(note, "wb").close(), lambda: make_full_folder(note)):
+            suspect()
+            after = self.log.mark()
 
-        self.touch()
+            self.touch()
 
-        self.assertFalse(os.path.exists(f"{FOLDER}/suspected"))
-        self.check(after, UNSEEN)
+            self.assertFalse(os.path.lexists(note))
+            self.check(after, UNSEEN)
+
+    def test_damage_is_told_of_whatever_stands_in_the_place_of_the_note(self):
+        def damage():
+            scribble_leaf(FILE, "names_data")
+            os.mkfifo(f"{FOLDER}/suspected")
+            os.utime(f"{FOLDER}/suspected", (0, 0))
+
+        self.damaged_and_only_asked(damage, ("search", "txt"))
 
     def make_read_only(self, folder):
         namespace.mount(folder, folder, flags=namespace.MS_BIND)

@@ -9,10 +9,10 @@ from damaged_state import (
     FILE,
     USED,
     StateDamageTest,
-    copy_log_back,
     scribble,
 )
 from harness import main, namespace
+from pages import copy_log_back
 from standing_in import make_full_folder, remove, replace
 
 LOG = FILE + "-wal"
@@ -56,10 +56,10 @@ class StateLogTest(StateDamageTest):
 
     def prepare(self):
         super().prepare()
-        copy_log_back()
+        copy_log_back(FILE)
         shutil.copyfile(FILE, OLDER)
         self.ctl("share", "set", "alpha", "--language", "german")
-        copy_log_back()
+        copy_log_back(FILE)
         self.ctl("folder", "add", f"{self.root}/d", "--photo")
         self.await_drained("alpha")
 

@@ -12,12 +12,12 @@ from damaged_state import (
     FILE,
     USED,
     StateDamageTest,
-    copy_log_back,
     remove_all_of,
     scribble,
     truncate,
 )
 from harness import main, namespace
+from pages import copy_log_back
 from standing_in import make_full_folder, remove, replace
 
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")
@@ -105,7 +105,7 @@ class StateTest(StateDamageTest):
 
     def damaged_in_place(self, damage):
         self.prepare()
-        copy_log_back()
+        copy_log_back(FILE)
         after = self.log.mark()
         damage()
 
@@ -202,7 +202,7 @@ class StateTest(StateDamageTest):
 
     def test_both_damaged_while_running_is_told_once(self):
         self.prepare()
-        copy_log_back()
+        copy_log_back(FILE)
         after = self.log.mark()
         scribble(COPY)
         scribble(FILE)

@@ -64,6 +64,15 @@ int CountIn(const char* folder) {
   return count;
 }
 
+std::string OpenFiles() {
+  std::string names;
+  for (const auto& entry : fs::directory_iterator("/proc/self/fd")) {
+    std::error_code closed;  // that of this look
+    names += fs::read_symlink(entry, closed).string() + "\n";
+  }
+  return names;
+}
+
 class CancelledWorkerTest : public MountTest {
  protected:
   void SetUp() override {
@@ -173,7 +182,7 @@ class CancelledWorkerTest : public MountTest {
 
   void Revive() {
     daemon.DeleteWorker("s");
-    ASSERT_EQ(CountIn("/proc/self/fd"), descriptors);
+    ASSERT_EQ(CountIn("/proc/self/fd"), descriptors) << OpenFiles();
     ASSERT_NO_FATAL_FAILURE(AwaitThreads());
     ASSERT_EQ(waitpid(-1, nullptr, WNOHANG), -1);
     ASSERT_EQ(errno, ECHILD);
