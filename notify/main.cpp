@@ -108,7 +108,8 @@ int Serve(const CommandLine& chosen) {
   std::string error;
   Instance instance(NOTIFIER_PROGRAM, NOTIFIER_PID_FILE, NOTIFIER_LOCK_FILE);
   std::string missing;
-  if (!instance.Claim(error) || !MakeStateRoot(error) || !Confine(missing, error)) {
+  if (instance.Claim(error) != Claimed::BY_US || !MakeStateRoot(error) ||
+      !Confine(missing, error)) {
     return Complain(error);
   }
   if (!missing.empty()) {

@@ -122,7 +122,7 @@ int Serve() {
   ContentLoop loop(
       {.helpers = std::max(std::thread::hardware_concurrency(), 1U), .program = HelperPath()});
   std::string error;
-  if (!instance.Claim(error) || !loop.Start(error) || !instance.Announce(error)) {
+  if (instance.Claim(error) != Claimed::BY_US || !loop.Start(error) || !instance.Announce(error)) {
     return Complain(error);
   }
 

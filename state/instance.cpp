@@ -35,37 +35,37 @@ Instance::~Instance() {
   }
 }
 
-bool Instance::Claim(std::string& error) {
+Claimed Instance::Claim(std::string& error) {
   ScopedFd opened(open(lock_file.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
-  if (opened.fd < 0) {
-    error = lock_file + ": " + std::generic_category().message(errno);
-    return false;
-  }
-
+  int failure = opened.fd < 0 ? errno : Lock(opened.fd);
   // One that was killed can leave the lock, for a moment, to a child that it was about to make a
   // helper of; and one that starts has not announced itself yet.
-  int failure = Lock(opened.fd);
   for (int waited_ms = 0;
        failure == EWOULDBLOCK && waited_ms < LOCK_WAIT_MS && AliveByPidFile(pid_file, program) <= 0;
        waited_ms += LOCK_NAP_MS) {
     (void)poll(nullptr, 0, LOCK_NAP_MS);
     failure = Lock(opened.fd);
   }
-  if (failure != 0) {
-    error = failure == EWOULDBLOCK ? "another instance runs"
-                                   : lock_file + ": " + std::generic_category().message(failure);
-    return false;
+  if (failure == EWOULDBLOCK) {
+    error = "another instance runs";
+    return Claimed::BY_ANOTHER;
   }
 
-  // Somebody may have removed the lock file from under a running instance.
+  // Somebody may have removed the lock file from under a running instance; and another user, who
+  // cannot have the lock, may read who runs.
   const pid_t alive = AliveByPidFile(pid_file, program);
   if (alive > 0 && alive != getpid()) {
     error = "another instance runs, pid " + std::to_string(alive);
-    return false;
+    return Claimed::BY_ANOTHER;
   }
 
+  if (failure != 0) {
+    error = lock_file + ": " + std::generic_category().message(failure);
+    errno = failure;
+    return Claimed::BY_NOBODY;
+  }
   lock.Swap(opened);
-  return true;
+  return Claimed::BY_US;
 }
 
 bool Instance::Announce(std::string& error) {

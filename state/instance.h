@@ -13,6 +13,12 @@
 
 namespace fileindexd {
 
+enum class Claimed {
+  BY_US,
+  BY_ANOTHER,
+  BY_NOBODY,  // the lock cannot be had, and nobody else is known to run
+};
+
 class Instance {
  public:
   // `program` is the name of the service's executable.
@@ -21,8 +27,8 @@ class Instance {
   Instance& operator=(const Instance&) = delete;
   ~Instance();  // removes the pid file if this process wrote it, then lets go of the lock
 
-  // False, and `error` then says why, when another instance runs or the lock cannot be had.
-  bool Claim(std::string& error);
+  // `error` says why it is not ours; errno of a lock that cannot be had is left as it was.
+  Claimed Claim(std::string& error);
   // Tells the world that the service runs. After Claim.
   bool Announce(std::string& error);
 

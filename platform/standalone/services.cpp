@@ -1,9 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Pid files, services and helper programs.
-#include <fcntl.h>
 #include <poll.h>
-#include <sys/file.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -11,7 +8,9 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
+#include <cstring>
 #include <string>
+#include <string_view>
 #include <thread>
 #include <utility>
 
@@ -24,6 +23,7 @@
 #include "platform/standalone/uncancelled.h"
 #include "platform/system.h"
 #include "state/belonging.h"
+#include "state/instance.h"
 #include "state/layout.h"
 #include "state/pid_file.h"
 
@@ -34,8 +34,6 @@ namespace {
 constexpr int STOP_WAIT_MS = 10000;
 constexpr int KILL_WAIT_MS = 1000;
 constexpr std::chrono::seconds KEPT_COPY_PAUSE(1);
-constexpr int LOCK_WAIT_MS = 2000;
-constexpr int LOCK_NAP_MS = 5;
 
 struct SystemError {
   int code = 0;
@@ -43,10 +41,6 @@ struct SystemError {
   int line = 0;
 };
 thread_local SystemError last_error;
-
-// The pid file, locked from the alive check to the end of the process: of two that start at the
-// same time one gets it. Never closed; the detached child inherits it.
-int pid_file_lock = -1;
 
 // The service that this process has started last, which may not have written its pid file yet.
 // Never its number alone: that may be another process's by the time it is to be stopped.
@@ -58,69 +52,29 @@ int Fail(const char* file, int line) {
 }
 #define FI_FAIL() Fail(__FILE__, __LINE__)
 
-// Opens and locks the pid file at its path: 1 done, 0 somebody else holds it, -1 with errno.
-int LockPidFile(const char* pid_file, ScopedFd& locked) {
-  for (;;) {
-    ScopedFd opened(open(pid_file, O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644));
-    if (opened.fd < 0) {
-      return -1;
-    }
-    if (flock(opened.fd, LOCK_EX | LOCK_NB) != 0) {
-      return errno == EWOULDBLOCK ? 0 : -1;
-    }
-
-    // An instance that just ended may have removed the file after we opened it.
-    struct stat ours = {};
-    struct stat there = {};
-    if (fstat(opened.fd, &ours) == 0 && stat(pid_file, &there) == 0 &&
-        ours.st_ino == there.st_ino && ours.st_dev == there.st_dev) {
-      locked.Swap(opened);
-      return 1;
-    }
-  }
+std::string LockFile(std::string_view pid_file) {
+  pid_file.remove_suffix(pid_file.ends_with(".pid") ? strlen(".pid") : 0);
+  return std::string(pid_file) + ".lock";
 }
 
 int CheckAlive(const char* pid_file) {
-  ScopedFd locked;
-  int taken = LockPidFile(pid_file, locked);
-  // A daemon that was killed can leave the lock, for a moment, to a helper that it was about to
-  // run; and one that starts has not written its pid yet. Until then the lock alone says nothing.
-  for (int waited_ms = 0; taken == 0 && waited_ms < LOCK_WAIT_MS; waited_ms += LOCK_NAP_MS) {
-    if (AliveByPidFile(pid_file, OwnProgram()) > 0) {
+  Instance instance(OwnProgram(), pid_file, LockFile(pid_file));
+  std::string error;
+  switch (instance.Claim(error)) {
+    case Claimed::BY_ANOTHER:
       return 1;
-    }
-    (void)poll(nullptr, 0, LOCK_NAP_MS);
-    taken = LockPidFile(pid_file, locked);
+    case Claimed::BY_NOBODY:
+      return FI_FAIL();
+    case Claimed::BY_US:
+      break;
   }
-  if (taken == 0) {
-    return 1;
-  }
-
-  // Also where the file could not be locked: another user may read whom it names.
-  const int reason = errno;
-  const pid_t recorded = AliveByPidFile(pid_file, OwnProgram());
-  if (recorded > 0 && recorded != getpid()) {
-    return 1;
-  }
-  if (taken < 0) {
-    errno = reason;
-    return FI_FAIL();
-  }
-  pid_file_lock = locked.Release();
+  // Held to the end of the process: the detached child inherits it.
+  (void)instance.lock.Release();
   return 0;
 }
 
 int RecordProcess(const char* pid_file) {
-  if (pid_file_lock < 0) {
-    return WritePidFile(pid_file) ? 0 : FI_FAIL();
-  }
-
-  const std::string text = std::to_string(getpid()) + "\n";
-  if (fchmod(pid_file_lock, 0644) != 0 || ftruncate(pid_file_lock, 0) != 0 ||
-      pwrite(pid_file_lock, text.data(), text.size(), 0) != static_cast<ssize_t>(text.size())) {
-    return FI_FAIL();
-  }
-  return 0;
+  return WritePidFile(pid_file) ? 0 : FI_FAIL();
 }
 
 std::string ServicePidFile(const std::string& name) {

@@ -7,9 +7,11 @@ import re
 import shutil
 import signal
 import stat
+import struct
 import unittest.mock
 
 from harness import MachineTest, control, main, namespace
+from harness.awaiting import FolderWatch
 from harness.machine import PID_FILE, SERVICE_PID_FILE, program
 
 STARTED = [
@@ -25,6 +27,23 @@ STARTED = [
 
 
 CLONE3 = 435
+
+IN_MODIFY = 0x02
+IN_MOVED_TO = 0x80
+IN_CREATE = 0x100
+EVENT = struct.Struct("iIII")
+
+
+def events_of(watch, name):
+    """What has happened to the file of that name, in order."""
+    found = []
+    data = os.read(watch.fd, 65536)
+    while data:
+        _, mask, _, length = EVENT.unpack_from(data)
+        if data[EVENT.size : EVENT.size + length].rstrip(b"\0") == name.encode():
+            found.append(mask)
+        data = data[EVENT.size + length :]
+    return found
 
 
 class CloneArguments(ctypes.Structure):
@@ -75,6 +94,14 @@ class StartStopTest(MachineTest):
         self.assertEqual(stat.S_IMODE(mode), 0o777)
         self.assertEqual(stat.S_IMODE(os.stat(namespace.STATE).st_mode), 0o700)
         self.await_file(SERVICE_PID_FILE)
+
+    def test_pid_file_is_there_at_once_with_the_number_of_the_detached_process(self):
+        with FolderWatch(namespace.RUN, mask=IN_CREATE | IN_MODIFY | IN_MOVED_TO) as watch:
+            pid = self.start()
+
+            self.assertEqual(events_of(watch, os.path.basename(PID_FILE)), [IN_MOVED_TO])
+        self.assertEqual(pid, self.detached_pid())
+        self.assertEqual(stat.S_IMODE(os.stat(PID_FILE).st_mode), 0o644)
 
     def test_standard_streams_lead_nowhere(self):
         pid = self.start()
