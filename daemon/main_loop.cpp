@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <poll.h>
 #include <sys/inotify.h>
-#include <sys/select.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <unistd.h>
 
-#include <algorithm>
+#include <array>
 #include <csignal>
 #include <cstddef>
 #include <cstring>
@@ -19,7 +19,7 @@ namespace fileindexd {
 namespace {
 
 constexpr int BACKLOG = 10;
-constexpr time_t SELECT_TIMEOUT = 10;  // seconds
+constexpr time_t WAIT_TIMEOUT = 10;  // seconds
 constexpr size_t EVENT_BUFFER_SIZE = 16384;
 constexpr const char QUEUE_NAME[] = "TALO@file_index_queue";
 // Its final NUL is part of the comparison, so that longer names do not match.
@@ -30,12 +30,19 @@ bool IsQueueWritten(const inotify_event& event) {
          memcmp(event.name, QUEUE_NAME, QUEUE_NAME_SIZE) == 0;
 }
 
-// Waits for one of the two to be readable, with SIGTERM and SIGINT let through. As select.
-int WaitReadable(int inotify_fd, int socket_fd, fd_set* readable) {
-  FD_ZERO(readable);
-  FD_SET(inotify_fd, readable);
-  FD_SET(socket_fd, readable);
+// What is waited for; a set of bits would have no room for the high numbers that are left over
+// where whoever started the process left many descriptors open.
+struct Readable {
+  Readable(int inotify_fd, int socket_fd)
+      : fds{{{inotify_fd, POLLIN, 0}, {socket_fd, POLLIN, 0}}} {}
+  bool HasEvents() const { return fds[0].revents != 0; }
+  bool HasClient() const { return fds[1].revents != 0; }
 
+  std::array<pollfd, 2> fds;
+};
+
+// Waits for one of the two to be readable, with SIGTERM and SIGINT let through. As poll.
+int WaitReadable(Readable& readable) {
   sigset_t mask;
   pthread_sigmask(SIG_BLOCK, nullptr, &mask);
   sigdelset(&mask, SIGTERM);
@@ -44,12 +51,12 @@ int WaitReadable(int inotify_fd, int socket_fd, fd_set* readable) {
   // A wait that finds something readable runs no handler: under a stream of clients a signal would
   // stay pending. One with nothing to find does.
   const timespec at_once = {0, 0};
-  if (pselect(0, nullptr, nullptr, nullptr, &at_once, &mask) < 0) {
+  if (ppoll(nullptr, 0, &at_once, &mask) < 0) {
     return -1;
   }
 
-  const timespec timeout = {SELECT_TIMEOUT, 0};
-  return pselect(std::max(inotify_fd, socket_fd) + 1, readable, nullptr, nullptr, &timeout, &mask);
+  const timespec timeout = {WAIT_TIMEOUT, 0};
+  return ppoll(readable.fds.data(), readable.fds.size(), &timeout, &mask);
 }
 
 }  // namespace
@@ -98,8 +105,8 @@ void Daemon::MainLoop() {
 }
 
 void Daemon::LoopOnce() {
-  fd_set readable;
-  if (WaitReadable(inotify_fd, socket_fd, &readable) <= 0) {
+  Readable readable(inotify_fd, socket_fd);
+  if (WaitReadable(readable) <= 0) {
     // Quiet, or a signal: housekeeping. Wanted: under a steady stream of work it waits.
     ReapFinishedWorkers();
     CheckResumeTime();
@@ -107,10 +114,10 @@ void Daemon::LoopOnce() {
   }
 
   try {
-    if (FD_ISSET(inotify_fd, &readable)) {
+    if (readable.HasEvents()) {
       HandleQueueEvents();
     }
-    if (FD_ISSET(socket_fd, &readable)) {
+    if (readable.HasClient()) {
       HandleCommand();
     }
   } catch (...) {  // the main thread is never cancelled

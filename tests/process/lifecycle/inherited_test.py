@@ -2,7 +2,9 @@
 """What whoever starts the programs leaves to them: closed streams, ignored signals, a state folder
 that is none."""
 
+import contextlib
 import os
+import resource
 import stat
 import subprocess
 
@@ -14,6 +16,7 @@ from harness.watching import NOTIFIER_PID_FILE
 CREATE = 0x40
 NULL = "/dev/null"
 STREAMS = (0, 1, 2)
+INHERITED = 1100  # more than a set of descriptors that is a table of bits has room for
 
 
 def without_streams(name, numbers):
@@ -45,6 +48,30 @@ class InheritedTest(MachineTest):
                 self.assert_streams_lead_nowhere(pid)
                 self.assertEqual(stat.S_IMODE(os.stat(NULL).st_mode), 0o666)
                 self.stop(pid)
+
+    def test_daemon_serves_beyond_the_first_thousand_descriptors(self):
+        limits = resource.getrlimit(resource.RLIMIT_NOFILE)
+        resource.setrlimit(resource.RLIMIT_NOFILE, (limits[1], limits[1]))
+        self.addCleanup(resource.setrlimit, resource.RLIMIT_NOFILE, limits)
+        root = self.make_share(files=("a.txt",))
+        with contextlib.ExitStack() as held:
+            inherited = [held.enter_context(open(NULL, "rb")).fileno() for _ in range(INHERITED)]
+            subprocess.run(
+                [program("fileindexd")],
+                env=environment(FILEINDEXD_LOG_LEVEL="debug"),
+                pass_fds=inherited,
+                check=True,
+                timeout=LIMIT,
+            )
+
+        self.await_line("Search daemon launched ...")
+        pid = self.daemon_pid()
+        self.assertGreater(self.descriptors(pid), INHERITED)
+        self.assertEqual(self.command("resume"), 0)
+        self.await_drained("alpha")
+        self.append("alpha", {"event": CREATE, "path": f"{root}/a.txt"})
+        self.await_drained("alpha")
+        self.stop(pid)
 
     def check_service(self, name, pid_file):
         service = subprocess.Popen(without_streams(name, STREAMS), env=environment())
