@@ -77,7 +77,10 @@ class Daemon {
   void Resume();
 
   // Asked by the Workers without a lock.
-  bool IsPaused() const { return resume_time == 0 || time(nullptr) < resume_time; }
+  bool IsPaused() const {
+    const int64_t until = resume_time;  // once: another pause may be set between two looks
+    return until == 0 || time(nullptr) < until;
+  }
 
   pthread_cond_t pause_cond;  // these three: initialised in SetupWorkers
   pthread_mutex_t pause_mutex;

@@ -65,6 +65,11 @@ int usleep(useconds_t time) {
   return Fails("usleep") ? 0 : Library("usleep", usleep)(time);
 }
 
+time_t time(time_t* now) noexcept {
+  (void)Fails("time");  // only counted
+  return Library("time", time)(now);
+}
+
 DIR* opendir(const char* path) {
   return Fails("opendir") ? nullptr : Library("opendir", opendir)(path);
 }

@@ -334,5 +334,14 @@ TEST_F(RegistryTest, ResumeTimeTellsWhetherThereIsAPause) {
   }
 }
 
+TEST_F(RegistryTest, APauseThatBecomesOneWithoutEndIsAPauseAllTheTime) {
+  daemon.resume_time = time(nullptr) + 1000;
+  script.Run("time", 1, [this] { daemon.resume_time = 0; });
+
+  EXPECT_TRUE(daemon.IsPaused());
+
+  EXPECT_EQ(daemon.resume_time, 0);
+}
+
 }  // namespace
 }  // namespace fileindexd
