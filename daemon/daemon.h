@@ -92,9 +92,9 @@ class Daemon {
   int64_t resume_time = -1;
   std::map<std::string, Worker*> workers;  // owned, by share name
 
-  // The clean-up has come in a pause: its end is none for the Workers, which then end their threads
-  // instead of going on. Asked by them without a lock.
-  std::atomic<bool> ends_in_pause{false};
+  // The clean-up has come: a Worker in a pause ends its thread instead of waiting. Asked by them
+  // without a lock.
+  std::atomic<bool> is_ending{false};
 
   // How many of platform_mutex, pause_mutex and pause_cond are initialised, in that order.
   int primitives = 0;

@@ -150,8 +150,8 @@ void Daemon::StopSearchService() {
   }
 }
 
-// Ends a pause first, so that no Worker that waits in it holds the clean-up up for ever. What they
-// held back stays undone: a pause that ends with the process has not ended for the queues.
+// Wakes the Workers that wait in a pause first, so that none holds the clean-up up for ever. What
+// they held back stays undone: a pause that ends with the process has not ended for the queues.
 //
 // Wanted: both mutexes are destroyed while they are held. The C library refuses that and leaves
 // them usable. It does not refuse while threads merely wait for one: the first of them would get
@@ -160,8 +160,7 @@ void Daemon::StopSearchService() {
 void Daemon::DestroyPrimitives() {
   if (primitives == 3) {
     pthread_mutex_lock(&pause_mutex);
-    ends_in_pause = IsPaused();
-    resume_time = -1;
+    is_ending = true;
     pthread_cond_broadcast(&pause_cond);
   }
 

@@ -196,10 +196,10 @@ bool Worker::Respawn() {
 }
 
 void Worker::WaitWhilePaused() {
-  if (daemon->IsPaused()) {
+  if (daemon->IsPaused() && !daemon->is_ending) {
     pthread_mutex_lock(pause_mutex);
     pthread_cleanup_push(Cleaner, pause_mutex);
-    while (daemon->IsPaused()) {
+    while (daemon->IsPaused() && !daemon->is_ending) {
       pthread_cond_wait(pause_cond, pause_mutex);
     }
     // Popping with execution would run the handler in a destructor that is noexcept, and its log
@@ -210,7 +210,7 @@ void Worker::WaitWhilePaused() {
 
   // As a cancellation in the wait would: a drained copy stays, and nothing is committed. The state
   // is left alone, by which the main thread knows that there is a thread to join.
-  if (daemon->ends_in_pause) {
+  if (daemon->is_ending && daemon->IsPaused()) {
     pthread_exit(nullptr);
   }
   AdoptFolders();

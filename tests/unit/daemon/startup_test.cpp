@@ -194,7 +194,7 @@ TEST_F(StartupTest, TheServiceIsStoppedOnlyWhenEveryWorkerIsGone) {
   EXPECT_EQ(left, 0);
 }
 
-TEST_F(StartupTest, CleanUpEndsAPauseThatWorkersWaitInWithoutALine) {
+TEST_F(StartupTest, CleanUpEndsTheWaitOfWorkersInAPauseWithoutALine) {
   ASSERT_TRUE(daemon.SetupInotify());
   ASSERT_TRUE(daemon.SetupWorkers());
   script.Run("pthread_cond_wait", EVERY_CALL, [] {});
@@ -206,7 +206,19 @@ TEST_F(StartupTest, CleanUpEndsAPauseThatWorkersWaitInWithoutALine) {
 
   EXPECT_EQ(script.CountLines("SetPaused"), 0U);
   EXPECT_EQ(script.CountLines("In cleaner"), 2U);
-  EXPECT_EQ(daemon.resume_time, -1);
+  EXPECT_EQ(daemon.resume_time, 0);
+}
+
+TEST_F(StartupTest, WhetherThereIsAPauseIsLeftToTheWorkersToAsk) {
+  ASSERT_TRUE(daemon.SetupInotify());
+  ASSERT_TRUE(daemon.SetupWorkers());
+  daemon.resume_time = time(nullptr) + 1000;
+  script.Run("time", EVERY_CALL, [] {});
+  const int before = script.CallCount("time");
+
+  daemon.CleanResource();
+
+  EXPECT_EQ(script.CallCount("time"), before);
 }
 
 TEST_F(StartupTest, CleanUpInAPauseLeavesTheQueuesAsTheyAre) {
