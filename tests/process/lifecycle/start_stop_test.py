@@ -146,6 +146,7 @@ class StartStopTest(MachineTest):
 
         self.stop(pid)
 
+        self.log.mark()  # so that all that was sent is seen
         self.assertEqual(
             self.log.texts(),
             [f"In kill handler({int(signal.SIGTERM)})", "Daemon Leaving main loop"],
