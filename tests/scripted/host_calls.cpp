@@ -6,6 +6,7 @@
 // are counted from the first thing that a test tells.
 #include <dirent.h>
 #include <dlfcn.h>
+#include <poll.h>
 #include <pthread.h>
 #include <sys/file.h>
 #include <sys/inotify.h>
@@ -14,7 +15,9 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <cstdlib>
 #include <ctime>
+#include <string>
 
 #include "scripted/script.h"
 
@@ -27,9 +30,9 @@ Function* Library(const char* name, Function* /*kind*/) {
   return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, name));
 }
 
-// True when the call shall fail, with errno set.
-bool Fails(const char* name) {
-  const auto error = TheScript().EnterUnrecorded(name, "");
+// True when the call shall fail, with errno set. `subject`: by which a test can tell calls apart.
+bool Fails(const char* name, const std::string& subject = "") {
+  const auto error = TheScript().EnterUnrecorded(name, subject);
   if (error) {
     errno = *error;
   }
@@ -105,11 +108,29 @@ int bind(int fd, const sockaddr* address, socklen_t size) noexcept {
 }
 
 int listen(int fd, int backlog) noexcept {
-  return Fails("listen") ? -1 : Library("listen", listen)(fd, backlog);
+  return Fails("listen", std::to_string(backlog)) ? -1 : Library("listen", listen)(fd, backlog);
 }
 
 int accept4(int fd, sockaddr* address, socklen_t* size, int flags) {
   return Fails("accept4") ? -1 : Library("accept4", accept4)(fd, address, size, flags);
+}
+
+int poll(pollfd* fds, nfds_t count, int timeout_ms) {
+  return Fails("poll") ? -1 : Library("poll", poll)(fds, count, timeout_ms);
+}
+
+int ppoll(pollfd* fds, nfds_t count, const timespec* timeout, const sigset_t* mask) {
+  const std::string time = std::to_string(timeout->tv_sec) + "." + std::to_string(timeout->tv_nsec);
+  return Fails("ppoll", time) ? -1 : Library("ppoll", ppoll)(fds, count, timeout, mask);
+}
+
+int unlink(const char* path) noexcept {
+  return Fails("unlink", path) ? -1 : Library("unlink", unlink)(path);
+}
+
+void srand(unsigned seed) noexcept {
+  (void)Fails("srand");  // only counted
+  Library("srand", srand)(seed);
 }
 
 int inotify_init() noexcept {

@@ -191,6 +191,34 @@ TEST_F(ControlTest, ANameWithANulIsThatOfNoShare) {
   EXPECT_THAT(Log(), ElementsAre("TALOShareGet failed, share=a", "CreateWorker failed, share=a"));
 }
 
+TEST_F(ControlTest, AReadThatIsInterruptedThreeTimesGoesOn) {
+  for (int call = 1; call <= 3; ++call) {
+    script.Answer("poll", call, EINTR);
+  }
+  EXPECT_EQ(Command(R"({"type":"resume","data":{}})"), 0);
+  EXPECT_EQ(script.CallCount("poll"), 5);
+}
+
+TEST_F(ControlTest, AFourthInterruptionFailsTheRead) {
+  for (int call = 1; call <= 4; ++call) {
+    script.Answer("poll", call, EINTR);
+  }
+  EXPECT_EQ(Exchange(""), -1);
+  EXPECT_THAT(Log(),
+              ElementsAre("Failed to read from domain socket, reason=Interrupted system call",
+                          "Receive command length failed"));
+}
+
+TEST_F(ControlTest, InterruptionsAreCountedOverAllPartsOfABody) {
+  for (int call = 2; call <= 8; call += 2) {  // the first is the length's, the odd ones read a part
+    script.Answer("poll", call, EINTR);
+  }
+  EXPECT_EQ(Exchange(Frame(5000, std::string(3 * 1024, ' '))), -1);
+  EXPECT_THAT(Log(),
+              ElementsAre("Failed to read from domain socket, reason=Interrupted system call",
+                          "Receive command body failed"));
+}
+
 TEST_F(ControlTest, AConnectionThatCannotBeAcceptedIsTold) {
   const ScopedFd client(Connect(""));
   script.Answer("accept4", 1, EMFILE);

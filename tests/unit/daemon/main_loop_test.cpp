@@ -41,6 +41,17 @@ class MainLoopTest : public DaemonFixture {
     daemon.LoopOnce();
   }
 
+  // A client that sends nothing.
+  static int Connect() {
+    const int client = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_un address = {};
+    address.sun_family = AF_UNIX;
+    strncpy(address.sun_path, SOCKET_PATH, sizeof(address.sun_path) - 1);
+    EXPECT_EQ(connect(client, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+    shutdown(client, SHUT_WR);
+    return client;
+  }
+
   bool IsReadable(int fd) {
     fd_set set;
     FD_ZERO(&set);
@@ -101,6 +112,7 @@ TEST_F(MainLoopTest, AFinishedThreadIsJoinedBeforeTheNextOneStarts) {
 }
 
 TEST_F(MainLoopTest, ARunningOrFullWorkerIsLeftAlone) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
   for (const int state : {WORKER_RUNNING, WORKER_OUT_OF_SPACE}) {
     daemon.workers["a"]->state = state;
     WriteQueue("a", "/x");
@@ -109,6 +121,7 @@ TEST_F(MainLoopTest, ARunningOrFullWorkerIsLeftAlone) {
   }
   daemon.workers["a"]->state = WORKER_IDLE;
   EXPECT_THAT(script.Calls(), IsEmpty());
+  EXPECT_THAT(Log(), IsEmpty());
 }
 
 TEST_F(MainLoopTest, OtherNamesAndOtherEventsStartNothing) {
@@ -159,13 +172,45 @@ TEST_F(MainLoopTest, AQuietIterationReapsFinishedThreadsAndEndsAPauseThatHasPass
   daemon.LoopOnce();
   AwaitFinished("a");
   daemon.resume_time = time(nullptr) - 1;
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
   script.Forget();
 
   QuietIteration();
 
   EXPECT_EQ(daemon.workers["a"]->state, WORKER_IDLE);
   EXPECT_EQ(daemon.resume_time, -1);
-  EXPECT_THAT(Log(), ElementsAre("In kill handler(15)", "SetPaused: false"));
+  EXPECT_THAT(Log(), ElementsAre("In kill handler(15)", "Worker[a] cancelled", "SetPaused: false"));
+}
+
+TEST_F(MainLoopTest, AQuietIterationLeavesARunningOrFullWorkerAlone) {
+  script.Run("pthread_timedjoin_np", EVERY_CALL, [] {});  // counted from now on
+  for (const int state : {WORKER_RUNNING, WORKER_OUT_OF_SPACE}) {
+    daemon.workers["a"]->state = state;
+    QuietIteration();
+    EXPECT_EQ(daemon.workers["a"]->state, state);
+  }
+  daemon.workers["a"]->state = WORKER_IDLE;
+  EXPECT_EQ(script.CallCount("pthread_timedjoin_np"), 0);
+}
+
+TEST_F(MainLoopTest, AWaitForAnythingReadableLastsTenSeconds) {
+  const ScopedFd client(Connect());
+  daemon.resume_time = 1;
+  script.Say("ppoll", "10.0", EINTR);
+
+  daemon.LoopOnce();
+
+  EXPECT_EQ(daemon.resume_time, -1);
+  EXPECT_TRUE(IsReadable(daemon.socket_fd));
+}
+
+TEST_F(MainLoopTest, TenClientsMayWaitToBeAccepted) {
+  Daemon other;
+  script.Say("listen", "10", EADDRINUSE);
+
+  EXPECT_FALSE(other.SetupDomainSocket());
+
+  close(other.socket_fd);
 }
 
 TEST_F(MainLoopTest, OnlyATimeThatHasPassedIsResumed) {
@@ -194,12 +239,7 @@ TEST_F(MainLoopTest, ABusyIterationDoesNoHousekeeping) {
 }
 
 TEST_F(MainLoopTest, AnExceptionWhileQueuesAreServedLeavesTheSocketForTheNextIteration) {
-  const ScopedFd client(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  sockaddr_un address = {};
-  address.sun_family = AF_UNIX;
-  strncpy(address.sun_path, SOCKET_PATH, sizeof(address.sun_path) - 1);
-  ASSERT_EQ(connect(client.fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
-  shutdown(client.fd, SHUT_WR);
+  const ScopedFd client(Connect());
   TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
   script.Run("WriteLog", 1, [] { throw 5; });  // "respawned"; anything may be thrown
   WriteQueue("a", "/x");

@@ -7,6 +7,9 @@
 
 #include <cerrno>
 #include <csignal>
+#include <cstdlib>
+#include <utility>
+#include <vector>
 
 #include "base/mutex_guard.h"
 #include "unit/daemon/daemon_fixture.h"
@@ -31,6 +34,12 @@ class StartupTest : public DaemonFixture {
 
   static void ArmSignal(int number) {
     script.Run("QLIBServiceStart", 1, [number] { raise(number); });
+  }
+
+  static bool HasHandler(int number, sighandler_t handler) {
+    struct sigaction now = {};
+    sigaction(number, nullptr, &now);
+    return now.sa_handler == handler;
   }
 
   static bool Exists(const char* path) { return access(path, F_OK) == 0; }
@@ -256,6 +265,84 @@ TEST_F(StartupTest, CleanUpInAPauseThatHoldsABatchLeavesTheRestInItsDrainedCopy)
   EXPECT_EQ(script.CallCount("DelFSDocument"), 1);
   EXPECT_TRUE(Exists((QueuePath("a") + ".tmp").c_str()));
   EXPECT_EQ(script.CountLines("Failed to wait thread"), 0U);
+}
+
+TEST_F(StartupTest, NumbersAreSeededOnceBeforeTheHandlersAreSet) {
+  script.Run("srand", 1, [] {
+    EXPECT_EQ(script.CallCount("daemon"), 1);
+    EXPECT_TRUE(HasHandler(SIGTERM, SIG_DFL));
+  });
+  const time_t before = time(nullptr);
+
+  daemon.Run();
+
+  EXPECT_EQ(script.CallCount("srand"), 1);
+  const int drawn = rand();
+  bool seeded_by_time = false;
+  for (time_t seed = before; seed <= time(nullptr); ++seed) {
+    srand(static_cast<unsigned>(seed));
+    seeded_by_time = seeded_by_time || rand() == drawn;
+  }
+  EXPECT_TRUE(seeded_by_time);
+}
+
+TEST_F(StartupTest, CleanUpClosesTheDescriptorsThenStopsTheWorkersByNameThenTheService) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  ASSERT_TRUE(daemon.SetupDomainSocket());
+  ASSERT_TRUE(daemon.SetupInotify());
+  ASSERT_TRUE(daemon.SetupWorkers());
+  daemon.RunWorkers();
+  AwaitFinished("a");
+  AwaitFinished("b");
+  script.Forget();
+  std::vector<std::pair<int, int>> at_joins;
+  for (const int call : {1, 2}) {
+    script.Run("pthread_timedjoin_np", call,
+               [&] { at_joins.emplace_back(daemon.socket_fd, daemon.inotify_fd); });
+  }
+  script.Run("QLIBServiceStop", 1, [] { FI_LOG("service"); });
+
+  daemon.CleanResource();
+
+  EXPECT_THAT(at_joins, ElementsAre(std::pair(-1, -1), std::pair(-1, -1)));
+  EXPECT_THAT(Log(), ElementsAre("Cleaning resource", "Worker[a] deleted", "Worker[a] cancelled",
+                                 "Worker[b] deleted", "Worker[b] cancelled", "service"));
+}
+
+TEST_F(StartupTest, CleanUpRestoresTheSignalsAndThenRemovesTheFilesOnceTheServiceHasStopped) {
+  close(creat(PID_PATH, 0600));
+  close(creat(SOCKET_PATH, 0600));
+  signal(SIGTERM, HandleKill);
+  signal(SIGINT, HandleKill);
+  signal(SIGPIPE, SIG_IGN);
+  script.Run("QLIBServiceStop", 1, [] {
+    EXPECT_TRUE(HasHandler(SIGTERM, HandleKill));
+    EXPECT_TRUE(HasHandler(SIGINT, HandleKill));
+    EXPECT_TRUE(HasHandler(SIGPIPE, SIG_IGN));
+    EXPECT_TRUE(Exists(PID_PATH));
+    EXPECT_TRUE(Exists(SOCKET_PATH));
+  });
+  std::vector<std::pair<bool, bool>> at_removals;
+  for (const int call : {1, 2}) {
+    script.Run("unlink", call, [&] {
+      EXPECT_TRUE(HasHandler(SIGTERM, SIG_DFL));
+      at_removals.emplace_back(Exists(PID_PATH), Exists(SOCKET_PATH));
+    });
+  }
+
+  EXPECT_EQ(daemon.CleanResource(), 0);
+
+  EXPECT_THAT(at_removals, ElementsAre(std::pair(true, true), std::pair(false, true)));
+  EXPECT_FALSE(Exists(SOCKET_PATH));
+}
+
+TEST_F(StartupTest, ARunEndsWithTheResultOfRemovingTheSocket) {
+  script.Say("unlink", PID_PATH, EBUSY);
+  EXPECT_EQ(daemon.Run(), 0);
+
+  script.Say("unlink", SOCKET_PATH, EBUSY);
+  script.Answer("daemon", EVERY_CALL, EAGAIN);
+  EXPECT_EQ(daemon.Run(), -1);
 }
 
 TEST_F(StartupTest, CleanUpRestoresTheSignals) {
