@@ -31,10 +31,47 @@ namespace {
   return builder.newStreamWriter();
 }
 
-// The reader lets two things through that it is told to refuse: comments inside an object or an
-// array, and a comma behind an empty key's value. Outside of strings neither a slash nor a comma
-// before a closing bracket has any place in JSON.
-bool HasCommentOrTrailingComma(const std::string& text) {
+size_t EndOfDigits(const std::string& text, size_t at) {
+  while (text[at] >= '0' && text[at] <= '9') {
+    ++at;
+  }
+  return at;
+}
+
+// Behind the number that begins there; npos where none does.
+size_t EndOfNumber(const std::string& text, size_t at) {
+  const size_t whole = at + (text[at] == '-' ? 1 : 0);
+  size_t end = EndOfDigits(text, whole);
+  if (end == whole || (text[whole] == '0' && end > whole + 1)) {
+    return std::string::npos;
+  }
+
+  if (text[end] == '.') {
+    const size_t fraction = end + 1;
+    end = EndOfDigits(text, fraction);
+    if (end == fraction) {
+      return std::string::npos;
+    }
+  }
+  if (text[end] == 'e' || text[end] == 'E') {
+    const size_t sign = end + 1;
+    const size_t exponent = sign + (text[sign] == '-' || text[sign] == '+' ? 1 : 0);
+    end = EndOfDigits(text, exponent);
+    if (end == exponent) {
+      return std::string::npos;
+    }
+  }
+  return end;
+}
+
+bool BeginsNumber(char byte) {
+  return (byte >= '0' && byte <= '9') || byte == '-' || byte == '+';
+}
+
+// The reader lets three things through that are no JSON: comments inside an object or an array, a
+// comma behind an empty key's value, and numbers that lack a part or have a zero or a plus in
+// front. Outside of strings neither a slash nor a comma before a closing bracket has any place.
+bool HasWhatTheReaderLetsThrough(const std::string& text) {
   bool in_string = false;
   bool after_comma = false;
   for (size_t i = 0; i < text.size(); ++i) {
@@ -46,6 +83,13 @@ bool HasCommentOrTrailingComma(const std::string& text) {
       return true;
     } else if (byte == '"') {
       in_string = true;
+      after_comma = false;
+    } else if (BeginsNumber(byte)) {
+      const size_t end = EndOfNumber(text, i);
+      if (end == std::string::npos) {
+        return true;
+      }
+      i = end - 1;
       after_comma = false;
     } else if (strchr(" \t\r\n", byte) == nullptr) {
       after_comma = byte == ',';
@@ -66,7 +110,7 @@ bool Value::fromString(const std::string& text) {
 
   try {
     ::Json::Value parsed;
-    if (HasCommentOrTrailingComma(text) ||
+    if (HasWhatTheReaderLetsThrough(text) ||
         !reader->parse(text.data(), text.data() + text.size(), &parsed, nullptr)) {
       return false;
     }
