@@ -8,10 +8,11 @@ void DeclareSearch(Declarer& declare) {
   Arguments& into = declare.arguments;
   CLI::App* search = declare.Add(&declare.app, "search", Search, "Search the index, best first",
                                  "--kind document --under /srv/projects 'annual -draft'");
-  // For the help alone: the words are taken out before, see SplitSearchArguments.
+  // For the help alone: the words are taken out before, see SplitSearchArguments. What comes here
+  // begins like an option, and the library takes it for none ("---x", "-- x").
   search
       ->add_option_function<std::vector<std::string>>(
-          "QUERY", [](const std::vector<std::string>&) {},
+          "QUERY", [](const std::vector<std::string>& given) { throw CLI::ExtrasError(given); },
           "What to find, see below; joined by a blank")
       ->type_name("");
   search->set_help_flag("--help", "Print this help message and exit");

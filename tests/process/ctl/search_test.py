@@ -137,6 +137,11 @@ class SearchTest(IndexTest):
             ("--nope", "beach"),
             ("--json", "-0", "beach"),
             ("--share",),
+            ("---x", "beach"),
+            ("--!x", "beach"),
+            ("-- x", "beach"),
+            ("--\n", "beach"),
+            ("---x beach",),
             ("size:<0", "beach"),
             ("size=10M", "beach"),
             ("beach", "name:(boys", "title:x)"),
@@ -148,6 +153,12 @@ class SearchTest(IndexTest):
         self.ctl("search", "--share", "nope", "beach", code=1)
         self.ctl("search", "--under", "/nowhere", "beach", code=1)
 
+    def test_an_option_that_is_none_is_named(self):
+        for option in ("--nope", "---x", "-- x"):
+            with self.subTest(option=option):
+                told = self.ctl("search", "beach", option, "--count", code=2).err.decode()
+                self.assertEqual(told, "fileindexctl: search: The following argument was not "
+                                       f"expected: {option}\n")
 
     def test_a_field_goes_for_all_in_the_brackets_behind_it(self):
         self.assertEqual(self.hits("name:(plan OR budget)"),
