@@ -72,6 +72,10 @@ bool TakesRange(QueryField field) {
   return field == F::NUMBER_FIELD || field == F::SIZE || field == F::MODIFIED || field == F::ADDED;
 }
 
+bool TakesList(QueryField field) {
+  return field == F::KIND || field == F::EXT || field == F::SHARE || field == F::OWNER;
+}
+
 const NamedField* FindField(std::string_view name) {
   for (const NamedField& field : FIELDS) {
     if (std::string_view(field.name).size() == name.size() &&

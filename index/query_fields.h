@@ -37,6 +37,8 @@ struct NamedField {
 
 // Whether its values are compared: numbers, sizes and times.
 bool TakesRange(QueryField field);
+// Whether it takes several values with commas between.
+bool TakesList(QueryField field);
 
 // Letter case does not count. Null: no such field.
 const NamedField* FindField(std::string_view name);

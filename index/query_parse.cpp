@@ -13,11 +13,13 @@
 //             | pattern                                of path
 //             | words                                  of text and of the text fields
 //             | range | circle                         see query_values.h
-//             | name { "," name }                      of kind, ext, owner, share
+//             | names { "," names }                    of kind, ext, owner, share
 //             | path | property | presence | stage     of under, is, has, content
+//   names     = word or quoted text: a name, or several with commas between
 //   pattern   = word or quoted text, with "*" for anything; in name: anywhere but at a word's end
 //               alone
 //
+// Behind a closing quote, or the "*" there, stands a blank, a ")", in a list a ",", or nothing.
 // AND, OR and NOT count in capitals only; alone they are words. What stands before a colon and is
 // no field belongs to the word, unless it can only be meant as one (query_slips.h). A word
 // without a letter or a digit ("++") is looked for as it stands, in the name.
@@ -51,13 +53,17 @@ class Parser {
   bool ReadNot(QueryNode& node, size_t length, int depth);
   bool ReadFieldGroup(const NamedField& field, QueryNode& node, int depth);
   bool ReadLeaf(QueryNode& node, int depth);
+  bool ReadValue(const NamedField* field, Value& value);
   bool ReadQuoted(Value& value);
-  void ReadBare(Value& value);
+  void ReadBare(Value& value, bool in_list);
+  bool ReadList(Value& value);
+  bool EndsQuotes();
   const NamedField* TakeField();
 
   void SkipBlanks();
   bool IsAt(std::string_view keyword) const;  // as a word of its own
   bool IsNegation() const;
+  bool IsAtQuote() const { return at < text.size() && text[at] == '"'; }
   bool Fail(const std::string& what, size_t where);
 
   const std::string& text;
@@ -270,10 +276,13 @@ bool Parser::ReadQuoted(Value& value) {
 }
 
 // A bracket that a word itself opened belongs to it: "copy(1).txt".
-void Parser::ReadBare(Value& value) {
+void Parser::ReadBare(Value& value, bool in_list) {
   value.at = at;
   int inside = 0;
   while (at < text.size() && !IsBlank(text[at])) {
+    if (in_list && text.compare(at, 2, ",\"") == 0) {
+      break;
+    }
     inside += text[at] == '(' ? 1 : 0;
     if (text[at] == ')' && --inside < 0) {
       if (open > 0) {
@@ -284,6 +293,43 @@ void Parser::ReadBare(Value& value) {
     ++at;
   }
   value.text = text.substr(value.at, at - value.at);
+}
+
+// Texts in quotes and others, with commas between, as one text without its quotes.
+bool Parser::ReadList(Value& value) {
+  value.at = at + (IsAtQuote() ? 1 : 0);
+  while (true) {
+    Value part;
+    if (!IsAtQuote()) {
+      ReadBare(part, true);
+    } else if (!ReadQuoted(part)) {
+      return false;
+    }
+    value.text += part.text;
+    value.has_star = part.has_star;
+    const bool goes_on = at < text.size() && text[at] == ',' && !value.has_star;
+    if (!goes_on) {
+      return !part.is_quoted || EndsQuotes();
+    }
+    value.text += ',';
+    ++at;
+  }
+}
+
+bool Parser::EndsQuotes() {
+  return at == text.size() || IsBlank(text[at]) || text[at] == ')' ||
+         Fail("a blank is missing behind what stands in quotes", at);
+}
+
+bool Parser::ReadValue(const NamedField* field, Value& value) {
+  if (field != nullptr && TakesList(field->field)) {
+    return ReadList(value);
+  }
+  if (IsAtQuote()) {
+    return ReadQuoted(value) && EndsQuotes();
+  }
+  ReadBare(value, false);
+  return true;
 }
 
 bool Parser::ReadLeaf(QueryNode& node, int depth) {
@@ -306,18 +352,14 @@ bool Parser::ReadLeaf(QueryNode& node, int depth) {
       return Fail(why, start);
     }
   }
-  Value value;
-  if (at < text.size() && text[at] == '"') {
-    if (!ReadQuoted(value)) {
-      return false;
-    }
-  } else {
-    ReadBare(value);
-  }
   node.start = start;
-  node.end = at;
   node.shared_field = shared == nullptr ? nullptr : shared->name;
   field = field == nullptr ? shared : field;
+  Value value;
+  if (!ReadValue(field, value)) {
+    return false;
+  }
+  node.end = at;
   return field == nullptr ? FillWords(value, node, error)
                           : FillField(*field, value, now, node, error);
 }

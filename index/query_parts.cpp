@@ -309,8 +309,7 @@ bool FillField(const NamedField& field, const Value& value, time_t now, QueryNod
   const bool has_words = field.field == QueryField::NAME || field.field == QueryField::PATH ||
                          field.field == QueryField::TEXT || field.field == QueryField::TEXT_FIELD;
   if (value.has_star && !has_words) {
-    return Fail(error, std::string(field.name) + ": takes no '*'",
-                value.at + value.text.size() + 1);
+    return Fail(error, std::string(field.name) + ": takes no '*'", node.end - 1);
   }
   node.field = field.content;
   switch (field.field) {

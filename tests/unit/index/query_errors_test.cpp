@@ -37,6 +37,7 @@ TEST_F(QueryErrorsTest, AreLinesForPeople) {
       {"foo:>3",
        "there is no field 'foo' (a word with a colon stands in quotes) (character 1, at: foo:>3)"},
       {"", "nothing to search for"},
+      {"name:\"report\"x", "a blank is missing behind what stands in quotes (character 14, at: x)"},
       {"a size:<0", "no such number is below 0 (character 8, at: <0)"},
       {"rating:>5", "a rating goes from 0 to 5 (character 8, at: >5)"},
       {"pages:>9223372036854775807",

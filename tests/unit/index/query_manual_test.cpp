@@ -213,7 +213,7 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
 
 TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
   for (const char* text :
-       {"-draft", "OR a", "inv*ce", "sise:1G", "undr:/srv", "size>1G", "ext=pdf",
+       {"-draft", "OR a", "\"moby dick\"s", "inv*ce", "sise:1G", "undr:/srv", "size>1G", "ext=pdf",
         "name:(a title:b)", "size: 1G", "share:data", "under:/srv/data/projects", "size:<0",
         "rating:>5", "modified:2024-06..2024-01", "near:52.5,13.4,0"}) {
     const Names hits = Hits(text);
@@ -237,7 +237,7 @@ TEST_F(QueryManualTest, WhatItSaysIsTheSameIsTheSame) {
            {"size:2G..", "size:>=2G", "size:>=2048M", "size:2G..1P"},
            {"duration:200", "duration:200s", "duration:3m20s"},
            {"bitrate:>=320K", "bitrate:320000.."},
-           {"ext:gz", "ext:tar.gz", "ext:.GZ"},
+           {"ext:gz", "ext:tar.gz", "ext:.GZ", "ext:\"tar.gz\",zip"},
            {"kind:photo", "Kind:PHOTO"},
            {"has:artist", "HAS:Artist"},
            {"near:48.8584,2.2945,500m", "near:48.8584,2.2945,500", "near:48.8584,2.2945,0.5km"},

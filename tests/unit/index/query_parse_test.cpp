@@ -16,7 +16,7 @@ TEST_F(QueryParseTest, WordsPhrasesAndBeginnings) {
       {"++*", "name:*++*"},
       {"\"annual report\"", "\"annual report\""},
       {"\"annual rep\"*", "\"annual rep\"*"},
-      {"\"a b\"c", "(\"a b\" c)"},
+      {"(\"a b\")", "\"a b\""},
       {"a\"b", "a\"b"},
       {"copy(1).txt", "copy(1).txt"},
       {"smile:)", "smile:)"},
@@ -104,6 +104,20 @@ TEST_F(QueryParseTest, WhatIsWrongInBracketsBehindAFieldIsShown) {
       {"name:(\"a/b\")", "?8"},   {"name:(*)", "?6"},
       {"title:(a ++)", "?9"},     {"kind:(film)", "?6"},
       {"size:(1X)", "?6"},        {"name:(a) )", "?9"},
+  });
+}
+
+TEST_F(QueryParseTest, SeveralValuesMayStandInQuotes) {
+  ExpectAll({
+      {"share:\"data\",\"dup\" one", "(share:data,dup one)"},
+      {"share:\"we ird:e\",data", "share:we ird:e,data"},
+      {"share:data,\"we ird:e\" x", "(share:data,we ird:e x)"},
+      {"share:\"a,b\",c", "share:a,b,c"},
+      {"kind:\"document\",\"photo\"", "kind:document,photo"},
+      {"kind:document,\"photo\",video", "kind:document,photo,video"},
+      {"ext:\"txt\",\"gz\"", "ext:txt,gz"},
+      {"ext:(\"txt\",gz OR pdf,\"jpg\")", "(ext:txt,gz OR ext:pdf,jpg)"},
+      {"owner:\"0\",\"1\"", "owner:0,1"},
   });
 }
 

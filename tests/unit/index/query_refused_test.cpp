@@ -32,6 +32,33 @@ namespace fileindexd {
 
 class QueryRefusedTest : public QueryParseTest {};
 
+// It would go unseen, as a word of its own or as nothing.
+TEST_F(QueryRefusedTest, NothingIsGluedToQuotes) {
+  ExpectAll({
+      {"\"a b\"c", "?5"},
+      {"\"a\"\"b\"", "?3"},
+      {"\"a\"*b", "?4"},
+      {"\"a\"**", "?4"},
+      {"\"a\"(b)", "?3"},
+      {"\"a\",\"b\"", "?3"},
+      {"x -\"a\"-b", "?6"},
+      {"name:\"report\"x", "?13"},
+      {"title:(\"a\"b)", "?10"},
+      {"under:\"/a\"/b", "?10"},
+      {"size:\"1M\"..2M", "?9"},
+      {"is:\"file\",\"link\"", "?9"},
+      {"kind:\"document\"x", "?15"},
+      {"kind:\"document\",", "?6"},
+      {"kind:\"document\",,photo", "?6"},
+      {"kind:\"document\",\"", "?16"},
+      {"kind:\"document\",\"film\"", "?6"},
+      {"kind:photo,\"document\"*", "?21"},
+      {"share:\"a\"b", "?9"},
+      {"share:\"a\",\"\"", "?7"},
+      {"\"a\")", "?3"},
+  });
+}
+
 TEST_F(QueryRefusedTest, SenselessQuestionsSayWhere) {
   ExpectAll({
       {"", "?0"},
