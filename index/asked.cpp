@@ -44,6 +44,29 @@ void AddOptions(const Question& question, size_t end, QueryNode& tree) {
   }
 }
 
+// Where the character begins that is at `at` of ToUtf8(bytes).
+size_t ByteOf(std::string_view bytes, size_t at) {
+  size_t byte = 0;
+  for (size_t done = 0; done < at && byte < bytes.size();) {
+    const size_t length = FirstCharacter(bytes.substr(byte)).length;
+    done += ToUtf8(bytes.substr(byte, length)).size();
+    byte += length;
+  }
+  return byte;
+}
+
+// A path is its bytes, and they need not be UTF-8: they are taken from the question as it came.
+void TakePaths(const std::string& bytes, QueryNode& node) {
+  for (QueryNode& below : node.below) {
+    TakePaths(bytes, below);
+  }
+  if (node.part == Part::UNDER) {
+    const size_t start = ByteOf(bytes, node.text_at);
+    const size_t end = ByteOf(bytes, node.text_at + node.text.size());
+    node.names = {NormalPath(bytes.substr(start, end - start)).value_or(node.names.front())};
+  }
+}
+
 void ReadLeaves(const QueryNode& node, bool is_positive, const NameTokenizer& tokenizer,
                 NameFolder& folder, Asked& asked) {
   for (const QueryNode& below : node.below) {
@@ -101,6 +124,9 @@ bool Asked::Read(const Question& question, NameMarker& names, std::string& error
   if (!ParseQuery(text, time(nullptr), tree, wrong)) {
     error = wrong.Line(text);
     return false;
+  }
+  if (text != question.text) {
+    TakePaths(question.text, tree);
   }
   if (!names.Open()) {
     error = "out of memory";

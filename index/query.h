@@ -62,7 +62,7 @@ struct QueryNode {
   const char* shared_field = nullptr;  // in front of the brackets that it stands in; null: none
   std::vector<QueryNode> below;        // AND, OR: two at least
 
-  // WORD, EXACT_NAME
+  // WORD, EXACT_NAME, UNDER
   std::string text;
   size_t text_at = 0;  // where it stands in the question
   Scope scope = Scope::ANY;

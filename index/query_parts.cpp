@@ -221,6 +221,8 @@ bool FillUnder(const Value& value, QueryNode& node, QueryError& error) {
     return Fail(error, Cited(value.text) + " is not a plain absolute path", value.at);
   }
   node.part = Part::UNDER;
+  node.text = value.text;
+  node.text_at = value.at;
   node.names = {*path};
   return true;
 }

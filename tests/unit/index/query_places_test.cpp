@@ -112,6 +112,26 @@ TEST_F(QueryPlacesTest, FoldersOfAShareWithoutAnIndexYetAreKnownByTheDisk) {
   EXPECT_FALSE(is_refused({}, "/no/such")) << "where nobody is asked, nobody can tell";
 }
 
+// Text that is not UTF-8 is shown and looked for in another form. A path is its bytes.
+TEST_F(QueryPlacesTest, PathsMayHoldAnyByte) {
+  const std::string name = "bad\xff\xfe name";
+  for (const std::string& each : {name, std::string("bad\xff\xfd name"), std::string("plain")}) {
+    MakeFolder(At(each));
+    WriteFile(At(each + "/whale.txt"), "");
+    Add(each);
+    Add(each + "/whale.txt");
+  }
+  Commit();
+
+  const Names hit = {At(name + "/whale.txt")};
+  const std::string written = "under:\"" + At(name) + "\"";
+  EXPECT_EQ(PathsIn({"s"}, "whale " + written), hit);
+  EXPECT_EQ(PathsIn({"s"}, "(x\xff\xe2\x82 OR wh\u00e4le* OR whale) " + written + " ext:txt"), hit);
+  EXPECT_EQ(PathsIn({"s"}, "whale under:" + At("plain")), Names({At("plain/whale.txt")}));
+  EXPECT_EQ(PathsIn({"s"}, "whale under:\"" + At("bad\ufffd\ufffd name") + "\"")[0].substr(0, 6),
+            "error:");
+}
+
 TEST_F(QueryPlacesTest, FolderOfAnEmptyShareIsKnown) {
   AddAll();
 
