@@ -6,12 +6,12 @@
 #include <algorithm>
 #include <deque>
 #include <iterator>
-#include <set>
 #include <utility>
 
 #include "index/asked.h"
 #include "index/asked_share.h"
 #include "index/entry_table.h"
+#include "index/query_reach.h"
 #include "index/side_by_side.h"
 #include "index/suggestion.h"
 #include "state/layout.h"
@@ -59,6 +59,18 @@ bool IsDirectory(const std::string& path) {
   return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
+bool ReadQuestion(const Question& question, NameMarker& names, Asked& asked, std::string& error) {
+  if (!asked.Read(question, names, error)) {
+    return false;
+  }
+  const QueryNode* unknown = UnknownShare(asked.tree, question);
+  if (unknown != nullptr) {
+    error = QueryError{"there is no such share", unknown->start}.Line(asked.text);
+    return false;
+  }
+  return true;
+}
+
 // A share without an index yet knows no more than what lies on its disk.
 bool Knows(const AskedShare& share, const Question& question, const std::string& path) {
   if (share.run != nullptr && HoldsAny(share.reader.database.db, path)) {
@@ -70,13 +82,28 @@ bool Knows(const AskedShare& share, const Question& question, const std::string&
           (!share.has_index && Covers(root->second, path) && IsDirectory(path)));
 }
 
+// A share that the question rules out was not asked: what may lie in it is taken for known.
+bool IsKnown(const std::string& path, const Question& question,
+             const std::deque<AskedShare>& shares) {
+  if (std::any_of(shares.begin(), shares.end(),
+                  [&](const AskedShare& share) { return Knows(share, question, path); })) {
+    return true;
+  }
+  return std::any_of(question.shares.begin(), question.shares.end(), [&](const std::string& name) {
+    const bool is_asked =
+        std::any_of(shares.begin(), shares.end(),
+                    [&name](const AskedShare& share) { return share.name == name; });
+    const auto root = question.roots.find(name);
+    return !is_asked && (root == question.roots.end() || Covers(path, root->second) ||
+                         Covers(root->second, path));
+  });
+}
+
 // A folder in the question's text of which the shares know nothing: null, or the first of them.
 const QueryNode* UnknownFolder(const QueryNode& node, const Question& question,
                                const std::deque<AskedShare>& shares) {
   const bool is_written = node.part == Part::UNDER && node.end > node.start;
-  if (is_written && std::none_of(shares.begin(), shares.end(), [&](const AskedShare& share) {
-        return Knows(share, question, node.names.front());
-      })) {
+  if (is_written && !IsKnown(node.names.front(), question, shares)) {
     return &node;
   }
   for (size_t i = 0; i < node.below.size() && node.part != Part::NOT; ++i) {
@@ -97,14 +124,13 @@ struct Asker::Impl {
   SideBySide side_by_side;
   bool AskAll(const Question& question, Answer& answer, std::string& error);
   bool HasHits(Question question, const std::string& text);
-  void Choose(const Question& question);
+  void Choose(const std::vector<std::string>& wanted);
   Answer Gather(const HitOrder& order, uint64_t offset, uint64_t wanted);
   void Complete(std::vector<Hit>& hits);
 };
 
-// Shares that are not asked this time are closed.
-void Asker::Impl::Choose(const Question& question) {
-  const std::set<std::string> wanted(question.shares.begin(), question.shares.end());
+// In order. Shares that are not asked this time are closed.
+void Asker::Impl::Choose(const std::vector<std::string>& wanted) {
   const bool same = std::equal(
       shares.begin(), shares.end(), wanted.begin(), wanted.end(),
       [](const AskedShare& share, const std::string& name) { return share.name == name; });
@@ -163,12 +189,7 @@ Answer Asker::Impl::Gather(const HitOrder& order, uint64_t offset, uint64_t want
 
 bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& error) {
   Asked asked;
-  if (!asked.Read(question, names, error)) {
-    return false;
-  }
-  const QueryNode* unknown = UnknownShare(asked.tree, question);
-  if (unknown != nullptr) {
-    error = QueryError{"there is no such share", unknown->start}.Line(asked.text);
+  if (!ReadQuestion(question, names, asked, error)) {
     return false;
   }
 
@@ -176,7 +197,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   const uint64_t limit = std::min(question.limit, MOST_HITS);
   const uint64_t wanted = limit == 0 ? 0 : offset + limit;
   const HitOrder order = {question.sort, question.reverse};
-  Choose(question);
+  Choose(ReachedShares(asked.tree, question));
   // A slow share holds up no other.
   side_by_side.Run(shares.size(), [&](size_t i) { shares[i].Ask(question, asked, order, wanted); });
 
@@ -184,9 +205,9 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   if (question.shows) {
     Complete(made.hits);
   }
-  const QueryNode* folder = made.total == 0 && made.failures.empty() && !shares.empty()
-                                ? UnknownFolder(asked.tree, question, shares)
-                                : nullptr;
+  const bool is_empty = made.total == 0 && made.failures.empty();
+  const QueryNode* folder =
+      is_empty && !question.shares.empty() ? UnknownFolder(asked.tree, question, shares) : nullptr;
   if (folder != nullptr) {
     for (AskedShare& share : shares) {
       share.Release();

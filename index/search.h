@@ -64,7 +64,7 @@ struct Answer {
   std::string word_like_field;  // without either: the first word like "type:pdf"
 };
 
-// False when the question makes no sense, and `error` then says why and where, in one line. Shares
+// False when the question makes no sense, and `error` then says why. The shares that it reaches
 // are asked side by side, each in one state of it; one that does not answer in time is among the
 // failures.
 bool Ask(const Question& question, Answer& answer, std::string& error);

@@ -112,6 +112,40 @@ TEST_F(QueryPlacesTest, FoldersOfAShareWithoutAnIndexYetAreKnownByTheDisk) {
   EXPECT_FALSE(is_refused({}, "/no/such")) << "where nobody is asked, nobody can tell";
 }
 
+TEST_F(QueryPlacesTest, SharesThatTheQuestionRulesOutAreNotAsked) {
+  Store({{"whale.txt", TextContent("x")}});
+  std::string error;
+  ASSERT_TRUE(MakeShareFolder("fresh", error)) << error;
+  MakeFolder(IndexPath("fresh"));  // nothing in it: whoever asks this share fails
+  const std::string here = "under:" + root;
+  const std::string there = "under:" + fresh;
+
+  for (const std::string& text :
+       {std::string("share:s whale"), std::string("whale -share:fresh"), "whale " + here,
+        "(share:s OR " + here + ") whale", "whale -(share:fresh OR " + there + ")",
+        "(whale share:s) OR (whale share:fresh " + here + ")"}) {
+    EXPECT_EQ(PathsIn({"s", "fresh"}, text), Names({At("whale.txt")})) << text;
+    EXPECT_EQ(answer.failures, Names()) << text;
+  }
+  for (const std::string& text :
+       {std::string("whale"), std::string("whale share:s,fresh"), std::string("whale OR share:s"),
+        "whale under:" + folder, "whale OR " + here, "whale -" + there + "/new",
+        std::string("whale -(share:fresh x)")}) {
+    EXPECT_EQ(PathsIn({"s", "fresh"}, text), Names({At("whale.txt")})) << text;
+    EXPECT_EQ(answer.failures.size(), 1U) << text;
+  }
+  question.roots.clear();
+  EXPECT_EQ(PathsIn({"s", "fresh"}, "whale " + here), Names({At("whale.txt")}));
+  EXPECT_EQ(answer.failures.size(), 1U) << "nobody knows where it lies";
+}
+
+TEST_F(QueryPlacesTest, FolderOfAShareThatIsRuledOutIsNoUnknownOne) {
+  Store({{"whale.txt", TextContent("x")}});
+
+  EXPECT_EQ(PathsIn({"s", "fresh"}, "share:fresh under:" + root), Names());
+  EXPECT_EQ(PathsIn({"s", "fresh"}, "share:fresh under:/no/such")[0].substr(0, 6), "error:");
+}
+
 // Text that is not UTF-8 is shown and looked for in another form. A path is its bytes.
 TEST_F(QueryPlacesTest, PathsMayHoldAnyByte) {
   const std::string name = "bad\xff\xfe name";
