@@ -171,15 +171,20 @@ int Search(const Arguments& arguments) {
   if (!session.Open() || !ChooseShares(session, arguments, question)) {
     return EXIT_FAILED;
   }
+  std::string error;
   if (arguments.wait) {
-    const int code = AwaitChanges(session, question.shares, patience);
+    // What makes no sense now will not do so later.
+    std::vector<std::string> reached;
+    if (!Understand(question, reached, error)) {
+      return Fail(EXIT_USAGE, "search: %s", error.c_str());
+    }
+    const int code = AwaitChanges(session, reached, patience);
     if (code != EXIT_DONE) {
       return code;
     }
   }
 
   Answer answer;
-  std::string error;
   if (!Ask(question, answer, error)) {
     return Fail(EXIT_USAGE, "search: %s", error.c_str());
   }

@@ -231,6 +231,16 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   return true;
 }
 
+bool Understand(const Question& question, std::vector<std::string>& reached, std::string& error) {
+  NameMarker names;
+  Asked asked;
+  if (!ReadQuestion(question, names, asked, error)) {
+    return false;
+  }
+  reached = ReachedShares(asked.tree, question);
+  return true;
+}
+
 Asker::Asker() : impl(std::make_unique<Impl>()) {}
 
 Asker::~Asker() = default;

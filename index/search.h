@@ -64,6 +64,11 @@ struct Answer {
   std::string word_like_field;  // without either: the first word like "type:pdf"
 };
 
+// False when the question makes no sense as far as its text tells, and `error` then says why and
+// where, in one line. No share is asked. `reached`: those of the question's that it does not rule
+// out.
+bool Understand(const Question& question, std::vector<std::string>& reached, std::string& error);
+
 // False when the question makes no sense, and `error` then says why. The shares that it reaches
 // are asked side by side, each in one state of it; one that does not answer in time is among the
 // failures.

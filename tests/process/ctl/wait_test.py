@@ -132,6 +132,25 @@ class WaitTest(IndexTest):
 
         self.assertEqual(service.requests[0], {"type": "sync", "shares": ["alpha"]})
 
+    def test_shares_that_the_question_rules_out_are_not_waited_for(self):
+        for share in ("alpha", "beta"):
+            self.make_share(share)
+        self.start()
+        for share in ("alpha", "beta"):
+            self.await_drained(share)
+        with self.service() as service:
+            for words in ("share:beta nothing", f"nothing under:{namespace.DATA}/beta",
+                          "nothing -share:alpha"):
+                self.ctl("search", "--wait", words)
+
+        self.assertEqual([request["shares"] for request in service.requests], [["beta"]] * 3)
+
+    def test_question_that_makes_no_sense_is_refused_at_once(self):
+        self.make_share()
+        for words in ("size:x", "share:nope x", "x OR"):
+            with self.subTest(words=words):  # no service runs that it could wait for
+                self.assertIn(b"character", self.ctl("search", "--wait", words, code=2).err)
+
     def test_waits_as_long_as_the_lines_do(self):
         root = self.make_share()
         self.start()
