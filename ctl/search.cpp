@@ -196,7 +196,7 @@ int Search(const Arguments& arguments) {
     TellOfMore(USUAL_HITS, screen);
   } else if (answer.total == 0 && answer.failures.empty() &&
              (question.limit > 0 || question.count_all)) {
-    TellNothingFound(answer, screen);
+    TellNothingFound(question, answer, screen);
   }
   if (!arguments.json) {
     TellOfWords(*session.settings, answer, screen);

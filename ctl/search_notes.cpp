@@ -24,7 +24,14 @@ void PutNote(const std::string& note, const std::optional<Screen>& screen) {
 
 }  // namespace
 
-void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen) {
+void TellNothingFound(const Question& question, const Answer& answer,
+                      const std::optional<Screen>& screen) {
+  if (!answer.knows_under) {
+    PutNote("No share that is asked knows the folder " +
+                (screen.has_value() ? Printable(question.under) : OneLine(question.under)),
+            screen);
+    return;
+  }
   if (!answer.suggestion.empty()) {
     PutNote("Did you mean: " + Printable(answer.suggestion), screen);
     return;

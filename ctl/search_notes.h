@@ -11,9 +11,10 @@
 
 namespace fileindexd {
 
-// Of a question without any hit: one that has some, or what in it is no field. People are told at
-// least that there is none.
-void TellNothingFound(const Answer& answer, const std::optional<Screen>& screen);
+// Of a question without any hit: a folder that is not there, a question that has some, or what in
+// it is no field. People are told at least that there is none.
+void TellNothingFound(const Question& question, const Answer& answer,
+                      const std::optional<Screen>& screen);
 
 // Shares whose words are not yet those of the language that is wanted.
 void TellOfWords(const Settings& settings, const Answer& answer,

@@ -208,6 +208,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   const bool is_empty = made.total == 0 && made.failures.empty();
   const QueryNode* folder =
       is_empty && !question.shares.empty() ? UnknownFolder(asked.tree, question, shares) : nullptr;
+  made.knows_under =
+      !is_empty || question.under.empty() || IsKnown(question.under, question, shares);
   if (folder != nullptr) {
     for (AskedShare& share : shares) {
       share.Release();

@@ -160,6 +160,18 @@ class SearchTest(IndexTest):
                 self.assertEqual(told, "fileindexctl: search: The following argument was not "
                                        f"expected: {option}\n")
 
+    def test_a_folder_that_is_not_there_is_told(self):
+        for words in (("beach",), ("beach", "--count"), ("is:folder",)):
+            with self.subTest(words=words):
+                told = self.try_ctl("search", "--under", f"{self.root}/ofice", *words)
+                self.assertEqual(told.code, 0)
+                self.assertEqual(told.err.decode(),
+                                 f"No share that is asked knows the folder {self.root}/ofice\n")
+        for words in (("--limit", "0", "beach"), ("nowhere", "--under", f"{self.root}/office"),
+                      ("nowhere", "--under", namespace.DATA), ("--under", self.root, "nowhere")):
+            with self.subTest(words=words):
+                self.assertEqual(self.ctl("search", *words).err, b"")
+
     def test_a_field_goes_for_all_in_the_brackets_behind_it(self):
         self.assertEqual(self.hits("name:(plan OR budget)"),
                          ["alpha/holiday/plan.txt", "alpha/office/budget.xyz"])

@@ -81,6 +81,12 @@ TEST_F(QueryPlacesTest, FoldersThatNoShareKnowsAreRefused) {
   EXPECT_EQ(Hits("whale OR under:/no/such"), Names({"whale.txt"}));
   question.under = "/no/such";
   EXPECT_EQ(Hits("whale"), Names()) << "an option is its caller's matter";
+  EXPECT_FALSE(answer.knows_under);
+  for (const std::string& known : {root, folder}) {
+    question.under = known;
+    EXPECT_EQ(Hits("none"), Names());
+    EXPECT_TRUE(answer.knows_under) << known;
+  }
 }
 
 // What a share will hold that was never indexed is known by the disk alone.
