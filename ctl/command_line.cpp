@@ -12,6 +12,35 @@ namespace fileindexd {
 
 namespace {
 
+const CLI::App& Innermost(const CLI::App& app) {
+  const CLI::App* inner = &app;
+  while (!inner->get_subcommands().empty()) {
+    inner = inner->get_subcommands().front();
+  }
+  return *inner;
+}
+
+// Of "--share=" the library takes the next argument, whatever it is, and of "--count=0" a number.
+void CheckAssigned(const CLI::App& command, const std::vector<std::string>& line) {
+  for (size_t i = 0; i < line.size() && line[i] != "--"; ++i) {
+    const size_t equals = line[i].find('=');
+    const std::string name = line[i].substr(0, equals);
+    const CLI::Option* option =
+        name.starts_with("--") ? command.get_option_no_throw(name) : nullptr;
+    if (option == nullptr) {
+      continue;
+    }
+    const bool takes_value = option->get_items_expected_max() > 0;
+    if (equals == std::string::npos) {
+      i += takes_value ? 1 : 0;
+    } else if (!takes_value) {
+      throw CLI::ValidationError(name, "takes no value");
+    } else if (equals + 1 == line[i].size()) {
+      throw CLI::ValidationError(name, "must not be empty");
+    }
+  }
+}
+
 // What is wrong, with the commands that were recognised in front: "folder add: PATH is required".
 std::string Complaint(const CLI::App& app, const CLI::Error& error) {
   std::string name;
@@ -76,8 +105,9 @@ Command ParseCommandLine(const std::vector<std::string>& given, Arguments& argum
   }
 
   try {
-    std::reverse(line.begin(), line.end());  // as parse() takes them
-    app.parse(line);
+    std::vector<std::string> backwards(line.rbegin(), line.rend());  // as parse() takes them
+    app.parse(backwards);
+    CheckAssigned(Innermost(app), line);
   } catch (const CLI::CallForHelp& help) {
     std::ostringstream text;
     (void)app.exit(help, text, text);

@@ -160,6 +160,30 @@ class SearchTest(IndexTest):
                 self.assertEqual(told, "fileindexctl: search: The following argument was not "
                                        f"expected: {option}\n")
 
+    def test_an_option_with_an_equals_sign_takes_what_stands_behind_that(self):
+        for line in (
+            ("search", "--share=", "beach", "--count"),
+            ("search", "--share", "", "beach", "--count"),
+            ("search", "--limit=", "beach", "--count"),
+            ("stats", "--share=", "--json"),
+            ("info", self.root, "--query", "", "--json"),
+            ("event", "alpha", "8", self.root, "--data=", "{}"),
+            ("search", "--count=3", "beach"),
+            ("search", "--count=0", "beach"),
+            ("search", "--count=true", "beach"),
+            ("search", "--reverse=false", "beach"),
+            ("search", "--json=", "beach"),
+            ("search", "--json=false", "beach"),
+            ("folder", "list", "--json=false"),
+        ):
+            with self.subTest(line=line):
+                told = self.ctl(*line, code=2)
+                self.assertEqual(told.out, b"")
+                self.assertRegex(told.err.decode(), r"^fileindexctl: [a-z ]+: --[a-z]+: [a-z ]+\n$")
+        self.ctl("folder", "set", self.root, "--exclude", "--share=", "--exclude=--count=3")
+        self.assertEqual(self.ctl("folder", "list", "--json").json()[0]["excludes"],
+                         ["--share=", "--count=3"])
+
     def test_a_folder_that_is_not_there_is_told(self):
         for words in (("beach",), ("beach", "--count"), ("is:folder",)):
             with self.subTest(words=words):
