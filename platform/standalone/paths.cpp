@@ -172,8 +172,11 @@ bool CanFullPathBeIndexed(const std::string& path) {
     if (share == nullptr || share->path == normal) {
       return share != nullptr;
     }
-    // What is not covered was judged by its name alone.
-    return verdict == Verdict::BELONGS ? !glance.look.mount_root : IsMountPoint(normal) == 0;
+    if (verdict == Verdict::NOT_COVERED) {
+      return IsMountPoint(normal) == 0;  // it was judged by its name alone
+    }
+    // A file that is mounted over another is an entry like any: nothing lies below it.
+    return glance.thing != Thing::DIRECTORY || !glance.look.mount_root;
   });
 }
 

@@ -45,6 +45,25 @@ class Mounts(FilesystemTest):
 
         self.check()
 
+    def test_flags_of_a_bound_file_follow_a_reindex_and_a_repair(self):
+        self.make_files(self.root, "target.txt")
+        self.bind("a.txt", "target.txt")
+        self.begin()
+        target = f"{self.root}/target.txt"
+        for wanted, mend in (
+            (True, lambda: self.event(REINDEX, "target.txt")),
+            (False, lambda: self.ctl("verify", "alpha", "--repair")),
+        ):
+            self.kill(self.daemon_pid())
+            self.ctl("folder", "set", self.root, f"--document={'on' if wanted else 'off'}")
+            os.unlink(self.queue("alpha"))  # so that nothing tells of it
+            self.start()
+
+            mend()
+            self.await_drained("alpha")
+
+            self.assertEqual(self.flags()[target], wanted)
+
     def test_events_below_a_mount_add_nothing(self):
         self.mount_tmpfs("in/point")
         self.begin()

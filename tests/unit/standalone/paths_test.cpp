@@ -64,6 +64,20 @@ TEST_F(PathsTest, SettingsSeenBeforeADrainAreNotBelievedAfterIt) {
   }
 }
 
+// Below a directory lies another file system; below a file nothing does.
+TEST_F(PathsTest, OfMountPointsOnlyDirectoriesAreNoOrdinaryEntries) {
+  MakeFile(root + "/d/bound");
+  MakeFolder(root + "/d/mounted");
+  EXPECT_TRUE(TALO::FILEINDEX::CanFullPathBeIndexed(root + "/d/mounted"));
+  Bind(root + "/d/f", root + "/d/bound");
+  MountTmpfs(root + "/d/mounted");
+
+  EXPECT_TRUE(TALO::FILEINDEX::CanFullPathBeIndexed(root + "/d/bound"));
+  EXPECT_TRUE(TALO::FILEINDEX::CanFullPathBeIndexed(root + "/d/f"));
+  EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));  // forgets what was seen
+  EXPECT_FALSE(TALO::FILEINDEX::CanFullPathBeIndexed(root + "/d/mounted"));
+}
+
 TEST_F(PathsTest, ALinkIsNoQueueFile) {
   fs::create_symlink(root + "/d/f", QueuePath("s"));
   EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
