@@ -70,7 +70,7 @@ struct FolderView {
   std::string path;
   uint64_t mount_id = 0;
   uint64_t device = 0;
-  int64_t seen_time = 0;  // nanoseconds, monotonic; 0: never
+  int64_t seen_time = 0;  // nanoseconds, monotonic, after the look; 0: never
 };
 
 // Looks at a path and judges it. Three system calls for an ordinary file.

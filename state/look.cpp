@@ -165,9 +165,8 @@ Look LookOnDisk(const Settings& settings, const std::string& normal) {
 
 // True when `path` is a folder in the share's own mount and device, with no link on the way.
 bool SeeFolder(const std::string& root_path, const std::string& path, FolderView& folder) {
-  const int64_t begin = Now();
   if (folder.path == path && folder.root == root_path &&
-      begin - folder.seen_time < FOLDER_KEPT_NS) {
+      Now() - folder.seen_time < FOLDER_KEPT_NS) {
     return true;
   }
 
@@ -179,7 +178,7 @@ bool SeeFolder(const std::string& root_path, const std::string& path, FolderView
       makedev(st.stx_dev_major, st.stx_dev_minor) != root->device) {
     return false;
   }
-  folder = {root_path, path, root->mount_id, root->device, begin};
+  folder = {root_path, path, root->mount_id, root->device, Now()};
   return true;
 }
 

@@ -22,11 +22,12 @@ constexpr int64_t GLANCE_NS = 5'000'000;
 
 // One operation on a document asks several questions about its path in a row, and then writes down
 // what is there. All that is taken from one look, which is not kept for longer than such a row
-// takes. It was made after the queue was drained, and so shows every change that led to the
-// operation; whatever changes later has its own event, in a later drain.
+// takes, however long the look itself took. It was made after the queue was drained, and so shows
+// every change that led to the operation; whatever changes later has its own event, in a later
+// drain.
 struct Glance {
   std::string path;
-  int64_t time = 0;                          // monotonic
+  int64_t time = 0;                          // monotonic, after the look
   std::shared_ptr<const Settings> settings;  // null: none
   Look look;
   Thing thing = Thing::NONE;
@@ -36,7 +37,7 @@ struct Glances {
   Glance kept;
   FolderView folder;
   std::shared_ptr<const Settings> settings;  // null: to be asked for
-  int64_t settings_time = 0;                 // monotonic
+  int64_t settings_time = 0;                 // monotonic, after they were asked for
 };
 
 Glances& OfThisThread() {
@@ -98,7 +99,7 @@ const Glance& GlanceAt(const std::string& path) {
     // made, and as old again when it is used.
     if (settings == nullptr || now - settings_time >= GLANCE_NS) {
       settings = CurrentSettings();
-      settings_time = now;
+      settings_time = Now();
     }
     kept.settings = settings;
     errno = 0;
@@ -109,7 +110,7 @@ const Glance& GlanceAt(const std::string& path) {
     kept.thing =
         IsNameVerdict(kept.look.verdict) ? LookAgain(*kept.settings, path) : kept.look.thing;
     kept.path = path;
-    kept.time = now;
+    kept.time = Now();
     // Between two passes a queue file is asked for. That look is not kept, nor the folder and the
     // settings before it, and so nothing that was seen before the drain is believed after it.
     if (IsOutside(kept.look.verdict)) {

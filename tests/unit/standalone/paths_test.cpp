@@ -10,6 +10,7 @@
 #include "state/filesystem.h"
 #include "state/layout.h"
 #include "tests/unit/state/mounts.h"
+#include "tests/unit/state/slow_looks.h"
 
 namespace fileindexd {
 namespace {
@@ -61,6 +62,28 @@ TEST_F(PathsTest, SettingsSeenBeforeADrainAreNotBelievedAfterIt) {
 
     ASSERT_TRUE(store->AddFolder(root, {})) << store->Error();
     EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));
+  }
+}
+
+TEST_F(PathsTest, ARowOfQuestionsCostsOneLookHoweverLongThatTakes) {
+  MakeFile(root + "/d/g");
+  for (const int64_t look_ns : {1'000'000, 60'000'000}) {
+    for (const char* below : {"/d/f", "/d/g", "/d"}) {
+      const std::string path = root + below;
+      EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));  // forgets what was seen
+      const SlowLooks slow(look_ns);
+      TALO::FILEINDEX::IsDirExist(path);
+      const int looks = SlowLooks::Count();
+      EXPECT_GT(looks, 0) << below;
+
+      TALO::FILEINDEX::IsFileExist(path);
+      TALO::FILEINDEX::CanFullPathBeIndexed(path);
+      TALO::FILEINDEX::IsSkipIndex(path);
+      Seen seen;
+      EXPECT_TRUE(TakeGlance(path, seen)) << below;
+
+      EXPECT_EQ(SlowLooks::Count(), looks) << below << " " << look_ns;
+    }
   }
 }
 

@@ -16,6 +16,7 @@
 #include "state/filesystem.h"
 #include "state/open_path.h"
 #include "tests/unit/state/mounts.h"
+#include "tests/unit/state/slow_looks.h"
 
 namespace fileindexd {
 namespace {
@@ -103,6 +104,23 @@ TEST(JudgeNameTest, PatternsOfTheDeepestFolderKeepOut) {
   EXPECT_TRUE(settings.HasFolderBelow("/"));
   EXPECT_FALSE(settings.HasFolderBelow("/v/s/build/inner"));
   EXPECT_FALSE(settings.HasFolderBelow("/v/s/buil"));
+}
+
+// The time that it is kept for begins when it was seen, not when it was asked for.
+TEST_F(BelongingTest, AFolderThatWasSeenSlowlyIsKept) {
+  MakeFile(root + "/d/a");
+  MakeFile(root + "/d/b");
+  FolderView view;
+  const SlowLooks slow(4'000'000);
+  LookNear(settings, root + "/d/a", view);
+  if (view.seen_time == 0) {
+    GTEST_SKIP() << "mount numbers are given again here";
+  }
+  const int looks = SlowLooks::Count();
+
+  EXPECT_EQ(LookNear(settings, root + "/d/b", view).verdict, Verdict::BELONGS);
+
+  EXPECT_EQ(SlowLooks::Count(), looks + 1);
 }
 
 TEST_F(BelongingTest, APatternForDirectoriesAsksTheDisk) {
