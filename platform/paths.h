@@ -13,8 +13,8 @@ namespace fileindexd {
 namespace TALO::FILEINDEX {
 
 // True for an existing directory. The last component is not followed; below a share's root nothing
-// behind a symbolic link exists, and a directory that a pattern of the settings keeps out with all
-// it holds is none.
+// behind a symbolic link exists, and a directory that is in a snapshot, or that a pattern of the
+// settings keeps out with all it holds, is none.
 bool IsDirExist(const std::string& path);
 
 // True for an existing regular file or symbolic link, by the same rules; for a queue file, only a

@@ -122,11 +122,15 @@ const Glance& GlanceAt(const std::string& path) {
   return kept;
 }
 
-// Walks descend into what is a directory. One that is kept out by a pattern (a build tree may be
-// larger than all that is indexed) is none to them, unless an indexed folder lies in it.
+// Walks descend into what is a directory. Two kinds are none to them: a snapshot, in which nothing
+// ever belongs, and one that is kept out by a pattern (a build tree may be larger than all that is
+// indexed), unless an indexed folder lies in it.
 bool MayHoldEntries(const Glance& glance) {
-  return glance.look.verdict != Verdict::EXCLUDED ||
-         glance.settings->HasFolderBelow(NormalPath(glance.path).value_or(glance.path));
+  const Verdict verdict = glance.look.verdict;
+  if (verdict == Verdict::EXCLUDED) {
+    return glance.settings->HasFolderBelow(NormalPath(glance.path).value_or(glance.path));
+  }
+  return verdict != Verdict::IN_SNAPSHOT;
 }
 
 }  // namespace

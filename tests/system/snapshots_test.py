@@ -35,6 +35,19 @@ class SnapshotsTest(FilesystemTest):
 
         self.check(left_out=[taken, deep])
 
+    def test_nothing_in_a_read_only_snapshot_is_walked(self):
+        taken = self.snapshot("taken", "-r")
+
+        self.begin()
+        self.event(REINDEX, "")
+        self.ctl("folder", "set", self.root, "--document=on")
+        self.await_drained("alpha")
+
+        for walk in ("IndexDirAdd", "IndexDirUpdate", "IndexDirClean"):
+            self.await_line(f"{walk}: {self.root}")
+        self.assert_not_logged(rf"IndexDir[A-Za-z]+: {taken}(/.*)?")
+        self.assert_not_logged(rf".*Document\[{taken}/.*")
+
     def test_folder_of_snapshots_by_name(self):
         self.snapshot("#snapshot/monday", "-r")
         self.snapshot("in/#snapshot/tuesday")
