@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <cerrno>
+#include <iterator>
 #include <thread>
 
 #include "base/mutex_guard.h"
@@ -12,6 +13,7 @@ namespace {
 using scripted::EVERY_CALL;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
+using ::testing::StartsWith;
 
 class WorkerDocumentsTest : public WorkerFixture {
  protected:
@@ -171,6 +173,28 @@ TEST_F(WorkerDocumentsTest, SuccessIsToldAtDebugLevelOnly) {
                           "[s] Document[" + path + "] deleted",
                           "[s] Directory[" + path + "] deleted, mode=1",
                           "[s] Directory[" + path + "] deleted, mode=2"));
+}
+
+TEST_F(WorkerDocumentsTest, AChangeIsCountedBetweenTheIndexersCallAndItsLine) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  const struct {
+    const char* call;
+    const char* told;
+  } TABLE[] = {{"AddFSDocument ", "[s] Document[%] added"},
+               {"UpdateFSDocument ", "[s] Document[%] updated"},
+               {"DelFSDocument ", "[s] Document[%] deleted"},
+               {"DelFSDocument ", "[s] Directory[%] deleted, mode=1"}};
+  for (int nth = 0; nth < static_cast<int>(std::size(TABLE)); ++nth) {
+    std::string told = TABLE[nth].told;
+    told.replace(told.find('%'), 1, path);
+    worker->op_count = 1999;  // so that it commits
+    script.Forget();
+
+    Operate(nth);
+
+    EXPECT_THAT(Changes(), ElementsAre(StartsWith(TABLE[nth].call), "Commit"));
+    EXPECT_THAT(Log(), ElementsAre("Worker[s] fileindex db committed", told));
+  }
 }
 
 TEST_F(WorkerDocumentsTest, TheFolderThatCoversBestGivesTheConfiguration) {
