@@ -46,8 +46,11 @@ class WorkerWalksTest : public WorkerFixture {
     return flags;
   }
 
-  // Each of the three walks, by number.
+  // Each of the three walks, by number; the first two take entries in.
   static constexpr int WALKS = 3;
+  static constexpr int TAKING_IN = 2;
+  static constexpr const char* NAMES[] = {"IndexDirAdd", "IndexDirUpdate", "IndexDirClean"};
+  static constexpr const char* TOUCHES[] = {"Add ", "Upd ", "Del "};
   int Walk(int which, const std::string& path) {
     return which == 0   ? worker->IndexDirAdd(path)
            : which == 1 ? worker->IndexDirUpdate(path, Flags())
@@ -102,6 +105,12 @@ TEST_F(WorkerWalksTest, AMissingPathIsCountedAndNotWalked) {
   EXPECT_THAT(Touched(), IsEmpty());
   EXPECT_EQ(worker->op_count, 1);
   EXPECT_THAT(Log(), IsEmpty());
+
+  EXPECT_EQ(worker->IndexDirUpdate(In("gone"), Flags()), 1);
+
+  EXPECT_THAT(Touched(), ElementsAre("Upd /gone"));  // an update has no filters
+  EXPECT_EQ(worker->op_count, 1 + 2);
+  EXPECT_EQ(script.CountLines("IndexDir"), 0U);
 }
 
 TEST_F(WorkerWalksTest, TheEndOfEachWalkIsToldAtDebugLevelOnly) {
@@ -145,10 +154,26 @@ TEST_F(WorkerWalksTest, AMountPointThatMayBeAnEntryIsWalkedAndNotAskedAbout) {
   File("d/f");
   script.Say("TALOFSDirIsMntPoint", d, 1);
 
-  worker->IndexDirAdd(d);
-
-  EXPECT_THAT(Touched(), ElementsAre("Add /d", "Add /d/f"));
+  for (int which = 0; which < TAKING_IN; ++which) {
+    script.Forget();
+    EXPECT_EQ(Walk(which, d), 2);
+    const std::string touch = TOUCHES[which];
+    EXPECT_THAT(Touched(), ElementsAre(touch + "/d", touch + "/d/f"));
+  }
   EXPECT_EQ(script.CallCount("TALOFSDirIsMntPoint"), 0);
+}
+
+TEST_F(WorkerWalksTest, ARefusedMountPointThatIsNoDirectoryIsNoEntry) {
+  const std::string d = Dir("d");
+  script.Say("CanFullPathBeIndexed", d, 0);
+  script.Say("TALOFSDirIsMntPoint", d, 1);
+  script.Say("IsDirExist", d, 0);
+  for (int which = 0; which < TAKING_IN; ++which) {
+    worker->op_count = 0;
+    EXPECT_EQ(Walk(which, d), 2) << which;
+    EXPECT_EQ(worker->op_count, 1) << which;
+  }
+  EXPECT_THAT(Touched(), IsEmpty());
 }
 
 TEST_F(WorkerWalksTest, AnyOtherRefusedDirectoryIsWalkedWithoutItsOwnEntry) {
@@ -170,8 +195,12 @@ TEST_F(WorkerWalksTest, ARefusedMountPointBelowIsOneEntryToo) {
   script.Say("CanFullPathBeIndexed", inner, 0);
   script.Say("TALOFSDirIsMntPoint", inner, 1);
 
-  EXPECT_EQ(worker->IndexDirAdd(d), 2);
-  EXPECT_THAT(Touched(), ElementsAre("Add /d", "Add /d/m"));
+  for (int which = 0; which < TAKING_IN; ++which) {
+    script.Forget();
+    EXPECT_EQ(Walk(which, d), 2);
+    const std::string touch = TOUCHES[which];
+    EXPECT_THAT(Touched(), ElementsAre(touch + "/d", touch + "/d/m"));
+  }
 }
 
 TEST_F(WorkerWalksTest, AMountPointInASnapshotIsWalked) {
@@ -181,8 +210,11 @@ TEST_F(WorkerWalksTest, AMountPointInASnapshotIsWalked) {
   script.Say("TALOFSDirIsMntPoint", d, 1);
   script.Say("QLIBFhsPathInSnapshot", d, 1);
 
-  EXPECT_EQ(worker->IndexDirAdd(d), 2);
-  EXPECT_THAT(Touched(), ElementsAre("Add /#snapshot/f"));
+  for (int which = 0; which < TAKING_IN; ++which) {
+    script.Forget();
+    EXPECT_EQ(Walk(which, d), 2);
+    EXPECT_THAT(Touched(), ElementsAre(TOUCHES[which] + std::string("/#snapshot/f")));
+  }
 }
 
 TEST_F(WorkerWalksTest, PreservedNamesAreNeverTouchedAtAnyDepth) {
@@ -191,9 +223,12 @@ TEST_F(WorkerWalksTest, PreservedNamesAreNeverTouchedAtAnyDepth) {
   File("d/e/keep");
   File("d/e/g");
   script.Say("IsSystemPreservedFileName", "keep", 1);
-  for (const auto& walk : {0, 1}) {
+  for (int which = 0; which < WALKS; ++which) {
     script.Forget();
-    Walk(walk, In("d"));
+    if (which == 2) {
+      script.Fail("IsFullPathIndexed");  // so that a clean descends
+    }
+    Walk(which, In("d"));
     EXPECT_EQ(Touched().size(), 3U);
     for (const std::string& call : script.Calls()) {
       EXPECT_EQ(call.find("/keep"), std::string::npos) << call;
@@ -336,7 +371,23 @@ TEST_F(WorkerWalksTest, AReadErrorEndsTheWalkAsIfItWereComplete) {
   EXPECT_THAT(Touched(), ElementsAre("Add /d", "Upd /d"));
 }
 
-TEST_F(WorkerWalksTest, AStopIsSeenBeforeAReadErrorOrTheEnd) {
+TEST_F(WorkerWalksTest, AReadErrorIsSeenBeforeAStop) {
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  File("d/f");
+  for (int which = 0; which < WALKS; ++which) {
+    worker->state = WORKER_RUNNING;
+    const int nth = script.CallCount("readdir64_r") + 1;
+    script.Answer("readdir64_r", nth, EIO);
+    script.Run("readdir64_r", nth, [&] { worker->state = WORKER_IDLE; });
+
+    EXPECT_EQ(Walk(which, In("d")), 2) << which;
+
+    EXPECT_EQ(Log().back(), NAMES[which] + (": " + In("d")));
+    EXPECT_EQ(script.CallCount("readdir64_r"), nth) << which;
+  }
+}
+
+TEST_F(WorkerWalksTest, AStopIsSeenBeforeTheEnd) {
   const std::string d = Dir("d");
   for (int which = 0; which < WALKS; ++which) {
     worker->state = WORKER_RUNNING;
