@@ -17,6 +17,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <ctime>
+#include <new>
 #include <string>
 
 #include "scripted/script.h"
@@ -49,6 +50,18 @@ using CondWait = int(pthread_cond_t*, pthread_mutex_t*);
 }
 
 }  // namespace
+
+// The kind that answers null; any answer of a test fails it.
+void* operator new(size_t size, const std::nothrow_t& /*kind*/) noexcept {
+  if (Fails("operator new")) {
+    return nullptr;
+  }
+  try {
+    return ::operator new(size);
+  } catch (const std::bad_alloc&) {
+    return nullptr;
+  }
+}
 
 extern "C" {
 

@@ -62,6 +62,7 @@ TEST_F(WorkerLifecycleTest, EachFailingStepEndsTheConstructionWithItsLines) {
       {"FILEIDXDBPathGet", -1, {"FILEIDXDBPathGet failed, share=s"}},
       {"FILEIDXQueuePathGet", -1, {"FILEIDXQueuePathGet failed, share=s"}},
       {"TALOShareGet", -1, {"TALOShareGet failed, share=s"}},
+      {"operator new", ENOMEM, {"Failed to initiate indexer, dbpath=" + db_path}},
       {"Indexer", 0, {"Failed to initiate indexer, dbpath=" + db_path}},
   };
   for (const auto& row : TABLE) {

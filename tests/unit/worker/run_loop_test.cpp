@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <cerrno>
 #include <stdexcept>
+#include <utility>
 
+#include "base/mutex_guard.h"
 #include "platform/log.h"
 #include "unit/worker/worker_fixture.h"
 
@@ -135,6 +138,30 @@ TEST_F(WorkerRunLoopTest, NeedsReindexThrowsTheQueueAwayAndIndexesTheShare) {
   EXPECT_FALSE(script.need_reindex.contains("s"));
 }
 
+TEST_F(WorkerRunLoopTest, APauseHoldsTheReindexOfAShareOnceItsQueueIsThrownAway) {
+  Queue({Event(128, In("x"))});
+  script.need_reindex.insert("s");
+  daemon.resume_time = 0;
+  script.Run("pthread_cond_wait", EVERY_CALL, [] {});
+  ASSERT_TRUE(worker->Run());
+  running = true;
+  ASSERT_TRUE(script.AwaitCount("pthread_cond_wait", 1));
+  {
+    const MutexGuard guard(&daemon.pause_mutex);  // free: the thread waits
+    EXPECT_THAT(script.Calls(), ElementsAre("ShareIsNeedReindex s", "ShareSetNeedReindex s false",
+                                            "QLIBCExec /bin/rm -rf " + queue_path));
+    EXPECT_FALSE(HasQueue());
+    daemon.resume_time = -1;
+    pthread_cond_broadcast(&daemon.pause_cond);
+  }
+
+  pthread_join(worker->thread, nullptr);
+  running = false;
+
+  EXPECT_EQ(Changes().front(), "DelFSDocument " + share_path + " 1");
+  EXPECT_EQ(script.CallCount("ShareSetNeedReindex"), 1);
+}
+
 TEST_F(WorkerRunLoopTest, AStoppedReindexStillCommitsAndKeepsTheCopy) {
   folder.Write("queue/TALO@file_index_queue.tmp", "rest");
   script.need_reindex.insert("s");
@@ -215,6 +242,19 @@ TEST_F(WorkerRunLoopTest, ACommitIsToldAtDebugLevelOnly) {
               ElementsAre("Worker[s] fileindex db committed", "Worker[s] failed to commit db"));
 }
 
+TEST_F(WorkerRunLoopTest, TheCountAndTheIntervalStartAnewBeforeTheCommit) {
+  worker->op_count = 7;
+  worker->last_commit = 0;
+  script.Run("Commit", 1, [&] {
+    EXPECT_EQ(worker->op_count, 0);
+    EXPECT_GT(worker->last_commit, 0);
+  });
+
+  worker->CommitIndex();
+
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+}
+
 TEST_F(WorkerRunLoopTest, AFailedCommitKeepsTheIndexerAndRestartsTheInterval) {
   const auto* before = worker->indexer;
   script.Fail("Commit");
@@ -239,6 +279,17 @@ TEST_F(WorkerRunLoopTest, AnIndexerThatDoesNotOpenAgainIsToldOnceAndKept) {
   EXPECT_FALSE(worker->indexer->IsOpen());
   EXPECT_THAT(Log(), ElementsAre("Failed to initiate indexer, dbpath=" + db_path));
   EXPECT_EQ(script.CallCount("Indexer"), 2);
+}
+
+TEST_F(WorkerRunLoopTest, AnIndexerThatGetsNoMemoryIsToldOnceAndIsNone) {
+  script.Answer("operator new", script.CallCount("operator new") + 1, ENOMEM);
+
+  worker->CommitIndex();
+
+  EXPECT_EQ(worker->indexer, nullptr);
+  EXPECT_EQ(script.live_indexers, indexers_before);
+  EXPECT_THAT(Log(), ElementsAre("Failed to initiate indexer, dbpath=" + db_path));
+  EXPECT_THAT(script.Calls(), ElementsAre("Commit", "~Indexer", "IsShareSpaceEnough s"));
 }
 
 TEST_F(WorkerRunLoopTest, WithoutAnIndexerACommitDoesNothing) {
