@@ -42,6 +42,7 @@ bool GetShareNameByPath(std::string& share_name, const std::string& path);
 bool CanShareBeIndexed(const _tag_TALOSHARE* share);
 
 // False when the share's volume, or the one that holds its index, is too full to index.
+// Otherwise clears the share's no-space flag where it stands.
 bool IsShareSpaceEnough(const std::string& share_name);
 
 }  // namespace TALO::FILEINDEX
