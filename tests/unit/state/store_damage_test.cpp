@@ -1,47 +1,18 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
-#include <array>
 #include <filesystem>
 #include <fstream>
 #include <functional>
 #include <vector>
 
 #include "state/store.h"
-#include "tests/unit/state/fixture.h"
+#include "tests/unit/state/store_fixture.h"
 #include "tests/unit/state/version_1.h"
 
 namespace fileindexd {
 namespace {
-
-class StoreDamageTest : public StateTest {
- protected:
-  StoreDamageTest() : database(state_root + "/state.db"), copy(database + ".copy") {
-    const auto store = OpenStore();
-    EXPECT_TRUE(store->AddShare({"a", "/v/a", ""})) << store->Error();
-    EXPECT_TRUE(store->AddFolder("/v/a", {})) << store->Error();
-  }
-
-  static void Sql(const std::string& path, const char* sql) {
-    sqlite3* db = nullptr;
-    ASSERT_EQ(sqlite3_open(path.c_str(), &db), SQLITE_OK);
-    EXPECT_EQ(sqlite3_exec(db, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
-    sqlite3_close(db);
-  }
-
-  void ExpectAllThere(StateStore& store) {
-    std::shared_ptr<const Settings> settings;
-    ASSERT_TRUE(store.GetSettings(settings)) << store.Error();
-    EXPECT_EQ(settings->shares.size(), 1U);
-    EXPECT_EQ(settings->folders.size(), 1U);
-  }
-
-  std::string database;
-  std::string copy;
-};
 
 TEST_F(StoreDamageTest, ANewerVersionIsRefusedByNameAndLeftAlone) {
   Sql(database, "PRAGMA user_version=99");
@@ -341,35 +312,6 @@ TEST_F(StoreDamageTest, AnUpgradeLeavesACopy) {
   ASSERT_TRUE(OpenStore()->GetSettings(settings));
   EXPECT_EQ(settings->shares.size(), 1U);
 }
-
-// Another program, which SQLite would not let share anything with this one. It is there before this
-// one opens a database, adds the folder when it is told to, and ends.
-class OtherProgram {
- public:
-  explicit OtherProgram(const std::string& folder) {
-    EXPECT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
-    child = Fork([&] {
-      close(ends[1]);  // so that it ends with the test, whatever becomes of that
-      char go = 0;
-      const bool told = read(ends[0], &go, 1) == 1;
-      std::string error;
-      const auto store = StateStore::Open(error);
-      return told && store != nullptr && store->AddFolder(folder, {}) ? 0 : 1;
-    });
-  }
-  ~OtherProgram() {
-    close(ends[0]);
-    close(ends[1]);
-  }
-  void AddFolder() {
-    EXPECT_EQ(write(ends[1], "g", 1), 1);
-    EXPECT_EQ(WaitFor(child), 0);
-  }
-
- private:
-  std::array<int, 2> ends{};
-  pid_t child = -1;
-};
 
 // Two programs with a memory of their own would write over each other's changes.
 TEST_F(StoreDamageTest, AnOpenStoreLosesNothingWithItsSharedMemory) {
