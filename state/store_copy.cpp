@@ -133,6 +133,38 @@ int LookInto(std::string image, bool& sound, Holding& holding) {
   return unsound ? SQLITE_OK : result;
 }
 
+// The database as it is at one moment, as the bytes of a file that stands alone. By way of the
+// memory: a read that fails is told there, while SQLite's own function for this puts zeros in the
+// page's place.
+int TakeImage(const StateConnection& connection, std::string& image) {
+  StateConnection memory;
+  const int opened = sqlite3_open(":memory:", &memory.db);
+  if (opened != SQLITE_OK) {
+    return opened;
+  }
+  sqlite3_backup* backup = sqlite3_backup_init(memory.db, "main", connection.db, "main");
+  if (backup == nullptr) {
+    return sqlite3_errcode(memory.db);
+  }
+  (void)sqlite3_backup_step(backup, -1);  // all pages; the end tells what failed
+  const int result = sqlite3_backup_finish(backup);
+  if (result != SQLITE_OK) {
+    return result;
+  }
+  sqlite3_int64 size = 0;
+  unsigned char* bytes = sqlite3_serialize(memory.db, "main", &size, 0);
+  if (bytes == nullptr || size < 100) {
+    sqlite3_free(bytes);
+    return SQLITE_NOMEM;
+  }
+  image.assign(reinterpret_cast<char*>(bytes), static_cast<size_t>(size));
+  sqlite3_free(bytes);
+  // These two bytes of the header say that there is no log beside it.
+  image[18] = 1;
+  image[19] = 1;
+  return SQLITE_OK;
+}
+
 // As PATH.new, on the disk.
 bool WriteNew(const std::string& path, const std::string& bytes, std::string& error) {
   const std::string temporary = path + ".new";
@@ -281,22 +313,15 @@ CopyLeft LeaveStateCopy(const StateConnection& connection, const ScopedFd& root,
     error = connection.path + " was replaced; the copy is that of the other one";
     return CopyLeft::FAILED;
   }
-  sqlite3_int64 size = 0;
-  unsigned char* bytes = sqlite3_serialize(connection.db, "main", &size, 0);
-  if (bytes == nullptr || size < 100) {
-    sqlite3_free(bytes);
-    error = StateError(connection, "cannot copy");
-    return CopyLeft::FAILED;
+  std::string image;
+  int result = TakeImage(connection, image);
+  if (result != SQLITE_OK) {
+    error = "cannot copy " + connection.path + ": " + sqlite3_errstr(result);
+    return IsDamage(result) ? CopyLeft::DAMAGED : CopyLeft::FAILED;
   }
-  std::string image(reinterpret_cast<char*>(bytes), static_cast<size_t>(size));
-  sqlite3_free(bytes);
-
-  // A copy stands alone: these two bytes of the header say that there is no log beside it.
-  image[18] = 1;
-  image[19] = 1;
   bool sound = false;
   Holding ignored;
-  const int result = LookInto(image, sound, ignored);
+  result = LookInto(image, sound, ignored);
   if (result != SQLITE_OK) {
     error = "cannot check " + connection.path + ": " + sqlite3_errstr(result);
     return CopyLeft::FAILED;
