@@ -127,23 +127,29 @@ bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is
   return LeaveCopy(is_lost);
 }
 
-// The change itself is safe, but where the copy takes this file's place: another program has put it
-// there, or this one does because what it has just read is damaged.
+// The change itself is safe, but where another file or log has come in the place of the one that it
+// was written to: another program has put it there, or this one does because what it has just read
+// is damaged.
 bool StateStore::Impl::LeaveCopy(bool& is_lost) {
   const std::string path = connection->path;
   const ino_t written = InodeOf(path);  // looked at first: what is found replaced leaves no copy
   std::string reason;
   const CopyLeft left = LeaveStateCopy(*connection, reason);
+  const bool moved = left == CopyLeft::FAILED && HasStateMoved(*connection);
   if (left == CopyLeft::DAMAGED) {
     TidyOnClose(*connection, false);
     if (!Open()) {
       return false;
     }
     is_lost = InodeOf(path) != written;
-  } else if (left == CopyLeft::FAILED) {
-    is_lost = IsSetAside(*connection);
+  } else if (moved) {
+    const std::string rows = IsSetAside(*connection) ? std::string() : RowsOf(*connection);
+    if (!Open()) {  // leaves the copy
+      return false;
+    }
+    is_lost = rows.empty() || RowsOf(*connection) != rows;
   }
-  if (left != CopyLeft::FAILED || is_lost) {
+  if (left != CopyLeft::FAILED || moved) {
     copy_failure.clear();
   } else if (std::exchange(copy_failure, reason) != reason) {
     syslog(LOG_ERR, "%s:%d %s", __FILE__, __LINE__, reason.c_str());

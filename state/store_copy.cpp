@@ -299,6 +299,11 @@ int CompareWithCopy(const StateConnection& connection, CopyAge& age, std::string
   return SQLITE_OK;
 }
 
+std::string RowsOf(const StateConnection& connection) {
+  Holding held;
+  return ReadHoldingAtOnce(connection, held) == SQLITE_OK ? held.rows : std::string();
+}
+
 // The lock keeps an older copy from replacing a newer one of another program.
 CopyLeft LeaveStateCopy(const StateConnection& connection, std::string& error) {
   ScopedFd lock;
@@ -309,8 +314,8 @@ CopyLeft LeaveStateCopy(const StateConnection& connection, std::string& error) {
 
 CopyLeft LeaveStateCopy(const StateConnection& connection, const ScopedFd& root,
                         std::string& error) {
-  if (IsSetAside(connection)) {
-    error = connection.path + " was replaced; the copy is that of the other one";
+  if (HasStateMoved(connection)) {
+    error = connection.path + " or its log was replaced; the copy is that of the other one";
     return CopyLeft::FAILED;
   }
   std::string image;

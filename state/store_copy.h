@@ -20,6 +20,9 @@ CopyLeft LeaveStateCopy(const StateConnection& connection, std::string& error);
 CopyLeft LeaveStateCopy(const StateConnection& connection, const ScopedFd& root,
                         std::string& error);
 
+// All that the connection sees, of one moment; empty where that cannot be read.
+std::string RowsOf(const StateConnection& connection);
+
 // BEHIND: the copy is missing, not sound, or lacks changes, and another is to be left. AHEAD: it
 // has changes that the database has lost.
 enum class CopyAge { LEVEL, BEHIND, AHEAD };

@@ -1,15 +1,33 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // The copy beside the state database holds what was acknowledged, whatever fails or comes in
 // between.
+#include <dlfcn.h>
 #include <sqlite3.h>
+#include <sys/file.h>
 #include <sys/types.h>
 
 #include <cerrno>
+#include <filesystem>
+#include <functional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "state/store.h"
 #include "tests/unit/state/store_fixture.h"
+
+namespace {
+std::function<void()> before_lock;  // run once, by the next call of flock
+}
+
+extern "C" int flock(int fd, int operation) noexcept {
+  using Function = int(int, int);
+  static auto* const own = reinterpret_cast<Function*>(dlsym(RTLD_NEXT, "flock"));
+  if (before_lock != nullptr) {
+    std::exchange(before_lock, nullptr)();
+  }
+  return own(fd, operation);
+}
 
 namespace fileindexd {
 namespace {
@@ -78,6 +96,40 @@ TEST_F(StoreCopyTest, AReadThatFailsLeavesNoGapInALongPattern) {
     ASSERT_FALSE(Exists(database + ".damaged")) << nth;
   }
   EXPECT_GT(nth, 5);
+}
+
+// The log went between the commit and the lock under which the copy is left.
+TEST_F(StoreCopyTest, AChangeThatWentWithTheLogMeanwhileIsMadeAgain) {
+  OtherProgram other("/v/a/b");
+  const auto store = OpenStore();
+  before_lock = [&] {
+    std::filesystem::remove(database + "-wal");
+    std::filesystem::remove(database + "-shm");
+    other.AddFolder();
+  };
+
+  ASSERT_TRUE(store->AddFolder("/v/a/c", {})) << store->Error();
+
+  EXPECT_EQ(before_lock, nullptr);
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_NE(settings->FolderAt("/v/a/b"), nullptr);
+  EXPECT_NE(settings->FolderAt("/v/a/c"), nullptr);
+  EXPECT_FALSE(Exists(database + ".damaged"));
+}
+
+// The change is in the log, and would be refused a second time: the folder is there.
+TEST_F(StoreCopyTest, AChangeThatIsStillThereWithoutItsSharedMemoryIsMadeOnce) {
+  const auto store = OpenStore();
+  before_lock = [&] { std::filesystem::remove(database + "-shm"); };
+
+  ASSERT_TRUE(store->AddFolder("/v/a/c", {})) << store->Error();
+
+  EXPECT_EQ(before_lock, nullptr);
+  WriteFile(database, std::string(10'000, 'x'));
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(OpenStore()->GetSettings(settings));
+  EXPECT_NE(settings->FolderAt("/v/a/c"), nullptr);
 }
 
 }  // namespace
