@@ -160,6 +160,16 @@ bool AreFilesOrNothing(const std::string& path) {
          IsFileOrNothing(path + "-shm") && IsFileOrNothing(path + "-journal");
 }
 
+// To SQLite an empty file has no log: it would remove one that is there. A log that a program of
+// ours begins stands beside a file with tables.
+bool IsEmptyBesideLog(const std::string& path) {
+  constexpr off_t LOG_HEADER = 32;  // a log of this size holds nothing
+  struct stat file {};
+  struct stat log {};
+  return lstat(path.c_str(), &file) == 0 && file.st_size == 0 &&
+         lstat((path + "-wal").c_str(), &log) == 0 && log.st_size > LOG_HEADER;
+}
+
 // A disk that fails for a moment looks like damage: it is looked at twice, from the beginning.
 Opened OpenTwice(std::unique_ptr<StateConnection>& connection, bool has_copy, const ScopedFd& root,
                  std::string& error) {
@@ -249,6 +259,8 @@ std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
       error = path + " is missing";
     } else if (!AreFilesOrNothing(path)) {
       error = path + " or its log is no regular file";
+    } else if (IsEmptyBesideLog(path)) {
+      error = path + " is empty beside its log";
     } else if (!MakeFile(path, error)) {
       return nullptr;
     } else {

@@ -85,6 +85,18 @@ class StateLogTest(StateDamageTest):
         self.assertEqual(len(self.told(USED, after)), 1)
         self.check_works()
 
+    def test_a_log_beside_an_emptied_database_is_kept_with_it(self):
+        self.killed()
+        os.truncate(FILE, 0)
+        with open(LOG, "rb") as file:
+            log = file.read()
+
+        self.start()
+
+        with open(f"{FILE}.damaged-wal", "rb") as file:
+            self.assertEqual(file.read(), log)
+        self.check_works()
+
     def test_a_log_that_is_whole_is_not_told_of(self):
         self.killed()
         after = self.log.mark()

@@ -65,6 +65,30 @@ TEST_F(StoreDamageTest, TheLogOfADamagedDatabaseIsNotPlayedIntoTheCopy) {
   EXPECT_TRUE(ReadFile(database + ".damaged-wal") == log);  // too long to be printed
 }
 
+// As a program leaves them that is killed. SQLite would remove the log: to it an empty file has
+// none.
+TEST_F(StoreDamageTest, TheLogBesideAnEmptyDatabaseIsKept) {
+  auto killed = OpenStore();
+  ASSERT_TRUE(killed->SetPause(5));
+  const std::string log = ReadFile(database + "-wal");
+  killed.reset();
+  ASSERT_FALSE(log.empty());
+  WriteFile(database, "");
+  WriteFile(database + "-wal", log);
+
+  ExpectAllThere(*OpenStore());
+  EXPECT_TRUE(ReadFile(database + ".damaged-wal") == log);
+
+  std::filesystem::remove(copy);
+  WriteFile(database, "");
+  WriteFile(database + "-wal", log);
+  std::string error;
+  EXPECT_EQ(StateStore::Open(error), nullptr);
+  EXPECT_NE(error.find(database), std::string::npos) << error;
+  EXPECT_NE(error.find("no sound copy"), std::string::npos) << error;
+  EXPECT_TRUE(ReadFile(database + "-wal") == log);
+}
+
 TEST_F(StoreDamageTest, WithoutASoundCopyItFailsAndRebuildsNothing) {
   const std::string garbage(8192, 'x');
   for (const std::string& bad_copy : {garbage, std::string(), ReadFile(copy).substr(0, 5000)}) {
