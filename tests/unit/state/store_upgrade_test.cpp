@@ -15,10 +15,13 @@ class StoreUpgradeTest : public StateTest {
  protected:
   StoreUpgradeTest() : database(state_root + "/state.db") {
     std::filesystem::create_directories(state_root);
+    Sql(VERSION_1);
+  }
+
+  void Sql(const char* sql) {
     sqlite3* db = nullptr;
     EXPECT_EQ(sqlite3_open(database.c_str(), &db), SQLITE_OK);
-    EXPECT_EQ(sqlite3_exec(db, VERSION_1, nullptr, nullptr, nullptr), SQLITE_OK)
-        << sqlite3_errmsg(db);
+    EXPECT_EQ(sqlite3_exec(db, sql, nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(db);
     sqlite3_close(db);
   }
 
@@ -76,6 +79,20 @@ TEST_F(StoreUpgradeTest, ACopyOfAnOlderVersionTakesTheDatabasesPlaceAndIsUpgrade
   WriteFile(database, std::string(8192, 'x'));
 
   ExpectAllThere(*OpenStore());
+}
+
+// What the copy holds is what the database held before, and as many changes are counted in both.
+TEST_F(StoreUpgradeTest, ACopyFromBeforeTheUpgradeIsMadeAnewByTheNextOpening) {
+  const std::string copy = database + ".copy";
+  Sql("INSERT INTO number VALUES('changes', 3)");
+  std::filesystem::copy_file(database, copy);
+  (void)OpenStore();
+
+  ExpectAllThere(*OpenStore());
+
+  EXPECT_FALSE(Exists(database + ".damaged"));
+  std::filesystem::rename(copy, database);
+  Sql("SELECT retry_contents FROM status");  // of the newest version only
 }
 
 }  // namespace
