@@ -251,7 +251,11 @@ bool PutCopyInPlace(const std::string& path, const ScopedFd& root, std::string& 
   bool sound = false;
   Holding ignored;
   const std::string copy = path + ".copy";
-  const int result = ReadAll(copy, image) ? LookInto(image, sound, ignored) : SQLITE_OK;
+  if (IsFileOrNothing(copy) && !ReadCopy(copy, image)) {
+    error += "; and " + StateFileError("cannot read", copy);
+    return false;
+  }
+  const int result = LookInto(image, sound, ignored);
   if (result != SQLITE_OK || !sound) {
     error += result == SQLITE_OK ? "; and there is no sound copy of it"
                                  : "; and " + copy + " cannot be read: " + sqlite3_errstr(result);

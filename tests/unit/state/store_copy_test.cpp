@@ -4,7 +4,9 @@
 #include <dlfcn.h>
 #include <sqlite3.h>
 #include <sys/file.h>
+#include <sys/resource.h>
 #include <sys/types.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <filesystem>
@@ -130,6 +132,37 @@ TEST_F(StoreCopyTest, AChangeThatIsStillThereWithoutItsSharedMemoryIsMadeOnce) {
   std::shared_ptr<const Settings> settings;
   ASSERT_TRUE(OpenStore()->GetSettings(settings));
   EXPECT_NE(settings->FolderAt("/v/a/c"), nullptr);
+}
+
+// No more than `more` descriptors can be opened than are open now.
+class FewDescriptors {
+ public:
+  explicit FewDescriptors(rlim_t more) {
+    const int next = dup(0);
+    close(next);
+    EXPECT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+    const rlimit few = {static_cast<rlim_t>(next) + more, before.rlim_max};
+    EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &few), 0);
+  }
+  ~FewDescriptors() { setrlimit(RLIMIT_NOFILE, &before); }
+  FewDescriptors(const FewDescriptors&) = delete;
+  FewDescriptors& operator=(const FewDescriptors&) = delete;
+
+ private:
+  rlimit before{};
+};
+
+TEST_F(StoreCopyTest, ACopyThatCannotBeOpenedIsNotSaidToBeUnsound) {
+  std::filesystem::remove(database);
+  std::string error;
+  {
+    const FewDescriptors few(1);  // for the lock
+    EXPECT_EQ(StateStore::Open(error), nullptr);
+  }
+  EXPECT_NE(error.find(copy + ": Too many open files"), std::string::npos) << error;
+  EXPECT_EQ(error.find("no sound copy"), std::string::npos) << error;
+
+  ExpectAllThere(*OpenStore());
 }
 
 }  // namespace
