@@ -19,13 +19,13 @@ constexpr std::chrono::milliseconds LOCK_NAP(5);
 
 }  // namespace
 
-bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error) {
+bool LockStateRoot(const std::string& root, bool wait, ScopedFd& lock, std::string& error) {
   ScopedFd folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   if (folder.fd < 0) {
     error = StateFileError("cannot open", root);
     return false;
   }
-  const auto deadline = std::chrono::steady_clock::now() + LOCK_WAIT;
+  const auto deadline = std::chrono::steady_clock::now() + (wait ? LOCK_WAIT : LOCK_WAIT.zero());
   while (flock(folder.fd, LOCK_EX | LOCK_NB) != 0) {
     if ((errno != EWOULDBLOCK && errno != EINTR) || std::chrono::steady_clock::now() >= deadline) {
       error = StateFileError("cannot lock", root);

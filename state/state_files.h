@@ -8,9 +8,9 @@
 
 namespace fileindexd {
 
-// The lock on the state root under which both are done, waited for 5 s at most. False on failure,
-// and `error` then says why.
-bool LockStateRoot(const std::string& root, ScopedFd& lock, std::string& error);
+// The lock on the state root under which both are done, waited for 5 s at most or, without `wait`,
+// not at all. False on failure, and `error` then says why.
+bool LockStateRoot(const std::string& root, bool wait, ScopedFd& lock, std::string& error);
 
 // What could not be done with a file, and why, by errno.
 std::string StateFileError(const std::string& what, const std::string& path);

@@ -23,21 +23,27 @@ std::string ResolvedStateRoot() {
 
 }  // namespace
 
-bool StateStore::Impl::Open() {
+bool StateStore::Impl::Open(bool wait) {
   cached.reset();
   data_version.reset();
   connection.reset();
   files_failed = false;
-  connection = OpenStateDatabase(error);
+  connection = OpenStateDatabase(wait, error);
   if (connection == nullptr) {
     return false;
   }
-  const bool full = !connection->read_only.empty();
-  if (full && !full_told) {
-    syslog(LOG_ERR, "%s:%d %s: nothing is changed there until it has space", __FILE__, __LINE__,
-           connection->read_only.c_str());
+  const bool read_only = !connection->read_only.empty();
+  if (read_only && !read_only_told) {
+    const char* why = connection->read_only.c_str();
+    if (connection->without_lock) {
+      syslog(LOG_ERR, "%s:%d %s: nothing is changed there until it is unlocked", __FILE__, __LINE__,
+             why);
+    } else {
+      syslog(LOG_ERR, "%s:%d %s: nothing is changed there until it has space", __FILE__, __LINE__,
+             why);
+    }
   }
-  full_told = full;
+  read_only_told = read_only;
   data_version.emplace();
   int64_t version = 0;
   if (!Prepare(*data_version, "PRAGMA data_version") || !ReadVersion(version)) {
@@ -76,11 +82,15 @@ bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
   return cached != nullptr && head.has_value() && cached_head == head;
 }
 
-bool StateStore::Impl::Ready() {
+bool StateStore::Impl::Ready(bool to_change) {
   // A transaction that is still open here is one whose rollback failed.
   const bool useful = connection != nullptr && connection->read_only.empty() && !files_failed &&
                       sqlite3_get_autocommit(connection->db) != 0;
-  return (useful && !HasStateMoved(*connection)) || Open();
+  if (useful && !HasStateMoved(*connection)) {
+    return true;
+  }
+  // Who reads has waited once for whoever stands still.
+  return Open(to_change || connection == nullptr || !connection->without_lock);
 }
 
 // SQLite opens a file that it may not write for reading only, and would stay with that for ever. A
@@ -107,7 +117,7 @@ bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
 
 bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is_lost) {
   is_lost = false;
-  if (!Ready()) {
+  if (!Ready(true)) {
     return false;
   }
   if (!connection->read_only.empty()) {
@@ -239,7 +249,9 @@ std::string StateStore::Error() {
 bool StateStore::Touch() {
   const std::lock_guard guard(impl->mutex);
   // On a full disk the opening that follows the space's return makes all of it.
-  const bool full = impl->connection != nullptr && !impl->connection->read_only.empty();
+  const StateConnection* connection = impl->connection.get();
+  const bool full =
+      connection != nullptr && !connection->read_only.empty() && !connection->without_lock;
   const bool written = full || impl->Change([] { return Impl::Outcome::CHANGED; });
   bool found = false;
   return written && impl->HasRow("SELECT 1 FROM share WHERE name = ?", {}, found);

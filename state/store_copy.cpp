@@ -312,8 +312,8 @@ std::string RowsOf(const StateConnection& connection) {
 CopyLeft LeaveStateCopy(const StateConnection& connection, std::string& error) {
   ScopedFd lock;
   const std::string root = connection.path.substr(0, connection.path.rfind('/'));
-  return LockStateRoot(root, lock, error) ? LeaveStateCopy(connection, lock, error)
-                                          : CopyLeft::FAILED;
+  return LockStateRoot(root, true, lock, error) ? LeaveStateCopy(connection, lock, error)
+                                                : CopyLeft::FAILED;
 }
 
 CopyLeft LeaveStateCopy(const StateConnection& connection, const ScopedFd& root,

@@ -190,6 +190,27 @@ Opened OpenTwice(std::unique_ptr<StateConnection>& connection, bool has_copy, co
   return outcome;
 }
 
+// Whoever has the lock may stand still, and is not to keep out who only wants to read. What is
+// there is taken as it is: sound and of our version, or not at all.
+bool OpenWithoutLock(StateConnection& connection, const std::string& error) {
+  const std::string& path = connection.path;
+  if (!StateFileExists(path) || !AreFilesOrNothing(path) || IsEmptyBesideLog(path)) {
+    return false;
+  }
+  constexpr int FLAGS = SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX;
+  if (sqlite3_open_v2(path.c_str(), &connection.db, FLAGS, nullptr) != SQLITE_OK) {
+    return false;
+  }
+  sqlite3_busy_timeout(connection.db, BUSY_WAIT_MS);
+  TidyOnClose(connection, false);
+  int64_t version = 0;
+  bool ok = false;
+  connection.read_only = error;
+  connection.without_lock = true;
+  return SchemaVersion(connection.db, version) == SQLITE_OK && version == STATE_VERSION &&
+         QuickCheck(connection.db, ok) == SQLITE_OK && ok;
+}
+
 }  // namespace
 
 StateConnection::~StateConnection() {
@@ -243,12 +264,17 @@ bool HasStateMoved(const StateConnection& connection) {
   return IsSetAside(connection) || LogFilesOf(connection.path) != connection.log;
 }
 
-std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error) {
+std::unique_ptr<StateConnection> OpenStateDatabase(bool wait, std::string& error) {
   ScopedFd lock;
-  if (!MakeStateRoot(error) || !LockStateRoot(StateRoot(), lock, error)) {
+  if (!MakeStateRoot(error)) {
     return nullptr;
   }
   const std::string path = StateDatabasePath();
+  if (!LockStateRoot(StateRoot(), wait, lock, error)) {
+    auto connection = std::make_unique<StateConnection>();
+    connection->path = path;
+    return OpenWithoutLock(*connection, error) ? std::move(connection) : nullptr;
+  }
   const bool has_copy = StateFileExists(path + ".copy");
   bool recovered = false;
   for (;;) {

@@ -37,15 +37,18 @@ class StateConnection {
   sqlite3* db = nullptr;
   std::string path;
   LogFiles log;  // that it uses
-  // Why it is for reading only, and sees no later change: the disk is full. Else empty.
+  // Why it is for reading only: the disk is full, and it sees no later change, or it was opened
+  // without the lock. Else empty.
   std::string read_only;
+  bool without_lock = false;
 };
 
 // Opens the database: makes it where there is none, upgrades an older one, refuses a newer one, and
 // puts the copy in the place of one that is damaged or lacks changes that the copy has. On a full
 // disk, which has no room for the log and the shared memory, the connection may be one for reading
-// only. Null on failure.
-std::unique_ptr<StateConnection> OpenStateDatabase(std::string& error);
+// only; so it may where another program keeps the lock for more than 5 s, or without `wait` at all.
+// Null on failure.
+std::unique_ptr<StateConnection> OpenStateDatabase(bool wait, std::string& error);
 
 // The second half of that: opens `connection` for reading what was closed properly, on a full disk.
 // `error` is what kept it from being opened. In store_unlogged.cpp.

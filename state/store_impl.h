@@ -25,11 +25,12 @@ struct StateStore::Impl {
   }
   bool FailSql();
 
-  bool Open();
+  // Without `wait` for another program that opens it, too: for reading only then.
+  bool Open(bool wait = true);
   // Opens anew where another program set the file aside or its log or shared memory is gone
   // (changes would be lost), and where the connection is of no use any more, or was for reading
-  // only.
-  bool Ready();
+  // only. Who wants to change something waits for other programs each time.
+  bool Ready(bool to_change = false);
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
   }
@@ -70,7 +71,7 @@ struct StateStore::Impl {
   std::string error;
   std::unique_ptr<StateConnection> connection;
   bool files_failed = false;              // of this connection
-  bool full_told = false;                 // that the disk is full, since it last was not
+  bool read_only_told = false;            // that it is for reading only, since it last was not
   bool newer_told = false;                // of the version, since it last was ours
   std::string copy_failure;               // that was told, since a copy was last left
   std::optional<Statement> data_version;  // goes before the connection

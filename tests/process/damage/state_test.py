@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """A state database that was damaged, removed or replaced: its copy is used, or all say what is wrong."""
 
+import fcntl
 import os
 import re
 import shutil
@@ -241,6 +242,21 @@ class StateTest(StateDamageTest):
             with sqlite3.connect(COPY) as db:
                 self.assertEqual(db.execute("PRAGMA quick_check").fetchall(), [("ok",)])
             db.close()
+        self.check_works()
+
+    def test_a_program_that_stands_still_with_the_lock_keeps_no_reader_out(self):
+        self.prepare()
+        root = os.open(namespace.STATE, os.O_RDONLY | os.O_DIRECTORY)
+        self.addCleanup(os.close, root)
+        fcntl.flock(root, fcntl.LOCK_EX)
+
+        (share,) = self.ctl("share", "list", "--json").json()
+        self.assertEqual(share["name"], "alpha")
+        self.assertIn("a.txt", self.ctl("search", "txt").out.decode())
+        error = self.ctl("share", "set", "alpha", "--language", "german", code=1).err.decode()
+        self.assertRegex(error, "cannot lock .*state: ")
+
+        fcntl.flock(root, fcntl.LOCK_UN)
         self.check_works()
 
     def test_state_folder_removed_while_stopped_is_a_first_start(self):

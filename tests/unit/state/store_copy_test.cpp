@@ -2,6 +2,7 @@
 // The copy beside the state database holds what was acknowledged, whatever fails or comes in
 // between.
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/resource.h>
@@ -15,6 +16,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/scoped_fd.h"
 #include "state/store.h"
 #include "tests/unit/state/store_fixture.h"
 
@@ -132,6 +134,22 @@ TEST_F(StoreCopyTest, AChangeThatIsStillThereWithoutItsSharedMemoryIsMadeOnce) {
   std::shared_ptr<const Settings> settings;
   ASSERT_TRUE(OpenStore()->GetSettings(settings));
   EXPECT_NE(settings->FolderAt("/v/a/c"), nullptr);
+}
+
+// Whoever has it may stand still.
+TEST_F(StoreCopyTest, AnotherProgramsLockOnTheRootKeepsOutWhoChangesAndNotWhoReads) {
+  ScopedFd root(open(state_root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  ASSERT_EQ(flock(root.fd, LOCK_EX), 0);
+
+  const auto store = OpenStore();
+  ASSERT_NE(store, nullptr);
+  ExpectAllThere(*store);
+  EXPECT_FALSE(store->SetPause(5));
+  EXPECT_NE(store->Error().find("cannot lock " + state_root), std::string::npos) << store->Error();
+  ExpectAllThere(*store);
+
+  root.Close();
+  EXPECT_TRUE(store->SetPause(5)) << store->Error();
 }
 
 // No more than `more` descriptors can be opened than are open now.
