@@ -156,7 +156,7 @@ TEST_F(StoreCopyTest, AnotherProgramsLockOnTheRootKeepsOutWhoChangesAndNotWhoRea
 class FewDescriptors {
  public:
   explicit FewDescriptors(rlim_t more) {
-    const int next = dup(0);
+    const int next = open("/dev/null", O_RDONLY | O_CLOEXEC);
     close(next);
     EXPECT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
     const rlimit few = {static_cast<rlim_t>(next) + more, before.rlim_max};
