@@ -6,6 +6,7 @@
 #include <exception>
 #include <utility>
 
+#include "index/emptied.h"
 #include "index/last_commit.h"
 #include "index/shrink.h"
 #include "index/writer_impl.h"
@@ -160,8 +161,11 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
     }
     changes_begun = table->changes;
   }
-  if (operation.removal && operation.mode == DeleteMode::STALE && operation.path == share->path &&
-      IsEmptied(*settings, *share)) {
+  // Single deletions are told of one by one, and believed. A refresh is refused as well: where
+  // another folder stands in the root's place, it would look at all that was below.
+  const bool is_single = operation.removal && operation.mode != DeleteMode::STALE;
+  if (!is_single && operation.path == share->path &&
+      IsEmptied(store, *settings, *share, static_cast<uint64_t>(table->entries))) {
     return IndexError::ROOT;
   }
   return operation.removal
@@ -169,19 +173,6 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
              : converger->Refresh(*settings, *share, operation.path, operation.wanted,
                                   operation.decide, seen != nullptr ? &seen->look : nullptr,
                                   operation.added);
-}
-
-// Whether the share's folder is empty where it was not, and nobody said that this is wanted: what
-// was mounted there may be gone. Single deletions are told of one by one, and believed.
-bool EntryWriter::Impl::IsEmptied(const Settings& settings, const Share& share) {
-  const auto folders =
-      std::count_if(settings.folders.begin(), settings.folders.end(),
-                    [&share](const IndexedFolder& folder) { return folder.share == share.name; });
-  if (table->entries <= folders || !IsRootEmpty(share)) {
-    return false;
-  }
-  ShareStatus status;
-  return !store.GetStatus(share.name, status) || !status.accept_empty;
 }
 
 // Gives the transaction up: whatever failed in it left it half done.

@@ -56,7 +56,6 @@ struct EntryWriter::Impl {
   IndexError Replay();
   IndexError ReplayOnce(bool& again);
   IndexError Apply(const EntryOperation& operation, const Seen* seen);
-  bool IsEmptied(const Settings& settings, const Share& share);
   IndexError Fail(IndexError error);
   IndexError FailSql(IndexError error);
   IndexError CommitTransaction();

@@ -89,6 +89,33 @@ TEST_F(RootTest, ReindexOfAFolderThatIsEmptyWhereItWasNotRemovesNothing) {
   EXPECT_LT(Held().size(), before.size());
 }
 
+// What was mounted there from elsewhere on the same file system is gone.
+TEST_F(RootTest, EmptyFolderInPlaceOfTheRootRemovesNothing) {
+  AddAll();
+  const Names before = Held();
+  MakeFolder(At("away"));
+  Run("mount --bind " + At("away") + " " + root);
+  mounted.push_back(root);
+
+  ExpectRefused(writer->Delete(root, DeleteMode::STALE));
+  ExpectRefused(writer->Refresh(root, {}, {}));
+  ExpectRefused(writer->Add(root, {}));
+  Commit();
+  EXPECT_EQ(Held(), before);
+}
+
+TEST_F(RootTest, EmptyRootThatIsAllThatTheIndexHoldsIsRefreshed) {
+  for (const auto& left : std::filesystem::directory_iterator(root)) {
+    std::filesystem::remove_all(left.path());
+  }
+
+  EXPECT_TRUE(writer->Add(root, {}));
+  Commit();
+  EXPECT_TRUE(writer->Refresh(root, {}, {}));
+  Commit();
+  EXPECT_EQ(Held(), Names({""}));
+}
+
 TEST_F(RootTest, ComparisonOfAnUnmountedShareIsRefused) {
   AddAll();
   Unmount(root);
