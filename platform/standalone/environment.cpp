@@ -9,6 +9,8 @@
 #include <set>
 #include <utility>
 
+#include "index/emptied.h"
+#include "index/reader.h"
 #include "platform/log.h"
 #include "state/belonging.h"
 #include "state/queue_writer.h"
@@ -25,6 +27,7 @@ struct Environment {
   std::shared_ptr<const Settings> settings = std::make_shared<Settings>();
   std::map<std::string, bool> commits;  // by share: whether the last one was good
   std::set<std::string> reopening;      // shares with a good commit and no opening since
+  std::set<std::string> put_off;        // shares whose reindex was put off in the pass that runs
   rlimit descriptors = {RLIM_INFINITY, RLIM_INFINITY};
 };
 
@@ -72,6 +75,20 @@ bool IsNews(const char* what, const std::string& share, bool good, StateStore& s
   }
   const std::string reason = store.Error();
   return std::exchange(process.failing[name], reason) != reason;
+}
+
+bool IsShareEmptied(const std::string& share) {
+  StateStore* store = Store();
+  const std::shared_ptr<const Settings> settings = CurrentSettings();
+  const Share* found = settings->ShareByName(share);
+  if (store == nullptr || found == nullptr || LookAtRoot(*found) != RootState::SOUND ||
+      !IsRootEmpty(*found)) {
+    return false;
+  }
+  EntryReader reader;
+  uint64_t entries = 0;
+  return reader.Open(share) == IndexError::NONE && reader.Count(entries) &&
+         IsEmptied(*store, *settings, *found, entries);
 }
 
 }  // namespace
@@ -169,6 +186,30 @@ bool IsRootAway(const std::string& share) {
   const std::shared_ptr<const Settings> settings = CurrentSettings();
   const Share* found = settings->ShareByName(share);
   return found != nullptr && LookAtRoot(*found) != RootState::SOUND;
+}
+
+bool PutReindexOff(const std::string& share) {
+  if (!IsShareEmptied(share)) {
+    return false;
+  }
+  Environment& process = Process();
+  const std::lock_guard guard(process.mutex);
+  process.put_off.insert(share);
+  return true;
+}
+
+void TakeUpReindex(const std::string& share) {
+  Environment& process = Process();
+  {
+    const std::lock_guard guard(process.mutex);
+    if (process.put_off.erase(share) == 0) {
+      return;
+    }
+  }
+  std::string error;
+  if (!IsShareEmptied(share) && !AppendToQueue(share, {}, error)) {
+    FI_LOG("Failed to wake share[%s]: %s", share.c_str(), error.c_str());
+  }
 }
 
 void NoteCommit(const std::string& share, bool good) {

@@ -240,6 +240,7 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
       EndReindex(share);
     }
     if (!share.empty()) {
+      TakeUpReindex(share);
       wait = EndPass(share);
     }
     return status;

@@ -34,7 +34,7 @@ bool StatusMgr::SetUpdated(const std::string& marker) {
 bool StatusMgr::ShareIsNeedReindex(const std::string& share_name) {
   return Uncancelled([&share_name] {
     const ShareStatus status = StatusOf(share_name);
-    return status.needs_reindex || status.reindex_begun;
+    return (status.needs_reindex || status.reindex_begun) && !PutReindexOff(share_name);
   });
 }
 

@@ -1,0 +1,85 @@
+# SPDX-License-Identifier: GPL-2.0-or-later
+"""A share's folder is empty where it was not: what is believed, and what waits."""
+
+import os
+import subprocess
+
+from harness import main, namespace
+from harness.awaiting import IN_CHANGE, await_in_folder
+from harness.checks import IndexTest
+
+DELETE = 0x80
+
+
+class EmptyRoot(IndexTest):
+    def setUp(self):
+        super().setUp()
+        self.root = self.make_share(files=("a.txt", "b.txt", "d/c.txt"))
+        self.start()
+        self.await_drained("alpha")
+        self.assert_index(self.root)
+
+    def empty(self):
+        subprocess.run(["find", self.root, "-mindepth", "1", "-delete"], check=True)
+
+    def reindex(self):
+        self.ctl("reindex", self.root)
+        self.await_drained("alpha")
+
+    def delete(self, *names):
+        self.append("alpha", *({"event": DELETE, "path": f"{self.root}/{name}"} for name in names))
+        self.await_drained("alpha")
+
+    def share(self):
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        return share
+
+    def assert_in_step(self):
+        """Nothing waits any more, and nothing is missed."""
+        self.await_drained("alpha")
+        store = f"{namespace.STATE}/state.db"
+        made_up = await_in_folder(store, lambda: not self.share()["needs_reindex"], mask=IN_CHANGE)
+        self.assertTrue(made_up)
+        self.await_drained("alpha")
+        self.assert_index(self.root)
+        self.assertEqual(self.share()["root"], "sound")
+
+    def test_single_deletes_are_believed_after_a_reindex_that_was_refused(self):
+        self.empty()
+        self.reindex()
+        self.assert_paths(self.root, ["a.txt", "b.txt", "d", "d/c.txt"])
+
+        self.delete("a.txt", "b.txt")
+        self.assert_paths(self.root, ["d", "d/c.txt"])
+        self.assertEqual(self.share()["root"], "empty")
+        self.assertIn(b"folder is empty", self.ctl("verify", "alpha", code=1).err)
+
+        self.delete("d")
+        self.assert_in_step()
+
+    def test_a_reindex_that_was_refused_is_made_up_for_when_the_files_are_back(self):
+        os.rename(self.root, f"{self.root}.away")
+        os.mkdir(self.root)
+        self.reindex()
+        self.delete("nothing")
+        self.assertEqual(self.share()["root"], "empty")
+
+        os.rmdir(self.root)
+        os.rename(f"{self.root}.away", self.root)
+        self.make_files(self.root, "d/new.txt")
+        self.delete("nothing")
+
+        self.assert_in_step()
+
+    def test_acceptance_goes_on_after_a_reindex_that_was_refused(self):
+        self.empty()
+        self.reindex()
+        self.delete("a.txt")
+
+        self.ctl("share", "accept", "alpha")
+
+        self.assert_in_step()
+
+
+if __name__ == "__main__":
+    main()
