@@ -39,8 +39,10 @@ struct ShareFeed::Impl {
   }
 
   void Clear();
+  bool IsRoot(const Settings& settings, const std::string& path) const;
   uint64_t CountBelow(const std::string& directory, uint64_t limit) const;
-  void Queue(const std::vector<QueueLine>& lines);
+  size_t Backlog() const { return backlog->Size() + (root_reindex ? 1 : 0); }
+  void Queue(const Settings& settings, const std::vector<QueueLine>& lines);
   void FoldCrowds(const Settings& settings);
   std::vector<QueueLine> TakeLines(const Settings& settings, size_t most);
   void Write(const Settings& settings, Clock::time_point now, bool at_once, FeedCounts& counts);
@@ -52,7 +54,9 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `deletes` is about
   SentDeletes deletes;
-  const Settings* in_force = nullptr;   // while FoldCrowds runs
+  bool root_reindex = false;           // waits with the backlog
+  bool root_in_file = false;           // the file that was written last holds a reindex of the root
+  const Settings* in_force = nullptr;  // while FoldCrowds runs
   std::unique_ptr<EntryReader> reader;  // the same; null: the index cannot be read
   size_t came = 0;                      // lines, since crowds were folded last
   uint64_t folded = 0;                  // lines that met others in the backlog
@@ -69,24 +73,33 @@ void ShareFeed::Impl::Clear() {
       "/",
       [this](const std::string& directory, uint64_t limit) { return CountBelow(directory, limit); },
       2 * PATHS_KEPT);
+  root_reindex = false;
   came = 0;
   full = false;
   retry = {};
   error.clear();
 }
 
-// The limit, which keeps the lines as they are, where it cannot be told.
+bool ShareFeed::Impl::IsRoot(const Settings& settings, const std::string& path) const {
+  const Share* fed = settings.ShareByName(share);
+  return fed != nullptr && fed->path == path;
+}
+
+// The limit, which keeps the lines as they are, where it cannot be told, and in the root.
 uint64_t ShareFeed::Impl::CountBelow(const std::string& directory, uint64_t limit) const {
   uint64_t below = 0;
   // A directory that only holds indexed folders is not to be reindexed itself.
-  const bool told = reader != nullptr && in_force->FolderOfPath(directory) != nullptr &&
+  const bool told = reader != nullptr && !IsRoot(*in_force, directory) &&
+                    in_force->FolderOfPath(directory) != nullptr &&
                     reader->CountBelow(directory, limit, below);
   return told ? below : limit;
 }
 
-void ShareFeed::Impl::Queue(const std::vector<QueueLine>& lines) {
+void ShareFeed::Impl::Queue(const Settings& settings, const std::vector<QueueLine>& lines) {
   for (const QueueLine& line : lines) {
-    if (line.event == QLIB_NOTIFY_RENAME) {
+    if (line.event == CUSTOM_EVENT_REINDEX && IsRoot(settings, line.path)) {
+      root_reindex = true;
+    } else if (line.event == QLIB_NOTIFY_RENAME) {
       backlog->AddRename(line.path, line.path_old);
     } else {
       backlog->Add(line.event, line.path, line.data);
@@ -115,6 +128,10 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
     file_number = appender.FileNumber();
     deletes.Forget();
   }
+  if (root_reindex) {
+    root_reindex = false;
+    return {{CUSTOM_EVENT_REINDEX, settings.ShareByName(share)->path, {}, {}}};
+  }
   std::vector<QueueLine> waiting = backlog->Take(most);
   std::vector<QueueLine> behind;
   size_t fitting = 0;
@@ -131,7 +148,7 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
     std::move(returned.begin(), returned.end(), std::back_inserter(behind));
   }
 
-  Queue({waiting.begin() + static_cast<std::ptrdiff_t>(fitting), waiting.end()});
+  Queue(settings, {waiting.begin() + static_cast<std::ptrdiff_t>(fitting), waiting.end()});
   waiting.resize(fitting);
   std::move(behind.begin(), behind.end(), std::back_inserter(waiting));
   return waiting;
@@ -139,7 +156,12 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
 
 void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, bool at_once,
                             FeedCounts& counts) {
-  if (backlog->Size() == 0 || (!full && now < retry && !at_once)) {
+  if (Backlog() == 0 || (!full && now < retry && !at_once)) {
+    return;
+  }
+  if ((root_reindex || root_in_file) && appender.IsWaiting()) {
+    full = true;
+    retry = now + RETRY_DELAY;
     return;
   }
 
@@ -159,20 +181,22 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
   std::string reason;
   const Appended result = appender.Append(give, reason);
   if (result == Appended::DONE) {
+    root_in_file = taken.size() == 1 && taken[0].event == CUSTOM_EVENT_REINDEX &&
+                   IsRoot(settings, taken[0].path);
     counts.lines += taken.size();
     for (const QueueLine& line : taken) {
       deletes.Note(line);
     }
     error.clear();
   } else if (result == Appended::FAILED) {
-    Queue(taken);
+    Queue(settings, taken);
     error = reason;
   }
-  full = result == Appended::FULL || (result == Appended::DONE && backlog->Size() > 0);
+  full = result == Appended::FULL || (result == Appended::DONE && Backlog() > 0);
   retry = now;
   if (result == Appended::LOCKED) {
     retry += LOCKED_DELAY;
-  } else if (backlog->Size() > 0) {
+  } else if (Backlog() > 0) {
     retry += RETRY_DELAY;
   }
 }
@@ -203,7 +227,7 @@ std::vector<ChangedFile> ShareFeed::TakeChanged() {
 }
 
 void ShareFeed::AddLines(const Settings& settings, const std::vector<QueueLine>& lines) {
-  impl->Queue(lines);
+  impl->Queue(settings, lines);
   impl->FoldCrowds(settings);
   impl->CheckBounds();
 }
@@ -212,11 +236,11 @@ void ShareFeed::Work(const Settings& settings, Clock::time_point now, bool every
                      Clock::time_point deadline) {
   std::vector<QueueLine> lines;
   impl->gatherer.TakeDue(settings, now, everything, lines, deadline);
-  const size_t expected = impl->backlog->Size() + lines.size();
-  impl->Queue(lines);
+  const size_t expected = impl->Backlog() + lines.size();
+  impl->Queue(settings, lines);
   impl->FoldCrowds(settings);
   // A rename may leave two lines.
-  impl->folded += expected - std::min(expected, impl->backlog->Size());
+  impl->folded += expected - std::min(expected, impl->Backlog());
   counts.folded = impl->gatherer.folded + impl->folded;
   impl->CheckBounds();
   impl->Write(settings, now, everything, counts);
@@ -224,7 +248,7 @@ void ShareFeed::Work(const Settings& settings, Clock::time_point now, bool every
 
 std::optional<ShareFeed::Clock::time_point> ShareFeed::NextDue() const {
   const auto gathered = impl->gatherer.NextDue();
-  if (impl->backlog->Size() == 0) {
+  if (impl->Backlog() == 0) {
     return gathered;
   }
   return gathered.has_value() ? std::min(*gathered, impl->retry) : impl->retry;
@@ -235,7 +259,7 @@ size_t ShareFeed::Gathered() const {
 }
 
 size_t ShareFeed::Backlog() const {
-  return impl->backlog->Size();
+  return impl->Backlog();
 }
 
 bool ShareFeed::TakeLoss() {

@@ -7,6 +7,11 @@
 // is due after a second, and then once a minute. All else is due at once, or, after 20 lines in the
 // last 50 ms, 50 ms later or when 1 MiB of lines are gathered. Nothing here waits: a locked queue
 // and a full one (5,000 lines) are tried again later, and meanwhile the backlog folds.
+//
+// What stands directly in the share's root is never folded into it, and a reindex of the root
+// stands alone in its queue file. In one batch the daemon drops what lies below a reindex, and a
+// root that is empty where it was not takes nothing out of the index: of what is deleted in it,
+// each line counts.
 #pragma once
 
 #include <chrono>

@@ -42,11 +42,9 @@ bool QueueAppender::IsSameFile(const Counted& file) const {
          file.birth_time == counted.birth_time && file.size >= counted.size;
 }
 
-// Without opening it: every close of the file makes the daemon look.
-bool QueueAppender::IsFullStill() const {
+bool QueueAppender::IsWaiting() const {
   Counted file;
-  return counted.lines >= QUEUE_LINE_LIMIT &&
-         Identify(AT_FDCWD, QueuePath(share_name).c_str(), 0, file) && IsSameFile(file);
+  return Identify(AT_FDCWD, QueuePath(share_name).c_str(), 0, file) && IsSameFile(file);
 }
 
 bool QueueAppender::Count(const ScopedFd& locked, std::string& error) {
@@ -71,7 +69,7 @@ bool QueueAppender::Count(const ScopedFd& locked, std::string& error) {
 }
 
 Appended QueueAppender::Append(const Give& give, std::string& error) {
-  if (IsFullStill()) {
+  if (counted.lines >= QUEUE_LINE_LIMIT && IsWaiting()) {
     return Appended::FULL;
   }
   if (!MakeShareFolder(share_name, error)) {

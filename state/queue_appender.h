@@ -35,6 +35,10 @@ class QueueAppender {
   using Give = std::function<std::vector<std::string>(size_t most)>;
   Appended Append(const Give& give, std::string& error);
 
+  // Whether the file that lines were counted in last stands still, and the daemon has not taken it.
+  // Does not open it: every close of the file makes the daemon look.
+  bool IsWaiting() const;
+
   // Of the file that lines were given to last: another number, another file.
   uint64_t FileNumber() const { return file_number; }
 
@@ -52,7 +56,6 @@ class QueueAppender {
 
   static bool Identify(int directory, const char* path, int flags, Counted& file);
   bool IsSameFile(const Counted& file) const;
-  bool IsFullStill() const;
   bool Count(const ScopedFd& locked, std::string& error);
 
   const std::string share_name;

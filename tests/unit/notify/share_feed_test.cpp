@@ -50,6 +50,9 @@ class ShareFeedTest : public FeedTest {
     return EventLine(event, Path(name));
   }
 
+  // Instead of the one folder in it.
+  void IndexRoot() { settings.folders = {{"s", share, {}}}; }
+
   // An index that holds what is on disk, below the indexed folder.
   void MakeIndex(const Texts& names) {
     auto store = OpenStore();
@@ -216,6 +219,52 @@ TEST_F(ShareFeedTest, ACrowdStaysWhereTheIndexCannotBeRead) {
   EXPECT_EQ(Queue().size(), 1001U);
 }
 
+TEST_F(ShareFeedTest, ACrowdDirectlyInTheRootStays) {
+  IndexRoot();
+  MakeIndex({});
+  for (int i = 0; i < 1001; ++i) {
+    Add({DELETED, false, share + "/" + std::to_string(i)});
+  }
+  Work();
+
+  EXPECT_EQ(Queue().size(), 1001U);
+}
+
+TEST_F(ShareFeedTest, WhatIsDeletedInTheRootIsToldBehindItsReindex) {
+  IndexRoot();
+  Add({DELETED, false, share + "/a"});
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}}});
+  Work();
+  Add({DELETED, false, share + "/b"});
+  Work();
+  EXPECT_EQ(Queue(), Texts({EventLine(CUSTOM_EVENT_REINDEX, share)}));
+  EXPECT_EQ(feed.Backlog(), 2U);
+  EXPECT_EQ(feed.counts.folded, 0U);
+  TakeQueue();
+  Work();
+
+  EXPECT_EQ(Queue(), Texts({EventLine(QLIB_NOTIFY_DELETE, share + "/a"),
+                            EventLine(QLIB_NOTIFY_DELETE, share + "/b")}));
+  EXPECT_TRUE(feed.IsWrittenOut());
+}
+
+TEST_F(ShareFeedTest, AReindexOfTheRootWaitsUntilTheLinesBeforeItAreTaken) {
+  IndexRoot();
+  Add({DELETED, false, share + "/a"});
+  Work();
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}}});
+  Work(true);
+  EXPECT_EQ(Queue(), Texts({EventLine(QLIB_NOTIFY_DELETE, share + "/a")}));
+  EXPECT_EQ(feed.Backlog(), 1U);
+  EXPECT_EQ(feed.NextDue(), now + seconds(1));
+  TakeQueue();
+  Work();
+
+  EXPECT_EQ(Queue(), Texts({EventLine(CUSTOM_EVENT_REINDEX, share)}));
+  EXPECT_TRUE(feed.IsWrittenOut());
+  EXPECT_EQ(feed.NextDue(), std::nullopt);
+}
+
 TEST_F(ShareFeedTest, TooMuchGatheredIsALoss) {
   AddWritten(100'000);
   EXPECT_FALSE(feed.TakeLoss());
@@ -243,6 +292,7 @@ TEST_F(ShareFeedTest, TooLongABacklogIsALoss) {
 TEST_F(ShareFeedTest, WhatIsClearedIsNotWritten) {
   Add(File(WRITTEN, "a"));
   feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("b"), {}, {}}});
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}, {}}});
   feed.Clear();
   Work(true);
 
