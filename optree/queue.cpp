@@ -10,6 +10,7 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -17,11 +18,13 @@
 #include <cstdlib>
 #include <exception>
 #include <memory>
+#include <new>
 
 #include "base/scoped_fd.h"
 #include "base/scoped_stream.h"
 #include "optree/event.h"
 #include "platform/log.h"
+#include "platform/share.h"
 
 namespace fileindexd {
 
@@ -30,6 +33,8 @@ namespace {
 constexpr int LOCK_TRIES = 16;
 constexpr int RENAME_TRIES = 16;
 constexpr useconds_t BACK_OFF_US = 10000;  // times 0 to 9
+// Of a pipe, neither the opening nor the reading may wait. Of a file nothing ever does.
+constexpr int READING = O_RDONLY | O_CLOEXEC | O_NONBLOCK;
 
 // The queue file's descriptor while it is locked. Its number is released twice, see Unlock; the
 // destructor stands behind the steps for a thread that is cancelled.
@@ -48,7 +53,7 @@ class QueueLock {
 bool QueueLock::Take(const std::string& queue_path) {
   int error = 0;
   for (int tries = 0; tries < LOCK_TRIES; ++tries) {
-    ScopedFd opened(open(queue_path.c_str(), O_RDONLY | O_CLOEXEC));
+    ScopedFd opened(open(queue_path.c_str(), READING));
     if (opened.fd < 0) {
       return false;  // no queue, nothing to do
     }
@@ -107,13 +112,17 @@ struct LineBuffer {
   size_t capacity = 0;
 };
 
-void InsertLines(OpTree& tree, FILE* stream) {
+// 0, or why not all lines were read and inserted, bad ones aside.
+int InsertLines(OpTree& tree, FILE* stream) {
   LineBuffer buffer;
   std::string line;
+  int lost = 0;
   for (;;) {
+    errno = 0;
     const ssize_t length = getline(&buffer.text, &buffer.capacity, stream);
     if (length < 0) {
-      return;
+      const bool is_end = feof(stream) != 0 && ferror(stream) == 0;
+      return is_end ? lost : errno != 0 ? errno : EIO;
     }
 
     line.assign(buffer.text, static_cast<size_t>(length));
@@ -124,6 +133,8 @@ void InsertLines(OpTree& tree, FILE* stream) {
     bool inserted = false;
     try {
       inserted = AddEvent(tree, line);
+    } catch (const std::bad_alloc&) {
+      lost = ENOMEM;  // nothing is wrong with the line
     } catch (const std::exception&) {
       inserted = false;  // one line is lost, not the batch
     }
@@ -133,20 +144,33 @@ void InsertLines(OpTree& tree, FILE* stream) {
   }
 }
 
+bool IsRegularFile(int fd) {
+  struct stat found = {};
+  return fstat(fd, &found) == 0 && S_ISREG(found.st_mode);
+}
+
 OpTree* ReadDrained(const std::string& share_path, const std::string& drained_path) {
   // Not fopen: a thread cancelled in the open would leave the stream behind.
-  ScopedFd opened(open(drained_path.c_str(), O_RDONLY | O_CLOEXEC));
+  ScopedFd opened(open(drained_path.c_str(), READING));
   ScopedFile stream(opened.fd < 0 ? nullptr : fdopen(opened.fd, "r"));
   if (stream.file == nullptr) {
+    const int error = errno;
     FI_LOG("Failed to open queue, path=%s, reason=%m", drained_path.c_str());
+    // What is not there is still in the queue file. What is there, the caller removes.
+    if (error != ENOENT) {
+      TALO::FILEINDEX::NoteLostChanges(share_path, error);
+    }
     return nullptr;
   }
 
   (void)opened.Release();  // the stream's now
 
   auto tree = std::make_unique<OpTree>(share_path);
-  InsertLines(*tree, stream.file);
+  const int lost = IsRegularFile(fileno(stream.file)) ? InsertLines(*tree, stream.file) : EINVAL;
   stream.Close();
+  if (lost != 0) {
+    TALO::FILEINDEX::NoteLostChanges(share_path, lost);
+  }
   return tree.release();
 }
 

@@ -35,6 +35,11 @@ namespace TALO::FILEINDEX {
 // that cannot be written makes the share need a reindex instead.
 void AddCustomEvent(const int& event, const std::string& path, const Json::Value& data);
 
+// Told that changes were lost on their way into the index of the share that holds `path`, as
+// something failed with `error` (of errno): the whole share has to be indexed again. Never tests
+// for cancellation.
+void NoteLostChanges(const std::string& path, int error);
+
 // Stores the name of the share that holds `path`. False when there is none, the name unchanged.
 bool GetShareNameByPath(std::string& share_name, const std::string& path);
 

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <cerrno>
 #include <exception>
 #include <memory>
 #include <new>
@@ -77,8 +78,11 @@ int Worker::ExecuteTree(OpTree* tree) {
 
     try {
       Execute(*node);
-    } catch (const std::exception&) {
+    } catch (const std::exception& failure) {
       FI_LOG("Failed to execute op %d, path=%s", node->op, node->name.c_str());
+      if (dynamic_cast<const std::bad_alloc*>(&failure) != nullptr) {
+        TALO::FILEINDEX::NoteLostChanges(share_path, ENOMEM);
+      }
     }
 
     // One node, which may be a whole walk, is never interrupted. A stop does not commit.

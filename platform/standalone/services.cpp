@@ -169,9 +169,10 @@ std::string ShareOfDrainedCopy(const std::string& path) {
 }
 
 // The drained copy is the last that is known of its events: before it goes, what a failed commit
-// has left undone is put on record. False when it has to stay.
+// or a short pass has left undone is put on record. False when it has to stay.
 bool MayRemoveDrainedCopy(const std::string& share) {
-  return WasLastCommitGood(share) || RequestReindex(share);
+  return (WasLastCommitGood(share) || RequestReindex(share)) &&
+         (!IsPassShort(share) || RecordReindex(share));
 }
 
 // A pass that removes the copy was not stopped: a reindex that was begun has ended, if the share

@@ -6,6 +6,7 @@
 #include "base/event_codes.h"
 #include "platform/log.h"
 #include "platform/standalone/environment.h"
+#include "platform/standalone/shortage.h"
 #include "platform/standalone/uncancelled.h"
 #include "state/belonging.h"
 #include "state/filesystem.h"
@@ -113,6 +114,15 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
     }
     return true;
   });
+}
+
+void NoteLostChanges(const std::string& path, int error) {
+  const CancelOff off;
+  const std::shared_ptr<const Settings> settings = CurrentSettings();
+  const Share* share = FindShareOfPath(*settings, path);
+  if (share != nullptr) {
+    NoteFailedLook(share->name, path, error);
+  }
 }
 
 bool GetShareNameByPath(std::string& share_name, const std::string& path) {

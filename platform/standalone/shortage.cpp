@@ -70,6 +70,13 @@ void NoteFailedLook(const std::string& share, const std::string& path, int error
   }
 }
 
+bool IsPassShort(const std::string& share) {
+  Passes& passes = ThePasses();
+  const std::lock_guard guard(passes.mutex);
+  const auto found = passes.by_share.find(share);
+  return found != passes.by_share.end() && found->second.is_short;
+}
+
 unsigned EndPass(const std::string& share) {
   const int tries = CountShort(share);
   if (tries == 0) {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// Passes that ran out of descriptors.
+// Passes that ran out of descriptors, or could not read what was queued for them.
 //
 // What a walk has no descriptor for it passes over without a word. So the shares that this happens
 // to are kept here, by name; at the end of such a pass the whole share is asked for again, a few
@@ -14,8 +14,12 @@ namespace fileindexd {
 // Whether what failed with `error` lacked nothing but a descriptor.
 bool IsShortage(int error);
 
-// A look at `path`, or its opening, failed for want of a descriptor.
+// Something failed in the share's pass, and the index lacks changes at or below `path`: a look or
+// an opening, for want of a descriptor; the reading of the queue, for any reason.
 void NoteFailedLook(const std::string& share, const std::string& path, int error);
+
+// Whether such a thing was noted since the last EndPass of the share.
+bool IsPassShort(const std::string& share);
 
 // At the end of a pass. Microseconds to wait before the next one, 0 when the pass was whole, or
 // when it is not tried again: then the share's needs-reindex flag stands until its next event.

@@ -77,6 +77,10 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
                     std::to_string(event) + " " + path + " " + data.toString());
 }
 
+void NoteLostChanges(const std::string& path, int error) {
+  TheScript().Enter("NoteLostChanges", path, path + " " + std::to_string(error));
+}
+
 bool GetShareNameByPath(std::string& share_name, const std::string& path) {
   const auto answer = TheScript().Enter("GetShareNameByPath", path, path);
   if (answer && *answer == 0) {

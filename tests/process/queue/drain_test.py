@@ -4,6 +4,7 @@
 import fcntl
 import os
 import re
+import socket
 
 from harness import IndexTest, main
 
@@ -223,6 +224,48 @@ class LeftoverCopyTest(IndexTest):
         )
         self.await_drained("alpha")
         self.assert_index(root)
+
+    def check_lost_copy(self, make_copy, *told):
+        """A copy of which nothing can be read: the whole share is looked at in its place."""
+        root = self.make_share()
+        pid = self.start()
+        self.await_drained("alpha")
+        self.stop(pid)
+        self.make_files(root, "never/announced.txt")
+        make_copy(self.queue("alpha") + ".tmp")
+        after = self.log.mark()
+
+        self.start()
+
+        self.await_lines([*told, f"IndexDirAdd: {root}"], after)
+        self.await_drained("alpha")
+        self.assert_index(root)
+        (share,) = self.ctl("status", "--json").json()["shares"]
+        self.assertFalse(share["needs_reindex"])
+
+    def test_copy_that_cannot_be_opened_has_the_share_indexed_again(self):
+        def make_socket(path):
+            with socket.socket(socket.AF_UNIX) as made:
+                made.bind(path)
+
+        self.check_lost_copy(
+            make_socket,
+            f"Failed to open queue, path={self.queue('alpha')}.tmp, "
+            "reason=No such device or address",
+            re.compile(r"Share\[alpha\] has to be indexed again, .*, reason=No such device .*"),
+        )
+
+    def test_copy_that_cannot_be_read_has_the_share_indexed_again(self):
+        self.check_lost_copy(
+            lambda path: os.symlink("/proc/self/mem", path),
+            re.compile(r"Share\[alpha\] has to be indexed again, .*, reason=Input/output error"),
+        )
+
+    def test_queue_that_is_a_pipe_holds_nobody_up(self):
+        def make_pipe(path):
+            os.mkfifo(path.removesuffix(".tmp"))
+
+        self.check_lost_copy(make_pipe)
 
     def test_empty_copy_does_no_harm(self):
         root = self.make_share()

@@ -5,7 +5,13 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/file.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
 #include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+#include <new>
 
 #include "base/scoped_fd.h"
 #include "platform/log.h"
@@ -43,6 +49,8 @@ class QueueTest : public ::testing::Test {
     EXPECT_EQ(scripted::OpenDescriptors(), before);
     return tree == nullptr ? NO_QUEUE : Render(*tree);
   }
+
+  static std::string Lost(int error) { return "NoteLostChanges /v/s " + std::to_string(error); }
 
   scripted::TempFolder folder;
   std::string queue_path;
@@ -149,6 +157,7 @@ TEST_F(QueueTest, AQueueThatCannotBeMovedIsTriedSixteenTimesAndReportedByTheMiss
   EXPECT_THAT(TheScript().Texts(), ElementsAre("Failed to open queue, path=" + queue_path +
                                                ".tmp, reason=No such file or directory"));
   EXPECT_TRUE(HasQueue());
+  EXPECT_THAT(TheScript().Calls(), IsEmpty());  // nothing is lost
 }
 
 TEST_F(QueueTest, AMoveThatSucceedsAtTheLastTryIsAsGood) {
@@ -218,6 +227,61 @@ TEST_F(QueueTest, AQueueThatIsADirectoryIsNoReasonToFail) {
   folder.MakeDir("TALO@file_index_queue");
 
   EXPECT_EQ(Drain(), "empty");  // it can be locked, moved and opened, but gives no line
+  EXPECT_THAT(TheScript().Calls(), ElementsAre(Lost(EINVAL)));
+}
+
+TEST_F(QueueTest, AQueueThatIsAPipeIsNotWaitedFor) {
+  ASSERT_EQ(mkfifo(queue_path.c_str(), 0600), 0);
+
+  EXPECT_EQ(Drain(), "empty");
+  EXPECT_THAT(TheScript().Calls(), ElementsAre(Lost(EINVAL)));
+}
+
+TEST_F(QueueTest, ACopyThatIsAPipeIsNotReadHoweverMuchIsWrittenIntoIt) {
+  const std::string drained_path = queue_path + ".tmp";
+  ASSERT_EQ(mkfifo(drained_path.c_str(), 0600), 0);
+  const ScopedFd writer(open(drained_path.c_str(), O_RDWR));
+  ASSERT_GT(write(writer.fd, ADD_A, strlen(ADD_A)), 0);
+
+  EXPECT_EQ(Drain(), "empty");
+  EXPECT_THAT(TheScript().Calls(), ElementsAre(Lost(EINVAL)));
+}
+
+TEST_F(QueueTest, ACopyThatCannotBeOpenedIsToldAsLost) {
+  WriteQueue(ADD_A);
+  rlimit before = {};
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+  TheScript().Run("rename", 1, [&] {
+    const ScopedFd next(dup(STDIN_FILENO));
+    const rlimit none_left = {static_cast<rlim_t>(next.fd), before.rlim_max};
+    setrlimit(RLIMIT_NOFILE, &none_left);
+  });
+  TheScript().Run("WriteLog", 1, [&] { setrlimit(RLIMIT_NOFILE, &before); });
+
+  EXPECT_EQ(Drain(), NO_QUEUE);
+
+  EXPECT_THAT(TheScript().Texts(), ElementsAre("Failed to open queue, path=" + queue_path +
+                                               ".tmp, reason=Too many open files"));
+  EXPECT_THAT(TheScript().Calls(), ElementsAre(Lost(EMFILE)));
+}
+
+TEST_F(QueueTest, ACopyThatCannotBeReadToItsEndIsToldAsLost) {
+  // Reads as a file does, and fails at its first byte.
+  ASSERT_EQ(symlink("/proc/self/mem", (queue_path + ".tmp").c_str()), 0);
+
+  EXPECT_EQ(Drain(), "empty");
+  EXPECT_THAT(TheScript().Calls(), ElementsAre(Lost(EIO)));
+}
+
+TEST_F(QueueTest, ALineForWhichThereIsNoMemoryIsToldAsLostAndTheNextOnesAreRead) {
+  WriteQueue(std::string(ADD_A) + ADD_B + "{\"event\":64,\"path\":\"/v/s/c\"}\n");
+  TheScript().Run("StringStartWith", 1, [] { throw std::bad_alloc(); });
+
+  EXPECT_EQ(Drain(), "7 /v/s {1 /v/s/a, 1 /v/s/c}");
+
+  EXPECT_THAT(TheScript().Texts(),
+              ElementsAre("Failed to insert event: {\"event\":64,\"path\":\"/v/s/b\"}"));
+  EXPECT_THAT(TheScript().Calls(), ElementsAre(Lost(ENOMEM)));
 }
 
 TEST_F(QueueTest, TheLockDescriptorsNumberIsOursUntilTheEndOfTheDrain) {

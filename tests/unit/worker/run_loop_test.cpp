@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <cerrno>
+#include <new>
 #include <stdexcept>
 
 #include "base/mutex_guard.h"
@@ -206,6 +207,17 @@ TEST_F(WorkerRunLoopTest, ANodeThatThrowsIsToldAndTheNextOneIsExecuted) {
 
   EXPECT_THAT(Log(), ElementsAre("Failed to execute op 2, path=" + In("a")));
   EXPECT_EQ(script.CallCount("DelFSDocument"), 2);
+}
+
+TEST_F(WorkerRunLoopTest, ANodeForWhichThereIsNoMemoryIsToldAsLost) {
+  Queue({Event(128, In("a")), Event(128, In("b"))});
+  script.Run("DelFSDocument", 1, [] { throw std::bad_alloc(); });
+
+  EXPECT_EQ(Pass(), PASS_DONE);
+
+  EXPECT_THAT(Log(), ElementsAre("Failed to execute op 2, path=" + In("a")));
+  EXPECT_THAT(script.Calls(),
+              Contains("NoteLostChanges " + share_path + " " + std::to_string(ENOMEM)));
 }
 
 TEST_F(WorkerRunLoopTest, ANodeThatThrowsWhileAStopIsAskedForEndsThePass) {
