@@ -54,6 +54,16 @@ int WatchQueueFolder(int inotify_fd, const std::string& queue_path) {
   return inotify_add_watch(inotify_fd, dirname(path), IN_CLOSE_WRITE);
 }
 
+// For a Worker whose folder could not be watched, or was removed and made anew. Where the watch
+// stands, the kernel gives the same one.
+void WatchAgain(int inotify_fd, Worker* worker) {
+  const int wd = WatchQueueFolder(inotify_fd, worker->queue_path);
+  if (wd >= 0 && wd != worker->wd) {
+    inotify_rm_watch(inotify_fd, worker->wd);
+    worker->wd = wd;
+  }
+}
+
 }  // namespace
 
 bool Daemon::SetupWorkers() {
@@ -193,6 +203,7 @@ bool Daemon::ReloadFolder(const std::string& share_name) {
     return false;
   }
 
+  WatchAgain(inotify_fd, found->second);
   // Until a thread has marked itself running, its Worker would look as if it had none.
   found->second->AwaitStart();
   if (!found->second->ReloadSetting()) {

@@ -74,10 +74,12 @@ int rename(const char* from, const char* to) noexcept {
 }
 
 unsigned sleep(unsigned seconds) {
+  TheScript().RecordWait("sleep", seconds);
   return Fails("sleep") ? 0 : Library("sleep", sleep)(seconds);
 }
 
 int usleep(useconds_t time) {
+  TheScript().RecordWait("usleep", time);
   return Fails("usleep") ? 0 : Library("usleep", usleep)(time);
 }
 
@@ -172,6 +174,7 @@ int pthread_create(pthread_t* thread, const pthread_attr_t* kind, void* (*entry)
 
 // Any answer: the wait for a thread ends at once when the thread has not ended.
 int pthread_timedjoin_np(pthread_t thread, void** result, const timespec* until) {
+  TheScript().RecordWait("pthread_timedjoin_np", until->tv_sec);
   const auto at_once = TheScript().EnterUnrecorded("pthread_timedjoin_np", "");
   timespec limit = *until;
   if (at_once) {

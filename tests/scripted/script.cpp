@@ -51,6 +51,7 @@ void Script::Reset() {
   no_space.clear();
   index_error = 0;
   system_error = 0;
+  waits.clear();
   removable_below.clear();
   rules_overlapped = false;
   rules.clear();
@@ -59,6 +60,11 @@ void Script::Reset() {
   calls.clear();
   lines.clear();
   plain = true;
+}
+
+void Script::RecordWait(const std::string& name, int64_t time) {
+  const MutexGuard lock(&mutex);
+  waits[name].push_back(time);
 }
 
 void Script::Answer(const std::string& operation, int nth, int value) {

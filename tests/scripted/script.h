@@ -100,6 +100,7 @@ class Script {
   // The same without a record, for what is called for every comparison.
   std::optional<int> EnterUnrecorded(const std::string& operation, const std::string& subject);
   void Record(LogLine line);
+  void RecordWait(const std::string& name, int64_t time);
 
   // Recursive: the thread sanitizer runs a signal's handler, which logs, at the end of whatever
   // call of the library comes next, and that may be the one that took this lock.
@@ -112,8 +113,11 @@ class Script {
   std::set<std::string> markers;
   std::set<std::string> need_reindex;
   std::set<std::string> no_space;
-  int index_error = 0;          // what ErrorHandler::GetError says
-  int system_error = 0;         // what QLIBCErrGet says
+  int index_error = 0;   // what ErrorHandler::GetError says
+  int system_error = 0;  // what QLIBCErrGet says
+  // What some calls of the C library were told to wait for, by name: the seconds of `sleep`, the
+  // microseconds of `usleep`, the second until which `pthread_timedjoin_np` waits.
+  std::map<std::string, std::vector<int64_t>> waits;
   std::string removable_below;  // "/bin/rm" removes below this folder only; empty: nothing
 
   // Alive now. Not touched by Reset.

@@ -20,12 +20,28 @@ class WorkersTest(IndexTest):
         self.await_drained("alpha")
         self.assertEqual(self.command("delete_share_worker", share_name="alpha"), 0)
         self.make_files(root, "a.txt")
+        after = self.log.mark()
 
         self.append("alpha", {"event": CREATE, "path": f"{root}/a.txt"})
         self.assertEqual(self.command("resume"), 0)
         self.assertTrue(os.path.exists(self.queue("alpha")))
+        self.assert_not_logged("Failed to get worker .*", after)  # nobody watches any more
 
         self.assertEqual(self.command("revive_share_worker", share_name="alpha"), 0)
+        self.await_drained("alpha")
+        self.assert_index(root)
+
+    def test_share_whose_folder_was_removed_is_drained_once_its_settings_are_read_again(self):
+        root = self.make_share(files=("a.txt",))
+        self.start()
+        self.await_drained("alpha")
+        shutil.rmtree(f"{namespace.STATE}/shares/alpha")
+        os.mkdir(f"{namespace.STATE}/shares/alpha", 0o700)  # as whoever queues for it does
+        self.make_files(root, "b.txt")
+        self.append("alpha", {"event": CREATE, "path": f"{root}/b.txt"})
+
+        self.assertEqual(self.command("upsert_folder_setting", folder_path=root), 0)
+
         self.await_drained("alpha")
         self.assert_index(root)
 

@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <cerrno>
+#include <ctime>
+#include <filesystem>
 #include <thread>
 
 #include "base/mutex_guard.h"
@@ -9,10 +11,13 @@ namespace fileindexd {
 namespace {
 
 using scripted::EVERY_CALL;
+using ::testing::AllOf;
 using ::testing::Contains;
 using ::testing::ElementsAre;
+using ::testing::Ge;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Le;
 
 class RegistryTest : public DaemonFixture {
  protected:
@@ -22,6 +27,12 @@ class RegistryTest : public DaemonFixture {
       names.push_back(entry.first);
     }
     return names;
+  }
+
+  static int64_t Now() {
+    timespec now = {};
+    clock_gettime(CLOCK_REALTIME, &now);
+    return now.tv_sec;
   }
 };
 
@@ -167,7 +178,7 @@ TEST_F(RegistryTest, StoppingJoinsAThreadThatEndsByItself) {
   EXPECT_EQ(Log().back(), "Worker[a] cancelled");
 }
 
-// The wait of 50 s is cut short: the thread has not ended then.
+// The wait of 50 s is cut short: the thread has not ended then. Its waits end at a time of day.
 TEST_F(RegistryTest, AThreadThatDoesNotEndIsCancelledAndItsWorkerDeleted) {
   SetUpShares({"a"});
   WriteQueue("a", "/x");
@@ -175,12 +186,19 @@ TEST_F(RegistryTest, AThreadThatDoesNotEndIsCancelledAndItsWorkerDeleted) {
   daemon.RunWorkers();
   ASSERT_TRUE(script.AwaitBlocked());
   script.Answer("pthread_timedjoin_np", 1, 0);
+  TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
+  const int64_t before = Now();
 
   daemon.DeleteWorker("a");
 
+  const int64_t after = Now();
   EXPECT_TRUE(daemon.workers.empty());
-  EXPECT_THAT(Log(), ElementsAre("Failed to wait thread[a], reason=Connection timed out"));
-  EXPECT_EQ(script.CallCount("pthread_timedjoin_np"), 2);
+  EXPECT_THAT(Log(), ElementsAre("Worker[a] deleted",
+                                 "Failed to wait thread[a], reason=Connection timed out",
+                                 "Worker[a] cancelled"));
+  EXPECT_THAT(
+      script.waits["pthread_timedjoin_np"],
+      ElementsAre(AllOf(Ge(before + 50), Le(after + 50)), AllOf(Ge(before + 2), Le(after + 2))));
 }
 
 TEST_F(RegistryTest, AThreadThatOutlivesBothWaitsLosesItsWorkerWhichIsNeverFreed) {
@@ -249,6 +267,55 @@ TEST_F(RegistryTest, AFolderOfAKnownShareReloadsItsSettings) {
 
   EXPECT_EQ(daemon.workers["a"]->folders.size(), 2U);
   EXPECT_EQ(daemon.workers["a"]->state, WORKER_IDLE);
+}
+
+TEST_F(RegistryTest, AReloadKeepsTheWatchThatStands) {
+  SetUpShares({"a"});
+  const int before = daemon.workers["a"]->wd;
+
+  EXPECT_TRUE(daemon.UpsertFolderSetting(SharePath("a")));
+
+  EXPECT_EQ(daemon.workers["a"]->wd, before);
+}
+
+TEST_F(RegistryTest, AReloadWatchesAQueueFolderThatWasMadeAnew) {
+  SetUpShares({"a"});
+  std::filesystem::remove_all(folder.Path("queue-a"));
+  EXPECT_TRUE(daemon.UpsertFolderSetting(SharePath("a")));  // nothing to watch
+  folder.MakeDir("queue-a");
+
+  EXPECT_TRUE(daemon.UpsertFolderSetting(SharePath("a")));
+
+  WriteQueue("a", "/x");
+  daemon.HandleQueueEvents();
+  AwaitFinished("a");
+  EXPECT_THAT(Log(), IsEmpty());
+}
+
+TEST_F(RegistryTest, AReloadWatchesAQueueFolderOnlyWhereItLiesNow) {
+  SetUpShares({"a"});
+  std::filesystem::rename(folder.Path("queue-a"), folder.Path("away"));
+  folder.MakeDir("queue-a");
+
+  EXPECT_TRUE(daemon.UpsertFolderSetting(SharePath("a")));
+
+  folder.Write("away/TALO@file_index_queue", "");
+  WriteQueue("a", "/x");
+  daemon.HandleQueueEvents();
+  AwaitFinished("a");
+  EXPECT_THAT(Log(), IsEmpty());
+}
+
+TEST_F(RegistryTest, AReloadMakesUpForAWatchThatFailed) {
+  SetUpShares({});
+  std::filesystem::remove_all(folder.Path("queue-a"));
+  ASSERT_TRUE(daemon.CreateWorker("a", false));
+  ASSERT_EQ(daemon.workers["a"]->wd, -1);
+  folder.MakeDir("queue-a");
+
+  EXPECT_TRUE(daemon.UpsertFolderSetting(SharePath("a")));
+
+  EXPECT_GE(daemon.workers["a"]->wd, 0);
 }
 
 TEST_F(RegistryTest, FailedUpsertsHaveTheirLines) {
