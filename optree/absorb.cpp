@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <utility>
+
 #include "optree/op_tree.h"
 #include "platform/log.h"
 #include "platform/paths.h"
@@ -7,21 +9,29 @@ namespace fileindexd {
 
 namespace {
 
-// A flag once true stays true; afterwards all four are there, as booleans.
+// A flag once true stays true; afterwards all four are there, as booleans. All or nothing: where
+// the data cannot take them, or holds a member of that name that is no flag, it stays as it was.
 void MergeFlags(OpNode* node, const Json::Value& data) {
   // Wanted: one boolean serves all four reads and is not reset, so a flag that the new data lacks
   // takes the value that was read for the flag before it.
   bool flag = false;
+  Json::Value merged = node->data;
   for (const char* key : {"document", "audio", "video", "photo"}) {
     TALO::FILEINDEX::RetrieveBoolFromJsonObj(flag, key, data);
-    const bool before = node->data.get(key, false).asBool();
-    node->data[key] = before || flag;
+    const bool before = merged.get(key, false).asBool();
+    merged[key] = before || flag;
   }
+  node->data = std::move(merged);
 }
 
 }  // namespace
 
 void AbsortOP(OpNode* node, int op, const Json::Value& data) {
+  // First, as a merge may throw: what was pending below is dropped in any case.
+  if (op == OP_DELETE || op == OP_REINDEX) {
+    ClearChildren(node);
+  }
+
   // Wanted: the pending operation decides, not the new one. An update of a subtree stays one even
   // when the path is deleted: it is followed by a clean walk.
   if (node->op == OP_UPDATE_DIR) {
@@ -33,10 +43,6 @@ void AbsortOP(OpNode* node, int op, const Json::Value& data) {
     FI_DEBUG("AbsortOP %s: %d -> %d", node->name.c_str(), node->op, op);
     node->op = op;
     node->data = data;
-  }
-
-  if (op == OP_DELETE || op == OP_REINDEX) {
-    ClearChildren(node);
   }
 }
 

@@ -85,8 +85,9 @@ bool Covers(const OpNode& node, const std::string& path);
 std::string CommonParent(const OpNode& node, const std::string& path);
 
 // Merges a new operation into a node of the same path. Which operation survives is decided by the
-// node's own; a new delete or reindex drops what was pending below, in any case. Throws where the
-// node's data is neither an object nor null and flags have to be merged into it.
+// node's own; a new delete or reindex drops what was pending below, in any case. Throws where
+// flags have to be merged into data that is neither an object nor null, or that has text, an array
+// or an object for one of the four; the data is unchanged then.
 void AbsortOP(OpNode* node, int op, const Json::Value& data);
 
 // Takes `child` out of the node's children without deleting it; one that is not there is ignored.

@@ -120,6 +120,19 @@ TEST_F(AbsorptionTest, DataThatHasNoMembersCannotTakeFlags) {
   }
 }
 
+TEST_F(AbsorptionTest, FlagsThatAreNoBooleansStopTheMergeAsAWholeButNotTheDroppingOfChildren) {
+  for (const char* data :
+       {R"({"document":true,"video":"x"})", R"({"audio":[]})", R"({"photo":{"k":1}})"}) {
+    const auto tree = TreeWith(OP_UPDATE_DIR, data);
+    const std::string before = Render(*tree);
+    EXPECT_THROW(tree->Insert(OP_ADD, "/v/s/d", Parse(R"({"audio":true})")), std::exception);
+    EXPECT_EQ(Render(*tree), before);
+
+    EXPECT_THROW(tree->Insert(OP_DELETE, "/v/s/d", Json::Value()), std::exception);
+    EXPECT_EQ(Render(*tree), "5 /v/s/d=" + Parse(data).toString());
+  }
+}
+
 TEST_F(AbsorptionTest, AnAddsDataIsReplacedAsAWhole) {
   OpNode node(OP_ADD, "/v/s/d", Parse(R"({"x":1})"));
 
