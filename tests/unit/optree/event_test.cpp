@@ -51,6 +51,7 @@ TEST_F(EventTest, EachCodeGivesItsOperations) {
       {R"({"event":66560,"path":"/v/s/a"})", "6 /v/s/a"},
       {R"({"event":72,"path":"/v/s/a"})", "1 /v/s/a"},
       {R"({"event":64.0,"path":"/v/s/a"})", "1 /v/s/a"},
+      {R"({"event":64.7,"path":"/v/s/a"})", "1 /v/s/a"},
       {R"({"event":64,"path":""})", "1 "},
       {"  {\"event\":64,\"path\":\"/v/s/a\"}\r", "1 /v/s/a"},
   };
@@ -58,6 +59,12 @@ TEST_F(EventTest, EachCodeGivesItsOperations) {
     EXPECT_EQ(TreeOf(row.line), row.tree) << row.line;
   }
   EXPECT_THAT(Log(), IsEmpty());
+}
+
+TEST_F(EventTest, ACodeMayBeWhateverConvertsToANumber) {
+  EXPECT_EQ(TreeOf(R"({"event":true,"path":"/v/s/a"})"), "0 /v/s/a");
+  EXPECT_EQ(TreeOf(R"({"event":null,"path":"/v/s/a"})"), "0 /v/s/a");
+  EXPECT_THAT(Log(), ElementsAre("Unknown event: 1, path=/v/s/a", "Unknown event: 0, path=/v/s/a"));
 }
 
 TEST_F(EventTest, ARenameHidesAllOtherBits) {

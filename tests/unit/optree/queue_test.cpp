@@ -12,6 +12,8 @@
 #include <cerrno>
 #include <cstring>
 #include <new>
+#include <set>
+#include <vector>
 
 #include "base/scoped_fd.h"
 #include "platform/log.h"
@@ -105,6 +107,44 @@ TEST_F(QueueTest, AWriterThatKeepsTheLockKeepsTheQueue) {
   EXPECT_FALSE(HasDrained());
 }
 
+TEST_F(QueueTest, BetweenTheTriesItSleepsForARandomNumberOfHundredthsOfASecond) {
+  WriteQueue(ADD_A);
+  TheScript().Answer("flock", EVERY_CALL, EAGAIN);
+  TheScript().Answer("usleep", EVERY_CALL, 0);
+  for (int drain = 0; drain < 20; ++drain) {
+    EXPECT_EQ(Drain(), NO_QUEUE);
+  }
+
+  const std::vector<int64_t> times = TheScript().waits["usleep"];
+  EXPECT_EQ(std::set<int64_t>(times.begin(), times.end()),
+            (std::set<int64_t>{0, 10000, 20000, 30000, 40000, 50000, 60000, 70000, 80000, 90000}));
+}
+
+TEST_F(QueueTest, AnotherReadersLockKeepsTheQueueToo) {
+  WriteQueue(ADD_A);
+  const ScopedFd reader(open(queue_path.c_str(), O_RDONLY));
+  ASSERT_EQ(flock(reader.fd, LOCK_SH), 0);
+  TheScript().Answer("usleep", EVERY_CALL, 0);
+
+  EXPECT_EQ(Drain(), NO_QUEUE);
+  EXPECT_EQ(TheScript().CallCount("usleep"), 16);
+}
+
+TEST_F(QueueTest, TheQueueIsLockedWhileItIsMoved) {
+  WriteQueue(ADD_A);
+  int locked = 0;
+  int error = 0;
+  TheScript().Run("rename", 1, [&] {
+    const ScopedFd writer(open(queue_path.c_str(), O_RDONLY));
+    locked = flock(writer.fd, LOCK_EX | LOCK_NB);
+    error = errno;
+  });
+
+  EXPECT_EQ(Drain(), "1 /v/s/a");
+  EXPECT_EQ(locked, -1);
+  EXPECT_EQ(error, EWOULDBLOCK);
+}
+
 TEST_F(QueueTest, ALockThatIsFreeAtTheLastTryIsTaken) {
   for (const int error : {EAGAIN, EINTR}) {
     TheScript().Reset();
@@ -153,7 +193,7 @@ TEST_F(QueueTest, AQueueThatCannotBeMovedIsTriedSixteenTimesAndReportedByTheMiss
   EXPECT_EQ(Drain(), NO_QUEUE);
 
   EXPECT_EQ(TheScript().CallCount("rename"), 16);
-  EXPECT_EQ(TheScript().CallCount("sleep"), 16);
+  EXPECT_EQ(TheScript().waits["sleep"], std::vector<int64_t>(16, 1));
   EXPECT_THAT(TheScript().Texts(), ElementsAre("Failed to open queue, path=" + queue_path +
                                                ".tmp, reason=No such file or directory"));
   EXPECT_TRUE(HasQueue());
