@@ -4,6 +4,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <chrono>
@@ -34,6 +35,7 @@ namespace {
 constexpr int STOP_WAIT_MS = 10000;
 constexpr int KILL_WAIT_MS = 1000;
 constexpr std::chrono::seconds KEPT_COPY_PAUSE(1);
+constexpr useconds_t SHORTAGE_PAUSE_US = 100'000;
 
 struct SystemError {
   int code = 0;
@@ -237,12 +239,17 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
 
     const std::array<const char*, 6> arguments = {program, arg1, arg2, arg3, arg4, nullptr};
     const int status = RunProgram(arguments.data());
+    if (status < 0 && (IsShortage(errno) || errno == EAGAIN)) {
+      // What could not be removed, or read, is tried again at once: until others let go of what is
+      // lacking, that would be all that the processor does.
+      wait = SHORTAGE_PAUSE_US;
+    }
     if (!share.empty() && status == 0) {
       EndReindex(share);
     }
     if (!share.empty()) {
       TakeUpReindex(share);
-      wait = EndPass(share);
+      wait = std::max(wait, EndPass(share));
     }
     return status;
   });

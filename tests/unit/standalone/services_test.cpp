@@ -1,0 +1,85 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Programs run on the platform that is shipped.
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <ctime>
+#include <filesystem>
+
+#include "base/scoped_fd.h"
+#include "platform/standalone/environment.h"
+#include "platform/system.h"
+#include "state/filesystem.h"
+#include "state/layout.h"
+#include "tests/unit/state/mounts.h"
+
+namespace {
+
+std::atomic<useconds_t> slept = 0;
+
+}  // namespace
+
+// In front of the C library's.
+extern "C" int usleep(useconds_t time) {
+  slept += time;
+  const timespec duration = {static_cast<time_t>(time / 1000000),
+                             static_cast<long>(time % 1000000) * 1000};
+  return nanosleep(&duration, nullptr);
+}
+
+namespace fileindexd {
+namespace {
+
+class ServicesTest : public MountTest {
+ protected:
+  void SetUp() override {
+    MountTest::SetUp();
+    if (IsSkipped()) {
+      return;
+    }
+    MakeFolder(root);
+    const auto store = OpenStore();
+    ASSERT_NE(store, nullptr);
+    ASSERT_TRUE(store->AddShare({"s", root, FilesystemIdentity(root)})) << store->Error();
+    std::string error;
+    ASSERT_TRUE(MakeShareFolder("s", error)) << error;
+    ASSERT_EQ(CurrentSettings()->shares.size(), 1U);
+    drained_path = DrainedPath("s");
+    WriteFile(drained_path, "");
+    slept = 0;
+  }
+
+  int RemoveDrained() {
+    return QLIBCExec("/bin/rm", "-rf", drained_path.c_str(), nullptr, nullptr);
+  }
+
+  std::string drained_path;
+};
+
+TEST_F(ServicesTest, ADrainedCopyIsRemovedWithoutAPause) {
+  EXPECT_EQ(RemoveDrained(), 0);
+  EXPECT_FALSE(std::filesystem::exists(drained_path));
+  EXPECT_EQ(slept, 0U);
+}
+
+TEST_F(ServicesTest, ARemovalThatLacksADescriptorIsFollowedByAPause) {
+  rlimit before = {};
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+  {
+    const ScopedFd next(dup(STDIN_FILENO));
+    const rlimit none_left = {static_cast<rlim_t>(next.fd), before.rlim_max};
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none_left), 0);
+  }
+
+  const int result = RemoveDrained();
+
+  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &before), 0);
+  EXPECT_EQ(result, -1);
+  EXPECT_TRUE(std::filesystem::exists(drained_path));
+  EXPECT_GT(slept, 0U);  // the Worker tries again at once, as long as there is a queue
+}
+
+}  // namespace
+}  // namespace fileindexd
