@@ -1,14 +1,16 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Programs run on the platform that is shipped.
-#include <fcntl.h>
+#include <sqlite3.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
 #include <atomic>
+#include <cerrno>
 #include <ctime>
 #include <filesystem>
 
 #include "base/scoped_fd.h"
+#include "platform/share.h"
 #include "platform/standalone/environment.h"
 #include "platform/system.h"
 #include "state/filesystem.h"
@@ -79,6 +81,29 @@ TEST_F(ServicesTest, ARemovalThatLacksADescriptorIsFollowedByAPause) {
   EXPECT_EQ(result, -1);
   EXPECT_TRUE(std::filesystem::exists(drained_path));
   EXPECT_GT(slept, 0U);  // the Worker tries again at once, as long as there is a queue
+}
+
+TEST_F(ServicesTest, ACopyWhoseChangesAreLostGoesOnceTheReindexIsOnRecord) {
+  TALO::FILEINDEX::NoteLostChanges(root, EIO);
+  sqlite3* db = nullptr;
+  ASSERT_EQ(sqlite3_open((state_root + "/state.db").c_str(), &db), SQLITE_OK);
+  ASSERT_EQ(sqlite3_exec(db, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr), SQLITE_OK);
+
+  EXPECT_EQ(RemoveDrained(), -1);
+  EXPECT_TRUE(std::filesystem::exists(drained_path));
+
+  sqlite3_close(db);
+  EXPECT_EQ(RemoveDrained(), 0);
+  EXPECT_FALSE(std::filesystem::exists(drained_path));
+  EXPECT_TRUE(StatusOf("s").needs_reindex);
+  EXPECT_TRUE(std::filesystem::exists(QueuePath("s")));  // which wakes the Worker
+}
+
+TEST_F(ServicesTest, ChangesThatNoShareHasAreNotMissed) {
+  TALO::FILEINDEX::NoteLostChanges(folder + "/elsewhere", EIO);
+
+  EXPECT_EQ(RemoveDrained(), 0);
+  EXPECT_FALSE(StatusOf("s").needs_reindex);
 }
 
 }  // namespace
