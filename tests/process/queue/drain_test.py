@@ -237,8 +237,8 @@ class LeftoverCopyTest(IndexTest):
 
         self.start()
 
-        self.await_lines([*told, f"IndexDirAdd: {root}"], after)
-        self.await_drained("alpha")
+        done = "Worker[alpha] finished all task, stopping"
+        self.await_lines([*told, f"IndexDirAdd: {root}", done], after)
         self.assert_index(root)
         (share,) = self.ctl("status", "--json").json()["shares"]
         self.assertFalse(share["needs_reindex"])
