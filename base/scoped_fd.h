@@ -2,6 +2,7 @@
 // Owner of one file descriptor, for early exits and for a thread that is cancelled.
 #pragma once
 
+#include <fcntl.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -33,5 +34,11 @@ class ScopedFd {
 
   int fd;
 };
+
+// Opens what is there; -1 with errno. By system call: open() is a cancellation point, and a thread
+// can be cancelled in it when the file is open already, so that nobody closes it.
+inline int OpenDescriptor(const char* path, int flags) {
+  return static_cast<int>(syscall(SYS_openat, AT_FDCWD, path, flags | O_LARGEFILE));
+}
 
 }  // namespace fileindexd

@@ -53,7 +53,7 @@ class QueueLock {
 bool QueueLock::Take(const std::string& queue_path) {
   int error = 0;
   for (int tries = 0; tries < LOCK_TRIES; ++tries) {
-    ScopedFd opened(open(queue_path.c_str(), READING));
+    ScopedFd opened(OpenDescriptor(queue_path.c_str(), READING));
     if (opened.fd < 0) {
       return false;  // no queue, nothing to do
     }
@@ -150,8 +150,8 @@ bool IsRegularFile(int fd) {
 }
 
 OpTree* ReadDrained(const std::string& share_path, const std::string& drained_path) {
-  // Not fopen: a thread cancelled in the open would leave the stream behind.
-  ScopedFd opened(open(drained_path.c_str(), READING));
+  // Not fopen, which does not say whether its file is left open by a thread that is cancelled.
+  ScopedFd opened(OpenDescriptor(drained_path.c_str(), READING));
   ScopedFile stream(opened.fd < 0 ? nullptr : fdopen(opened.fd, "r"));
   if (stream.file == nullptr) {
     const int error = errno;
