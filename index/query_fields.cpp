@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/query_fields.h"
 
-#include <strings.h>
-
 #include <algorithm>
 #include <string>
 
+#include "index/letter_case.h"
 #include "index/suggestion.h"
 
 namespace fileindexd {
@@ -78,8 +77,7 @@ bool TakesList(QueryField field) {
 
 const NamedField* FindField(std::string_view name) {
   for (const NamedField& field : FIELDS) {
-    if (std::string_view(field.name).size() == name.size() &&
-        strncasecmp(field.name, name.data(), name.size()) == 0) {
+    if (IsSameName(name, field.name)) {
       return &field;
     }
   }
@@ -92,8 +90,7 @@ const char* NearField(std::string_view name) {
     return nullptr;
   }
   std::string lower(name);
-  std::transform(lower.begin(), lower.end(), lower.begin(),
-                 [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
+  std::transform(lower.begin(), lower.end(), lower.begin(), SmallLetter);
   const auto* const near = std::find_if(
       std::begin(FIELDS), std::end(FIELDS),
       [&lower](const NamedField& field) { return EditDistance(lower, field.name, 1) == 1; });

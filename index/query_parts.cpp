@@ -2,7 +2,6 @@
 #include "index/query_parts.h"
 
 #include <pwd.h>
-#include <strings.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -12,6 +11,7 @@
 #include <system_error>
 
 #include "index/kind.h"
+#include "index/letter_case.h"
 #include "index/query_values.h"
 #include "index/text_characters.h"
 #include "state/layout.h"
@@ -51,11 +51,6 @@ std::vector<std::string> SplitAt(std::string_view text, char separator) {
     }
     text.remove_prefix(end + 1);
   }
-}
-
-bool IsSame(std::string_view given, const char* name) {
-  return given.size() == std::string_view(name).size() &&
-         strncasecmp(given.data(), name, given.size()) == 0;
 }
 
 bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
@@ -230,7 +225,7 @@ bool FillUnder(const Value& value, QueryNode& node, QueryError& error) {
 bool FillIs(const Value& value, QueryNode& node, QueryError& error) {
   constexpr const char* NAMES[] = {"file", "folder", "link", "empty", "hidden", "duplicate"};
   const auto* const name = std::find_if(std::begin(NAMES), std::end(NAMES), [&](const char* known) {
-    return IsSame(value.text, known);
+    return IsSameName(value.text, known);
   });
   if (name == std::end(NAMES)) {
     return Fail(error, "is: knows file, folder, link, empty, hidden and duplicate", value.at);
@@ -244,7 +239,7 @@ bool FillHas(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::HAS;
   constexpr const char* NAMES[] = {"content", "text", "location"};
   const auto* const name = std::find_if(std::begin(NAMES), std::end(NAMES), [&](const char* known) {
-    return IsSame(value.text, known);
+    return IsSameName(value.text, known);
   });
   if (name != std::end(NAMES)) {
     node.presence = static_cast<Presence>(name - std::begin(NAMES));
@@ -265,7 +260,7 @@ bool FillHas(const Value& value, QueryNode& node, QueryError& error) {
 bool FillContent(const Value& value, QueryNode& node, QueryError& error) {
   constexpr const char* NAMES[] = {"waiting", "done", "failed"};
   const auto* const name = std::find_if(std::begin(NAMES), std::end(NAMES), [&](const char* known) {
-    return IsSame(value.text, known);
+    return IsSameName(value.text, known);
   });
   if (name == std::end(NAMES)) {
     return Fail(error, "content: knows waiting, done and failed", value.at);

@@ -4,6 +4,8 @@
 #include <charconv>
 #include <string>
 
+#include "index/letter_case.h"
+
 namespace fileindexd {
 
 namespace {
@@ -85,7 +87,7 @@ std::optional<TimeSpan> Calendar(std::string_view text, bool utc) {
   if (has_day && !TakeDigits(text, 2, day)) {
     return std::nullopt;
   }
-  const bool has_time = has_day && Take(text, 'T');
+  const bool has_time = has_day && (Take(text, 'T') || Take(text, 't'));
   if (has_time && !(TakeDigits(text, 2, hour) && Take(text, ':') && TakeDigits(text, 2, minute))) {
     return std::nullopt;
   }
@@ -127,7 +129,7 @@ std::optional<int64_t> DurationSeconds(std::string_view text) {
     text.remove_prefix(static_cast<size_t>(end - text.data()));
     constexpr std::string_view UNITS = "smhdwy";
     constexpr int64_t SECONDS[] = {1, 60, 3600, 86400, 7 * 86400, 365 * 86400};
-    const size_t unit = text.empty() ? 0 : UNITS.find(text.front());
+    const size_t unit = text.empty() ? 0 : UNITS.find(SmallLetter(text.front()));
     if (unit == std::string_view::npos || number > LONGEST / SECONDS[unit]) {
       return std::nullopt;
     }
@@ -143,15 +145,16 @@ std::optional<int64_t> DurationSeconds(std::string_view text) {
 std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool utc) {
   tm local = Broken(moment, false);
   const time_t now = utc ? timegm(&local) : moment;  // what a clock without zone shows
-  if (text == "now") {
+  if (IsSameName(text, "now")) {
     return TimeSpan{now, now, false};
   }
-  if (text == "today" || text == "yesterday") {
-    return Day(Broken(moment, false), text == "today" ? 0 : -1, utc);
+  const bool is_today = IsSameName(text, "today");
+  if (is_today || IsSameName(text, "yesterday")) {
+    return Day(Broken(moment, false), is_today ? 0 : -1, utc);
   }
   if (text.starts_with('-')) {
     const std::optional<int64_t> ago = DurationSeconds(text.substr(1));
-    const bool has_unit = !text.empty() && text.back() >= 'a';
+    const bool has_unit = !text.empty() && SmallLetter(text.back()) >= 'a';
     if (!ago.has_value() || !has_unit) {
       return std::nullopt;
     }

@@ -7,6 +7,7 @@
 #include <cmath>
 #include <optional>
 
+#include "index/letter_case.h"
 #include "index/query_error.h"
 #include "index/query_times.h"
 
@@ -67,15 +68,11 @@ std::optional<int64_t> Scaled(std::string_view text, std::string_view units, dou
   return static_cast<int64_t>(*number * factor);
 }
 
-bool IsSmallOrCapital(char c, char capital) {
-  return c == capital || c == capital + 0x20;
-}
-
 std::optional<int64_t> Bytes(std::string_view text) {
-  if (text.size() > 1 && IsSmallOrCapital(text.back(), 'B')) {
+  if (text.size() > 1 && EndsWithName(text, "B")) {
     text.remove_suffix(1);
   }
-  if (text.size() > 2 && text.back() == 'i') {  // "10MiB"
+  if (text.size() > 2 && EndsWithName(text, "i")) {  // "10MiB"
     text.remove_suffix(1);
   }
   return Scaled(text, "KMGTP", 1024);
@@ -255,10 +252,10 @@ bool ParseCircle(std::string_view text, Circle& circle, std::string& what) {
   }
   std::string_view distance = values[2];
   double unit = 1;
-  if (distance.ends_with("km")) {
+  if (EndsWithName(distance, "km")) {
     unit = 1000;
     distance.remove_suffix(2);
-  } else if (distance.ends_with('m')) {
+  } else if (EndsWithName(distance, "m")) {
     distance.remove_suffix(1);
   }
   const std::optional<double> latitude = Decimal(values[0]);

@@ -184,6 +184,30 @@ TEST_F(QueryParseTest, NumbersSizesAndDurations) {
   });
 }
 
+TEST_F(QueryParseTest, CapitalLettersDoNotCountInValuesKnownByName) {
+  for (const auto& [text, as_small] : std::vector<std::pair<std::string, std::string>>{
+           {"sent:TODAY", "sent:today"},
+           {"sent:Yesterday", "sent:yesterday"},
+           {"sent:2024..NOW", "sent:2024..now"},
+           {"taken:Today", "taken:today"},
+           {"modified:>-1D", "modified:>-1d"},
+           {"modified:-1H30M", "modified:-1h30m"},
+           {"sent:2024-01-05t12:30", "sent:2024-01-05T12:30"},
+           {"duration:>1H", "duration:>1h"},
+           {"duration:90S..3M", "duration:90s..3m"},
+           {"size:1MIB..2mib", "size:1MiB..2MiB"},
+           {"bitrate:1m", "bitrate:1M"},
+           {"near:0,0,1KM", "near:0,0,1km"},
+           {"near:0,0,1Km", "near:0,0,1km"},
+           {"near:0,0,500M", "near:0,0,500m"},
+           {"kind:Folder IS:Duplicate has:TEXT content:Failed",
+            "kind:folder is:duplicate has:text content:failed"},
+       }) {
+    EXPECT_EQ(Parsed(text), Parsed(as_small)) << text;
+    EXPECT_FALSE(Parsed(text).starts_with('?')) << text;
+  }
+}
+
 TEST_F(QueryParseTest, TimesAreThoseOfTheZone) {
   ExpectAll({
       {"sent:today", "sent[1705276800..1705363199]"},
