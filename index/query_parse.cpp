@@ -81,22 +81,20 @@ bool Parser::Fail(const std::string& what, size_t where) {
 }
 
 void Parser::SkipBlanks() {
-  while (at < text.size() && IsBlank(text[at])) {
-    ++at;
-  }
+  at = SkipBlanksAt(text, at);
 }
 
 bool Parser::IsAt(std::string_view keyword) const {
   const size_t end = at + keyword.size();
   return text.compare(at, keyword.size(), keyword) == 0 &&
-         (end == text.size() || IsBlank(text[end]) || text[end] == '(' ||
+         (end == text.size() || BlankAt(text, end) > 0 || text[end] == '(' ||
           (text[end] == ')' && open > 0));
 }
 
 // "-5" is no number: a minus in front always says what not to find. "--" and "- " say nothing.
 bool Parser::IsNegation() const {
-  return text[at] == '-' && at + 1 < text.size() && !IsBlank(text[at + 1]) && text[at + 1] != '-' &&
-         text[at + 1] != ')';
+  return text[at] == '-' && at + 1 < text.size() && BlankAt(text, at + 1) == 0 &&
+         text[at + 1] != '-' && text[at + 1] != ')';
 }
 
 // Of what is not positive: the NOT that is alone.
@@ -120,12 +118,13 @@ bool Parser::Run(QueryNode& query) {
   }
 
   QueryNode read;
-  const std::string_view alone = std::string_view(text).substr(
-      at, text.find_last_not_of(std::string_view(" \t\n\r")) + 1 - at);
-  if (alone == "AND" || alone == "OR" || alone == "NOT") {
-    read.text = alone;
+  const size_t end = NextBlank(text, at);
+  const std::string_view first = std::string_view(text).substr(at, end - at);
+  const bool is_alone = SkipBlanksAt(text, end) == text.size();
+  if (is_alone && (first == "AND" || first == "OR" || first == "NOT")) {
+    read.text = first;
     read.start = at;
-    read.end = at + alone.size();
+    read.end = end;
   } else if (!ReadAny(read, 0)) {
     return false;
   }
@@ -279,7 +278,7 @@ bool Parser::ReadQuoted(Value& value) {
 void Parser::ReadBare(Value& value, bool in_list) {
   value.at = at;
   int inside = 0;
-  while (at < text.size() && !IsBlank(text[at])) {
+  while (at < text.size() && BlankAt(text, at) == 0) {
     if (in_list && text.compare(at, 2, ",\"") == 0) {
       break;
     }
@@ -317,7 +316,7 @@ bool Parser::ReadList(Value& value) {
 }
 
 bool Parser::EndsQuotes() {
-  return at == text.size() || IsBlank(text[at]) || text[at] == ')' ||
+  return at == text.size() || BlankAt(text, at) > 0 || text[at] == ')' ||
          Fail("a blank is missing behind what stands in quotes", at);
 }
 

@@ -5,6 +5,7 @@
 
 #include "index/query_error.h"
 #include "index/query_fields.h"
+#include "index/text_characters.h"
 
 namespace fileindexd {
 
@@ -16,9 +17,7 @@ std::string_view ValueAt(std::string_view text) {
     const size_t end = text.find('"', 1);
     return text.substr(0, end == std::string_view::npos ? end : end + 1);
   }
-  const auto* const end = std::find_if(text.begin(), text.end(),
-                                       [](char c) { return IsBlank(c) || c == '(' || c == ')'; });
-  return text.substr(0, static_cast<size_t>(end - text.begin()));
+  return text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
 }
 
 // "size>10M".
@@ -48,7 +47,7 @@ std::string WhyColonIsMissing(std::string_view text) {
 std::string WhyNoField(std::string_view text) {
   const size_t letters = LettersAtStart(text);
   if (letters == 0 || letters + 1 >= text.size() || text[letters] != ':' ||
-      IsBlank(text[letters + 1])) {
+      BlankAt(text, letters + 1) > 0) {
     return "";
   }
   const std::string_view value = text.substr(letters + 1);
@@ -67,8 +66,28 @@ std::string WhyNoField(std::string_view text) {
 
 }  // namespace
 
-bool IsBlank(char c) {
-  return static_cast<unsigned char>(c) <= 0x20 || c == 0x7f;
+// No byte within a character is well-formed alone, so that text can be looked through by bytes.
+size_t BlankAt(std::string_view text, size_t at) {
+  if (at >= text.size()) {
+    return 0;
+  }
+  const Character character = CharacterAt(text, at);
+  const bool is_one = character.size > 1 || static_cast<unsigned char>(text[at]) < 0x80;
+  return is_one && IsBlankCharacter(character.code) ? character.size : 0;
+}
+
+size_t SkipBlanksAt(std::string_view text, size_t at) {
+  while (const size_t size = BlankAt(text, at)) {
+    at += size;
+  }
+  return at;
+}
+
+size_t NextBlank(std::string_view text, size_t at) {
+  while (at < text.size() && BlankAt(text, at) == 0) {
+    ++at;
+  }
+  return at;
 }
 
 size_t LettersAtStart(std::string_view text) {

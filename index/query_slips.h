@@ -8,7 +8,11 @@
 
 namespace fileindexd {
 
-bool IsBlank(char c);  // what words are parted by
+// The bytes of the blank at that byte, which parts words; 0: there is none, or the text ends.
+size_t BlankAt(std::string_view text, size_t at);
+// The first byte at or behind that one that is no blank, and the first that is one.
+size_t SkipBlanksAt(std::string_view text, size_t at);
+size_t NextBlank(std::string_view text, size_t at);
 
 // How many letters of ASCII, as names of fields are made of, `text` begins with.
 size_t LettersAtStart(std::string_view text);

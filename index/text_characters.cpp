@@ -130,6 +130,18 @@ CharacterClass ClassOf(int32_t code) {
   }
 }
 
+bool IsBlankCharacter(int32_t code) {
+  switch (utf8proc_category(code)) {
+    case UTF8PROC_CATEGORY_CC:
+    case UTF8PROC_CATEGORY_ZS:
+    case UTF8PROC_CATEGORY_ZL:
+    case UTF8PROC_CATEGORY_ZP:
+      return true;
+    default:
+      return false;
+  }
+}
+
 Character CharacterAt(std::string_view text, size_t at) {
   const auto* bytes = reinterpret_cast<const utf8proc_uint8_t*>(text.data() + at);
   if (*bytes < 0x80) {

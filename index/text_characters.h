@@ -28,6 +28,9 @@ struct Character {
 };
 Character CharacterAt(std::string_view text, size_t at);
 
+// Whether it only parts words in every script: controls, spaces and ends of lines.
+bool IsBlankCharacter(int32_t code);
+
 // By itself: '_' is a separator here, and a joiner only in the table of ASCII.
 CharacterClass ClassOf(int32_t code);
 

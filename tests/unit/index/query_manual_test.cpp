@@ -243,7 +243,7 @@ TEST_F(QueryManualTest, WhatItSaysIsTheSameIsTheSame) {
            {"near:48.8584,2.2945,500m", "near:48.8584,2.2945,500", "near:48.8584,2.2945,0.5km"},
            {"modified:-400d..now", "modified:-400d", "modified:>=-400d", "modified:>=-9600h"},
            {"path:projects/2024", "path:projects*2024"},
-           {"annual report", "annual AND report"},
+           {"annual report", "annual AND report", "annual\u3000report"},
            {"name:(annual OR invoice)", "name:annual OR name:invoice"},
            {"ext:(pdf OR jpg)", "ext:pdf,jpg"},
            {"name:report -draft", "name:report NOT draft"}}) {

@@ -36,6 +36,31 @@ TEST_F(QueryParseTest, WordsPhrasesAndBeginnings) {
   });
 }
 
+TEST_F(QueryParseTest, BlanksOfAnyScriptPartWords) {
+  for (const std::string blank : {" ", "\t", "\n", "\x01", "\u00a0", "\u0085", "\u1680", "\u2003",
+                                  "\u2009", "\u2028", "\u202f", "\u205f", "\u3000"}) {
+    const auto parsed = [&blank](std::string text) {
+      for (size_t at = 0; (at = text.find('_', at)) != std::string::npos; at += blank.size()) {
+        text.replace(at, 1, blank);
+      }
+      return Parsed(text);
+    };
+    EXPECT_EQ(parsed("_a__b_"), "(a b)") << blank;
+    EXPECT_EQ(parsed("\u00e0_\u6771"), "(\u00e0 \u6771)") << blank;
+    EXPECT_EQ(parsed("kind:document_report"), "(kind:document report)") << blank;
+    EXPECT_EQ(parsed("a_OR_b_-c"), "(a OR (b -c))") << blank;
+    EXPECT_EQ(parsed("name:(_a_OR_b_)_c"), "((name:a OR name:b) c)") << blank;
+    EXPECT_EQ(parsed("_NOT_"), "NOT") << blank;
+    EXPECT_EQ(parsed("a_-_b"), "(a name:*-* b)") << blank;
+    EXPECT_EQ(parsed("form:_b"), "(form: b)") << blank;
+    EXPECT_EQ(parsed("_"), "?0") << blank;
+    EXPECT_EQ(parsed("\"a_b\""), "\"a" + blank + "b\"") << blank;
+  }
+  for (const std::string sign : {"\u200b", "\u00ad", "\u200d", "\xa0", "\xe3\x80"}) {
+    EXPECT_EQ(Parsed("a" + sign + "b"), "a" + sign + "b") << "none of these is a blank";
+  }
+}
+
 TEST_F(QueryParseTest, OperatorsBindAsWritten) {
   ExpectAll({
       {"a b OR c", "((a b) OR c)"},
