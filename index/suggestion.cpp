@@ -4,12 +4,14 @@
 #include <algorithm>
 #include <array>
 #include <cstdlib>
+#include <functional>
 #include <map>
 #include <utility>
 #include <vector>
 
 #include "index/contents_schema.h"
 #include "index/name_text.h"
+#include "index/text_stems.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -34,9 +36,14 @@ std::vector<int32_t> Codes(const std::string& text) {
 // The words of vocabularies that are nearest to one, and rather none shorter than it, as stems are.
 class NearestWords {
  public:
+  // Whether a word as near as that would stay.
+  bool Takes(int distance, bool is_shorter) const {
+    return words.empty() || std::pair(distance, is_shorter) <= nearest;
+  }
+
   void Add(int distance, bool is_shorter, int64_t frequency, std::string word) {
     const std::pair<int, bool> nearness = {distance, is_shorter};
-    if (!words.empty() && nearness > nearest) {
+    if (!Takes(distance, is_shorter)) {
       return;
     }
     if (words.empty() || nearness < nearest) {
@@ -110,35 +117,86 @@ class Vocabulary {
     (void)sqlite3_exec(db, "PRAGMA query_only = 0", nullptr, nullptr, nullptr);
     int code = sqlite3_exec(db, make.c_str(), nullptr, nullptr, nullptr);
     (void)sqlite3_exec(db, "PRAGMA query_only = 1", nullptr, nullptr, nullptr);
-    const std::string read = "SELECT term, doc" + std::string(column.empty() ? "" : ", col") +
+    const std::string read = "SELECT term, doc, cnt" + std::string(column.empty() ? "" : ", col") +
                              " FROM temp." + name + " WHERE term >= ?1 AND term <= ?2 LIMIT " +
                              std::to_string(MOST_TERMS);
     code = code == SQLITE_OK ? terms.Prepare(db, read.c_str()) : code;
     return code;
   }
 
-  void Look(const std::string& word, NearestWords& nearest) {
+  // `stems`: that stand beside the words.
+  void Look(const std::string& word, Stems& stems, NearestWords& nearest) {
+    std::vector<Near> found;
     const size_t letters = CharacterStarts(word).size() - 1;
     const int most = letters >= LONG ? 2 : 1;
     for (const std::string& beginning : Beginnings(word)) {
-      const std::string end = BehindAll(beginning);
-      terms.BindText(1, beginning);
-      terms.BindText(2, end);
-      while (terms.Step() == SQLITE_ROW) {
-        if (!column.empty() && terms.Bytes(2) != column) {
-          continue;
-        }
-        const std::string term = terms.Bytes(0);
-        const int distance = EditDistance(word, term, most);
+      ForEach(beginning, [&](const Term& term) {
+        const int distance = EditDistance(word, term.text, most);
         if (distance > 0 && distance <= most) {
-          nearest.Add(distance, term.size() < word.size(), terms.Int(1), term);
+          found.push_back({{distance, term.text.size() < word.size()}, term});
         }
+      });
+    }
+    std::stable_sort(found.begin(), found.end(), [](const Near& one, const Near& other) {
+      return one.nearness < other.nearness;
+    });
+    for (const auto& [nearness, term] : found) {
+      if (!nearest.Takes(nearness.first, nearness.second)) {
+        break;
       }
-      terms.Reset();
+      const Term written = Written(word, term, stems);
+      if (!written.text.empty()) {
+        nearest.Add(nearness.first, nearness.second, written.documents, written.text);
+      }
     }
   }
 
  private:
+  struct Term {
+    std::string text;
+    int64_t documents = 0;
+    int64_t times = 0;
+  };
+  struct Near {
+    std::pair<int, bool> nearness;
+    Term term;
+  };
+
+  void ForEach(const std::string& beginning, const std::function<void(const Term&)>& visit) {
+    const std::string end = BehindAll(beginning);
+    terms.BindText(1, beginning);
+    terms.BindText(2, end);
+    while (terms.Step() == SQLITE_ROW) {
+      if (column.empty() || terms.Bytes(3) == column) {
+        visit({terms.Bytes(0), terms.Int(1), terms.Int(2)});
+      }
+    }
+    terms.Reset();
+  }
+
+  // The term, or where it never stands but as the stem of others the most frequent of these, of
+  // which the slips of `word` must leave half. Empty: none. At most the last letter of a stem is
+  // none of its words'.
+  Term Written(const std::string& word, const Term& term, Stems& stems) {
+    const std::vector<size_t> starts = CharacterStarts(term.text);
+    if (starts.size() <= SHORTEST) {
+      return term;
+    }
+    Term best;
+    int64_t as_stem = 0;
+    ForEach(term.text.substr(0, starts[starts.size() - 2]), [&](const Term& form) {
+      if (form.text == term.text || stems.Of(form.text) != term.text) {
+        return;
+      }
+      as_stem += form.times;
+      const int most = static_cast<int>(CharacterStarts(form.text).size() - 1) / 2;
+      if (form.documents > best.documents && EditDistance(word, form.text, most) <= most) {
+        best = form;
+      }
+    });
+    return as_stem < term.times ? term : best;
+  }
+
   std::string column;
   Statement terms;
 };
@@ -202,10 +260,12 @@ class WordSearch {
     Vocabulary names;
     Vocabulary texts;
     if (IsInNames() && names.Open(db, "main", "names", "") == SQLITE_OK) {
-      names.Look(word, nearest);
+      Stems none(NO_LANGUAGE);
+      names.Look(word, none, nearest);
     }
     if (IsInContents() && texts.Open(db, "contents", "words", Column()) == SQLITE_OK) {
-      texts.Look(word, nearest);
+      Stems stems(LanguageOfWords(share.words.language));
+      texts.Look(word, stems, nearest);
     }
   }
 
@@ -283,6 +343,7 @@ int EditDistance(const std::string& from, const std::string& to, int most) {
 
 std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMarker& names) {
   std::map<size_t, WordPlace> changes;  // by their start, with the new word
+  size_t looks = 0;
   for (const WordLeaf& leaf : asked.leaves) {
     const QueryNode& node = *leaf.node;
     const bool has_words = node.part == Part::WORD || node.part == Part::EXACT_NAME;
@@ -297,14 +358,13 @@ std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMark
       if (CharacterStarts(word.token).size() <= SHORTEST || AnyKnows(word.token, where, shares)) {
         continue;
       }
-      if (changes.size() == MOST_SLIPS) {
+      if (looks++ == MOST_SLIPS) {
         return "";
       }
       word.token = NearestTo(word.token, where, shares);
-      if (word.token.empty()) {
-        return "";
+      if (!word.token.empty()) {
+        changes.emplace(word.start, std::move(word));
       }
-      changes.emplace(word.start, std::move(word));
     }
   }
 

@@ -13,9 +13,9 @@ namespace fileindexd {
 
 // The question's text with each word that no share knows, where the word is looked for (behind a
 // field, in that field alone), changed into the nearest one that some share does: one slip of the
-// fingers away, or two in a longer word. The words of a phrase are looked at one by one. Empty when
-// there is none for one of them, there are more than ten of them, or nothing was to be changed.
-// Looks at a bounded part of the vocabularies.
+// fingers away, or two in a longer word. The words of a phrase are looked at one by one. What
+// nothing is near to stays, as the other side of an OR may find something. Empty when there are
+// more than ten of them, or nothing was to be changed. Looks at a bounded part of the vocabularies.
 std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMarker& names);
 
 // The first word like "type:pdf", which looks for a field that there is not; empty: there is none.

@@ -14,7 +14,7 @@ TEST_F(QuerySuggestionTest, SuggestionsAreWordsThatTheIndexHas) {
   EXPECT_EQ(Suggested("holidys plans"), "holiday plans");
   EXPECT_EQ(Suggested("ohliday"), "holiday");
   EXPECT_EQ(Suggested("computr"), "computer") << "not the stem alone";
-  EXPECT_EQ(Suggested("invocies OR xyzzyx"), "");
+  EXPECT_EQ(Suggested("invocies OR xyzzyx"), "invoices OR xyzzyx");
   EXPECT_EQ(Suggested("kind:document  invocies"), "kind:document  invoices");
   EXPECT_EQ(Suggested("\"holidya\""), "\"holiday\"");
   EXPECT_EQ(Suggested("zzzzzz"), "");
@@ -51,6 +51,43 @@ TEST_F(QuerySuggestionTest, SuggestionsStandInTheirPlaceBehindFieldsAndInPhrases
   for (const auto& [text, better] : suggested) {
     EXPECT_EQ(Suggested(text), better) << text;
     EXPECT_EQ(Hits(better).size(), 1U) << better;
+  }
+}
+
+TEST_F(QuerySuggestionTest, WordsThatNothingIsNearToKeepTheirPlace) {
+  Store({{"holiday plans.txt", TextContent("the computer counts")}});
+  const std::map<std::string, std::string> suggested = {
+      {"holidya OR xyzzyx", "holiday OR xyzzyx"},
+      {"xyzzyx OR holidya", "xyzzyx OR holiday"},
+      {"kind:document (xyzzyx OR compuetr)", "kind:document (xyzzyx OR computer)"},
+      {"holidya OR \"compuetr xyzzyx\"", "holiday OR \"computer xyzzyx\""},
+      {"holidya xyzzyx", ""},
+      {"(holidya xyzzyx) OR xyzzyq", ""},
+      {"xyzzyx OR xyzzyq", ""},
+  };
+  for (const auto& [text, better] : suggested) {
+    EXPECT_EQ(Suggested(text), better) << text;
+  }
+}
+
+// The index keeps stems beside the words that they stand in for. Nobody writes them.
+TEST_F(QuerySuggestionTest, StemsAloneAreNotSuggested) {
+  Store({{"a.txt", TextContent("Companies are happy about nothing that the happiest company has")},
+         {"b.txt", TextContent("their policies: contract, contracts")}});
+  const std::map<std::string, std::string> suggested = {
+      {"compny", "company"},
+      {"text:compny", "text:company"},
+      {"hapy", "happy"},
+      {"hapi", "happy"},
+      {"not", ""},
+      {"noht", ""},
+      {"polciy", "policies"},
+      {"polcies", "policies"},
+      {"nothng", "nothing"},
+      {"contrat", "contract"},
+  };
+  for (const auto& [text, better] : suggested) {
+    EXPECT_EQ(Suggested(text), better) << text;
   }
 }
 
