@@ -135,4 +135,14 @@ ValueForm FormOf(Column column, ContentField field) {
   }
 }
 
+bool IsTime(ValueForm form) {
+  return form == ValueForm::SECONDS || form == ValueForm::NANOSECONDS ||
+         form == ValueForm::CAMERA_TIME;
+}
+
+bool IsTime(const NamedField& field) {
+  return field.field == F::MODIFIED || field.field == F::ADDED ||
+         (field.field == F::NUMBER_FIELD && IsTime(FormOf(Column::FIELD, field.content)));
+}
+
 }  // namespace fileindexd

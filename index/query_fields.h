@@ -61,5 +61,7 @@ enum class ValueForm : uint8_t {
   CAMERA_TIME
 };
 ValueForm FormOf(Column column, ContentField field);
+bool IsTime(ValueForm form);
+bool IsTime(const NamedField& field);  // whether its values are times
 
 }  // namespace fileindexd

@@ -29,6 +29,7 @@
 #include "index/query.h"
 #include "index/query_parts.h"
 #include "index/query_slips.h"
+#include "index/query_times.h"
 
 namespace fileindexd {
 
@@ -91,8 +92,12 @@ bool Parser::IsAt(std::string_view keyword) const {
           (text[end] == ')' && open > 0));
 }
 
-// "-5" is no number: a minus in front always says what not to find. "--" and "- " say nothing.
+// "-5" is no number: a minus in front says what not to find, but for "-7d" in the brackets of a
+// time. "--" and "- " say nothing.
 bool Parser::IsNegation() const {
+  if (shared != nullptr && IsTime(*shared) && BeginsWithAgo(std::string_view(text).substr(at))) {
+    return false;
+  }
   return text[at] == '-' && at + 1 < text.size() && BlankAt(text, at + 1) == 0 &&
          text[at + 1] != '-' && text[at + 1] != ')';
 }

@@ -10,6 +10,7 @@ namespace fileindexd {
 
 namespace {
 
+constexpr std::string_view UNITS = "smhdwy";
 constexpr int64_t LONGEST = int64_t{100000} * 24 * 60 * 60;  // safe to calculate with
 
 // Exactly `count` digits, and not one of what else a library takes for a number.
@@ -127,7 +128,6 @@ std::optional<int64_t> DurationSeconds(std::string_view text) {
       return std::nullopt;
     }
     text.remove_prefix(static_cast<size_t>(end - text.data()));
-    constexpr std::string_view UNITS = "smhdwy";
     constexpr int64_t SECONDS[] = {1, 60, 3600, 86400, 7 * 86400, 365 * 86400};
     const size_t unit = text.empty() ? 0 : UNITS.find(SmallLetter(text.front()));
     if (unit == std::string_view::npos || number > LONGEST / SECONDS[unit]) {
@@ -161,6 +161,12 @@ std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool
     return TimeSpan{now - *ago, now - *ago, true};
   }
   return Calendar(text, utc);
+}
+
+bool BeginsWithAgo(std::string_view text) {
+  const size_t unit = text.find_first_not_of("0123456789", 1);
+  return text.starts_with('-') && unit > 1 && unit < text.size() &&
+         UNITS.find(SmallLetter(text[unit])) != std::string_view::npos;
 }
 
 }  // namespace fileindexd

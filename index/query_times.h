@@ -23,4 +23,7 @@ std::optional<int64_t> DurationSeconds(std::string_view text);
 // a clock without a zone, which counts as UTC.
 std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool utc);
 
+// Whether `text` begins with "-", digits and a unit: with a time before now, if with any.
+bool BeginsWithAgo(std::string_view text);
+
 }  // namespace fileindexd

@@ -148,11 +148,6 @@ const char* Expected(ValueForm form) {
   return "a time like today, -7d, 2024, 2024-01 or 2024-01-05";
 }
 
-bool IsTime(ValueForm form) {
-  return form == ValueForm::SECONDS || form == ValueForm::NANOSECONDS ||
-         form == ValueForm::CAMERA_TIME;
-}
-
 // Why nothing can lie in it; null: something can.
 const char* WhyEmpty(const ValueRange& range, ValueForm form) {
   constexpr int64_t BEST_RATING = 5;

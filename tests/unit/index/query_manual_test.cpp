@@ -242,6 +242,7 @@ TEST_F(QueryManualTest, WhatItSaysIsTheSameIsTheSame) {
            {"has:artist", "HAS:Artist"},
            {"near:48.8584,2.2945,500m", "near:48.8584,2.2945,500", "near:48.8584,2.2945,0.5km"},
            {"modified:-400d..now", "modified:-400d", "modified:>=-400d", "modified:>=-9600h"},
+           {"modified:(-400d OR 2024)", "modified:-400d OR modified:2024"},
            {"path:projects/2024", "path:projects*2024"},
            {"annual report", "annual AND report", "annual\u3000report"},
            {"name:(annual OR invoice)", "name:annual OR name:invoice"},

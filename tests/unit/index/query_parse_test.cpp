@@ -61,6 +61,27 @@ TEST_F(QueryParseTest, BlanksOfAnyScriptPartWords) {
   }
 }
 
+// In front of digits and a unit "-" says how long ago; in front of all else it leaves out.
+TEST_F(QueryParseTest, TimesBeforeNowAreValuesInBracketsToo) {
+  ExpectAll({
+      {"sent:(-7d)", "sent[1704715200..1705320000]"},
+      {"sent:(-7d OR 2023)", "(sent[1704715200..1705320000] OR sent[1672531200..1704067199])"},
+      {"sent:(2024 -7d)", "(sent[1704067200..1735689599] sent[1704715200..1705320000])"},
+      {"sent:(2024 NOT -7d)", "(sent[1704067200..1735689599] -sent[1704715200..1705320000])"},
+      {"sent:(2024 --7d)", "?11"},
+      {"sent:(2024 -2023)", "(sent[1704067200..1735689599] -sent[1672531200..1704067199])"},
+      {"sent:(2024 -2024-01-05)", "(sent[1704067200..1735689599] -sent[1704412800..1704499199])"},
+      {"sent:(2024 -today)", "(sent[1704067200..1735689599] -sent[1705276800..1705363199])"},
+      {"sent:(2024 -(-7d))", "(sent[1704067200..1735689599] -sent[1704715200..1705320000])"},
+      {"sent:(-1h30m..now)", "sent[1705314600..1705320000]"},
+      {"sent:(-7D..-1d)", "sent[1704715200..1705233600]"},
+      {"sent:(-7d..)", "sent[1704715200..]"},
+      {"duration:(3m -7s)", "(duration[180000..180999] -duration[7000..7999])"},
+      {"name:(a -7d)", "(name:a -name:7d)"},
+      {"a -7d", "(a -7d)"},
+  });
+}
+
 TEST_F(QueryParseTest, OperatorsBindAsWritten) {
   ExpectAll({
       {"a b OR c", "((a b) OR c)"},
