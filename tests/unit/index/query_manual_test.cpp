@@ -227,6 +227,28 @@ TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
   }
 }
 
+TEST_F(QueryManualTest, WhatItSaysHoldsTogetherIsFoundWholeAndByItsParts) {
+  Store({{"joined.txt", TextContent("an annual_report of v1.2.3")},
+         {"parted.txt", TextContent("an annual report, and 1 of 2")},
+         {"name annual_report", TextContent("x")},
+         {"name annual report", TextContent("x")}});
+  const Names both = {"joined.txt", "parted.txt"};
+  const Names joined = {"joined.txt"};
+  for (const auto& [text, found] : std::map<std::string, Names>{
+           {"text:annual_report", joined},
+           {"text:report", both},
+           {"text:(annual report)", both},
+           {"text:\"annual report\"", {"parted.txt"}},
+           {"v1.2.3", joined},
+           {"1.2.3", joined},
+           {"v1", joined},
+           {"1.2", {}},
+           {"1.2*", joined},
+           {"name:annual_report", {"name annual report", "name annual_report"}}}) {
+    EXPECT_EQ(Sorted(text), found) << text;
+  }
+}
+
 TEST_F(QueryManualTest, WhatItSaysIsTheSameIsTheSame) {
   StoreAll();
   ASSERT_NO_FATAL_FAILURE(StoreTheRest());
