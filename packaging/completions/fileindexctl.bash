@@ -61,6 +61,26 @@ _fileindexctl_shares() {
   [[ -e ${FILEINDEXD_STATE_DIR:-/var/lib/fileindexd}/state.db ]] && "$1" share list 2>/dev/null
 }
 
+# Paths that begin with the word `$2`, each ended with NUL, as lines may end within them. `$1`:
+# "@folder" for folders alone.
+_fileindexctl_paths() (
+  plain=${2//\\/}
+  plain=${plain#[\"\']}
+  home=''
+  if [[ $plain == \~/* ]]; then
+    home=$HOME/
+    plain=$home${plain#\~/}
+  fi
+  GLOBIGNORE=''
+  set +f
+  shopt -s nullglob dotglob
+  for path in "$plain"*; do
+    [[ $1 == @folder && ! -d $path ]] && continue
+    [[ -n $home ]] && path='~'/${path#"$home"}
+    printf '%s\0' "$path"
+  done
+)
+
 # Fills COMPREPLY with what of `$1` (see above) begins with `$2`. `$3`: the program.
 _fileindexctl_reply() {
   local name plain
@@ -78,9 +98,7 @@ _fileindexctl_reply() {
     @file | @folder)
       # Outside of a completion there is nothing to set.
       compopt -o filenames 2>/dev/null
-      local kind=-f
-      [[ $1 == @folder ]] && kind=-d
-      mapfile -t COMPREPLY < <(compgen "$kind" -- "$2")
+      mapfile -d '' -t COMPREPLY < <(_fileindexctl_paths "$1" "$2")
       ;;
     *) mapfile -t COMPREPLY < <(compgen -W "$1" -- "$2") ;;
   esac
@@ -103,7 +121,7 @@ _fileindexctl_words() {
 }
 
 _fileindexctl() {
-  local words=() current previous='' command='' value count=0 word
+  local words=() current previous='' command='' value count=0 word are_options_over=''
   COMPREPLY=()
   _fileindexctl_words
   current=${words[-1]}
@@ -113,8 +131,12 @@ _fileindexctl() {
       previous=''
       continue
     fi
-    previous=$word
-    [[ $word == -* ]] && continue
+    previous=''
+    if [[ -z $are_options_over && $word == -* ]]; then
+      previous=$word
+      [[ $word == -- ]] && are_options_over=yes
+      continue
+    fi
     case $command in
       '') command=$word ;;
       share | folder | worker) command+=" $word" ;;
@@ -122,14 +144,14 @@ _fileindexctl() {
     esac
   done
 
-  if [[ $current == --*=* ]]; then
+  if [[ -z $are_options_over && $current == --*=* ]]; then
     previous=${current%%=*}
     current=${current#*=}
   fi
   value=$(_fileindexctl_value "$command" "$previous")
   if [[ -n $value ]]; then
     _fileindexctl_reply "$value" "$current" "${1:-fileindexctl}"
-  elif [[ $current == -* ]]; then
+  elif [[ -z $are_options_over && $current == -* ]]; then
     _fileindexctl_reply "$(_fileindexctl_options "$command")" "$current"
     [[ ${#COMPREPLY[@]} -eq 1 && ${COMPREPLY[0]} == *= ]] && compopt -o nospace 2>/dev/null
   else

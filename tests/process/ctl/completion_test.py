@@ -47,6 +47,18 @@ OFFERED = [
     (("failed", "--retry", ""), ["alpha", "beta"]),
 ]
 
+# Where the value stands in the option's own word.
+EQUALS = [
+    (("search", "--kind="), KINDS),
+    (("search", "--kind=v"), ["video"]),
+    (("search", "--sort=mo"), ["modified"]),
+    (("search", "--share=be"), ["beta"]),
+    (("stats", "--share="), ["alpha", "beta"]),
+    (("stats", "--by=ex"), ["ext"]),
+    (("folder", "set", "--document="), ["off", "on"]),
+    (("folder", "set", "--document=o"), ["off", "on"]),
+]
+
 
 def commands(ctl, *group):
     """All that there are, in their words, as help lists them."""
@@ -96,10 +108,10 @@ class BashTest(CompletionTest):
                 self.assertEqual(self.offered(*words), wanted)
 
     def test_values_behind_an_equals_sign(self):
-        self.assertEqual(self.offered("search", "--kind="), KINDS)
-        self.assertEqual(self.offered("search", "--kind=v"), ["video"])
+        for words, wanted in EQUALS:
+            with self.subTest(words=words):
+                self.assertEqual(self.offered(*words), wanted)
         self.assertEqual(self.offered("search", "--kind=photo", "--so"), ["--sort"])
-        self.assertEqual(self.offered("folder", "set", "--document=o"), ["off", "on"])
         self.assertEqual(self.offered("folder", "set", "--doc"), ["--document="])
 
     def test_every_option_of_every_command_and_no_other(self):
@@ -134,6 +146,24 @@ class BashTest(CompletionTest):
         self.assertEqual(self.offered("dump", ""), ["a\\$b", "alpha", "beta", "my\\ files"])
         self.assertEqual(self.offered("dump", "my\\ f"), ["my\\ files"])
         self.assertEqual(self.offered("dump", "'my f"), ["my files"])
+
+    def test_names_with_ends_of_lines(self):
+        self.make_files(self.root, "two\nlines", "two\nfolders/")
+
+        self.assertEqual(self.offered("info", f"{self.root}/tw"),
+                         [f"{self.root}/two\nfolders", f"{self.root}/two\nlines"])
+        self.assertEqual(self.offered("folder", "add", f"{self.root}/tw"),
+                         [f"{self.root}/two\nfolders"])
+
+    def test_no_option_stands_behind_two_dashes(self):
+        self.assertEqual(self.offered("search", "--", "-"), [])
+        self.assertEqual(self.offered("search", "--kind", "photo", "--", "--so"), [])
+        self.assertEqual(self.offered("search", "--", "--kind", "p"), [])
+        self.assertEqual(self.offered("search", "--", "--kind=p"), [])
+        self.assertEqual(self.offered("verify", "--", "-"), [])
+        self.assertEqual(self.offered("verify", "--", "al"), ["alpha"])
+        self.assertEqual(self.offered("search", "--kind", "p", "--"),
+                         self.offered("search", "--"))
 
     def test_names_that_the_shell_parts(self):
         for name in ("a:b", "a:c=d", "a::"):
@@ -248,7 +278,17 @@ class ZshTest(CompletionTest):
                 self.assertEqual(offered, sorted(wanted))
 
     def test_values_behind_an_equals_sign(self):
-        self.assertEqual(self.offered("folder", "set", "--document="), ["off", "on"])
+        self.make_files(self.root, "only/")
+        for words, wanted in EQUALS:
+            with self.subTest(words=words):
+                self.assertEqual(self.offered(*words), wanted)
+        for command, option in (("search", "--under"), ("event", "--path-old")):
+            self.assertEqual(self.offered(command, f"{option}={self.root}/o"), ["only"])
+
+    def test_no_option_stands_behind_two_dashes(self):
+        self.assertEqual(self.offered("search", "--", "-"), [])
+        self.assertEqual(self.offered("verify", "--", "-"), [])
+        self.assertEqual(self.offered("verify", "--", "al"), ["alpha"])
 
     def test_no_state_is_made(self):
         nowhere = f"{namespace.RUN}/nowhere"
