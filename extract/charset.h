@@ -13,9 +13,11 @@ struct ByteOrderMark {
 };
 ByteOrderMark FindByteOrderMark(std::string_view bytes);
 
-// Controls that no text has, more than a stray few.
-bool LooksBinary(std::string_view bytes);
-// "UTF-16LE", "UTF-16BE" where every second byte is mostly nothing; else null.
+// Controls that no text has, more than a stray few. With `may_shift`, a text of a charset that
+// shifts out and in.
+bool LooksBinary(std::string_view bytes, bool may_shift);
+// UTF-16 and UTF-32 of either order where every second byte is mostly nothing, or where the bytes
+// are letters of one alphabet that way; else null.
 const char* WideCharset(std::string_view bytes);
 
 bool IsAscii(std::string_view bytes);
@@ -24,6 +26,8 @@ bool HasShifts(std::string_view bytes);
 // Nearly all characters beyond ASCII are sequences of UTF-8: a bad byte among many good ones does
 // not make it another charset. The last character may be cut.
 bool IsMostlyUtf8(std::string_view bytes);
+// The only bytes beyond ASCII are the last ones, which may begin a character of UTF-8.
+bool TellsOnlyByItsEnd(std::string_view bytes);
 // Of bytes that are no UTF-8; never empty.
 std::string GuessCharset(std::string_view bytes);
 // What texts under a charset's name are really written in: often a larger one, and readers of mail

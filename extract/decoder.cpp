@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <utility>
 #include <vector>
 
 #include "base/utf8.h"
@@ -71,11 +72,18 @@ class Iconv {
   std::string pending;
 };
 
+bool IsBeyondAscii(char byte) {
+  return static_cast<unsigned char>(byte) >= 0x80;
+}
+
 // One file's way to UTF-8. The charset is settled by the first piece that tells.
 class Decoding {
  public:
   // False: what follows is no text.
-  bool Decode(std::string_view bytes, const CharsetFinder& declared, std::string& text) {
+  bool Decode(std::string_view piece, const CharsetFinder& declared, std::string& text) {
+    const std::string joined = held + std::string(piece);
+    held.clear();
+    std::string_view bytes = joined;
     if (is_first) {
       is_first = false;
       const ByteOrderMark mark = FindByteOrderMark(bytes);
@@ -85,20 +93,43 @@ class Decoding {
         Settle(WideCharset(bytes));
       }
     }
-    if (!is_wide && LooksBinary(bytes)) {
+    may_shift = may_shift || HasShifts(bytes);
+    if (!is_wide && LooksBinary(bytes, may_shift)) {
       return false;
     }
+    if (!is_settled && TellsOnlyByItsEnd(bytes)) {
+      const auto end = std::find_if(bytes.begin(), bytes.end(), IsBeyondAscii);
+      held.assign(end, bytes.end());
+      bytes.remove_suffix(held.size());
+    }
     if (!is_settled && !IsAscii(bytes)) {
-      Settle(IsMostlyUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
-      Settle("WINDOWS-1252");  // where that is one which the C library does not know
+      SettleBy(bytes);
     } else if (!is_settled && HasShifts(bytes)) {
       Settle(GuessCharset(bytes));
     }
-    text = converter.IsOpen() ? converter.Convert(bytes) : std::string(bytes);
+    text = Converted(bytes);
     return true;
   }
 
+  // What waited for another piece.
+  std::string End() {
+    if (held.empty()) {
+      return "";
+    }
+    SettleBy(held);
+    return Converted(std::exchange(held, {}));
+  }
+
  private:
+  void SettleBy(std::string_view bytes) {
+    Settle(!TellsOnlyByItsEnd(bytes) && IsMostlyUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
+    Settle("WINDOWS-1252");  // where that is one which the C library does not know
+  }
+
+  std::string Converted(std::string_view bytes) {
+    return converter.IsOpen() ? converter.Convert(bytes) : std::string(bytes);
+  }
+
   // An unknown name settles nothing: the bytes will tell.
   void Settle(const std::string& charset) {
     if (charset.empty() || is_settled) {
@@ -113,9 +144,11 @@ class Decoding {
   }
 
   Iconv converter;
+  std::string held;  // the beginning of a character, before anything told the charset
   bool is_first = true;
   bool is_settled = false;
   bool is_wide = false;
+  bool may_shift = false;
 };
 
 }  // namespace
@@ -142,6 +175,7 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
       return false;
     }
     if (length == 0) {
+      take(decoding.End());
       return true;
     }
 

@@ -87,6 +87,88 @@ TEST(TextTest, CharsetsAreTold) {
   }
 }
 
+// A guess needs more to rest on than a name or two in a text without any other accent.
+TEST(TextTest, AFewAccentsAreWestern) {
+  for (const char* text :
+       {"Please send the draft to José before Friday and ask whether the figures are right.",
+        "It would be naïve to think that this works.", "The Señor called.",
+        "My friend Zoë came yesterday with the keys of the house.",
+        "A letter from Günther arrived this morning.", "The façade was painted.",
+        "João wrote the first version of the program.", "François and his brother went home.",
+        "Dvorák played by Céline at Orléans.", "20° below and 5 µm thick",
+        "Het programma is geïnstalleerd op alle computers van de organisatie."}) {
+    EXPECT_EQ(Read(ReadText, InCharset("WINDOWS-1252", text)).content.text, text);
+  }
+  std::string italian;
+  for (int line = 0; line < 40; ++line) {
+    italian +=
+        "tutti gli esseri umani nascono liberi ed eguali senza alcuna distinzione e possono ";
+    italian += line % 8 == 0 ? "avere la proprietà privata e la libertà, " : "vivere in pace, ";
+  }
+  italian += "ecco";
+  EXPECT_TRUE(Read(ReadText, InCharset("ISO-8859-1", italian)).content.text == italian);
+}
+
+TEST(TextTest, ManyAccentsAreNotTakenForWestern) {
+  for (const char* text :
+       {"Wszyscy ludzie rodzą się wolni i równi pod względem swej godności i swych praw.",
+        "Sva ljudska bića rađaju se slobodna i jednaka u dostojanstvu i pravima. Ona su obdarena "
+        "razumom i sviješću i trebaju jedna prema drugima postupati u duhu bratstva."}) {
+    EXPECT_EQ(Read(ReadText, InCharset("WINDOWS-1250", text)).content.text, text);
+  }
+}
+
+TEST(TextTest, WideTextWithoutAMarkIsTold) {
+  constexpr const char* CYRILLIC_LINES = "Съешь ещё этих\nмягких французских булок\n";
+  for (const char* text : {CYRILLIC_LINES, RUSSIAN, GREEK, "日本語の文章\n東京は日本の首都\n",
+                           "这是一个 UTF-16 文件\n北京是中国的首都\n", FRENCH}) {
+    for (const char* charset : {"UTF-16LE", "UTF-16BE", "UTF-32LE", "UTF-32BE"}) {
+      const std::string read = Read(ReadText, InCharset(charset, text)).content.text;
+      const std::string lines = Read(ReadText, text).content.text;
+      EXPECT_EQ(read, lines) << charset;
+    }
+  }
+  // Tables of small numbers are none.
+  std::string numbers;
+  for (int number = 0; number < 2000; ++number) {
+    numbers += static_cast<char>(number % 251);
+    numbers += static_cast<char>(number % 5);
+  }
+  EXPECT_FALSE(Read(ReadText, numbers).is_read);
+}
+
+TEST(TextTest, KoreanWithShiftsIsRead) {
+  EXPECT_EQ(Read(ReadText, InCharset("ISO-2022-KR", KOREAN)).content.text, KOREAN);
+}
+
+TEST(TextTest, TheLargerOfTwoCharsetsIsMeant) {
+  constexpr const char* UKRAINIAN =
+      "Всі люди народжуються вільними і рівними у своїй гідності та правах. Її ґанок.";
+  EXPECT_EQ(Read(ReadText, InCharset("KOI8-U", UKRAINIAN)).content.text, UKRAINIAN);
+  // Mostly Hungarian, with a few letters that the standard's charset has elsewhere.
+  constexpr const char* HUNGARIAN =
+      "Minden emberi lény szabadon születik és egyenlő méltósága és joga van. Az emberek, ésszel "
+      "és lelkiismerettel bírván, egymással szemben testvéri szellemben kell hogy viseltessenek: "
+      "Tomáš, Žofie a Šťastný";
+  EXPECT_EQ(Read(ReadText, InCharset("WINDOWS-1250", HUNGARIAN)).content.text, HUNGARIAN);
+}
+
+// What begins a character at a piece's or the file's end tells nothing of the charset yet.
+TEST(TextTest, ACharacterThatTheEndCutsSettlesNoCharset) {
+  EXPECT_EQ(Read(ReadText, "Caf\xE9").content.text, "Café");
+  EXPECT_EQ(Read(ReadText, "\xE9").content.text, "é");
+  constexpr size_t PIECE = 64 * 1024;
+  const std::string plain(PIECE - 1, 'a');
+  const std::string text = plain + "é est une lettre. " + FRENCH;
+  EXPECT_TRUE(Read(ReadText, InCharset("ISO-8859-1", text), 1'000'000).content.text == text);
+  EXPECT_TRUE(Read(ReadText, text, 1'000'000).content.text == text);
+  const std::string last = plain + "é";
+  EXPECT_TRUE(Read(ReadText, InCharset("ISO-8859-1", last), 1'000'000).content.text == last);
+  EXPECT_TRUE(Read(ReadText, last, 1'000'000).content.text == last);
+  // Cut, but other characters told before.
+  EXPECT_EQ(Read(ReadText, "éa\xC3").content.text, "éa");
+}
+
 TEST(TextTest, MarksOfByteOrderAreNoText) {
   EXPECT_EQ(Read(ReadText,
                  "\xEF\xBB\xBF"
