@@ -105,7 +105,14 @@ std::optional<int64_t> ZoneOf(std::string_view text) {
   return west ? -seconds : seconds;
 }
 
-std::optional<int64_t> ClockOf(std::string_view text) {
+namespace {
+
+struct Clock {
+  int64_t seconds = 0;  // as written, in whatever zone
+  int64_t zone = 0;
+};
+
+std::optional<Clock> ReadClock(std::string_view text) {
   size_t digits = text.find_first_of("0123456789");
   if (digits == std::string_view::npos) {
     return std::nullopt;
@@ -130,7 +137,19 @@ std::optional<int64_t> ClockOf(std::string_view text) {
     zone = ZoneOf(text).value_or(0);
   }
   int64_t days = std::chrono::sys_days(date).time_since_epoch().count();
-  return days * 86400 + seconds - zone;
+  return Clock{days * 86400 + seconds, zone};
+}
+
+}  // namespace
+
+std::optional<int64_t> ClockOf(std::string_view text) {
+  const std::optional<Clock> clock = ReadClock(text);
+  return clock ? std::optional(clock->seconds - clock->zone) : std::nullopt;
+}
+
+std::optional<int64_t> WrittenClockOf(std::string_view text) {
+  const std::optional<Clock> clock = ReadClock(text);
+  return clock ? std::optional(clock->seconds) : std::nullopt;
 }
 
 std::optional<int64_t> LeadingNumber(std::string_view text) {

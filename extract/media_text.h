@@ -22,6 +22,9 @@ std::string_view Trimmed(std::string_view text);
 // between the years 1 and 9999, and for the zeros that cameras write when their clock is not set.
 std::optional<int64_t> ClockOf(std::string_view text);
 
+// The same with the zone passed over: what a clock on the spot showed, as if it were UTC.
+std::optional<int64_t> WrittenClockOf(std::string_view text);
+
 // Seconds east of Greenwich: "+02:00", "-0330", "Z".
 std::optional<int64_t> ZoneOf(std::string_view text);
 

@@ -23,25 +23,22 @@ std::string Joined(const std::vector<std::string>& texts) {
   return joined;
 }
 
-// A time of the camera's clock, with its zone where the camera wrote that down.
-std::optional<int64_t> ExifClock(const Exiv2::ExifData& exif, const char* key, const char* zone) {
-  const std::optional<int64_t> clock = ClockOf(ExifText(exif, key));
-  if (!clock) {
-    return std::nullopt;
-  }
-  return *clock - ZoneOf(ExifText(exif, zone)).value_or(0);
+// A time of the camera's clock. Where the camera wrote down its zone, that is left out: what people
+// remember, and what cameras without one write, is what the clock said.
+std::optional<int64_t> ExifClock(const Exiv2::ExifData& exif, const char* key) {
+  return WrittenClockOf(ExifText(exif, key));
 }
 
 std::optional<int64_t> FirstClock(const std::vector<std::string>& texts) {
-  return texts.empty() ? std::nullopt : ClockOf(texts[0]);
+  return texts.empty() ? std::nullopt : WrittenClockOf(texts[0]);
 }
 
 std::optional<int64_t> Taken(const Exiv2::Image& image) {
   const Exiv2::ExifData& exif = image.exifData();
   const Exiv2::XmpData& xmp = image.xmpData();
-  auto taken = ExifClock(exif, "Exif.Photo.DateTimeOriginal", "Exif.Photo.OffsetTimeOriginal");
+  auto taken = ExifClock(exif, "Exif.Photo.DateTimeOriginal");
   if (!taken) {
-    taken = ExifClock(exif, "Exif.Photo.DateTimeDigitized", "Exif.Photo.OffsetTimeDigitized");
+    taken = ExifClock(exif, "Exif.Photo.DateTimeDigitized");
   }
   for (const char* key :
        {"Xmp.exif.DateTimeOriginal", "Xmp.photoshop.DateCreated", "Xmp.xmp.CreateDate"}) {
@@ -50,11 +47,11 @@ std::optional<int64_t> Taken(const Exiv2::Image& image) {
   if (!taken) {
     const auto days = IptcTexts(image.iptcData(), "Iptc.Application2.DateCreated");
     const auto times = IptcTexts(image.iptcData(), "Iptc.Application2.TimeCreated");
-    taken =
-        days.empty() ? std::nullopt : ClockOf(times.empty() ? days[0] : days[0] + " " + times[0]);
+    taken = days.empty() ? std::nullopt
+                         : WrittenClockOf(times.empty() ? days[0] : days[0] + " " + times[0]);
   }
   // The last, as it is that of the last change where a program has been at work.
-  return taken ? taken : ExifClock(exif, "Exif.Image.DateTime", "Exif.Photo.OffsetTime");
+  return taken ? taken : ExifClock(exif, "Exif.Image.DateTime");
 }
 
 std::string_view FirstWord(std::string_view text) {

@@ -21,6 +21,14 @@ TEST(MediaTextTest, ClocksAreReadInTheFormsOfTags) {
   }
 }
 
+TEST(MediaTextTest, WhatWasWrittenNeedsNoZone) {
+  for (const char* text : {"2003:01:02 10:11:12", "2003-01-02T10:11:12+02:00",
+                           "2003-01-02T10:11:12.5-0330", "2003-01-02 10:11:12 UTC"}) {
+    EXPECT_EQ(WrittenClockOf(text), 1041502272) << text;
+  }
+  EXPECT_EQ(WrittenClockOf("yesterday"), std::nullopt);
+}
+
 TEST(MediaTextTest, WhatIsNoClockIsNone) {
   for (const char* text : {"", "yesterday", "2003", "2003-1-2", "0000-00-00 00:00:00", "2003-02-30",
                            "12003-01-02", "    :  :  "}) {

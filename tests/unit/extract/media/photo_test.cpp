@@ -93,9 +93,12 @@ TEST(PhotoReaderTest, MakerAndModelThatDifferStandTogether) {
             "SONY ILCE-7");
 }
 
-TEST(PhotoReaderTest, AClockWithoutZoneCountsAsUtc) {
+TEST(PhotoReaderTest, WhatTheClockSaidCountsWhateverItsZone) {
   EXPECT_EQ(ReadTiff({}, {TiffText(0x9003, "2003:01:02 10:11:12")}, {}).Number(ContentField::TAKEN),
-            PHOTO_TAKEN + 7200);
+            PHOTO_TAKEN);
+  EXPECT_EQ(ReadTiff({}, {TiffText(0x9003, "2003:01:02 10:11:12"), TiffText(0x9011, "+09:00")}, {})
+                .Number(ContentField::TAKEN),
+            PHOTO_TAKEN);
 }
 
 TEST(PhotoReaderTest, AClockThatWasNotSetIsNoDate) {

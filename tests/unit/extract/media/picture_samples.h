@@ -10,9 +10,9 @@
 
 namespace fileindexd {
 
-// Taken on 2003-01-02 at 10:11:12, two hours east of Greenwich, with a "NIKON D70" of "NIKON
+// Taken on 2003-01-02 at 10:11:12 of its clock, with a "NIKON D70" of "NIKON
 // CORPORATION" through an "AF-S 18-70mm", at 48° 12' 30.15" N, 11° 30' W; caption "Grüße vom Berg".
-constexpr int64_t PHOTO_TAKEN = 1041495072;
+constexpr int64_t PHOTO_TAKEN = 1041502272;
 constexpr int64_t PHOTO_LATITUDE = 482083750;
 constexpr int64_t PHOTO_LONGITUDE = -115000000;
 
