@@ -7,7 +7,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr size_t MOST_PARTS = 10;
+constexpr size_t MOST_BOUNDS = 10;  // beside joiners; more have keys and hashes
 
 bool IsLetter(CharacterClass type) {
   return type == CharacterClass::LETTER || type == CharacterClass::UPPER;
@@ -41,19 +41,18 @@ size_t TextWord::StartOf(size_t piece) const {
   return piece < pieces.size() ? pieces[piece].start : folded.size();
 }
 
-// At a capital behind a small letter, and at the last of several capitals before a small one, but
-// for a plural's s ("PDFs").
+// At a capital behind a small letter, and at one before a small letter behind capitals or digits,
+// but for a plural's s ("PDFs").
 bool TextWord::BeginsPart(size_t piece, bool& by_number) const {
   const CharacterClass before = pieces[piece - 1].type;
   const CharacterClass type = pieces[piece].type;
-  by_number = (before == CharacterClass::DIGIT) != (type == CharacterClass::DIGIT);
-  if (by_number || type != CharacterClass::UPPER) {
-    return by_number;
-  }
   const bool small_follows =
       piece + 1 < pieces.size() && pieces[piece + 1].type == CharacterClass::LETTER;
   const bool plural = piece + 2 == pieces.size() && folded.back() == 's';
-  return before == CharacterClass::LETTER || (small_follows && !plural);
+  const bool begins_word = type == CharacterClass::UPPER && small_follows && !plural;
+  by_number = !begins_word && (before == CharacterClass::DIGIT) != (type == CharacterClass::DIGIT);
+  return by_number || begins_word ||
+         (type == CharacterClass::UPPER && before == CharacterClass::LETTER);
 }
 
 void TextWord::AddPart(size_t first, size_t end) {
@@ -88,10 +87,10 @@ const std::vector<std::string_view>& TextWord::Parts() {
     bool by_number = false;
     const bool bound = joiner || (pieces[piece - 1].type != CharacterClass::JOINER &&
                                   BeginsPart(piece, by_number));
-    bounds += bound ? 1 : 0;
+    bounds += bound && !joiner ? 1 : 0;
     is_identifier = is_identifier || (bound && !by_number);
   }
-  if (!is_identifier || bounds >= MOST_PARTS) {
+  if (!is_identifier || bounds >= MOST_BOUNDS) {
     return parts;
   }
 

@@ -4,6 +4,7 @@
 //   foo_bar    foo, bar
 //   fooBar     foo, bar        XMLReader    xml, reader
 //   v1.2       v1, v, 1, 2, 1.2
+//   utf8Text   utf, 8, text
 //   fooBar2    foo, bar, 2     (utf8 is whole: digits part a word only where something else does)
 #pragma once
 

@@ -201,6 +201,22 @@ TEST_F(TokenizerTest, LanguageTellsTheStems) {
   EXPECT_TRUE(Finds("grande", "les grands"));
 }
 
+TEST_F(TokenizerTest, ACapitalBehindADigitBeginsAWord) {
+  EXPECT_EQ(Words("Utf8Decoder"), Names({"8|decod|decoder|utf|utf8decoder"}));
+  EXPECT_EQ(Words("MP3Player"), Names({"3|mp|mp3player|player"}));
+  EXPECT_TRUE(Finds("hash", "Sha256Hash"));
+  EXPECT_TRUE(Finds("encoder", "Base64Encoder"));
+  EXPECT_EQ(Words("4GB"), Names({"4gb"}));
+  EXPECT_EQ(Words("A4s"), Names({"a4s"}));
+}
+
+TEST_F(TokenizerTest, AWordOfManyJoinedOnesHasThemAll) {
+  constexpr const char* NAME = "test_that_a_user_can_log_in_with_a_valid_passphrase";
+  for (const char* part : {"user", "log", "valid", "passphrase"}) {
+    EXPECT_TRUE(Finds(part, NAME)) << part;
+  }
+}
+
 TEST_F(TokenizerTest, EncodedDataHasNoParts) {
   EXPECT_EQ(Words("aB1cD2eF3gH4iJ5kL6mN7").size(), 1U);
   EXPECT_EQ(Words("aB1cD2eF3gH4iJ5kL6mN7"), Names({"ab1cd2ef3gh4ij5kl6mn7"}));
