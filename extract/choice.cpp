@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "extract/charset.h"
 #include "extract/memory_file.h"
 
 namespace fileindexd {
@@ -119,6 +120,42 @@ bool IsStillPackage(Format named, Format seen, bool has_found, const std::string
          (fault == "encrypted" || has_found);
 }
 
+// Files of these are never all text.
+bool IsBinary(Format format) {
+  return format == Format::PHOTO || format == Format::AUDIO || format == Format::VIDEO ||
+         format == Format::ARCHIVE || format == Format::OFFICE_ZIP || format == Format::EPUB ||
+         format == Format::OLD_OFFICE;
+}
+
+// A name without an ending is a note's as often as not.
+bool MayBeNote(const Document& document) {
+  const std::string head = FirstBytes(document, HEAD);
+  return document.name.find('.') == std::string::npos && !head.empty() && !LooksBinary(head, false);
+}
+
+bool HasFoundSince(const ContentSink::Mark& begin, const ContentSink& sink) {
+  return sink.content.text.size() > begin.text_size ||
+         sink.content.texts.size() > begin.texts.size();
+}
+
+bool ReadByContent(const Document& document, ContentSink& sink, std::string& why) {
+  const Format seen = FormatOfContent(document);
+  const bool may_be_note = MayBeNote(document);
+  if (may_be_note && (seen == Format::NONE || IsBinary(seen))) {
+    return Read(Format::TEXT, document, sink, why);
+  }
+  ContentSink::Mark begin = sink.Here();
+  if (seen == Format::NONE || Read(seen, document, sink, why)) {
+    return true;
+  }
+  if (!may_be_note || why == "encrypted" || HasFoundSince(begin, sink)) {
+    return false;
+  }
+  why.clear();
+  sink.ReturnTo(std::move(begin));
+  return Read(Format::TEXT, document, sink, why);
+}
+
 }  // namespace
 
 bool LoadMagic(std::string& error) {
@@ -146,8 +183,7 @@ void LeaveOutFileUsers() {
 bool ReadDocument(const Document& document, ContentSink& sink, std::string& why) {
   const Format named = FormatOfName(document.name);
   if (named == Format::NONE) {
-    const Format seen = FormatOfContent(document);
-    return seen == Format::NONE || Read(seen, document, sink, why);
+    return ReadByContent(document, sink, why);
   }
   if (document.size == 0) {
     sink.SetKind(ReadingOf(named).kind);
@@ -165,8 +201,7 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
     sink.ReturnTo(std::move(begin));
     return true;  // many endings of source code name something else elsewhere
   }
-  const bool has_found =
-      sink.content.text.size() > begin.text_size || sink.content.texts.size() > begin.texts.size();
+  const bool has_found = HasFoundSince(begin, sink);
   if (seen == Format::NONE || seen == named || IsStillPackage(named, seen, has_found, fault)) {
     why = fault;
     return false;

@@ -462,6 +462,25 @@ TEST(FormatTableTest, WhatNoReaderIsForIsNotClaimedByItsContent) {
             static_cast<int>(Format::ARCHIVE));
 }
 
+// Magic numbers of a few letters begin notes as well.
+TEST(ChoiceTest, ANoteWithoutAnEndingIsTextWhateverItBeginsWith) {
+  std::string error;
+  ASSERT_TRUE(LoadMagic(error)) << error;
+  for (const std::string begin :
+       {"Xref: see the other list", "<?xml is how such files begin", "%PDF-word is a word",
+        "GIF89a is an old format", "!<arch>", "RIFF is a container", "%!PS-Adobe is a printer's"}) {
+    const std::string note = begin + "\nand so on, said the harbour master.\n";
+    const Found found = Read(
+        [](const Document& document, ContentSink& sink, std::string& why) {
+          return ReadDocument({document.file, "note", document.size, 0}, sink, why);
+        },
+        note);
+    EXPECT_TRUE(found.is_read) << begin << ": " << found.why;
+    EXPECT_NE(found.content.text.find("the harbour master"), std::string::npos) << begin;
+    EXPECT_EQ(found.content.kind, Kind::DOCUMENT) << begin;
+  }
+}
+
 TEST(ChoiceTest, WhatTheDiskDoesNotGiveAnyReaderIsNoted) {
   const int file = memfd_create("test", MFD_CLOEXEC);
   ASSERT_EQ(write(file, "words", 5), 5);
