@@ -39,9 +39,19 @@ std::string BareName(const std::string& name) {
   return dot == std::string::npos || dot == 0 ? name : name.substr(0, dot);
 }
 
-void ReadMember(Unpacker& archive, const Document& document, ContentSink& sink) {
+// Of a long one, the beginning.
+bool ReadBytes(Unpacker& archive, Allowance& allowance, MemoryFile& member) {
+  const bool is_whole = archive.ReadAll(Allowance::MAX_MEMBER_BYTES, member);
+  if (member.size >= Allowance::MAX_MEMBER_BYTES) {
+    allowance.NoteBound();
+  }
+  return is_whole;
+}
+
+void ReadMember(Unpacker& archive, const Document& document, Allowance& allowance,
+                ContentSink& sink) {
   MemoryFile member;
-  (void)archive.ReadAll(Allowance::MAX_MEMBER_BYTES, member);  // of a long one, the beginning
+  (void)ReadBytes(archive, allowance, member);
   if (member.size > 0) {
     const std::string name(LastComponent(archive.name));
     ReadNestedText(ReadDocument, member.AsDocument(name, document.depth + 1), sink);
@@ -49,16 +59,21 @@ void ReadMember(Unpacker& archive, const Document& document, ContentSink& sink) 
 }
 
 // One compressed file is what it holds, fields and all.
-bool ReadBare(Unpacker& archive, const Document& document, ContentSink& sink, std::string& why) {
+bool ReadBare(Unpacker& archive, const Document& document, Allowance& allowance, ContentSink& sink,
+              std::string& why) {
   MemoryFile member;
-  const bool is_whole = archive.ReadAll(Allowance::MAX_MEMBER_BYTES, member);
+  const bool is_whole = ReadBytes(archive, allowance, member);
   if (!is_whole && member.size == 0) {
     why = "damaged";
     return false;
   }
-  const bool is_good =
+  bool is_good =
       ReadDocument(member.AsDocument(BareName(document.name), document.depth + 1), sink, why);
   sink.converter.clear();  // it would be given the compressed bytes
+  if (archive.is_broken) {
+    why = "damaged";
+    is_good = false;
+  }
   return is_good;
 }
 
@@ -75,14 +90,8 @@ void SetForeignNames(std::string_view names, ContentSink& sink) {
   }
 }
 
-}  // namespace
-
-bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) {
-  sink.SetKind(Kind::DOCUMENT);
-  if (document.depth >= Allowance::MAX_DEPTH) {
-    return true;  // an archive so deep inside others counts as a member without text
-  }
-  Allowance allowance;
+bool ReadUnpacked(const Document& document, Allowance& allowance, ContentSink& sink,
+                  std::string& why) {
   Unpacker archive;
   if (!archive.Open(document, Unpacker::Formats::ALL, why)) {
     return false;
@@ -94,7 +103,7 @@ bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) 
   bool is_encrypted = false;
   while (names < MAX_NAMES && archive.Next()) {
     if (archive.is_bare) {
-      return ReadBare(archive, document, sink, why);
+      return ReadBare(archive, document, allowance, sink, why);
     }
     ++names;
     if (IsUtf8(archive.name)) {
@@ -106,16 +115,37 @@ bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) 
     if (archive.is_file && !archive.is_encrypted && !sink.IsFull() && !IsWordless(archive.name) &&
         allowance.TakeMember()) {
       ++read;
-      ReadMember(archive, document, sink);
+      ReadMember(archive, document, allowance, sink);
     }
+  }
+  if (names == MAX_NAMES) {
+    allowance.NoteBound();
   }
   SetForeignNames(foreign, sink);
   if ((is_encrypted && read == 0) || archive.is_closed) {
     why = "encrypted";
   } else if (archive.is_damaged) {
-    why = names == 0 ? "not an archive" : "damaged";
+    why = names == 0 && !archive.is_compressed ? "not an archive" : "damaged";
+  } else if (archive.is_broken) {
+    why = "damaged";
   }
   return why.empty();
+}
+
+}  // namespace
+
+bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) {
+  sink.SetKind(Kind::DOCUMENT);
+  if (document.depth >= Allowance::MAX_DEPTH) {
+    return true;  // an archive so deep inside others counts as a member without text
+  }
+  Allowance allowance;
+  const bool is_read = ReadUnpacked(document, allowance, sink, why);
+  // Not before the end: what is cut takes no more.
+  if (document.depth == 0 && allowance.HasBound()) {
+    sink.content.is_cut = true;
+  }
+  return is_read;
 }
 
 }  // namespace fileindexd

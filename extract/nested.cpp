@@ -12,6 +12,7 @@ struct Spent {
   int users = 0;
   int members = 0;
   int64_t bytes = 0;
+  bool has_bound = false;
   std::chrono::steady_clock::time_point start;
 };
 
@@ -23,6 +24,7 @@ Allowance::Allowance() {
   if (spent.users++ == 0) {
     spent.members = 0;
     spent.bytes = 0;
+    spent.has_bound = false;
     spent.start = std::chrono::steady_clock::now();
   }
 }
@@ -32,16 +34,30 @@ Allowance::~Allowance() {
 }
 
 bool Allowance::TakeMember() {
-  return spent.members < MAX_MEMBERS && ++spent.members <= MAX_MEMBERS;
+  const bool is_taken = spent.members < MAX_MEMBERS;
+  spent.members += is_taken ? 1 : 0;
+  spent.has_bound = spent.has_bound || !is_taken;
+  return is_taken;
 }
 
 bool Allowance::TakeBytes(int64_t bytes) {
   spent.bytes += bytes;
-  return spent.bytes <= MAX_BYTES;
+  return !IsSpent();
 }
 
 bool Allowance::IsSpent() const {
-  return spent.bytes > MAX_BYTES || std::chrono::steady_clock::now() - spent.start > MAX_TIME;
+  const bool is_spent =
+      spent.bytes > MAX_BYTES || std::chrono::steady_clock::now() - spent.start > MAX_TIME;
+  spent.has_bound = spent.has_bound || is_spent;
+  return is_spent;
+}
+
+void Allowance::NoteBound() {
+  spent.has_bound = true;
+}
+
+bool Allowance::HasBound() const {
+  return spent.has_bound;
 }
 
 void ReadNestedText(FormatReader reader, const Document& document, ContentSink& sink) {

@@ -28,7 +28,9 @@ class Allowance {
 
   bool TakeMember();
   bool TakeBytes(int64_t bytes);
-  bool IsSpent() const;  // no time or no bytes are left
+  bool IsSpent() const;   // no time or no bytes are left
+  void NoteBound();       // a bound that somebody else holds ended the reading
+  bool HasBound() const;  // something was not read, since it would have cost too much
 };
 
 // Lets `reader` add its text to the sink, but neither fields nor kind: those belong to the file

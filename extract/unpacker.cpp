@@ -9,6 +9,7 @@
 #include <cerrno>
 #include <clocale>
 #include <cstdio>
+#include <cstring>
 
 #include "extract/read_at.h"
 
@@ -41,6 +42,13 @@ class Utf8Locale {
 
 bool IsUsable(int code) {
   return code == ARCHIVE_OK || code == ARCHIVE_WARN;
+}
+
+// The library says of what is compressed and cut early only that it is no archive.
+bool BeginsCompressed(const Document& document) {
+  const std::string begin = FirstBytes(document, 4);
+  return begin.starts_with("\x1F\x8B") || begin.starts_with("BZh") ||
+         begin.starts_with("\xFD\x37zX") || begin.starts_with("\x28\xB5\x2F\xFD");
 }
 
 }  // namespace
@@ -121,7 +129,9 @@ bool Unpacker::Open(const Document& document, Formats formats, std::string& why)
   (void)archive_read_set_skip_callback(packed, Skip);
   (void)archive_read_set_seek_callback(packed, Seek);
   if (archive_read_open1(packed) != ARCHIVE_OK) {
-    why = formats == Formats::ZIP ? "not a ZIP file" : "not an archive";
+    why = BeginsCompressed(document) ? "damaged"
+          : formats == Formats::ZIP  ? "not a ZIP file"
+                                     : "not an archive";
     return false;
   }
   return true;
@@ -166,6 +176,7 @@ bool Unpacker::Next() {
 
   struct archive_entry* entry = nullptr;
   const int code = archive_read_next_header(packed, &entry);
+  is_compressed = archive_filter_count(packed) > 1;
   if (!IsUsable(code)) {
     is_damaged = code != ARCHIVE_EOF;
     is_closed = is_damaged && archive_read_has_encrypted_entries(packed) > 0;
@@ -187,6 +198,10 @@ ssize_t Unpacker::Read(char* into, size_t count) {
   const Utf8Locale locale;
   const ssize_t got = archive_read_data(packed, into, count);
   if (got < 0) {
+    // A password or a method that the library does not have is no damage.
+    const char* error = archive_error_string(packed);
+    is_broken = is_broken || (!is_encrypted &&
+                              (error == nullptr || std::strstr(error, "nsupported") == nullptr));
     return -1;
   }
   counted += got;

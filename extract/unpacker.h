@@ -48,8 +48,10 @@ class Unpacker {
   bool is_encrypted = false;
 
   bool is_damaged = false;
-  bool is_closed = false;  // not even the names can be had without a password
-  bool is_bare = false;    // no archive, one compressed file
+  bool is_broken = false;      // bytes of a member that was read could not be had
+  bool is_closed = false;      // not even the names can be had without a password
+  bool is_bare = false;        // no archive, one compressed file
+  bool is_compressed = false;  // the whole is, as far as its beginning tells
 
  private:
   // The document, as the library asks for it.

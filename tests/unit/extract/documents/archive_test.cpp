@@ -187,6 +187,37 @@ TEST(ArchiveTest, OneCompressedFileIsReadAsThatFile) {
   EXPECT_EQ(reading.Text(ContentField::MEMBERS), "");
 }
 
+TEST(ArchiveTest, HalfOfACompressedFileIsReadAndSaidToBeDamaged) {
+  std::string words;
+  for (int i = 0; words.size() < 900'000; ++i) {
+    words += "word" + std::to_string(i * 7919) + " ";
+  }
+  for (const int filter : {ARCHIVE_FILTER_GZIP, ARCHIVE_FILTER_XZ}) {
+    const std::string bytes = Packed({ARCHIVE_FORMAT_RAW, filter, "", ""}, {{"x", words}});
+
+    const Reading reading = ReadBytes(ReadArchive, "a.txt.gz", bytes.substr(0, bytes.size() / 2));
+
+    EXPECT_FALSE(reading.is_good);
+    EXPECT_EQ(reading.why, "damaged");
+    EXPECT_THAT(reading.content.text, testing::StartsWith("word0 word7919 "));
+  }
+  const std::string little =
+      Packed({ARCHIVE_FORMAT_RAW, ARCHIVE_FILTER_GZIP, "", ""}, {{"x", "a few words"}});
+  EXPECT_EQ(ReadBytes(ReadArchive, "a.txt.gz", little.substr(0, little.size() - 10)).why,
+            "damaged");
+}
+
+TEST(ArchiveTest, AMemberThatCannotBeUnpackedDamagesTheArchive) {
+  std::string bytes = Packed({ARCHIVE_FORMAT_ZIP, ARCHIVE_FILTER_NONE, "zip:compression=store", ""},
+                             {{"a.txt", "the red harbour"}, {"b.txt", "kernel"}});
+  bytes[bytes.find("harbour")] = 'b';
+
+  const Reading reading = ReadBytes(ReadArchive, "a.zip", bytes);
+
+  EXPECT_EQ(reading.why, "damaged");
+  EXPECT_EQ(reading.Text(ContentField::MEMBERS), "a.txt\nb.txt");
+}
+
 TEST(ArchiveTest, WhatIsNoArchiveIsSaidInWords) {
   EXPECT_EQ(ReadBytes(ReadArchive, "a.zip", "").why, "not an archive");
   EXPECT_EQ(ReadBytes(ReadArchive, "a.zip", "some words").why, "not an archive");
@@ -289,6 +320,7 @@ TEST(ArchiveTest, OnlySoManyMembersAreRead) {
   const Reading reading = ReadBytes(ReadArchive, "a.zip", Zipped(members));
 
   EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_TRUE(reading.content.is_cut);
   EXPECT_THAT(reading.content.text, testing::EndsWith(" w999"));
   EXPECT_THAT(reading.Text(ContentField::MEMBERS), testing::EndsWith("\n1000.txt"));
 }
@@ -301,10 +333,12 @@ TEST(ArchiveTest, WhatHasToBeUnpackedToBePassedOverCounts) {
       ReadBytes(ReadArchive, "a.tar.zst", LongOnesFirst(stream, bound + (8 << 20)));
   EXPECT_TRUE(beyond.is_good) << beyond.why;
   EXPECT_EQ(beyond.Text(ContentField::MEMBERS), "film.mp4");
+  EXPECT_TRUE(beyond.content.is_cut);
 
   const Reading within = ReadBytes(ReadArchive, "a.tar.zst", LongOnesFirst(stream, 8 << 20));
   EXPECT_TRUE(within.is_good) << within.why;
   EXPECT_EQ(within.Text(ContentField::MEMBERS), "film.mp4\nafter.txt");
+  EXPECT_FALSE(within.content.is_cut);
 }
 
 // Blanks fill no text: 600 MiB of them in archives in one of a few KiB.
