@@ -55,8 +55,9 @@ std::string DeclaredCharset(std::string_view bytes) {
     }
     const size_t end = std::min(head.find_first_not_of(NAME, begin), head.size());
     const std::string name = head.substr(begin, end - begin);
-    // What was read so far would not be there if this were true.
-    return name.starts_with("utf-16") || name.starts_with("utf-32") ? "" : name;
+    // What was read so far would not be there if it were UTF-16 or UTF-32; and what UTF-8 is, the
+    // bytes themselves tell better.
+    return name.starts_with("utf-") || name == "utf8" ? "" : name;
   }
   return "";
 }

@@ -5,16 +5,17 @@
 #include <memory>
 #include <new>
 #include <optional>
+#include <utility>
 
 #include "extract/format.h"
+#include "extract/memory_file.h"
 #include "extract/read_at.h"
 
 namespace fileindexd {
 
 namespace {
 
-// No limits lifted, nothing fetched, no entity put in; what is half right is read as far as it
-// goes.
+// No limits lifted, nothing fetched, no entity put in.
 constexpr int OPTIONS =
     XML_PARSE_NONET | XML_PARSE_NOERROR | XML_PARSE_NOWARNING | XML_PARSE_RECOVER;
 
@@ -139,6 +140,27 @@ class Walk {
   std::string value;
 };
 
+// It begins with a mark, whatever is wrong with the rest.
+bool IsMeantForXml(const Document& document) {
+  const std::string head = FirstBytes(document, 256);
+  const size_t begin = head.find_first_not_of(" \t\r\n\xEF\xBB\xBF");
+  return begin != std::string::npos && head[begin] == '<' &&
+         head.find('>', begin) != std::string::npos;
+}
+
+// Behind a fault the parser gives nothing, and of some it gives nothing at all. Pages have the same
+// marks, and their parser goes on.
+void ReadBeyondFault(const Document& document, ContentSink::Mark&& begin, ContentSink& sink) {
+  Content found = sink.content;
+  sink.ReturnTo(std::move(begin));
+  sink.content.texts = found.texts;
+  std::string why;
+  (void)ReadHtml(document, sink, why);
+  if (sink.content.text.size() < found.text.size()) {
+    sink.content = std::move(found);
+  }
+}
+
 }  // namespace
 
 bool ReadXml(const Document& document, ContentSink& sink, std::string& why) {
@@ -152,13 +174,18 @@ bool ReadXml(const Document& document, ContentSink& sink, std::string& why) {
       reader.get(), [](void*, const char*, xmlParserSeverities, xmlTextReaderLocatorPtr) {},
       nullptr);
 
+  ContentSink::Mark begin = sink.Here();
   Walk walk(reader.get(), sink);
   int result = 1;
   while (!sink.IsFull() && (result = xmlTextReaderRead(reader.get())) == 1) {
     walk.Take();
   }
   if (result < 0) {
-    why = walk.has_element ? "damaged XML" : "not an XML file";
+    const bool is_meant = walk.has_element || IsMeantForXml(document);
+    why = is_meant ? "damaged XML" : "not an XML file";
+    if (is_meant) {
+      ReadBeyondFault(document, std::move(begin), sink);
+    }
     return false;
   }
   return true;

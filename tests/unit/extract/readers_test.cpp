@@ -357,9 +357,24 @@ TEST(XmlTest, NoEntityIsPutInAndNothingIsFetched) {
   EXPECT_EQ(bomb.content.text, "x y");
 }
 
-TEST(XmlTest, DamagedFilesKeepWhatComesFirst) {
+TEST(XmlTest, AFaultCostsNoWordsAndNoFields) {
+  for (const char* begin :
+       {"<?xml version=\"1.0\" encoding=\"UTF-8\"?><a><title>Dues</title><b>caf\xE9 closed</b>",
+        "<?xml version=\"1.0\" encoding=\"no-such\"?><a><title>Dues</title><b>caf\xE9 closed</b>",
+        "<a><title>Dues</title><b>caf\xE9 closed</b>&nbsp;",
+        "<a><title>Dues</title><b>caf\xE9 closed</b></c>"}) {
+    const Found found = Read(ReadXml, std::string(begin) + "<b>quay <i>west</i></b></a>");
+    EXPECT_EQ(found.why, "damaged XML") << begin;
+    EXPECT_NE(found.content.text.find("café closed"), std::string::npos) << found.content.text;
+    EXPECT_NE(found.content.text.find("quay west"), std::string::npos) << found.content.text;
+    EXPECT_EQ(found.content.text.find("version"), std::string::npos) << found.content.text;
+    EXPECT_EQ(FieldOf(found, ContentField::TITLE), "Dues") << begin;
+  }
+}
+
+TEST(XmlTest, DamagedFilesKeepWhatIsThere) {
   const Found damaged = Read(ReadXml, "<a><b>words</b><c>more");
-  EXPECT_EQ(damaged.content.text, "words");
+  EXPECT_EQ(damaged.content.text, "words more");
   EXPECT_EQ(damaged.why, "damaged XML");
   const Found other = Read(ReadXml, "no markup");
   EXPECT_FALSE(other.is_read);
