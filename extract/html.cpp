@@ -15,10 +15,10 @@ namespace {
 constexpr size_t HEAD = 4096;  // where a page says its charset
 
 // Within these, words go on.
-constexpr std::array<std::string_view, 26> INLINE = {
-    "a",    "abbr",  "acronym", "b",      "bdi", "bdo", "big",  "cite", "code",
-    "del",  "em",    "font",    "i",      "ins", "kbd", "mark", "q",    "s",
-    "samp", "small", "span",    "strong", "sub", "sup", "tt",   "u"};
+constexpr std::array<std::string_view, 29> INLINE = {
+    "a",    "abbr",   "acronym", "b",   "bdi", "bdo",  "big", "cite", "code", "del",
+    "em",   "font",   "i",       "ins", "kbd", "mark", "q",   "s",    "samp", "small",
+    "span", "strong", "sub",     "sup", "tt",  "u",    "dfn", "var",  "wbr"};
 // Nobody reads what stands in these.
 constexpr std::array<std::string_view, 5> HIDDEN = {"script", "style", "template", "object",
                                                     "noscript"};

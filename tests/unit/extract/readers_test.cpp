@@ -270,11 +270,11 @@ TEST(HtmlTest, WordsAndFieldsAreRead) {
 <title>A &amp; B &eacute;</title><meta name="Author" content="Me &lt;me@x&gt;">
 <META NAME=description CONTENT='What it is'><meta name=keywords content="one, two">
 <style>p { color: hidden1 }</style><script>var hidden2 = "</p>";</script></head>
-<body onload='hidden3()'><h1>He<i>ad</i></h1><p>one<p>two<br>three<table><tr><td>x<td>y</table>
+<body onload='hidden3()'><h1>He<i>ad</i></h1><p>one<p>two<br>three<table><tr><td>x<td>y</table>lo<wbr>ng <var>a</var>b
 <svg><title>not this</title></svg><noscript>hidden4</noscript><template>hidden5</template>
 <!-- hidden6 --><a href="hidden7">li</a>nk &#8364; &unknown;</body></html>)");
   EXPECT_TRUE(found.is_read) << found.why;
-  EXPECT_EQ(found.content.text, "Head one two three x y not this link \xE2\x82\xAC &unknown;");
+  EXPECT_EQ(found.content.text, "Head one two three x y long ab not this link \xE2\x82\xAC &unknown;");
   EXPECT_EQ(FieldOf(found, ContentField::TITLE), "A & B \xC3\xA9");
   EXPECT_EQ(FieldOf(found, ContentField::AUTHOR), "Me <me@x>");
   EXPECT_EQ(FieldOf(found, ContentField::DESCRIPTION), "What it is");
