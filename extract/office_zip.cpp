@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include <algorithm>
 #include <cerrno>
 #include <string>
 #include <string_view>
@@ -20,7 +21,7 @@ constexpr int MAX_PARTS = 100'000;
 using PartReader = void (*)(XmlPart& part, ContentSink& sink);
 
 struct PartRule {
-  std::string_view begin;  // of the part's name
+  std::string_view begin;  // of the part's name, in lower case
   PartReader read;
 };
 
@@ -34,22 +35,35 @@ constexpr PartRule RULES[] = {
     {"word/footer", AddOoxmlWords},
     {"word/diagrams/data", AddOoxmlWords},
     {"ppt/slides/slide", AddOoxmlWords},
-    {"ppt/notesSlides/notesSlide", AddOoxmlWords},
+    {"ppt/notesslides/notesslide", AddOoxmlWords},
     {"ppt/comments/", AddOoxmlWords},
     {"ppt/diagrams/data", AddOoxmlWords},
-    {"xl/sharedStrings", AddOoxmlWords},
+    {"xl/sharedstrings", AddOoxmlWords},
     {"xl/comments", AddOoxmlWords},
     {"xl/drawings/drawing", AddOoxmlWords},
     {"xl/worksheets/sheet", AddSheetWords},
     {"xl/workbook.xml", AddSheetNames},
-    {"docProps/core", SetOoxmlFields},
-    {"docProps/app", SetOoxmlFields},
+    {"docprops/core", SetOoxmlFields},
+    {"docprops/app", SetOoxmlFields},
     {"content.xml", ReadOdfPart},
     {"meta.xml", ReadOdfMeta},
     {"styles.xml", ReadOdfPart},
 };
 
-PartReader ReaderOf(std::string_view name) {
+// Packers differ in the case of names, and in whether they begin with a slash.
+std::string PlainName(std::string_view name) {
+  std::string plain(name.substr(std::min(name.find_first_not_of('/'), name.size())));
+  for (char& letter : plain) {
+    letter = letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
+  }
+  return plain;
+}
+
+PartReader ReaderOf(std::string_view packed_name) {
+  const std::string name = PlainName(packed_name);
+  if (name.ends_with(".psmdcp")) {
+    return SetOoxmlFields;  // the properties, under a name made for each document
+  }
   if (!name.ends_with(".xml")) {
     return nullptr;
   }
@@ -114,7 +128,7 @@ class OfficeZip {
 
   void ReadPart(Unpacker& zip) {
     const PartReader reader = ReaderOf(zip.name);
-    const bool is_manifest = zip.name == "META-INF/manifest.xml";
+    const bool is_manifest = PlainName(zip.name) == "meta-inf/manifest.xml";
     if (reader == nullptr && !is_manifest) {
       return;
     }

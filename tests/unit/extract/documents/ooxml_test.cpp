@@ -65,6 +65,25 @@ std::string Pptx() {
 
 }  // namespace
 
+// As the format has it, whose parts are one whatever the case of their names.
+TEST(OoxmlTest, PartsAreFoundWhateverTheirNamesLookLike) {
+  const Reading upper = ReadBytes(
+      ReadOfficeZip, "a.xlsx",
+      Zipped({{"/XL/Worksheets/Sheet1.xml",
+               "<worksheet><sheetData><row><c t=\"inlineStr\"><is><t>in place</t></is></c></row>"
+               "</sheetData></worksheet>"}}));
+  EXPECT_TRUE(upper.is_good) << upper.why;
+  EXPECT_EQ(upper.content.text, "in place");
+
+  const Reading other = ReadBytes(
+      ReadOfficeZip, "a.docx",
+      Zipped({{"word/document.xml", "<w:document xmlns:w=\"w\"><w:t>harbour</w:t></w:document>"},
+              {"package/services/metadata/core-properties/0a1b.psmdcp", CORE.bytes}}));
+  EXPECT_TRUE(other.is_good) << other.why;
+  EXPECT_EQ(other.content.text, "harbour");
+  EXPECT_EQ(other.Text(ContentField::AUTHOR), "\u738b\u82b3");
+}
+
 TEST(OoxmlTest, TextAndFieldsOfADocumentAreFound) {
   const Reading reading = ReadBytes(
       ReadOfficeZip, "a.docx",
