@@ -23,6 +23,7 @@ constexpr int32_t VOWELS = 21;
 constexpr int32_t TAILS = 28;
 constexpr int32_t VOICED = 0x3099;
 constexpr int32_t HALF_VOICED = 0x309a;
+constexpr int32_t BREAK_WITHOUT_WIDTH = 0x200b;  // a format character, but one between words
 
 struct Range {
   int32_t first;
@@ -106,6 +107,9 @@ CharacterClass ClassOf(int32_t code) {
   }
   if (IsIn(ACCENTS, code)) {
     return CharacterClass::MARK;
+  }
+  if (code == BREAK_WITHOUT_WIDTH) {
+    return CharacterClass::SEPARATOR;
   }
   switch (utf8proc_category(code)) {
     case UTF8PROC_CATEGORY_LU:

@@ -21,7 +21,7 @@ constexpr const char* SAMPLE =
     "naturalidade evleriniz alamaga\u0301 fotografiilor h\u00e1zaknak talossanikaan "
     "\u043a\u0440\u0430\u0441\u0438\u0432\u0435\u0439\u0448\u0438\u043c\u0438 "
     "\u0643\u062a\u0627\u0628\u0647\u0645 \ufb01ne \uff26\uff55\uff4c\uff4c \u6771\u4eac\u90fd "
-    "foo_bar fooBar v1.2 utf8Decoder a_b_c_d_e_f_g_h_i_j_k_l";
+    "foo_bar fooBar v1.2 utf8Decoder x\u200by a_b_c_d_e_f_g_h_i_j_k_l";
 
 }  // namespace
 

@@ -210,6 +210,12 @@ TEST_F(TokenizerTest, ACapitalBehindADigitBeginsAWord) {
   EXPECT_EQ(Words("A4s"), Names({"a4s"}));
 }
 
+TEST_F(TokenizerTest, ABreakWithoutWidthEndsAWord) {
+  EXPECT_EQ(Words("harbour\u200bquay"), Names({"harbour", "quay"}));
+  EXPECT_TRUE(
+      Finds("\u0e40\u0e23\u0e37\u0e2d", "\u0e17\u0e48\u0e32\u200b\u0e40\u0e23\u0e37\u0e2d"));
+}
+
 TEST_F(TokenizerTest, AWordOfManyJoinedOnesHasThemAll) {
   constexpr const char* NAME = "test_that_a_user_can_log_in_with_a_valid_passphrase";
   for (const char* part : {"user", "log", "valid", "passphrase"}) {
