@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "extract/charset.h"
+#include "extract/choice.h"
 #include "extract/gobject.h"
 #include "extract/memory_file.h"
 
@@ -15,6 +16,21 @@ namespace {
 
 constexpr int MAX_LEVELS = 50;  // of parts within parts
 constexpr int MAX_PARTS = 10'000;
+
+bool IsSignedOnly(GMimeObject* object) {
+  const char* type = g_mime_object_get_content_type_parameter(object, "smime-type");
+  return type != nullptr && g_ascii_strcasecmp(type, "signed-data") == 0;
+}
+
+// A document by its type alone, which has a reader; texts are bodies.
+bool IsOfFormat(GMimeObject* object) {
+  GMimeContentType* type = g_mime_object_get_content_type(object);
+  char* mime = type != nullptr ? g_mime_content_type_get_mime_type(type) : nullptr;
+  const std::string_view name = mime != nullptr ? mime : "";
+  const bool is_known = name.starts_with("application/") && FormatOfMime(name) != Format::NONE;
+  g_free(mime);
+  return is_known;
+}
 
 bool IsType(GMimeObject* object, const char* type, const char* subtype) {
   GMimeContentType* content_type = g_mime_object_get_content_type(object);
@@ -108,7 +124,7 @@ void MailParts::TakeObject(GMimeObject* object, int level) {
     return;
   }
   if (GMIME_IS_MULTIPART_ENCRYPTED(object) || IsType(object, "application", "pkcs7-mime")) {
-    is_encrypted = true;
+    is_encrypted = is_encrypted || !IsSignedOnly(object);
   } else if (GMIME_IS_MULTIPART(object)) {
     TakeMultipart(GMIME_MULTIPART(object), level);
   } else if (GMIME_IS_MESSAGE_PART(object)) {
@@ -163,7 +179,7 @@ void MailParts::TakePart(GMimePart* part) {
   const char* disposition = g_mime_object_get_disposition(object);
   const bool is_attached =
       (disposition != nullptr && g_ascii_strcasecmp(disposition, "attachment") == 0) ||
-      !name.empty();
+      !name.empty() || IsOfFormat(object);
   sink.Set(ContentField::ATTACHMENTS, name);
   if (sink.IsFull() || IsMedia(object)) {
     return;

@@ -126,6 +126,28 @@ TEST(MailTest, AnAttachedMessageHasItsName) {
   EXPECT_EQ(reading.content.text, "The lighthouse p\u0159ed inner inner words");
 }
 
+// Its words lie in the signature's own wrapping.
+TEST(MailTest, ASignedMessageIsNotSaidToBeEncrypted) {
+  const std::string type = "Content-Type: application/pkcs7-mime; name=smime.p7m";
+  const Reading signed_one =
+      ReadBytes(ReadMessage, "a.eml", HEAD + type + "; smime-type=Signed-Data\n\nxyz\n");
+  EXPECT_TRUE(signed_one.is_good) << signed_one.why;
+  EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", HEAD + type + "\n\nxyz\n").why, "encrypted");
+  EXPECT_EQ(
+      ReadBytes(ReadMessage, "a.eml", HEAD + type + "; smime-type=enveloped-data\n\nxyz\n").why,
+      "encrypted");
+}
+
+TEST(MailTest, APartOfAFormatNeedsNoName) {
+  const Reading reading = ReadBytes(
+      ReadMessage, "a.eml",
+      HEAD + Multipart("mixed", {"Content-Type: text/plain\n\nbody\n",
+                                 "Content-Type: application/rtf\n\n{\\rtf1 dues of the quay}\n",
+                                 "Content-Type: application/pgp-signature\n\nsealed\n"}));
+  EXPECT_THAT(reading.content.text, testing::HasSubstr("dues of the quay"));
+  EXPECT_THAT(reading.content.text, testing::Not(testing::HasSubstr("sealed")));
+}
+
 TEST(MailTest, AnEncryptedMessageKeepsItsHeaders) {
   const Reading reading = ReadBytes(
       ReadMessage, "a.eml",
