@@ -274,7 +274,8 @@ TEST(HtmlTest, WordsAndFieldsAreRead) {
 <svg><title>not this</title></svg><noscript>hidden4</noscript><template>hidden5</template>
 <!-- hidden6 --><a href="hidden7">li</a>nk &#8364; &unknown;</body></html>)");
   EXPECT_TRUE(found.is_read) << found.why;
-  EXPECT_EQ(found.content.text, "Head one two three x y long ab not this link \xE2\x82\xAC &unknown;");
+  EXPECT_EQ(found.content.text,
+            "Head one two three x y long ab not this link \xE2\x82\xAC &unknown;");
   EXPECT_EQ(FieldOf(found, ContentField::TITLE), "A & B \xC3\xA9");
   EXPECT_EQ(FieldOf(found, ContentField::AUTHOR), "Me <me@x>");
   EXPECT_EQ(FieldOf(found, ContentField::DESCRIPTION), "What it is");
