@@ -8,7 +8,7 @@ import shutil
 import sqlite3
 
 from harness import IndexTest, main, namespace
-from pages import PAGE, copy_log_back, scribble, scribble_leaf
+from harness.pages import PAGE, copy_log_back, scribble, scribble_leaf
 from standing_in import make_full_folder, remove, replace
 
 CREATE = 0x40

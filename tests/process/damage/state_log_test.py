@@ -12,7 +12,7 @@ from damaged_state import (
     scribble,
 )
 from harness import main, namespace
-from pages import copy_log_back
+from harness.pages import copy_log_back
 from standing_in import make_full_folder, remove, replace
 
 LOG = FILE + "-wal"

@@ -18,7 +18,7 @@ from damaged_state import (
     truncate,
 )
 from harness import main, namespace
-from pages import copy_log_back
+from harness.pages import copy_log_back
 from standing_in import make_full_folder, remove, replace
 
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")

@@ -289,7 +289,7 @@ long syscall(long number, ...) noexcept {
     NoteClosing(static_cast<int>(given[0]));
   }
   const long result = next(number, given[0], given[1], given[2], given[3], given[4], given[5]);
-  if (number == SYS_openat2 || number == SYS_pidfd_open) {
+  if (number == SYS_openat || number == SYS_openat2 || number == SYS_pidfd_open) {
     NoteOpened(static_cast<int>(result));
   }
   return result;

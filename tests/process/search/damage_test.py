@@ -4,8 +4,8 @@
 import os
 
 from harness import main, namespace
+from harness.pages import scribble_leaf
 from library import CLOSE_WRITE, ContentsTest
-from pages import scribble_leaf
 
 FOLDER = f"{namespace.STATE}/shares/alpha/contents"
 FILE = f"{FOLDER}/contents.db"
