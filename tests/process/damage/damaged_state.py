@@ -6,7 +6,7 @@ import re
 import signal
 
 from harness import IndexTest, namespace
-from standing_in import remove
+from harness.standing_in import remove
 
 CREATE = 0x40
 FILE = f"{namespace.STATE}/state.db"

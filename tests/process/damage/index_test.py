@@ -9,7 +9,7 @@ import sqlite3
 
 from harness import IndexTest, main, namespace
 from harness.pages import PAGE, copy_log_back, scribble, scribble_leaf
-from standing_in import make_full_folder, remove, replace
+from harness.standing_in import make_full_folder, remove, replace
 
 CREATE = 0x40
 MS_RDONLY = 1

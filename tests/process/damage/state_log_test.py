@@ -13,7 +13,7 @@ from damaged_state import (
 )
 from harness import main, namespace
 from harness.pages import copy_log_back
-from standing_in import make_full_folder, remove, replace
+from harness.standing_in import make_full_folder, remove, replace
 
 LOG = FILE + "-wal"
 MEMORY = FILE + "-shm"

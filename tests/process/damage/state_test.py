@@ -19,7 +19,7 @@ from damaged_state import (
 )
 from harness import main, namespace
 from harness.pages import copy_log_back
-from standing_in import make_full_folder, remove, replace
+from harness.standing_in import make_full_folder, remove, replace
 
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")
 UPGRADED = re.compile(r".*state\.db is upgraded from version 1 to \d+")

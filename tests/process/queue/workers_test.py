@@ -2,11 +2,11 @@
 """Workers come and go: dropped, revived, woken by their queue, a thousand times in a row."""
 
 import os
-import shutil
 import time
 
 from harness import IndexTest, main, namespace
 from harness.machine import SANITIZERS
+from harness.standing_in import remove
 
 PAIRS = 1000
 PAIRS_LIMIT = 60  # seconds
@@ -35,13 +35,18 @@ class WorkersTest(IndexTest):
         root = self.make_share(files=("a.txt",))
         self.start()
         self.await_drained("alpha")
-        shutil.rmtree(f"{namespace.STATE}/shares/alpha")
-        os.mkdir(f"{namespace.STATE}/shares/alpha", 0o700)  # as whoever queues for it does
+        remove(f"{namespace.STATE}/shares/alpha")
+        # As whoever queues for it does.
+        os.makedirs(f"{namespace.STATE}/shares/alpha", 0o700, exist_ok=True)
         self.make_files(root, "b.txt")
         self.append("alpha", {"event": CREATE, "path": f"{root}/b.txt"})
 
+        after = self.log.mark()
         self.assertEqual(self.command("upsert_folder_setting", folder_path=root), 0)
 
+        # The index went with the folder: the whole share follows what was queued.
+        done = "Worker[alpha] finished all task, stopping"
+        self.await_lines([f"IndexDirAdd: {root}", done], after)
         self.await_drained("alpha")
         self.assert_index(root)
 
@@ -88,7 +93,7 @@ class WorkersTest(IndexTest):
         pid = self.start()
         self.await_drained("alpha")
         self.stop(pid)
-        shutil.rmtree(f"{namespace.STATE}/shares/alpha/index")
+        remove(f"{namespace.STATE}/shares/alpha/index")
 
         after = self.log.mark()
         self.start()
@@ -101,7 +106,7 @@ class WorkersTest(IndexTest):
         root = self.make_share(files=("a.txt", "d/b.txt"))
         self.start()
         self.await_drained("alpha")
-        shutil.rmtree(f"{namespace.STATE}/shares/alpha/index")
+        remove(f"{namespace.STATE}/shares/alpha/index")
         self.make_files(root, "c.txt")
         after = self.log.mark()
 
