@@ -41,7 +41,7 @@ struct ShareFeed::Impl {
   void Clear();
   bool IsRoot(const Settings& settings, const std::string& path) const;
   uint64_t CountBelow(const std::string& directory, uint64_t limit) const;
-  size_t Backlog() const { return backlog->Size() + (root_reindex ? 1 : 0); }
+  size_t Backlog() const { return backlog->Size() + (root_reindex.has_value() ? 1 : 0); }
   void Queue(const Settings& settings, const std::vector<QueueLine>& lines);
   void FoldCrowds(const Settings& settings);
   std::vector<QueueLine> TakeLines(const Settings& settings, size_t most);
@@ -54,7 +54,7 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `deletes` is about
   SentDeletes deletes;
-  bool root_reindex = false;           // waits with the backlog
+  std::optional<std::string> root_reindex;  // the root, where its reindex waits with the backlog
   bool root_in_file = false;           // the file that was written last holds a reindex of the root
   const Settings* in_force = nullptr;  // while FoldCrowds runs
   std::unique_ptr<EntryReader> reader;  // the same; null: the index cannot be read
@@ -73,7 +73,7 @@ void ShareFeed::Impl::Clear() {
       "/",
       [this](const std::string& directory, uint64_t limit) { return CountBelow(directory, limit); },
       2 * PATHS_KEPT);
-  root_reindex = false;
+  root_reindex.reset();
   came = 0;
   full = false;
   retry = {};
@@ -98,7 +98,7 @@ uint64_t ShareFeed::Impl::CountBelow(const std::string& directory, uint64_t limi
 void ShareFeed::Impl::Queue(const Settings& settings, const std::vector<QueueLine>& lines) {
   for (const QueueLine& line : lines) {
     if (line.event == CUSTOM_EVENT_REINDEX && IsRoot(settings, line.path)) {
-      root_reindex = true;
+      root_reindex = line.path;
     } else if (line.event == QLIB_NOTIFY_RENAME) {
       backlog->AddRename(line.path, line.path_old);
     } else {
@@ -128,9 +128,9 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
     file_number = appender.FileNumber();
     deletes.Forget();
   }
-  if (root_reindex) {
-    root_reindex = false;
-    return {{CUSTOM_EVENT_REINDEX, settings.ShareByName(share)->path, {}, {}}};
+  if (root_reindex.has_value()) {
+    // Not the root of the settings: they may know no such share any more.
+    return {{CUSTOM_EVENT_REINDEX, *std::exchange(root_reindex, {}), {}, {}}};
   }
   std::vector<QueueLine> waiting = backlog->Take(most);
   std::vector<QueueLine> behind;
@@ -159,7 +159,7 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
   if (Backlog() == 0 || (!full && now < retry && !at_once)) {
     return;
   }
-  if ((root_reindex || root_in_file) && appender.IsWaiting()) {
+  if ((root_reindex.has_value() || root_in_file) && appender.IsWaiting()) {
     full = true;
     retry = now + RETRY_DELAY;
     return;

@@ -265,6 +265,16 @@ TEST_F(ShareFeedTest, AReindexOfTheRootWaitsUntilTheLinesBeforeItAreTaken) {
   EXPECT_EQ(feed.NextDue(), std::nullopt);
 }
 
+TEST_F(ShareFeedTest, AReindexOfTheRootThatWaitsOutlivesItsShare) {
+  IndexRoot();
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}}});
+  settings = {};
+  Work();
+
+  EXPECT_EQ(Queue(), Texts({EventLine(CUSTOM_EVENT_REINDEX, share)}));
+  EXPECT_TRUE(feed.IsWrittenOut());
+}
+
 TEST_F(ShareFeedTest, TooMuchGatheredIsALoss) {
   AddWritten(100'000);
   EXPECT_FALSE(feed.TakeLoss());
