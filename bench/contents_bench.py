@@ -25,8 +25,8 @@ import slow_document
 from machine import Log, Machine, has_tracker, look_until, row, wait
 
 DIVISOR = int(sys.argv[1])
-PROGRAMS = sys.argv[2]
-POOL_BENCH = sys.argv[3]
+PROGRAMS = os.path.abspath(sys.argv[2])
+POOL_BENCH = os.path.abspath(sys.argv[3])
 ROUNDS = 3 if DIVISOR < 10 else 1
 NEW_FILES = max(200 // DIVISOR, 20)
 QUICK_FILES = 100
