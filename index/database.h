@@ -3,7 +3,6 @@
 #pragma once
 
 #include <sqlite3.h>
-#include <sys/types.h>
 
 #include <cstdint>
 #include <string>

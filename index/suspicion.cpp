@@ -74,7 +74,7 @@ void TellWriter(const std::string& share_name, IndexError error) {
                            : error == IndexError::IO || error == IndexError::PATH_NOT_FOUND;
     std::string ignored;  // whoever reads later tells again
     if (wakes) {
-      (void)AppendToQueue(share_name, {}, ignored);
+      (void)TouchQueue(share_name, ignored);
     }
   } catch (const std::exception&) {  // no memory
   }

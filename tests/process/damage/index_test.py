@@ -5,6 +5,7 @@ import glob
 import os
 import re
 import shutil
+import signal
 import sqlite3
 
 from harness import IndexTest, main, namespace
@@ -129,6 +130,16 @@ DAMAGES = (
     ("memory overwritten", lambda: scribble(FILE + "-shm", 0, None), UNSEEN, UNSEEN),
 )
 
+# What is asked of an index that cannot be opened, and the code it exits with.
+ASKED = (
+    (("dump", "alpha"), 1),
+    (("verify", "alpha"), 1),
+    (("stats",), 1),
+    (("search", "txt"), 1),
+    (("info", f"{namespace.DATA}/alpha"), 0),
+    (("status",), 0),
+)
+
 
 class DamagedIndexTest(IndexTest):
     def make_index(self):
@@ -250,13 +261,13 @@ class DamagedIndexTest(IndexTest):
 
         self.check(after, fate, None, found)
 
-    def damaged_and_only_asked(self, damage, asked, fate=KEPT):
-        self.make_index()
+    def damaged_and_only_asked(self, damage, asked, fate=KEPT, code=1):
+        self.await_alone(self.make_index())
         after = self.log.mark()
         damage()
         found = contents(FOLDER)
 
-        self.ctl(*asked, code=1)
+        self.ctl(*asked, code=code)
         self.await_line(TOLD, after)
         self.settle(after)
 
@@ -367,6 +378,17 @@ def add_cases():
 
             words = re.sub(r"\W+", "_", name)
             setattr(DamagedIndexTest, f"test_{words}_while_{state}", test)
+
+    for asked, code in ASKED:
+        def test_asked(self, asked=asked, code=code):
+            def damage():
+                os.kill(self.service_pid(), signal.SIGSTOP)  # it reads, too
+                scribble_pages(0, PAGE)
+
+            self.damaged_and_only_asked(damage, asked, code=code)
+
+        name = f"test_index_that_cannot_be_opened_is_told_of_by_{asked[0]}"
+        setattr(DamagedIndexTest, name, test_asked)
 
 
 add_cases()

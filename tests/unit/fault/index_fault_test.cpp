@@ -6,10 +6,13 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <filesystem>
+#include <fstream>
 #include <ostream>
 #include <string>
 #include <vector>
 
+#include "index/suspicion.h"
 #include "platform/log.h"
 #include "state/layout.h"
 #include "unit/fault/each.h"
@@ -51,6 +54,23 @@ void Live(const Fault& fault, int nth) {
   ExpectEachOperationLogged();
 }
 
+// A page that cannot be read for a moment looks like a damaged one to whoever checks them all.
+void CheckOnSuspicion(const Fault& fault, int nth) {
+  World world;
+  world.HaveWorker();
+  world.Burst();
+  const std::string note = IndexPath("s") + "/" + SUSPICION_NOTE;
+  ASSERT_TRUE(std::ofstream(note).good());
+  Arm(fault, nth);
+  world.Touch();
+  world.Burst();
+  Disarm();
+
+  EXPECT_EQ(Logged().find("set aside"), std::string::npos) << Logged();
+  world.ExpectMadeGoodByATouch();
+  EXPECT_FALSE(std::filesystem::exists(note));
+}
+
 }  // namespace
 
 class IndexFaultTest : public testing::TestWithParam<Fault> {};
@@ -58,6 +78,11 @@ class IndexFaultTest : public testing::TestWithParam<Fault> {};
 TEST_P(IndexFaultTest, NextTouchMakesGood) {
   const Fault fault = GetParam();
   ForEachCall(fault, [&fault](int nth) { Live(fault, nth); });
+}
+
+TEST(SuspicionFaultTest, AReadThatFailsOnceIsNoDamage) {
+  const Fault fault{Call::READ, SQLITE_IOERR_READ, Target::ENTRIES};
+  ForEachCall(fault, [&fault](int nth) { CheckOnSuspicion(fault, nth); });
 }
 
 INSTANTIATE_TEST_SUITE_P(
