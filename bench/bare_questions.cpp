@@ -41,6 +41,7 @@ const DatabaseForm BARE_FORM = {
     .probed = "entries WHERE id < 0",
     .last_commit = nullptr,
     .prepare = RegisterTextTokenizer,
+    .most_log_frames = LEAST_LOG_FRAMES,
 };
 
 void Check(int code, const char* what) {

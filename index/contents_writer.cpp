@@ -338,6 +338,10 @@ bool ContentsWriter::Merge(bool& more) {
   return impl->Guarded([&] { return impl->Ready() && impl->Done(impl->table->MergeWords(more)); });
 }
 
+void ContentsWriter::CutLog() {
+  impl->database.CutLog();
+}
+
 bool ContentsWriter::AreEntriesBeingRemoved() const {
   return impl->entries.is_going;
 }

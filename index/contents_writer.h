@@ -93,6 +93,8 @@ class ContentsWriter {
   // Where much is new, one step of some hundredths of a second towards smaller words: for when
   // there is nothing else to do. `more`: call again, after a commit.
   bool Merge(bool& more);
+  // Makes the log on disk, which may hold 32 MiB, small again: as Merge.
+  void CutLog();
 
   bool HasChanges() const;
   // Text since the last commit. What is removed counts twice: that is done by the commit, at once.

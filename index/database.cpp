@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <filesystem>
 #include <optional>
 #include <utility>
 
@@ -34,17 +35,29 @@ constexpr const char* PRAGMAS_FOR_CREATING =
 constexpr const char* PRAGMAS_FOR_WRITING =
     "PRAGMA synchronous = FULL; PRAGMA cache_size = -8192; PRAGMA temp_store = MEMORY;"
     "PRAGMA journal_mode = WAL";
-constexpr int MOST_LOG_FRAMES = 1000;  // of 4 KiB
 constexpr const char* PRAGMAS_FOR_READING = "PRAGMA cache_size = -8192; PRAGMA query_only = 1";
+
+void CutLogOf(sqlite3* db, const char* name) {
+  sqlite3_busy_timeout(db, 0);
+  (void)sqlite3_wal_checkpoint_v2(db, name, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  sqlite3_busy_timeout(db, BUSY_TIMEOUT_MS);
+}
+
+bool HasPlenty(sqlite3* db, const char* name) {
+  constexpr uintmax_t PLENTY = uintmax_t{1} << 30;
+  std::error_code failed;
+  const std::filesystem::space_info space =
+      std::filesystem::space(sqlite3_db_filename(db, name), failed);
+  return !failed && space.available >= PLENTY;
+}
 
 // Called at each commit. A log that was only copied back would grow for ever: a connection is
 // closed after each commit, and the next one, which reads the whole log, no longer knows what was
 // copied. So it is cut. A reader that is in the way is not waited for: the next commit tries again.
-int CutLongLog(void* /*unused*/, sqlite3* db, const char* name, int frames) {
-  if (frames >= MOST_LOG_FRAMES) {
-    sqlite3_busy_timeout(db, 0);
-    (void)sqlite3_wal_checkpoint_v2(db, name, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
-    sqlite3_busy_timeout(db, BUSY_TIMEOUT_MS);
+int CutLongLog(void* form, sqlite3* db, const char* name, int frames) {
+  const int most = static_cast<const DatabaseForm*>(form)->most_log_frames;
+  if (frames >= most || (frames >= LEAST_LOG_FRAMES && !HasPlenty(db, name))) {
+    CutLogOf(db, name);
   }
   return SQLITE_OK;
 }
@@ -300,10 +313,14 @@ IndexError IndexDatabase::OpenForWriting(const std::string& index_path, bool cre
   }
 
   if (error == IndexError::NONE) {
-    sqlite3_wal_hook(db, CutLongLog, nullptr);
+    sqlite3_wal_hook(db, CutLongLog, const_cast<DatabaseForm*>(&form));
     Remember("main", index_path + "/" + form.file);
   }
   return error;
+}
+
+void IndexDatabase::CutLog() {
+  CutLogOf(db, "main");
 }
 
 IndexError IndexDatabase::OpenForReading(const std::string& index_path, const DatabaseForm& form) {

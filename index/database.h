@@ -39,7 +39,10 @@ struct DatabaseForm {
   const char* last_commit;      // a column there that grows with each commit, which is noted beside
                                 // the database as well (see last_commit.h); null: there is none
   int (*prepare)(sqlite3* db);  // what the tables need of a connection; null: nothing
+  int most_log_frames;          // of 4 KiB: where the disk has plenty of room, a log of so many is
+                                // copied back and cut; else, one of LEAST_LOG_FRAMES
 };
+constexpr int LEAST_LOG_FRAMES = 1000;
 
 extern const DatabaseForm ENTRIES_FORM;
 
@@ -70,6 +73,8 @@ class IndexDatabase {
   // transaction. Without success nothing is attached.
   IndexError Attach(const std::string& index_path, const char* name, const DatabaseForm& form);
   void Close();
+  // Copies the log back and empties it, unless somebody is in the way.
+  void CutLog();
 
   bool IsOpen() const { return db != nullptr; }
   // True when a file that is open here, or its log, or the memory that its users share, is no

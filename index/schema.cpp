@@ -65,6 +65,7 @@ const DatabaseForm ENTRIES_FORM = {
     .probed = "meta WHERE id = 1",
     .last_commit = "last_written",
     .prepare = nullptr,
+    .most_log_frames = LEAST_LOG_FRAMES,  // each commit's connection reads it
 };
 
 }  // namespace fileindexd

@@ -229,6 +229,10 @@ bool ContentsWriter::Merge(bool& more) {
   return impl->Call("Merge");
 }
 
+void ContentsWriter::CutLog() {
+  (void)impl->Call("CutLog");
+}
+
 bool ContentsWriter::HasChanges() const {
   return impl->changed;
 }
