@@ -2,9 +2,9 @@
 // The content service: follows what the daemon commits, has what is wanted read by the pool of
 // helpers, and writes it down.
 //
-// DESIGN. One thread for all but what the shares' file systems are asked, and the cutting of texts
-// while one share alone has any (see opener.h). It never waits but in poll, and for disks of our
-// own:
+// DESIGN. One thread for all but what the shares' file systems are asked, the cutting of texts
+// while one share alone has any (see opener.h), and commits. It never waits but in poll, and for
+// disks of our own:
 //
 //   watches      hints: a commit, other settings, the pause, the daemon's pid file
 //   permission   the daemon's end, the end of a pause
@@ -17,9 +17,10 @@
 // child processes' work, and what a share's file system is asked, which may never answer, is a
 // thread's of that share. The rest is SQLite's, which takes one writer at a time. Texts are packed
 // and cut into words beside it, by the thread that looked whether their file is still the same;
-// where several shares are at work, whose texts would add up, by the writer. Without permission
-// nothing is read and nothing written: what runs is killed and taken back, and it goes on where it
-// was.
+// where several shares are at work, whose texts would add up, by the writer. A commit, which writes
+// the words' table and waits for the disk, is a thread's of its own while there is more to read:
+// the helpers are given work meanwhile. Without permission nothing is read and nothing written:
+// what runs is killed and taken back, and it goes on where it was.
 #pragma once
 
 #include <poll.h>

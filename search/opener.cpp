@@ -134,8 +134,8 @@ bool Opener::Ask(Question question, Time now, Work work) {
   return true;
 }
 
-void Opener::Take(Time now) {
-  while (waiting > 0) {
+void Opener::Take(Time now, size_t most) {
+  for (size_t taken = 0; waiting > 0 && taken < most; ++taken) {
     Answer answer;
     {
       const std::lock_guard lock(shared->mutex);

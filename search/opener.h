@@ -18,6 +18,7 @@
 #include <poll.h>
 
 #include <chrono>
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <vector>
@@ -44,9 +45,9 @@ class Opener {
 
   // False when no thread can be had.
   bool Ask(Question question, Time now, Work work = nullptr);
-  // Runs the answers that have come, but for those of questions that were dropped. One may drop the
-  // others.
-  void Take(Time now);
+  // Runs the answers that have come, or the first ones of them, but for those of questions that were
+  // dropped. One may drop the others.
+  void Take(Time now, size_t most = SIZE_MAX);
   // What was asked is not answered any more.
   void Drop();
   // The same file, which the other thread closes when nobody has it any more; may be let go by any

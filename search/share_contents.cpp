@@ -67,7 +67,7 @@ void ShareContents::EntriesChanged() {
 
 // Nothing is opened for it, or our own closing would keep us awake for ever.
 void ShareContents::EntriesClosed() {
-  if (writer.IsOpen()) {
+  if (IsOpen()) {
     has_news = true;
     between_looks = milliseconds(0);
     next_take_in = std::min(next_take_in, taken_in + SHORTEST_BETWEEN_LOOKS);
@@ -90,8 +90,8 @@ bool ShareContents::CanWork(Time now) const {
 
 bool ShareContents::IsIdle() const {
   return !has_news && !look_at_all && !Sweeps() && !WantsMore() && fresh.ready.empty() &&
-         again.ready.empty() && running.empty() && !opener.IsWaiting() && !retry_wanted &&
-         !writer.HasChanges();
+         again.ready.empty() && running.empty() && !opener.IsWaiting() && opened.empty() &&
+         !retry_wanted && !HasChanges();
 }
 
 // When the disk is asked again for what it did not give. The writer may be closed meanwhile.
@@ -114,10 +114,14 @@ void ShareContents::FollowUnread(Time now, int64_t wall) {
 }
 
 void ShareContents::Work(Time now, int64_t wall) {
+  if (!TakeCommit(now)) {
+    return;
+  }
   if (CanWork(now)) {
     TakeAnswers(now);
+    BeginTries(now);
   }
-  if (!CanWork(now)) {
+  if (!CanWork(now) || committing.IsRunning()) {
     return;
   }
   if (now >= next_full_look) {
@@ -141,9 +145,12 @@ void ShareContents::Work(Time now, int64_t wall) {
   if (takes_more && !HasRoom(now)) {
     return;
   }
-  const bool good =
-      Retry() && TakeIn(now) && Sweep(wall) && ReleasePatient(now) && CommitIfDue(now) && Merge();
-  if (!good) {
+  if (!Retry() || !TakeIn(now) || !Sweep(wall) || !ReleasePatient(now)) {
+    RestForError(now);
+    return;
+  }
+  CommitIfDue(now);
+  if (!Merge()) {
     RestForError(now);
     return;
   }
@@ -215,11 +222,11 @@ bool ShareContents::ReleasePatient(Time now) {
 // With nothing more to come, at once: somebody may be waiting for it. What is being read for longer
 // than a lull is slow, and is not waited for.
 Time ShareContents::CommitDue() const {
-  if (!first_change) {
+  if (!first_change || writer.PendingBytes() >= enough_pending) {
     return Time();
   }
   const Time latest = *first_change + COMMIT_AGE;
-  if (has_news || Sweeps() || WantsMore() || opening || !fresh.ready.empty() ||
+  if (has_news || Sweeps() || WantsMore() || opening || !opened.empty() || !fresh.ready.empty() ||
       (may_read_again && !again.ready.empty())) {
     return latest;
   }
@@ -230,17 +237,57 @@ Time ShareContents::CommitDue() const {
   return running.empty() ? Time() : std::min({latest, last_end + LULL, newest + LULL});
 }
 
-bool ShareContents::CommitIfDue(Time now) {
+void ShareContents::CommitIfDue(Time now) {
   if (!writer.HasChanges()) {
     first_change.reset();
-    return true;
+    return;
   }
 
   first_change = first_change.value_or(now);
-  if (writer.PendingBytes() < enough_pending && now < CommitDue()) {
+  if (now >= CommitDue()) {
+    CommitBeside([this] { return writer.Commit(); }, now);
+  }
+}
+
+// With nothing to do meanwhile, it is done here: what is new is found sooner.
+void ShareContents::CommitBeside(std::function<bool()> commit, Time now) {
+  const auto work = [this, commit = std::move(commit)] { committed = commit(); };
+  if (!HasMore() || !committing.Begin(work)) {
+    work();
+    EndCommit(now);
+  } else {
+    (void)TakeCommit(now);
+  }
+}
+
+// False while the writer is committing.
+bool ShareContents::TakeCommit(Time now) {
+  if (!committing.IsRunning()) {
     return true;
   }
-  return Commit();
+  if (!committing.HasEnded()) {
+    return false;
+  }
+  committing.Await();
+  EndCommit(now);
+  return true;
+}
+
+void ShareContents::EndCommit(Time now) {
+  if (!committed) {
+    RestForError(now);
+    return;
+  }
+  first_change.reset();
+  std::deque<Ready>& ready = LineOf(opened_for).ready;
+  std::move(opened.begin(), opened.end(), std::back_inserter(ready));
+  opened.clear();
+  GoneOn();
+}
+
+ContentsWriter& ShareContents::Writer() {
+  committing.Await();
+  return writer;
 }
 
 bool ShareContents::Commit() {
@@ -274,6 +321,7 @@ void ShareContents::CloseIfIdle(Time now) {
     const bool sweep = is_sweeping;
     const bool reads_again = again.may_have;
     GoneOn();
+    writer.CutLog();
     Forget();
     later_look = look;
     is_sweeping = sweep;
@@ -282,7 +330,7 @@ void ShareContents::CloseIfIdle(Time now) {
 }
 
 void ShareContents::Halt() {
-  if (!writer.IsOpen()) {
+  if (!Writer().IsOpen()) {
     DropQuestions();
     return;
   }
@@ -297,6 +345,9 @@ void ShareContents::Halt() {
       good = good && writer.Release(one.job.file);
     }
   }
+  for (const Ready& one : opened) {
+    good = good && writer.Release(one.job.file);
+  }
   if (!good || (writer.HasChanges() && !writer.Commit())) {
     ServiceDebug("Share[%s] stopped in the middle, reason=%s", share.name.c_str(),
                  IndexErrorText(writer.Error()));
@@ -305,8 +356,16 @@ void ShareContents::Halt() {
   has_news = true;
 }
 
+void ShareContents::AddPolled(std::vector<pollfd>& polled) const {
+  if (committing.IsRunning()) {
+    committing.AddPolled(polled);  // answers are taken behind it
+  } else {
+    opener.AddPolled(polled);
+  }
+}
+
 Time ShareContents::Due() const {
-  if (no_space) {
+  if (no_space || committing.IsRunning()) {
     return Time::max();
   }
   if (is_asking_root && !root.has_value()) {

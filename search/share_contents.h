@@ -6,9 +6,10 @@
 // A share whose databases or whose root fail rests, for longer each time, and nobody else is held
 // up by it. What is given out is opened, looked at and on record before. The share's own file
 // system is asked by way of an Opener alone: while there is no answer, this share waits, and then
-// rests.
+// rests. While there is more to read, commits are made by a thread of their own: files are given
+// out and taken back meanwhile, and what was found in them waits.
 //
-// One thread, but for the Opener's. Times are passed in.
+// One thread, but for these two. Times are passed in.
 #pragma once
 
 #include <poll.h>
@@ -16,6 +17,7 @@
 #include <chrono>
 #include <cstdint>
 #include <deque>
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
@@ -28,6 +30,7 @@
 #include "index/contents_writer.h"
 #include "search/open_file.h"
 #include "search/opener.h"
+#include "search/side_work.h"
 #include "state/belonging.h"
 #include "state/settings.h"
 #include "state/store.h"
@@ -42,7 +45,7 @@ class ShareContents {
   explicit ShareContents(Share followed);
 
   // Settings in force: which kinds are wanted where. Folders that changed want LookAtAll.
-  void Use(std::shared_ptr<const Settings> settings) { writer.UseSettings(std::move(settings)); }
+  void Use(std::shared_ptr<const Settings> settings) { Writer().UseSettings(std::move(settings)); }
   // What is known of the share from outside, as it is now.
   void Set(const Share& current, const ShareStatus& status);
   void EntriesChanged();
@@ -72,7 +75,7 @@ class ShareContents {
   void Halt();
 
   // What tells that an answer of the file system is there: Work wants to be called.
-  void AddPolled(std::vector<pollfd>& polled) const { opener.AddPolled(polled); }
+  void AddPolled(std::vector<pollfd>& polled) const;
   // When Work wants to be called; max() if nothing is to be done.
   Time Due() const;
   // True once after all that failed was made to wait again, and that is on disk.
@@ -89,6 +92,7 @@ class ShareContents {
 
  private:
   static constexpr std::chrono::hours BETWEEN_FULL_LOOKS{24};
+  static constexpr size_t MOST_PATIENT = 4096;
   struct Ready {
     ContentJob job;
     std::shared_ptr<ScopedFd> file;  // this, and all that are open: kept by the opener
@@ -127,20 +131,31 @@ class ShareContents {
   bool Retry();
   bool Merge();
   bool ReleasePatient(Time now);
-  bool CommitIfDue(Time now);
+  void CommitIfDue(Time now);
   bool Commit();
+  // The writer, once nobody else has it: waits for a commit.
+  ContentsWriter& Writer();
+  bool IsOpen() const { return committing.IsRunning() || writer.IsOpen(); }
+  bool HasChanges() const { return committing.IsRunning() || writer.HasChanges(); }
+  bool HasMore() const { return !running.empty() || !fresh.ready.empty() || !again.ready.empty(); }
+  void CommitBeside(std::function<bool()> commit, Time now);
+  bool TakeCommit(Time now);
+  void EndCommit(Time now);
+  void BeginTries(Time now);
   void CloseIfIdle(Time now);
 
+  bool MayOpen(const Line& line) const {
+    return line.may_have && !opening && opened.empty() && patient.size() < MOST_PATIENT;
+  }
   Line& LineOf(Turn turn) { return turn == Turn::NEW ? fresh : again; }
   const Line& LineOf(Turn turn) const { return turn == Turn::NEW ? fresh : again; }
   bool WantsMore() const { return fresh.may_have || (again.may_have && may_read_again); }
   void MayHaveMore() { fresh.may_have = again.may_have = true; }
   void FollowUnread(Time now, int64_t wall);
-  bool Refill(Turn turn, Time now);
+  void Refill(Turn turn, Time now);
   bool TakeUnopened(int64_t file, Opening opening, const std::string& reason, Time now);
-  void TakeBatch(Batch& opened);
+  void TakeBatch(Batch& batch_of_files);
   void TakeLook(uint64_t id, const Ended& ended);
-  bool BeginTries(const Line& line);
   void BePatient(int64_t file, Time now);
   void AdaptBatch(Time now);
 
@@ -154,14 +169,19 @@ class ShareContents {
   void GoneOn();
   void Forget();
 
-  ContentsWriter writer;
+  ContentsWriter writer;                      // the other thread's while it is committing
+  bool committed = false;                     // whether that was good; as the writer
+  SideWork committing;                        // goes before both
   std::shared_ptr<ContentPreparer> preparer;  // null until it is needed
   Opener opener;
   bool is_asking_root = false;
   std::optional<RootState> root;  // the answer, until it is used
   std::optional<Turn> opening;    // a batch for that turn
-  size_t looking = 0;             // at files that were read
-  Time answered;                  // the time, for answers
+  std::vector<Ready> opened;      // the last one: about to be put on record, for
+  Turn opened_for = Turn::NEW;
+  size_t looking = 0;        // at files that were read
+  size_t looking_bytes = 0;  // of their texts
+  Time answered;             // the time, for answers
   bool has_news = true;
   bool takes_more = false;  // the last look at news did not see all
   bool look_at_all = true;

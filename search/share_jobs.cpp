@@ -24,14 +24,14 @@ constexpr milliseconds QUICK_BATCH(250);
 constexpr milliseconds SLOW_BATCH(1000);
 
 // Files that were read and are looked at again: what they were found to hold is kept meanwhile.
-constexpr size_t MOST_LOOKING = 4;
+constexpr size_t MOST_LOOKING = 64;
+constexpr size_t MOST_LOOKING_BYTES = size_t{5} << 19;
 
 // Files that are open and on record while what is new goes first.
 constexpr size_t MOST_AGAIN = 16;
 
 constexpr seconds FIRST_PATIENCE(2);
 constexpr seconds LONGEST_PATIENCE(300);
-constexpr size_t MOST_PATIENT = 4096;
 
 }  // namespace
 
@@ -79,26 +79,34 @@ struct ShareContents::Batch {
 
 bool ShareContents::MayHaveJobs(Turn turn, Time now) const {
   const Line& line = LineOf(turn);
-  const bool may_open = line.may_have && !opening && patient.size() < MOST_PATIENT;
-  return writer.IsOpen() && CanWork(now) && looking < MOST_LOOKING &&
+  const bool may_open = !committing.IsRunning() && MayOpen(line);
+  return IsOpen() && CanWork(now) && looking < MOST_LOOKING && looking_bytes < MOST_LOOKING_BYTES &&
          (!line.ready.empty() || may_open);
 }
 
 bool ShareContents::IsNewWaiting(Time now) const {
-  return writer.IsOpen() && CanWork(now) &&
+  return IsOpen() && CanWork(now) &&
          ((fresh.may_have && patient.size() < MOST_PATIENT) || !fresh.ready.empty() ||
-          opening == Turn::NEW);
+          opening == Turn::NEW || (!opened.empty() && opened_for == Turn::NEW));
 }
 
 bool ShareContents::TakesRoom(Time now) const {
-  return writer.IsOpen() && CanWork(now) &&
-         (WantsMore() || opening || !fresh.ready.empty() || !again.ready.empty() ||
-          !running.empty() || writer.HasChanges());
+  return IsOpen() && CanWork(now) &&
+         (WantsMore() || opening || !opened.empty() || !fresh.ready.empty() ||
+          !again.ready.empty() || !running.empty() || HasChanges());
 }
 
 bool ShareContents::Next(Turn turn, Time now, uint64_t id, ExtractJob& job) {
   Line& line = LineOf(turn);
-  if (!MayHaveJobs(turn, now) || (line.ready.empty() && !Refill(turn, now))) {
+  if (!MayHaveJobs(turn, now)) {
+    return false;
+  }
+  // The second half of what is new is read while the next files are opened and put on record.
+  const size_t ahead = turn == Turn::NEW ? batch / 2 : 0;
+  if (line.ready.size() <= ahead && !committing.IsRunning() && MayOpen(line)) {
+    Refill(turn, now);
+  }
+  if (line.ready.empty()) {
     return false;
   }
 
@@ -117,9 +125,9 @@ bool ShareContents::Next(Turn turn, Time now, uint64_t id, ExtractJob& job) {
 }
 
 // What comes of it is ready now, or later.
-bool ShareContents::Refill(Turn turn, Time now) {
+void ShareContents::Refill(Turn turn, Time now) {
   if (!HasRoom(now)) {
-    return false;
+    return;
   }
   Line& line = LineOf(turn);
   std::vector<ContentJob> jobs;
@@ -133,7 +141,7 @@ bool ShareContents::Refill(Turn turn, Time now) {
   }
   if (!good) {
     RestForError(now);
-    return false;
+    return;
   }
 
   auto asked = std::make_shared<Batch>();
@@ -153,36 +161,46 @@ bool ShareContents::Refill(Turn turn, Time now) {
       return [this, asked] { TakeBatch(*asked); };
     };
     Ask(std::move(open), now);
+    BeginTries(now);
   }
-  return !line.ready.empty();
 }
 
-void ShareContents::TakeBatch(Batch& opened) {
+void ShareContents::TakeBatch(Batch& batch_of_files) {
   const Time now = answered;
   assert(opening);  // who does not wait for it any more drops the question
-  Line& line = LineOf(*std::exchange(opening, std::nullopt));
+  opened_for = *std::exchange(opening, std::nullopt);
   // First: what is open is not left to the batch, which would close it here. Closing is asking,
   // too.
-  for (Batch::File& one : opened.files) {
+  for (Batch::File& one : batch_of_files.files) {
     if (one.opening == Opening::DONE) {
-      Ready& next = line.ready.emplace_back();
+      Ready& next = opened.emplace_back();
       next.file = opener.Keep(one.file);
       next.name = one.path.substr(one.path.rfind('/') + 1);
       next.job = std::move(one.job);
     }
   }
-  if (!IsSound(opened.root, now)) {
+  if (!IsSound(batch_of_files.root, now)) {
     return;
   }
-  for (const Batch::File& one : opened.files) {
+  for (const Batch::File& one : batch_of_files.files) {
     if (one.opening != Opening::DONE && !TakeUnopened(one.job.file, one.opening, one.reason, now)) {
       RestForError(now);
       return;
     }
   }
-  if (!line.ready.empty() && !BeginTries(line)) {
-    RestForError(now);
+}
+
+// What is open goes to the helpers once it is on record.
+void ShareContents::BeginTries(Time now) {
+  if (opened.empty() || committing.IsRunning()) {
+    return;
   }
+  std::vector<int64_t> files;
+  files.reserve(opened.size());
+  for (const Ready& one : opened) {
+    files.push_back(one.job.file);
+  }
+  CommitBeside([this, files = std::move(files)] { return writer.BeginTries(files); }, now);
 }
 
 // False when that could not be written down.
@@ -215,19 +233,6 @@ void ShareContents::AdaptBatch(Time now) {
   refilled = now;
 }
 
-bool ShareContents::BeginTries(const Line& line) {
-  std::vector<int64_t> files;
-  files.reserve(line.ready.size());
-  for (const Ready& one : line.ready) {
-    files.push_back(one.job.file);
-  }
-  if (!writer.BeginTries(files)) {
-    return false;
-  }
-  first_change.reset();
-  return true;
-}
-
 void ShareContents::BePatient(int64_t file, Time now) {
   if (patience.size() >= MOST_PATIENT) {
     std::erase_if(patience, [now](const auto& one) { return one.second.until <= now; });
@@ -241,6 +246,7 @@ void ShareContents::BePatient(int64_t file, Time now) {
 struct ShareContents::Ended {
   ExtractOutcome outcome;
   std::shared_ptr<ScopedFd> file;
+  size_t bytes = 0;  // of its text
   bool is_still = false;
   PreparedContent found;
 };
@@ -263,9 +269,11 @@ void ShareContents::End(ExtractOutcome&& outcome, Time now) {
 
   const uint64_t id = outcome.id;
   const auto ended = std::make_shared<Ended>();
+  ended->bytes = outcome.content.text.size();
   ended->outcome = std::move(outcome);
   ended->file = std::move(found->second.open);
   ++looking;
+  looking_bytes += ended->bytes;
   const auto look = [this, id, ended, identity = found->second.identity]() -> Opener::Answer {
     ended->is_still = IsStill(ended->file->fd, identity);
     ended->file.reset();
@@ -287,6 +295,7 @@ void ShareContents::TakeLook(uint64_t id, const Ended& ended) {
   assert(found != running.end());  // who takes back what runs drops the questions about it
   const Time now = answered;
   --looking;
+  looking_bytes -= ended.bytes;
   const int64_t file = found->second.file;
   const ExtractOutcome& outcome = ended.outcome;
   running.erase(found);
@@ -311,9 +320,13 @@ void ShareContents::TakeLook(uint64_t id, const Ended& ended) {
         break;
     }
   }
-  if (!good || !CommitIfDue(now)) {
+  if (!good) {
     RestForError(now);
     return;
+  }
+  first_change = first_change.value_or(now);
+  if (!HasMore()) {
+    CommitIfDue(now);  // before it is asked whether there are others
   }
   MayHaveMore();  // it may wait again, or another have waited for its end
   may_merge = true;

@@ -16,6 +16,8 @@ using std::chrono::seconds;
 
 constexpr seconds SHORTEST_REST(1);
 constexpr seconds LONGEST_REST(60);
+// At once: writing down what was found takes its time, in which nobody gives the helpers work.
+constexpr size_t MOST_ANSWERS = 4;
 
 }  // namespace
 
@@ -37,8 +39,8 @@ void ShareContents::Open(Time now) {
   is_asking_root = false;
   root.reset();
 
-  const IndexError opened = writer.Open(share, EXTRACTOR_VERSION);
-  if (opened == IndexError::PATH_NOT_FOUND) {
+  const IndexError result = writer.Open(share, EXTRACTOR_VERSION);
+  if (result == IndexError::PATH_NOT_FOUND) {
     look_at_all = true;
     has_news = writer.AreEntriesBeingRemoved();
     if (has_news) {
@@ -48,8 +50,8 @@ void ShareContents::Open(Time now) {
     }
     return;
   }
-  if (opened != IndexError::NONE) {
-    Rest(now, IndexErrorText(opened));
+  if (result != IndexError::NONE) {
+    Rest(now, IndexErrorText(result));
     return;
   }
 
@@ -95,9 +97,13 @@ void ShareContents::Ask(Opener::Question question, Time now, Opener::Work work) 
   TakeAnswers(now);
 }
 
+// Not while another thread has the writer: most answers are for it.
 void ShareContents::TakeAnswers(Time now) {
+  if (committing.IsRunning()) {
+    return;
+  }
   answered = now;
-  opener.Take(now);
+  opener.Take(now, MOST_ANSWERS);
   if (now >= opener.Deadline()) {
     Rest(now, "its file system does not answer");
   }
@@ -105,7 +111,7 @@ void ShareContents::TakeAnswers(Time now) {
 
 void ShareContents::RestForError(Time now) {
   // A database was taken away while it was open: the next opening tells which.
-  if (writer.Error() == IndexError::PATH_NOT_FOUND) {
+  if (Writer().Error() == IndexError::PATH_NOT_FOUND) {
     Forget();
     look_at_all = true;
     has_news = true;
@@ -121,7 +127,7 @@ void ShareContents::Rest(Time now, const std::string& reason) {
     ServiceLog("Share[%s] contents rest, reason=%s", share.name.c_str(), reason.c_str());
     rest_told = true;
   }
-  if (writer.HasChanges()) {
+  if (Writer().HasChanges()) {
     (void)writer.Commit();  // good if it still can be done: it would be read once more
   }
   Forget();
@@ -145,12 +151,14 @@ void ShareContents::DropQuestions() {
   root.reset();
   opening.reset();
   looking = 0;
+  looking_bytes = 0;
 }
 
 // What was given out is not waited for any more.
 void ShareContents::Forget() {
-  writer.Close();
+  Writer().Close();
   DropQuestions();
+  opened.clear();
   fresh.ready.clear();
   again.ready.clear();
   running.clear();

@@ -64,6 +64,9 @@ struct ScriptedPool {
 // Of all shares: what is asked is not answered. False in the beginning.
 bool& FilesystemHangs();
 
+// Of all shares: what is done beside has not ended until it is awaited. False in the beginning.
+bool& SideWorkTakesTime();
+
 // As the entries would have it.
 FileIdentity IdentityOf(const std::string& path);
 

@@ -36,7 +36,7 @@ bool Opener::Ask(Question question, Time now, Work work) {
   return true;
 }
 
-void Opener::Take(Time now) {
+void Opener::Take(Time now, size_t /*most*/) {
   if (!FilesystemHangs()) {
     shared->dropped.clear();
     shared->closing.clear();

@@ -197,6 +197,7 @@ TEST_F(ShareContentsTest, WithNothingToDoItClosesAndSleeps) {
   EXPECT_THAT(GiveOut(), IsEmpty());
   Wait(20);
   EXPECT_EQ(Count("Close"), 1U);  // though it looks once more later
+  EXPECT_EQ(Count("CutLog"), 1U);
   Quieten();
 
   EXPECT_GT(contents.Due() - now, std::chrono::hours(20));

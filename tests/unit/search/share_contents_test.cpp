@@ -90,6 +90,7 @@ TEST_F(ShareContentsTest, MuchTextIsCommittedAtOnce) {
   ASSERT_EQ(ids.size(), 2U);
 
   End(ids[0], ExtractOutcome::Result::DONE, std::string(9 << 20, 'x'));
+  Settle();
 
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
 }
@@ -285,10 +286,10 @@ TEST_F(ShareContentsTest, AFileSystemThatIsTooSlowForABatchIsAskedForSmallerOnes
     AddFile(row);
   }
   Settle();
-  ASSERT_EQ(GiveOut(28).size(), 28U);
+  ASSERT_EQ(GiveOut(20).size(), 20U);
   ASSERT_EQ(Count("NextJobs 16"), 1U);
   FilesystemHangs() = true;
-  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_EQ(GiveOut().size(), 8U) << "those that were open before";
   ASSERT_EQ(Count("NextJobs 32"), 1U);
   Pass(seconds(10));
   ASSERT_EQ(Count("Close"), 1U);
