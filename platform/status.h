@@ -19,7 +19,8 @@ bool IsUpdated(const std::string& marker);
 bool SetUpdated(const std::string& marker);
 
 // Whether the whole share has to be indexed again: the flag is set, or a reindex was begun and has
-// not ended.
+// not ended. Asked at the beginning of a pass: where the host puts the reindex off, the answer is
+// no, and the host remembers until the pass's end that another one may be due.
 bool ShareIsNeedReindex(const std::string& share_name);
 // Sets the flag, or clears it and records that the reindex begins.
 void ShareSetNeedReindex(const std::string& share_name, bool need);

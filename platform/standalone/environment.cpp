@@ -198,18 +198,19 @@ bool PutReindexOff(const std::string& share) {
   return true;
 }
 
-void TakeUpReindex(const std::string& share) {
+bool TakeUpReindex(const std::string& share) {
   Environment& process = Process();
   {
     const std::lock_guard guard(process.mutex);
     if (process.put_off.erase(share) == 0) {
-      return;
+      return false;
     }
   }
   std::string error;
   if (!IsShareEmptied(share) && !AppendToQueue(share, {}, error)) {
     FI_LOG("Failed to wake share[%s]: %s", share.c_str(), error.c_str());
   }
+  return true;
 }
 
 void NoteCommit(const std::string& share, bool good) {

@@ -39,8 +39,9 @@ bool IsRootAway(const std::string& share);
 // Whether a whole reindex is to be put off although it is asked for: the root is empty where it was
 // not, so it would be refused, and take along the queue in which single deletions are told of.
 bool PutReindexOff(const std::string& share);
-// At the end of a pass: sees to the next one if the reindex was put off and may be made now.
-void TakeUpReindex(const std::string& share);
+// At the end of a pass: whether the reindex was put off in it. If it was, and may be made now, sees
+// to the next one.
+bool TakeUpReindex(const std::string& share);
 
 void NoteCommit(const std::string& share, bool good);
 // True once after each good commit: what is opened then is a database that was there.

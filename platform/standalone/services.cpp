@@ -177,8 +177,8 @@ bool MayRemoveDrainedCopy(const std::string& share) {
          (!IsPassShort(share) || RecordReindex(share));
 }
 
-// A pass that removes the copy was not stopped: a reindex that was begun has ended, if the share
-// could be looked at and its changes are durable.
+// A pass that removes the copy was not stopped: a reindex that was begun, and not put off, has
+// ended, if the share could be looked at and its changes are durable.
 void EndReindex(const std::string& share_name) {
   if (!StatusOf(share_name).reindex_begun || !WasLastCommitGood(share_name)) {
     return;
@@ -244,11 +244,11 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
       // lacking, that would be all that the processor does.
       wait = SHORTAGE_PAUSE_US;
     }
-    if (!share.empty() && status == 0) {
-      EndReindex(share);
-    }
     if (!share.empty()) {
-      TakeUpReindex(share);
+      const bool was_put_off = TakeUpReindex(share);
+      if (status == 0 && !was_put_off) {
+        EndReindex(share);
+      }
       wait = std::max(wait, EndPass(share));
     }
     return status;

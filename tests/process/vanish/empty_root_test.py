@@ -2,6 +2,7 @@
 """A share's folder is empty where it was not: what is believed, and what waits."""
 
 import os
+import sqlite3
 import subprocess
 
 from harness import main, namespace
@@ -63,6 +64,26 @@ class EmptyRoot(IndexTest):
         self.reindex()
         self.delete("nothing")
         self.assertEqual(self.share()["root"], "empty")
+
+        os.rmdir(self.root)
+        os.rename(f"{self.root}.away", self.root)
+        self.make_files(self.root, "d/new.txt")
+        self.delete("nothing")
+
+        self.assert_in_step()
+
+    def test_a_reindex_that_was_interrupted_is_made_up_for_when_the_files_are_back(self):
+        self.stop(self.daemon_pid())
+        with sqlite3.connect(f"{namespace.STATE}/state.db") as state:
+            changed = state.execute("UPDATE status SET needs_reindex = 0, reindex_begun = 1")
+            self.assertEqual(changed.rowcount, 1)
+            state.execute("UPDATE number SET value = value + 1 WHERE name = 'changes'")
+        state.close()
+        os.rename(self.root, f"{self.root}.away")
+        os.mkdir(self.root)
+        self.start()
+        self.delete("nothing")
+        self.assertTrue(self.share()["needs_reindex"])
 
         os.rmdir(self.root)
         os.rename(f"{self.root}.away", self.root)
