@@ -78,10 +78,11 @@ struct Indexer::Handle {
   }
 
   // What happened while the share could not be looked at is not seen again: when it is back, it is
-  // looked at as a whole. Nobody is woken, as the next pass would fail like this one.
+  // looked at as a whole. Nobody is woken before that, as the next pass would fail like this one.
   void NoteRoot(bool is_away) {
     if (is_away && !away_noted) {
       away_noted = RecordReindex(share_name);
+      (void)PutReindexOff(share_name);  // if it is only empty: that may change within the pass
     }
   }
 

@@ -9,6 +9,7 @@ from harness import main, namespace
 from harness.awaiting import IN_CHANGE, await_in_folder
 from harness.checks import IndexTest
 
+ATTRIBUTES = 0x4
 DELETE = 0x80
 
 
@@ -89,6 +90,15 @@ class EmptyRoot(IndexTest):
         os.rename(f"{self.root}.away", self.root)
         self.make_files(self.root, "d/new.txt")
         self.delete("nothing")
+
+        self.assert_in_step()
+
+    def test_a_touched_root_and_its_last_deletes_in_one_batch_leave_nothing_to_be_done(self):
+        names = ("a.txt", "b.txt", "d/c.txt", "d")
+        self.empty()
+        os.chmod(self.root, 0o700)
+        self.append("alpha", {"event": ATTRIBUTES, "path": self.root},
+                    *({"event": DELETE, "path": f"{self.root}/{name}"} for name in names))
 
         self.assert_in_step()
 
