@@ -54,7 +54,9 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `deletes` is about
   SentDeletes deletes;
-  std::optional<std::string> root_reindex;  // the root, where its reindex waits with the backlog
+  // The root, where its reindex waits before the backlog. Not that of the settings: they may know no
+  // such share any more.
+  std::optional<std::string> root_reindex;
   bool root_in_file = false;           // the file that was written last holds a reindex of the root
   const Settings* in_force = nullptr;  // while FoldCrowds runs
   std::unique_ptr<EntryReader> reader;  // the same; null: the index cannot be read
@@ -129,8 +131,10 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
     deletes.Forget();
   }
   if (root_reindex.has_value()) {
-    // Not the root of the settings: they may know no such share any more.
-    return {{CUSTOM_EVENT_REINDEX, *std::exchange(root_reindex, {}), {}, {}}};
+    if (most < QUEUE_LINE_LIMIT) {
+      return {};  // the file holds lines, of whomever
+    }
+    return {{CUSTOM_EVENT_REINDEX, *root_reindex, {}, {}}};
   }
   std::vector<QueueLine> waiting = backlog->Take(most);
   std::vector<QueueLine> behind;
@@ -181,15 +185,17 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
   std::string reason;
   const Appended result = appender.Append(give, reason);
   if (result == Appended::DONE) {
-    root_in_file = taken.size() == 1 && taken[0].event == CUSTOM_EVENT_REINDEX &&
-                   IsRoot(settings, taken[0].path);
+    root_in_file = root_reindex.has_value();
+    root_reindex.reset();
     counts.lines += taken.size();
     for (const QueueLine& line : taken) {
       deletes.Note(line);
     }
     error.clear();
   } else if (result == Appended::FAILED) {
-    Queue(settings, taken);
+    if (!root_reindex.has_value()) {
+      Queue(settings, taken);
+    }
     error = reason;
   }
   full = result == Appended::FULL || (result == Appended::DONE && Backlog() > 0);

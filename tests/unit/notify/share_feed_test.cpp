@@ -265,6 +265,22 @@ TEST_F(ShareFeedTest, AReindexOfTheRootWaitsUntilTheLinesBeforeItAreTaken) {
   EXPECT_EQ(feed.NextDue(), std::nullopt);
 }
 
+TEST_F(ShareFeedTest, AReindexOfTheRootWaitsForTheLinesOfOthersToo) {
+  const std::string others = EventLine(QLIB_NOTIFY_DELETE, share + "/a");
+  std::string error;
+  ASSERT_TRUE(AppendToQueue("s", {others}, error)) << error;
+  IndexRoot();
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}}});
+  Work();
+  EXPECT_EQ(Queue(), Texts({others}));
+  EXPECT_EQ(feed.NextDue(), now + seconds(1));
+  TakeQueue();
+  Work();
+
+  EXPECT_EQ(Queue(), Texts({EventLine(CUSTOM_EVENT_REINDEX, share)}));
+  EXPECT_TRUE(feed.IsWrittenOut());
+}
+
 TEST_F(ShareFeedTest, AReindexOfTheRootThatWaitsOutlivesItsShare) {
   IndexRoot();
   feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}}});
