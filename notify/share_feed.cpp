@@ -39,10 +39,11 @@ struct ShareFeed::Impl {
   }
 
   void Clear();
-  bool IsRoot(const Settings& settings, const std::string& path) const;
+  std::string RootIn(const Settings& settings) const;
   uint64_t CountBelow(const std::string& directory, uint64_t limit) const;
   size_t Backlog() const { return backlog->Size() + (root_reindex.has_value() ? 1 : 0); }
   void Queue(const Settings& settings, const std::vector<QueueLine>& lines);
+  void QueueRootReindex(const std::string& root);
   void FoldCrowds(const Settings& settings);
   std::vector<QueueLine> TakeLines(const Settings& settings, size_t most);
   void Write(const Settings& settings, Clock::time_point now, bool at_once, FeedCounts& counts);
@@ -54,8 +55,8 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `deletes` is about
   SentDeletes deletes;
-  // The root, where its reindex waits before the backlog. Not that of the settings: they may know no
-  // such share any more.
+  // The root, where its reindex waits before the backlog. Not that of the settings: they may know
+  // no such share any more.
   std::optional<std::string> root_reindex;
   bool root_in_file = false;           // the file that was written last holds a reindex of the root
   const Settings* in_force = nullptr;  // while FoldCrowds runs
@@ -82,32 +83,38 @@ void ShareFeed::Impl::Clear() {
   error.clear();
 }
 
-bool ShareFeed::Impl::IsRoot(const Settings& settings, const std::string& path) const {
+// Empty when they know no such share.
+std::string ShareFeed::Impl::RootIn(const Settings& settings) const {
   const Share* fed = settings.ShareByName(share);
-  return fed != nullptr && fed->path == path;
+  return fed != nullptr ? fed->path : std::string();
 }
 
-// The limit, which keeps the lines as they are, where it cannot be told, and in the root.
+// The limit, which keeps the lines as they are, where it cannot be told.
 uint64_t ShareFeed::Impl::CountBelow(const std::string& directory, uint64_t limit) const {
   uint64_t below = 0;
   // A directory that only holds indexed folders is not to be reindexed itself.
-  const bool told = reader != nullptr && !IsRoot(*in_force, directory) &&
-                    in_force->FolderOfPath(directory) != nullptr &&
+  const bool told = reader != nullptr && in_force->FolderOfPath(directory) != nullptr &&
                     reader->CountBelow(directory, limit, below);
   return told ? below : limit;
 }
 
 void ShareFeed::Impl::Queue(const Settings& settings, const std::vector<QueueLine>& lines) {
+  const std::string root = RootIn(settings);
   for (const QueueLine& line : lines) {
-    if (line.event == CUSTOM_EVENT_REINDEX && IsRoot(settings, line.path)) {
-      root_reindex = line.path;
+    if (line.event == CUSTOM_EVENT_REINDEX && line.path == root) {
+      QueueRootReindex(root);
     } else if (line.event == QLIB_NOTIFY_RENAME) {
       backlog->AddRename(line.path, line.path_old);
-    } else {
+    } else if (!root_reindex.has_value() || !IsLook(line.event)) {
       backlog->Add(line.event, line.path, line.data);
     }
   }
   came += lines.size();
+}
+
+void ShareFeed::Impl::QueueRootReindex(const std::string& root) {
+  root_reindex = root;
+  backlog->DropLooks(root);
 }
 
 void ShareFeed::Impl::FoldCrowds(const Settings& settings) {
@@ -118,7 +125,10 @@ void ShareFeed::Impl::FoldCrowds(const Settings& settings) {
     if (reader->Open(share) != IndexError::NONE) {
       reader.reset();
     }
-    backlog->FoldCrowded();
+    const std::string root = RootIn(settings);
+    if (backlog->FoldCrowded(root)) {
+      QueueRootReindex(root);
+    }
     reader.reset();
     in_force = nullptr;
   }

@@ -8,10 +8,9 @@
 // last 50 ms, 50 ms later or when 1 MiB of lines are gathered. Nothing here waits: a locked queue
 // and a full one (5,000 lines) are tried again later, and meanwhile the backlog folds.
 //
-// What stands directly in the share's root is never folded into it, and a reindex of the root
-// stands alone in its queue file. In one batch the daemon drops what lies below a reindex, and a
-// root that is empty where it was not takes nothing out of the index: of what is deleted in it,
-// each line counts.
+// A reindex of the share's root stands alone in its queue file, and of the backlog it takes in only
+// what asks for a look. In one batch the daemon drops what lies below a reindex, and a root that is
+// empty where it was not takes nothing out of the index: of what is deleted, each line counts.
 #pragma once
 
 #include <chrono>

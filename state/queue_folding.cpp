@@ -40,6 +40,12 @@ std::string_view ParentOf(std::string_view path) {
 
 }  // namespace
 
+bool IsLook(uint32_t event) {
+  constexpr uint32_t LOOKS =
+      QLIB_NOTIFY_MODIFY | QLIB_NOTIFY_ATTRIB | QLIB_NOTIFY_CLOSE_WRITE | QLIB_NOTIFY_CREATE;
+  return (event & ~LOOKS) == 0;
+}
+
 bool ByComponents::operator()(std::string_view a, std::string_view b) const {
   const size_t shared = std::min(a.size(), b.size());
   const auto [at_a, at_b] = std::mismatch(a.begin(), a.begin() + shared, b.begin());
@@ -185,21 +191,42 @@ void QueueFolding::FoldInto(const std::string& directory) {
   }
 }
 
-void QueueFolding::FoldCrowded() {
+bool QueueFolding::IsCrowd(const std::string& directory, size_t held) const {
+  const uint64_t most = CROWD_SHARE * held;
+  return held > CROWD && count(directory, most + 1) <= most;
+}
+
+size_t QueueFolding::LooksIn(const std::string& directory) const {
+  size_t looks = 0;
+  auto line = lines.upper_bound(directory);
+  for (; line != lines.end() && Covers(directory, line->first); ++line) {
+    looks += IsLook(line->second.event) && ParentOf(line->first) == directory ? 1 : 0;
+  }
+  return looks;
+}
+
+bool QueueFolding::FoldCrowded(const std::string& spared) {
   std::vector<std::string> crowded;
   for (const auto& [directory, held] : direct) {
-    if (held > CROWD && !directory.empty()) {
+    if (held > CROWD && !directory.empty() && directory != spared) {
       crowded.push_back(directory);
     }
   }
   for (const std::string& directory : crowded) {
     const auto held = direct.find(directory);  // one above may have been folded meanwhile
-    if (held == direct.end() || held->second <= CROWD) {
-      continue;
-    }
-    const uint64_t most = CROWD_SHARE * held->second;
-    if (count(directory, most + 1) <= most) {
+    if (held != direct.end() && IsCrowd(directory, held->second)) {
       FoldInto(directory);
+    }
+  }
+  return direct.contains(spared) && IsCrowd(spared, LooksIn(spared));
+}
+
+void QueueFolding::DropLooks(const std::string& directory) {
+  auto line = lines.lower_bound(directory);
+  while (line != lines.end() && Covers(directory, line->first)) {
+    const auto at = line++;
+    if (IsLook(at->second.event)) {
+      Erase(at);
     }
   }
 }

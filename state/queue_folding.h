@@ -29,6 +29,10 @@ struct QueueLine {
   std::string path_old = {};  // of a rename: the former path, normal
 };
 
+// Whether a line of that event has the daemon look at its path, and do no more. What looks at all
+// that stands there now, like a reindex above it, does as much.
+bool IsLook(uint32_t event);
+
 // Byte order, except that '/' comes before every other byte: what lies below a path follows it at
 // once.
 struct ByComponents {
@@ -67,7 +71,11 @@ class QueueFolding {
   std::vector<QueueLine> Lines(size_t most);
 
   // Does the same for crowded directories alone. Costs a look at each directory that has lines.
-  void FoldCrowded();
+  // `spared` is not folded: true if the looks directly in it are a crowd.
+  bool FoldCrowded(const std::string& spared = {});
+
+  // Takes out the looks at and below the directory.
+  void DropLooks(const std::string& directory);
 
   // Takes out the first `most` lines in that order, and leaves the rest as it is.
   std::vector<QueueLine> Take(size_t most);
@@ -91,6 +99,8 @@ class QueueFolding {
   void AddAtRename(LineMap::iterator rename, uint32_t event, const std::string& data);
   void FoldUnlessTakenIn(const std::string& directory);
   void FoldIfTooMany();
+  bool IsCrowd(const std::string& directory, size_t held) const;
+  size_t LooksIn(const std::string& directory) const;
   std::vector<QueueLine> Copy(size_t most) const;
   void FoldInto(const std::string& directory);
   void FoldTo(size_t most);

@@ -219,7 +219,7 @@ TEST_F(ShareFeedTest, ACrowdStaysWhereTheIndexCannotBeRead) {
   EXPECT_EQ(Queue().size(), 1001U);
 }
 
-TEST_F(ShareFeedTest, ACrowdDirectlyInTheRootStays) {
+TEST_F(ShareFeedTest, ACrowdOfDeletesDirectlyInTheRootStays) {
   IndexRoot();
   MakeIndex({});
   for (int i = 0; i < 1001; ++i) {
@@ -228,6 +228,42 @@ TEST_F(ShareFeedTest, ACrowdDirectlyInTheRootStays) {
   Work();
 
   EXPECT_EQ(Queue().size(), 1001U);
+}
+
+TEST_F(ShareFeedTest, OfACrowdDirectlyInTheRootAllButTheDeletesIsCoarsened) {
+  IndexRoot();
+  MakeIndex({});
+  for (int i = 0; i < 1001; ++i) {
+    const std::string path = share + "/" + std::to_string(i);
+    WriteFile(path, "x");
+    Add({WRITTEN, false, path});
+  }
+  Add({DELETED, false, share + "/gone"});
+  Work();
+  EXPECT_EQ(Queue(), Texts({EventLine(CUSTOM_EVENT_REINDEX, share)}));
+  TakeQueue();
+  Work();
+
+  EXPECT_EQ(Queue(), Texts({EventLine(QLIB_NOTIFY_DELETE, share + "/gone")}));
+  EXPECT_TRUE(feed.IsWrittenOut());
+  EXPECT_EQ(feed.counts.folded, 1000U);
+}
+
+TEST_F(ShareFeedTest, AReindexOfTheRootThatWaitsTakesInAllButWhatIsGone) {
+  IndexRoot();
+  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("before"), {}},
+                           {QLIB_NOTIFY_DELETE, Path("gone"), {}},
+                           {QLIB_NOTIFY_RENAME, Path("to"), {}, Path("from")}});
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, share, {}}});
+  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("behind"), {}}});
+  EXPECT_EQ(feed.Backlog(), 3U);
+  Work();
+  EXPECT_EQ(Queue(), Texts({EventLine(CUSTOM_EVENT_REINDEX, share)}));
+  TakeQueue();
+  Work();
+
+  EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_DELETE, "gone"),
+                            EventLine(QLIB_NOTIFY_RENAME, Path("to"), Path("from"))}));
 }
 
 TEST_F(ShareFeedTest, WhatIsDeletedInTheRootIsToldBehindItsReindex) {
