@@ -82,15 +82,15 @@ bool StateStore::Impl::IsCacheGood(const std::optional<LogHead>& head) {
   return cached != nullptr && head.has_value() && cached_head == head;
 }
 
-bool StateStore::Impl::Ready(bool to_change) {
+bool StateStore::Impl::Ready() {
   // A transaction that is still open here is one whose rollback failed.
   const bool useful = connection != nullptr && connection->read_only.empty() && !files_failed &&
                       sqlite3_get_autocommit(connection->db) != 0;
   if (useful && !HasStateMoved(*connection)) {
     return true;
   }
-  // Who reads has waited once for whoever stands still.
-  return Open(to_change || connection == nullptr || !connection->without_lock);
+  // Whoever stands still with the lock has been waited for once.
+  return Open(connection == nullptr || !connection->without_lock);
 }
 
 // SQLite opens a file that it may not write for reading only, and would stay with that for ever. A
@@ -117,7 +117,7 @@ bool StateStore::Impl::Change(const std::function<Outcome()>& body) {
 
 bool StateStore::Impl::ChangeOnce(const std::function<Outcome()>& body, bool& is_lost) {
   is_lost = false;
-  if (!Ready(true)) {
+  if (!Ready()) {
     return false;
   }
   if (!connection->read_only.empty()) {

@@ -29,8 +29,8 @@ struct StateStore::Impl {
   bool Open(bool wait = true);
   // Opens anew where another program set the file aside or its log or shared memory is gone
   // (changes would be lost), and where the connection is of no use any more, or was for reading
-  // only. Who wants to change something waits for other programs each time.
-  bool Ready(bool to_change = false);
+  // only. Waits for a program that keeps the lock only where none was waited for the last time.
+  bool Ready();
   bool Prepare(Statement& statement, const char* sql) {
     return statement.Prepare(connection->db, sql) == SQLITE_OK || FailSql();
   }

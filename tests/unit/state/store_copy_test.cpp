@@ -22,11 +22,13 @@
 
 namespace {
 std::function<void()> before_lock;  // run once, by the next call of flock
+int locks_asked = 0;
 }
 
 extern "C" int flock(int fd, int operation) noexcept {
   using Function = int(int, int);
   static auto* const own = reinterpret_cast<Function*>(dlsym(RTLD_NEXT, "flock"));
+  ++locks_asked;
   if (before_lock != nullptr) {
     std::exchange(before_lock, nullptr)();
   }
@@ -144,7 +146,9 @@ TEST_F(StoreCopyTest, AnotherProgramsLockOnTheRootKeepsOutWhoChangesAndNotWhoRea
   const auto store = OpenStore();
   ASSERT_NE(store, nullptr);
   ExpectAllThere(*store);
+  locks_asked = 0;
   EXPECT_FALSE(store->SetPause(5));
+  EXPECT_EQ(locks_asked, 1);  // the opening has waited
   EXPECT_NE(store->Error().find("cannot lock " + state_root), std::string::npos) << store->Error();
   ExpectAllThere(*store);
 
