@@ -6,6 +6,7 @@
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/resource.h>
+#include <sys/stat.h>
 #include <sys/types.h>
 #include <unistd.h>
 
@@ -23,7 +24,8 @@
 namespace {
 std::function<void()> before_lock;  // run once, by the next call of flock
 int locks_asked = 0;
-}
+int lock_failure = 0;  // errno of each call; 0: none fails
+}  // namespace
 
 extern "C" int flock(int fd, int operation) noexcept {
   using Function = int(int, int);
@@ -31,6 +33,10 @@ extern "C" int flock(int fd, int operation) noexcept {
   ++locks_asked;
   if (before_lock != nullptr) {
     std::exchange(before_lock, nullptr)();
+  }
+  if (lock_failure != 0) {
+    errno = lock_failure;
+    return -1;
   }
   return own(fd, operation);
 }
@@ -151,9 +157,43 @@ TEST_F(StoreCopyTest, AnotherProgramsLockOnTheRootKeepsOutWhoChangesAndNotWhoRea
   EXPECT_EQ(locks_asked, 1);  // the opening has waited
   EXPECT_NE(store->Error().find("cannot lock " + state_root), std::string::npos) << store->Error();
   ExpectAllThere(*store);
+  EXPECT_FALSE(store->Touch());
 
   root.Close();
+  EXPECT_TRUE(store->Touch()) << store->Error();
   EXPECT_TRUE(store->SetPause(5)) << store->Error();
+}
+
+TEST_F(StoreCopyTest, WithoutTheRootsLockWhatWouldHaveToBePutRightIsLeftAsItIs) {
+  auto killed = OpenStore();
+  ASSERT_TRUE(killed->SetPause(5));
+  const std::string log = ReadFile(database + "-wal");
+  killed.reset();
+  const std::string good = ReadFile(database);
+  std::string older = good;
+  older[63] = static_cast<char>(older[63] - 1);  // the version's last byte
+  std::string scribbled = good;
+  scribbled.replace(4096, 4096, 4096, '\x5a');
+  const std::vector<std::pair<std::string, std::string>> kinds = {
+      {older, ""}, {scribbled, ""}, {"", log}, {good, "FIFO"}};
+  for (const auto& [tables, log_beside] : kinds) {
+    WriteFile(database, tables);
+    if (log_beside == "FIFO") {
+      std::filesystem::remove(database + "-wal");
+      ASSERT_EQ(mkfifo((database + "-wal").c_str(), 0600), 0);
+    } else if (!log_beside.empty()) {
+      WriteFile(database + "-wal", log_beside);
+    }
+    lock_failure = ENOLCK;
+    std::string error;
+    EXPECT_EQ(StateStore::Open(error), nullptr) << tables.size();
+    lock_failure = 0;
+
+    EXPECT_NE(error.find("cannot lock " + state_root), std::string::npos) << error;
+    EXPECT_TRUE(ReadFile(database) == tables) << tables.size();
+    EXPECT_TRUE(log_beside != log || ReadFile(database + "-wal") == log);
+    EXPECT_FALSE(Exists(database + ".damaged"));
+  }
 }
 
 // No more than `more` descriptors can be opened than are open now.
