@@ -8,7 +8,6 @@
 #include <utility>
 
 #include "platform/log.h"
-#include "platform/standalone/environment.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {
@@ -83,9 +82,8 @@ unsigned EndPass(const std::string& share) {
     return 0;
   }
 
-  ChangeStatus(share, [](ShareStatus& status) { status.needs_reindex = true; });
   if (tries > MAX_TRIES) {
-    FI_LOG("Share[%s] is not indexed as a whole: too few descriptors", share.c_str());
+    FI_LOG("Share[%s] is not indexed as a whole", share.c_str());
     return 0;
   }
 

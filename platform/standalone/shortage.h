@@ -21,8 +21,9 @@ void NoteFailedLook(const std::string& share, const std::string& path, int error
 // Whether such a thing was noted since the last EndPass of the share.
 bool IsPassShort(const std::string& share);
 
-// At the end of a pass. Microseconds to wait before the next one, 0 when the pass was whole, or
-// when it is not tried again: then the share's needs-reindex flag stands until its next event.
+// At the end of a pass; if that was short, the share's needs-reindex flag is set by then.
+// Microseconds to wait before the next one, 0 when the pass was whole, or when it is not tried
+// again: then the flag stands until the share's next event.
 unsigned EndPass(const std::string& share);
 
 }  // namespace fileindexd
