@@ -72,13 +72,8 @@ int64_t Now() {
 }
 
 void NoteShortage(const Settings& settings, const std::string& path, int error) {
-  if (!IsShortage(error)) {
-    return;
-  }
-  const std::optional<std::string> normal = NormalPath(path);
-  const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
-  if (share != nullptr) {
-    NoteFailedLook(share->name, path, error);
+  if (IsShortage(error)) {
+    NoteFailedLook(settings, path, error);
   }
 }
 

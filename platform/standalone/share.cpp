@@ -118,11 +118,7 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
 
 void NoteLostChanges(const std::string& path, int error) {
   const CancelOff off;
-  const std::shared_ptr<const Settings> settings = CurrentSettings();
-  const Share* share = FindShareOfPath(*settings, path);
-  if (share != nullptr) {
-    NoteFailedLook(share->name, path, error);
-  }
+  NoteFailedLook(*CurrentSettings(), path, error);
 }
 
 bool GetShareNameByPath(std::string& share_name, const std::string& path) {

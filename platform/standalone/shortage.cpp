@@ -5,9 +5,11 @@
 #include <cstdlib>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <utility>
 
 #include "platform/log.h"
+#include "state/layout.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {
@@ -62,10 +64,13 @@ bool IsShortage(int error) {
   return error == EMFILE || error == ENFILE;
 }
 
-void NoteFailedLook(const std::string& share, const std::string& path, int error) {
-  if (MarkShort(share)) {
+void NoteFailedLook(const Settings& settings, const std::string& path, int error) {
+  const std::optional<std::string> normal = NormalPath(path);
+  const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
+  if (share != nullptr && MarkShort(share->name)) {
     errno = error;
-    FI_LOG("Share[%s] has to be indexed again, path=%s, reason=%m", share.c_str(), path.c_str());
+    FI_LOG("Share[%s] has to be indexed again, path=%s, reason=%m", share->name.c_str(),
+           path.c_str());
   }
 }
 

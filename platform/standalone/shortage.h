@@ -9,14 +9,17 @@
 
 #include <string>
 
+#include "state/settings.h"
+
 namespace fileindexd {
 
 // Whether what failed with `error` lacked nothing but a descriptor.
 bool IsShortage(int error);
 
-// Something failed in the share's pass, and the index lacks changes at or below `path`: a look or
-// an opening, for want of a descriptor; the reading of the queue, for any reason.
-void NoteFailedLook(const std::string& share, const std::string& path, int error);
+// Something failed in the pass of the share that holds `path`, if one does, and the index lacks
+// changes at or below it: a look or an opening, for want of a descriptor; the reading of the queue,
+// for any reason.
+void NoteFailedLook(const Settings& settings, const std::string& path, int error);
 
 // Whether such a thing was noted since the last EndPass of the share.
 bool IsPassShort(const std::string& share);
