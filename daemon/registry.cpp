@@ -55,7 +55,8 @@ int WatchQueueFolder(int inotify_fd, const std::string& queue_path) {
 }
 
 // For a Worker whose folder could not be watched, or was removed and made anew. Where the watch
-// stands, the kernel gives the same one.
+// stands, the kernel gives the same one. A new setting starts no thread: a queue that was written
+// before the watch waits for its next writer.
 void WatchAgain(int inotify_fd, Worker* worker) {
   const int wd = WatchQueueFolder(inotify_fd, worker->queue_path);
   if (wd >= 0 && wd != worker->wd) {
