@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Programs run on the platform that is shipped.
+#include <dlfcn.h>
 #include <sqlite3.h>
 #include <sys/resource.h>
 #include <unistd.h>
@@ -20,10 +21,21 @@
 namespace {
 
 std::atomic<useconds_t> slept = 0;
+std::atomic<int> fork_failure = 0;  // errno of the next one; 0: it does not fail
 
 }  // namespace
 
-// In front of the C library's.
+// Both in front of the C library's.
+extern "C" pid_t fork() noexcept {
+  static auto* const own = reinterpret_cast<pid_t (*)()>(dlsym(RTLD_NEXT, "fork"));
+  const int error = fork_failure.exchange(0);
+  if (error != 0) {
+    errno = error;
+    return -1;
+  }
+  return own();
+}
+
 extern "C" int usleep(useconds_t time) {
   slept += time;
   const timespec duration = {static_cast<time_t>(time / 1000000),
@@ -83,6 +95,16 @@ TEST_F(ServicesTest, ARemovalThatLacksADescriptorIsFollowedByAPause) {
   EXPECT_EQ(result, -1);
   EXPECT_TRUE(std::filesystem::exists(drained_path));
   EXPECT_GT(slept, 0U);  // the Worker tries again at once, as long as there is a queue
+}
+
+TEST_F(ServicesTest, ARemovalThatLacksAProcessIsFollowedByAPause) {
+  fork_failure = EAGAIN;
+
+  EXPECT_EQ(RemoveDrained(), -1);
+
+  EXPECT_TRUE(std::filesystem::exists(drained_path));
+  EXPECT_GT(slept, 0U);
+  EXPECT_EQ(RemoveDrained(), 0);
 }
 
 TEST_F(ServicesTest, ACopyWhoseChangesAreLostGoesOnceTheReindexIsOnRecord) {
