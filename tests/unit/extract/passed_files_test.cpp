@@ -4,13 +4,14 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/mman.h>
-#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 
 #include <array>
 #include <cerrno>
 #include <string>
+
+#include "tests/scripted/few_descriptors.h"
 
 namespace fileindexd {
 
@@ -85,14 +86,14 @@ TEST_F(PassedFilesTest, AMessageWithMoreFilesThanThereIsRoomForIsLost) {
 }
 
 TEST_F(PassedFilesTest, AMessageOfWhichAFileCannotBeHadIsLost) {
-  rlimit before = {};
-  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
-  const rlimit limit = {static_cast<rlim_t>(lowest_free) + 1, before.rlim_max};
   ASSERT_TRUE(Send(3));
-  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &limit), 0);
-  const ssize_t length = Receive(received);
-  const int error = errno;
-  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &before), 0);
+  ssize_t length = 0;
+  int error = 0;
+  {
+    const scripted::FewDescriptors one(1);
+    length = Receive(received);
+    error = errno;
+  }
   EXPECT_EQ(length, -1);
   EXPECT_EQ(error, EMFILE);
   EXPECT_EQ(received[0].fd, -1);

@@ -5,18 +5,19 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/file.h>
-#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstring>
 #include <new>
+#include <optional>
 #include <set>
 #include <vector>
 
 #include "base/scoped_fd.h"
 #include "platform/log.h"
+#include "scripted/few_descriptors.h"
 #include "scripted/script.h"
 #include "scripted/temp_folder.h"
 #include "unit/optree/tree_text.h"
@@ -289,14 +290,9 @@ TEST_F(QueueTest, ACopyThatIsAPipeIsNotReadHoweverMuchIsWrittenIntoIt) {
 
 TEST_F(QueueTest, ACopyThatCannotBeOpenedIsToldAsLost) {
   WriteQueue(ADD_A);
-  rlimit before = {};
-  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
-  TheScript().Run("rename", 1, [&] {
-    const ScopedFd next(dup(STDIN_FILENO));
-    const rlimit none_left = {static_cast<rlim_t>(next.fd), before.rlim_max};
-    setrlimit(RLIMIT_NOFILE, &none_left);
-  });
-  TheScript().Run("WriteLog", 1, [&] { setrlimit(RLIMIT_NOFILE, &before); });
+  std::optional<scripted::FewDescriptors> none;
+  TheScript().Run("rename", 1, [&] { none.emplace(0); });
+  TheScript().Run("WriteLog", 1, [&] { none.reset(); });
 
   EXPECT_EQ(Drain(), NO_QUEUE);
 

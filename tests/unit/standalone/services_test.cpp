@@ -2,7 +2,6 @@
 // Programs run on the platform that is shipped.
 #include <dlfcn.h>
 #include <sqlite3.h>
-#include <sys/resource.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -10,12 +9,12 @@
 #include <ctime>
 #include <filesystem>
 
-#include "base/scoped_fd.h"
 #include "platform/share.h"
 #include "platform/standalone/environment.h"
 #include "platform/system.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
+#include "tests/scripted/few_descriptors.h"
 #include "tests/unit/state/mounts.h"
 
 namespace {
@@ -80,18 +79,13 @@ TEST_F(ServicesTest, ADrainedCopyIsRemovedWithoutAPause) {
 
 TEST_F(ServicesTest, ARemovalThatLacksADescriptorIsFollowedByAPause) {
   const std::string path = drained_path;
-  rlimit before = {};
-  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+  int result = 0;
   {
-    const ScopedFd next(dup(STDIN_FILENO));
-    const rlimit none_left = {static_cast<rlim_t>(next.fd), before.rlim_max};
-    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none_left), 0);
+    const scripted::FewDescriptors none(0);
+    // The sanitizers look at the object of a member's call by way of a descriptor.
+    result = QLIBCExec("/bin/rm", "-rf", path.c_str(), nullptr, nullptr);
   }
 
-  // The sanitizers look at the object of a member's call by way of a descriptor.
-  const int result = QLIBCExec("/bin/rm", "-rf", path.c_str(), nullptr, nullptr);
-
-  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &before), 0);
   EXPECT_EQ(result, -1);
   EXPECT_TRUE(std::filesystem::exists(drained_path));
   EXPECT_GT(slept, 0U);  // the Worker tries again at once, as long as there is a queue

@@ -5,7 +5,6 @@
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/file.h>
-#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/types.h>
 #include <unistd.h>
@@ -19,6 +18,7 @@
 
 #include "base/scoped_fd.h"
 #include "state/store.h"
+#include "tests/scripted/few_descriptors.h"
 #include "tests/unit/state/store_fixture.h"
 
 namespace {
@@ -196,29 +196,11 @@ TEST_F(StoreCopyTest, WithoutTheRootsLockWhatWouldHaveToBePutRightIsLeftAsItIs) 
   }
 }
 
-// No more than `more` descriptors can be opened than are open now.
-class FewDescriptors {
- public:
-  explicit FewDescriptors(rlim_t more) {
-    const int next = open("/dev/null", O_RDONLY | O_CLOEXEC);
-    close(next);
-    EXPECT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
-    const rlimit few = {static_cast<rlim_t>(next) + more, before.rlim_max};
-    EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &few), 0);
-  }
-  ~FewDescriptors() { setrlimit(RLIMIT_NOFILE, &before); }
-  FewDescriptors(const FewDescriptors&) = delete;
-  FewDescriptors& operator=(const FewDescriptors&) = delete;
-
- private:
-  rlimit before{};
-};
-
 TEST_F(StoreCopyTest, ACopyThatCannotBeOpenedIsNotSaidToBeUnsound) {
   std::filesystem::remove(database);
   std::string error;
   {
-    const FewDescriptors few(1);  // for the lock
+    const scripted::FewDescriptors few(1);  // for the lock
     EXPECT_EQ(StateStore::Open(error), nullptr);
   }
   EXPECT_NE(error.find(copy + ": Too many open files"), std::string::npos) << error;
