@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -36,20 +35,6 @@ class ControlTest : public DaemonFixture {
   ControlTest() {
     EXPECT_TRUE(daemon.SetupDomainSocket());
     SetUpShares({"a"});
-  }
-
-  // A client that has sent these bytes; with `gone` it sends no more.
-  static int Connect(const std::string& bytes, bool gone = true) {
-    const int client = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    sockaddr_un address = {};
-    address.sun_family = AF_UNIX;
-    strncpy(address.sun_path, SOCKET_PATH, sizeof(address.sun_path) - 1);
-    EXPECT_EQ(connect(client, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
-    EXPECT_EQ(write(client, bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
-    if (gone) {
-      shutdown(client, SHUT_WR);
-    }
-    return client;
   }
 
   // The reply, which is four bytes and then the end of the connection.

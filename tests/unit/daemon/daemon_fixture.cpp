@@ -3,9 +3,12 @@
 
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/socket.h>
+#include <sys/un.h>
 #include <unistd.h>
 
 #include <csignal>
+#include <cstring>
 #include <fstream>
 
 namespace fileindexd {
@@ -45,6 +48,19 @@ DaemonFixture::~DaemonFixture() {
 
 std::string DaemonFixture::QueuePath(const std::string& name) const {
   return folder.path + "/queue-" + name + "/TALO@file_index_queue";
+}
+
+int DaemonFixture::Connect(const std::string& bytes, bool gone) {
+  const int client = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+  sockaddr_un address = {};
+  address.sun_family = AF_UNIX;
+  strncpy(address.sun_path, SOCKET_PATH, sizeof(address.sun_path) - 1);
+  EXPECT_EQ(connect(client, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+  EXPECT_EQ(write(client, bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
+  if (gone) {
+    shutdown(client, SHUT_WR);
+  }
+  return client;
 }
 
 void DaemonFixture::AddFolder(const std::string& share, const std::string& path) {

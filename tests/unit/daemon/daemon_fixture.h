@@ -33,6 +33,9 @@ class DaemonFixture : public ::testing::Test {
   // A thread that has ended by itself, not joined yet.
   void AwaitFinished(const std::string& name, size_t times = 1);
 
+  // A client that has sent these bytes; with `gone` it sends no more.
+  static int Connect(const std::string& bytes, bool gone = true);
+
   static std::vector<std::string> Log() { return script.Texts(); }
 
   static scripted::Script& script;

@@ -3,14 +3,11 @@
 // no test waits out the ten seconds of a quiet one.
 #include <fcntl.h>
 #include <sys/inotify.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <csignal>
-#include <cstring>
 
 #include "base/scoped_fd.h"
 #include "unit/daemon/daemon_fixture.h"
@@ -39,17 +36,6 @@ class MainLoopTest : public DaemonFixture {
   void QuietIteration() {
     raise(SIGTERM);
     daemon.LoopOnce();
-  }
-
-  // A client that sends nothing.
-  static int Connect() {
-    const int client = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    sockaddr_un address = {};
-    address.sun_family = AF_UNIX;
-    strncpy(address.sun_path, SOCKET_PATH, sizeof(address.sun_path) - 1);
-    EXPECT_EQ(connect(client, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
-    shutdown(client, SHUT_WR);
-    return client;
   }
 
   bool IsReadable(int fd) {
@@ -194,7 +180,7 @@ TEST_F(MainLoopTest, AQuietIterationLeavesARunningOrFullWorkerAlone) {
 }
 
 TEST_F(MainLoopTest, AWaitForAnythingReadableLastsTenSeconds) {
-  const ScopedFd client(Connect());
+  const ScopedFd client(Connect(""));
   daemon.resume_time = 1;
   script.Say("ppoll", "10.0", EINTR);
 
@@ -239,7 +225,7 @@ TEST_F(MainLoopTest, ABusyIterationDoesNoHousekeeping) {
 }
 
 TEST_F(MainLoopTest, AnExceptionWhileQueuesAreServedLeavesTheSocketForTheNextIteration) {
-  const ScopedFd client(Connect());
+  const ScopedFd client(Connect(""));
   TALO::FILEINDEX::LOG_LEVEL = LOG_LEVEL_DEBUG;
   script.Run("WriteLog", 1, [] { throw 5; });  // "respawned"; anything may be thrown
   WriteQueue("a", "/x");
