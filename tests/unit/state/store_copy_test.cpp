@@ -117,7 +117,7 @@ TEST_F(StoreCopyTest, AChangeThatWentWithTheLogMeanwhileIsMadeAgain) {
   before_lock = [&] {
     std::filesystem::remove(database + "-wal");
     std::filesystem::remove(database + "-shm");
-    other.AddFolder();
+    other.Act();
   };
 
   ASSERT_TRUE(store->AddFolder("/v/a/c", {})) << store->Error();

@@ -340,10 +340,14 @@ TEST_F(StoreDamageTest, AnUpgradeLeavesACopy) {
 // Two programs with a memory of their own would write over each other's changes.
 TEST_F(StoreDamageTest, AnOpenStoreLosesNothingWithItsSharedMemory) {
   OtherProgram other("/v/a/b");
+  OtherProgram asker([](StateStore& store) {
+    int64_t paused = 0;
+    return store.GetPause(paused) && paused == 6;
+  });
   const auto store = OpenStore();
   ASSERT_TRUE(store->SetPause(5));
   std::filesystem::remove(database + "-shm");
-  other.AddFolder();
+  other.Act();
   std::filesystem::remove(copy);  // nothing comes out of it
 
   std::shared_ptr<const Settings> settings;
@@ -352,6 +356,7 @@ TEST_F(StoreDamageTest, AnOpenStoreLosesNothingWithItsSharedMemory) {
   ASSERT_TRUE(store->SetPause(6)) << store->Error();
   ASSERT_TRUE(OpenStore()->GetSettings(settings));
   EXPECT_EQ(settings->folders.size(), 2U);
+  asker.Act();
   EXPECT_FALSE(Exists(database + ".damaged"));
 }
 
@@ -361,7 +366,7 @@ TEST_F(StoreDamageTest, AStoreThatEndsWithoutItsSharedMemoryTakesNothingWithIt) 
   auto store = OpenStore();
   ASSERT_TRUE(store->SetPause(5));
   std::filesystem::remove(database + "-shm");
-  other.AddFolder();
+  other.Act();
   std::filesystem::remove(copy);
 
   store.reset();
@@ -378,7 +383,7 @@ TEST_F(StoreDamageTest, TheFirstStoreNoticesThatItsLogWent) {
   ASSERT_TRUE(store->AddShare({"a", "/v/a", ""})) << store->Error();
   Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
   std::filesystem::remove(database + "-wal");
-  other.AddFolder();
+  other.Act();
 
   ExpectAllThere(*store);
   EXPECT_FALSE(Exists(database + ".damaged"));

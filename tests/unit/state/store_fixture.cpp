@@ -27,7 +27,7 @@ void StoreDamageTest::ExpectAllThere(StateStore& store) {
   EXPECT_EQ(settings->folders.size(), 1U);
 }
 
-OtherProgram::OtherProgram(const std::string& folder) {
+OtherProgram::OtherProgram(const Deed& deed) {
   EXPECT_EQ(pipe2(ends.data(), O_CLOEXEC), 0);
   child = Fork([&] {
     close(ends[1]);  // so that it ends with the test, whatever becomes of that
@@ -35,16 +35,19 @@ OtherProgram::OtherProgram(const std::string& folder) {
     const bool told = read(ends[0], &go, 1) == 1;
     std::string error;
     const auto store = StateStore::Open(error);
-    return told && store != nullptr && store->AddFolder(folder, {}) ? 0 : 1;
+    return told && store != nullptr && deed(*store) ? 0 : 1;
   });
 }
+
+OtherProgram::OtherProgram(const std::string& folder)
+    : OtherProgram([&folder](StateStore& store) { return store.AddFolder(folder, {}); }) {}
 
 OtherProgram::~OtherProgram() {
   close(ends[0]);
   close(ends[1]);
 }
 
-void OtherProgram::AddFolder() {
+void OtherProgram::Act() {
   EXPECT_EQ(write(ends[1], "g", 1), 1);
   EXPECT_EQ(WaitFor(child), 0);
 }

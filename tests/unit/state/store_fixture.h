@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <array>
+#include <functional>
 #include <string>
 
 #include "tests/unit/state/fixture.h"
@@ -23,12 +24,16 @@ class StoreDamageTest : public StateTest {
 };
 
 // Another program, which SQLite would not let share anything with this one. It is there before this
-// one opens a database, adds the folder when it is told to, and ends.
+// one opens a database, opens it when it is told to, does its deed, and ends.
 class OtherProgram {
  public:
-  explicit OtherProgram(const std::string& folder);
+  using Deed = std::function<bool(StateStore&)>;
+  explicit OtherProgram(const Deed& deed);
+  explicit OtherProgram(const std::string& folder);  // that it adds
+  OtherProgram(const OtherProgram&) = delete;
+  OtherProgram& operator=(const OtherProgram&) = delete;
   ~OtherProgram();
-  void AddFolder();
+  void Act();  // a test failure if the deed fails
 
  private:
   std::array<int, 2> ends{};
