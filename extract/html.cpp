@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/html.h"
+
 #include <libxml/HTMLparser.h>
 
 #include <algorithm>
@@ -62,8 +64,23 @@ std::string DeclaredCharset(std::string_view bytes) {
   return "";
 }
 
+bool IsHidden(std::string_view element) {
+  return IsAmong(HIDDEN, element);
+}
+
+std::string Without(std::string_view mark, std::string_view text) {
+  std::string kept;
+  for (size_t at = text.find(mark); at != std::string_view::npos; at = text.find(mark)) {
+    kept += text.substr(0, at);
+    text.remove_prefix(at + mark.size());
+  }
+  kept += text;
+  return kept;
+}
+
 struct Page {
   ContentSink& sink;
+  bool (*is_hidden)(std::string_view element);
   int hidden = 0;         // elements around that nobody reads
   bool in_title = false;  // of the page, not of a picture in it
   std::string title;
@@ -105,7 +122,7 @@ void Guarded(void* context, const Step& step) {
 void StartElement(void* context, const xmlChar* name, const xmlChar** attributes) {
   Guarded(context, [&](Page& page) {
     const std::string_view element = View(name);
-    page.hidden += IsAmong(HIDDEN, element) ? 1 : 0;
+    page.hidden += page.is_hidden(element) ? 1 : 0;
     page.in_title = page.in_title || (element == "title" && page.title.empty());
     if (!IsAmong(INLINE, element)) {
       page.sink.AddText(" ");
@@ -119,7 +136,7 @@ void StartElement(void* context, const xmlChar* name, const xmlChar** attributes
 void EndElement(void* context, const xmlChar* name) {
   Guarded(context, [&](Page& page) {
     const std::string_view element = View(name);
-    page.hidden -= IsAmong(HIDDEN, element) && page.hidden > 0 ? 1 : 0;
+    page.hidden -= page.is_hidden(element) && page.hidden > 0 ? 1 : 0;
     if (element == "title") {
       page.in_title = false;
     }
@@ -150,10 +167,10 @@ htmlSAXHandler Handler() {
   return handler;
 }
 
-}  // namespace
-
-bool ReadHtml(const Document& document, ContentSink& sink, std::string& why) {
-  Page page = {sink, 0, false, "", false};
+// `take` gives the parser a piece of the text.
+template <typename Take>
+bool ReadMarkup(const Document& document, Page& page, const Take& take, std::string& why) {
+  ContentSink& sink = page.sink;
   htmlSAXHandler handler = Handler();
   const std::unique_ptr<htmlParserCtxt, decltype(&htmlFreeParserCtxt)> parser(
       htmlCreatePushParserCtxt(&handler, &page, nullptr, 0, nullptr, XML_CHAR_ENCODING_UTF8),
@@ -170,7 +187,7 @@ bool ReadHtml(const Document& document, ContentSink& sink, std::string& why) {
   const bool is_read = DecodeText(
       document, DeclaredCharset,
       [&](std::string_view text) {
-        (void)htmlParseChunk(parser.get(), text.data(), static_cast<int>(text.size()), 0);
+        take(parser.get(), text);
         return !sink.IsFull() && !page.failed;
       },
       why);
@@ -182,6 +199,28 @@ bool ReadHtml(const Document& document, ContentSink& sink, std::string& why) {
   }
   sink.Set(ContentField::TITLE, page.title);
   return is_read;
+}
+
+void Parse(htmlParserCtxt* parser, std::string_view text) {
+  (void)htmlParseChunk(parser, text.data(), static_cast<int>(text.size()), 0);
+}
+
+}  // namespace
+
+bool ReadHtml(const Document& document, ContentSink& sink, std::string& why) {
+  Page page = {sink, IsHidden, 0, false, "", false};
+  return ReadMarkup(document, page, Parse, why);
+}
+
+bool ReadXmlAsHtml(const Document& document, bool (*is_hidden)(std::string_view element),
+                   ContentSink& sink, std::string& why) {
+  Page page = {sink, is_hidden, 0, false, "", false};
+  // The marks around text that is taken as it is are unknown to pages. One that two pieces share
+  // stays.
+  const auto take = [](htmlParserCtxt* parser, std::string_view text) {
+    Parse(parser, Without("]]>", Without("<![CDATA[", text)));
+  };
+  return ReadMarkup(document, page, take, why);
 }
 
 }  // namespace fileindexd

@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "extract/format.h"
+#include "extract/html.h"
 #include "extract/memory_file.h"
 #include "extract/read_at.h"
 
@@ -58,7 +59,8 @@ std::optional<ContentField> FieldOf(std::string_view element, int depth) {
   return std::nullopt;
 }
 
-bool IsHidden(std::string_view element) {
+bool IsHidden(std::string_view prefixed) {
+  const std::string_view element = prefixed.substr(prefixed.rfind(':') + 1);  // npos + 1 is 0
   return element == "script" || element == "style" || element == "binary" ||
          element == "binary-data";
 }
@@ -155,7 +157,7 @@ void ReadBeyondFault(const Document& document, ContentSink::Mark&& begin, Conten
   sink.ReturnTo(std::move(begin));
   sink.content.texts = found.texts;
   std::string why;
-  (void)ReadHtml(document, sink, why);
+  (void)ReadXmlAsHtml(document, IsHidden, sink, why);
   if (sink.content.text.size() < found.text.size()) {
     sink.content = std::move(found);
   }

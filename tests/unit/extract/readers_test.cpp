@@ -130,6 +130,17 @@ TEST(XmlTest, AFaultCostsNoWordsAndNoFields) {
   }
 }
 
+TEST(XmlTest, BehindAFaultTheSameIsHiddenAndTheSameIsText) {
+  for (const char* fault : {"", "&nbsp;", "</c>"}) {
+    const std::string bytes =
+        "<?xml version=\"1.0\"?><a xmlns:office=\"urn:o\"><b>quay <object>west</object></b>" +
+        std::string(fault) +
+        "<binary id=\"1\">aGlkZGVu</binary><office:binary-data>aGlkZGVu</office:binary-data>"
+        "<b><![CDATA[alpha words]]></b></a>";
+    EXPECT_EQ(Read(ReadXml, bytes).content.text, "quay west alpha words") << fault;
+  }
+}
+
 TEST(XmlTest, DamagedFilesKeepWhatIsThere) {
   const Found damaged = Read(ReadXml, "<a><b>words</b><c>more");
   EXPECT_EQ(damaged.content.text, "words more");
