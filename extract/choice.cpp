@@ -19,6 +19,9 @@ namespace {
 // What libmagic looks at: its tests for text and for tar need no more.
 constexpr size_t HEAD = 64 * 1024;
 
+// Why nobody reads it here, however good it is.
+constexpr const char* LEFT_OUT = "left out: this kernel cannot confine ";
+
 struct Reading {
   FormatReader read;
   Kind kind;        // unless the reader knows better
@@ -89,7 +92,7 @@ Format FormatOfContent(const Document& document) {
 bool Read(Format format, const Document& document, ContentSink& sink, std::string& why) {
   const Reading reading = ReadingOf(format);
   if (reading.uses_files && !Around().has_files) {
-    why = "left out: this kernel cannot confine its library";
+    why = std::string(LEFT_OUT) + "its library";
     return false;
   }
   sink.SetKind(reading.kind);
@@ -105,7 +108,7 @@ bool Read(Format format, const Document& document, ContentSink& sink, std::strin
   }
   if (!sink.converter.empty() && (document.depth > 0 || !Around().has_files)) {
     if (document.depth == 0) {
-      why = "left out: this kernel cannot confine " + sink.converter;
+      why = LEFT_OUT + sink.converter;
     }
     sink.converter.clear();  // a member has no descriptor that a program could be given
     return is_read && document.depth > 0;
@@ -148,7 +151,8 @@ bool ReadByContent(const Document& document, ContentSink& sink, std::string& why
   if (seen == Format::NONE || Read(seen, document, sink, why)) {
     return true;
   }
-  if (!may_be_note || why == "encrypted" || HasFoundSince(begin, sink)) {
+  if (!may_be_note || why == "encrypted" || why.starts_with(LEFT_OUT) ||
+      HasFoundSince(begin, sink)) {
     return false;
   }
   why.clear();

@@ -64,9 +64,9 @@ class HelperTest : public PoolFixture {
   void SetUp() override { OpenOwn(); }
 
   // Each process needs its own.
-  void OpenOwn() {
+  void OpenOwn(const char* program = HELPER) {
     PoolOptions options;
-    options.program = HELPER;
+    options.program = program;
     options.text_cap = 1000;
     OpenPool(options);
   }
@@ -214,6 +214,18 @@ TEST_F(HelperTest, ContentTellsWhereTheNameDoesNot) {
     EXPECT_EQ(outcome.content.text, row.text) << row.name;
     EXPECT_EQ(outcome.content.kind, Kind::DOCUMENT) << row.name;
   }
+}
+
+// As a note it would count as read, and not be read when the kernel has what confines its reader.
+TEST_F(HelperTest, WhatIsLeftOutIsNoNoteThoughItsNameHasNoEnding) {
+  OpenOwn(WITHOUT_WALLS);
+  for (const char* bytes :
+       {"{\\rtf1\\ansi\\pard Dear Sir\\par}", "%PDF-1.4\n1 0 obj <</Type /Catalog>> endobj\n"}) {
+    const ExtractOutcome outcome = Run("letter", bytes);
+    EXPECT_TRUE(Told(outcome).starts_with("failed: left out: ")) << Told(outcome);
+    EXPECT_EQ(outcome.content.text, "");
+  }
+  EXPECT_EQ(Run("letter", "Xref: see the other list\n").content.text, "Xref: see the other list");
 }
 
 TEST_F(HelperTest, AConverterReadsBehindTheSameDoors) {
