@@ -9,7 +9,6 @@
 #include <cerrno>
 #include <clocale>
 #include <cstdio>
-#include <cstring>
 
 #include "extract/read_at.h"
 
@@ -49,6 +48,13 @@ bool BeginsCompressed(const Document& document) {
   const std::string begin = FirstBytes(document, 4);
   return begin.starts_with("\x1F\x8B") || begin.starts_with("BZh") ||
          begin.starts_with("\xFD\x37zX") || begin.starts_with("\x28\xB5\x2F\xFD");
+}
+
+// What the library has no method for is not damaged. It has no code for that, and many words.
+bool IsUnknownMethod(const char* error) {
+  const std::string_view words = error != nullptr ? error : "";
+  return words.find("upported") != std::string_view::npos ||  // unsupported, not supported
+         words.find("codec ID") != std::string_view::npos;
 }
 
 }  // namespace
@@ -198,10 +204,7 @@ ssize_t Unpacker::Read(char* into, size_t count) {
   const Utf8Locale locale;
   const ssize_t got = archive_read_data(packed, into, count);
   if (got < 0) {
-    // A password or a method that the library does not have is no damage.
-    const char* error = archive_error_string(packed);
-    is_broken = is_broken || (!is_encrypted &&
-                              (error == nullptr || std::strstr(error, "nsupported") == nullptr));
+    is_broken = is_broken || !IsUnknownMethod(archive_error_string(packed));
     return -1;
   }
   counted += got;

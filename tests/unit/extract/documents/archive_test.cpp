@@ -107,6 +107,27 @@ std::string Rar5(const std::vector<Member>& members) {
   return rar + Rar5Block(std::string("\5\0\0", 3));
 }
 
+// Of one member, packed by what nobody knows.
+std::string ZipOfAnotherMethod() {
+  std::string zip = Zipped({{"a.txt", "the red harbour"}});
+  for (const auto& [mark, at] : {std::pair<const char*, size_t>{"PK\3\4", 8}, {"PK\1\2", 10}}) {
+    zip[zip.find(mark) + at] = 97;
+  }
+  return zip;
+}
+
+std::string SevenZipOfAnotherCodec() {
+  std::string bytes =
+      Packed({ARCHIVE_FORMAT_7ZIP, ARCHIVE_FILTER_NONE, "7zip:compression=store", ""},
+             {{"a.txt", "the red harbour"}});
+  constexpr size_t HEAD = 32;                                  // of the file
+  constexpr std::string_view ONE_FOLDER("\x0B\1\0\1\1\0", 6);  // one coder, the id of one byte
+  bytes[bytes.find(ONE_FOLDER, HEAD) + ONE_FOLDER.size() - 1] = 5;
+  const size_t rest = HEAD + std::string_view("the red harbour").size();
+  bytes.replace(28, 4, Le32(Crc32(bytes.substr(rest))));
+  return bytes.replace(8, 4, Le32(Crc32(bytes.substr(12, 20))));
+}
+
 class ArchiveFormatTest : public testing::TestWithParam<Case> {};
 
 // One member of so many zeros, then another.
@@ -216,6 +237,16 @@ TEST(ArchiveTest, AMemberThatCannotBeUnpackedDamagesTheArchive) {
 
   EXPECT_EQ(reading.why, "damaged");
   EXPECT_EQ(reading.Text(ContentField::MEMBERS), "a.txt\nb.txt");
+}
+
+TEST(ArchiveTest, WhatNobodyCanUnpackIsNotDamaged) {
+  for (const std::string& bytes : {ZipOfAnotherMethod(), SevenZipOfAnotherCodec()}) {
+    const Reading reading = ReadBytes(ReadArchive, "a.zip", bytes);
+
+    EXPECT_TRUE(reading.is_good) << reading.why;
+    EXPECT_EQ(reading.Text(ContentField::MEMBERS), "a.txt");
+    EXPECT_EQ(reading.content.text, "");
+  }
 }
 
 TEST(ArchiveTest, WhatIsNoArchiveIsSaidInWords) {
