@@ -90,8 +90,14 @@ void SetForeignNames(std::string_view names, ContentSink& sink) {
   }
 }
 
-bool ReadUnpacked(const Document& document, Allowance& allowance, ContentSink& sink,
-                  std::string& why) {
+}  // namespace
+
+bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) {
+  sink.SetKind(Kind::DOCUMENT);
+  if (document.depth >= Allowance::MAX_DEPTH) {
+    return true;  // an archive so deep inside others counts as a member without text
+  }
+  Allowance allowance;
   Unpacker archive;
   if (!archive.Open(document, Unpacker::Formats::ALL, why)) {
     return false;
@@ -101,11 +107,14 @@ bool ReadUnpacked(const Document& document, Allowance& allowance, ContentSink& s
   int read = 0;
   std::string foreign;  // names in a charset that the archive does not tell, a line each
   bool is_encrypted = false;
-  while (names < MAX_NAMES && archive.Next()) {
+  while (archive.Next()) {
     if (archive.is_bare) {
       return ReadBare(archive, document, allowance, sink, why);
     }
-    ++names;
+    if (++names > MAX_NAMES) {
+      allowance.NoteBound();
+      break;
+    }
     if (IsUtf8(archive.name)) {
       sink.Set(ContentField::MEMBERS, archive.name);
     } else if (foreign.size() < ContentSink::MAX_FIELD) {
@@ -118,9 +127,6 @@ bool ReadUnpacked(const Document& document, Allowance& allowance, ContentSink& s
       ReadMember(archive, document, allowance, sink);
     }
   }
-  if (names == MAX_NAMES) {
-    allowance.NoteBound();
-  }
   SetForeignNames(foreign, sink);
   if ((is_encrypted && read == 0) || archive.is_closed) {
     why = "encrypted";
@@ -130,22 +136,6 @@ bool ReadUnpacked(const Document& document, Allowance& allowance, ContentSink& s
     why = "damaged";
   }
   return why.empty();
-}
-
-}  // namespace
-
-bool ReadArchive(const Document& document, ContentSink& sink, std::string& why) {
-  sink.SetKind(Kind::DOCUMENT);
-  if (document.depth >= Allowance::MAX_DEPTH) {
-    return true;  // an archive so deep inside others counts as a member without text
-  }
-  Allowance allowance;
-  const bool is_read = ReadUnpacked(document, allowance, sink, why);
-  // Not before the end: what is cut takes no more.
-  if (document.depth == 0 && allowance.HasBound()) {
-    sink.content.is_cut = true;
-  }
-  return is_read;
 }
 
 }  // namespace fileindexd

@@ -11,6 +11,7 @@
 
 #include "extract/charset.h"
 #include "extract/memory_file.h"
+#include "extract/nested.h"
 
 namespace fileindexd {
 
@@ -160,31 +161,7 @@ bool ReadByContent(const Document& document, ContentSink& sink, std::string& why
   return Read(Format::TEXT, document, sink, why);
 }
 
-}  // namespace
-
-bool LoadMagic(std::string& error) {
-  if (Around().magic != nullptr) {
-    return true;
-  }
-  // Not what is inside compressed files, and nothing that runs a program for it.
-  magic_t magic = magic_open(MAGIC_MIME_TYPE | MAGIC_NO_CHECK_COMPRESS | MAGIC_NO_CHECK_ELF);
-  if (magic == nullptr || magic_load(magic, nullptr) != 0) {
-    const char* text = magic == nullptr ? nullptr : magic_error(magic);
-    error = std::string("libmagic: ") + (text == nullptr ? "no memory" : text);
-    if (magic != nullptr) {
-      magic_close(magic);
-    }
-    return false;
-  }
-  Around().magic = magic;
-  return true;
-}
-
-void LeaveOutFileUsers() {
-  Around().has_files = false;
-}
-
-bool ReadDocument(const Document& document, ContentSink& sink, std::string& why) {
+bool ReadByName(const Document& document, ContentSink& sink, std::string& why) {
   const Format named = FormatOfName(document.name);
   if (named == Format::NONE) {
     return ReadByContent(document, sink, why);
@@ -212,6 +189,40 @@ bool ReadDocument(const Document& document, ContentSink& sink, std::string& why)
   }
   sink.ReturnTo(std::move(begin));
   return Read(seen, document, sink, why);
+}
+
+}  // namespace
+
+bool LoadMagic(std::string& error) {
+  if (Around().magic != nullptr) {
+    return true;
+  }
+  // Not what is inside compressed files, and nothing that runs a program for it.
+  magic_t magic = magic_open(MAGIC_MIME_TYPE | MAGIC_NO_CHECK_COMPRESS | MAGIC_NO_CHECK_ELF);
+  if (magic == nullptr || magic_load(magic, nullptr) != 0) {
+    const char* text = magic == nullptr ? nullptr : magic_error(magic);
+    error = std::string("libmagic: ") + (text == nullptr ? "no memory" : text);
+    if (magic != nullptr) {
+      magic_close(magic);
+    }
+    return false;
+  }
+  Around().magic = magic;
+  return true;
+}
+
+void LeaveOutFileUsers() {
+  Around().has_files = false;
+}
+
+bool ReadDocument(const Document& document, ContentSink& sink, std::string& why) {
+  const Allowance allowance;
+  const bool is_read = ReadByName(document, sink, why);
+  // Not before the end: what is cut takes no more.
+  if (document.depth == 0 && allowance.HasBound()) {
+    sink.content.is_cut = true;
+  }
+  return is_read;
 }
 
 }  // namespace fileindexd

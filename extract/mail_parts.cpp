@@ -82,6 +82,9 @@ bool Decode(GMimePart* part, const std::string& charset, Allowance& allowance, M
       break;
     }
   }
+  if (file.size >= Allowance::MAX_MEMBER_BYTES) {
+    allowance.NoteBound();
+  }
   return true;
 }
 
@@ -120,7 +123,11 @@ void MailParts::Take(GMimeMessage* message) {
 }
 
 void MailParts::TakeObject(GMimeObject* object, int level) {
-  if (level > MAX_LEVELS || ++parts > MAX_PARTS || allowance.IsSpent()) {
+  if (level > MAX_LEVELS || ++parts > MAX_PARTS) {
+    allowance.NoteBound();
+    return;
+  }
+  if (allowance.IsSpent()) {
     return;
   }
   if (GMIME_IS_MULTIPART_ENCRYPTED(object) || IsType(object, "application", "pkcs7-mime")) {

@@ -348,7 +348,7 @@ TEST(ArchiveTest, OnlySoManyMembersAreRead) {
     members.push_back({std::to_string(i) + ".txt", "w" + std::to_string(i)});
   }
 
-  const Reading reading = ReadBytes(ReadArchive, "a.zip", Zipped(members));
+  const Reading reading = ReadBytes(ReadDocument, "a.zip", Zipped(members));
 
   EXPECT_TRUE(reading.is_good) << reading.why;
   EXPECT_TRUE(reading.content.is_cut);
@@ -356,17 +356,44 @@ TEST(ArchiveTest, OnlySoManyMembersAreRead) {
   EXPECT_THAT(reading.Text(ContentField::MEMBERS), testing::EndsWith("\n1000.txt"));
 }
 
+TEST(ArchiveTest, OnlySoManyNamesAreTaken) {
+  constexpr size_t MAX_NAMES = 10'000;
+  std::vector<Member> members(MAX_NAMES, {"a.jpg", ""});
+  EXPECT_FALSE(ReadBytes(ReadDocument, "a.zip", Zipped(members)).content.is_cut);
+  members.push_back({"b.jpg", ""});
+
+  const Reading reading = ReadBytes(ReadDocument, "a.zip", Zipped(members));
+
+  EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_TRUE(reading.content.is_cut);
+  EXPECT_EQ(reading.Text(ContentField::MEMBERS), "a.jpg");
+}
+
+TEST(ArchiveTest, OfALongMemberTheBeginningIsRead) {
+  const std::string blanks(Allowance::MAX_MEMBER_BYTES + 1, ' ');
+  const Packing bare = {ARCHIVE_FORMAT_RAW, ARCHIVE_FILTER_GZIP, "", ""};
+  for (const auto& [name, bytes] :
+       {std::pair<const char*, std::string>{"a.zip", Zipped({{"a.txt", "begin" + blanks}})},
+        {"a.txt.gz", Packed(bare, {{"x", "begin" + blanks}})}}) {
+    const Reading reading = ReadBytes(ReadDocument, name, bytes);
+
+    EXPECT_TRUE(reading.is_good) << reading.why;
+    EXPECT_EQ(reading.content.text, "begin") << name;
+    EXPECT_TRUE(reading.content.is_cut) << name;
+  }
+}
+
 // Passing it over would take minutes where it is long enough.
 TEST(ArchiveTest, WhatHasToBeUnpackedToBePassedOverCounts) {
   const Packing stream = {ARCHIVE_FORMAT_TAR_USTAR, ARCHIVE_FILTER_ZSTD, "", ""};
   const int64_t bound = Allowance::MAX_BYTES;
   const Reading beyond =
-      ReadBytes(ReadArchive, "a.tar.zst", LongOnesFirst(stream, bound + (8 << 20)));
+      ReadBytes(ReadDocument, "a.tar.zst", LongOnesFirst(stream, bound + (8 << 20)));
   EXPECT_TRUE(beyond.is_good) << beyond.why;
   EXPECT_EQ(beyond.Text(ContentField::MEMBERS), "film.mp4");
   EXPECT_TRUE(beyond.content.is_cut);
 
-  const Reading within = ReadBytes(ReadArchive, "a.tar.zst", LongOnesFirst(stream, 8 << 20));
+  const Reading within = ReadBytes(ReadDocument, "a.tar.zst", LongOnesFirst(stream, 8 << 20));
   EXPECT_TRUE(within.is_good) << within.why;
   EXPECT_EQ(within.Text(ContentField::MEMBERS), "film.mp4\nafter.txt");
   EXPECT_FALSE(within.content.is_cut);

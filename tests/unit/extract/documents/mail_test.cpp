@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "extract/nested.h"
 #include "tests/unit/extract/documents/fixture.h"
 #include "tests/unit/extract/documents/packing.h"
 
@@ -190,11 +191,39 @@ TEST(MailTest, PartsWithinPartsWithoutEndEnd) {
     }
   }
 
-  const Reading reading = ReadBytes(ReadMessage, "a.eml", deep + "\ndeep\n");
+  const Reading reading = ReadBytes(ReadDocument, "a.eml", deep + "\ndeep\n");
 
   EXPECT_TRUE(reading.is_good) << reading.why;
+  EXPECT_TRUE(reading.content.is_cut);
   EXPECT_EQ(reading.Text(ContentField::TO).substr(0, 4), "Quay");
   EXPECT_EQ(reading.content.text, "level 0 level 1 level 2");
+}
+
+TEST(MailTest, WhatABoundKeepsFromBeingReadIsTold) {
+  const std::vector<std::string> most(Allowance::MAX_MEMBERS, Attached("a.txt", "words"));
+  std::vector<std::string> more = most;
+  more.push_back(more.back());
+  const std::vector<Member> members(Allowance::MAX_MEMBERS + 1, {"a.txt", "words"});
+  const std::string packed = Attached("a.zip", Zipped(members));
+  const std::string blanks(Allowance::MAX_MEMBER_BYTES + 1, '\n');
+  const std::string is_long = "Content-Disposition: attachment; filename=a.txt\n\n" + blanks;
+  const std::vector<std::string> parts(10'001, "Content-Type: image/png\n\nx");
+  const struct {
+    const char* what;
+    std::string bytes;
+    bool is_cut;
+  } rows[] = {{"as many parts as are read", Multipart("mixed", most), false},
+              {"more", Multipart("mixed", more), true},
+              {"more in an archive", Multipart("mixed", {packed}), true},
+              {"a long part", Multipart("mixed", {is_long}), true},
+              {"parts that are not read", Multipart("mixed", parts), true}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(ReadBytes(ReadDocument, "a.eml", HEAD + row.bytes).content.is_cut, row.is_cut)
+        << row.what;
+    EXPECT_EQ(ReadBytes(ReadDocument, "a.mbox", "From x\n" + (HEAD + row.bytes)).content.is_cut,
+              row.is_cut)
+        << row.what << ", in a mailbox";
+  }
 }
 
 TEST(MailTest, DamageIsSurvived) {
