@@ -77,8 +77,8 @@ Surroundings& Around() {
   return surroundings;
 }
 
-Format FormatOfContent(const Document& document) {
-  const std::string head = FirstBytes(document, HEAD);
+// `head`: the first HEAD bytes.
+Format FormatOfContent(const std::string& head) {
   if (head.empty() || Around().magic == nullptr) {
     return Format::NONE;
   }
@@ -132,9 +132,8 @@ bool IsBinary(Format format) {
 }
 
 // A name without an ending is a note's as often as not.
-bool MayBeNote(const Document& document) {
-  const std::string head = FirstBytes(document, HEAD);
-  return document.name.find('.') == std::string::npos && !head.empty() && !LooksBinary(head, false);
+bool MayBeNote(const std::string& name, const std::string& head) {
+  return name.find('.') == std::string::npos && !head.empty() && !LooksBinary(head, false);
 }
 
 bool HasFoundSince(const ContentSink::Mark& begin, const ContentSink& sink) {
@@ -143,8 +142,9 @@ bool HasFoundSince(const ContentSink::Mark& begin, const ContentSink& sink) {
 }
 
 bool ReadByContent(const Document& document, ContentSink& sink, std::string& why) {
-  const Format seen = FormatOfContent(document);
-  const bool may_be_note = MayBeNote(document);
+  const std::string head = FirstBytes(document, HEAD);
+  const Format seen = FormatOfContent(head);
+  const bool may_be_note = MayBeNote(document.name, head);
   if (may_be_note && (seen == Format::NONE || IsBinary(seen))) {
     return Read(Format::TEXT, document, sink, why);
   }
@@ -177,7 +177,7 @@ bool ReadByName(const Document& document, ContentSink& sink, std::string& why) {
   if (Read(named, document, sink, fault)) {
     return true;
   }
-  const Format seen = FormatOfContent(document);
+  const Format seen = FormatOfContent(FirstBytes(document, HEAD));
   if (seen == Format::NONE && named == Format::TEXT) {
     sink.ReturnTo(std::move(begin));
     return true;  // many endings of source code name something else elsewhere

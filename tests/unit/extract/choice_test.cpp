@@ -99,26 +99,56 @@ TEST(FormatTableTest, WhatNoReaderIsForIsNotClaimedByItsContent) {
             static_cast<int>(Format::ARCHIVE));
 }
 
+class ChoiceTest : public testing::Test {
+ public:
+  void SetUp() override {
+    std::string error;
+    ASSERT_TRUE(LoadMagic(error)) << error;
+  }
+
+  static Found ReadNamed(const char* name, const std::string& bytes) {
+    const ScopedFd file(memfd_create("test", MFD_CLOEXEC));
+    EXPECT_EQ(write(file.fd, bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
+    ContentSink sink(1000);
+    Found found;
+    found.is_read =
+        ReadDocument({file.fd, name, static_cast<int64_t>(bytes.size()), 0}, sink, found.why);
+    found.content = sink.content;
+    return found;
+  }
+};
+
 // Magic numbers of a few letters begin notes as well.
-TEST(ChoiceTest, ANoteWithoutAnEndingIsTextWhateverItBeginsWith) {
-  std::string error;
-  ASSERT_TRUE(LoadMagic(error)) << error;
+TEST_F(ChoiceTest, ANoteWithoutAnEndingIsTextWhateverItBeginsWith) {
   for (const std::string begin :
        {"Xref: see the other list", "<?xml is how such files begin", "%PDF-word is a word",
         "GIF89a is an old format", "!<arch>", "RIFF is a container", "%!PS-Adobe is a printer's"}) {
     const std::string note = begin + "\nand so on, said the harbour master.\n";
-    const Found found = Read(
-        [](const Document& document, ContentSink& sink, std::string& why) {
-          return ReadDocument({document.file, "note", document.size, 0}, sink, why);
-        },
-        note);
+    const Found found = ReadNamed("note", note);
     EXPECT_TRUE(found.is_read) << begin << ": " << found.why;
     EXPECT_NE(found.content.text.find("the harbour master"), std::string::npos) << begin;
     EXPECT_EQ(found.content.kind, Kind::DOCUMENT) << begin;
   }
 }
 
-TEST(ChoiceTest, WhatTheDiskDoesNotGiveAnyReaderIsNoted) {
+TEST_F(ChoiceTest, WhatHasAnEndingOrWordsOfItsFormatIsNoNote) {
+  for (const char* begin : {"GIF89a is an old format", "!<arch>"}) {
+    const Found found =
+        ReadNamed("note.unknown", begin + std::string("\nsaid the harbour master.\n"));
+    EXPECT_EQ(found.content.text, "") << begin;
+  }
+  const Found damaged = ReadNamed("page", "<?xml version=\"1.0\"?>\n<a><b>some words</b>");
+  EXPECT_EQ(damaged.why, "damaged XML");
+  EXPECT_EQ(damaged.content.text, "some words");
+  const Found encrypted =
+      ReadNamed("letter",
+                "Return-Path: <quay@example.org>\nMIME-Version: 1.0\nContent-Type: "
+                "application/pkcs7-mime; smime-type=enveloped-data\n\nMIIB\n");
+  EXPECT_EQ(encrypted.why, "encrypted");
+  EXPECT_EQ(encrypted.content.text, "");
+}
+
+TEST_F(ChoiceTest, WhatTheDiskDoesNotGiveAnyReaderIsNoted) {
   const int file = memfd_create("test", MFD_CLOEXEC);
   ASSERT_EQ(write(file, "words", 5), 5);
   const ScopedFd readable(file);
