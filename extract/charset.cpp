@@ -145,10 +145,13 @@ const char* WideCharset(std::string_view bytes) {
   if (is_wide(zeros[0], zeros[1])) {
     return "UTF-16BE";
   }
+  if (zeros[0] + zeros[1] == 0 || IsPlainText(bytes)) {
+    return nullptr;
+  }
   constexpr WideForm FORMS[] = {
       {"UTF-32LE", 4, true}, {"UTF-32BE", 4, false}, {"UTF-16LE", 2, true}, {"UTF-16BE", 2, false}};
   for (const WideForm& form : FORMS) {
-    if (zeros[0] + zeros[1] > 0 && !IsPlainText(bytes) && IsTextOf(form, bytes)) {
+    if (IsTextOf(form, bytes)) {
       return form.charset;
     }
   }
@@ -180,11 +183,11 @@ bool IsMostlyUtf8(std::string_view bytes) {
   return bad * GOOD_OF_A_BAD <= good;
 }
 
-bool TellsOnlyByItsEnd(std::string_view bytes) {
+std::string_view UntoldEnd(std::string_view bytes) {
   const auto odd = std::find_if(bytes.begin(), bytes.end(),
                                 [](char byte) { return static_cast<unsigned char>(byte) >= 0x80; });
-  return odd != bytes.end() &&
-         FirstCharacter(bytes.substr(static_cast<size_t>(odd - bytes.begin()))).is_cut;
+  bytes.remove_prefix(static_cast<size_t>(odd - bytes.begin()));
+  return !bytes.empty() && FirstCharacter(bytes).is_cut ? bytes : std::string_view();
 }
 
 namespace {

@@ -26,8 +26,9 @@ bool HasShifts(std::string_view bytes);
 // Nearly all characters beyond ASCII are sequences of UTF-8: a bad byte among many good ones does
 // not make it another charset. The last character may be cut.
 bool IsMostlyUtf8(std::string_view bytes);
-// The only bytes beyond ASCII are the last ones, which may begin a character of UTF-8.
-bool TellsOnlyByItsEnd(std::string_view bytes);
+// The last bytes, where they are the only ones beyond ASCII and may begin a character of UTF-8:
+// what comes behind them tells. Else empty.
+std::string_view UntoldEnd(std::string_view bytes);
 // Of bytes that are no UTF-8; never empty.
 std::string GuessCharset(std::string_view bytes);
 // What texts under a charset's name are really written in: often a larger one, and readers of mail

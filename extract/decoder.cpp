@@ -72,34 +72,31 @@ class Iconv {
   std::string pending;
 };
 
-bool IsBeyondAscii(char byte) {
-  return static_cast<unsigned char>(byte) >= 0x80;
-}
-
 // One file's way to UTF-8. The charset is settled by the first piece that tells.
 class Decoding {
  public:
-  // False: what follows is no text.
-  bool Decode(std::string_view piece, const CharsetFinder& declared, std::string& text) {
-    const std::string joined = held + std::string(piece);
-    held.clear();
-    std::string_view bytes = joined;
+  // False: what follows is no text. `text` lasts as long as `bytes` do, and until the next call.
+  bool Decode(std::string_view bytes, const CharsetFinder& declared, std::string_view& text) {
+    if (!held.empty()) {
+      joined = std::exchange(held, {}) + std::string(bytes);
+      bytes = joined;
+    }
     if (is_first) {
       is_first = false;
       const ByteOrderMark mark = FindByteOrderMark(bytes);
       bytes.remove_prefix(mark.length);
       Settle(mark.charset != nullptr ? mark.charset : declared ? declared(bytes) : "");
-      if (mark.charset == nullptr && WideCharset(bytes) != nullptr) {
-        Settle(WideCharset(bytes));
+      const char* wide = mark.charset == nullptr ? WideCharset(bytes) : nullptr;
+      if (wide != nullptr) {
+        Settle(wide);
       }
     }
     may_shift = may_shift || HasShifts(bytes);
     if (!is_wide && LooksBinary(bytes, may_shift)) {
       return false;
     }
-    if (!is_settled && TellsOnlyByItsEnd(bytes)) {
-      const auto end = std::find_if(bytes.begin(), bytes.end(), IsBeyondAscii);
-      held.assign(end, bytes.end());
+    if (!is_settled) {
+      held = UntoldEnd(bytes);
       bytes.remove_suffix(held.size());
     }
     if (!is_settled && !IsAscii(bytes)) {
@@ -112,22 +109,26 @@ class Decoding {
   }
 
   // What waited for another piece.
-  std::string End() {
+  std::string_view End() {
     if (held.empty()) {
-      return "";
+      return {};
     }
     SettleBy(held);
-    return Converted(std::exchange(held, {}));
+    return Converted(held);
   }
 
  private:
   void SettleBy(std::string_view bytes) {
-    Settle(!TellsOnlyByItsEnd(bytes) && IsMostlyUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
+    Settle(UntoldEnd(bytes).empty() && IsMostlyUtf8(bytes) ? "UTF-8" : GuessCharset(bytes));
     Settle("WINDOWS-1252");  // where that is one which the C library does not know
   }
 
-  std::string Converted(std::string_view bytes) {
-    return converter.IsOpen() ? converter.Convert(bytes) : std::string(bytes);
+  std::string_view Converted(std::string_view bytes) {
+    if (!converter.IsOpen()) {
+      return bytes;
+    }
+    converted = converter.Convert(bytes);
+    return converted;
   }
 
   // An unknown name settles nothing: the bytes will tell.
@@ -144,7 +145,9 @@ class Decoding {
   }
 
   Iconv converter;
-  std::string held;  // the beginning of a character, before anything told the charset
+  std::string held;       // the beginning of a character, before anything told the charset
+  std::string joined;     // what was held and the piece behind it
+  std::string converted;  // the last piece
   bool is_first = true;
   bool is_settled = false;
   bool is_wide = false;
@@ -179,7 +182,7 @@ bool DecodeText(const Document& document, const CharsetFinder& declared, const T
       return true;
     }
 
-    std::string text;
+    std::string_view text;
     if (!decoding.Decode({chunk.data(), length}, declared, text)) {
       why = "not a text";
       return at > 0;
