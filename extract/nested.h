@@ -26,9 +26,11 @@ class Allowance {
   Allowance(const Allowance&) = delete;
   Allowance& operator=(const Allowance&) = delete;
 
+  // What one of these denies is noted, for HasBound.
   bool TakeMember();
-  bool TakeBytes(int64_t bytes);
-  bool IsSpent() const;   // no time or no bytes are left
+  bool TakeBytes(int64_t bytes);  // false when it is spent
+  bool IsSpent() const;           // no time or no bytes are left
+
   void NoteBound();       // a bound that somebody else holds ended the reading
   bool HasBound() const;  // something was not read, since it would have cost too much
 };

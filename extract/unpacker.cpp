@@ -158,7 +158,7 @@ bool Unpacker::PassOver() {
     code = archive_read_data_block(packed, &block, &length, &offset);
     if (IsUsable(code)) {
       counted += static_cast<int64_t>(length);
-      if (!allowance.TakeBytes(static_cast<int64_t>(length)) || allowance.IsSpent()) {
+      if (!allowance.TakeBytes(static_cast<int64_t>(length))) {
         return false;
       }
     }
@@ -176,7 +176,7 @@ bool Unpacker::Next() {
   const int64_t unpacked = archive_filter_count(packed) > 1 ? archive_filter_bytes(packed, 0) : 0;
   const int64_t skipped = std::max<int64_t>(unpacked - counted, 0);
   counted += skipped;
-  if (!allowance.TakeBytes(skipped) || allowance.IsSpent()) {
+  if (!allowance.TakeBytes(skipped)) {
     return false;
   }
 
@@ -208,7 +208,7 @@ ssize_t Unpacker::Read(char* into, size_t count) {
     return -1;
   }
   counted += got;
-  return allowance.TakeBytes(got) && !allowance.IsSpent() ? got : -1;
+  return allowance.TakeBytes(got) ? got : -1;
 }
 
 bool Unpacker::ReadAll(size_t limit, std::string& bytes) {
