@@ -118,6 +118,19 @@ TEST(CharsetTest, TheLargerOfTwoCharsetsIsMeant) {
   EXPECT_EQ(Read(ReadText, InCharset("WINDOWS-1250", HUNGARIAN)).content.text, HUNGARIAN);
 }
 
+// Controls in the standards' charsets, which a guess names first.
+TEST(CharsetTest, SignsThatOnlyTheLargerCharsetHasAreTold) {
+  const struct {
+    const char* charset;
+    const char* text;
+  } rows[] = {{"WINDOWS-1253", "2004 1821 – 1821 – “Άλλα” 2004 … … – Η"},
+              {"WINDOWS-1252", "med fornuft og samvittighet – … og “bør” handle mot"},
+              {"WINDOWS-1252", "Le cœur des élèves bat où sa sœur préfère étudier l’œuvre."}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(Read(ReadText, InCharset(row.charset, row.text)).content.text, row.text);
+  }
+}
+
 // What begins a character at a piece's or the file's end tells nothing of the charset yet.
 TEST(CharsetTest, ACharacterThatTheEndCutsSettlesNoCharset) {
   EXPECT_EQ(Read(ReadText, "Caf\xE9").content.text, "Café");
