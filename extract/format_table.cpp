@@ -3,6 +3,7 @@
 #include <array>
 #include <unordered_map>
 
+#include "base/ascii.h"
 #include "extract/choice.h"
 
 namespace fileindexd {
@@ -191,9 +192,7 @@ Format FormatOfName(std::string_view name) {
 
   std::array<char, LONGEST> lower{};
   const std::string_view ending = name.substr(dot + 1);
-  std::transform(ending.begin(), ending.end(), lower.begin(), [](char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-  });
+  std::transform(ending.begin(), ending.end(), lower.begin(), LowerLetter);
   const auto found = endings.find(std::string_view(lower.data(), ending.size()));
   return found == endings.end() ? Format::NONE : found->second;
 }

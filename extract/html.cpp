@@ -8,6 +8,7 @@
 #include <memory>
 #include <new>
 
+#include "base/ascii.h"
 #include "extract/decoder.h"
 
 namespace fileindexd {
@@ -30,21 +31,13 @@ bool IsAmong(const std::array<std::string_view, SIZE>& names, std::string_view n
   return std::find(names.begin(), names.end(), name) != names.end();
 }
 
-std::string Lower(std::string_view text) {
-  std::string lower(text);
-  for (char& letter : lower) {
-    letter = letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
-  }
-  return lower;
-}
-
 std::string_view View(const xmlChar* text) {
   return text == nullptr ? std::string_view() : reinterpret_cast<const char*>(text);
 }
 
 // "charset=x", "charset = 'x'", and the encoding of an XML declaration.
 std::string DeclaredCharset(std::string_view bytes) {
-  const std::string head = Lower(bytes.substr(0, HEAD));
+  const std::string head = LowerText(bytes.substr(0, HEAD));
   for (const std::string_view word : {"charset", "encoding"}) {
     const size_t at = head.find(word);
     if (at == std::string::npos) {
@@ -91,9 +84,9 @@ void TakeMeta(Page& page, const xmlChar** attributes) {
   std::string name;
   std::string_view value;
   for (; attributes != nullptr && attributes[0] != nullptr; attributes += 2) {
-    const std::string key = Lower(View(attributes[0]));
+    const std::string key = LowerText(View(attributes[0]));
     if (key == "name" || key == "property") {
-      name = Lower(View(attributes[1]));
+      name = LowerText(View(attributes[1]));
     } else if (key == "content") {
       value = View(attributes[1]);
     }

@@ -3,6 +3,7 @@
 
 #include <chrono>
 
+#include "base/ascii.h"
 #include "base/utf8.h"
 #include "extract/utf16.h"
 
@@ -171,10 +172,7 @@ bool HasEnding(std::string_view name, std::string_view endings) {
   if (dot == std::string_view::npos) {
     return false;
   }
-  std::string ending;
-  for (char letter : name.substr(dot + 1)) {
-    ending += letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
-  }
+  const std::string ending = LowerText(name.substr(dot + 1));
   while (!endings.empty()) {
     size_t end = endings.find(' ');
     if (endings.substr(0, end) == ending) {

@@ -4,6 +4,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/ascii.h"
 #include "extract/format.h"
 #include "extract/memory_file.h"
 #include "extract/nested.h"
@@ -21,7 +22,7 @@ constexpr int MAX_PARTS = 100'000;
 using PartReader = void (*)(XmlPart& part, ContentSink& sink);
 
 struct PartRule {
-  std::string_view begin;  // of the part's name, in lower case
+  std::string_view begin;  // of the part's plain name
   PartReader read;
 };
 
@@ -52,15 +53,10 @@ constexpr PartRule RULES[] = {
 
 // Packers differ in the case of names, and in whether they begin with a slash.
 std::string PlainName(std::string_view name) {
-  std::string plain(name.substr(std::min(name.find_first_not_of('/'), name.size())));
-  for (char& letter : plain) {
-    letter = letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
-  }
-  return plain;
+  return LowerText(name.substr(std::min(name.find_first_not_of('/'), name.size())));
 }
 
-PartReader ReaderOf(std::string_view packed_name) {
-  const std::string name = PlainName(packed_name);
+PartReader ReaderOf(std::string_view name) {
   if (name.ends_with(".psmdcp")) {
     return SetOoxmlFields;  // the properties, under a name made for each document
   }
@@ -89,10 +85,15 @@ class OfficeZip {
       return false;
     }
     for (int i = 0; i < MAX_PARTS && zip.Next(); ++i) {
-      if (IsTable(zip.name)) {
+      const std::string name = PlainName(zip.name);
+      const PartReader reader = ReaderOf(name);
+      if (reader == AddSheetWords) {
         ++tables;
-      } else {
-        ReadPart(zip);
+      } else if (name == "meta-inf/manifest.xml") {
+        ReadManifest(zip);
+      } else if (reader != nullptr) {
+        ++parts;
+        ReadPart(zip, reader);
       }
     }
     if (tables > 0 && !sink.IsFull()) {
@@ -110,8 +111,6 @@ class OfficeZip {
   }
 
  private:
-  static bool IsTable(std::string_view name) { return ReaderOf(name) == AddSheetWords; }
-
   void ReadTables() {
     Unpacker zip;
     std::string fault;
@@ -119,25 +118,20 @@ class OfficeZip {
       return;
     }
     for (int left = tables; left > 0 && !sink.IsFull() && zip.Next();) {
-      if (IsTable(zip.name)) {
-        ReadPart(zip);
+      if (ReaderOf(PlainName(zip.name)) == AddSheetWords) {
+        ReadPart(zip, AddSheetWords);
         --left;
       }
     }
   }
 
-  void ReadPart(Unpacker& zip) {
-    const PartReader reader = ReaderOf(zip.name);
-    const bool is_manifest = PlainName(zip.name) == "meta-inf/manifest.xml";
-    if (reader == nullptr && !is_manifest) {
-      return;
-    }
+  void ReadManifest(Unpacker& zip) {
     XmlPart part([&zip](char* into, size_t count) { return zip.Read(into, count); });
-    if (is_manifest) {
-      is_encrypted = IsOdfEncrypted(part) || is_encrypted;
-      return;
-    }
-    parts += IsTable(zip.name) ? 0 : 1;
+    is_encrypted = IsOdfEncrypted(part) || is_encrypted;
+  }
+
+  void ReadPart(Unpacker& zip, PartReader reader) {
+    XmlPart part([&zip](char* into, size_t count) { return zip.Read(into, count); });
     reader(part, sink);
     sink.AddText("\n");
     is_damaged = is_damaged || part.is_damaged;

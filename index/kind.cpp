@@ -5,6 +5,7 @@
 #include <array>
 #include <unordered_map>
 
+#include "base/ascii.h"
 #include "index/kind_table.h"
 
 namespace fileindexd {
@@ -46,10 +47,7 @@ Kind KindOfName(std::string_view name) {
 
   std::array<char, LONGEST> lower{};
   const std::string_view ending = name.substr(dot + 1);
-  // Not tolower(): the locale must not decide what a file is.
-  std::transform(ending.begin(), ending.end(), lower.begin(), [](char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-  });
+  std::transform(ending.begin(), ending.end(), lower.begin(), LowerLetter);
 
   const auto found = endings.find(std::string_view(lower.data(), ending.size()));
   return found == endings.end() ? Kind::OTHER : found->second;

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/ascii.h"
 #include "index/contents_reader.h"
 #include "index/entry_table.h"
 #include "index/schema.h"
@@ -24,10 +25,6 @@ std::string_view View(const Statement& row, int column) {
   return bytes == nullptr ? std::string_view()
                           : std::string_view(static_cast<const char*>(bytes),
                                              static_cast<size_t>(std::max(size, 0)));
-}
-
-char Small(char c) {
-  return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
 }
 
 }  // namespace
@@ -70,9 +67,7 @@ std::string ExtensionOf(std::string_view path) {
       name.find_first_of(" \t\n", dot) != std::string_view::npos) {
     return {};
   }
-  std::string extension(name.substr(dot + 1));
-  std::transform(extension.begin(), extension.end(), extension.begin(), Small);
-  return extension;
+  return LowerText(name.substr(dot + 1));
 }
 
 const char* AgeName(int64_t mtime, int64_t now) {

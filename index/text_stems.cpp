@@ -9,6 +9,7 @@
 #include <cstring>
 #include <utility>
 
+#include "base/ascii.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -85,10 +86,7 @@ std::string_view Stems::Of(std::string_view word) {
 }
 
 std::string LanguageName(std::string_view given) {
-  std::string name(given);
-  std::transform(name.begin(), name.end(), name.begin(), [](char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-  });
+  const std::string name = LowerText(given);
   for (const auto& [code, language] : CODES) {
     if (name == code) {
       return std::string(language);
