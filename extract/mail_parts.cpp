@@ -5,6 +5,7 @@
 #include <string>
 #include <utility>
 
+#include "base/ascii.h"
 #include "extract/charset.h"
 #include "extract/choice.h"
 #include "extract/gobject.h"
@@ -17,16 +18,19 @@ namespace {
 constexpr int MAX_LEVELS = 50;  // of parts within parts
 constexpr int MAX_PARTS = 10'000;
 
-bool IsSignedOnly(GMimeObject* object) {
+// Sealed for anybody to open. Where nothing is said, it is encrypted.
+bool IsOpen(GMimeObject* object) {
   const char* type = g_mime_object_get_content_type_parameter(object, "smime-type");
-  return type != nullptr && g_ascii_strcasecmp(type, "signed-data") == 0;
+  const std::string name = LowerText(type != nullptr ? type : "");
+  return name == "signed-data" || name == "compressed-data" || name == "certs-only" ||
+         name == "signed-receipt";
 }
 
 // A document by its type alone, which has a reader; texts are bodies.
 bool IsOfFormat(GMimeObject* object) {
   GMimeContentType* type = g_mime_object_get_content_type(object);
   char* mime = type != nullptr ? g_mime_content_type_get_mime_type(type) : nullptr;
-  const std::string_view name = mime != nullptr ? mime : "";
+  const std::string name = LowerText(mime != nullptr ? mime : "");
   const bool is_known = name.starts_with("application/") && FormatOfMime(name) != Format::NONE;
   g_free(mime);
   return is_known;
@@ -131,7 +135,7 @@ void MailParts::TakeObject(GMimeObject* object, int level) {
     return;
   }
   if (GMIME_IS_MULTIPART_ENCRYPTED(object) || IsType(object, "application", "pkcs7-mime")) {
-    is_encrypted = is_encrypted || !IsSignedOnly(object);
+    is_encrypted = is_encrypted || !IsOpen(object);
   } else if (GMIME_IS_MULTIPART(object)) {
     TakeMultipart(GMIME_MULTIPART(object), level);
   } else if (GMIME_IS_MESSAGE_PART(object)) {

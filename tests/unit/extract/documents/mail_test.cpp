@@ -128,11 +128,14 @@ TEST(MailTest, AnAttachedMessageHasItsName) {
 }
 
 // Its words lie in the signature's own wrapping.
-TEST(MailTest, ASignedMessageIsNotSaidToBeEncrypted) {
+TEST(MailTest, WhatIsSignedOrPackedIsNotSaidToBeEncrypted) {
   const std::string type = "Content-Type: application/pkcs7-mime; name=smime.p7m";
-  const Reading signed_one =
-      ReadBytes(ReadMessage, "a.eml", HEAD + type + "; smime-type=Signed-Data\n\nxyz\n");
-  EXPECT_TRUE(signed_one.is_good) << signed_one.why;
+  for (const std::string sort :
+       {"Signed-Data", "compressed-data", "certs-only", "signed-receipt"}) {
+    const Reading open_one =
+        ReadBytes(ReadMessage, "a.eml", HEAD + type + "; smime-type=" + sort + "\n\nxyz\n");
+    EXPECT_TRUE(open_one.is_good) << sort << ": " << open_one.why;
+  }
   EXPECT_EQ(ReadBytes(ReadMessage, "a.eml", HEAD + type + "\n\nxyz\n").why, "encrypted");
   EXPECT_EQ(
       ReadBytes(ReadMessage, "a.eml", HEAD + type + "; smime-type=enveloped-data\n\nxyz\n").why,
@@ -144,8 +147,10 @@ TEST(MailTest, APartOfAFormatNeedsNoName) {
       ReadMessage, "a.eml",
       HEAD + Multipart("mixed", {"Content-Type: text/plain\n\nbody\n",
                                  "Content-Type: application/rtf\n\n{\\rtf1 dues of the quay}\n",
+                                 "Content-Type: APPLICATION/RTF\n\n{\\rtf1 tolls of the gate}\n",
                                  "Content-Type: application/pgp-signature\n\nsealed\n"}));
   EXPECT_THAT(reading.content.text, testing::HasSubstr("dues of the quay"));
+  EXPECT_THAT(reading.content.text, testing::HasSubstr("tolls of the gate"));
   EXPECT_THAT(reading.content.text, testing::Not(testing::HasSubstr("sealed")));
 }
 
