@@ -87,6 +87,9 @@ std::string_view Trimmed(std::string_view text) {
   return text.substr(first, text.find_last_not_of(BLANKS) - first + 1);
 }
 
+namespace {
+
+// Seconds east of Greenwich: "+02:00", "-0330", "Z".
 std::optional<int64_t> ZoneOf(std::string_view text) {
   text = Trimmed(text);
   if (text.starts_with("Z") || text.starts_with("UTC")) {
@@ -105,8 +108,6 @@ std::optional<int64_t> ZoneOf(std::string_view text) {
   int64_t seconds = hours * 3600 + minutes * 60;
   return west ? -seconds : seconds;
 }
-
-namespace {
 
 struct Clock {
   int64_t seconds = 0;  // as written, in whatever zone

@@ -25,9 +25,6 @@ std::optional<int64_t> ClockOf(std::string_view text);
 // The same with the zone passed over: what a clock on the spot showed, as if it were UTC.
 std::optional<int64_t> WrittenClockOf(std::string_view text);
 
-// Seconds east of Greenwich: "+02:00", "-0330", "Z".
-std::optional<int64_t> ZoneOf(std::string_view text);
-
 // The first number of a text: 3 of "3/12", 1999 of "1999-05-01". None above nine digits.
 std::optional<int64_t> LeadingNumber(std::string_view text);
 
