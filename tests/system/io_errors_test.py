@@ -79,8 +79,7 @@ class FullAtTheStart:
         """By the daemon, which asks for the state each time that it is to revive the Worker."""
         for _ in range(3):
             self.ctl("worker", "revive", "alpha", code=1)
-            self.log.mark()
-            said = self.log.texts(after)
+            said = self.logged(after)
             self.assertEqual(len(list(filter(FULL_STATE.fullmatch, said))), times, said)
 
     def assert_lives_and_heals(self):

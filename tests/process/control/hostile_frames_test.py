@@ -106,8 +106,7 @@ class HostileFramesTest(MachineTest):
                     reply = control.exchange(control.frame(body.encode()))
 
                     self.assertEqual(reply, -1)
-                    self.log.mark()
-                    (line,) = (t for t in self.log.texts(after) if t.startswith("Malformed"))
+                    (line,) = (t for t in self.logged(after) if t.startswith("Malformed"))
                     shown = line.removeprefix("Malformed command: ")
                     if size < LOGGED:
                         self.assertEqual(shown, body)

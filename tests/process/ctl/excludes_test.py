@@ -97,8 +97,7 @@ class KeptOutTest(ExcludesTest):
 
         self.event(REINDEX, "")
 
-        self.log.mark()
-        walked = [line for line in self.log.texts(after) if "IndexDirAdd: " in line]
+        walked = [line for line in self.logged(after) if "IndexDirAdd: " in line]
         self.assertEqual(len(walked), 2, walked)  # the folder itself, and src
         self.check("src/build")
 

@@ -19,12 +19,6 @@ def remove_all_of(path):
         remove(path + ending)
 
 
-def scribble(path, start=0):
-    with open(path, "r+b") as file:
-        file.seek(start)
-        file.write(b"\xa5" * max(os.fstat(file.fileno()).st_size - start, 5000))
-
-
 def truncate(part):
     os.truncate(FILE, int(os.path.getsize(FILE) * part))
 

@@ -186,8 +186,7 @@ class DamagedIndexTest(IndexTest):
 
     def assert_told_once(self, after, fate, begun):
         """By whoever noticed: a Worker that has begun since, or one that was at work."""
-        self.log.mark()
-        texts = self.log.texts(after)
+        texts = self.logged(after)
         told = {
             "set aside": len(list(filter(SET_ASIDE.fullmatch, texts))),
             "made anew": len(list(filter(MADE_ANEW.fullmatch, texts))),

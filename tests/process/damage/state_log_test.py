@@ -5,14 +5,9 @@ import os
 import re
 import shutil
 
-from damaged_state import (
-    FILE,
-    USED,
-    StateDamageTest,
-    scribble,
-)
+from damaged_state import FILE, USED, StateDamageTest
 from harness import main, namespace
-from harness.pages import copy_log_back
+from harness.pages import copy_log_back, scribble
 from harness.standing_in import make_full_folder, remove, replace
 
 LOG = FILE + "-wal"

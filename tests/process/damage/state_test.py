@@ -14,11 +14,10 @@ from damaged_state import (
     USED,
     StateDamageTest,
     remove_all_of,
-    scribble,
     truncate,
 )
 from harness import main, namespace
-from harness.pages import copy_log_back
+from harness.pages import copy_log_back, scribble
 from harness.standing_in import make_full_folder, remove, replace
 
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")

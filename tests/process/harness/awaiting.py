@@ -4,6 +4,7 @@
 import ctypes
 import os
 import select
+import struct
 import time
 
 from harness.scale import IS_LONG
@@ -14,6 +15,7 @@ IN_ANY = 0x00000FFE  # all changes of a folder and of what is in it, but reading
 IN_CHANGE = 0x00000FC2  # the same without opening and closing: what a look itself does not raise
 IN_CLOSE = 0x00000018
 IN_CLOEXEC = 0o2000000
+EVENT = struct.Struct("iIII")  # and its name behind it
 
 FUTEX = 202  # the number of the call, on amd64
 FUTEX_COMMAND = 0x7F
@@ -44,6 +46,17 @@ class FolderWatch:
         if ready:
             os.read(self.fd, 65536)
         return bool(ready)
+
+    def events(self, name):
+        """What has happened to the entry of that name, in order; some event has to be there."""
+        found = []
+        data = os.read(self.fd, 65536)
+        while data:
+            _, mask, _, length = EVENT.unpack_from(data)
+            if data[EVENT.size : EVENT.size + length].rstrip(b"\0") == name.encode():
+                found.append(mask)
+            data = data[EVENT.size + length :]
+        return found
 
     def __enter__(self):
         return self

@@ -211,9 +211,12 @@ class MachineTest(unittest.TestCase):
             after = self.await_line(text, after)
         return after
 
+    def logged(self, after=0):
+        """The texts of all lines that were sent by now."""
+        return self.log.texts(after, self.log.mark())
+
     def assert_not_logged(self, pattern, after=0):
-        self.log.mark()  # so that all that was sent is seen
-        found = [text for text in self.log.texts(after) if re.fullmatch(pattern, text)]
+        found = [text for text in self.logged(after) if re.fullmatch(pattern, text)]
         self.assertEqual(found, [])
 
     # Files.

@@ -16,11 +16,12 @@ def copy_log_back(path):
     db.close()
 
 
-def scribble(path, start, end=None):
+def scribble(path, start=0, end=None):
+    """To the file's end where none is given, and beyond it where hardly anything is left to it."""
     with open(path, "r+b") as file:
         size = os.fstat(file.fileno()).st_size
         file.seek(start)
-        file.write(b"\xa5" * ((size if end is None else min(end, size)) - start))
+        file.write(b"\xa5" * (max(size - start, PAGE) if end is None else min(end, size) - start))
 
 
 def scribble_leaf(path, table):

@@ -35,8 +35,7 @@ class SecondInstanceTest(MachineTest):
 
         self.launch(debug=False)
 
-        self.log.mark()  # so that all that was sent is seen
-        self.assertEqual(self.log.texts(), [])
+        self.assertEqual(self.logged(), [])
 
     def test_second_start_by_another_user_leaves_the_first_alone(self):
         pid = self.start()

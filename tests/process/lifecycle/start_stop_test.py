@@ -7,7 +7,6 @@ import re
 import shutil
 import signal
 import stat
-import struct
 import unittest.mock
 
 from harness import MachineTest, control, main, namespace
@@ -31,19 +30,6 @@ CLONE3 = 435
 IN_MODIFY = 0x02
 IN_MOVED_TO = 0x80
 IN_CREATE = 0x100
-EVENT = struct.Struct("iIII")
-
-
-def events_of(watch, name):
-    """What has happened to the file of that name, in order."""
-    found = []
-    data = os.read(watch.fd, 65536)
-    while data:
-        _, mask, _, length = EVENT.unpack_from(data)
-        if data[EVENT.size : EVENT.size + length].rstrip(b"\0") == name.encode():
-            found.append(mask)
-        data = data[EVENT.size + length :]
-    return found
 
 
 class CloneArguments(ctypes.Structure):
@@ -99,7 +85,7 @@ class StartStopTest(MachineTest):
         with FolderWatch(namespace.RUN, mask=IN_CREATE | IN_MODIFY | IN_MOVED_TO) as watch:
             pid = self.start()
 
-            self.assertEqual(events_of(watch, os.path.basename(PID_FILE)), [IN_MOVED_TO])
+            self.assertEqual(watch.events(os.path.basename(PID_FILE)), [IN_MOVED_TO])
         self.assertEqual(pid, self.detached_pid())
         self.assertEqual(stat.S_IMODE(os.stat(PID_FILE).st_mode), 0o644)
 
@@ -146,9 +132,8 @@ class StartStopTest(MachineTest):
 
         self.stop(pid)
 
-        self.log.mark()  # so that all that was sent is seen
         self.assertEqual(
-            self.log.texts(),
+            self.logged(),
             [f"In kill handler({int(signal.SIGTERM)})", "Daemon Leaving main loop"],
         )
 

@@ -72,8 +72,7 @@ class PauseTest(IndexTest):
         after = self.pause_in_a_walk(pid, root)
 
         # The operation that was under way ends; the next one waits.
-        self.log.mark()  # so that all that was sent is seen
-        self.assertLess(len(list(filter(ADDED.fullmatch, self.log.texts(after)))), 2)
+        self.assertLess(len(list(filter(ADDED.fullmatch, self.logged(after)))), 2)
 
         self.assertEqual(self.command("resume"), 0)
         self.await_line("In cleaner", after)

@@ -23,7 +23,7 @@ class ContentsDamageTest(ContentsTest):
         for i in range(TEXTS):
             words = " ".join(f"word{i}x{n}" for n in range(200))
             self.write(f"{self.root}/text-{i:03}.txt", f"lighthouse {words}")
-        self.pid = self.start()
+        self.start()
         self.ctl("folder", "add", self.root, "--document")
         self.await_counts(done=TEXTS, waiting=0)
 

@@ -3,11 +3,11 @@
 
 import os
 import sqlite3
-import subprocess
 
 from harness import main, namespace
 from harness.awaiting import IN_CHANGE, await_in_folder
 from harness.checks import IndexTest
+from harness.standing_in import empty
 
 ATTRIBUTES = 0x4
 DELETE = 0x80
@@ -20,9 +20,6 @@ class EmptyRoot(IndexTest):
         self.start()
         self.await_drained("alpha")
         self.assert_index(self.root)
-
-    def empty(self):
-        subprocess.run(["find", self.root, "-mindepth", "1", "-delete"], check=True)
 
     def reindex(self):
         self.ctl("reindex", self.root)
@@ -47,7 +44,7 @@ class EmptyRoot(IndexTest):
         self.assertEqual(self.share()["root"], "sound")
 
     def test_single_deletes_are_believed_after_a_reindex_that_was_refused(self):
-        self.empty()
+        empty(self.root)
         self.reindex()
         self.assert_paths(self.root, ["a.txt", "b.txt", "d", "d/c.txt"])
 
@@ -95,7 +92,7 @@ class EmptyRoot(IndexTest):
 
     def test_a_touched_root_and_its_last_deletes_in_one_batch_leave_nothing_to_be_done(self):
         names = ("a.txt", "b.txt", "d/c.txt", "d")
-        self.empty()
+        empty(self.root)
         os.chmod(self.root, 0o700)
         self.append("alpha", {"event": ATTRIBUTES, "path": self.root},
                     *({"event": DELETE, "path": f"{self.root}/{name}"} for name in names))
@@ -103,7 +100,7 @@ class EmptyRoot(IndexTest):
         self.assert_in_step()
 
     def test_acceptance_goes_on_after_a_reindex_that_was_refused(self):
-        self.empty()
+        empty(self.root)
         self.reindex()
         self.delete("a.txt")
 
