@@ -45,7 +45,7 @@ class Opener {
 
   // False when no thread can be had.
   bool Ask(Question question, Time now, Work work = nullptr);
-  // Runs the answers that have come, or the first ones of them, but for those of questions that were
+  // Runs the answers that have come, or the first of them, but for those of questions that were
   // dropped. One may drop the others.
   void Take(Time now, size_t most = SIZE_MAX);
   // What was asked is not answered any more.
