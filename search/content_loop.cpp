@@ -26,7 +26,7 @@ constexpr milliseconds RELOAD_FAILED(1000);
 // For what no watch could be set on.
 constexpr seconds BETWEEN_LOOKS(60);
 constexpr seconds LONGEST_POOL_REST(60);
-// Files of all shares that are held open to be given out next.
+// Files of all shares that are held open to be given out next: two batches of each.
 constexpr size_t MOST_READY = 256;
 // Of all shares' databases: a share's own caches could take as much.
 constexpr int64_t MOST_CACHED = int64_t{20} << 20;
@@ -335,7 +335,8 @@ void ContentLoop::HandOut(Time now) {
 
   sharing = std::max<size_t>(sharing, 1);
   for (auto& [name, followed] : shares) {
-    followed.contents.largest_batch = std::min(MOST_READY / sharing, ShareContents::LARGEST_BATCH);
+    followed.contents.largest_batch =
+        std::min(MOST_READY / 2 / sharing, ShareContents::LARGEST_BATCH);
     followed.contents.enough_pending = ContentsWriter::ENOUGH_PENDING / sharing;
   }
   while (pool != nullptr && pool->Room() > 0 && HandOutOne(Turn::NEW, now)) {

@@ -82,7 +82,7 @@ class ShareContents {
   bool TakeRetried() { return std::exchange(retried, false); }
 
   Share share;
-  size_t largest_batch = LARGEST_BATCH;  // files held open to be given out next
+  size_t largest_batch = LARGEST_BATCH;  // of files; two are held open to be given out next
   bool may_read_again = true;            // nothing new waits anywhere
   // Bytes of a transaction: words are collected in memory until its end.
   size_t enough_pending = ContentsWriter::ENOUGH_PENDING;

@@ -101,8 +101,8 @@ bool ShareContents::Next(Turn turn, Time now, uint64_t id, ExtractJob& job) {
   if (!MayHaveJobs(turn, now)) {
     return false;
   }
-  // The second half of what is new is read while the next files are opened and put on record.
-  const size_t ahead = turn == Turn::NEW ? batch / 2 : 0;
+  // What is new is read while as much again is opened and put on record.
+  const size_t ahead = turn == Turn::NEW ? batch : 0;
   if (line.ready.size() <= ahead && !committing.IsRunning() && MayOpen(line)) {
     Refill(turn, now);
   }

@@ -269,8 +269,8 @@ TEST_F(ContentLoopTest, SharesWhoseFilesAreBeingReadHaveTheirPartOfTheRoom) {
   Settle();
 
   EXPECT_EQ(Running().size(), 307U);
-  EXPECT_THAT(Scripted("h").calls, testing::Contains("NextJobs 32"));
-  EXPECT_THAT(Scripted("h").calls, testing::Not(testing::Contains("NextJobs 64")));
+  EXPECT_THAT(Scripted("h").calls, testing::Contains("NextJobs 16"));
+  EXPECT_THAT(Scripted("h").calls, testing::Not(testing::Contains("NextJobs 32")));
 }
 
 TEST_F(ContentLoopTest, WhatIsReadIsWrittenDownAndTheNextIsGivenOut) {

@@ -75,7 +75,7 @@ TEST_F(CommitBesideTest, TriesAreOnRecordBeforeTheirFilesAreGivenOut) {
     AddFile(row);
   }
   Settle();
-  ids = GiveOut(1);  // of four; the next ones are opened when two of these are left
+  ids = GiveOut(1);  // of four; the next ones are opened behind it
   ASSERT_THAT(ids, SizeIs(1));
   SideWorkTakesTime() = true;
   EXPECT_THAT(GiveOut(), SizeIs(3));

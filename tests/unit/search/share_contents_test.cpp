@@ -286,10 +286,10 @@ TEST_F(ShareContentsTest, AFileSystemThatIsTooSlowForABatchIsAskedForSmallerOnes
     AddFile(row);
   }
   Settle();
-  ASSERT_EQ(GiveOut(20).size(), 20U);
+  ASSERT_EQ(GiveOut(12).size(), 12U);
   ASSERT_EQ(Count("NextJobs 16"), 1U);
   FilesystemHangs() = true;
-  EXPECT_EQ(GiveOut().size(), 8U) << "those that were open before";
+  EXPECT_EQ(GiveOut().size(), 16U) << "those that were open before";
   ASSERT_EQ(Count("NextJobs 32"), 1U);
   Pass(seconds(10));
   ASSERT_EQ(Count("Close"), 1U);
