@@ -9,6 +9,12 @@ namespace {
 
 constexpr int32_t END_CODE = 0xe000;
 
+// Wanted: a break without width parts words of texts, but none of names: these rows keep no copy of
+// what was taken in, so that words cut otherwise would mean a new version of the whole database.
+bool IsDropped(CharacterClass type, int32_t code) {
+  return type == CharacterClass::MARK || code == BREAK_WITHOUT_WIDTH;
+}
+
 // Where what was added last came from.
 void Note(std::vector<uint32_t>* origins, const std::string& text, size_t origin) {
   if (origins != nullptr) {
@@ -57,7 +63,7 @@ std::string NameFolder::Fold(std::string_view name, bool apart, std::vector<uint
       last = joined != 0 ? joined : plain;
       last_at = text.size();
       AppendUtf8(static_cast<char32_t>(last), text);
-    } else if (entry.type != CharacterClass::MARK) {
+    } else if (!IsDropped(entry.type, character.code)) {
       last = 0;
       if (entry.type == CharacterClass::SEPARATOR || character.code == END_CODE) {
         text.append(character.code == END_CODE ? " " : name.substr(at, character.size));

@@ -23,7 +23,6 @@ constexpr int32_t VOWELS = 21;
 constexpr int32_t TAILS = 28;
 constexpr int32_t VOICED = 0x3099;
 constexpr int32_t HALF_VOICED = 0x309a;
-constexpr int32_t BREAK_WITHOUT_WIDTH = 0x200b;  // a format character, but one between words
 
 struct Range {
   int32_t first;

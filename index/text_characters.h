@@ -11,6 +11,8 @@
 
 namespace fileindexd {
 
+constexpr int32_t BREAK_WITHOUT_WIDTH = 0x200b;  // a format character, but one between words
+
 enum class CharacterClass : uint8_t {
   SEPARATOR,
   LETTER,  // small, or of a script without case; signs that belong to letters too
