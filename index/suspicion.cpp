@@ -5,10 +5,14 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <ctime>
 #include <exception>
 #include <filesystem>
+#include <map>
+#include <mutex>
+#include <utility>
 #include <vector>
 
 #include "base/scoped_fd.h"
@@ -20,7 +24,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr time_t WAKE_INTERVAL = 60;  // seconds, while a note lies there
+constexpr time_t WAKE_INTERVAL = 60;  // seconds
 
 std::string NotePath(const std::string& index_path) {
   return index_path + "/" + SUSPICION_NOTE;
@@ -47,6 +51,22 @@ bool LeaveNote(const std::string& index_path) {
   return note.fd >= 0 && futimens(note.fd, nullptr) == 0;
 }
 
+// Whether this process has told it not long ago. Who looks again whenever something happens to a
+// share would wake itself without end.
+bool WasJustTold(const std::string& share_name, IndexError error) {
+  using Clock = std::chrono::steady_clock;
+  static std::mutex mutex;
+  static std::map<std::pair<std::string, IndexError>, Clock::time_point> told;
+  const std::lock_guard<std::mutex> lock(mutex);
+  const Clock::time_point now = Clock::now();
+  const auto [last, is_first] = told.try_emplace({share_name, error}, now);
+  if (!is_first && now - last->second < std::chrono::seconds(WAKE_INTERVAL)) {
+    return true;
+  }
+  last->second = now;
+  return false;
+}
+
 // The words' tables can be damaged in pages that are sound.
 int CheckWords(sqlite3* db) {
   std::vector<std::string> tables;
@@ -69,9 +89,9 @@ void TellWriter(const std::string& share_name, IndexError error) {
     if (access(path.c_str(), F_OK) != 0) {
       return;  // the share was removed: nothing of it is made anew
     }
-    const bool wakes = error == IndexError::DAMAGED
-                           ? LeaveNote(path)
-                           : error == IndexError::IO || error == IndexError::PATH_NOT_FOUND;
+    const bool is_gone = error == IndexError::IO || error == IndexError::PATH_NOT_FOUND;
+    const bool wakes =
+        error == IndexError::DAMAGED ? LeaveNote(path) : is_gone && !WasJustTold(share_name, error);
     std::string ignored;  // whoever reads later tells again
     if (wakes) {
       (void)TouchQueue(share_name, ignored);

@@ -17,8 +17,8 @@ constexpr const char* SUSPICION_NOTE = "suspected";  // a file in the database's
 
 // Called with what a read of the share's entries ended with. Of damage it leaves a note. Then,
 // where the disk failed, which may be a log that was taken away, and where there is no database, it
-// wakes the share's Worker, which opens the database anew; of damage once a minute at most, until
-// that was done.
+// wakes the share's Worker, which opens the database anew: once a minute at most, of damage until
+// that was done, and of all else from this process. By any thread.
 void TellWriter(const std::string& share_name, IndexError error);
 
 // The same of contents, of damage alone: the content service watches for the note.

@@ -21,9 +21,16 @@ class SuspicionTest : public IndexTest {
     note = IndexPath("s") + "/" + SUSPICION_NOTE;
   }
 
-  bool Wakes(IndexError error) {
-    TellWriter("s", error);
-    return remove(QueuePath("s").c_str()) == 0;
+  static bool Wakes(IndexError error, const std::string& share = "s") {
+    TellWriter(share, error);
+    return remove(QueuePath(share).c_str()) == 0;
+  }
+  // The name of a share of which nothing was told in this process.
+  static std::string FreshShare() {
+    static int shares = 0;
+    std::string name = "fresh" + std::to_string(++shares);
+    std::filesystem::create_directories(IndexPath(name));
+    return name;
   }
   bool HasNote() const { return access(note.c_str(), F_OK) == 0; }
   void SetNoteBack(time_t seconds) {
@@ -53,9 +60,20 @@ TEST_F(SuspicionTest, ANoteFromTheFutureHoldsNothingBack) {
 }
 
 TEST_F(SuspicionTest, AFailedDiskAndAMissingDatabaseWakeWithoutANote) {
+  const std::string share = FreshShare();
   for (const IndexError error : {IndexError::IO, IndexError::PATH_NOT_FOUND}) {
-    EXPECT_TRUE(Wakes(error));
-    EXPECT_FALSE(HasNote());
+    EXPECT_TRUE(Wakes(error, share));
+    EXPECT_TRUE(std::filesystem::is_empty(IndexPath(share)));
+  }
+}
+
+// Who looks again whenever something happens to a share would otherwise wake itself without end.
+TEST_F(SuspicionTest, WhatWasJustToldOfAShareWakesNobodyAgain) {
+  for (const IndexError error : {IndexError::IO, IndexError::PATH_NOT_FOUND}) {
+    const std::string share = FreshShare();
+    EXPECT_TRUE(Wakes(error, share));
+    EXPECT_FALSE(Wakes(error, share));
+    EXPECT_TRUE(Wakes(error, FreshShare()));
   }
 }
 
