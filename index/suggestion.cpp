@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <functional>
 #include <map>
+#include <set>
 #include <utility>
 #include <vector>
 
@@ -18,7 +19,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int64_t MOST_TERMS = 200'000;  // that are looked at for one word in one vocabulary
+constexpr int64_t MOST_TERMS = 200'000;  // that are read at once, of those that begin alike
 constexpr size_t SHORTEST = 3;           // letters of a word for which another is looked for
 constexpr size_t MOST_SLIPS = 10;        // in one question: each costs a look through vocabularies
 constexpr size_t LONG = 6;               // letters of a word in which two slips are likely
@@ -118,33 +119,33 @@ class Vocabulary {
     int code = sqlite3_exec(db, make.c_str(), nullptr, nullptr, nullptr);
     (void)sqlite3_exec(db, "PRAGMA query_only = 1", nullptr, nullptr, nullptr);
     const std::string read = "SELECT term, doc, cnt" + std::string(column.empty() ? "" : ", col") +
-                             " FROM temp." + name + " WHERE term >= ?1 AND term <= ?2 LIMIT " +
-                             std::to_string(MOST_TERMS);
+                             " FROM temp." + name + " WHERE term >= ?1 AND term <= ?2";
     code = code == SQLITE_OK ? terms.Prepare(db, read.c_str()) : code;
     return code;
   }
 
-  // `stems`: that stand beside the words.
-  void Look(const std::string& word, Stems& stems, NearestWords& nearest) {
+  // `language`: whose stems stand beside the words.
+  void Look(const std::string& word, const std::string& language, NearestWords& nearest) {
     std::vector<Near> found;
     const size_t letters = CharacterStarts(word).size() - 1;
     const int most = letters >= LONG ? 2 : 1;
-    for (const std::string& beginning : Beginnings(word)) {
-      ForEach(beginning, [&](const Term& term) {
-        const int distance = EditDistance(word, term.text, most);
-        if (distance > 0 && distance <= most) {
-          found.push_back({{distance, term.text.size() < word.size()}, term});
-        }
-      });
-    }
+    ForEach(Beginnings(word), [&](const Term& term) {
+      const int distance = EditDistance(word, term.text, most);
+      if (distance > 0 && distance <= most) {
+        found.push_back({{distance, term.text.size() < word.size()}, term});
+      }
+    });
     std::stable_sort(found.begin(), found.end(), [](const Near& one, const Near& other) {
       return one.nearness < other.nearness;
     });
+    const FormsByStem forms = FormsOf(word, found, language);
     for (const auto& [nearness, term] : found) {
       if (!nearest.Takes(nearness.first, nearness.second)) {
         break;
       }
-      const Term written = Written(word, term, stems);
+      const auto of_term = forms.find(term.text);
+      const bool is_word = of_term == forms.end() || of_term->second.times < term.times;
+      const Term& written = is_word ? term : of_term->second.best;
       if (!written.text.empty()) {
         nearest.Add(nearness.first, nearness.second, written.documents, written.text);
       }
@@ -161,40 +162,68 @@ class Vocabulary {
     std::pair<int, bool> nearness;
     Term term;
   };
+  // What stands under one stem: how often, and of what the slips leave half the most frequent.
+  struct Forms {
+    int64_t times = 0;
+    Term best;
+  };
+  using FormsByStem = std::map<std::string, Forms, std::less<>>;
 
-  void ForEach(const std::string& beginning, const std::function<void(const Term&)>& visit) {
-    const std::string end = BehindAll(beginning);
-    terms.BindText(1, beginning);
-    terms.BindText(2, end);
-    while (terms.Step() == SQLITE_ROW) {
-      if (column.empty() || terms.Bytes(3) == column) {
-        visit({terms.Bytes(0), terms.Int(1), terms.Int(2)});
+  // What begins with one of them; none begins with another.
+  void ForEach(const std::vector<std::string>& beginnings,
+               const std::function<void(const Term&)>& visit) {
+    int64_t left = MOST_TERMS;
+    for (const std::string& beginning : beginnings) {
+      const std::string end = BehindAll(beginning);
+      terms.BindText(1, beginning);
+      terms.BindText(2, end);
+      for (; left > 0 && terms.Step() == SQLITE_ROW; --left) {
+        if (column.empty() || terms.Bytes(3) == column) {
+          visit({terms.Bytes(0), terms.Int(1), terms.Int(2)});
+        }
       }
+      terms.Reset();
     }
-    terms.Reset();
   }
 
-  // The term, or where it never stands but as the stem of others the most frequent of these, of
-  // which the slips of `word` must leave half. Empty: none. At most the last letter of a stem is
-  // none of its words'.
-  Term Written(const std::string& word, const Term& term, Stems& stems) {
-    const std::vector<size_t> starts = CharacterStarts(term.text);
-    if (starts.size() <= SHORTEST) {
-      return term;
+  // Of those that were found, as what never stands but as the stem of others is no word. At most
+  // the last letter of a stem is none of its words'.
+  FormsByStem FormsOf(const std::string& word, const std::vector<Near>& found,
+                      const std::string& language) {
+    FormsByStem forms;
+    std::set<std::string> beginnings;
+    for (const Near& near : found) {
+      const std::string& text = near.term.text;
+      const std::vector<size_t> starts = CharacterStarts(text);
+      if (language != NO_LANGUAGE && starts.size() > SHORTEST) {
+        forms.try_emplace(text);
+        beginnings.insert(text.substr(0, starts[starts.size() - 2]));
+      }
     }
-    Term best;
-    int64_t as_stem = 0;
-    ForEach(term.text.substr(0, starts[starts.size() - 2]), [&](const Term& form) {
-      if (form.text == term.text || stems.Of(form.text) != term.text) {
+    if (forms.empty()) {
+      return forms;
+    }
+
+    std::vector<std::string> apart;
+    for (const std::string& beginning : beginnings) {
+      if (apart.empty() || !beginning.starts_with(apart.back())) {
+        apart.push_back(beginning);
+      }
+    }
+    Stems stems(language);
+    ForEach(apart, [&](const Term& form) {
+      const auto of_stem = forms.find(stems.Of(form.text));
+      if (of_stem == forms.end() || of_stem->first == form.text) {
         return;
       }
-      as_stem += form.times;
+      Forms& others = of_stem->second;
+      others.times += form.times;
       const int most = static_cast<int>(CharacterStarts(form.text).size() - 1) / 2;
-      if (form.documents > best.documents && EditDistance(word, form.text, most) <= most) {
-        best = form;
+      if (form.documents > others.best.documents && EditDistance(word, form.text, most) <= most) {
+        others.best = form;
       }
     });
-    return as_stem < term.times ? term : best;
+    return forms;
   }
 
   std::string column;
@@ -260,12 +289,10 @@ class WordSearch {
     Vocabulary names;
     Vocabulary texts;
     if (IsInNames() && names.Open(db, "main", "names", "") == SQLITE_OK) {
-      Stems none(NO_LANGUAGE);
-      names.Look(word, none, nearest);
+      names.Look(word, NO_LANGUAGE, nearest);
     }
     if (IsInContents() && texts.Open(db, "contents", "words", Column()) == SQLITE_OK) {
-      Stems stems(LanguageOfWords(share.words.language));
-      texts.Look(word, stems, nearest);
+      texts.Look(word, LanguageOfWords(share.words.language), nearest);
     }
   }
 
