@@ -3,9 +3,11 @@
 
 #include <algorithm>
 #include <array>
+#include <compare>
 #include <cstdlib>
 #include <functional>
 #include <map>
+#include <optional>
 #include <set>
 #include <utility>
 #include <vector>
@@ -34,54 +36,34 @@ std::vector<int32_t> Codes(const std::string& text) {
   return codes;
 }
 
-// The words of vocabularies that are nearest to one, and rather none shorter than it, as stems are.
-class NearestWords {
+// The word of vocabularies that is nearest to one, and rather not shorter than it, as stems are. Of
+// those as near the most frequent, and of these the first.
+class NearestWord {
  public:
-  // Whether a word as near as that would stay.
+  // Whether a word as near as that may be it.
   bool Takes(int distance, bool is_shorter) const {
-    return words.empty() || std::pair(distance, is_shorter) <= nearest;
+    return !best.has_value() ||
+           std::pair(distance, is_shorter) <= std::pair(best->distance, best->is_shorter);
   }
 
   void Add(int distance, bool is_shorter, int64_t frequency, std::string word) {
-    const std::pair<int, bool> nearness = {distance, is_shorter};
-    if (!Takes(distance, is_shorter)) {
-      return;
+    Word added = {distance, is_shorter, -frequency, std::move(word)};
+    if (!best.has_value() || added < *best) {
+      best = std::move(added);
     }
-    if (words.empty() || nearness < nearest) {
-      words.clear();
-      nearest = nearness;
-    }
-    words.push_back({frequency, std::move(word)});
   }
 
-  // The most frequent, and of those the first; empty: there is none. Stems, which stand in for many
-  // words and are none themselves, go behind what goes on from them.
-  std::string Best() {
-    // What goes on from a word stands right behind it then.
-    std::sort(words.begin(), words.end(),
-              [](const Word& one, const Word& other) { return one.text < other.text; });
-    const Word* best = nullptr;
-    const Word* next = nullptr;  // the first behind that is another
-    for (size_t i = words.size(); i-- > 0;) {
-      const Word& word = words[i];
-      if (i + 1 < words.size() && words[i + 1].text != word.text) {
-        next = &words[i + 1];
-      }
-      const bool is_stem = next != nullptr && next->text.starts_with(word.text);
-      if (!is_stem && (best == nullptr || word.frequency >= best->frequency)) {
-        best = &word;
-      }
-    }
-    return best == nullptr ? "" : best->text;
-  }
+  std::string Text() const { return best.has_value() ? best->text : ""; }  // empty: there is none
 
  private:
   struct Word {
-    int64_t frequency = 0;
+    int distance = 0;
+    bool is_shorter = false;
+    int64_t rarity = 0;
     std::string text;
+    auto operator<=>(const Word&) const = default;
   };
-  std::pair<int, bool> nearest;
-  std::vector<Word> words;
+  std::optional<Word> best;
 };
 
 // Words with the first letter of the asked one: slips happen there rarely, and the others would
@@ -125,7 +107,7 @@ class Vocabulary {
   }
 
   // `language`: whose stems stand beside the words.
-  void Look(const std::string& word, const std::string& language, NearestWords& nearest) {
+  void Look(const std::string& word, const std::string& language, NearestWord& nearest) {
     std::vector<Near> found;
     const size_t letters = CharacterStarts(word).size() - 1;
     const int most = letters >= LONG ? 2 : 1;
@@ -285,7 +267,7 @@ class WordSearch {
                      TextQueryOf(alone)));
   }
 
-  void Look(const std::string& word, NearestWords& nearest) const {
+  void Look(const std::string& word, NearestWord& nearest) const {
     Vocabulary names;
     Vocabulary texts;
     if (IsInNames() && names.Open(db, "main", "names", "") == SQLITE_OK) {
@@ -313,13 +295,13 @@ class WordSearch {
 // The nearest word to one that no share knows; empty: there is none.
 std::string NearestTo(const std::string& word, const QueryNode& leaf,
                       std::deque<AskedShare>& shares) {
-  NearestWords nearest;
+  NearestWord nearest;
   for (AskedShare& share : shares) {
     if (share.run != nullptr) {
       WordSearch(share, leaf).Look(word, nearest);
     }
   }
-  return nearest.Best();
+  return nearest.Text();
 }
 
 bool AnyKnows(const std::string& word, const QueryNode& leaf, std::deque<AskedShare>& shares) {

@@ -103,18 +103,24 @@ TEST_F(QuerySuggestionTest, WordsThatStandElsewhereAreNotSuggested) {
   }
 }
 
-// Of words as near as each other the most frequent one, and of those as frequent the first.
-TEST_F(QuerySuggestionTest, WhatOthersGoOnFromIsNotSuggestedHoweverOftenItStands) {
-  Store({{"abcdefgoz.txt", TextContent("abcdefgoz abcdefgozh")},
-         {"a abcdefgoz.txt", TextContent("abcdefgoz abcdefguz")},
-         {"b abcdefgoz.txt", TextContent("abcdefgoz abcdefgoq abcdefgoqh")}});
-  EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgoqh");
-  EXPECT_EQ(Suggested("abcdefgh"), "abcdefgoqh");
-  EXPECT_EQ(Suggested("name:abcdefgh"), "name:abcdefgoz");
+TEST_F(QuerySuggestionTest, OfWordsAsNearAsEachOtherTheMostFrequentIsSuggestedThenTheFirst) {
+  Store({{"a.txt", TextContent("abcdefgoz abcdefgozh")},
+         {"b abcdefgoz.txt", TextContent("abcdefgoz abcdefguz")},
+         {"c abcdefgoa.txt", TextContent("abcdefgoqh")}});
+  EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgoz");
+  EXPECT_EQ(Suggested("name:abcdefgh"), "name:abcdefgoa");
 
-  Store({{"c.txt", TextContent("abcdefgozh")}});
-  EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgozh");
-  EXPECT_EQ(Suggested("abcdefgh"), "abcdefgozh");
+  Store({{"d.txt", TextContent("abcdefgozh abcdefgoqh")},
+         {"e.txt", TextContent("abcdefgozh abcdefgoqh")}});
+  EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgoqh");
+}
+
+// Here the stem is a word too, and the more frequent one.
+TEST_F(QuerySuggestionTest, WordsThatOthersGoOnFromAreSuggestedWhereTheyAreTheMostFrequent) {
+  Store({{"a.txt", TextContent("The carp is old")},
+         {"b.txt", TextContent("A carp, a pike")},
+         {"c.txt", TextContent("Two carps")}});
+  EXPECT_EQ(Suggested("text:cars"), "text:carp");
 }
 
 // Each costs a look through the vocabularies.
