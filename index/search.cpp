@@ -218,8 +218,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
         QueryError{"the shares that are asked know no such folder", folder->start}.Line(asked.text);
     return false;
   }
-  const bool suggests =
-      made.total == 0 && question.suggests && (question.limit > 0 || question.count_all);
+  const bool suggests = made.knows_under && made.total == 0 && question.suggests &&
+                        (question.limit > 0 || question.count_all);
   std::string suggestion = suggests ? Suggest(asked, shares, names) : "";
   for (AskedShare& share : shares) {
     share.Release();

@@ -80,8 +80,9 @@ TEST_F(QueryPlacesTest, FoldersThatNoShareKnowsAreRefused) {
   EXPECT_EQ(Hits("whale -under:/no/such"), Names({"whale.txt"}));
   EXPECT_EQ(Hits("whale OR under:/no/such"), Names({"whale.txt"}));
   question.under = "/no/such";
-  EXPECT_EQ(Hits("whale"), Names()) << "an option is its caller's matter";
+  EXPECT_EQ(Hits("whale type:doc"), Names()) << "an option is its caller's matter";
   EXPECT_FALSE(answer.knows_under);
+  EXPECT_EQ(answer.word_like_field, "") << "other words would find nothing either";
   for (const std::string& known : {root, folder}) {
     question.under = known;
     EXPECT_EQ(Hits("none"), Names());
