@@ -253,6 +253,9 @@ int Waiter::TooLate() {
 
 int AwaitChanges(Session& session, const std::vector<std::string>& shares,
                  std::chrono::seconds patience) {
+  if (shares.empty()) {
+    return EXIT_DONE;  // the service would take none for all
+  }
   const Progress progress("Waiting for the index …");
   Waiter waiter(session, patience);
   int code = waiter.AskService(shares);

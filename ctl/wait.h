@@ -11,9 +11,9 @@
 namespace fileindexd {
 
 // Until all that had happened before to the files of these shares is in the index, names and
-// attributes. Returns EXIT_DONE, or the exit code with its line written: EXIT_FAILED after
-// `patience`, or when the notification service is of no help; EXIT_NO_DAEMON when there is work for
-// the daemon and it does not run.
+// attributes; of no share, at once. Returns EXIT_DONE, or the exit code with its line written:
+// EXIT_FAILED after `patience`, or when the notification service is of no help; EXIT_NO_DAEMON when
+// there is work for the daemon and it does not run.
 int AwaitChanges(Session& session, const std::vector<std::string>& shares,
                  std::chrono::seconds patience);
 

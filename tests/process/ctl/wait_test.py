@@ -140,8 +140,9 @@ class WaitTest(IndexTest):
             self.await_drained(share)
         with self.service() as service:
             for words in ("share:beta nothing", f"nothing under:{namespace.DATA}/beta",
-                          "nothing -share:alpha"):
+                          "nothing -share:alpha", "nothing share:alpha share:beta"):
                 self.ctl("search", "--wait", words)
+            self.finish(self.begin("--share", "alpha", "--under", f"{namespace.DATA}/beta", "x"))
 
         self.assertEqual([request["shares"] for request in service.requests], [["beta"]] * 3)
 
