@@ -7,6 +7,7 @@
 #include "base/utf8.h"
 #include "index/contents_schema.h"
 #include "index/name_marker.h"
+#include "index/query_reach.h"
 #include "index/search.h"
 #include "index/text_tokenizer.h"
 #include "state/layout.h"
@@ -134,6 +135,7 @@ bool Asked::Read(const Question& question, NameMarker& names, std::string& error
   }
   AddOptions(question, text.size(), tree);
   ReadLeaves(tree, true, names.tokenizer, names.folder, *this);
+  shares = ReachedShares(tree, question);
   return true;
 }
 

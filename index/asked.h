@@ -38,8 +38,9 @@ class Asked {
 
   std::string text;  // valid UTF-8
   QueryNode tree;
-  std::vector<WordLeaf> leaves;  // WORD, NAME_PATTERN and EXACT_NAME, in order
-  bool needs_contents = false;   // some part asks for more than names and attributes
+  std::vector<WordLeaf> leaves;     // WORD, NAME_PATTERN and EXACT_NAME, in order
+  bool needs_contents = false;      // some part asks for more than names and attributes
+  std::vector<std::string> shares;  // of the question, but those that the tree rules out; in order
 };
 
 // The column of the contents' table that a text field stands in.

@@ -11,7 +11,6 @@
 #include "index/asked.h"
 #include "index/asked_share.h"
 #include "index/entry_table.h"
-#include "index/query_reach.h"
 #include "index/side_by_side.h"
 #include "index/suggestion.h"
 #include "state/layout.h"
@@ -197,7 +196,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   const uint64_t limit = std::min(question.limit, MOST_HITS);
   const uint64_t wanted = limit == 0 ? 0 : offset + limit;
   const HitOrder order = {question.sort, question.reverse};
-  Choose(ReachedShares(asked.tree, question));
+  Choose(asked.shares);
   // A slow share holds up no other.
   side_by_side.Run(shares.size(), [&](size_t i) { shares[i].Ask(question, asked, order, wanted); });
 
@@ -239,7 +238,7 @@ bool Understand(const Question& question, std::vector<std::string>& reached, std
   if (!ReadQuestion(question, names, asked, error)) {
     return false;
   }
-  reached = ReachedShares(asked.tree, question);
+  reached = std::move(asked.shares);
   return true;
 }
 

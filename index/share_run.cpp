@@ -73,7 +73,7 @@ int ShareRun::Run(BestHits& best, uint64_t& total) {
 }
 
 size_t ShareRun::BlockSize(const IdSet& candidates, const Sizes& sizes) const {
-  const size_t shares = std::max<size_t>(1, question.shares.size());
+  const size_t shares = std::max<size_t>(1, asked.shares.size());
   const size_t few = std::max(sizes.few / shares, 2 * sizes.least);
   return candidates.Count() <= few ? few : std::max(sizes.block / shares, sizes.least);
 }

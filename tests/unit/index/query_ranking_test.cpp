@@ -47,6 +47,21 @@ class QueryManyTextsTest : public QuestionTest {
     }
   }
 
+  // The numbers of FILES follow no order of their ages, i * 101 % FILES.
+  void StoreManyOfAllAges() {
+    constexpr time_t DAY = 86400;
+    const time_t now = time(nullptr);
+    for (int i = 0; i < FILES; ++i) {
+      OldFile("f" + std::to_string(i), now - (i * 101 % FILES) * 10 * DAY);
+    }
+    TakeIn();
+    Jobs(FILES);
+    for (const auto& [name, job] : handed) {
+      EXPECT_TRUE(contents->Finish(job.file, TextContent("one walrus")));
+    }
+    EXPECT_TRUE(contents->Commit());
+  }
+
   // Pages that a question reads, of both databases.
   int64_t PagesRead(const std::string& text) {
     question.text = text;
@@ -64,6 +79,8 @@ class QueryManyTextsTest : public QuestionTest {
                             0);
     return read;
   }
+
+  static constexpr int FILES = 350;
 };
 
 TEST_F(QueryManyTextsTest, BeginningsAreNotPutTogetherForEachHit) {
@@ -97,24 +114,21 @@ TEST_F(QueryManyTextsTest, TitlesStandAboveWhatIsSaidOftenHoweverManySayIt) {
 }
 
 TEST_F(QueryManyTextsTest, TheYoungestOfManyThatSayTheSameComeFirst) {
-  constexpr time_t DAY = 86400;
-  constexpr int FILES = 350;
-  const time_t now = time(nullptr);
-  for (int i = 0; i < FILES; ++i) {
-    OldFile("f" + std::to_string(i), now - (i * 101 % FILES) * 10 * DAY);
-  }
-  TakeIn();
-  Jobs(FILES);
-  for (const auto& [name, job] : handed) {
-    EXPECT_TRUE(contents->Finish(job.file, TextContent("one walrus")));
-  }
-  EXPECT_TRUE(contents->Commit());
-
+  StoreManyOfAllAges();
   const Names hits = Hits("walrus");
   ASSERT_EQ(hits.size(), 20U);
   for (int i = 0; i < 20; ++i) {
     EXPECT_EQ(std::stoi(hits[static_cast<size_t>(i)].substr(1)) * 101 % FILES, i);
   }
+}
+
+TEST_F(QueryManyTextsTest, SharesThatAreRuledOutChangeNoHits) {
+  StoreManyOfAllAges();
+  question.shares = {"s"};
+  const Names alone = Paths("walrus");
+  question.shares = {"s", "a", "b", "c", "d", "e", "f", "g", "h", "i"};
+
+  EXPECT_EQ(Paths("walrus share:s"), alone);
 }
 
 TEST_F(QueryManyTextsTest, RareWordsCountMoreThanCommonOnesHoweverManyHoldThose) {
