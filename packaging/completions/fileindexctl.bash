@@ -61,22 +61,41 @@ _fileindexctl_shares() {
   [[ -e ${FILEINDEXD_STATE_DIR:-/var/lib/fileindexd}/state.db ]] && "$1" share list 2>/dev/null
 }
 
+# Fills `plain` with the word `$1` as it is without quotes and backslashes.
+_fileindexctl_unquote() {
+  local rest=${1#\"}
+  plain=''
+  if [[ $rest == \'* ]]; then
+    plain=${rest#\'}
+    return
+  fi
+  while [[ $rest == *\\* ]]; do
+    plain+=${rest%%\\*}
+    rest=${rest#*\\}
+    plain+=${rest:0:1}
+    rest=${rest:1}
+  done
+  plain+=$rest
+}
+
 # Paths that begin with the word `$2`, each ended with NUL, as lines may end within them. `$1`:
 # "@folder" for folders alone.
 _fileindexctl_paths() (
-  plain=${2//\\/}
-  plain=${plain#[\"\']}
+  _fileindexctl_unquote "$2"
+  user=''
   home=''
-  if [[ $plain == \~/* ]]; then
-    home=$HOME/
-    plain=$home${plain#\~/}
+  if [[ $2 =~ ^~[A-Za-z0-9._-]*/ ]]; then
+    user=${BASH_REMATCH[0]}
+    eval "home=$user"  # of a user that there is not, it stays
+    plain=$home${plain#"$user"}
   fi
   GLOBIGNORE=''
   set +f
+  shopt -u failglob
   shopt -s nullglob dotglob
   for path in "$plain"*; do
     [[ $1 == @folder && ! -d $path ]] && continue
-    [[ -n $home ]] && path='~'/${path#"$home"}
+    [[ -n $user ]] && path=$user${path#"$home"}
     printf '%s\0' "$path"
   done
 )
@@ -87,8 +106,7 @@ _fileindexctl_reply() {
   case $1 in
     '' | -) ;;
     @share)
-      plain=${2//\\/}
-      plain=${plain#[\"\']}
+      _fileindexctl_unquote "$2"
       while IFS=$'\t' read -r name _; do
         [[ $name == "$plain"* ]] || continue
         [[ $2 == [\"\']* ]] || printf -v name '%q' "$name"

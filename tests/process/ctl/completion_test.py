@@ -3,6 +3,7 @@
 
 import os
 import pty
+import pwd
 import re
 import select
 import shlex
@@ -81,9 +82,10 @@ class BashTest(CompletionTest):
         """As the shell parts a word that is not in quotes."""
         return [word] if word[:1] in ("", "'") else re.findall(r"[:=]+|[^:=]+", word)
 
-    def offered(self, *words, **more):
+    def offered(self, *words, setup="", **more):
         """What the function leaves in COMPREPLY, sorted."""
         script = (
+            f'{setup}\n'
             'source "$0"; program=$1; COMP_LINE="$program $2"; shift 2; '
             'COMP_WORDS=("$program" "$@"); COMP_CWORD=$#; '
             '_fileindexctl "$program" "${@: -1}" "${COMP_WORDS[COMP_CWORD-1]}"; '
@@ -154,6 +156,28 @@ class BashTest(CompletionTest):
                          [f"{self.root}/two\nfolders", f"{self.root}/two\nlines"])
         self.assertEqual(self.offered("folder", "add", f"{self.root}/tw"),
                          [f"{self.root}/two\nfolders"])
+
+    def test_paths_in_home_folders(self):
+        self.make_files(self.root, "two")
+        home = pwd.getpwnam("daemon").pw_dir
+        theirs = sorted(f"~daemon/{name}" for name in os.listdir(home) if name.startswith("a"))
+        self.assertTrue(theirs)
+
+        self.assertEqual(self.offered("info", "~/tw", HOME=self.root), ["~/two"])
+        self.assertEqual(self.offered("info", "~daemon/a"), theirs)
+        self.assertEqual(self.offered("info", "~nobody-there/"), [])
+
+    def test_names_with_backslashes(self):
+        self.make_files(self.root, "a\\b", "ab")
+
+        wanted = [f"{self.root}/a\\b"]
+        self.assertEqual(self.offered("info", f"{self.root}/a\\\\"), wanted)
+        self.assertEqual(self.offered("info", f"'{self.root}/a\\"), wanted)
+
+    def test_nothing_is_said_where_what_matches_nothing_is_an_error(self):
+        for words in (("info", f"{self.root}/none"), ("nope",), ("dump", "none")):
+            with self.subTest(words=words):
+                self.assertEqual(self.offered(*words, setup="shopt -s failglob"), [])
 
     def test_no_option_stands_behind_two_dashes(self):
         self.assertEqual(self.offered("search", "--", "-"), [])
