@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// Names that a question knows, in which capital letters do not count. The locale has no say.
+// Names and endings in which capital letters of ASCII do not count. The locale has no say.
 #pragma once
 
 #include <algorithm>

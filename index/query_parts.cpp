@@ -139,8 +139,7 @@ bool FillNear(const Value& value, QueryNode& node, QueryError& error) {
 bool FillKind(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::KIND;
   for (std::string& name : SplitAt(value.text, ',')) {
-    std::transform(name.begin(), name.end(), name.begin(),
-                   [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c; });
+    std::transform(name.begin(), name.end(), name.begin(), SmallLetter);
     const std::optional<Kind> kind = KindFromText(name);
     if (!kind.has_value()) {
       return Fail(error,
