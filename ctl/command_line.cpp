@@ -12,12 +12,13 @@ namespace fileindexd {
 
 namespace {
 
-const CLI::App& Innermost(const CLI::App& app) {
-  const CLI::App* inner = &app;
-  while (!inner->get_subcommands().empty()) {
-    inner = inner->get_subcommands().front();
+// The program and the commands that were recognised behind it.
+std::vector<const CLI::App*> Recognised(const CLI::App& app) {
+  std::vector<const CLI::App*> found = {&app};
+  while (!found.back()->get_subcommands().empty()) {
+    found.push_back(found.back()->get_subcommands().front());
   }
-  return *inner;
+  return found;
 }
 
 // Of "--share=" the library takes the next argument, whatever it is, and of "--count=0" a number.
@@ -43,11 +44,11 @@ void CheckAssigned(const CLI::App& command, const std::vector<std::string>& line
 
 // What is wrong, with the commands that were recognised in front: "folder add: PATH is required".
 std::string Complaint(const CLI::App& app, const CLI::Error& error) {
+  const std::vector<const CLI::App*> commands = Recognised(app);
+  const CLI::App* inner = commands.back();
   std::string name;
-  const CLI::App* inner = &app;
-  while (!inner->get_subcommands().empty()) {
-    inner = inner->get_subcommands().front();
-    name += inner->get_name() + " ";
+  for (size_t i = 1; i < commands.size(); ++i) {
+    name += commands[i]->get_name() + " ";
   }
   if (!name.empty()) {
     name.back() = ':';
@@ -107,7 +108,7 @@ Command ParseCommandLine(const std::vector<std::string>& given, Arguments& argum
   try {
     std::vector<std::string> backwards(line.rbegin(), line.rend());  // as parse() takes them
     app.parse(backwards);
-    CheckAssigned(Innermost(app), line);
+    CheckAssigned(*Recognised(app).back(), line);
   } catch (const CLI::CallForHelp& help) {
     std::ostringstream text;
     (void)app.exit(help, text, text);
