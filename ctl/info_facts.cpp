@@ -130,6 +130,7 @@ void AskIndex(const Settings& settings, PathFacts& facts) {
   });
   uint64_t entries = 0;
   if (!read || !reader.Count(entries)) {
+    TellWriter(facts.share->name, reader.read_error);
     facts.index_read = false;
     facts.index_problem = "the index cannot be read";
     return;

@@ -40,6 +40,7 @@ void ReadIndex(ShareReport& report) {
   }
 
   if (!reader.Summarise(report.index)) {
+    TellWriter(report.share.name, reader.read_error);
     report.index_problem = "cannot be read";
   }
 }

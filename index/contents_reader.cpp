@@ -107,8 +107,15 @@ IndexError ContentsReader::Open(const std::string& share_name) {
 }
 
 IndexError ContentsReader::Failed(int code) {
-  TellContentsWriter(share, FromSqlite(code));
-  return FromSqlite(code);
+  const IndexError error = FromSqlite(code);
+  TellWriter(share, error);
+  TellContentsWriter(share, error);
+  return error;
+}
+
+bool ContentsReader::Refuse() {
+  (void)Failed(sqlite3_errcode(entries.db));
+  return false;
 }
 
 bool ContentsReader::Count(ContentCounts& counts) {
@@ -118,7 +125,7 @@ bool ContentsReader::Count(ContentCounts& counts) {
       rate.Prepare(entries.db,
                    "SELECT ifnull(sum(done), 0) FROM contents.rate WHERE second > ?1") !=
           SQLITE_OK) {
-    return false;
+    return Refuse();
   }
 
   ContentCounts read;
@@ -135,9 +142,12 @@ bool ContentsReader::Count(ContentCounts& counts) {
       counted->failed += static_cast<uint64_t>(by_kind.Int(3));
     }
   }
-  rate.BindInt(1, static_cast<int64_t>(time(nullptr)) - 60);
-  if (code != SQLITE_DONE || rate.Step() != SQLITE_ROW) {
-    return false;
+  if (code == SQLITE_DONE) {
+    rate.BindInt(1, static_cast<int64_t>(time(nullptr)) - 60);
+    code = rate.Step();
+  }
+  if (code != SQLITE_ROW) {
+    return Refuse();
   }
   read.done_last_minute = static_cast<uint64_t>(rate.Int(0));
   counts = read;
@@ -156,7 +166,7 @@ bool ContentsReader::FindWordsProgress(const std::string& share_language,
                     "SELECT count(*) FROM contents.files WHERE text <> 0 AND text <= ?1") !=
           SQLITE_OK ||
       words.Step() != SQLITE_ROW) {
-    return false;
+    return Refuse();
   }
   WordsProgress found;
   found.language = words.Bytes(0);
@@ -179,7 +189,7 @@ bool ContentsReader::FindWordsProgress(const std::string& share_language,
   };
   if (!count(has_begun ? words.Int(2) : ALL_WORDS, found.total) ||
       (counts && !count(words.Int(1), found.done))) {
-    return false;
+    return Refuse();
   }
   if (found.total > 0) {
     progress = found;
@@ -194,7 +204,7 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
                      " FROM contents.files AS files CROSS JOIN entries"
                      " ON " FILEINDEX_WANTED_FILE
                      " WHERE files.state >= 2 GROUP BY files.id") != SQLITE_OK) {
-    return false;
+    return Refuse();
   }
   int code = failed.Step();
   for (; code == SQLITE_ROW; code = failed.Step()) {
@@ -216,7 +226,7 @@ IndexError ContentsReader::Find(const Entry& entry, StoredContent& stored) {
   }
   if (code == SQLITE_ROW) {
     if (!ReadContent(row, found.content)) {
-      return IndexError::DAMAGED;
+      return Failed(SQLITE_CORRUPT);
     }
     found.state = StateText(static_cast<ContentState>(row.Int(0)));
     found.reason = row.Bytes(1);

@@ -72,7 +72,9 @@ class ContentsReader {
   IndexDatabase entries;  // with the contents attached as "contents"
 
  private:
+  // Tells who writes the contents, and who writes the entries, which are read beside them.
   IndexError Failed(int code);
+  bool Refuse();  // the same of SQLite's last error; false
 
   std::string share;
 };

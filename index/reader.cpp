@@ -59,6 +59,11 @@ IndexError EntryReader::OpenOnceMade(const std::string& share_name) {
   return error;
 }
 
+bool EntryReader::Ends(bool is_read) {
+  read_error = is_read ? IndexError::NONE : FromSqlite(sqlite3_errcode(database.db));
+  return is_read;
+}
+
 bool EntryReader::Summarise(Summary& summary) {
   // Counting what is wanted reads its own small index alone.
   Statement statement;
@@ -68,23 +73,23 @@ bool EntryReader::Summarise(Summary& summary) {
           " (SELECT count(*) FROM entries WHERE content_wanted <> 0 AND content_wanted = 1)"
           " FROM meta WHERE id = 1") != SQLITE_OK ||
       statement.Step() != SQLITE_ROW) {
-    return false;
+    return Ends(false);
   }
 
   summary.entries = static_cast<uint64_t>(statement.Int(0));
   summary.last_commit = statement.Int(1);
   summary.wanted = static_cast<uint64_t>(statement.Int(2));
-  return true;
+  return Ends(true);
 }
 
 bool EntryReader::Count(uint64_t& entries) {
   Statement statement;
   if (statement.Prepare(database.db, "SELECT entries FROM meta WHERE id = 1") != SQLITE_OK ||
       statement.Step() != SQLITE_ROW) {
-    return false;
+    return Ends(false);
   }
   entries = static_cast<uint64_t>(statement.Int(0));
-  return true;
+  return Ends(true);
 }
 
 bool EntryReader::ForEach(const std::string& under,
@@ -98,16 +103,14 @@ bool EntryReader::ForEach(const std::string& under,
       below.Prepare(database.db,
                     "SELECT " FILEINDEX_ENTRY_COLUMNS
                     " FROM entries WHERE path > ?2 AND path < ?3 ORDER BY path") != SQLITE_OK) {
-    read_error = FromSqlite(sqlite3_errcode(database.db));
-    return false;
+    return Ends(false);
   }
 
   const PathRange range(under);
   at.BindBlob(1, under);
   range.Bind(below);
   bool going = true;
-  const bool read = VisitAll(at, visit, going) && VisitAll(below, visit, going);
-  read_error = FromSqlite(read ? SQLITE_OK : sqlite3_errcode(database.db));
+  const bool read = Ends(VisitAll(at, visit, going) && VisitAll(below, visit, going));
   at.Reset();
   below.Reset();
   return read;

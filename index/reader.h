@@ -21,6 +21,9 @@ class EntryReader {
   // being made, or put in another's place, is not there for some milliseconds.
   IndexError OpenOnceMade(const std::string& share_name);
 
+  // What the last Summarise, Count or ForEach has met.
+  IndexError read_error = IndexError::NONE;
+
   struct Summary {
     uint64_t entries = 0;
     uint64_t wanted = 0;      // those whose content is wanted
@@ -37,7 +40,6 @@ class EntryReader {
   // Calls `visit` with each entry at or below normal path `under` in byte order of the paths, until
   // it returns false. False when reading failed.
   bool ForEach(const std::string& under, const std::function<bool(const Entry&)>& visit);
-  IndexError read_error = IndexError::NONE;  // of the last ForEach
 
   // The entry at exactly that path, if there is one. NONE, or why that cannot be told.
   IndexError Find(const std::string& path, std::optional<Entry>& entry);
@@ -58,6 +60,8 @@ class EntryReader {
   IndexDatabase database;
 
  private:
+  bool Ends(bool is_read);  // sets read_error
+
   std::optional<int64_t> first_version;  // of the data, when HasWriterEnded was first asked
 };
 

@@ -261,12 +261,15 @@ class DamagedIndexTest(IndexTest):
         self.check(after, fate, None, found)
 
     def damaged_and_only_asked(self, damage, asked, fate=KEPT, code=1):
+        self.damaged_and_only_met_by(damage, lambda: self.ctl(*asked, code=code), fate)
+
+    def damaged_and_only_met_by(self, damage, ask, fate=KEPT):
         self.await_alone(self.make_index())
         after = self.log.mark()
         damage()
         found = contents(FOLDER)
 
-        self.ctl(*asked, code=code)
+        ask()
         self.await_line(TOLD, after)
         self.settle(after)
 
@@ -281,6 +284,22 @@ class DamagedIndexTest(IndexTest):
 
     def test_rows_that_only_statistics_read_are_told_of_and_made_anew(self):
         self.damaged_and_only_asked(lambda: scribble_leaf(FILE, "entries"), ("stats",))
+
+    def test_rows_that_only_info_reads_are_told_of_and_made_anew(self):
+        def ask():
+            paths = (f"{self.root}/d{i % 7}/{i}.txt" for i in range(400))
+            self.assertTrue(
+                any(b"cannot be read" in self.ctl("info", path).out for path in paths)
+            )
+
+        self.damaged_and_only_met_by(lambda: scribble_leaf(FILE, "entries"), ask)
+
+    def test_rows_that_only_status_counts_are_told_of_and_made_anew(self):
+        def damage():
+            os.kill(self.service_pid(), signal.SIGSTOP)  # it follows them
+            scribble_leaf(FILE, "entries_wanted")
+
+        self.damaged_and_only_asked(damage, ("status",), code=0)
 
     def test_an_older_file_below_its_log_is_told_of_by_whoever_reads_it(self):
         pid = self.make_index()

@@ -22,7 +22,8 @@ class ContentsDamageTest(ContentsTest):
         self.root = self.make_share(folders=())
         for i in range(TEXTS):
             words = " ".join(f"word{i}x{n}" for n in range(200))
-            self.write(f"{self.root}/text-{i:03}.txt", f"lighthouse {words}")
+            ending = ".txt" if i % 2 else ""  # the kind of the others stands in the contents alone
+            self.write(f"{self.root}/text-{i:03}{ending}", f"lighthouse {words}")
         self.start()
         self.ctl("folder", "add", self.root, "--document")
         self.await_counts(done=TEXTS, waiting=0)
@@ -53,6 +54,21 @@ class ContentsDamageTest(ContentsTest):
             self.assertTrue(any(b"the index is damaged" in result.out for result in asked))
 
         self.asked_only("texts", ask)
+
+    def test_files_that_only_duplicates_are_made_of_are_made_anew(self):
+        self.asked_only("files", lambda: self.ctl("stats", "--duplicates", code=1))
+
+    def test_files_that_only_statistics_by_kind_read_are_made_anew(self):
+        self.asked_only("files", lambda: self.ctl("stats", "--by", "kind", code=1))
+
+    def test_files_that_only_a_dump_reads_are_made_anew(self):
+        self.asked_only("files", lambda: self.ctl("dump", "--json", "alpha", code=1))
+
+    def test_failures_that_only_a_list_of_them_reads_are_made_anew(self):
+        self.asked_only("files_failed", lambda: self.ctl("failed", code=1))
+
+    def test_counts_that_only_status_reads_are_made_anew(self):
+        self.asked_only("counts", lambda: self.assertIn(b"cannot be read", self.ctl("status").out))
 
     def test_entries_whose_shared_memory_went_are_followed_on(self):
         os.unlink(f"{ENTRIES}-shm")
