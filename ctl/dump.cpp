@@ -39,12 +39,11 @@ int Dump(const Arguments& arguments) {
   }
 
   EntryReader reader;
-  const IndexError opened = reader.Open(share->name);
+  const IndexError opened = OpenAndTell(reader.database, share->name);
   if (opened == IndexError::PATH_NOT_FOUND) {  // nothing was indexed yet
     return EXIT_DONE;
   }
   if (opened != IndexError::NONE) {
-    TellWriter(share->name, opened);
     return Fail(EXIT_FAILED, "%s: index: %s", share->name.c_str(), IndexErrorText(opened));
   }
 

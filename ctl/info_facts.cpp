@@ -112,13 +112,12 @@ void Explain(const Settings& settings, PathFacts& facts, int reason) {
 
 void AskIndex(const Settings& settings, PathFacts& facts) {
   EntryReader reader;
-  const IndexError opened = reader.Open(facts.share->name);
+  const IndexError opened = OpenAndTell(reader.database, facts.share->name);
   if (opened == IndexError::PATH_NOT_FOUND) {
     facts.index_problem = "the share is not indexed yet";
     return;
   }
   if (opened != IndexError::NONE) {
-    TellWriter(facts.share->name, opened);
     facts.index_read = false;
     facts.index_problem = std::string("the index cannot be read: ") + IndexErrorText(opened);
     return;

@@ -24,7 +24,7 @@ namespace {
 // An index that is not there is a problem where nothing is on the way that makes it.
 void ReadIndex(ShareReport& report) {
   EntryReader reader;
-  const IndexError opened = reader.Open(report.share.name);
+  const IndexError opened = OpenAndTell(reader.database, report.share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {
     const bool comes = report.waiting > 0 || report.needs_reindex || report.work.has_value();
     if (report.has_folders && !comes) {
@@ -34,7 +34,6 @@ void ReadIndex(ShareReport& report) {
     return;
   }
   if (opened != IndexError::NONE) {
-    TellWriter(report.share.name, opened);
     report.index_problem = IndexErrorText(opened);
     return;
   }

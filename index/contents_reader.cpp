@@ -96,9 +96,8 @@ IndexError AttachContents(IndexDatabase& entries, const std::string& share_name)
 
 IndexError ContentsReader::Open(const std::string& share_name) {
   share = share_name;
-  IndexError error = entries.OpenForReading(IndexPath(share_name));
+  IndexError error = OpenAndTell(entries, share_name);
   if (error != IndexError::NONE) {
-    TellWriter(share, error);
     return error;
   }
   error = AttachContents(entries, share_name);

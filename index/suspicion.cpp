@@ -100,6 +100,14 @@ void TellWriter(const std::string& share_name, IndexError error) {
   }
 }
 
+IndexError OpenAndTell(IndexDatabase& entries, const std::string& share_name) {
+  const IndexError error = entries.OpenForReading(IndexPath(share_name));
+  if (error != IndexError::PATH_NOT_FOUND) {
+    TellWriter(share_name, error);
+  }
+  return error;
+}
+
 void TellContentsWriter(const std::string& share_name, IndexError error) {
   try {
     if (error == IndexError::DAMAGED) {

@@ -24,6 +24,10 @@ void TellWriter(const std::string& share_name, IndexError error);
 // The same of contents, of damage alone: the content service watches for the note.
 void TellContentsWriter(const std::string& share_name, IndexError error);
 
+// Opens the share's entries, and tells of what keeps them from being read, but for a database that
+// is not there: nothing may have been indexed yet. NONE, or why not.
+IndexError OpenAndTell(IndexDatabase& entries, const std::string& share_name);
+
 // Looks at the whole database if there is a note: NONE, DAMAGED, or what kept it from being read.
 IndexError CheckSuspected(sqlite3* db, const std::string& index_path);
 

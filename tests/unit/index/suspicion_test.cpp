@@ -8,6 +8,8 @@
 #include <ctime>
 #include <filesystem>
 
+#include "index/contents_reader.h"
+#include "index/schema.h"
 #include "state/layout.h"
 #include "tests/unit/index/fixture.h"
 
@@ -75,6 +77,19 @@ TEST_F(SuspicionTest, WhatWasJustToldOfAShareWakesNobodyAgain) {
     EXPECT_FALSE(Wakes(error, share));
     EXPECT_TRUE(Wakes(error, FreshShare()));
   }
+}
+
+// Of no database nothing is told: it may never have been made.
+TEST_F(SuspicionTest, WhatKeepsTheEntriesFromBeingOpenedIsTold) {
+  const std::string share = FreshShare();
+  IndexDatabase entries;
+  EXPECT_EQ(OpenAndTell(entries, share), IndexError::PATH_NOT_FOUND);
+  EXPECT_EQ(ContentsReader().Open(share), IndexError::PATH_NOT_FOUND);
+  EXPECT_FALSE(std::filesystem::exists(QueuePath(share)));
+
+  WriteFile(IndexPath(share) + "/" + ENTRIES_FILE, "no database at all");
+  EXPECT_EQ(OpenAndTell(entries, share), IndexError::DAMAGED);
+  EXPECT_TRUE(std::filesystem::exists(QueuePath(share)));
 }
 
 TEST_F(SuspicionTest, AllElseWakesNobody) {
