@@ -71,10 +71,7 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
   }
 
   for (const Share& share : session.settings->shares) {
-    const bool named = !arguments.in_share || share.name == *arguments.in_share;
-    const bool reached = question.under.empty() || Covers(question.under, share.path) ||
-                         Covers(share.path, question.under);
-    if (named && reached) {
+    if (!arguments.in_share || share.name == *arguments.in_share) {
       question.shares.push_back(share.name);
       question.roots.emplace(share.name, share.path);
     }
