@@ -10,6 +10,8 @@
 #include <utility>
 
 #include "base/scoped_fd.h"
+#include "index/schema.h"
+#include "index/suspicion.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
 #include "tests/unit/index/contents_fixture.h"
@@ -24,6 +26,9 @@ constexpr int64_t NOW = 2'000'000'000;
 
 class ContentsWriterTest : public ContentsTest {
  protected:
+  // Whether the entries' writer was told of damage since it was last asked.
+  static bool TakeNote() { return remove((IndexPath("s") + "/" + SUSPICION_NOTE).c_str()) == 0; }
+
   // Writes over the first page of each of these tables or indexes of the entries.
   void DamageEntries(const std::vector<std::string>& names) {
     const std::string path = IndexPath("s") + "/entries.db";
@@ -384,11 +389,23 @@ TEST_F(ContentsWriterTest, DamagedEntriesTakeNothingFromTheContents) {
     OpenContents();
     EXPECT_FALSE(step()) << name;
     EXPECT_EQ(contents->Error(), IndexError::DAMAGED) << name;
+    EXPECT_TRUE(TakeNote()) << name;
   }
 
   OpenContents();
   EXPECT_EQ(Holding("txt"), 1);
   EXPECT_NE(access((ContentsPath("s") + ".damaged").c_str(), F_OK), 0);
+}
+
+TEST_F(ContentsWriterTest, EntriesThatCannotBeOpenedAreToldOf) {
+  File("a.txt");
+  contents.reset();
+  writer.reset();
+  WriteFile(IndexPath("s") + "/" + ENTRIES_FILE, "no database at all");
+
+  ContentsWriter other;
+  EXPECT_EQ(other.Open(TheShare(), 1), IndexError::DAMAGED);
+  EXPECT_TRUE(TakeNote());
 }
 
 TEST_F(ContentsWriterTest, FilesAreTheOwnersAlone) {
