@@ -5,16 +5,13 @@
 #include <algorithm>
 #include <string_view>
 
-namespace fileindexd {
+#include "base/ascii.h"
 
-// Of a letter of ASCII; all else stays.
-inline char SmallLetter(char c) {
-  return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 0x20) : c;
-}
+namespace fileindexd {
 
 inline bool IsSameName(std::string_view given, std::string_view name) {
   return std::equal(given.begin(), given.end(), name.begin(), name.end(),
-                    [](char a, char b) { return SmallLetter(a) == SmallLetter(b); });
+                    [](char a, char b) { return LowerLetter(a) == LowerLetter(b); });
 }
 
 inline bool EndsWithName(std::string_view text, std::string_view name) {

@@ -5,10 +5,10 @@
 #include <array>
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/utf8.h"
 #include "index/asked.h"
 #include "index/entry_table.h"
-#include "index/letter_case.h"
 #include "index/text_tokenizer.h"
 
 namespace fileindexd {
@@ -167,7 +167,7 @@ bool NamePattern::FitsName(std::string_view name) {
   std::array<char, 256> folded;  // NOLINT: what is read has been written
   const size_t size = std::min(name.size(), folded.size());
   for (size_t i = 0; i < size; ++i) {
-    folded[i] = SmallLetter(name[i]);
+    folded[i] = LowerLetter(name[i]);
   }
   return name.size() <= folded.size() ? Fits({folded.data(), size}) : Fits(folder.Parts(name));
 }

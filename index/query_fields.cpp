@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <string>
 
+#include "base/ascii.h"
 #include "index/letter_case.h"
 #include "index/suggestion.h"
 
@@ -90,7 +91,7 @@ const char* NearField(std::string_view name) {
     return nullptr;
   }
   std::string lower(name);
-  std::transform(lower.begin(), lower.end(), lower.begin(), SmallLetter);
+  std::transform(lower.begin(), lower.end(), lower.begin(), LowerLetter);
   const auto* const near = std::find_if(
       std::begin(FIELDS), std::end(FIELDS),
       [&lower](const NamedField& field) { return EditDistance(lower, field.name, 1) == 1; });

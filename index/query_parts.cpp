@@ -10,6 +10,7 @@
 #include <optional>
 #include <system_error>
 
+#include "base/ascii.h"
 #include "index/kind.h"
 #include "index/letter_case.h"
 #include "index/query_values.h"
@@ -139,7 +140,7 @@ bool FillNear(const Value& value, QueryNode& node, QueryError& error) {
 bool FillKind(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::KIND;
   for (std::string& name : SplitAt(value.text, ',')) {
-    std::transform(name.begin(), name.end(), name.begin(), SmallLetter);
+    std::transform(name.begin(), name.end(), name.begin(), LowerLetter);
     const std::optional<Kind> kind = KindFromText(name);
     if (!kind.has_value()) {
       return Fail(error,

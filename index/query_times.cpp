@@ -4,6 +4,7 @@
 #include <charconv>
 #include <string>
 
+#include "base/ascii.h"
 #include "index/letter_case.h"
 
 namespace fileindexd {
@@ -129,7 +130,7 @@ std::optional<int64_t> DurationSeconds(std::string_view text) {
     }
     text.remove_prefix(static_cast<size_t>(end - text.data()));
     constexpr int64_t SECONDS[] = {1, 60, 3600, 86400, 7 * 86400, 365 * 86400};
-    const size_t unit = text.empty() ? 0 : UNITS.find(SmallLetter(text.front()));
+    const size_t unit = text.empty() ? 0 : UNITS.find(LowerLetter(text.front()));
     if (unit == std::string_view::npos || number > LONGEST / SECONDS[unit]) {
       return std::nullopt;
     }
@@ -154,7 +155,7 @@ std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool
   }
   if (text.starts_with('-')) {
     const std::optional<int64_t> ago = DurationSeconds(text.substr(1));
-    const bool has_unit = !text.empty() && SmallLetter(text.back()) >= 'a';
+    const bool has_unit = !text.empty() && LowerLetter(text.back()) >= 'a';
     if (!ago.has_value() || !has_unit) {
       return std::nullopt;
     }
@@ -166,7 +167,7 @@ std::optional<TimeSpan> ParseTimeSpan(std::string_view text, time_t moment, bool
 bool BeginsWithAgo(std::string_view text) {
   const size_t unit = text.find_first_not_of("0123456789", 1);
   return text.starts_with('-') && unit > 1 && unit < text.size() &&
-         UNITS.find(SmallLetter(text[unit])) != std::string_view::npos;
+         UNITS.find(LowerLetter(text[unit])) != std::string_view::npos;
 }
 
 }  // namespace fileindexd
