@@ -100,7 +100,7 @@ const DatabaseForm CONTENTS_FORM = {
     .last_commit = nullptr,  // a text that is missing is read again
     .prepare = RegisterTextTokenizer,
     // Merging writes the same pages again and again: most of them are then copied back once.
-    .most_log_frames = 8 * LEAST_LOG_FRAMES,
+    .most_log_frames = 3 * LEAST_LOG_FRAMES,
 };
 
 const std::array<ContentsAddition, 2> CONTENTS_ADDITIONS = {

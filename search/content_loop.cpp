@@ -144,7 +144,7 @@ void ContentLoop::End() {
   }
   owner.clear();
   for (auto& [name, followed] : shares) {
-    followed.contents.Halt();
+    followed.contents.Halt(true);
   }
 }
 

@@ -329,7 +329,7 @@ void ShareContents::CloseIfIdle(Time now) {
   }
 }
 
-void ShareContents::Halt() {
+void ShareContents::Halt(bool cuts_log) {
   if (!Writer().IsOpen()) {
     DropQuestions();
     return;
@@ -351,6 +351,9 @@ void ShareContents::Halt() {
   if (!good || (writer.HasChanges() && !writer.Commit())) {
     ServiceDebug("Share[%s] stopped in the middle, reason=%s", share.name.c_str(),
                  IndexErrorText(writer.Error()));
+  }
+  if (cuts_log && writer.IsOpen()) {
+    writer.CutLog();
   }
   Forget();
   has_news = true;

@@ -71,8 +71,9 @@ class ShareContents {
   bool TakesRoom(Time now) const;
   // What came of a file that was given out under that id; of one that was taken back: nothing.
   void End(ExtractOutcome&& outcome, Time now);
-  // Takes back what was given out, and closes. For pauses: it goes on as it was.
-  void Halt();
+  // Takes back what was given out, and closes. For pauses: it goes on as it was. With `cuts_log`
+  // the database is left as questions like to find it.
+  void Halt(bool cuts_log = false);
 
   // What tells that an answer of the file system is there: Work wants to be called.
   void AddPolled(std::vector<pollfd>& polled) const;
@@ -169,19 +170,19 @@ class ShareContents {
   void GoneOn();
   void Forget();
 
-  ContentsWriter writer;                      // the other thread's while it is committing
-  bool committed = false;                     // whether that was good; as the writer
-  SideWork committing;                        // goes before both
+  ContentsWriter writer;  // the other thread's while it is committing, as is `committed`
+  SideWork committing;    // goes before the writer
   std::shared_ptr<ContentPreparer> preparer;  // null until it is needed
   Opener opener;
   bool is_asking_root = false;
   std::optional<RootState> root;  // the answer, until it is used
   std::optional<Turn> opening;    // a batch for that turn
-  std::vector<Ready> opened;      // the last one: about to be put on record, for
+  std::vector<Ready> opened;      // the last one, for `opened_for`: about to be put on record
+  size_t looking = 0;             // at files that were read
+  size_t looking_bytes = 0;       // of their texts
+  Time answered;                  // the time, for answers
   Turn opened_for = Turn::NEW;
-  size_t looking = 0;        // at files that were read
-  size_t looking_bytes = 0;  // of their texts
-  Time answered;             // the time, for answers
+  bool committed = false;  // whether the last commit beside was good
   bool has_news = true;
   bool takes_more = false;  // the last look at news did not see all
   bool look_at_all = true;

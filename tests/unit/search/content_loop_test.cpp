@@ -187,6 +187,7 @@ TEST_F(ContentLoopTest, APauseStopsItAndItsEndLetsItGoOn) {
   Settle();
   EXPECT_THAT(Running(), ElementsAre());
   EXPECT_EQ(Scripted("a").kept[1].tries, 0);
+  EXPECT_THAT(Scripted("a").calls, testing::Contains("CutLog"));
 
   ASSERT_TRUE(store->ClearPause(0));
   Settle();
