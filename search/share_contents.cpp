@@ -90,8 +90,8 @@ bool ShareContents::CanWork(Time now) const {
 
 bool ShareContents::IsIdle() const {
   return !has_news && !look_at_all && !Sweeps() && !WantsMore() && fresh.ready.empty() &&
-         again.ready.empty() && running.empty() && !opener.IsWaiting() && opened.empty() &&
-         !retry_wanted && !HasChanges();
+         again.ready.empty() && running.empty() && !opener.IsWaiting() && !retry_wanted &&
+         !HasChanges();
 }
 
 // When the disk is asked again for what it did not give. The writer may be closed meanwhile.
@@ -226,7 +226,7 @@ Time ShareContents::CommitDue() const {
     return Time();
   }
   const Time latest = *first_change + COMMIT_AGE;
-  if (has_news || Sweeps() || WantsMore() || opening || !opened.empty() || !fresh.ready.empty() ||
+  if (has_news || Sweeps() || WantsMore() || opening || !fresh.ready.empty() ||
       (may_read_again && !again.ready.empty())) {
     return latest;
   }
@@ -238,6 +238,9 @@ Time ShareContents::CommitDue() const {
 }
 
 void ShareContents::CommitIfDue(Time now) {
+  if (!opened.empty()) {
+    return;  // all goes on record along with their tries
+  }
   if (!writer.HasChanges()) {
     first_change.reset();
     return;
@@ -375,7 +378,8 @@ Time ShareContents::Due() const {
     return opener.Deadline();
   }
   Time due = std::min(next_full_look, next_unread);
-  const bool has_work = Sweeps() || look_at_all || retry_wanted || (may_merge && IsIdle());
+  const bool has_work =
+      Sweeps() || look_at_all || retry_wanted || !opened.empty() || (may_merge && IsIdle());
   if (!writer.IsOpen()) {
     due = is_missing                            ? due
           : has_news || has_work || WantsMore() ? Time()

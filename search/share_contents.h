@@ -146,7 +146,8 @@ class ShareContents {
   void CloseIfIdle(Time now);
 
   bool MayOpen(const Line& line) const {
-    return line.may_have && !opening && opened.empty() && patient.size() < MOST_PATIENT;
+    return line.may_have && !opening && opened.empty() && !committing.IsRunning() &&
+           patient.size() < MOST_PATIENT;
   }
   Line& LineOf(Turn turn) { return turn == Turn::NEW ? fresh : again; }
   const Line& LineOf(Turn turn) const { return turn == Turn::NEW ? fresh : again; }

@@ -79,9 +79,8 @@ struct ShareContents::Batch {
 
 bool ShareContents::MayHaveJobs(Turn turn, Time now) const {
   const Line& line = LineOf(turn);
-  const bool may_open = !committing.IsRunning() && MayOpen(line);
   return IsOpen() && CanWork(now) && looking < MOST_LOOKING && looking_bytes < MOST_LOOKING_BYTES &&
-         (!line.ready.empty() || may_open);
+         (!line.ready.empty() || MayOpen(line));
 }
 
 bool ShareContents::IsNewWaiting(Time now) const {
@@ -92,8 +91,8 @@ bool ShareContents::IsNewWaiting(Time now) const {
 
 bool ShareContents::TakesRoom(Time now) const {
   return IsOpen() && CanWork(now) &&
-         (WantsMore() || opening || !opened.empty() || !fresh.ready.empty() ||
-          !again.ready.empty() || !running.empty() || HasChanges());
+         (WantsMore() || opening || !fresh.ready.empty() || !again.ready.empty() ||
+          !running.empty() || HasChanges());
 }
 
 bool ShareContents::Next(Turn turn, Time now, uint64_t id, ExtractJob& job) {
@@ -103,7 +102,7 @@ bool ShareContents::Next(Turn turn, Time now, uint64_t id, ExtractJob& job) {
   }
   // What is new is read while as much again is opened and put on record.
   const size_t ahead = turn == Turn::NEW ? batch : 0;
-  if (line.ready.size() <= ahead && !committing.IsRunning() && MayOpen(line)) {
+  if (line.ready.size() <= ahead && MayOpen(line)) {
     Refill(turn, now);
   }
   if (line.ready.empty()) {

@@ -62,6 +62,23 @@ TEST_F(OpenerTest, AnswersComeInOrderToWhoTakesThem) {
   EXPECT_EQ(heard, "abc");
 }
 
+TEST_F(OpenerTest, WhatIsNotTakenIsStillTold) {
+  AskAndHang("a");
+  Ask("b");
+  Ask("c");
+  gate.set_value();
+  std::vector<pollfd> polled;
+  opener->AddPolled(polled);
+  while (heard.size() < 2) {
+    ASSERT_EQ(poll(polled.data(), polled.size(), 60'000), 1);
+    opener->Take(now, 2 - heard.size());
+  }
+  EXPECT_EQ(heard, "ab");
+  EXPECT_TRUE(opener->IsWaiting());
+  Await();
+  EXPECT_EQ(heard, "abc");
+}
+
 TEST_F(OpenerTest, WorkBehindAnAnswerMayTakeAsLongAsItTakes) {
   const auto question = [this]() -> Opener::Answer { return [this] { heard += "a"; }; };
   const auto work = [this, opened = gate.get_future().share()] {

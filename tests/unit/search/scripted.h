@@ -66,6 +66,8 @@ bool& FilesystemHangs();
 
 // Of all shares: what is done beside has not ended until it is awaited. False in the beginning.
 bool& SideWorkTakesTime();
+// Whether some is begun and not awaited: the writer is not to be used then.
+bool IsSideWorkRunning();
 
 // As the entries would have it.
 FileIdentity IdentityOf(const std::string& path);

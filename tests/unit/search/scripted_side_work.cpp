@@ -12,12 +12,28 @@ bool& SideWorkTakesTime() {
   return takes_time;
 }
 
+namespace {
+
+int& CountRunning() {
+  static int running = 0;
+  return running;
+}
+
+}  // namespace
+
+bool IsSideWorkRunning() {
+  return CountRunning() > 0;
+}
+
 SideWork::SideWork() = default;
-SideWork::~SideWork() = default;
+SideWork::~SideWork() {
+  Await();
+}
 
 bool SideWork::Begin(std::function<void()> work) {
   work();
   running = std::make_unique<Running>();
+  ++CountRunning();
   return true;
 }
 
@@ -30,6 +46,7 @@ bool SideWork::HasEnded() const {
 }
 
 void SideWork::Await() {
+  CountRunning() -= IsRunning() ? 1 : 0;
   running.reset();
 }
 

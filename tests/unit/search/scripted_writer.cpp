@@ -21,6 +21,7 @@ struct ContentsWriter::Impl {
 
   // False when the test wants this call to fail.
   bool Call(const std::string& name, const std::string& about = "") {
+    EXPECT_FALSE(IsSideWorkRunning()) << name << " while another thread has the writer";
     contents->calls.push_back(about.empty() ? name : name + " " + about);
     const auto found = contents->failing.find(name);
     if (found != contents->failing.end()) {

@@ -7,7 +7,6 @@ namespace {
 
 using std::chrono::milliseconds;
 using std::chrono::seconds;
-using testing::Contains;
 using testing::IsEmpty;
 using testing::Not;
 using testing::SizeIs;
@@ -81,10 +80,72 @@ TEST_F(CommitBesideTest, TriesAreOnRecordBeforeTheirFilesAreGivenOut) {
   EXPECT_THAT(GiveOut(), SizeIs(3));
   EXPECT_EQ(Count("NextJobs 8"), 1U);
   contents.Work(now, Wall());
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
+  EXPECT_TRUE(contents.IsNewWaiting(now));
   EXPECT_THAT(GiveOut(), IsEmpty());
 
   EndCommit();
   EXPECT_THAT(GiveOut(), SizeIs(4));
+}
+
+TEST_F(CommitBesideTest, TriesThatAreBeingRecordedAreTakenBackByAPause) {
+  for (int64_t row = 1; row <= 8; ++row) {
+    AddFile(row);
+  }
+  Settle();
+  ids = GiveOut(1);
+  SideWorkTakesTime() = true;
+  EXPECT_THAT(GiveOut(), SizeIs(3));
+  EXPECT_EQ(Kept(8).tries, 1);
+  contents.Halt();
+
+  for (int64_t row = 1; row <= 8; ++row) {
+    EXPECT_EQ(Kept(row).tries, 0) << row;
+  }
+}
+
+// The batch is answered first, and then the look at what was read, whose text is enough for a
+// commit.
+TEST_F(CommitBesideTest, WhatWasJustOpenedIsPutOnRecordByNoOtherCommit) {
+  AddFile(1);
+  Settle();
+  ids = GiveOut();
+  ASSERT_THAT(ids, SizeIs(1));
+  AddFile(2);
+  contents.EntriesChanged();
+  Pass(seconds(1));
+  FilesystemHangs() = true;
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  FilesystemHangs() = false;
+  const size_t asked = Count("NextJobs");
+  End(ids[0], ExtractOutcome::Result::DONE, std::string(9 << 20, 'x'));
+
+  EXPECT_THAT(GiveOut(), IsEmpty());
+  EXPECT_EQ(Count("NextJobs"), asked);
+  Settle();
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+  EXPECT_EQ(Kept(2).tries, 1);
+  EXPECT_THAT(GiveOut(), SizeIs(1));
+}
+
+TEST_F(CommitBesideTest, TextsThatWaitAreBounded) {
+  BeginCommit();
+  End(ids[1], ExtractOutcome::Result::DONE, std::string(3 << 20, 'x'));
+  EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
+  EXPECT_THAT(GiveOut(), IsEmpty());
+
+  EndCommit();
+  EXPECT_THAT(GiveOut(), Not(IsEmpty()));
+}
+
+TEST_F(CommitBesideTest, TextsThatWereTakenBackCountNoMore) {
+  BeginCommit();
+  End(ids[1], ExtractOutcome::Result::DONE, std::string(3 << 20, 'x'));
+  contents.Halt();
+  SideWorkTakesTime() = false;
+  Settle();
+
+  EXPECT_THAT(GiveOut(), Not(IsEmpty()));
 }
 
 TEST_F(CommitBesideTest, OneThatFailsLetsTheShareRestAndLosesNothing) {
