@@ -2,7 +2,6 @@
 #include "search/share_contents.h"
 
 #include <algorithm>
-#include <iterator>
 #include <utility>
 
 #include "search/log.h"
@@ -27,9 +26,6 @@ constexpr milliseconds LONGEST_BETWEEN_LOOKS(100);
 // A slow disk may take its time.
 constexpr milliseconds LATER_LOOKS[] = {milliseconds(200), milliseconds(1000), milliseconds(5000),
                                         milliseconds(30000), milliseconds(120000)};
-constexpr milliseconds COMMIT_AGE(400);
-// What is still being read after that time is slow, and what was read beside it does not wait.
-constexpr milliseconds LULL(20);
 // Its page cache is of no use any more.
 constexpr seconds CLOSE_AFTER(10);
 
@@ -216,89 +212,6 @@ bool ShareContents::ReleasePatient(Time now) {
     patient.erase(patient.begin());
     MayHaveMore();
   }
-  return true;
-}
-
-// With nothing more to come, at once: somebody may be waiting for it. What is being read for longer
-// than a lull is slow, and is not waited for.
-Time ShareContents::CommitDue() const {
-  if (!first_change || writer.PendingBytes() >= enough_pending) {
-    return Time();
-  }
-  const Time latest = *first_change + COMMIT_AGE;
-  if (has_news || Sweeps() || WantsMore() || opening || !fresh.ready.empty() ||
-      (may_read_again && !again.ready.empty())) {
-    return latest;
-  }
-  Time newest;
-  for (const auto& [id, one] : running) {
-    newest = std::max(newest, one.since);
-  }
-  return running.empty() ? Time() : std::min({latest, last_end + LULL, newest + LULL});
-}
-
-void ShareContents::CommitIfDue(Time now) {
-  if (!opened.empty()) {
-    return;  // all goes on record along with their tries
-  }
-  if (!writer.HasChanges()) {
-    first_change.reset();
-    return;
-  }
-
-  first_change = first_change.value_or(now);
-  if (now >= CommitDue()) {
-    CommitBeside([this] { return writer.Commit(); }, now);
-  }
-}
-
-// With nothing to do meanwhile, it is done here: what is new is found sooner.
-void ShareContents::CommitBeside(std::function<bool()> commit, Time now) {
-  const auto work = [this, commit = std::move(commit)] { committed = commit(); };
-  if (!HasMore() || !committing.Begin(work)) {
-    work();
-    EndCommit(now);
-  } else {
-    (void)TakeCommit(now);
-  }
-}
-
-// False while the writer is committing.
-bool ShareContents::TakeCommit(Time now) {
-  if (!committing.IsRunning()) {
-    return true;
-  }
-  if (!committing.HasEnded()) {
-    return false;
-  }
-  committing.Await();
-  EndCommit(now);
-  return true;
-}
-
-void ShareContents::EndCommit(Time now) {
-  if (!committed) {
-    RestForError(now);
-    return;
-  }
-  first_change.reset();
-  std::deque<Ready>& ready = LineOf(opened_for).ready;
-  std::move(opened.begin(), opened.end(), std::back_inserter(ready));
-  opened.clear();
-  GoneOn();
-}
-
-ContentsWriter& ShareContents::Writer() {
-  committing.Await();
-  return writer;
-}
-
-bool ShareContents::Commit() {
-  if (!writer.Commit()) {
-    return false;
-  }
-  first_change.reset();
-  GoneOn();
   return true;
 }
 

@@ -189,19 +189,6 @@ void ShareContents::TakeBatch(Batch& batch_of_files) {
   }
 }
 
-// What is open goes to the helpers once it is on record.
-void ShareContents::BeginTries(Time now) {
-  if (opened.empty() || committing.IsRunning()) {
-    return;
-  }
-  std::vector<int64_t> files;
-  files.reserve(opened.size());
-  for (const Ready& one : opened) {
-    files.push_back(one.job.file);
-  }
-  CommitBeside([this, files = std::move(files)] { return writer.BeginTries(files); }, now);
-}
-
 // False when that could not be written down.
 bool ShareContents::TakeUnopened(int64_t file, Opening result, const std::string& reason,
                                  Time now) {
