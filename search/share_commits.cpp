@@ -71,9 +71,16 @@ bool ShareContents::TakeCommit(Time now) {
   if (!committing.HasEnded()) {
     return false;
   }
-  committing.Await();
+  (void)AwaitCommit();
   EndCommit(now);
   return true;
+}
+
+// False when one was under way and failed: its writer has closed.
+bool ShareContents::AwaitCommit() {
+  const bool is_running = committing.IsRunning();
+  committing.Await();
+  return !is_running || committed;
 }
 
 void ShareContents::EndCommit(Time now) {
@@ -86,11 +93,6 @@ void ShareContents::EndCommit(Time now) {
   std::move(opened.begin(), opened.end(), std::back_inserter(ready));
   opened.clear();
   GoneOn();
-}
-
-ContentsWriter& ShareContents::Writer() {
-  committing.Await();
-  return writer;
 }
 
 bool ShareContents::Commit() {

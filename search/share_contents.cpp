@@ -113,6 +113,9 @@ void ShareContents::Work(Time now, int64_t wall) {
   if (!TakeCommit(now)) {
     return;
   }
+  if (in_force != nullptr) {
+    writer.UseSettings(std::exchange(in_force, nullptr));
+  }
   if (CanWork(now)) {
     TakeAnswers(now);
     BeginTries(now);
@@ -246,13 +249,15 @@ void ShareContents::CloseIfIdle(Time now) {
 }
 
 void ShareContents::Halt(bool cuts_log) {
-  if (!Writer().IsOpen()) {
+  // A writer that has just closed for a commit that failed still knows what it had given out.
+  const bool is_good = AwaitCommit();
+  if (is_good && !writer.IsOpen()) {
     DropQuestions();
     return;
   }
 
   // A failure here costs no more than a try on record of files that were not to blame.
-  bool good = true;
+  bool good = is_good;
   for (const auto& [id, one] : running) {
     good = good && writer.Release(one.file);
   }

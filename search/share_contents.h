@@ -44,8 +44,9 @@ class ShareContents {
  public:
   explicit ShareContents(Share followed);
 
-  // Settings in force: which kinds are wanted where. Folders that changed want LookAtAll.
-  void Use(std::shared_ptr<const Settings> settings) { Writer().UseSettings(std::move(settings)); }
+  // Settings in force: which kinds are wanted where; from the next slice on. Folders that changed
+  // want LookAtAll.
+  void Use(std::shared_ptr<const Settings> settings) { in_force = std::move(settings); }
   // What is known of the share from outside, as it is now.
   void Set(const Share& current, const ShareStatus& status);
   void EntriesChanged();
@@ -134,13 +135,12 @@ class ShareContents {
   bool ReleasePatient(Time now);
   void CommitIfDue(Time now);
   bool Commit();
-  // The writer, once nobody else has it: waits for a commit.
-  ContentsWriter& Writer();
   bool IsOpen() const { return committing.IsRunning() || writer.IsOpen(); }
   bool HasChanges() const { return committing.IsRunning() || writer.HasChanges(); }
   bool HasMore() const { return !running.empty() || !fresh.ready.empty() || !again.ready.empty(); }
   void CommitBeside(std::function<bool()> commit, Time now);
   bool TakeCommit(Time now);
+  bool AwaitCommit();
   void EndCommit(Time now);
   void BeginTries(Time now);
   void CloseIfIdle(Time now);
@@ -173,6 +173,7 @@ class ShareContents {
 
   ContentsWriter writer;  // the other thread's while it is committing, as is `committed`
   SideWork committing;    // goes before the writer
+  std::shared_ptr<const Settings> in_force;   // null: the writer has them
   std::shared_ptr<ContentPreparer> preparer;  // null until it is needed
   Opener opener;
   bool is_asking_root = false;

@@ -111,7 +111,7 @@ void ShareContents::TakeAnswers(Time now) {
 
 void ShareContents::RestForError(Time now) {
   // A database was taken away while it was open: the next opening tells which.
-  if (Writer().Error() == IndexError::PATH_NOT_FOUND) {
+  if (writer.Error() == IndexError::PATH_NOT_FOUND) {
     Forget();
     look_at_all = true;
     has_news = true;
@@ -127,7 +127,7 @@ void ShareContents::Rest(Time now, const std::string& reason) {
     ServiceLog("Share[%s] contents rest, reason=%s", share.name.c_str(), reason.c_str());
     rest_told = true;
   }
-  if (Writer().HasChanges()) {
+  if (writer.HasChanges()) {
     (void)writer.Commit();  // good if it still can be done: it would be read once more
   }
   Forget();
@@ -156,7 +156,7 @@ void ShareContents::DropQuestions() {
 
 // What was given out is not waited for any more.
 void ShareContents::Forget() {
-  Writer().Close();
+  writer.Close();
   DropQuestions();
   opened.clear();
   fresh.ready.clear();

@@ -66,8 +66,14 @@ bool& FilesystemHangs();
 
 // Of all shares: what is done beside has not ended until it is awaited. False in the beginning.
 bool& SideWorkTakesTime();
+// Of all shares: there is no thread for it. False in the beginning.
+bool& SideWorkFails();
 // Whether some is begun and not awaited: the writer is not to be used then.
 bool IsSideWorkRunning();
+
+// What stands for their descriptors among what is polled.
+constexpr int OPENER_POLLED = -2;
+constexpr int SIDE_WORK_POLLED = -3;
 
 // As the entries would have it.
 FileIdentity IdentityOf(const std::string& path);

@@ -67,6 +67,8 @@ Opener::Time Opener::Deadline() const {
   return waiting > 0 ? heard + std::chrono::seconds(10) : Time::max();
 }
 
-void Opener::AddPolled(std::vector<pollfd>& /*polled*/) const {}
+void Opener::AddPolled(std::vector<pollfd>& polled) const {
+  polled.push_back({OPENER_POLLED, POLLIN, 0});
+}
 
 }  // namespace fileindexd

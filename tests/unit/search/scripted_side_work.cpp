@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Work without a thread: it is done when it is begun, and has ended unless it takes its time.
+#include <gtest/gtest.h>
+
 #include "search/side_work.h"
 #include "tests/unit/search/scripted.h"
 
@@ -10,6 +12,11 @@ struct SideWork::Running {};
 bool& SideWorkTakesTime() {
   static bool takes_time = false;
   return takes_time;
+}
+
+bool& SideWorkFails() {
+  static bool fails = false;
+  return fails;
 }
 
 namespace {
@@ -31,6 +38,10 @@ SideWork::~SideWork() {
 }
 
 bool SideWork::Begin(std::function<void()> work) {
+  EXPECT_FALSE(IsRunning());
+  if (SideWorkFails()) {
+    return false;
+  }
   work();
   running = std::make_unique<Running>();
   ++CountRunning();
@@ -50,6 +61,8 @@ void SideWork::Await() {
   running.reset();
 }
 
-void SideWork::AddPolled(std::vector<pollfd>& /*polled*/) const {}
+void SideWork::AddPolled(std::vector<pollfd>& polled) const {
+  polled.push_back({SIDE_WORK_POLLED, POLLIN, 0});
+}
 
 }  // namespace fileindexd

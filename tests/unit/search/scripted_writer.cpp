@@ -12,7 +12,8 @@
 namespace fileindexd {
 
 struct ContentsWriter::Impl {
-  ScriptedContents* contents = nullptr;  // null: closed
+  ScriptedContents* contents = nullptr;  // null: nothing was opened since it was closed
+  bool is_open = false;                  // what fails closes it, but it still knows what is out
   int64_t extractor = 0;
   bool changed = false;
   bool entries_go = false;
@@ -26,9 +27,10 @@ struct ContentsWriter::Impl {
     const auto found = contents->failing.find(name);
     if (found != contents->failing.end()) {
       error = found->second;
-      return false;
+      is_open = changed = false;
+      contents->pending_bytes = 0;
     }
-    return true;
+    return is_open;
   }
 
   // Those that fulfil the condition, and are not out.
@@ -91,6 +93,7 @@ ContentsWriter::~ContentsWriter() = default;
 
 IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
   impl->contents = &Scripted(share.name);
+  impl->is_open = true;
   if (!impl->Call("Open")) {
     impl->entries_go = impl->contents->entries_go;
     impl->contents = nullptr;
@@ -107,21 +110,27 @@ IndexError ContentsWriter::Open(const Share& share, int64_t extractor_version) {
 }
 
 void ContentsWriter::Close() {
-  if (IsOpen()) {
+  if (impl->contents != nullptr) {
     (void)impl->Call("Close");
   }
   *impl = Impl();
 }
 
 bool ContentsWriter::IsOpen() const {
-  return impl->contents != nullptr;
+  EXPECT_FALSE(IsSideWorkRunning());
+  return impl->is_open;
 }
 
 bool ContentsWriter::AreEntriesBeingRemoved() const {
   return impl->entries_go;
 }
 
-void ContentsWriter::UseSettings(std::shared_ptr<const Settings> /*in_force*/) {}
+void ContentsWriter::UseSettings(std::shared_ptr<const Settings> /*in_force*/) {
+  EXPECT_FALSE(IsSideWorkRunning());
+  if (impl->contents != nullptr) {
+    impl->contents->calls.emplace_back("UseSettings");
+  }
+}
 
 bool ContentsWriter::TakeIn(size_t /*limit*/, bool& more) {
   more = false;
@@ -168,6 +177,7 @@ bool ContentsWriter::NextAgain(int64_t now, size_t limit, std::vector<ContentJob
 }
 
 int64_t ContentsWriter::UnreadDue() const {
+  EXPECT_FALSE(IsSideWorkRunning());
   int64_t due = INT64_MAX;
   for (const auto& [row, file] : impl->contents->now) {
     if (file.state == ScriptedFile::State::UNREAD && !impl->out.contains(row)) {
@@ -235,10 +245,12 @@ void ContentsWriter::CutLog() {
 }
 
 bool ContentsWriter::HasChanges() const {
+  EXPECT_FALSE(IsSideWorkRunning());
   return impl->changed;
 }
 
 size_t ContentsWriter::PendingBytes() const {
+  EXPECT_FALSE(IsSideWorkRunning());
   return impl->contents->pending_bytes;
 }
 
@@ -253,6 +265,7 @@ bool ContentsWriter::Commit() {
 }
 
 IndexError ContentsWriter::Error() const {
+  EXPECT_FALSE(IsSideWorkRunning());
   return impl->error;
 }
 

@@ -7,6 +7,7 @@ namespace {
 
 using std::chrono::milliseconds;
 using std::chrono::seconds;
+using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::Not;
 using testing::SizeIs;
@@ -34,6 +35,27 @@ class CommitBesideTest : public ShareContentsTest {
     SideWorkTakesTime() = false;
     contents.Work(now, Wall());
     Settle();
+  }
+  // Whatever happened before, in the end all is read.
+  void ReadAll() {
+    for (int rounds = 0; rounds < 4; ++rounds) {
+      for (const uint64_t id : GiveOut()) {
+        End(id, ExtractOutcome::Result::DONE);
+      }
+      Pass(milliseconds(500));
+    }
+    for (int64_t row = 1; row <= 8; ++row) {
+      EXPECT_EQ(Kept(row).state, ScriptedFile::State::DONE) << row;
+    }
+  }
+  std::vector<int> Polled() const {
+    std::vector<pollfd> polled;
+    contents.AddPolled(polled);
+    std::vector<int> fds;
+    for (const pollfd& one : polled) {
+      fds.push_back(one.fd);
+    }
+    return fds;
   }
   bool IsWriterLeftAlone() const { return Scripted().calls.size() == calls; }
 
@@ -160,15 +182,56 @@ TEST_F(CommitBesideTest, OneThatFailsLetsTheShareRestAndLosesNothing) {
   Scripted().failing.clear();
   Pass(seconds(1));
   EXPECT_EQ(Kept(1).state, ScriptedFile::State::WAITS);
-  for (int rounds = 0; rounds < 4; ++rounds) {
-    for (const uint64_t id : GiveOut()) {
-      End(id, ExtractOutcome::Result::DONE);
-    }
-    Pass(milliseconds(500));
-  }
+  ReadAll();
+}
+
+// What was read meanwhile, and was not looked at yet, is taken back along with all else.
+TEST_F(CommitBesideTest, OneThatFailsBesideAPauseLosesNothing) {
+  fails = true;
+  BeginCommit();
+  End(ids[1], ExtractOutcome::Result::DONE);
+  contents.Halt();
+  EXPECT_EQ(Count("Close"), 1U);
+
+  Scripted().failing.clear();
+  SideWorkTakesTime() = false;
+  Settle();
+  ReadAll();
+}
+
+TEST_F(CommitBesideTest, SettingsWaitForItsEndAndTakeNothingOfIt) {
   for (int64_t row = 1; row <= 8; ++row) {
-    EXPECT_EQ(Kept(row).state, ScriptedFile::State::DONE) << row;
+    AddFile(row);
   }
+  Settle();
+  ids = GiveOut(1);
+  SideWorkTakesTime() = true;
+  EXPECT_THAT(GiveOut(), SizeIs(3));
+  const size_t begun = Count("BeginTries");
+  contents.Use(std::make_shared<Settings>());
+  EXPECT_EQ(contents.Due(), Time::max());
+
+  EndCommit();
+  EXPECT_EQ(Count("BeginTries"), begun);
+  EXPECT_EQ(Kept(8).tries, 1);
+  EXPECT_EQ(Count("UseSettings"), 1U);
+}
+
+TEST_F(CommitBesideTest, ItsEndIsWaitedForBeforeAnswers) {
+  BeginCommit();
+  EXPECT_THAT(Polled(), ElementsAre(SIDE_WORK_POLLED));
+  EndCommit();
+  EXPECT_THAT(Polled(), ElementsAre(OPENER_POLLED));
+}
+
+TEST_F(CommitBesideTest, WithoutAThreadForItItIsDoneHere) {
+  SideWorkFails() = true;
+  BeginCommit();
+  EXPECT_EQ(Kept(1).state, ScriptedFile::State::DONE);
+  EXPECT_NE(contents.Due(), Time::max());
+  End(ids[1], ExtractOutcome::Result::DONE);
+  End(ids[2], ExtractOutcome::Result::DONE);
+  ReadAll();
 }
 
 TEST_F(CommitBesideTest, WithNothingElseToReadItIsDoneAtOnce) {

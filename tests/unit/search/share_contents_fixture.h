@@ -32,6 +32,7 @@ class ShareContentsTest : public StateTest {
   ~ShareContentsTest() override {
     FilesystemHangs() = false;
     SideWorkTakesTime() = false;
+    SideWorkFails() = false;
   }
 
   // A file of the share that the entries know.
