@@ -121,15 +121,6 @@ const IndexedFolder* FindFolder(const Settings& settings, const std::string& giv
   return folder;
 }
 
-// Whether the folder's own path leaves the index with it because another folder's pattern keeps it
-// out: an update passes over the path that it begins with.
-bool IsKeptOutWithout(const Settings& settings, const IndexedFolder& folder) {
-  Settings changed = settings;
-  std::erase_if(changed.folders,
-                [&folder](const IndexedFolder& other) { return other.path == folder.path; });
-  return FindExclusion(changed, folder.path, Leaf::DIRECTORY).pattern != nullptr;
-}
-
 // The daemon's hands are off the share: what was known of its files goes.
 int DiscardIndex(Session& session, const std::string& share) {
   const std::string targets[] = {QueuePath(share),    DrainedPath(share),
@@ -272,9 +263,7 @@ int FolderRemove(const Arguments& arguments) {
   const int told = CodeOfReply(TellDaemon("delete_folder_setting", folder->path), folder->path);
   const ContentFlags every = {.document = true, .audio = true, .video = true, .photo = true};
   const std::string line =
-      IsKeptOutWithout(*session.settings, *folder)
-          ? EventLine(CUSTOM_EVENT_REINDEX, folder->path)
-          : EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt, ToText(FlagsObject(every)));
+      EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt, ToText(FlagsObject(every)));
   const int queued = Queue(session, folder->share, line);
   return told != EXIT_DONE ? told : queued;
 }

@@ -159,21 +159,18 @@ bool IsFileExist(const std::string& path) {
   });
 }
 
+// What has no place in an index is not refused here: of that an add makes no entry, and an update
+// takes the one out that is left. Only below the root of another file system lies something else.
 bool CanFullPathBeIndexed(const std::string& path) {
   return Uncancelled([&path] {
     const Glance& glance = GlanceAt(path);
-    const Verdict verdict = glance.look.verdict;
-    if (verdict != Verdict::BELONGS && verdict != Verdict::NOT_COVERED) {
-      return false;
-    }
-
     const std::string normal = NormalPath(path).value_or(path);
     const Share* share = glance.settings->ShareOfPath(normal);
     if (share == nullptr || share->path == normal) {
       return share != nullptr;
     }
-    if (verdict == Verdict::NOT_COVERED) {
-      return IsMountPoint(normal) == 0;  // it was judged by its name alone
+    if (IsNameVerdict(glance.look.verdict)) {
+      return IsMountPoint(normal) != 1;  // it was judged by its name alone
     }
     // A file that is mounted over another is an entry like any: nothing lies below it.
     return glance.thing != Thing::DIRECTORY || !glance.look.mount_root;

@@ -10,6 +10,7 @@ from harness import IndexTest, main
 REINDEX = 0x10000
 UPDATE = 0x20000
 CREATE = 0x40
+DELETE = 0x80
 FILES = (
     "a.txt",
     "a.o",
@@ -202,6 +203,22 @@ class NestedTest(ExcludesTest):
         self.assert_paths(self.root, without_inner)
         self.assertEqual(self.ctl("verify", "alpha").out, b"")
 
+    def test_an_inner_folder_that_goes_is_updated_like_any(self):
+        self.begin("build/")
+        self.ctl("folder", "add", f"{self.root}/src/build/deep")
+        self.await_drained("alpha")
+        self.ctl("pause")
+
+        self.ctl("folder", "remove", f"{self.root}/src/build/deep")
+
+        with open(self.queue("alpha"), encoding="utf-8") as file:
+            (line,) = file
+        every = dict.fromkeys(("document", "audio", "video", "photo"), True)
+        self.assertEqual(
+            json.loads(line),
+            {"event": UPDATE, "path": f"{self.root}/src/build/deep", "data": every},
+        )
+
     def test_an_inner_folder_that_goes_leaves_the_outer_ones_patterns(self):
         self.begin("*.o")
         self.ctl("folder", "add", f"{self.root}/src", "--exclude", "build/")
@@ -217,6 +234,18 @@ class NestedTest(ExcludesTest):
         self.begin("src", path="src")
 
         self.assert_index(self.root, folders=[f"{self.root}/src"])
+
+    def test_what_is_gone_leaves_with_an_update_behind_which_it_is_deleted(self):
+        self.begin("build/")
+        self.ctl("pause")
+        shutil.rmtree(f"{self.root}/src")
+        self.ctl("event", "alpha", str(UPDATE), f"{self.root}/src", "--data", '{"audio":true}')
+        self.ctl("event", "alpha", str(DELETE), f"{self.root}/src")
+        self.ctl("resume")
+        self.await_drained("alpha")
+
+        self.assertEqual(self.ctl("verify", "alpha").out, b"")
+        self.assertNotIn(f"{self.root}/src".encode(), self.dump())
 
     def test_what_is_gone_leaves_while_an_inner_folder_stays(self):
         self.begin("build/")

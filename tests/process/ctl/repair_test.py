@@ -262,6 +262,18 @@ class RepairTest(IndexTest):
 
         self.mend()
 
+    def test_an_update_that_waits_does_the_work_of_what_it_swallows(self):
+        for name, replace in (("a.txt", None), ("d", None), ("x", os.mkfifo)):
+            with self.subTest(name=name):
+                self.ctl("event", "alpha", "CUSTOM_EVENT_UPDATE", self.path(name),
+                         "--data", '{"audio":true}')
+                path = self.path(name)
+                shutil.rmtree(path) if os.path.isdir(path) else os.unlink(path)
+                if replace:
+                    replace(path)
+
+                self.mend()
+
     def test_repair_while_the_daemon_runs(self):
         self.pid = self.start(debug=False)
         self.write("new")

@@ -2,6 +2,7 @@
 // Questions about paths on the platform that is shipped.
 #include "platform/paths.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -99,6 +100,20 @@ TEST_F(PathsTest, OfMountPointsOnlyDirectoriesAreNoOrdinaryEntries) {
   EXPECT_TRUE(TALO::FILEINDEX::CanFullPathBeIndexed(root + "/d/f"));
   EXPECT_FALSE(TALO::FILEINDEX::IsFileExist(QueuePath("s")));  // forgets what was seen
   EXPECT_FALSE(TALO::FILEINDEX::CanFullPathBeIndexed(root + "/d/mounted"));
+}
+
+// An update takes out what the index may still have of it.
+TEST_F(PathsTest, WhatIsGoneOrHasNoPlaceIsAskedAboutAllTheSame) {
+  ASSERT_EQ(mkfifo((root + "/d/pipe").c_str(), 0600), 0);
+  MakeFile(root + "/d/@eaDir/f");
+  fs::create_directory_symlink("d", root + "/link");
+  for (const char* below : {"/gone", "/d/pipe", "/d/@eaDir", "/d/@eaDir/gone", "/link/f"}) {
+    EXPECT_TRUE(TALO::FILEINDEX::IsSkipIndex(root + below) ||
+                !TALO::FILEINDEX::IsFileExist(root + below))
+        << below;
+    EXPECT_TRUE(TALO::FILEINDEX::CanFullPathBeIndexed(root + below)) << below;
+  }
+  EXPECT_FALSE(TALO::FILEINDEX::CanFullPathBeIndexed(folder));
 }
 
 TEST_F(PathsTest, ALinkIsNoQueueFile) {
