@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// Writing one share's contents. The content service alone does it; one thread.
+// Writing one share's contents. The content service alone does it; one thread at a time.
 //
 // Contents stand under a file's identity, not its path: a rename, a move, another hard link, a
 // reindex or a rebuilt entries database costs no reading. Changes gather in one transaction until

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/name_text.h"
 
+#include "base/ascii.h"
 #include "base/utf8.h"
 
 namespace fileindexd {
@@ -40,7 +41,7 @@ std::string NameFolder::Fold(std::string_view name, bool apart, std::vector<uint
   for (size_t at = 0; at < name.size();) {
     const auto byte = static_cast<unsigned char>(name[at]);
     if (byte < 0x80) {
-      text += static_cast<char>(byte >= 'A' && byte <= 'Z' ? byte + 0x20 : byte);
+      text += LowerLetter(name[at]);
       Note(origins, text, at);
       last = 0;
       ++at;

@@ -71,7 +71,7 @@ struct ShareFeed::Impl {
 
 void ShareFeed::Impl::Clear() {
   gatherer.Clear();
-  // Nothing is coarsened into its root: what is too much is dropped.
+  // Over all paths: nothing is coarsened into "/", and what is too much below it is dropped.
   backlog = std::make_unique<QueueFolding>(
       "/",
       [this](const std::string& directory, uint64_t limit) { return CountBelow(directory, limit); },

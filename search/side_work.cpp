@@ -3,6 +3,7 @@
 
 #include <sys/eventfd.h>
 
+#include <cassert>
 #include <system_error>
 #include <thread>
 #include <utility>
@@ -23,6 +24,7 @@ SideWork::~SideWork() {
 }
 
 bool SideWork::Begin(std::function<void()> work) {
+  assert(!IsRunning());
   auto begun = std::make_unique<Running>();
   ScopedFd ended(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
   if (ended.fd < 0) {

@@ -18,7 +18,7 @@ class SideWork {
   SideWork(const SideWork&) = delete;
   SideWork& operator=(const SideWork&) = delete;
 
-  // Nothing runs before. False when no thread can be had: the work is not done then.
+  // None may be running. False when no thread can be had: the work is not done then.
   bool Begin(std::function<void()> work);
   // Begun, and not awaited yet; its maker keeps off what it works on.
   bool IsRunning() const;

@@ -13,6 +13,7 @@
 #include "index/reader.h"
 #include "platform/log.h"
 #include "state/belonging.h"
+#include "state/layout.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {
@@ -180,6 +181,11 @@ bool RequestReindex(const std::string& share) {
 
 bool RecordReindex(const std::string& share) {
   return ChangeStatus(share, [](ShareStatus& status) { status.needs_reindex = true; });
+}
+
+const Share* FindShareOfPath(const Settings& settings, const std::string& path) {
+  const std::optional<std::string> normal = NormalPath(path);
+  return normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
 }
 
 bool IsRootAway(const std::string& share) {

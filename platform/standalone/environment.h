@@ -26,6 +26,9 @@ std::shared_ptr<const Settings> CurrentSettings();
 ShareStatus StatusOf(const std::string& share);
 bool ChangeStatus(const std::string& share, const std::function<void(ShareStatus&)>& change);
 
+// The share that a path lies in, however the path is written; null: none. The settings' own.
+const Share* FindShareOfPath(const Settings& settings, const std::string& path);
+
 // Makes the share's next pass a whole reindex, and sees to it that there is one. False when that
 // could not be recorded.
 bool RequestReindex(const std::string& share);

@@ -30,11 +30,6 @@ int CopyPath(const std::string& path, char* buffer, int size) {
   return 0;
 }
 
-const Share* FindShareOfPath(const Settings& settings, const std::string& path) {
-  const std::optional<std::string> normal = NormalPath(path);
-  return normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
-}
-
 // An index that was found missing may be made anew now that what fills it is on record, where no
 // power cut can reach it: else an index could be left that is new, empty and opens well.
 void AllowRebuild(const Share& share) {

@@ -5,11 +5,10 @@
 #include <cstdlib>
 #include <map>
 #include <mutex>
-#include <optional>
 #include <utility>
 
 #include "platform/log.h"
-#include "state/layout.h"
+#include "platform/standalone/environment.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {
@@ -65,8 +64,7 @@ bool IsShortage(int error) {
 }
 
 void NoteFailedLook(const Settings& settings, const std::string& path, int error) {
-  const std::optional<std::string> normal = NormalPath(path);
-  const Share* share = normal.has_value() ? settings.ShareOfPath(*normal) : nullptr;
+  const Share* share = FindShareOfPath(settings, path);
   if (share != nullptr && MarkShort(share->name)) {
     errno = error;
     FI_LOG("Share[%s] has to be indexed again, path=%s, reason=%m", share->name.c_str(),

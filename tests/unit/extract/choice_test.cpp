@@ -107,14 +107,7 @@ class ChoiceTest : public testing::Test {
   }
 
   static Found ReadNamed(const char* name, const std::string& bytes) {
-    const ScopedFd file(memfd_create("test", MFD_CLOEXEC));
-    EXPECT_EQ(write(file.fd, bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
-    ContentSink sink(1000);
-    Found found;
-    found.is_read =
-        ReadDocument({file.fd, name, static_cast<int64_t>(bytes.size()), 0}, sink, found.why);
-    found.content = sink.content;
-    return found;
+    return Read(ReadDocument, bytes, 1000, name);
   }
 };
 

@@ -20,12 +20,13 @@ struct Found {
   Content content;
 };
 
-inline Found Read(FormatReader reader, std::string_view bytes, size_t cap = 100'000) {
+inline Found Read(FormatReader reader, std::string_view bytes, size_t cap = 100'000,
+                  const char* name = "test") {
   const ScopedFd file(memfd_create("test", MFD_CLOEXEC));
   EXPECT_EQ(write(file.fd, bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
   ContentSink sink(cap);
   Found found;
-  found.is_read = reader({file.fd, "test", static_cast<int64_t>(bytes.size()), 0}, sink, found.why);
+  found.is_read = reader({file.fd, name, static_cast<int64_t>(bytes.size()), 0}, sink, found.why);
   found.content = sink.content;
   return found;
 }
