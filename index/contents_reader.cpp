@@ -107,7 +107,6 @@ IndexError ContentsReader::Open(const std::string& share_name) {
 
 IndexError ContentsReader::Failed(int code) {
   const IndexError error = FromSqlite(code);
-  TellWriter(share, error);
   TellContentsWriter(share, error);
   return error;
 }
@@ -117,6 +116,11 @@ bool ContentsReader::Refuse() {
   return false;
 }
 
+bool ContentsReader::RefuseBoth() {
+  TellWriter(share, FromSqlite(sqlite3_errcode(entries.db)));
+  return Refuse();
+}
+
 bool ContentsReader::Count(ContentCounts& counts) {
   Statement by_kind;
   Statement rate;
@@ -124,7 +128,7 @@ bool ContentsReader::Count(ContentCounts& counts) {
       rate.Prepare(entries.db,
                    "SELECT ifnull(sum(done), 0) FROM contents.rate WHERE second > ?1") !=
           SQLITE_OK) {
-    return Refuse();
+    return RefuseBoth();
   }
 
   ContentCounts read;
@@ -146,7 +150,7 @@ bool ContentsReader::Count(ContentCounts& counts) {
     code = rate.Step();
   }
   if (code != SQLITE_ROW) {
-    return Refuse();
+    return RefuseBoth();
   }
   read.done_last_minute = static_cast<uint64_t>(rate.Int(0));
   counts = read;
@@ -203,7 +207,7 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
                      " FROM contents.files AS files CROSS JOIN entries"
                      " ON " FILEINDEX_WANTED_FILE
                      " WHERE files.state >= 2 GROUP BY files.id") != SQLITE_OK) {
-    return Refuse();
+    return RefuseBoth();
   }
   int code = failed.Step();
   for (; code == SQLITE_ROW; code = failed.Step()) {
@@ -211,7 +215,7 @@ bool ContentsReader::ForEachFailed(const std::function<bool(const FailedContent&
       return true;
     }
   }
-  return code == SQLITE_DONE || Failed(code) == IndexError::NONE;
+  return code == SQLITE_DONE || RefuseBoth();
 }
 
 IndexError ContentsReader::Find(const Entry& entry, StoredContent& stored) {

@@ -72,9 +72,12 @@ class ContentsReader {
   IndexDatabase entries;  // with the contents attached as "contents"
 
  private:
-  // Tells who writes the contents, and who writes the entries, which are read beside them.
+  // Tells who writes the contents.
   IndexError Failed(int code);
-  bool Refuse();  // the same of SQLite's last error; false
+  // The same of SQLite's last error; false.
+  bool Refuse();
+  // Tells who writes the entries as well, for they were read beside the contents.
+  bool RefuseBoth();
 
   std::string share;
 };

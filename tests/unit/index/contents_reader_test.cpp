@@ -2,11 +2,13 @@
 #include "index/contents_reader.h"
 
 #include <gmock/gmock.h>
+#include <unistd.h>
 
 #include <tuple>
 
 #include "index/content_terms.h"
 #include "index/contents_schema.h"
+#include "index/suspicion.h"
 #include "index/text_tokenizer.h"
 #include "state/layout.h"
 #include "state/sqlite.h"
@@ -17,7 +19,12 @@ namespace {
 
 using testing::ElementsAre;
 
-class ContentsReaderTest : public ContentsTest {};
+class ContentsReaderTest : public ContentsTest {
+ protected:
+  static bool IsSuspected(const std::string& folder) {
+    return access((folder + "/" + SUSPICION_NOTE).c_str(), F_OK) == 0;
+  }
+};
 
 TEST_F(ContentsReaderTest, BeforeThereAreWordsThereAreNoContents) {
   contents.reset();
@@ -126,6 +133,23 @@ TEST_F(ContentsReaderTest, WhatCannotBeReadIsNoContent) {
 
   ASSERT_EQ(reader.Open("s"), IndexError::NONE);
   EXPECT_EQ(reader.Find(entry, stored), IndexError::DAMAGED);
+  EXPECT_TRUE(IsSuspected(ContentsPath("s")));
+  EXPECT_FALSE(IsSuspected(IndexPath("s"))) << "no entry was read";
+}
+
+TEST_F(ContentsReaderTest, WhatIsReadBesideTheEntriesMayBeTheirDamage) {
+  File("a.txt");
+  ASSERT_EQ(Jobs(), Names({"a.txt"}));
+  ASSERT_TRUE(contents->Fail(JobOf("a.txt").file, "damaged", {}, false));
+  ASSERT_TRUE(contents->Commit());
+  contents.reset();
+  DamageTable(ContentsPath("s") + "/" + CONTENTS_FORM.file, "files");
+  ContentsReader reader;
+
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  EXPECT_FALSE(reader.ForEachFailed([](const FailedContent&) { return true; }));
+  EXPECT_TRUE(IsSuspected(ContentsPath("s")));
+  EXPECT_TRUE(IsSuspected(IndexPath("s")));
 }
 
 // Beside the entries they are found as wrong as they are alone, and the entries stay usable.
