@@ -221,6 +221,8 @@ class ReadmeSessionTest(RunTest):
         export = export.replace(self.BUILT, os.environ["FILEINDEXD_BIN_DIR"])
 
         for prompt in prompts:
+            if "verify" in prompt:  # who types is slower than the service
+                self.ctl("search", "--wait", "name:holiday")
             command = f"{export}; {prompt}".replace(self.SHOWN, self.folder)
             done = subprocess.run(["bash", "-c", command], cwd=PROJECT, env=environment(),
                                   check=False, capture_output=True, timeout=LIMIT)
