@@ -27,7 +27,9 @@
 #include <utility>
 
 #include "index/query.h"
+#include "index/query_names.h"
 #include "index/query_parts.h"
+#include "index/query_piece.h"
 #include "index/query_slips.h"
 #include "index/query_times.h"
 
@@ -54,17 +56,11 @@ class Parser {
   bool ReadNot(QueryNode& node, size_t length, int depth);
   bool ReadFieldGroup(const NamedField& field, QueryNode& node, int depth);
   bool ReadLeaf(QueryNode& node, int depth);
-  bool ReadValue(const NamedField* field, Value& value);
-  bool ReadQuoted(Value& value);
-  void ReadBare(Value& value, bool in_list);
-  bool ReadList(Value& value);
-  bool EndsQuotes();
   const NamedField* TakeField();
 
   void SkipBlanks();
   bool IsAt(std::string_view keyword) const;  // as a word of its own
   bool IsNegation() const;
-  bool IsAtQuote() const { return at < text.size() && text[at] == '"'; }
   bool Fail(const std::string& what, size_t where);
 
   const std::string& text;
@@ -264,78 +260,6 @@ const NamedField* Parser::TakeField() {
   return field;
 }
 
-bool Parser::ReadQuoted(Value& value) {
-  const size_t start = at;
-  const size_t end = text.find('"', at + 1);
-  if (end == std::string::npos) {
-    return Fail("this quote is never closed", start);
-  }
-  value.text = text.substr(at + 1, end - at - 1);
-  value.at = at + 1;
-  value.is_quoted = true;
-  at = end + 1;
-  value.has_star = at < text.size() && text[at] == '*';
-  at += value.has_star ? 1 : 0;
-  return true;
-}
-
-// A bracket that a word itself opened belongs to it: "copy(1).txt".
-void Parser::ReadBare(Value& value, bool in_list) {
-  value.at = at;
-  int inside = 0;
-  while (at < text.size() && BlankAt(text, at) == 0) {
-    if (in_list && text.compare(at, 2, ",\"") == 0) {
-      break;
-    }
-    inside += text[at] == '(' ? 1 : 0;
-    if (text[at] == ')' && --inside < 0) {
-      if (open > 0) {
-        break;
-      }
-      inside = 0;
-    }
-    ++at;
-  }
-  value.text = text.substr(value.at, at - value.at);
-}
-
-// Texts in quotes and others, with commas between, as one text without its quotes.
-bool Parser::ReadList(Value& value) {
-  value.at = at + (IsAtQuote() ? 1 : 0);
-  while (true) {
-    Value part;
-    if (!IsAtQuote()) {
-      ReadBare(part, true);
-    } else if (!ReadQuoted(part)) {
-      return false;
-    }
-    value.text += part.text;
-    value.has_star = part.has_star;
-    const bool goes_on = at < text.size() && text[at] == ',' && !value.has_star;
-    if (!goes_on) {
-      return !part.is_quoted || EndsQuotes();
-    }
-    value.text += ',';
-    ++at;
-  }
-}
-
-bool Parser::EndsQuotes() {
-  return at == text.size() || BlankAt(text, at) > 0 || text[at] == ')' ||
-         Fail("a blank is missing behind what stands in quotes", at);
-}
-
-bool Parser::ReadValue(const NamedField* field, Value& value) {
-  if (field != nullptr && TakesList(field->field)) {
-    return ReadList(value);
-  }
-  if (IsAtQuote()) {
-    return ReadQuoted(value) && EndsQuotes();
-  }
-  ReadBare(value, false);
-  return true;
-}
-
 bool Parser::ReadLeaf(QueryNode& node, int depth) {
   const size_t start = at;
   const NamedField* field = TakeField();
@@ -359,11 +283,13 @@ bool Parser::ReadLeaf(QueryNode& node, int depth) {
   node.start = start;
   node.shared_field = shared == nullptr ? nullptr : shared->name;
   field = field == nullptr ? shared : field;
+  PieceReader reader(text, at, open > 0, error);
   Value value;
-  if (!ReadValue(field, value)) {
+  const bool is_list = field != nullptr && TakesList(field->field);
+  if (is_list ? !reader.ReadList(value) : !reader.ReadOne(value)) {
     return false;
   }
-  node.end = at;
+  at = node.end = reader.at;
   return field == nullptr ? FillWords(value, node, error)
                           : FillField(*field, value, now, node, error);
 }

@@ -18,8 +18,7 @@ struct Value {
   bool has_star = false;  // behind the quotes
 };
 
-// Set all of the node but its place. False, and `error` says why.
-bool FillWords(const Value& value, QueryNode& node, QueryError& error);
+// Sets all of the node but its place. False, and `error` says why.
 bool FillField(const NamedField& field, const Value& value, time_t now, QueryNode& node,
                QueryError& error);
 

@@ -1,0 +1,130 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/query_names.h"
+
+#include <utility>
+
+#include "index/query_piece.h"
+#include "index/text_characters.h"
+
+namespace fileindexd {
+
+namespace {
+
+bool Fail(QueryError& error, const std::string& what, size_t at) {
+  error = {what, at};
+  return false;
+}
+
+// Whether the tables have words for it.
+bool HoldsWords(std::string_view text) {
+  for (size_t at = 0; at < text.size();) {
+    const Character character = CharacterAt(text, at);
+    const CharacterClass type = character.code < 0x80
+                                    ? ASCII_CLASSES[static_cast<size_t>(character.code)]
+                                    : ClassOf(character.code);
+    if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK &&
+        type != CharacterClass::JOINER) {
+      return true;
+    }
+    at += character.size;
+  }
+  return false;
+}
+
+bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
+  if (value.text.find_first_not_of('*') == std::string::npos) {
+    return Fail(error, "'*' needs something to begin with, as in rep*", value.at);
+  }
+  node.part = Part::NAME_PATTERN;
+  node.pieces = {value.text.substr(0, value.text.find_last_not_of('*') + 1)};
+  return true;
+}
+
+// "*part*", "*.pdf", "a*b".
+bool FillPattern(const Value& value, Part part, QueryNode& node, QueryError& error) {
+  node.part = part;
+  for (std::string& piece : SplitAt(value.text, '*')) {
+    if (!piece.empty()) {
+      node.pieces.push_back(std::move(piece));
+    }
+  }
+  return !node.pieces.empty() ||
+         Fail(error, "'*' alone stands for everything; add a part, as in name:*part*", value.at);
+}
+
+bool HoldsNoSlash(const Value& value, QueryError& error) {
+  const size_t slash = value.text.find('/');
+  return slash == std::string::npos ||
+         Fail(error, "no name holds a '/'; path: looks in whole paths", value.at + slash);
+}
+
+}  // namespace
+
+// In quotes a star says nothing, nor is it part of any word.
+bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
+  const size_t end = value.text.find_last_not_of('*') + 1;
+  const size_t star = value.text.find('*');
+  if (!value.is_quoted && star < end) {
+    return Fail(error, "'*' stands at the end of a word; names with gaps are found by name:inv*ce",
+                value.at + star);
+  }
+  if (!HoldsWords(value.text)) {
+    if (value.text.empty() && value.is_quoted) {
+      return Fail(error, "nothing stands between the quotes", value.at - 1);
+    }
+    if (node.scope == Scope::FIELD || node.scope == Scope::TEXT) {
+      return Fail(error, Cited(value.text) + " is no word", value.at);
+    }
+    return FillSign(value, node, error);
+  }
+  node.part = Part::WORD;
+  node.text_at = value.at;
+  node.text = value.is_quoted ? value.text.substr(0, end) : value.text;
+  node.is_phrase = value.is_quoted;
+  node.is_beginning = value.is_quoted ? value.has_star : value.text.ends_with('*');
+  return true;
+}
+
+// In quotes it is the whole name, but for what a '*' stands for.
+bool FillName(const Value& value, QueryNode& node, QueryError& error) {
+  const size_t star = value.text.find('*');
+  const bool is_beginning = !value.is_quoted && star + 1 == value.text.size();
+  if ((star != std::string::npos && !is_beginning) || value.has_star) {
+    node.at_start = value.text.front() != '*';
+    node.at_end = value.text.back() != '*' && !value.has_star;
+    return HoldsNoSlash(value, error) && FillPattern(value, Part::NAME_PATTERN, node, error);
+  }
+  if (value.is_quoted) {
+    if (!HoldsNoSlash(value, error)) {
+      return false;
+    }
+    node.part = Part::EXACT_NAME;
+    node.text_at = value.at;
+    node.text = value.text;
+    return true;
+  }
+  node.scope = Scope::NAME;
+  return FillWords(value, node, error);
+}
+
+bool FillPath(const Value& value, QueryNode& node, QueryError& error) {
+  return FillPattern(value, Part::PATH, node, error);
+}
+
+bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
+  node.part = Part::EXT;
+  node.names = SplitAt(value.text, ',');
+  for (std::string& name : node.names) {
+    name.erase(0, name.starts_with('.') ? 1 : 0);
+    if (name.find('*') != std::string::npos) {
+      return Fail(error, "ext: takes no '*'; names with gaps are found by name:*.jp*", value.at);
+    }
+    if (name.empty() || name.find('/') != std::string::npos) {
+      return Fail(error, Cited(value.text) + " is no ending of names like pdf or jpg,png",
+                  value.at);
+    }
+  }
+  return true;
+}
+
+}  // namespace fileindexd

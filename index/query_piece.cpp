@@ -1,0 +1,93 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/query_piece.h"
+
+#include "index/query_slips.h"
+
+namespace fileindexd {
+
+bool PieceReader::Fail(const std::string& what, size_t where) {
+  error = {what, where};
+  return false;
+}
+
+bool PieceReader::ReadQuoted(Value& value) {
+  const size_t start = at;
+  const size_t end = text.find('"', at + 1);
+  if (end == std::string::npos) {
+    return Fail("this quote is never closed", start);
+  }
+  value.text = text.substr(at + 1, end - at - 1);
+  value.at = at + 1;
+  value.is_quoted = true;
+  at = end + 1;
+  value.has_star = at < text.size() && text[at] == '*';
+  at += value.has_star ? 1 : 0;
+  return true;
+}
+
+// A bracket that a word itself opened belongs to it: "copy(1).txt".
+void PieceReader::ReadBare(Value& value, bool in_list) {
+  value.at = at;
+  int inside = 0;
+  while (at < text.size() && BlankAt(text, at) == 0) {
+    if (in_list && text.compare(at, 2, ",\"") == 0) {
+      break;
+    }
+    inside += text[at] == '(' ? 1 : 0;
+    if (text[at] == ')' && --inside < 0) {
+      if (is_inside) {
+        break;
+      }
+      inside = 0;
+    }
+    ++at;
+  }
+  value.text = text.substr(value.at, at - value.at);
+}
+
+bool PieceReader::EndsQuotes() {
+  return at == text.size() || BlankAt(text, at) > 0 || text[at] == ')' ||
+         Fail("a blank is missing behind what stands in quotes", at);
+}
+
+bool PieceReader::ReadOne(Value& value) {
+  if (IsAtQuote()) {
+    return ReadQuoted(value) && EndsQuotes();
+  }
+  ReadBare(value, false);
+  return true;
+}
+
+bool PieceReader::ReadList(Value& value) {
+  value.at = at + (IsAtQuote() ? 1 : 0);
+  while (true) {
+    Value part;
+    if (!IsAtQuote()) {
+      ReadBare(part, true);
+    } else if (!ReadQuoted(part)) {
+      return false;
+    }
+    value.text += part.text;
+    value.has_star = part.has_star;
+    const bool goes_on = at < text.size() && text[at] == ',' && !value.has_star;
+    if (!goes_on) {
+      return !part.is_quoted || EndsQuotes();
+    }
+    value.text += ',';
+    ++at;
+  }
+}
+
+std::vector<std::string> SplitAt(std::string_view text, char separator) {
+  std::vector<std::string> parts;
+  while (true) {
+    const size_t end = text.find(separator);
+    parts.emplace_back(text.substr(0, end));
+    if (end == std::string_view::npos) {
+      return parts;
+    }
+    text.remove_prefix(end + 1);
+  }
+}
+
+}  // namespace fileindexd

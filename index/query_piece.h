@@ -1,0 +1,42 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// A word or a value of a question as it is written: bare, in quotes, or several with commas
+// between.
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "index/query_parts.h"
+
+namespace fileindexd {
+
+class PieceReader {
+ public:
+  // Reads from that byte on. `in_brackets`: the first ')' that a bare word has not opened itself
+  // stands behind it. The text stays as long as the reader.
+  PieceReader(const std::string& question, size_t start, bool in_brackets, QueryError& failure)
+      : at(start), text(question), is_inside(in_brackets), error(failure) {}
+
+  // False when it makes no sense, and the error says why.
+  bool ReadOne(Value& value);
+  bool ReadList(Value& value);  // as one text without its quotes
+
+  size_t at;  // behind what was read
+
+ private:
+  bool ReadQuoted(Value& value);
+  void ReadBare(Value& value, bool in_list);
+  bool EndsQuotes();
+  bool IsAtQuote() const { return at < text.size() && text[at] == '"'; }
+  bool Fail(const std::string& what, size_t where);
+
+  const std::string& text;
+  bool is_inside;
+  QueryError& error;
+};
+
+// What stands between separators, in front of the first and behind the last: one at least.
+std::vector<std::string> SplitAt(std::string_view text, char separator);
+
+}  // namespace fileindexd
