@@ -1,8 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/query_names.h"
 
+#include <cstdio>
 #include <utility>
 
+#include "index/name_text.h"
 #include "index/query_piece.h"
 #include "index/text_characters.h"
 
@@ -31,25 +33,42 @@ bool HoldsWords(std::string_view text) {
   return false;
 }
 
+// Accents and what is not seen are of no account: alone they would stand in every name.
+bool IsOfAccount(std::string_view text, size_t at, QueryError& error) {
+  if (!NameFolder().Parts(text).empty()) {
+    return true;
+  }
+  char code[16];
+  (void)snprintf(code, sizeof code, "U+%04X", static_cast<unsigned>(CharacterAt(text, 0).code));
+  return Fail(error,
+              std::string(code) +
+                  " alone is nothing to search for: accents and what is not seen do not count",
+              at);
+}
+
 bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
   if (value.text.find_first_not_of('*') == std::string::npos) {
     return Fail(error, "'*' needs something to begin with, as in rep*", value.at);
   }
   node.part = Part::NAME_PATTERN;
   node.pieces = {value.text.substr(0, value.text.find_last_not_of('*') + 1)};
-  return true;
+  return IsOfAccount(node.pieces.front(), value.at, error);
 }
 
 // "*part*", "*.pdf", "a*b".
 bool FillPattern(const Value& value, Part part, QueryNode& node, QueryError& error) {
   node.part = part;
+  std::string letters;
   for (std::string& piece : SplitAt(value.text, '*')) {
     if (!piece.empty()) {
+      letters += piece;
       node.pieces.push_back(std::move(piece));
     }
   }
-  return !node.pieces.empty() ||
-         Fail(error, "'*' alone stands for everything; add a part, as in name:*part*", value.at);
+  if (node.pieces.empty()) {
+    return Fail(error, "'*' alone stands for everything; add a part, as in name:*part*", value.at);
+  }
+  return IsOfAccount(letters, value.at + value.text.find_first_not_of('*'), error);
 }
 
 bool HoldsNoSlash(const Value& value, QueryError& error) {
@@ -76,6 +95,10 @@ bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
       return Fail(error, Cited(value.text) + " is no word", value.at);
     }
     return FillSign(value, node, error);
+  }
+  // A mark of Arabic as a letter of its own.
+  if (!IsOfAccount(std::string_view(value.text).substr(0, end), value.at, error)) {
+    return false;
   }
   node.part = Part::WORD;
   node.text_at = value.at;
@@ -122,6 +145,9 @@ bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
     if (name.empty() || name.find('/') != std::string::npos) {
       return Fail(error, Cited(value.text) + " is no ending of names like pdf or jpg,png",
                   value.at);
+    }
+    if (!IsOfAccount(name, value.at, error)) {
+      return false;
     }
   }
   return true;

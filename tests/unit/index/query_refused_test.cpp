@@ -178,6 +178,41 @@ TEST_F(QueryRefusedTest, SenselessQuestionsSayWhere) {
   });
 }
 
+// Folded as names are, nothing is left of it, and nothing stands in every name.
+TEST_F(QueryRefusedTest, WhatIsNotSeenIsNothingToSearchFor) {
+  for (const std::string sign :
+       {"\u200b", "\ufeff", "\u00ad", "\u200d", "\u200e", "\u202e", "\ufe0f", "\u2060", "\u0301",
+        "\u20dd", "\ufe77", "\u0301\u200b"}) {
+    ExpectAll({
+        {sign, "?0"},
+        {sign + "*", "?0"},
+        {"\"" + sign + "\"", "?1"},
+        {"report " + sign, "?7"},
+        {"report -" + sign, "?8"},
+        {"kind:document -(a OR " + sign + ")", "?21"},
+        {"name:" + sign, "?5"},
+        {"name:" + sign + "*", "?5"},
+        {"name:*" + sign + "*", "?6"},
+        {"name:*" + sign + "*" + sign + "*", "?6"},
+        {"name:(" + sign + ")", "?6"},
+        {"name:\"" + sign + "\"*", "?6"},
+        {"path:" + sign, "?5"},
+        {"path:**" + sign, "?7"},
+        {"path:\"" + sign + "\"", "?6"},
+        {"ext:" + sign, "?4"},
+        {"ext:." + sign, "?4"},
+        {"ext:pdf," + sign, "?4"},
+        {"text:" + sign, "?5"},
+        {"title:" + sign, "?6"},
+        {"a" + sign, "a" + sign},
+        {"name:*a*" + sign + "*", "name:*a*" + sign + "*"},
+    });
+  }
+  EXPECT_EQ(LineOf("a \u200b"),
+            "a \u200b: U+200B alone is nothing to search for: accents and what is not seen do not "
+            "count (character 3, at: \u200b)");
+}
+
 TEST_F(QueryRefusedTest, RangesThatNothingCanLieInAreRefused) {
   ExpectAll({
       {"size:<0", "?5"},
