@@ -1,0 +1,104 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What can only be meant otherwise than it is written.
+#include <map>
+
+#include "tests/unit/index/query_parse_fixture.h"
+
+namespace fileindexd {
+
+class QuerySlipsTest : public QueryParseTest {};
+
+// Fields' names with a slip in them.
+TEST_F(QuerySlipsTest, WhatCanOnlyBeMeantForAFieldIsRefused) {
+  ExpectAll({
+      {"sise:>1G", "?0"},        {"a -sise:1G", "?3"},   {"(sise:1G)", "?1"},
+      {"autor:x", "?0"},         {"form:bob", "?0"},     {"tags:sea", "?0"},
+      {"undr:/srv/data", "?0"},  {"a undr:/srv", "?2"},  {"shere:/x", "?0"},
+      {"SIEZ:1M", "?0"},         {"exxt:pdf", "?0"},     {"kidn:video", "?0"},
+      {"-(a kidn:video)", "?4"}, {"modifed:2024", "?0"}, {"modifide:2024", "?0"},
+      {"artits:x", "?0"},        {"durasoin:>3m", "?0"}, {"foo:>3", "?0"},
+      {"foo:<=3", "?0"},         {"foo:\"a b\"", "?0"},  {"c:\"a b\"", "?0"},
+  });
+  EXPECT_EQ(LineOf("a sise:>1G"),
+            "a sise:>1G: there is no field 'sise'; 'size'? (a word with a colon stands in quotes) "
+            "(character 3, at: sise:>1G)");
+}
+
+// Of several the one that is listed first.
+TEST_F(QuerySlipsTest, TheFieldThatIsNearestIsNamed) {
+  for (const auto& [text, meant] : std::map<std::string, std::string>{{"kidn:x", "kind"},
+                                                                      {"albm:x", "album"},
+                                                                      {"keywrod:x", "keyword"},
+                                                                      {"keywrods:x", "keywords"},
+                                                                      {"heigth:5", "height"},
+                                                                      {"widht:5", "width"},
+                                                                      {"brtrate:5", "bitrate"}}) {
+    const std::string what = ErrorOf(text).what;
+    EXPECT_NE(what.find("; '" + meant + "'?"), std::string::npos) << text << ": " << what;
+  }
+  EXPECT_EQ(Parsed("keyword2:x"), "keyword2:x");
+}
+
+TEST_F(QuerySlipsTest, WordsWithColonsAreWords) {
+  ExpectAll({
+      {"http://x", "http://x"},
+      {"https://example.org/a?b=c:d", "https://example.org/a?b=c:d"},
+      {"file:///x", "file:///x"},
+      {"texts://x", "texts://x"},
+      {"fs::path id::x tags::", "(fs::path id::x tags::)"},
+      {"C:\\x c:/y x:y c:", "(C:\\x c:/y x:y c:)"},
+      {"12:30", "12:30"},
+      {"std:vector std:move", "(std:vector std:move)"},
+      {"go:generate id:5", "(go:generate id:5)"},
+      {"number:5 computer:7", "(number:5 computer:7)"},
+      {"atrits:x durattoin:3m", "(atrits:x durattoin:3m)"},
+      {"exr:pdf SIZ:1 si:x us:x", "(exr:pdf SIZ:1 si:x us:x)"},
+      {"todo:x note:x main:x", "(todo:x note:x main:x)"},
+      {"knsid:x", "knsid:x"},
+      {"modfd:x", "modfd:x"},
+      {"Note: exr: size", "(Note: exr: size)"},
+      {"\"size:pdf\" \"exxt:pdf\"", "(\"size:pdf\" \"exxt:pdf\")"},
+  });
+}
+
+TEST_F(QuerySlipsTest, FieldsWithoutTheirColonAreRefused) {
+  ExpectAll({
+      {"size>10M", "?0"},
+      {"a Width<100", "?2"},
+      {"modified>=2024", "?0"},
+      {"size=10M", "?0"},
+      {"a size==10M", "?2"},
+      {"modified<2024", "?0"},
+      {"ext=pdf", "?0"},
+      {"a -ext=pdf", "?3"},
+      {"(kind=video)", "?1"},
+      {"name<x", "?0"},
+      {"title=\"moby dick\"", "?0"},
+      {"from<x", "?0"},
+      {"size> 10M", "?0"},
+      {"size=", "?0"},
+      {"xsize>10", "xsize>10"},
+      {"a=b sizes=1 a<b x>=y", "(a=b sizes=1 a<b x>=y)"},
+      {"size-x=1 size_=1 \"size=10M\"", "(size-x=1 size_=1 \"size=10M\")"},
+      {"ext!=pdf", "ext!=pdf"},
+      {"a=size=1", "a=size=1"},
+  });
+  for (const auto& [text, form] :
+       std::map<std::string, std::string>{{"size=10M", "size:10M"},
+                                          {"size==10M", "size:10M"},
+                                          {"a SIZE>10M b", "size:>10M"},
+                                          {"(size>=10M)", "size:>=10M"},
+                                          {"size=>10M", "size:>=10M"},
+                                          {"size=<10M", "size:<=10M"},
+                                          {"modified<2024 x", "modified:<2024"},
+                                          {"ext=pdf", "ext:pdf"},
+                                          {"tag>sea", "tag:sea"},
+                                          {"title=\"moby dick\" x", "title:\"moby dick\""},
+                                          {"title=\"moby", "title:\"moby"}}) {
+    const std::string what = ErrorOf(text).what;
+    EXPECT_NE(what.find(", as in " + form + " ("), std::string::npos) << text << ": " << what;
+    EXPECT_NE(what.find("in quotes"), std::string::npos) << what;
+  }
+}
+
+}  // namespace fileindexd
