@@ -20,27 +20,55 @@ std::string_view ValueAt(std::string_view text) {
   return text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
 }
 
-// "size>10M".
-std::string WhyColonIsMissing(std::string_view text) {
-  const size_t letters = LettersAtStart(text);
-  const size_t end = std::min(text.find_first_not_of("<>=", letters), text.size());
-  const NamedField* field = end > letters ? FindField(text.substr(0, letters)) : nullptr;
-  if (field == nullptr) {
-    return "";
+// The sign between a field and its value that stands at that byte: a comparison, or a colon that a
+// blank parts from its field. Not the eyes of a face, nor the colons of "std ::x".
+size_t SignAt(std::string_view text, size_t at, bool is_apart) {
+  const std::string_view rest = text.substr(at);
+  if (rest.starts_with("!=")) {
+    return 2;
   }
-  const std::string_view compared = text.substr(letters, end - letters);
-  const std::string_view value = ValueAt(text.substr(end));
-  std::string form = std::string(field->name) + ":";
-  if (TakesRange(field->field)) {
+  if (rest.starts_with(':')) {
+    const bool is_other =
+        rest.starts_with("::") || rest.starts_with(":)") || rest.starts_with(":-)");
+    return is_apart && !is_other ? 1 : 0;
+  }
+  return std::min(rest.find_first_not_of("<>="), rest.size());
+}
+
+// As it should have been written: "size:>10M".
+std::string WrittenForm(const NamedField& field, std::string_view compared,
+                        std::string_view value) {
+  std::string form = compared == "!=" ? "-" : "";
+  form.append(field.name).append(":");
+  if (TakesRange(field.field)) {
     const size_t sign = compared.find_first_of("<>");
     const bool is_compared = sign != std::string_view::npos;
     form += is_compared ? std::string(1, compared[sign]) : "";
     form += is_compared && compared.find('=') != std::string_view::npos ? "=" : "";
   }
-  form += Shortened(value);
-  return "a colon is missing behind " + Cited(text.substr(0, letters)) +
-         (value.empty() ? "" : ", as in " + form) + " (a word with " + compared.front() +
-         " stands in quotes)";
+  return form + Shortened(value);
+}
+
+// "size>10M", "size > 10M", "text : whale".
+std::string WhyColonIsMissing(std::string_view text) {
+  const size_t letters = LettersAtStart(text);
+  const size_t start = SkipBlanksAt(text, letters);
+  const bool is_apart = start > letters;
+  const size_t size = letters > 0 && start < text.size() ? SignAt(text, start, is_apart) : 0;
+  const NamedField* field = size > 0 ? FindField(text.substr(0, letters)) : nullptr;
+  if (field == nullptr) {
+    return "";
+  }
+  const size_t value_at = SkipBlanksAt(text, start + size);
+  const std::string_view compared = text.substr(start, size);
+  const std::string_view value = ValueAt(text.substr(value_at));
+  const std::string example =
+      value.empty() ? "" : ", as in " + WrittenForm(*field, compared, value);
+  const std::string name = Cited(text.substr(0, letters));
+  return is_apart ? "behind the field " + name + " stands a colon and no blank" + example +
+                        " (as a word it stands in quotes)"
+                  : "a colon is missing behind " + name + example + " (a word with " +
+                        compared.front() + " stands in quotes)";
 }
 
 // "sise:10M", "foo:>3".

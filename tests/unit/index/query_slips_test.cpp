@@ -80,8 +80,9 @@ TEST_F(QuerySlipsTest, FieldsWithoutTheirColonAreRefused) {
       {"xsize>10", "xsize>10"},
       {"a=b sizes=1 a<b x>=y", "(a=b sizes=1 a<b x>=y)"},
       {"size-x=1 size_=1 \"size=10M\"", "(size-x=1 size_=1 \"size=10M\")"},
-      {"ext!=pdf", "ext!=pdf"},
-      {"a=size=1", "a=size=1"},
+      {"ext!=pdf", "?0"},
+      {"a size!=10M", "?2"},
+      {"a=size=1 a!=b size!", "(a=size=1 a!=b size!)"},
   });
   for (const auto& [text, form] :
        std::map<std::string, std::string>{{"size=10M", "size:10M"},
@@ -94,7 +95,50 @@ TEST_F(QuerySlipsTest, FieldsWithoutTheirColonAreRefused) {
                                           {"ext=pdf", "ext:pdf"},
                                           {"tag>sea", "tag:sea"},
                                           {"title=\"moby dick\" x", "title:\"moby dick\""},
-                                          {"title=\"moby", "title:\"moby"}}) {
+                                          {"title=\"moby", "title:\"moby"},
+                                          {"size!=10M", "-size:10M"},
+                                          {"ext!=pdf", "-ext:pdf"},
+                                          {"size> 10M", "size:>10M"}}) {
+    const std::string what = ErrorOf(text).what;
+    EXPECT_NE(what.find(", as in " + form + " ("), std::string::npos) << text << ": " << what;
+    EXPECT_NE(what.find("in quotes"), std::string::npos) << what;
+  }
+}
+
+TEST_F(QuerySlipsTest, BlanksDoNotPartAFieldFromItsColonOrComparison) {
+  ExpectAll({
+      {"kind:video size >10M", "?11"},
+      {"size > 10M", "?0"},
+      {"a size <=10M b", "?2"},
+      {"size =10M", "?0"},
+      {"size != 10M", "?0"},
+      {"a -size > 10M", "?3"},
+      {"(size >10M)", "?1"},
+      {"name:(a size > 1)", "?8"},
+      {"text : whale", "?0"},
+      {"text :whale", "?0"},
+      {"text :", "?0"},
+      {"Size\u3000> 10M", "?0"},
+      {"name:size > 10M", "(name:size name:*>* 10M)"},
+      {"size 10M", "(size 10M)"},
+      {"size", "size"},
+      {"a size b", "(a size b)"},
+      {"size - 10M", "(size name:*-* 10M)"},
+      {"size -10M", "(size -10M)"},
+      {"sizes > 10M", "(sizes name:*>* 10M)"},
+      {"\"size\" > 10M", "(\"size\" name:*>* 10M)"},
+      {"text ::x", "(text ::x)"},
+      {"text ! x", "(text name:*!* x)"},
+      {"(name) > x", "(name name:*>* x)"},
+  });
+  for (const auto& [text, form] :
+       std::map<std::string, std::string>{{"size > 10M", "size:>10M"},
+                                          {"a size >=10M b", "size:>=10M"},
+                                          {"size = 10M", "size:10M"},
+                                          {"size != 10M", "-size:10M"},
+                                          {"text : whale", "text:whale"},
+                                          {"text :\"a b\"", "text:\"a b\""},
+                                          {"text =x", "text:x"}}) {
     const std::string what = ErrorOf(text).what;
     EXPECT_NE(what.find(", as in " + form + " ("), std::string::npos) << text << ": " << what;
     EXPECT_NE(what.find("in quotes"), std::string::npos) << what;
