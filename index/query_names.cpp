@@ -110,17 +110,17 @@ bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
 
 // In quotes it is the whole name, but for what a '*' stands for.
 bool FillName(const Value& value, QueryNode& node, QueryError& error) {
+  if (!HoldsNoSlash(value, error)) {
+    return false;
+  }
   const size_t star = value.text.find('*');
   const bool is_beginning = !value.is_quoted && star + 1 == value.text.size();
   if ((star != std::string::npos && !is_beginning) || value.has_star) {
     node.at_start = value.text.front() != '*';
     node.at_end = value.text.back() != '*' && !value.has_star;
-    return HoldsNoSlash(value, error) && FillPattern(value, Part::NAME_PATTERN, node, error);
+    return FillPattern(value, Part::NAME_PATTERN, node, error);
   }
   if (value.is_quoted) {
-    if (!HoldsNoSlash(value, error)) {
-      return false;
-    }
     node.part = Part::EXACT_NAME;
     node.text_at = value.at;
     node.text = value.text;
@@ -136,17 +136,16 @@ bool FillPath(const Value& value, QueryNode& node, QueryError& error) {
 
 bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::EXT;
-  node.names = SplitAt(value.text, ',');
-  for (std::string& name : node.names) {
+  for (const Value& one : NamesIn(value)) {
+    std::string& name = node.names.emplace_back(one.text);
     name.erase(0, name.starts_with('.') ? 1 : 0);
     if (name.find('*') != std::string::npos) {
-      return Fail(error, "ext: takes no '*'; names with gaps are found by name:*.jp*", value.at);
+      return Fail(error, "ext: takes no '*'; names with gaps are found by name:*.jp*", one.at);
     }
     if (name.empty() || name.find('/') != std::string::npos) {
-      return Fail(error, Cited(value.text) + " is no ending of names like pdf or jpg,png",
-                  value.at);
+      return Fail(error, Cited(value.text) + " is no ending of names like pdf or jpg,png", one.at);
     }
-    if (!IsOfAccount(name, value.at, error)) {
+    if (!IsOfAccount(name, one.at, error)) {
       return false;
     }
   }

@@ -27,11 +27,18 @@ bool Fail(QueryError& error, const std::string& what, size_t at) {
   return false;
 }
 
+// A share's name may hold commas: in quotes it is taken whole.
 bool FillShare(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::SHARE;
-  node.names = SplitAt(value.text, ',');
-  return std::all_of(node.names.begin(), node.names.end(), IsValidShareName) ||
-         Fail(error, Cited(value.text) + " is no name of a share", value.at);
+  for (const Value& part : value.listed) {
+    for (const Value& name : part.is_quoted ? std::vector{part} : AtCommas(part)) {
+      if (!IsValidShareName(name.text)) {
+        return Fail(error, Cited(name.text) + " is no name of a share", name.at);
+      }
+      node.names.push_back(name.text);
+    }
+  }
+  return true;
 }
 
 bool FillRange(Column column, const Value& value, time_t now, QueryNode& node, QueryError& error) {
@@ -63,13 +70,14 @@ bool FillNear(const Value& value, QueryNode& node, QueryError& error) {
 
 bool FillKind(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::KIND;
-  for (std::string& name : SplitAt(value.text, ',')) {
-    std::transform(name.begin(), name.end(), name.begin(), LowerLetter);
-    const std::optional<Kind> kind = KindFromText(name);
+  for (Value& name : NamesIn(value)) {
+    std::string& text = name.text;
+    std::transform(text.begin(), text.end(), text.begin(), LowerLetter);
+    const std::optional<Kind> kind = KindFromText(text);
     if (!kind.has_value()) {
       return Fail(error,
-                  Cited(name) + " is no kind: document, audio, video, photo, other or folder",
-                  value.at);
+                  Cited(text) + " is no kind: document, audio, video, photo, other or folder",
+                  name.at);
     }
     node.numbers.push_back(static_cast<int64_t>(*kind));
   }
@@ -101,17 +109,17 @@ int UserNumber(const std::string& name, std::optional<int64_t>& number) {
 
 bool FillOwner(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::OWNER;
-  for (const std::string& name : SplitAt(value.text, ',')) {
+  for (const Value& name : NamesIn(value)) {
     std::optional<int64_t> user;
-    const int failed = UserNumber(name, user);
+    const int failed = UserNumber(name.text, user);
     if (failed != 0) {
       return Fail(error,
-                  "cannot look up the user " + Cited(name) + ": " +
+                  "cannot look up the user " + Cited(name.text) + ": " +
                       std::generic_category().message(failed) + "; a number needs none",
-                  value.at);
+                  name.at);
     }
     if (!user.has_value()) {
-      return Fail(error, "there is no user " + Cited(name), value.at);
+      return Fail(error, "there is no user " + Cited(name.text), name.at);
     }
     node.numbers.push_back(*user);
   }

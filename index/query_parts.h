@@ -4,6 +4,7 @@
 
 #include <ctime>
 #include <string>
+#include <vector>
 
 #include "index/query.h"
 #include "index/query_fields.h"
@@ -16,6 +17,8 @@ struct Value {
   size_t at = 0;     // byte of the question
   bool is_quoted = false;
   bool has_star = false;  // behind the quotes
+  // Of a list, what stands in quotes and what stands bare in between, commas in it as well.
+  std::vector<Value> listed;
 };
 
 // Sets all of the node but its place. False, and `error` says why.

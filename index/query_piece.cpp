@@ -70,6 +70,7 @@ bool PieceReader::ReadList(Value& value) {
     value.text += part.text;
     value.has_star = part.has_star;
     const bool goes_on = at < text.size() && text[at] == ',' && !value.has_star;
+    value.listed.push_back(part);
     if (!goes_on) {
       return !part.is_quoted || EndsQuotes();
     }
@@ -88,6 +89,28 @@ std::vector<std::string> SplitAt(std::string_view text, char separator) {
     }
     text.remove_prefix(end + 1);
   }
+}
+
+std::vector<Value> AtCommas(const Value& value) {
+  std::vector<Value> names;
+  size_t at = value.at;
+  for (const std::string& text : SplitAt(value.text, ',')) {
+    Value& name = names.emplace_back();
+    name.text = text;
+    name.at = at;
+    name.is_quoted = value.is_quoted;
+    at += text.size() + 1;
+  }
+  return names;
+}
+
+std::vector<Value> NamesIn(const Value& list) {
+  std::vector<Value> names;
+  for (const Value& part : list.listed) {
+    const std::vector<Value> parted = AtCommas(part);
+    names.insert(names.end(), parted.begin(), parted.end());
+  }
+  return names;
 }
 
 }  // namespace fileindexd

@@ -38,5 +38,9 @@ class PieceReader {
 
 // What stands between separators, in front of the first and behind the last: one at least.
 std::vector<std::string> SplitAt(std::string_view text, char separator);
+// The same of a value with commas, each with its place.
+std::vector<Value> AtCommas(const Value& value);
+// Of a list that was read: commas part in quotes as well.
+std::vector<Value> NamesIn(const Value& list);
 
 }  // namespace fileindexd

@@ -51,6 +51,14 @@ class SearchTest(IndexTest):
         self.assertEqual(self.hits("share:gamma,beta", "beach"), ["beta/beach.txt"])
         self.ctl("search", "share:delta", "beach", code=2)
 
+    def test_a_share_with_a_comma_in_its_name_is_named_in_quotes(self):
+        os.mkdir(f"{namespace.DATA}/gamma")
+        self.ctl("share", "add", "alpha,old", f"{namespace.DATA}/gamma")
+
+        self.assertEqual(self.hits('share:"alpha,old"', "beach"), [])
+        self.assertEqual(self.hits('share:"alpha,old",beta', "beach"), ["beta/beach.txt"])
+        self.ctl("search", "share:alpha,old", "beach", code=2)
+
     def test_several_words_are_joined(self):
         self.assertEqual(self.hits("beach", "boys"), ["alpha/music/beach boys.mp3"])
         self.assertEqual(self.hits("beach boys"), ["alpha/music/beach boys.mp3"])

@@ -164,7 +164,22 @@ TEST_F(QueryParseTest, SeveralValuesMayStandInQuotes) {
       {"ext:\"txt\",\"gz\"", "ext:txt,gz"},
       {"ext:(\"txt\",gz OR pdf,\"jpg\")", "(ext:txt,gz OR ext:pdf,jpg)"},
       {"owner:\"0\",\"1\"", "owner:0,1"},
+      {"kind:\"photo,video\"", "kind:photo,video"},
   });
+}
+
+TEST_F(QueryParseTest, CommasInQuotesBelongToTheNameOfAShareAndPartAllElse) {
+  const auto names = [](const std::string& text) {
+    QueryNode query;
+    QueryError error;
+    EXPECT_TRUE(ParseQuery(text, NOW, query, error)) << text;
+    return query.names;
+  };
+  using Names = std::vector<std::string>;
+  EXPECT_EQ(names("share:\"a,b\""), Names({"a,b"}));
+  EXPECT_EQ(names("share:\"a,b\",c,\"d\""), Names({"a,b", "c", "d"}));
+  EXPECT_EQ(names("share:a,b"), Names({"a", "b"}));
+  EXPECT_EQ(names("ext:\"tar.gz,zip\""), Names({"tar.gz", "zip"}));
 }
 
 TEST_F(QueryParseTest, FieldsAndTheirValues) {
