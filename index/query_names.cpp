@@ -17,22 +17,6 @@ bool Fail(QueryError& error, const std::string& what, size_t at) {
   return false;
 }
 
-// Whether the tables have words for it.
-bool HoldsWords(std::string_view text) {
-  for (size_t at = 0; at < text.size();) {
-    const Character character = CharacterAt(text, at);
-    const CharacterClass type = character.code < 0x80
-                                    ? ASCII_CLASSES[static_cast<size_t>(character.code)]
-                                    : ClassOf(character.code);
-    if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK &&
-        type != CharacterClass::JOINER) {
-      return true;
-    }
-    at += character.size;
-  }
-  return false;
-}
-
 // Accents and what is not seen are of no account: alone they would stand in every name.
 bool IsOfAccount(std::string_view text, size_t at, QueryError& error) {
   if (!NameFolder().Parts(text).empty()) {
@@ -78,6 +62,34 @@ bool HoldsNoSlash(const Value& value, QueryError& error) {
 }
 
 }  // namespace
+
+bool HoldsWords(std::string_view text) {
+  for (size_t at = 0; at < text.size();) {
+    const Character character = CharacterAt(text, at);
+    const CharacterClass type = character.code < 0x80
+                                    ? ASCII_CLASSES[static_cast<size_t>(character.code)]
+                                    : ClassOf(character.code);
+    if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK &&
+        type != CharacterClass::JOINER) {
+      return true;
+    }
+    at += character.size;
+  }
+  return false;
+}
+
+bool BeginsAsWord(const Value& value, const std::string& field, QueryError& error) {
+  const char sign = value.text.front();
+  if (value.is_quoted || !HoldsWords(value.text) ||
+      std::string_view("-<>=").find(sign) == std::string_view::npos) {
+    return true;
+  }
+  const std::string why = sign == '-'
+                              ? "a '-' that leaves out stands in front of the field, as in -" +
+                                    field + ":" + Shortened(value.text.substr(1))
+                              : field + ": compares nothing";
+  return Fail(error, why + " (a value that begins with " + sign + " stands in quotes)", value.at);
+}
 
 // In quotes a star says nothing, nor is it part of any word.
 bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
@@ -138,6 +150,9 @@ bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::EXT;
   for (const Value& one : NamesIn(value)) {
     std::string& name = node.names.emplace_back(one.text);
+    if (!name.empty() && !BeginsAsWord(one, "ext", error)) {
+      return false;
+    }
     name.erase(0, name.starts_with('.') ? 1 : 0);
     if (name.find('*') != std::string::npos) {
       return Fail(error, "ext: takes no '*'; names with gaps are found by name:*.jp*", one.at);

@@ -199,6 +199,9 @@ bool FillField(const NamedField& field, const Value& value, time_t now, QueryNod
   if (value.has_star && !has_words) {
     return Fail(error, std::string(field.name) + ": takes no '*'", node.end - 1);
   }
+  if (has_words && !BeginsAsWord(value, field.name, error)) {
+    return false;
+  }
   node.field = field.content;
   switch (field.field) {
     case QueryField::NAME:

@@ -212,13 +212,29 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
 }
 
 TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
-  for (const char* text : {"-draft",           "OR a",         "\"moby dick\"s",
-                           "inv*ce",           "sise:1G",      "undr:/srv",
-                           "size>1G",          "ext=pdf",      "ext!=pdf",
-                           "size > 1G",        "text : whale", "name:(a title:b)",
-                           "size: 1G",         "share:data",   "under:/srv/data/projects",
-                           "size:<0",          "rating:>5",    "modified:2024-06..2024-01",
-                           "near:52.5,13.4,0", "\u0301",       "\u200b"}) {
+  for (const char* text : {"-draft",
+                           "OR a",
+                           "\"moby dick\"s",
+                           "inv*ce",
+                           "sise:1G",
+                           "undr:/srv",
+                           "size>1G",
+                           "ext=pdf",
+                           "ext!=pdf",
+                           "size > 1G",
+                           "text : whale",
+                           "title:-moby",
+                           "camera:>5",
+                           "name:(a title:b)",
+                           "size: 1G",
+                           "share:data",
+                           "under:/srv/data/projects",
+                           "size:<0",
+                           "rating:>5",
+                           "modified:2024-06..2024-01",
+                           "near:52.5,13.4,0",
+                           "\u0301",
+                           "\u200b"}) {
     const Names hits = Hits(text);
     ASSERT_EQ(hits.size(), 1U) << text;
     EXPECT_TRUE(hits[0].starts_with("error: ")) << text;

@@ -145,4 +145,38 @@ TEST_F(QuerySlipsTest, BlanksDoNotPartAFieldFromItsColonOrComparison) {
   }
 }
 
+TEST_F(QuerySlipsTest, FieldsOfTextCompareNothingAndLeaveOutNothing) {
+  ExpectAll({
+      {"camera:>5", "?7"},
+      {"a ext:>pdf", "?6"},
+      {"ext:pdf,>jpg", "?8"},
+      {"ext:-pdf", "?4"},
+      {"name:>3", "?5"},
+      {"name:<=x*", "?5"},
+      {"name:->x", "?5"},
+      {"name:-*.txt", "?5"},
+      {"title:-moby", "?6"},
+      {"-title:-moby a", "?7"},
+      {"title:=moby", "?6"},
+      {"text:-5", "?5"},
+      {"path:-draft", "?5"},
+      {"title:(a >5)", "?9"},
+      {"title:(a -b)", "(title:a -title:b)"},
+      {"title:\"-moby\"", "title:\"-moby\""},
+      {"name:\"-*.txt\"", "name:-*.txt"},
+      {"name:\"->x\"", "name:\"->x\""},
+      {"path:\"-draft\"", "path:*-draft*"},
+      {"ext:\"-x\",pdf", "ext:-x,pdf"},
+      {"name:*-draft*", "name:*-draft*"},
+      {"name:-", "name:*-*"},
+      {"name:->", "name:*->*"},
+      {"title:a-b name:a>b", "(title:a-b name:a>b)"},
+  });
+  EXPECT_EQ(ErrorOf("title:-moby").what,
+            "a '-' that leaves out stands in front of the field, as in -title:moby (a value that "
+            "begins with - stands in quotes)");
+  EXPECT_EQ(ErrorOf("camera:>5").what,
+            "camera: compares nothing (a value that begins with > stands in quotes)");
+}
+
 }  // namespace fileindexd
