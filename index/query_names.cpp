@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/query_names.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <utility>
 
@@ -61,6 +62,14 @@ bool HoldsNoSlash(const Value& value, QueryError& error) {
          Fail(error, "no name holds a '/'; path: looks in whole paths", value.at + slash);
 }
 
+// "annual report\"": without the first of the two, what should be a row of words is none.
+bool OpensItsQuotes(const Value& value, QueryError& error) {
+  const bool is_even = std::count(value.text.begin(), value.text.end(), '"') % 2 == 0;
+  return value.is_quoted || is_even || value.text.back() != '"' ||
+         Fail(error, "this quote closes nothing; one opens in front of the first word",
+              value.at + value.text.size() - 1);
+}
+
 }  // namespace
 
 bool HoldsWords(std::string_view text) {
@@ -98,6 +107,9 @@ bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
   if (!value.is_quoted && star < end) {
     return Fail(error, "'*' stands at the end of a word; names with gaps are found by name:inv*ce",
                 value.at + star);
+  }
+  if (!OpensItsQuotes(value, error)) {
+    return false;
   }
   if (!HoldsWords(value.text)) {
     if (value.text.empty() && value.is_quoted) {
@@ -143,7 +155,8 @@ bool FillName(const Value& value, QueryNode& node, QueryError& error) {
 }
 
 bool FillPath(const Value& value, QueryNode& node, QueryError& error) {
-  return FillPattern(value, Part::PATH, node, error);
+  const bool has_gaps = value.text.find('*') != std::string::npos;
+  return (has_gaps || OpensItsQuotes(value, error)) && FillPattern(value, Part::PATH, node, error);
 }
 
 bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
@@ -160,7 +173,7 @@ bool FillExt(const Value& value, QueryNode& node, QueryError& error) {
     if (name.empty() || name.find('/') != std::string::npos) {
       return Fail(error, Cited(value.text) + " is no ending of names like pdf or jpg,png", one.at);
     }
-    if (!IsOfAccount(name, one.at, error)) {
+    if (!OpensItsQuotes(one, error) || !IsOfAccount(name, one.at, error)) {
       return false;
     }
   }

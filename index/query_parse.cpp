@@ -8,7 +8,8 @@
 //   values    = any    where each of words is a value of that field, and no other field stands
 //   words     = '"' { character } '"' [ "*" ] | word
 //   word      = characters up to a blank, or up to a ")" that closes a group; "*" at its end, and
-//               nowhere else: what begins with it. In quotes it says nothing
+//               nowhere else: what begins with it. In quotes it says nothing. At the end of a word
+//               no bracket and no quote closes what the word has not opened
 //   value     = word | pattern | '"' whole name '"'     of name
 //             | pattern                                of path
 //             | words                                  of text and of the text fields
@@ -89,7 +90,7 @@ bool Parser::IsAt(std::string_view keyword) const {
 }
 
 // "-5" is no number: a minus in front says what not to find, but for "-7d" in the brackets of a
-// time. "--" and "- " say nothing.
+// time. "--" and "- " are signs.
 bool Parser::IsNegation() const {
   if (shared != nullptr && IsTime(*shared) && BeginsWithAgo(std::string_view(text).substr(at))) {
     return false;
@@ -275,7 +276,9 @@ bool Parser::ReadLeaf(QueryNode& node, int depth) {
     return Fail("too many words", start);
   }
   if (field == nullptr) {
-    const std::string why = WhyMeantForField(std::string_view(text).substr(start));
+    const std::string_view rest = std::string_view(text).substr(start);
+    std::string why = WhyMeantForField(rest);
+    why = why.empty() ? WhyLeftOutTwice(rest) : why;
     if (!why.empty()) {
       return Fail(why, start);
     }

@@ -5,6 +5,17 @@
 
 namespace fileindexd {
 
+namespace {
+
+// ":)", ";-))".
+bool EndsWithFace(std::string_view word) {
+  word.remove_suffix(word.size() - (word.find_last_not_of(')') + 1));
+  word.remove_suffix(word.ends_with('-') ? 1 : 0);
+  return word.ends_with(':') || word.ends_with(';') || word.ends_with('=');
+}
+
+}  // namespace
+
 bool PieceReader::Fail(const std::string& what, size_t where) {
   error = {what, where};
   return false;
@@ -25,10 +36,12 @@ bool PieceReader::ReadQuoted(Value& value) {
   return true;
 }
 
-// A bracket that a word itself opened belongs to it: "copy(1).txt".
-void PieceReader::ReadBare(Value& value, bool in_list) {
+// A bracket that a word itself opened belongs to it: "copy(1).txt". So does one within it that
+// closes nothing ("a)b"), but not at its end.
+bool PieceReader::ReadBare(Value& value, bool in_list) {
   value.at = at;
   int inside = 0;
+  size_t unopened = std::string::npos;
   while (at < text.size() && BlankAt(text, at) == 0) {
     if (in_list && text.compare(at, 2, ",\"") == 0) {
       break;
@@ -39,10 +52,13 @@ void PieceReader::ReadBare(Value& value, bool in_list) {
         break;
       }
       inside = 0;
+      unopened = at;
     }
     ++at;
   }
   value.text = text.substr(value.at, at - value.at);
+  return unopened + 1 != at || EndsWithFace(value.text) ||
+         Fail("this bracket closes nothing (a word that ends with one stands in quotes)", unopened);
 }
 
 bool PieceReader::EndsQuotes() {
@@ -54,17 +70,14 @@ bool PieceReader::ReadOne(Value& value) {
   if (IsAtQuote()) {
     return ReadQuoted(value) && EndsQuotes();
   }
-  ReadBare(value, false);
-  return true;
+  return ReadBare(value, false);
 }
 
 bool PieceReader::ReadList(Value& value) {
   value.at = at + (IsAtQuote() ? 1 : 0);
   while (true) {
     Value part;
-    if (!IsAtQuote()) {
-      ReadBare(part, true);
-    } else if (!ReadQuoted(part)) {
+    if (IsAtQuote() ? !ReadQuoted(part) : !ReadBare(part, true)) {
       return false;
     }
     value.text += part.text;

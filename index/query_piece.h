@@ -26,7 +26,7 @@ class PieceReader {
 
  private:
   bool ReadQuoted(Value& value);
-  void ReadBare(Value& value, bool in_list);
+  bool ReadBare(Value& value, bool in_list);
   bool EndsQuotes();
   bool IsAtQuote() const { return at < text.size() && text[at] == '"'; }
   bool Fail(const std::string& what, size_t where);

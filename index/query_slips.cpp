@@ -5,6 +5,7 @@
 
 #include "index/query_error.h"
 #include "index/query_fields.h"
+#include "index/query_names.h"
 #include "index/text_characters.h"
 
 namespace fileindexd {
@@ -123,6 +124,16 @@ size_t LettersAtStart(std::string_view text) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
   });
   return static_cast<size_t>(end - text.begin());
+}
+
+std::string WhyLeftOutTwice(std::string_view text) {
+  const size_t first = text.find_first_not_of('-');
+  if (!text.starts_with("--") || first == std::string_view::npos) {
+    return "";
+  }
+  const bool is_followed = text[first] == '"' || text[first] == '(' ||
+                           HoldsWords(text.substr(first, NextBlank(text, first) - first));
+  return is_followed ? "one '-' leaves out (a word that begins with two stands in quotes)" : "";
 }
 
 std::string WhyMeantForField(std::string_view text) {

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// Words of a question that can only be meant for a field and are none: as words they would be
-// looked for in vain, and nobody would be told why.
+// Words of a question that can only be meant for something else: as words they would be looked for
+// in vain, and nobody would be told why.
 #pragma once
 
 #include <string>
@@ -25,5 +25,8 @@ size_t LettersAtStart(std::string_view text);
 // field's (NearField). Words of names and texts hold colons too: addresses ("http://x"), names in
 // programs ("fs::path"), and what is far from all fields or has nothing behind its colon.
 std::string WhyMeantForField(std::string_view text);
+
+// The same of "--draft", which would find what is to be left out. "--" alone is a sign.
+std::string WhyLeftOutTwice(std::string_view text);
 
 }  // namespace fileindexd

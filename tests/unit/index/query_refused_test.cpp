@@ -70,7 +70,7 @@ TEST_F(QueryRefusedTest, SenselessQuestionsSayWhere) {
       {"(", "?1"},
       {"(a", "?0"},
       {"x (a OR (b)", "?2"},
-      {"a)", "a)"},
+      {"a)", "?1"},
       {"a )", "?2"},
       {"()", "?1"},
       {"a ()", "?3"},

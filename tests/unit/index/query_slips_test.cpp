@@ -179,4 +179,53 @@ TEST_F(QuerySlipsTest, FieldsOfTextCompareNothingAndLeaveOutNothing) {
             "camera: compares nothing (a value that begins with > stands in quotes)");
 }
 
+TEST_F(QuerySlipsTest, WhatOpensNothingClosesNothing) {
+  ExpectAll({
+      {"report)", "?6"},
+      {"report))", "?7"},
+      {"foo(1))", "?6"},
+      {"max(a, b)", "?8"},
+      {"annual report) x", "?13"},
+      {"(annual)report)", "?14"},
+      {"name:report)", "?11"},
+      {"name:*)", "?6"},
+      {"kind:photo)", "?10"},
+      {"ext:\"pdf\",jpg)", "?13"},
+      {"title:)", "?6"},
+      {"\"report)\" name:\"*)\"", "(\"report)\" name:*))"},
+      {"name:*)*", "name:*)*"},
+      {"annual report\"", "?13"},
+      {"report\" x", "?6"},
+      {"(annual report\")", "?14"},
+      {"name:report\"", "?11"},
+      {"title:report\"", "?12"},
+      {"path:a/b\"", "?8"},
+      {"ext:pdf\"", "?7"},
+      {"ext:pdf\",jpg", "?7"},
+      {"a\"b", "a\"b"},
+      {"name:*17\" path:*17\"", "(name:*17\" path:*17\"*)"},
+  });
+  EXPECT_EQ(ErrorOf("report)").what,
+            "this bracket closes nothing (a word that ends with one stands in quotes)");
+  EXPECT_EQ(ErrorOf("report\"").what,
+            "this quote closes nothing; one opens in front of the first word");
+}
+
+TEST_F(QuerySlipsTest, TwoMinusLeaveOutNothing) {
+  ExpectAll({
+      {"report --draft", "?7"},
+      {"--draft report", "?0"},
+      {"---draft", "?0"},
+      {"a NOT --b", "?6"},
+      {"a --(b OR c)", "?2"},
+      {"a --\"b c\"", "?2"},
+      {"a --name:b", "?2"},
+      {"name:(a --b)", "?8"},
+      {"a \"--b\"", "(a \"--b\")"},
+      {"report --", "(report name:*--*)"},
+  });
+  EXPECT_EQ(ErrorOf("a --b").what,
+            "one '-' leaves out (a word that begins with two stands in quotes)");
+}
+
 }  // namespace fileindexd
