@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <string>
 
+#include "base/ascii.h"
 #include "ctl/output.h"
 #include "ctl/terminal/cells.h"
 #include "index/text_tokenizer.h"
@@ -22,6 +23,14 @@ void PutNote(const std::string& note, const std::optional<Screen>& screen) {
   }
 }
 
+void TellOfSmallOperator(const std::string& word, const std::optional<Screen>& screen) {
+  const char first = LowerLetter(word.front());
+  const std::string meant = first == 'o'   ? "OR is written in capitals"
+                            : first == 'a' ? "all words are wanted anyway"
+                                           : "NOT is written in capitals, or as -word";
+  PutNote("'" + word + "' was looked for as a word: " + meant + ".", screen);
+}
+
 }  // namespace
 
 void TellNothingFound(const Question& question, const Answer& answer,
@@ -32,6 +41,9 @@ void TellNothingFound(const Question& question, const Answer& answer,
             screen);
     return;
   }
+  if (!answer.small_operator.empty()) {
+    TellOfSmallOperator(answer.small_operator, screen);
+  }
   if (!answer.suggestion.empty()) {
     PutNote("Did you mean: " + Printable(answer.suggestion), screen);
     return;
@@ -41,7 +53,7 @@ void TellNothingFound(const Question& question, const Answer& answer,
     PutNote("There is no field '" + word.substr(0, word.find(':')) + "': '" + Printable(word) +
                 "' was looked for as words.",
             screen);
-  } else if (screen.has_value()) {
+  } else if (screen.has_value() && answer.small_operator.empty()) {
     PutNote("Nothing found.", screen);
   }
 }

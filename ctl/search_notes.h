@@ -11,8 +11,8 @@
 
 namespace fileindexd {
 
-// Of a question without any hit: a folder that is not there, a question that has some, or what in
-// it is no field. People are told at least that there is none.
+// Of a question without any hit: a folder that is not there, an operator in small letters, a
+// question that has some, or what in it is no field. People are told at least that there is none.
 void TellNothingFound(const Question& question, const Answer& answer,
                       const std::optional<Screen>& screen);
 

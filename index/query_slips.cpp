@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "index/letter_case.h"
 #include "index/query_error.h"
 #include "index/query_fields.h"
 #include "index/query_names.h"
@@ -139,6 +140,27 @@ std::string WhyLeftOutTwice(std::string_view text) {
 std::string WhyMeantForField(std::string_view text) {
   std::string why = WhyColonIsMissing(text);
   return why.empty() ? WhyNoField(text) : why;
+}
+
+// Between two others, "not" in front of one at least. What an option says was not written there.
+std::string SmallOperator(const QueryNode& node) {
+  const auto is_written = [](const QueryNode& part) { return part.end > part.start; };
+  for (size_t i = 0; i < node.below.size(); ++i) {
+    const QueryNode& part = node.below[i];
+    const bool is_bare = part.part == Part::WORD && !part.is_phrase &&
+                         (part.scope == Scope::ANY || part.shared_field != nullptr);
+    const bool has_next = i + 1 < node.below.size() && is_written(node.below[i + 1]);
+    const bool is_two_sided = IsSameName(part.text, "or") || IsSameName(part.text, "and");
+    const bool is_operator = (is_two_sided && i > 0) || IsSameName(part.text, "not");
+    if (node.part == Part::AND && is_bare && has_next && is_operator) {
+      return part.text;
+    }
+    std::string inner = SmallOperator(part);
+    if (!inner.empty()) {
+      return inner;
+    }
+  }
+  return "";
 }
 
 }  // namespace fileindexd

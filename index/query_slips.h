@@ -6,6 +6,8 @@
 #include <string>
 #include <string_view>
 
+#include "index/query.h"
+
 namespace fileindexd {
 
 // The bytes of the blank at that byte, which parts words; 0: there is none, or the text ends.
@@ -28,5 +30,9 @@ std::string WhyMeantForField(std::string_view text);
 
 // The same of "--draft", which would find what is to be left out. "--" alone is a sign.
 std::string WhyLeftOutTwice(std::string_view text);
+
+// Behind an answer without hits, what may have been meant for an operator: the first "or", "and" or
+// "not" in small letters that stands where one would. Empty: there is none.
+std::string SmallOperator(const QueryNode& node);
 
 }  // namespace fileindexd

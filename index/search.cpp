@@ -11,6 +11,7 @@
 #include "index/asked.h"
 #include "index/asked_share.h"
 #include "index/entry_table.h"
+#include "index/query_slips.h"
 #include "index/side_by_side.h"
 #include "index/suggestion.h"
 #include "state/layout.h"
@@ -223,6 +224,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   for (AskedShare& share : shares) {
     share.Release();
   }
+  made.small_operator = suggests ? SmallOperator(asked.tree) : "";
   if (!suggestion.empty() && HasHits(question, suggestion)) {
     made.suggestion = std::move(suggestion);
   } else if (suggests) {

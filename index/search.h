@@ -62,6 +62,7 @@ struct Answer {
   std::map<std::string, AskedWords> words;  // by share; none of those without contents
   std::string suggestion;       // without any hit: the question in words that the index has
   std::string word_like_field;  // without either: the first word like "type:pdf"
+  std::string small_operator;   // without any hit: the first "or", "and" or "not" between words
   bool knows_under = true;      // false: no share knows the question's `under`, and so no hit
 };
 

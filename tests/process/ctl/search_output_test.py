@@ -163,6 +163,17 @@ class TerminalTest(ContentsTest):
             with self.subTest(words=words):
                 self.assertEqual(self.show(words).out, "Nothing found.\n")
 
+    def test_an_operator_in_small_letters_is_told(self):
+        for words, note in (
+                ("zzzz or story", "'or' was looked for as a word: OR is written in capitals."),
+                ("zzzz And story", "'And' was looked for as a word: all words are wanted anyway."),
+                ("zzzz not story",
+                 "'not' was looked for as a word: NOT is written in capitals, or as -word."),
+                ("lighthuose or story", "'or' was looked for as a word: OR is written in capitals.")):
+            with self.subTest(words=words):
+                self.assertEqual(self.show(words).out, note + "\n")
+                self.assertEqual(self.try_ctl("search", "--json", words).err, note.encode() + b"\n")
+
 
 class MoreTest(IndexTest):
     NOTE = "There are more than these 20: --limit N or --limit all shows them, --offset N the next."

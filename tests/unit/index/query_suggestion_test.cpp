@@ -184,6 +184,33 @@ TEST_F(QuerySuggestionTest, WordsThatLookLikeFieldsAreToldWhereNothingIsFound) {
   }
 }
 
+TEST_F(QuerySuggestionTest, WhatMayBeMeantForAnOperatorIsTold) {
+  Store({{"holiday plans.txt", TextContent("this or that")}});
+  question.kind = Kind::DOCUMENT;
+  const std::map<std::string, std::string> told = {
+      {"nothing or plans", "or"},
+      {"nothing Or plans", "Or"},
+      {"nothing and plans or x", "and"},
+      {"nothing not plans", "not"},
+      {"not nothing", "not"},
+      {"x OR (nothing or y)", "or"},
+      {"name:(nothing or plans)", "or"},
+      {"holidya or nothing", "or"},
+      {"holiday or that", ""},  // is found
+      {"nothing or", ""},
+      {"or nothing", ""},
+      {"nothing not", ""},
+      {"nothing \"or\" plans", ""},
+      {"nothing name:or plans", ""},
+      {"nothing orphans plans", ""},
+      {"nothing", ""},
+  };
+  for (const auto& [text, word] : told) {
+    (void)Hits(text);
+    EXPECT_EQ(answer.small_operator, word) << text;
+  }
+}
+
 TEST_F(QuerySuggestionTest, DistanceCountsSlips) {
   EXPECT_EQ(EditDistance("abc", "abc", 2), 0);
   EXPECT_EQ(EditDistance("abc", "acb", 2), 1);
