@@ -99,12 +99,14 @@ bool Parser::IsNegation() const {
          text[at + 1] != '-' && text[at + 1] != ')';
 }
 
-// Of what is not positive: the NOT that is alone.
-const QueryNode& FirstNegative(const QueryNode& node) {
+// Of what is not positive: the NOT that is alone. `is_side`: it is, or stands in, a side of an OR.
+const QueryNode& FirstNegative(const QueryNode& node, bool& is_side) {
   if (node.part == Part::NOT) {
     return node;
   }
-  return FirstNegative(*std::find_if_not(node.below.begin(), node.below.end(), IsPositive));
+  is_side = is_side || node.part == Part::OR;
+  return FirstNegative(*std::find_if_not(node.below.begin(), node.below.end(), IsPositive),
+                       is_side);
 }
 
 bool Parser::Run(QueryNode& query) {
@@ -131,8 +133,13 @@ bool Parser::Run(QueryNode& query) {
     return false;
   }
   if (!IsPositive(read)) {
-    return Fail("this says only what not to find; add what to find, as in kind:document",
-                FirstNegative(read).start);
+    bool is_side = false;
+    const size_t where = FirstNegative(read, is_side).start;
+    return Fail(is_side
+                    ? "this side of OR says only what not to find; add to it what to find, as in "
+                      "kind:document"
+                    : "this says only what not to find; add what to find, as in kind:document",
+                where);
   }
   query = std::move(read);
   return true;

@@ -72,7 +72,8 @@ std::optional<int64_t> Bytes(std::string_view text) {
   if (text.size() > 1 && EndsWithName(text, "B")) {
     text.remove_suffix(1);
   }
-  if (text.size() > 2 && EndsWithName(text, "i")) {  // "10MiB"
+  // Behind a unit alone: "10MiB".
+  if (text.size() > 2 && EndsWithName(text, "i") && LowerLetter(text[text.size() - 2]) >= 'a') {
     text.remove_suffix(1);
   }
   return Scaled(text, "KMGTP", 1024);
@@ -145,7 +146,21 @@ const char* Expected(ValueForm form) {
     case ValueForm::CAMERA_TIME:
       break;
   }
-  return "a time like today, -7d, 2024, 2024-01 or 2024-01-05";
+  return "a time like today, yesterday, -7d, 2024, 2024-01, 2024-01-05 or 2024-01-05T12:30";
+}
+
+// Whether it would be one if its numbers were small.
+bool IsTooLarge(std::string_view text, ValueForm form, time_t now) {
+  std::string small;
+  bool was_digit = false;
+  for (const char c : text) {
+    const bool is_digit = c >= '0' && c <= '9';
+    if (!is_digit || !was_digit) {
+      small += is_digit ? '1' : c;
+    }
+    was_digit = is_digit;
+  }
+  return PointOf(small, form, now).has_value();
 }
 
 // Why nothing can lie in it; null: something can.
@@ -166,8 +181,9 @@ bool ReadRange(std::string_view text, ValueForm form, time_t now, ValueRange& ra
     const std::optional<Point> read = PointOf(value, form, now);
     if (!read.has_value()) {
       at = static_cast<size_t>(value.data() - text.data());
-      what = (value.empty() ? "a value is missing: " : Cited(value) + " is not ");
-      what += Expected(form);
+      what = value.empty()                  ? std::string("a value is missing: ") + Expected(form)
+             : IsTooLarge(value, form, now) ? Cited(value) + " is too large"
+                                            : Cited(value) + " is not " + Expected(form);
     }
     return read;
   };
@@ -204,7 +220,7 @@ bool ReadRange(std::string_view text, ValueForm form, time_t now, ValueRange& ra
   if (!is_compared) {
     made = {value->alone, value->until};
   } else if (text.front() == '>' && !or_equal && value->last == INT64_MAX) {
-    what = "no number is greater than that";
+    what = IsTime(form) ? "no time is later than that" : "no number is greater than that";
     at = 0;
     return false;
   } else if (text.front() == '>') {

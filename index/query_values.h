@@ -15,7 +15,8 @@ namespace fileindexd {
 //
 //   range     = ( ">" | ">=" | "<" | "<=" ) point | [ point ] ".." [ point ] | point
 //   point     = number | size | duration | time
-//   size      = digits [ "." digits ] [ "K" | "M" | "G" | "T" ] [ "B" ]    of 1024
+//   size      = digits [ "." digits ] [ unit [ "i" ] ] [ "B" ]
+//   unit      = "K" | "M" | "G" | "T" | "P"       of 1024
 //   duration  = { digits ( "s" | "m" | "h" | "d" | "w" | "y" ) } | digits  seconds
 //   time      = "now" | "today" | "yesterday" | "-" duration | day [ "T" hour ":" minute ]
 //   day       = year [ "-" month [ "-" day ] ]

@@ -292,8 +292,8 @@ TEST_F(QueryAttributesTest, OptionsNarrowLikeParts) {
                    "kind:document (character 1, at: -b)"}));
   EXPECT_EQ(
       Hits("a OR (b OR -c -d)"),
-      Names({"error: a OR (b OR -c -d): this says only what not to find; add what to find, as "
-             "in kind:document (character 12, at: -c -d))"}));
+      Names({"error: a OR (b OR -c -d): this side of OR says only what not to find; add to it what "
+             "to find, as in kind:document (character 12, at: -c -d))"}));
 }
 
 }  // namespace fileindexd

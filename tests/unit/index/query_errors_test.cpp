@@ -46,6 +46,27 @@ TEST_F(QueryErrorsTest, AreLinesForPeople) {
       {"rating:>5", "a rating goes from 0 to 5 (character 8, at: >5)"},
       {"pages:>9223372036854775807",
        "no number is greater than that (character 7, at: >9223372036854775807)"},
+      {"size:>8192P", "'8192P' is too large (character 7, at: 8192P)"},
+      {"size:9223372036854775807",
+       "'9223372036854775807' is too large (character 6, at: 9223372036854775807)"},
+      {"year:99999999999999999999",
+       "'99999999999999999999' is too large (character 6, at: 99999999999999999999)"},
+      {"bitrate:>99999999999999M",
+       "'99999999999999M' is too large (character 10, at: 99999999999999M)"},
+      {"duration:1h..99999999999m", "'99999999999m' is too large (character 14, at: 99999999999m)"},
+      {"sent:>-99999999999d", "'-99999999999d' is too large (character 7, at: -99999999999d)"},
+      {"modified:>2262", "no time is later than that (character 10, at: >2262)"},
+      {"modified:2024-01-05T12:30:15",
+       "'2024-01-05T12:30:15' is not a time like today, yesterday, -7d, 2024, 2024-01, 2024-01-05 "
+       "or 2024-01-05T12:30 (character 10, at: 2024-01-05T12:30:15)"},
+      {"size:>10i", "'10i' is not a size like 500K, 10M or 1.5G (character 7, at: 10i)"},
+      {"size:10iB", "'10iB' is not a size like 500K, 10M or 1.5G (character 6, at: 10iB)"},
+      {"a OR -b",
+       "this side of OR says only what not to find; add to it what to find, as in kind:document "
+       "(character 6, at: -b)"},
+      {"-a -b",
+       "this says only what not to find; add what to find, as in kind:document (character 1, at: "
+       "-a -b)"},
       {"size:5M..1M", "the range ends before it begins (character 6, at: 5M..1M)"},
       {"near:1,2,0",
        "latitude goes from -90 to 90, longitude from -180 to 180, and a radius is above 0 "

@@ -221,6 +221,7 @@ TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
                          "report\"",
                          "report)",
                          "report --draft",
+                         "a OR -b",
                          "sise:1G",
                          "undr:/srv",
                          "size>1G",
