@@ -138,6 +138,13 @@ void PutAnswer(const Answer& answer, const Arguments& arguments,
   }
 }
 
+// "-h" leaves out what holds an h, and is meant for help where it stands alone.
+int Refuse(const Question& question, const std::string& error) {
+  const bool wants_help =
+      question.text == "-h" || question.text == "-?" || question.text == "-help";
+  return Fail(EXIT_USAGE, "search: %s%s", error.c_str(), wants_help ? "; --help shows help" : "");
+}
+
 }  // namespace
 
 int Search(const Arguments& arguments) {
@@ -173,7 +180,7 @@ int Search(const Arguments& arguments) {
     // What makes no sense now will not do so later.
     std::vector<std::string> reached;
     if (!Understand(question, reached, error)) {
-      return Fail(EXIT_USAGE, "search: %s", error.c_str());
+      return Refuse(question, error);
     }
     const int code = AwaitChanges(session, reached, patience);
     if (code != EXIT_DONE) {
@@ -183,7 +190,7 @@ int Search(const Arguments& arguments) {
 
   Answer answer;
   if (!Ask(question, answer, error)) {
-    return Fail(EXIT_USAGE, "search: %s", error.c_str());
+    return Refuse(question, error);
   }
 
   const bool has_more = tells_of_more && answer.hits.size() > USUAL_HITS;

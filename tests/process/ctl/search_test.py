@@ -168,6 +168,14 @@ class SearchTest(IndexTest):
                 self.assertEqual(told, "fileindexctl: search: The following argument was not "
                                        f"expected: {option}\n")
 
+    def test_who_asks_for_help_with_a_question_is_told_what_does(self):
+        for words in (("-h",), ("-?",), ("-help",), ("--wait", "-h")):
+            with self.subTest(words=words):
+                told = self.ctl("search", *words, code=2).err.decode()
+                self.assertRegex(told, "^fileindexctl: search: -.*; --help shows help\n$")
+        self.assertNotIn(b"--help", self.ctl("search", "-x", code=2).err)
+        self.assertEqual(self.hits("-h", "budget"), ["alpha/office/budget.xyz"])
+
     def test_an_option_with_an_equals_sign_takes_what_stands_behind_that(self):
         for line in (
             ("search", "--share=", "beach", "--count"),
