@@ -20,7 +20,7 @@ class PieceReader {
 
   // False when it makes no sense, and the error says why.
   bool ReadOne(Value& value);
-  bool ReadList(Value& value);  // as one text without its quotes
+  bool ReadList(Value& value);  // as one text without its quotes, and part by part
 
   size_t at;  // behind what was read
 

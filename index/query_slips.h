@@ -21,11 +21,11 @@ size_t LettersAtStart(std::string_view text);
 
 // Why the word that `text` begins with, which has no field in front, is refused; empty: it is not.
 //
-// Refused are a field with a comparison in the place of its colon ("size>10M", "ext=pdf"), or one
-// that blanks part from it or from its colon ("size > 10M", "text : whale"); a
-// comparison or a quote behind the colon of what is no field; and a name that is a slip of a
-// field's (NearField). Words of names and texts hold colons too: addresses ("http://x"), names in
-// programs ("fs::path"), and what is far from all fields or has nothing behind its colon.
+// Refused are a field with a comparison in the place of its colon ("size>10M", "ext!=pdf") or with
+// blanks in front of its colon or comparison ("size > 10M", "text : whale"); a comparison or a
+// quote behind the colon of what is no field; and a name that is a slip of a field's (NearField).
+// Words of names and texts hold colons too: addresses ("http://x"), names in programs ("fs::path"),
+// and what is far from all fields or has nothing behind its colon.
 std::string WhyMeantForField(std::string_view text);
 
 // The same of "--draft", which would find what is to be left out. "--" alone is a sign.

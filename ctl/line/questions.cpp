@@ -40,8 +40,9 @@ void DeclareSearch(Declarer& declare) {
   search->add_flag("-0", into.nul_ended, "End paths with NUL, not with a newline")->excludes(json);
   search->footer(
       "Every word of QUERY must stand in a file's name or content. \"words in a row\", begin*, "
-      "-without, one OR another, (groups), name:*.tar.gz, title:word, size:>10M; QUERY.md tells "
-      "of all. Options may stand between the words; what follows a lone -- is QUERY.\n\n" +
+      "-without, one OR another, (groups), name:*.tar.gz, title:word, size:>10M; kind:video or "
+      "share:NAME alone finds all of it; QUERY.md tells of all. Options may stand between the "
+      "words; what follows a lone -- is QUERY.\n\n" +
       search->get_footer());
 }
 

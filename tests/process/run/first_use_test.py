@@ -232,20 +232,23 @@ class ReadmeSessionTest(RunTest):
             self.assertEqual(sorted(lines), self.ANSWERS[prompt], prompt)
         self.stop_all()
 
-    def test_the_command_line_of_the_manual_of_questions_finds_what_it_says(self):
+    def test_the_command_lines_of_the_manual_of_questions_find_what_it_says(self):
         with open(f"{PROJECT}/QUERY.md", encoding="utf-8") as file:
             commands = re.findall(r"`(fileindexctl search [^`]+)`", file.read())
-        self.assertEqual(commands, ["fileindexctl search 'size:>1G \"annual report\"'"])
+        wanted = {"fileindexctl search 'size:>1G \"annual report\"'": "annual report.bin",
+                  "fileindexctl search --kind video is:file": "film.mkv"}
+        self.assertEqual(commands, list(wanted))
         for name, size in (("annual report.bin", 2 << 30), ("old annual report.bin", 1 << 30),
-                           ("report annual.bin", 2 << 30)):
+                           ("report annual.bin", 2 << 30), ("film.mkv", 1)):
             os.truncate(self.put(name, ""), size)
         self.index()
 
         path = f"{os.environ['FILEINDEXD_BIN_DIR']}:{os.environ['PATH']}"
-        done = subprocess.run(["bash", "-c", commands[0]], env=environment(PATH=path), check=False,
-                              capture_output=True, timeout=LIMIT)
-        self.assertEqual((done.returncode, done.stderr), (0, b""))
-        self.assertEqual(done.stdout.decode(), f"{self.folder}/annual report.bin\n")
+        for command in commands:
+            done = subprocess.run(["bash", "-c", command], env=environment(PATH=path), check=False,
+                                  capture_output=True, timeout=LIMIT)
+            self.assertEqual((done.returncode, done.stderr), (0, b""), command)
+            self.assertEqual(done.stdout.decode(), f"{self.folder}/{wanted[command]}\n", command)
         self.stop_all()
 
 

@@ -221,7 +221,7 @@ TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
                          "report\"",
                          "report)",
                          "report --draft",
-                         "a OR -b",
+                         "report OR -draft",
                          "sise:1G",
                          "undr:/srv",
                          "size>1G",
@@ -250,6 +250,21 @@ TEST_F(QueryManualTest, WhatItSaysIsRefusedIsRefused) {
        {"12:30", "http://example.org", "fs::path", "go:generate", "\"sise:1G\""}) {
     EXPECT_EQ(Hits(text), Names()) << text;
   }
+}
+
+TEST_F(QueryManualTest, WhatItSaysAsksForAllDoes) {
+  StoreAll();
+  ASSERT_NO_FATAL_FAILURE(StoreTheRest());
+  question.limit = 1000;
+  const Names videos = Sorted("kind:video");
+  EXPECT_EQ(videos, Names({"film.mkv"}));
+  const Names below = Sorted("under:" + At("projects"));
+
+  question.kind = Kind::VIDEO;
+  EXPECT_EQ(Sorted("is:file"), videos);
+  question.kind.reset();
+  question.under = At("projects");
+  EXPECT_EQ(Sorted("is:file OR is:folder"), below);
 }
 
 TEST_F(QueryManualTest, WhatItSaysHoldsTogetherIsFoundWholeAndByItsParts) {
