@@ -12,20 +12,30 @@ namespace fileindexd {
 
 namespace {
 
-// Whether the last characters that count are one of Han, kana or Hangul alone.
+// Whether the last run of Han, kana or Hangul is one character, with no word behind it. Parts that
+// join are one, as where words are cut: a syllable may come as its letters, a kana with its mark.
 bool EndsInOnePaired(std::string_view word) {
-  int run = 0;
+  CharacterTable characters;
+  size_t count = 0;  // characters of the last run
+  int32_t last = 0;  // the one before; 0: none of a run
   for (size_t at = 0; at < word.size();) {
     const Character character = CharacterAt(word, at);
     const CharacterClass type = ClassOf(character.code);
     if (type == CharacterClass::PAIRED) {
-      ++run;
-    } else if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK) {
-      run = 0;
+      const int32_t plain = characters.Plain(character.code);
+      const int32_t joined = Joined(last, plain);
+      if (joined == 0) {
+        count = last == 0 ? 1 : count + 1;
+      }
+      last = joined == 0 ? plain : joined;
+    } else {
+      const bool counts = type != CharacterClass::SEPARATOR && type != CharacterClass::MARK;
+      count = counts ? 0 : count;
+      last = 0;
     }
     at += character.size;
   }
-  return run == 1;
+  return count == 1;
 }
 
 int Create(void* /*context*/, const char** arguments, int count, Fts5Tokenizer** made) {

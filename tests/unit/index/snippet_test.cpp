@@ -105,6 +105,35 @@ TEST_P(SnippetTest, FirstPlaceWithMostWordsIsShownWithAllThatStandThere) {
   }
 }
 
+class SnippetMarksTest : public testing::Test {
+ protected:
+  // What is marked.
+  std::vector<std::string> Marked(const std::vector<std::string>& words, const std::string& text) {
+    std::vector<QueryNode> nodes(words.size());
+    std::vector<const QueryNode*> asked;
+    for (size_t i = 0; i < words.size(); ++i) {
+      nodes[i].text = words[i];
+      asked.push_back(&nodes[i]);
+    }
+    Content content;
+    content.text = text;
+    const Snippet snippet = MakeSnippet(content, asked, cutter);
+    std::vector<std::string> marked;
+    for (const Snippet::Mark& mark : snippet.marks) {
+      marked.push_back(snippet.text.substr(mark.start, mark.end - mark.start));
+    }
+    return marked;
+  }
+
+  TextCutter cutter{"english"};
+};
+
+using Texts = std::vector<std::string>;
+
+TEST_F(SnippetMarksTest, OneCharacterInPartsMarksThePairThatItBegins) {
+  EXPECT_EQ(Marked({"\u1100\u116e\u11a8"}, "abc \uad6d\uc5b4 def"), Texts({"\uad6d\uc5b4"}));
+}
+
 INSTANTIATE_TEST_SUITE_P(Lengths, SnippetTest, testing::Values(5, 50, 200));
 
 }  // namespace
