@@ -5,8 +5,8 @@
 #include <string>
 
 #include "base/ascii.h"
+#include "index/edit_distance.h"
 #include "index/letter_case.h"
-#include "index/suggestion.h"
 
 namespace fileindexd {
 

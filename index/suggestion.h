@@ -21,8 +21,4 @@ std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMark
 // The first word like "type:pdf", which looks for a field that there is not; empty: there is none.
 std::string WordLikeField(const QueryNode& node);
 
-// Insertions, deletions, changes and swaps of neighbours that lead from one to the other; more than
-// `most` come as most + 1. By characters of valid UTF-8.
-int EditDistance(const std::string& from, const std::string& to, int most);
-
 }  // namespace fileindexd

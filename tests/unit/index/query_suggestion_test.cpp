@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
+#include "index/edit_distance.h"
 #include "index/suggestion.h"
 #include "tests/unit/index/question_fixture.h"
 

@@ -1,0 +1,82 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// Words that an index has, near to one that it has not.
+#pragma once
+
+#include <sqlite3.h>
+
+#include <compare>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "state/sqlite.h"
+
+namespace fileindexd {
+
+// The word of vocabularies that is nearest to one, and rather not shorter than it, as stems are. Of
+// those as near the most frequent, and of these the first.
+class NearestWord {
+ public:
+  // Whether a word as near as that may be it.
+  bool Takes(int distance, bool is_shorter) const;
+
+  void Add(int distance, bool is_shorter, int64_t frequency, std::string word);
+
+  std::string Text() const { return best.has_value() ? best->text : ""; }  // empty: there is none
+
+ private:
+  struct Word {
+    int distance = 0;
+    bool is_shorter = false;
+    int64_t rarity = 0;
+    std::string text;
+    auto operator<=>(const Word&) const = default;
+  };
+  std::optional<Word> best;
+};
+
+// The words of one full-text table, or of one column of it. A bounded part of them is looked at.
+// One thread.
+class Vocabulary {
+ public:
+  // `of_column`: empty: of all. SQLite's code.
+  int Open(sqlite3* db, const char* database, const char* table, const std::string& of_column);
+
+  // Words that are one slip of the fingers away, or two in a longer word. `language`: whose stems
+  // stand beside the words.
+  void Look(const std::string& word, const std::string& language, NearestWord& nearest);
+
+ private:
+  struct Term {
+    std::string text;
+    int64_t documents = 0;
+    int64_t times = 0;
+  };
+  struct Near {
+    std::pair<int, bool> nearness;
+    Term term;
+  };
+  // What stands under one stem: how often, and of what the slips leave half the most frequent.
+  struct Forms {
+    int64_t times = 0;
+    Term best;
+  };
+  using FormsByStem = std::map<std::string, Forms, std::less<>>;
+
+  // What begins with one of them; none begins with another.
+  void ForEach(const std::vector<std::string>& beginnings,
+               const std::function<void(const Term&)>& visit);
+  // Of those that were found, as what never stands but as the stem of others is no word. At most
+  // the last letter of a stem is none of its words'.
+  FormsByStem FormsOf(const std::string& word, const std::vector<Near>& found,
+                      const std::string& language);
+
+  std::string column;
+  Statement terms;
+};
+
+}  // namespace fileindexd
