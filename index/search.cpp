@@ -220,13 +220,19 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
   }
   const bool suggests = made.knows_under && made.total == 0 && question.suggests &&
                         (question.limit > 0 || question.count_all);
-  std::string suggestion = suggests ? Suggest(asked, shares, names) : "";
+  std::vector<std::string> suggestions;
+  if (suggests) {
+    suggestions = Suggest(asked, shares, names);
+  }
   for (AskedShare& share : shares) {
     share.Release();
   }
   made.small_operator = suggests ? SmallOperator(asked.tree) : "";
-  if (!suggestion.empty() && HasHits(question, suggestion)) {
-    made.suggestion = std::move(suggestion);
+  const auto suggestion =
+      std::find_if(suggestions.begin(), suggestions.end(),
+                   [&](const std::string& text) { return HasHits(question, text); });
+  if (suggestion != suggestions.end()) {
+    made.suggestion = *suggestion;
   } else if (suggests) {
     made.word_like_field = WordLikeField(asked.tree);
   }

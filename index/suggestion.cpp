@@ -2,6 +2,7 @@
 #include "index/suggestion.h"
 
 #include <algorithm>
+#include <iterator>
 #include <map>
 #include <utility>
 #include <vector>
@@ -17,6 +18,7 @@ namespace {
 
 constexpr size_t SHORTEST = 3;     // letters of a word for which another is looked for
 constexpr size_t MOST_SLIPS = 10;  // in one question: each costs a look through vocabularies
+constexpr size_t MOST_TEXTS = 6;   // each may be asked
 
 bool IsKnown(const AskedShare& share, const WordLeaf& leaf) {
   return share.run != nullptr && share.run->Sets().CountOf(leaf) > 0;
@@ -28,6 +30,13 @@ struct WordPlace {
   size_t start = 0;
   size_t end = 0;
 };
+
+// What may stand in the place of a word.
+struct Change {
+  size_t end = 0;
+  std::vector<std::string> words;  // the best first; there is one
+};
+using Changes = std::map<size_t, Change>;  // by where the word starts
 
 // But for a last one of which only the beginning is said.
 std::vector<WordPlace> WordsOf(const QueryNode& node, NameMarker& names) {
@@ -73,14 +82,14 @@ class WordSearch {
                      TextQueryOf(alone)));
   }
 
-  void Look(const std::string& word, NearestWord& nearest) const {
+  void Look(const std::string& word, NearWords& near_words) const {
     Vocabulary names;
     Vocabulary texts;
     if (IsInNames() && names.Open(db, "main", "names", "") == SQLITE_OK) {
-      names.Look(word, NO_LANGUAGE, nearest);
+      names.Look(word, NO_LANGUAGE, near_words);
     }
     if (IsInContents() && texts.Open(db, "contents", "words", Column()) == SQLITE_OK) {
-      texts.Look(word, LanguageOfWords(share.words.language), nearest);
+      texts.Look(word, LanguageOfWords(share.words.language), near_words);
     }
   }
 
@@ -98,16 +107,16 @@ class WordSearch {
   sqlite3* db;
 };
 
-// The nearest word to one that no share knows; empty: there is none.
-std::string NearestTo(const std::string& word, const QueryNode& leaf,
-                      std::deque<AskedShare>& shares) {
-  NearestWord nearest;
+// The nearest words to one that no share knows, the best first.
+std::vector<std::string> NearTo(const std::string& word, const QueryNode& leaf,
+                                std::deque<AskedShare>& shares) {
+  NearWords near_words;
   for (AskedShare& share : shares) {
     if (share.run != nullptr) {
-      WordSearch(share, leaf).Look(word, nearest);
+      WordSearch(share, leaf).Look(word, near_words);
     }
   }
-  return nearest.Text();
+  return near_words.Texts();
 }
 
 bool AnyKnows(const std::string& word, const QueryNode& leaf, std::deque<AskedShare>& shares) {
@@ -116,14 +125,46 @@ bool AnyKnows(const std::string& word, const QueryNode& leaf, std::deque<AskedSh
   });
 }
 
+// The text with one word for each change, `ranks` behind the best.
+std::string Changed(const std::string& text, const Changes& changes,
+                    const std::vector<size_t>& ranks) {
+  std::string changed;
+  size_t at = 0;
+  auto rank = ranks.begin();
+  for (const auto& [start, change] : changes) {
+    changed += text.substr(at, start - at) + change.words[*rank++];
+    at = change.end;
+  }
+  return changed + text.substr(at);
+}
+
+// Adds the texts whose words are `behind` places behind the best ones, all counted together; those
+// of `ranks` are chosen, and `next` is the first other change.
+void AddTexts(const std::string& text, const Changes& changes, Changes::const_iterator next,
+              size_t behind, std::vector<size_t>& ranks, std::vector<std::string>& texts) {
+  if (next == changes.end()) {
+    if (behind == 0 && texts.size() < MOST_TEXTS) {
+      texts.push_back(Changed(text, changes, ranks));
+    }
+    return;
+  }
+  const size_t last = std::min(behind, next->second.words.size() - 1);
+  for (size_t rank = 0; rank <= last && texts.size() < MOST_TEXTS; ++rank) {
+    ranks.push_back(rank);
+    AddTexts(text, changes, std::next(next), behind - rank, ranks, texts);
+    ranks.pop_back();
+  }
+}
+
 bool IsLetter(char c) {
   return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
 }
 
 }  // namespace
 
-std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMarker& names) {
-  std::map<size_t, WordPlace> changes;  // by their start, with the new word
+std::vector<std::string> Suggest(const Asked& asked, std::deque<AskedShare>& shares,
+                                 NameMarker& names) {
+  Changes changes;
   size_t looks = 0;
   for (const WordLeaf& leaf : asked.leaves) {
     const QueryNode& node = *leaf.node;
@@ -135,27 +176,30 @@ std::string Suggest(const Asked& asked, std::deque<AskedShare>& shares, NameMark
     }
     QueryNode where = node;
     where.scope = node.part == Part::EXACT_NAME ? Scope::NAME : node.scope;
-    for (WordPlace& word : WordsOf(node, names)) {
+    for (const WordPlace& word : WordsOf(node, names)) {
       if (CharacterStarts(word.token).size() <= SHORTEST || AnyKnows(word.token, where, shares)) {
         continue;
       }
       if (looks++ == MOST_SLIPS) {
-        return "";
+        return {};
       }
-      word.token = NearestTo(word.token, where, shares);
-      if (!word.token.empty()) {
-        changes.emplace(word.start, std::move(word));
+      std::vector<std::string> words = NearTo(word.token, where, shares);
+      if (!words.empty()) {
+        changes.emplace(word.start, Change{word.end, std::move(words)});
       }
     }
   }
 
-  std::string text;
-  size_t at = 0;
+  std::vector<std::string> texts;
+  size_t worst = 0;
   for (const auto& [start, change] : changes) {
-    text += asked.text.substr(at, start - at) + change.token;
-    at = change.end;
+    worst += change.words.size() - 1;
   }
-  return changes.empty() ? "" : text + asked.text.substr(at);
+  for (size_t behind = 0; behind <= worst && !changes.empty(); ++behind) {
+    std::vector<size_t> ranks;
+    AddTexts(asked.text, changes, changes.begin(), behind, ranks, texts);
+  }
+  return texts;
 }
 
 std::string WordLikeField(const QueryNode& node) {

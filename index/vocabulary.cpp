@@ -39,16 +39,30 @@ std::string BehindAll(const std::string& beginning) {
 
 }  // namespace
 
-bool NearestWord::Takes(int distance, bool is_shorter) const {
-  return !best.has_value() ||
-         std::pair(distance, is_shorter) <= std::pair(best->distance, best->is_shorter);
+bool NearWords::Takes(int distance, bool is_shorter) const {
+  return words.size() < MOST || std::pair(distance, is_shorter) <=
+                                    std::pair(words.back().distance, words.back().is_shorter);
 }
 
-void NearestWord::Add(int distance, bool is_shorter, int64_t frequency, std::string word) {
+// Several vocabularies may have one word.
+void NearWords::Add(int distance, bool is_shorter, int64_t frequency, std::string word) {
   Word added = {distance, is_shorter, -frequency, std::move(word)};
-  if (!best.has_value() || added < *best) {
-    best = std::move(added);
+  const auto known = std::find_if(words.begin(), words.end(),
+                                  [&added](const Word& other) { return other.text == added.text; });
+  if (known != words.end()) {
+    added = std::min(added, *known);
+    words.erase(known);
   }
+  words.insert(std::upper_bound(words.begin(), words.end(), added), std::move(added));
+  words.resize(std::min(words.size(), MOST));
+}
+
+std::vector<std::string> NearWords::Texts() const {
+  std::vector<std::string> texts;
+  for (const Word& word : words) {
+    texts.push_back(word.text);
+  }
+  return texts;
 }
 
 int Vocabulary::Open(sqlite3* db, const char* database, const char* table,
@@ -68,7 +82,7 @@ int Vocabulary::Open(sqlite3* db, const char* database, const char* table,
   return code;
 }
 
-void Vocabulary::Look(const std::string& word, const std::string& language, NearestWord& nearest) {
+void Vocabulary::Look(const std::string& word, const std::string& language, NearWords& near_words) {
   std::vector<Near> found;
   const size_t letters = CharacterStarts(word).size() - 1;
   const int most = letters >= LONG ? 2 : 1;
@@ -83,14 +97,14 @@ void Vocabulary::Look(const std::string& word, const std::string& language, Near
   });
   const FormsByStem forms = FormsOf(word, found, language);
   for (const auto& [nearness, term] : found) {
-    if (!nearest.Takes(nearness.first, nearness.second)) {
+    if (!near_words.Takes(nearness.first, nearness.second)) {
       break;
     }
     const auto of_term = forms.find(term.text);
     const bool is_word = of_term == forms.end() || of_term->second.times < term.times;
     const Term& written = is_word ? term : of_term->second.best;
     if (!written.text.empty()) {
-      nearest.Add(nearness.first, nearness.second, written.documents, written.text);
+      near_words.Add(nearness.first, nearness.second, written.documents, written.text);
     }
   }
 }

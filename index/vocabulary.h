@@ -8,7 +8,6 @@
 #include <cstdint>
 #include <functional>
 #include <map>
-#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -17,16 +16,18 @@
 
 namespace fileindexd {
 
-// The word of vocabularies that is nearest to one, and rather not shorter than it, as stems are. Of
-// those as near the most frequent, and of these the first.
-class NearestWord {
+// The words of vocabularies that are nearest to one, and rather not shorter than it, as stems are.
+// Of those as near the most frequent, and of these the first.
+class NearWords {
  public:
-  // Whether a word as near as that may be it.
+  static constexpr size_t MOST = 4;
+
+  // Whether a word as near as that may be among them.
   bool Takes(int distance, bool is_shorter) const;
 
   void Add(int distance, bool is_shorter, int64_t frequency, std::string word);
 
-  std::string Text() const { return best.has_value() ? best->text : ""; }  // empty: there is none
+  std::vector<std::string> Texts() const;  // the best first
 
  private:
   struct Word {
@@ -36,7 +37,7 @@ class NearestWord {
     std::string text;
     auto operator<=>(const Word&) const = default;
   };
-  std::optional<Word> best;
+  std::vector<Word> words;  // in order, each text once
 };
 
 // The words of one full-text table, or of one column of it. A bounded part of them is looked at.
@@ -48,7 +49,7 @@ class Vocabulary {
 
   // Words that are one slip of the fingers away, or two in a longer word. `language`: whose stems
   // stand beside the words.
-  void Look(const std::string& word, const std::string& language, NearestWord& nearest);
+  void Look(const std::string& word, const std::string& language, NearWords& near_words);
 
  private:
   struct Term {

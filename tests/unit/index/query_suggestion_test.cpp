@@ -116,6 +116,19 @@ TEST_F(QuerySuggestionTest, OfWordsAsNearAsEachOtherTheMostFrequentIsSuggestedTh
   EXPECT_EQ(Suggested("text:abcdefgh"), "text:abcdefgoqh");
 }
 
+TEST_F(QuerySuggestionTest, WordsThatStandTogetherAreSuggestedBeforeMoreFrequentOnes) {
+  Store({{"a.txt", TextContent("a white whale")},
+         {"b.txt", TextContent("the wheel, a brown shale")},
+         {"c.txt", TextContent("one wheel")},
+         {"d.txt", TextContent("two kinds of whirl, wheal and whaer")}});
+  EXPECT_EQ(Suggested("whael"), "wheel");
+  EXPECT_EQ(Suggested("white whael"), "white whale");
+  EXPECT_EQ(Suggested("\"white whael\""), "\"white whale\"");
+  EXPECT_EQ(Suggested("whiet whael"), "white whale");
+  EXPECT_EQ(Suggested("kinds whael"), "kinds whaer");
+  EXPECT_EQ(Suggested("brown white whael"), "") << "no text has them all";
+}
+
 // Here the stem is a word too, and the more frequent one.
 TEST_F(QuerySuggestionTest, WordsThatOthersGoOnFromAreSuggestedWhereTheyAreTheMostFrequent) {
   Store({{"a.txt", TextContent("The carp is old")},
