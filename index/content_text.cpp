@@ -90,7 +90,7 @@ ContentWords WordsOf(const Content& content) {
 }
 
 int64_t FieldBits(const Content& content) {
-  int64_t bits = 0;
+  int64_t bits = content.text.empty() ? NO_TEXT : 0;
   for (const TextField& field : content.texts) {
     bits |= int64_t{1} << static_cast<int>(field.field);
   }

@@ -28,7 +28,8 @@ struct ContentWords {
 };
 ContentWords WordsOf(const Content& content);
 
-// A bit for each text field that is there: 1 << number.
+// A bit for each text field that is there, 1 << number, and NO_TEXT where the text is empty.
+constexpr int64_t NO_TEXT = 1;
 int64_t FieldBits(const Content& content);
 
 // Empty when there is no memory.

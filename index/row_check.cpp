@@ -6,6 +6,7 @@
 #include <numbers>
 
 #include "base/utf8.h"
+#include "index/content_text.h"
 #include "index/entry_table.h"
 #include "state/layout.h"
 
@@ -216,11 +217,14 @@ bool RowCheck::MatchesContent(const QueryNode& node, const Candidate& candidate)
   if (facts == nullptr) {
     return false;
   }
-  if (node.presence == Presence::CONTENT || node.presence == Presence::TEXT) {
+  if (node.presence == Presence::TEXT) {
+    return facts->length > 0 && (facts->fields & NO_TEXT) == 0;
+  }
+  if (node.presence == Presence::CONTENT) {
     const bool has_number =
         std::any_of(facts->numbers.begin(), facts->numbers.end(),
                     [](const std::optional<int64_t>& number) { return number.has_value(); });
-    return facts->length > 0 || (node.presence == Presence::CONTENT && has_number);
+    return facts->length > 0 || has_number;
   }
   if (node.presence == Presence::LOCATION) {
     return facts->Number(ContentField::LATITUDE).has_value() &&

@@ -214,5 +214,5 @@ class Asker:
             Asked("is:file", lambda entry: not entry.is_folder),
             Asked("is:empty", lambda entry: not entry.is_folder and entry.size == 0),
             Asked("is:hidden", lambda entry: entry.name.startswith(".")),
-            Asked("has:text", lambda entry: entry.title != "" or entry.text != ""),
+            Asked("has:text", lambda entry: entry.text != ""),
             Asked("has:title", lambda entry: entry.title != "")))

@@ -222,7 +222,7 @@ PlainQuestion QuestionMaker::Has() {
                 return f.WasRead() && (has_words(f) || !f.content.numbers.empty());
               }};
     case 1:
-      return {"has:text", [=](const PlainFile& f) { return f.WasRead() && has_words(f); }};
+      return {"has:text", [](const PlainFile& f) { return f.WasRead() && !f.text.empty(); }};
     case 2:
       return {"has:location",
               [](const PlainFile& f) { return f.Number(ContentField::LATITUDE) != nullptr; }};

@@ -96,6 +96,22 @@ TEST_F(QueryAttributesTest, NumbersOfContentsAreRanges) {
   EXPECT_EQ(Sorted("has:content"), Names({"a.mp3", "b.mp3", "c.jpg", "d.txt"}));
 }
 
+TEST_F(QueryAttributesTest, ATitleIsNoText) {
+  Content scan = Tagged(ContentField::TITLE, "Deed of 1851");
+  scan.numbers = {{ContentField::PAGES, 2}};
+  Content book = TextContent("Call me Ishmael");
+  book.texts = {{ContentField::TITLE, "Whales"}};
+  Store({{"scan.pdf", scan},
+         {"book.pdf", book},
+         {"year.mp3", Numbered({{ContentField::YEAR, 1994}})},
+         {"plain.txt", TextContent("x")}});
+
+  EXPECT_EQ(Sorted("has:text"), Names({"book.pdf", "plain.txt"}));
+  EXPECT_EQ(Sorted("has:content -has:text"), Names({"scan.pdf", "year.mp3"}));
+  EXPECT_EQ(Sorted("pdf NOT has:text"), Names({"scan.pdf"}));
+  EXPECT_EQ(Sorted("has:title"), Names({"book.pdf", "scan.pdf"}));
+}
+
 TEST_F(QueryAttributesTest, PicturesAreAsWideAndAsHighAsTheirNumbersSay) {
   Store({{"wide.jpg",
           Numbered({{ContentField::WIDTH, 4000}, {ContentField::HEIGHT, 3000}}, Kind::PHOTO)},

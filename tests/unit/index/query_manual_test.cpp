@@ -196,6 +196,8 @@ TEST_F(QueryManualTest, ExamplesFindWhatTheyAreFor) {
       {"year:1990..1999", {"song.mp3"}},
       {"bitrate:>=320K", {"song.mp3"}},
       {"taken:2024-01-05", {"img_2024.jpg", "paris.png"}},
+      {"has:content -has:text",
+       {"backup.tar.gz", "film.mkv", "img_2024.jpg", "paris.png", "song.mp3"}},
       {"near:52.5163,13.3777,2km", {"img_2024.jpg"}},
       {"near:48.8584,2.2945,500m", {"paris.png"}},
       {"has:artist -has:album", {"song.mp3"}},
