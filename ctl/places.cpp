@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/places.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -40,6 +41,21 @@ std::string SplitLast(std::string& path) {
   std::string name = path.substr(slash + 1);
   path.resize(slash == 0 ? 1 : slash);
   return name;
+}
+
+// Whether it is the user who is kept out of the state, or from making it.
+bool IsForOthers(const std::string& root) {
+  struct stat status = {};
+  std::string existing = root;
+  while (stat(existing.c_str(), &status) != 0) {
+    if (errno != ENOENT || existing == "/") {
+      return errno == EACCES;
+    }
+    SplitLast(existing);
+  }
+  return S_ISDIR(status.st_mode) &&
+         faccessat(AT_FDCWD, existing.c_str(), R_OK | W_OK | X_OK, AT_EACCESS) != 0 &&
+         errno == EACCES;
 }
 
 void DropSlashes(std::string& path) {
@@ -87,6 +103,10 @@ bool MakeAbsolute(const std::string& given, std::string& path) {
 bool Session::Open() {
   std::string error;
   store = StateStore::Open(error);
+  if (!store && IsForOthers(StateRoot())) {
+    (void)Fail(EXIT_FAILED, "cannot read the state folder %s: root is needed", StateRoot().c_str());
+    return false;
+  }
   if (!store) {
     (void)Fail(EXIT_FAILED, "%s", error.c_str());
     return false;

@@ -2,11 +2,14 @@
 """Wrong command lines end with 2 and one line; help ends with 0; broken surroundings with 1."""
 
 import os
+import shutil
 import subprocess
 
 from harness import IndexTest, main, namespace
 from harness.awaiting import LIMIT
 from harness.machine import environment, program
+
+NOBODY = 65534
 
 WRONG = [
     (),
@@ -93,6 +96,45 @@ class UsageTest(IndexTest):
 
         for arguments in (("share", "list"), ("status",), ("dump", "a")):
             self.ctl(*arguments, code=1, FILEINDEXD_STATE_DIR=f"{namespace.RUN}/file/state")
+
+    def by_another_user(self, *arguments, **more):
+        copy = f"{namespace.RUN}/open/fileindexctl"
+        if not os.path.exists(copy):
+            os.mkdir(f"{namespace.RUN}/open")
+            shutil.copy(program("fileindexctl"), copy)
+        try:
+            return subprocess.run(
+                [copy, *arguments],
+                env=environment(**more),
+                user=NOBODY,
+                cwd="/",
+                capture_output=True,
+                check=False,
+                timeout=LIMIT,
+            )
+        except OSError as error:  # where only one user is mapped
+            self.skipTest(f"no other user here: {error}")
+
+    def test_another_user_is_told_that_root_is_needed(self):
+        self.make_share()
+        for state in (namespace.STATE, f"{namespace.STATE}/below", f"{namespace.RUN}/no/state"):
+            told = f"fileindexctl: cannot read the state folder {state}: root is needed\n"
+            for arguments in (("search", "x"), ("info", "/x"), ("stats",), ("status",),
+                              ("dump", "alpha"), ("failed",), ("verify", "alpha"),
+                              ("share", "list"), ("folder", "list"), ("share", "add", "b", "/")):
+                with self.subTest(state=state, arguments=arguments):
+                    done = self.by_another_user(*arguments, FILEINDEXD_STATE_DIR=state)
+                    self.assertEqual((done.returncode, done.stdout, done.stderr.decode()),
+                                     (1, b"", told))
+
+    def test_what_else_is_wrong_is_told_to_another_user_too(self):
+        with open(f"{namespace.RUN}/file", "w", encoding="ascii"):
+            pass
+        for state, told in (("x", b"FILEINDEXD_STATE_DIR is not an absolute path: x"),
+                            (f"{namespace.RUN}/file", b"cannot create")):
+            done = self.by_another_user("share", "list", FILEINDEXD_STATE_DIR=state)
+            self.assertEqual(done.returncode, 1)
+            self.assertIn(told, done.stderr)
 
     def test_output_that_cannot_be_written(self):
         self.make_share()
