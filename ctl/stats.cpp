@@ -38,7 +38,7 @@ int ReadWish(const Arguments& arguments, StatisticsWish& wish) {
   if (arguments.growth) {
     const std::optional<int64_t> seconds = ParseDuration(*arguments.growth);
     if (!seconds) {
-      return Fail(EXIT_USAGE, "stats: --growth: not a duration such as 90s, 15m, 2h, 7d: %s",
+      return Fail(EXIT_USAGE, "stats: --growth: not a duration such as 15m, 1h30m, 7d, 2w: %s",
                   arguments.growth->c_str());
     }
     wish.born_since = wish.now - *seconds * SECOND;

@@ -5,11 +5,11 @@
 #include <charconv>
 #include <ctime>
 
+#include "index/query_times.h"
+
 namespace fileindexd {
 
 namespace {
-
-constexpr int64_t MAX_DURATION = int64_t{100000} * 24 * 60 * 60;  // seconds
 
 template <typename Number>
 std::optional<Number> WholeNumber(std::string_view text) {
@@ -171,34 +171,10 @@ std::optional<int64_t> ParseTime(std::string_view text) {
 }
 
 std::optional<int64_t> ParseDuration(std::string_view text) {
-  if (text.size() < 2 || !Scanner::IsDigits(text.substr(0, text.size() - 1))) {
+  if (text.empty() || Scanner::IsDigits(text.substr(text.size() - 1))) {
     return std::nullopt;
   }
-
-  int64_t unit = 0;
-  switch (text.back()) {
-    case 's':
-      unit = 1;
-      break;
-    case 'm':
-      unit = 60;
-      break;
-    case 'h':
-      unit = 60 * 60;
-      break;
-    case 'd':
-      unit = 24 * 60 * 60;
-      break;
-    default:
-      return std::nullopt;
-  }
-
-  const std::optional<int64_t> number = WholeNumber<int64_t>(text.substr(0, text.size() - 1));
-  if (!number || *number > MAX_DURATION / unit) {
-    return std::nullopt;
-  }
-
-  return *number * unit;
+  return DurationSeconds(text);
 }
 
 std::optional<uint64_t> ParseCount(std::string_view text) {

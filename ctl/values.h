@@ -20,7 +20,7 @@ namespace fileindexd {
 // local, and 24:00:00 its end. Fractions are dropped.
 std::optional<int64_t> ParseTime(std::string_view text);
 
-// Seconds of "90s", "15m", "2h", "1d". At most 100,000 days, so that adding it to a time is safe.
+// Seconds of "90s", "15m", "1h30m", "2w", as in questions, but that the last number has its unit.
 std::optional<int64_t> ParseDuration(std::string_view text);
 
 // A number of decimal digits alone.

@@ -16,7 +16,7 @@ struct TimeSpan {
   bool is_relative = false;  // a moment before now
 };
 
-// "90s", "1h30m", "2w", "90": digits without a unit are seconds.
+// "90s", "1h30m", "2w", "90" (seconds); at most 100,000 days, so that a time may be added to it.
 std::optional<int64_t> DurationSeconds(std::string_view text);
 
 // "today", "-7d", "2024", "2024-01", "2024-01-05", "2024-01-05T12:30". In local time, or in that of

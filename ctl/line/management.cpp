@@ -113,7 +113,8 @@ void AddControl(Declarer& declare) {
   CLI::App* pause = declare.Add(&declare.app, "pause", Pause, "Pause indexing", "--for 2h");
   CLI::Option* until =
       AddOption(pause, "--until", into.until, "TIME", "End: seconds since the epoch, or ISO 8601");
-  AddOption(pause, "--for", into.duration, "DURATION", "Length: 90s, 15m, 2h, 1d")->excludes(until);
+  AddOption(pause, "--for", into.duration, "DURATION", "Length: 90s, 15m, 1h30m, 1d")
+      ->excludes(until);
   declare.Add(&declare.app, "resume", Resume, "End the pause", "");
 
   CLI::App* level =

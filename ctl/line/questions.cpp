@@ -72,7 +72,7 @@ void AddStats(Declarer& declare) {
   AddOption(stats, "--largest", into.largest, "N", "The N largest files");
   stats->add_flag("--duplicates", into.duplicates, "Files that are probably alike");
   AddOption(stats, "--growth", into.growth, "DURATION",
-            "What was added since, by folder: 90s, 15m, 2h, 7d");
+            "What was added since, by folder: 15m, 1h30m, 7d, 2w");
   AddJson(stats, into, "One JSON document");
   stats->footer(
       "Each name of a file counts, its bytes count once in a share: at the first of its paths "

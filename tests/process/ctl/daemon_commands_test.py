@@ -56,7 +56,8 @@ class PauseCommandTest(IndexTest):
         self.assertIsNone(self.paused_until())
 
     def test_durations(self):
-        for text, seconds in (("90s", 90), ("15m", 900), ("2h", 7200), ("1d", DAY)):
+        for text, seconds in (("90s", 90), ("15m", 900), ("2h", 7200), ("1d", DAY),
+                              ("1h30m", 5400), ("1w", 7 * DAY)):
             with self.subTest(text=text):
                 before = int(time.time())
 
@@ -90,7 +91,7 @@ class PauseCommandTest(IndexTest):
 
     def test_values_that_are_refused(self):
         for option, values in {
-            "--for": ("", "90", "s", "-1s", "1.5h", "1w", "1 h", "99999999999999999999s"),
+            "--for": ("", "90", "s", "-1s", "1.5h", "1x", "1 h", "99999999999999999999s"),
             "--until": ("", "soon", "2099-13-01", "2099-02-30", "2099-01-01T25:00", "12:00"),
         }.items():
             for value in values:

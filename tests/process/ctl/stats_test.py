@@ -173,6 +173,8 @@ class CountsTest(StatsTest):
         self.assertEqual(grown("2d"), {f"{root}/a": (4, 1500), f"{root}/c": (1, 0),
                                        root: (4, 50), f"{root}/empty": (1, 0)})
         self.assertEqual(grown("4d")[f"{root}/a"], (5, 4500))
+        self.assertEqual(grown("1w"), grown("7d"))
+        self.assertEqual(grown("1d24h"), grown("2d"))
 
     def test_a_disk_that_is_gone_is_not_missed(self):
         self.index(self.root)
@@ -234,7 +236,7 @@ class TroubleTest(StatsTest):
     def test_what_is_refused(self):
         for arguments in (("--by", "size"), ("--by",), ("--by", ""), ("--largest", "0"),
                           ("--largest", "-1"), ("--largest", "x"), ("--largest", "1000000000"),
-                          ("--growth", "7"), ("--growth", "7w"), ("--growth", "-1d"),
+                          ("--growth", "7"), ("--growth", "7x"), ("--growth", "-1d"),
                           ("--growth", ""), ("--duplicates=x",), ("extra",), ("--nope",)):
             with self.subTest(arguments=arguments):
                 self.ctl("stats", *arguments, code=2)

@@ -134,25 +134,19 @@ TEST(ParseDurationTest, TakesEveryUnit) {
   EXPECT_EQ(ParseDuration("15m"), 900);
   EXPECT_EQ(ParseDuration("2h"), 7200);
   EXPECT_EQ(ParseDuration("1d"), 86400);
+  EXPECT_EQ(ParseDuration("2w"), 1209600);
+  EXPECT_EQ(ParseDuration("1y"), 31536000);
+  EXPECT_EQ(ParseDuration("1h30m"), 5400);
+  EXPECT_EQ(ParseDuration("5S"), 5);
   EXPECT_EQ(ParseDuration("0s"), 0);
   EXPECT_EQ(ParseDuration("100000d"), int64_t{8640000000});
 }
 
 TEST(ParseDurationTest, RefusesEverythingElse) {
-  const char* const bad[] = {"",
-                             "s",
-                             "90",
-                             "90x",
-                             "-5s",
-                             "+5s",
-                             "1.5h",
-                             "1h30m",
-                             " 5s",
-                             "5 s",
-                             "5S",
-                             "100001d",
-                             "99999999999999999999s",
-                             "0x5s"};
+  const char* const bad[] = {
+      "",     "s",      "90",  "90x", "-5s",     "+5s",       "1.5h",
+      "1h30", "1h 30m", " 5s", "5 s", "100001d", "99999d25h", "99999999999999999999s",
+      "0x5s"};
   for (const char* text : bad) {
     EXPECT_FALSE(ParseDuration(text).has_value()) << '"' << text << '"';
   }
