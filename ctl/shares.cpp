@@ -11,6 +11,7 @@
 #include "ctl/commands.h"
 #include "ctl/output.h"
 #include "ctl/places.h"
+#include "ctl/values.h"
 #include "index/reader.h"
 #include "index/text_tokenizer.h"
 #include "state/belonging.h"
@@ -271,11 +272,7 @@ int ShareAccept(const Arguments& arguments) {
 int ShareSet(const Arguments& arguments) {
   const std::string language = LanguageName(arguments.language.value_or(""));
   if (language.empty()) {
-    std::string known;
-    for (const std::string& name : Languages()) {
-      known += (known.empty() ? "" : ", ") + name;
-    }
-    return Fail(EXIT_USAGE, "share set: --language: not one of %s: %s", known.c_str(),
+    return Fail(EXIT_USAGE, "share set: --language: not one of %s: %s", KnownLanguages().c_str(),
                 arguments.language.value_or("").c_str());
   }
 

@@ -6,6 +6,7 @@
 #include <ctime>
 
 #include "index/query_times.h"
+#include "index/text_tokenizer.h"
 
 namespace fileindexd {
 
@@ -179,6 +180,14 @@ std::optional<int64_t> ParseDuration(std::string_view text) {
 
 std::optional<uint64_t> ParseCount(std::string_view text) {
   return Scanner::IsDigits(text) ? WholeNumber<uint64_t>(text) : std::nullopt;
+}
+
+std::string KnownLanguages() {
+  std::string known;
+  for (const std::string& name : Languages()) {
+    known += (known.empty() ? "" : ", ") + name;
+  }
+  return known;
 }
 
 SearchArguments SplitSearchArguments(const std::vector<std::string>& arguments,

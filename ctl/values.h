@@ -26,6 +26,9 @@ std::optional<int64_t> ParseDuration(std::string_view text);
 // A number of decimal digits alone.
 std::optional<uint64_t> ParseCount(std::string_view text);
 
+// What --language takes, for people: "arabic, ... none, ...".
+std::string KnownLanguages();
+
 // Arguments of `search`, told apart: what begins with "--", or is "-0", is an option; every other
 // argument belongs to the query, and so does everything after a lone "--".
 struct SearchArguments {

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Commands that change something: shares, folders, queues, the daemon.
 #include "ctl/line/declarer.h"
+#include "ctl/values.h"
 
 namespace fileindexd {
 
@@ -46,8 +47,11 @@ void AddShares(Declarer& declare) {
   CLI::App* set = declare.Add(group, "set", ShareSet, "Change what holds for a share",
                               "letters --language german");
   AddText(set, "NAME", into.share, "The share");
-  AddOption(set, "--language", into.language, "L",
-            "Find the forms of that language's words together; none: of no language's")
+  AddOption(
+      set, "--language", into.language, "L",
+      ("Find the forms of that language's words together; none: of no language's. L is one of " +
+       KnownLanguages())
+          .c_str())
       ->required();
 
   CLI::App* list = declare.Add(group, "list", ShareList, "List the shares", "--json");

@@ -51,7 +51,11 @@ _fileindexctl_value() {
     *:--under | *:--path-old) echo '@file' ;;
     'folder set:--document' | 'folder set:--audio' | 'folder set:--video' | 'folder set:--photo')
       echo 'on off' ;;
-    *:--language | *:--exclude | *:--data | *:--until | *:--for | *:--limit | *:--offset | \
+    'share set:--language')
+      echo 'arabic armenian basque catalan danish dutch english finnish french german greek' \
+        'hindi hungarian indonesian irish italian lithuanian nepali none norwegian porter' \
+        'portuguese romanian russian serbian spanish swedish tamil turkish yiddish' ;;
+    *:--exclude | *:--data | *:--until | *:--for | *:--limit | *:--offset | \
       *:--timeout | *:--query | *:--largest | *:--growth) echo '-' ;;
   esac
 }

@@ -44,6 +44,7 @@ OFFERED = [
     (("search", "word", "--off"), ["--offset"]),
     (("stats", "--by", ""), ["age", "ext", "folder", "kind", "owner"]),
     (("stats", "--share", "be"), ["beta"]),
+    (("share", "set", "alpha", "--language", "ge"), ["german"]),
     (("log-level", ""), ["debug", "error"]),
     (("failed", "--retry", ""), ["alpha", "beta"]),
 ]
@@ -125,6 +126,12 @@ class BashTest(CompletionTest):
                 wanted = re.findall(r"^  (?:-h,)?(--[a-z-]+|-0)", listed, re.MULTILINE)
                 offered = [reply.rstrip("=") for reply in self.offered(*words, "-")]
                 self.assertEqual(offered, sorted(wanted))
+
+    def test_every_language(self):
+        told = self.ctl("share", "set", "alpha", "--language", "?", code=2).err.decode()
+        languages = told.partition("not one of ")[2].rpartition(": ")[0].split(", ")
+        self.assertGreater(len(languages), 2)
+        self.assertEqual(self.offered("share", "set", "alpha", "--language", ""), languages)
 
     def test_every_command(self):
         for words in commands(self.ctl):

@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Help: all commands are listed, and each has an example that the command line takes."""
 
+import os
 import re
 import shlex
 
@@ -8,6 +9,7 @@ from ctl.completion_test import commands
 from ctl.follow_test import Follower
 from harness import IndexTest, main, namespace
 
+README = os.path.join(os.path.dirname(__file__), "../../../README.md")
 EXAMPLE = re.compile(r"\nExample:\n((?:  fileindexctl [^\n]+\n)+)\Z")
 
 
@@ -102,6 +104,17 @@ class HelpTest(IndexTest):
 
         self.assertIn("--limit N At most so many hits, or 'all'; 20 if not given; with 0 the "
                       "question is only checked", told)
+
+    def test_every_language_is_told(self):
+        refused = self.ctl("share", "set", "a", "--language", "?", code=2).err.decode()
+        languages = refused.partition("not one of ")[2].rpartition(": ")[0]
+        self.assertGreater(len(languages.split(", ")), 2)
+        self.assertIn(languages, " ".join(self.ctl("share", "set", "--help").out.decode().split()))
+
+        with open(README, encoding="utf-8") as file:
+            option = file.read().partition("--language L` (")[2].partition(")")[0].lower()
+        for language in set(languages.split(", ")) - {"porter"}:  # English, as it was cut once
+            self.assertIn(language, option)
 
     def test_examples_differ_from_each_other(self):
         found = [tuple(e) for command in commands(self.ctl) for e in self.examples(*command)]
