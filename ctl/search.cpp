@@ -196,8 +196,11 @@ int Search(const Arguments& arguments) {
   const bool has_more = tells_of_more && answer.hits.size() > USUAL_HITS;
   answer.hits.resize(has_more ? USUAL_HITS : answer.hits.size());
   PutAnswer(answer, arguments, screen);
+  const bool is_behind_all = answer.hits.empty() && answer.total > 0 && question.limit > 0;
   if (has_more) {
     TellOfMore(USUAL_HITS, screen);
+  } else if (is_behind_all && answer.failures.empty()) {
+    TellOfFewer(question, answer, screen);
   } else if (answer.total == 0 && answer.failures.empty() &&
              (question.limit > 0 || question.count_all)) {
     TellNothingFound(question, answer, screen);

@@ -72,6 +72,15 @@ void TellOfWords(const Settings& settings, const Answer& answer,
   }
 }
 
+void TellOfFewer(const Question& question, const Answer& answer,
+                 const std::optional<Screen>& screen) {
+  if (screen.has_value()) {
+    PutNote("Nothing behind the first " + std::to_string(question.offset) + ": there " +
+                (answer.total == 1 ? "is " : "are ") + std::to_string(answer.total) + " in all.",
+            screen);
+  }
+}
+
 void TellOfMore(uint64_t shown, const std::optional<Screen>& screen) {
   PutNote("There are more than these " + std::to_string(shown) +
               ": --limit N or --limit all shows them, --offset N the next.",

@@ -199,6 +199,16 @@ class MoreTest(IndexTest):
         with open(f"{namespace.RUN}/found", "rb") as file:
             self.assertEqual(len(file.readlines()), 20)
 
+    def test_how_many_there_are_is_told_behind_the_last(self):
+        note = "Nothing behind the first 25: there are 25 in all."
+        self.assertEqual(self.show("tower", "--offset", "25"), [note])
+        self.assertEqual(self.show("tower", "--offset", "25", "--limit", "5"), [note])
+        self.assertEqual(self.show("tower 7", "--offset", "9"),
+                         ["Nothing behind the first 9: there is 1 in all."])
+        self.assertEqual(self.show("tower", "--offset", "25", "--limit", "0"), [])
+        self.assertEqual(self.ctl("search", "tower", "--offset", "25").out, b"")
+        self.assertEqual(self.show("--json", "tower", "--offset", "25"), [])
+
     def test_otherwise_nothing_is_told(self):
         for count, *arguments in ((20, "--offset", "5"), (20, "--limit", "20"),
                                   (3, "--limit", "3"), (25, "--limit", "all")):
