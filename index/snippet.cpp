@@ -26,32 +26,37 @@ struct Wanted {
   bool is_beginning;
   size_t word;
   size_t number;  // of the token in the question: those in one place have the same
+  size_t first;   // of the word's numbers
+  size_t last;
 };
 
 struct Place {
   size_t start;
   size_t end;
   size_t number;
+  size_t first;
+  size_t last;
+  size_t at;  // how many words stand before it
 };
 
-// Of a word with several tokens each one counts: where most of them stand together is best.
 std::vector<Wanted> TokensOf(const std::vector<const QueryNode*>& words, TextCutter& cutter) {
   std::vector<Wanted> tokens;
   size_t number = 0;
   for (size_t word = 0; word < words.size(); ++word) {
     const std::string& text = words[word]->text;
     const size_t first = tokens.size();
+    const size_t first_number = number;
     size_t last_start = 0;
     cutter.Cut(text, true, [&](std::string_view token, size_t start, size_t) {
       number += tokens.size() > first && start != last_start ? 1 : 0;
       last_start = start;
-      tokens.push_back({std::string(token), false, word, number});
+      tokens.push_back({std::string(token), false, word, number, first_number, 0});
       return true;
     });
-    if (words[word]->is_beginning || IsBeginning(text)) {
-      for (size_t i = first; i < tokens.size(); ++i) {
-        tokens[i].is_beginning = tokens[i].number == number;
-      }
+    const bool is_beginning = words[word]->is_beginning || IsBeginning(text);
+    for (size_t i = first; i < tokens.size(); ++i) {
+      tokens[i].is_beginning = is_beginning && tokens[i].number == number;
+      tokens[i].last = number;
     }
     ++number;
   }
@@ -103,6 +108,41 @@ class Completeness {
   size_t end = NOWHERE;
 };
 
+// Whether all tokens of its word stand in a row there.
+bool IsWhole(const std::vector<Place>& places, size_t i) {
+  const Place& place = places[i];
+  const size_t before = place.number - place.first;
+  if (before > i || i - before + (place.last - place.first) >= places.size()) {
+    return false;
+  }
+  const Place* row = &places[i - before];
+  for (size_t k = 0; k <= place.last - place.first; ++k) {
+    if (row[k].number != place.first + k || row[k].at != row->at + k) {
+      return false;
+    }
+  }
+  return true;
+}
+
+// Of a word with several tokens those count that stand in a row; where none do, each one.
+std::vector<Place> WithoutParts(const std::vector<Place>& places) {
+  std::vector<bool> is_whole;
+  std::set<size_t> whole;  // by the first number
+  for (size_t i = 0; i < places.size(); ++i) {
+    is_whole.push_back(IsWhole(places, i));
+    if (is_whole[i] && places[i].first < places[i].last) {
+      whole.insert(places[i].first);
+    }
+  }
+  std::vector<Place> left;
+  for (size_t i = 0; i < places.size(); ++i) {
+    if (is_whole[i] || !whole.contains(places[i].first)) {
+      left.push_back(places[i]);
+    }
+  }
+  return left;
+}
+
 // All, or as far as those behind do not count.
 std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& tokens,
                             TextCutter& cutter) {
@@ -112,22 +152,29 @@ std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& to
   }
   Completeness shown(tokens);
   std::map<size_t, size_t> counts;  // a common word does not hide a rare one
+  size_t at = 0;
+  size_t last_start = 0;
   cutter.Cut(text, false, [&](std::string_view token, size_t start, size_t end) {
     if (shown.IsBehind(start)) {
       return false;
     }
+    at += start == last_start ? 0 : 1;  // several may stand in one place
+    last_start = start;
     for (const Wanted& wanted : tokens) {
       const bool same =
           wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token;
       const bool known = !places.empty() && places.back().start == start;
+      if (same && known && places.back().first != wanted.first) {
+        places.back().first = places.back().last = places.back().number;  // it counts alone, too
+      }
       if (same && !known && ++counts[wanted.number] <= MOST_PLACES) {
-        places.push_back({start, end, wanted.number});
+        places.push_back({start, end, wanted.number, wanted.first, wanted.last, at});
         shown.Add(places.back());
       }
     }
     return true;
   });
-  return places;
+  return WithoutParts(places);
 }
 
 // The place from which on most different words are shown.

@@ -134,6 +134,20 @@ TEST_F(SnippetMarksTest, OneCharacterInPartsMarksThePairThatItBegins) {
   EXPECT_EQ(Marked({"\u1100\u116e\u11a8"}, "abc \uad6d\uc5b4 def"), Texts({"\uad6d\uc5b4"}));
 }
 
+TEST_F(SnippetMarksTest, OfAPhraseOnlyWholeOnesAreMarked) {
+  EXPECT_EQ(Marked({"white whale"}, "A White fur. The white whales, and a whale of white."),
+            Texts({"white", "whales"}));
+  EXPECT_EQ(Marked({"white whale"}, "white white whale whale"), Texts({"white", "whale"}));
+  EXPECT_EQ(Marked({"white whale"}, "a white whale, or a white whale"),
+            Texts({"white", "whale", "white", "whale"}));
+  EXPECT_EQ(Marked({"white-whale"}, "white; white/whale"), Texts({"white", "whale"}));
+  EXPECT_EQ(Marked({"white whale", "white"}, "a white coat, a whale, a white whale"),
+            Texts({"white", "white", "whale"}))
+      << "what is asked for alone is marked there, too";
+  EXPECT_EQ(Marked({"white whale"}, "a white coat, a whale"), Texts({"white", "whale"}))
+      << "it stands further down";
+}
+
 INSTANTIATE_TEST_SUITE_P(Lengths, SnippetTest, testing::Values(5, 50, 200));
 
 }  // namespace
