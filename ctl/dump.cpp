@@ -30,7 +30,7 @@ bool PutEntry(const Entry& entry, Kind kind, const Arguments& arguments) {
 
 int Dump(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!session.OpenToAsk()) {
     return EXIT_FAILED;
   }
   const Share* share = session.FindShare(arguments.share);

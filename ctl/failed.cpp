@@ -114,7 +114,7 @@ std::string RetryText(const Listing& listing) {
 
 int Failed(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!(arguments.retry ? session.Open() : session.OpenToAsk())) {
     return EXIT_FAILED;
   }
   std::vector<Share> shares = session.settings->shares;

@@ -28,7 +28,7 @@ std::string FlagsText(const ContentFlags& flags) {
 
 int FolderList(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!session.OpenToAsk()) {
     return EXIT_FAILED;
   }
 

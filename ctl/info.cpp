@@ -259,7 +259,7 @@ void PutLines(const FactLines& lines) {
 
 int Info(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!session.OpenToAsk()) {
     return EXIT_FAILED;
   }
   const int code =

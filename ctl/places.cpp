@@ -120,6 +120,16 @@ bool Session::Open() {
   return true;
 }
 
+bool Session::OpenToAsk() {
+  struct stat status = {};
+  const std::string root = StateRoot();
+  if (lstat(root.c_str(), &status) != 0 && errno == ENOENT && !IsForOthers(root)) {
+    settings = std::make_shared<const Settings>();
+    return true;
+  }
+  return Open();
+}
+
 const Share* Session::FindShare(const std::string& name) const {
   const Share* share = settings->ShareByName(name);
   if (share == nullptr) {

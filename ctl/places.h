@@ -14,10 +14,13 @@ namespace fileindexd {
 struct Session {
   // False, with its line written, on failure.
   bool Open();
+  // For what only asks: where there is no state, none is made. The settings are those without a
+  // share then, and there is no store.
+  bool OpenToAsk();
   // The share of that name; null, with its line written, when there is none.
   const Share* FindShare(const std::string& name) const;
 
-  std::unique_ptr<StateStore> store;
+  std::unique_ptr<StateStore> store;  // null: there is no state
   std::shared_ptr<const Settings> settings;
 };
 

@@ -172,7 +172,8 @@ int Search(const Arguments& arguments) {
   question.limit += tells_of_more ? 1 : 0;
 
   Session session;
-  if (!session.Open() || !ChooseShares(session, arguments, question)) {
+  if (!(arguments.wait ? session.Open() : session.OpenToAsk()) ||
+      !ChooseShares(session, arguments, question)) {
     return EXIT_FAILED;
   }
   std::string error;

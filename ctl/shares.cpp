@@ -287,7 +287,7 @@ int ShareSet(const Arguments& arguments) {
 
 int ShareList(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!session.OpenToAsk()) {
     return EXIT_FAILED;
   }
 

@@ -56,7 +56,7 @@ int Stats(const Arguments& arguments) {
     return code;
   }
   Session session;
-  if (!session.Open()) {
+  if (!session.OpenToAsk()) {
     return EXIT_FAILED;
   }
   if (arguments.in_share && session.FindShare(*arguments.in_share) == nullptr) {

@@ -100,8 +100,9 @@ bool IsRemoved(Session& session, const std::string& name) {
 
 bool MakeReport(Session& session, const Watches& watches, StatusReport& report) {
   int64_t resume_time = -1;
-  std::shared_ptr<const Settings> settings;
-  if (!session.store->GetSettings(settings) || !session.store->GetPause(resume_time)) {
+  std::shared_ptr<const Settings> settings = session.settings;
+  if (session.store != nullptr &&
+      (!session.store->GetSettings(settings) || !session.store->GetPause(resume_time))) {
     (void)Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
     return false;
   }
@@ -129,7 +130,7 @@ bool MakeReport(Session& session, const Watches& watches, StatusReport& report) 
 
 int Status(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!(arguments.follow ? session.Open() : session.OpenToAsk())) {
     return EXIT_FAILED;
   }
   if (arguments.follow) {

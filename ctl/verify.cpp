@@ -138,7 +138,7 @@ void ReindexFolders(const Settings& settings, const Share& share, Repair& repair
 
 int Verify(const Arguments& arguments) {
   Session session;
-  if (!session.Open()) {
+  if (!(arguments.repair ? session.Open() : session.OpenToAsk())) {
     return EXIT_FAILED;
   }
   const Share* share = session.FindShare(arguments.share);

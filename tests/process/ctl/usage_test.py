@@ -97,6 +97,25 @@ class UsageTest(IndexTest):
         for arguments in (("share", "list"), ("status",), ("dump", "a")):
             self.ctl(*arguments, code=1, FILEINDEXD_STATE_DIR=f"{namespace.RUN}/file/state")
 
+    def test_a_question_makes_no_state_and_answers_as_without_shares(self):
+        nowhere = f"{namespace.RUN}/no/state"
+        self.ctl("share", "remove", "alpha", code=1)  # makes one
+        for arguments in (("search", "x"), ("search", "--count", "x"), ("search", "x", "share:a"),
+                          ("search", "--json", "x"), ("search", "--share", "a", "x"),
+                          ("info", "/x"), ("stats",), ("stats", "--json"),
+                          ("stats", "--share", "a"), ("status",), ("status", "--json"),
+                          ("dump", "a"), ("failed",), ("failed", "--json"), ("failed", "a"),
+                          ("verify", "a"), ("share", "list"), ("share", "list", "--json"),
+                          ("folder", "list"),
+                          ("folder", "list", "--json")):
+            with self.subTest(arguments=arguments):
+                self.assertEqual(self.try_ctl(*arguments, FILEINDEXD_STATE_DIR=nowhere),
+                                 self.try_ctl(*arguments))
+                self.assertFalse(os.path.lexists(f"{namespace.RUN}/no"))
+
+        self.ctl("resume", FILEINDEXD_STATE_DIR=nowhere)
+        self.assertTrue(os.path.exists(f"{nowhere}/state.db"))
+
     def by_another_user(self, *arguments, **more):
         copy = f"{namespace.RUN}/open/fileindexctl"
         if not os.path.exists(copy):
