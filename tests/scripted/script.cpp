@@ -15,7 +15,8 @@ namespace fileindexd::scripted {
 struct Script::Plan {
   std::optional<int> answer;
   std::vector<std::function<void()>> run;
-  bool block = false;
+  // The releases so far where the call is to block: one that comes before it waits counts, too.
+  std::optional<int> block;
 };
 
 namespace {
@@ -123,12 +124,14 @@ Script::Plan Script::Count(const std::string& operation, const std::string& subj
     if (rule.run) {
       plan.run.push_back(rule.run);
     }
-    plan.block = plan.block || rule.block;
+    if (rule.block) {
+      plan.block = release;
+    }
   }
   return plan;
 }
 
-void Script::WaitWhileBlocked(const std::string& operation) {
+void Script::AwaitReleaseAfter(int before, const std::string& operation) {
   // A destructor must not be unwound out of.
   int state = PTHREAD_CANCEL_ENABLE;
   if (operation == "~Indexer") {
@@ -136,7 +139,6 @@ void Script::WaitWhileBlocked(const std::string& operation) {
   }
   {
     const MutexGuard lock(&mutex);
-    const int before = release;
     const BlockedCount count(blocked, &changed);
     while (release == before) {
       pthread_cond_wait(&changed, &mutex);
@@ -158,7 +160,7 @@ std::optional<int> Script::Enter(const std::string& operation, const std::string
     action();
   }
   if (plan.block) {
-    WaitWhileBlocked(operation);
+    AwaitReleaseAfter(*plan.block, operation);
   }
   return plan.answer;
 }
@@ -179,7 +181,7 @@ std::optional<int> Script::EnterUnrecorded(const std::string& operation,
     action();
   }
   if (plan.block) {
-    WaitWhileBlocked(operation);
+    AwaitReleaseAfter(*plan.block, operation);
   }
   return plan.answer;
 }

@@ -130,7 +130,7 @@ class Script {
  private:
   struct Plan;
   Plan Count(const std::string& operation, const std::string& subject);
-  void WaitWhileBlocked(const std::string& operation);
+  void AwaitReleaseAfter(int before, const std::string& operation);
   bool Await(const std::function<bool()>& reached);
 
   std::vector<Rule> rules;
@@ -140,7 +140,7 @@ class Script {
   std::vector<LogLine> lines;
   std::atomic<bool> plain = true;  // no rule and no answer was given
   int blocked = 0;
-  int release = 0;  // counts releases: one that is blocked waits for the next
+  int release = 0;  // counts releases
 };
 
 // The one script of the process: link-time platforms have no object to hang it on.
