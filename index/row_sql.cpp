@@ -6,7 +6,6 @@
 #include <vector>
 
 #include "index/candidate.h"
-#include "index/content_text.h"
 #include "index/contents_schema.h"
 #include "index/entry_table.h"
 #include "index/schema.h"
@@ -102,9 +101,8 @@ std::optional<std::string> OfFile(const QueryNode& node) {
     case Part::NEAR:
       return NearSql(node);
     case Part::HAS:
-      return node.presence == Presence::CONTENT ? " AND files.state <> 0"
-             : node.presence == Presence::TEXT
-                 ? " AND files.text <> 0 AND (files.fields & " + std::to_string(NO_TEXT) + ") = 0"
+      return node.presence == Presence::CONTENT    ? " AND files.state <> 0"
+             : node.presence == Presence::TEXT     ? " AND files.text <> 0"
              : node.presence == Presence::LOCATION ? " AND files.latitude IS NOT NULL"
              : IsNumberField(node.field)
                  ? " AND " + ColumnOf(node.field) + " IS NOT NULL"
