@@ -4,6 +4,7 @@
 #include <exception>
 #include <memory>
 #include <new>
+#include <optional>
 
 #include "index/fts5_api.h"
 #include "index/text_words.h"
@@ -15,14 +16,17 @@ namespace {
 // Whether the last run of Han, kana or Hangul is one character, with no word behind it. Parts that
 // join are one, as where words are cut: a syllable may come as its letters, a kana with its mark.
 bool EndsInOnePaired(std::string_view word) {
-  CharacterTable characters;
-  size_t count = 0;  // characters of the last run
-  int32_t last = 0;  // the one before; 0: none of a run
+  std::optional<CharacterTable> characters;  // none for the letters of most words
+  size_t count = 0;                          // characters of the last run
+  int32_t last = 0;                          // the one before; 0: none of a run
   for (size_t at = 0; at < word.size();) {
     const Character character = CharacterAt(word, at);
     const CharacterClass type = ClassOf(character.code);
     if (type == CharacterClass::PAIRED) {
-      const int32_t plain = characters.Plain(character.code);
+      if (!characters.has_value()) {
+        characters.emplace();
+      }
+      const int32_t plain = characters->Plain(character.code);
       const int32_t joined = Joined(last, plain);
       if (joined == 0) {
         count = last == 0 ? 1 : count + 1;
