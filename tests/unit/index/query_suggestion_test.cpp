@@ -129,6 +129,38 @@ TEST_F(QuerySuggestionTest, WordsThatStandTogetherAreSuggestedBeforeMoreFrequent
   EXPECT_EQ(Suggested("brown white whael"), "") << "no text has them all";
 }
 
+// Names and texts have words of their own: one that both have is one all the same, as frequent as
+// it is where it is more frequent.
+TEST_F(QuerySuggestionTest, AWordThatSeveralVocabulariesHaveStandsForOne) {
+  Store({{"whaeb.txt", TextContent("whaeb")},
+         {"whaeb 2.txt", TextContent("whaeb")},
+         {"whaem.txt", TextContent("whaem")},
+         {"whaem 2.txt", TextContent("whaem")},
+         {"a.txt", TextContent("a white whaek")},
+         {"tower.txt", TextContent("tower")},
+         {"tower 2.txt", TextContent("towed")},
+         {"tower 3.txt", TextContent("towed")}});
+  EXPECT_EQ(Suggested("white whael"), "white whaek");
+  EXPECT_EQ(Suggested("towex"), "tower");
+}
+
+TEST_F(QuerySuggestionTest, OnlyTheFirstWaysToPutNearWordsTogetherAreTried) {
+  std::map<std::string, Content> files;
+  for (const char* word : {"harb", "quay"}) {
+    for (int rank = 0; rank < 4; ++rank) {
+      for (int times = rank; times < 5; ++times) {
+        const std::string text = word + std::string(1, static_cast<char>('a' + rank));
+        files[text[0] + std::to_string(rank) + std::to_string(times) + ".txt"] = TextContent(text);
+      }
+    }
+  }
+  files["last.txt"] = TextContent("harbd quayd");
+  Store(files);
+  EXPECT_EQ(Suggested("harbx quayx"), "");
+  Store({{"sixth.txt", TextContent("harbc quaya")}});
+  EXPECT_EQ(Suggested("harbx quayx"), "harbc quaya");
+}
+
 // Here the stem is a word too, and the more frequent one.
 TEST_F(QuerySuggestionTest, WordsThatOthersGoOnFromAreSuggestedWhereTheyAreTheMostFrequent) {
   Store({{"a.txt", TextContent("The carp is old")},
