@@ -88,6 +88,17 @@ bool IsUtf8(std::string_view bytes) {
   return true;
 }
 
+std::vector<size_t> CharacterStarts(std::string_view text) {
+  std::vector<size_t> starts;
+  for (size_t i = 0; i < text.size(); ++i) {
+    if ((static_cast<unsigned char>(text[i]) & 0xc0) != 0x80) {
+      starts.push_back(i);
+    }
+  }
+  starts.push_back(text.size());
+  return starts;
+}
+
 void AppendUtf8(char32_t code, std::string& text) {
   if (code > 0x10FFFF || (code >= 0xD800 && code < 0xE000)) {
     code = 0xFFFD;

@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace fileindexd {
 
@@ -22,6 +23,9 @@ Utf8Character FirstCharacter(std::string_view bytes);
 // The text with every byte that is not part of well-formed UTF-8 replaced by U+FFFD.
 std::string ToUtf8(std::string_view bytes);
 bool IsUtf8(std::string_view bytes);
+
+// Where each character of a text that is UTF-8 begins, and the end.
+std::vector<size_t> CharacterStarts(std::string_view text);
 
 // Appends a character; what is none, such as half of a pair, becomes U+FFFD.
 void AppendUtf8(char32_t code, std::string& text);

@@ -168,15 +168,4 @@ std::string TextQueryOf(const QueryNode& node) {
   return "";
 }
 
-std::vector<size_t> CharacterStarts(std::string_view text) {
-  std::vector<size_t> starts;
-  for (size_t i = 0; i < text.size(); ++i) {
-    if ((static_cast<unsigned char>(text[i]) & 0xc0) != 0x80) {
-      starts.push_back(i);
-    }
-  }
-  starts.push_back(text.size());
-  return starts;
-}
-
 }  // namespace fileindexd

@@ -47,7 +47,5 @@ class Asked {
 std::string ColumnName(ContentField field);
 // Of a WORD, in the contents' table's own language. Empty: it is looked for in names alone.
 std::string TextQueryOf(const QueryNode& word);
-// Where each character of valid UTF-8 begins, and the end.
-std::vector<size_t> CharacterStarts(std::string_view text);
 
 }  // namespace fileindexd

@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <vector>
 
-#include "index/asked.h"
+#include "base/utf8.h"
 
 namespace fileindexd {
 
@@ -57,6 +57,11 @@ std::string QueryError::Line(std::string_view question) const {
           std::to_string(place + 1);
   return line + (place >= count ? ", at the end)"
                                 : ", at: " + Piece(question, starts, place, BEHIND) + ")");
+}
+
+bool Fail(QueryError& error, const std::string& what, size_t at) {
+  error = {what, at};
+  return false;
 }
 
 std::string Shortened(std::string_view text) {

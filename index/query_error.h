@@ -16,6 +16,9 @@ struct QueryError {
   std::string Line(std::string_view question) const;
 };
 
+// Sets it. Always false, for `return`.
+bool Fail(QueryError& error, const std::string& what, size_t at);
+
 // A user's text in quotes, as long as it takes to see which is meant.
 std::string Cited(std::string_view text);
 // The same without quotes.

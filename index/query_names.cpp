@@ -13,11 +13,6 @@ namespace fileindexd {
 
 namespace {
 
-bool Fail(QueryError& error, const std::string& what, size_t at) {
-  error = {what, at};
-  return false;
-}
-
 // Accents and what is not seen are of no account: alone they would stand in every name.
 bool IsOfAccount(std::string_view text, size_t at, QueryError& error) {
   if (!NameFolder().Parts(text).empty()) {
@@ -31,13 +26,18 @@ bool IsOfAccount(std::string_view text, size_t at, QueryError& error) {
               at);
 }
 
+std::string WithoutStars(std::string text) {
+  std::erase(text, '*');
+  return text;
+}
+
 bool FillSign(const Value& value, QueryNode& node, QueryError& error) {
   if (value.text.find_first_not_of('*') == std::string::npos) {
     return Fail(error, "'*' needs something to begin with, as in rep*", value.at);
   }
   node.part = Part::NAME_PATTERN;
   node.pieces = {value.text.substr(0, value.text.find_last_not_of('*') + 1)};
-  return IsOfAccount(node.pieces.front(), value.at, error);
+  return IsOfAccount(WithoutStars(value.text), value.at, error);
 }
 
 // "*part*", "*.pdf", "a*b".
@@ -65,9 +65,10 @@ bool HoldsNoSlash(const Value& value, QueryError& error) {
 // "annual report\"": without the first of the two, what should be a row of words is none.
 bool OpensItsQuotes(const Value& value, QueryError& error) {
   const bool is_even = std::count(value.text.begin(), value.text.end(), '"') % 2 == 0;
-  return value.is_quoted || is_even || value.text.back() != '"' ||
+  const size_t last = value.text.find_last_not_of('*');
+  return value.is_quoted || is_even || value.text[last] != '"' ||
          Fail(error, "this quote closes nothing; one opens in front of the first word",
-              value.at + value.text.size() - 1);
+              value.at + last);
 }
 
 }  // namespace
@@ -75,11 +76,8 @@ bool OpensItsQuotes(const Value& value, QueryError& error) {
 bool HoldsWords(std::string_view text) {
   for (size_t at = 0; at < text.size();) {
     const Character character = CharacterAt(text, at);
-    const CharacterClass type = character.code < 0x80
-                                    ? ASCII_CLASSES[static_cast<size_t>(character.code)]
-                                    : ClassOf(character.code);
-    if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK &&
-        type != CharacterClass::JOINER) {
+    const CharacterClass type = ClassOf(character.code);
+    if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK) {
       return true;
     }
     at += character.size;
@@ -93,10 +91,13 @@ bool BeginsAsWord(const Value& value, const std::string& field, QueryError& erro
       std::string_view("-<>=").find(sign) == std::string_view::npos) {
     return true;
   }
-  const std::string why = sign == '-'
-                              ? "a '-' that leaves out stands in front of the field, as in -" +
-                                    field + ":" + Shortened(value.text.substr(1))
-                              : field + ": compares nothing";
+  std::string why = field + ": compares nothing";
+  if (sign == '-') {
+    const std::string left_out = value.text.substr(value.text.find_first_not_of("-<>="));
+    why = "a '-' that leaves out stands in front of the field";
+    why += left_out.find('"') == std::string::npos ? ", as in -" + field + ":" + Shortened(left_out)
+                                                   : "";
+  }
   return Fail(error, why + " (a value that begins with " + sign + " stands in quotes)", value.at);
 }
 
@@ -121,7 +122,7 @@ bool FillWords(const Value& value, QueryNode& node, QueryError& error) {
     return FillSign(value, node, error);
   }
   // A mark of Arabic as a letter of its own.
-  if (!IsOfAccount(std::string_view(value.text).substr(0, end), value.at, error)) {
+  if (!IsOfAccount(WithoutStars(value.text), value.at, error)) {
     return false;
   }
   node.part = Part::WORD;

@@ -4,7 +4,8 @@
 
 #include <string_view>
 
-#include "index/query_parts.h"
+#include "index/query.h"
+#include "index/query_piece.h"
 
 namespace fileindexd {
 

@@ -283,9 +283,7 @@ bool Parser::ReadLeaf(QueryNode& node, int depth) {
     return Fail("too many words", start);
   }
   if (field == nullptr) {
-    const std::string_view rest = std::string_view(text).substr(start);
-    std::string why = WhyMeantForField(rest);
-    why = why.empty() ? WhyLeftOutTwice(rest) : why;
+    const std::string why = WhyMeantOtherwise(std::string_view(text).substr(start));
     if (!why.empty()) {
       return Fail(why, start);
     }

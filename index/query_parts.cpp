@@ -22,11 +22,6 @@ namespace fileindexd {
 
 namespace {
 
-bool Fail(QueryError& error, const std::string& what, size_t at) {
-  error = {what, at};
-  return false;
-}
-
 // A share's name may hold commas: in quotes it is taken whole.
 bool FillShare(const Value& value, QueryNode& node, QueryError& error) {
   node.part = Part::SHARE;

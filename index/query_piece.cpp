@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/query_piece.h"
 
-#include "index/query_slips.h"
+#include <algorithm>
+
+#include "index/text_characters.h"
 
 namespace fileindexd {
 
@@ -15,6 +17,37 @@ bool EndsWithFace(std::string_view word) {
 }
 
 }  // namespace
+
+// No byte within a character is well-formed alone, so that text can be looked through by bytes.
+size_t BlankAt(std::string_view text, size_t at) {
+  if (at >= text.size()) {
+    return 0;
+  }
+  const Character character = CharacterAt(text, at);
+  const bool is_one = character.size > 1 || static_cast<unsigned char>(text[at]) < 0x80;
+  return is_one && IsBlankCharacter(character.code) ? character.size : 0;
+}
+
+size_t SkipBlanksAt(std::string_view text, size_t at) {
+  while (const size_t size = BlankAt(text, at)) {
+    at += size;
+  }
+  return at;
+}
+
+size_t NextBlank(std::string_view text, size_t at) {
+  while (at < text.size() && BlankAt(text, at) == 0) {
+    ++at;
+  }
+  return at;
+}
+
+size_t LettersAtStart(std::string_view text) {
+  const auto* const end = std::find_if_not(text.begin(), text.end(), [](char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+  });
+  return static_cast<size_t>(end - text.begin());
+}
 
 bool PieceReader::Fail(const std::string& what, size_t where) {
   error = {what, where};
@@ -57,7 +90,11 @@ bool PieceReader::ReadBare(Value& value, bool in_list) {
     ++at;
   }
   value.text = text.substr(value.at, at - value.at);
-  return unopened + 1 != at || EndsWithFace(value.text) ||
+  // "report)*" is "report)", but "*)*" a name with a bracket in it.
+  std::string_view word = value.text;
+  word = word.starts_with('*') ? word : word.substr(0, word.find_last_not_of('*') + 1);
+  return unopened == std::string::npos || unopened + 1 != value.at + word.size() ||
+         EndsWithFace(word) ||
          Fail("this bracket closes nothing (a word that ends with one stands in quotes)", unopened);
 }
 

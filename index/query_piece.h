@@ -7,9 +7,28 @@
 #include <string_view>
 #include <vector>
 
-#include "index/query_parts.h"
+#include "index/query_error.h"
 
 namespace fileindexd {
+
+// The bytes of the blank at that byte, which parts words; 0: there is none, or the text ends.
+size_t BlankAt(std::string_view text, size_t at);
+// The first byte at or behind that one that is no blank, and the first that is one.
+size_t SkipBlanksAt(std::string_view text, size_t at);
+size_t NextBlank(std::string_view text, size_t at);
+
+// How many letters of ASCII, as names of fields are made of, `text` begins with.
+size_t LettersAtStart(std::string_view text);
+
+// What stands behind a field's colon, or alone.
+struct Value {
+  std::string text;  // without its quotes
+  size_t at = 0;     // byte of the question
+  bool is_quoted = false;
+  bool has_star = false;  // behind the quotes
+  // Of a list, what stands in quotes and what stands bare in between, commas in it as well.
+  std::vector<Value> listed;
+};
 
 class PieceReader {
  public:

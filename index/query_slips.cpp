@@ -4,22 +4,32 @@
 #include <algorithm>
 
 #include "index/letter_case.h"
+#include "index/query.h"
 #include "index/query_error.h"
 #include "index/query_fields.h"
 #include "index/query_names.h"
-#include "index/text_characters.h"
+#include "index/query_piece.h"
 
 namespace fileindexd {
 
 namespace {
 
-// What was compared with: a quoted text, or up to a blank or a bracket.
-std::string_view ValueAt(std::string_view text) {
+// What was compared with: a quoted text, or up to a blank or a bracket. Empty where that would not
+// do as a value either.
+std::string ValueAt(std::string_view text) {
   if (text.starts_with('"')) {
-    const size_t end = text.find('"', 1);
-    return text.substr(0, end == std::string_view::npos ? end : end + 1);
+    return std::string(text.substr(0, text.find('"', 1))) + '"';
   }
-  return text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
+  std::string_view value = text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
+  value = value.substr(0, value.find_last_not_of("<>=") + 1);  // "from <bob@home>"
+  const bool has_sign = value.find_first_of("-<>=:") == 0;
+  return HoldsWords(value) && !has_sign ? std::string(value) : "";
+}
+
+// ":)", ":-(". What ":(" begins may be what is meant for a field.
+bool IsFace(std::string_view text) {
+  return text.starts_with(":)") || text.starts_with(":-)") || text.starts_with(":-(") ||
+         (text.starts_with(":(") && (text.size() == 2 || BlankAt(text, 2) > 0));
 }
 
 // The sign between a field and its value that stands at that byte: a comparison, or a colon that a
@@ -30,9 +40,7 @@ size_t SignAt(std::string_view text, size_t at, bool is_apart) {
     return 2;
   }
   if (rest.starts_with(':')) {
-    const bool is_other =
-        rest.starts_with("::") || rest.starts_with(":)") || rest.starts_with(":-)");
-    return is_apart && !is_other ? 1 : 0;
+    return is_apart && !rest.starts_with("::") && !IsFace(rest) ? 1 : 0;
   }
   return std::min(rest.find_first_not_of("<>="), rest.size());
 }
@@ -63,7 +71,7 @@ std::string WhyColonIsMissing(std::string_view text) {
   }
   const size_t value_at = SkipBlanksAt(text, start + size);
   const std::string_view compared = text.substr(start, size);
-  const std::string_view value = ValueAt(text.substr(value_at));
+  const std::string value = ValueAt(text.substr(value_at));
   const std::string example =
       value.empty() ? "" : ", as in " + WrittenForm(*field, compared, value);
   const std::string name = Cited(text.substr(0, letters));
@@ -94,39 +102,6 @@ std::string WhyNoField(std::string_view text) {
          " (a word with a colon stands in quotes)";
 }
 
-}  // namespace
-
-// No byte within a character is well-formed alone, so that text can be looked through by bytes.
-size_t BlankAt(std::string_view text, size_t at) {
-  if (at >= text.size()) {
-    return 0;
-  }
-  const Character character = CharacterAt(text, at);
-  const bool is_one = character.size > 1 || static_cast<unsigned char>(text[at]) < 0x80;
-  return is_one && IsBlankCharacter(character.code) ? character.size : 0;
-}
-
-size_t SkipBlanksAt(std::string_view text, size_t at) {
-  while (const size_t size = BlankAt(text, at)) {
-    at += size;
-  }
-  return at;
-}
-
-size_t NextBlank(std::string_view text, size_t at) {
-  while (at < text.size() && BlankAt(text, at) == 0) {
-    ++at;
-  }
-  return at;
-}
-
-size_t LettersAtStart(std::string_view text) {
-  const auto* const end = std::find_if_not(text.begin(), text.end(), [](char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
-  });
-  return static_cast<size_t>(end - text.begin());
-}
-
 std::string WhyLeftOutTwice(std::string_view text) {
   const size_t first = text.find_first_not_of('-');
   if (!text.starts_with("--") || first == std::string_view::npos) {
@@ -137,9 +112,12 @@ std::string WhyLeftOutTwice(std::string_view text) {
   return is_followed ? "one '-' leaves out (a word that begins with two stands in quotes)" : "";
 }
 
-std::string WhyMeantForField(std::string_view text) {
+}  // namespace
+
+std::string WhyMeantOtherwise(std::string_view text) {
   std::string why = WhyColonIsMissing(text);
-  return why.empty() ? WhyNoField(text) : why;
+  why = why.empty() ? WhyNoField(text) : why;
+  return why.empty() ? WhyLeftOutTwice(text) : why;
 }
 
 // Between two others, "not" in front of one at least. What an option says was not written there.

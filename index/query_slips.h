@@ -6,18 +6,9 @@
 #include <string>
 #include <string_view>
 
-#include "index/query.h"
-
 namespace fileindexd {
 
-// The bytes of the blank at that byte, which parts words; 0: there is none, or the text ends.
-size_t BlankAt(std::string_view text, size_t at);
-// The first byte at or behind that one that is no blank, and the first that is one.
-size_t SkipBlanksAt(std::string_view text, size_t at);
-size_t NextBlank(std::string_view text, size_t at);
-
-// How many letters of ASCII, as names of fields are made of, `text` begins with.
-size_t LettersAtStart(std::string_view text);
+struct QueryNode;
 
 // Why the word that `text` begins with, which has no field in front, is refused; empty: it is not.
 //
@@ -26,10 +17,8 @@ size_t LettersAtStart(std::string_view text);
 // quote behind the colon of what is no field; and a name that is a slip of a field's (NearField).
 // Words of names and texts hold colons too: addresses ("http://x"), names in programs ("fs::path"),
 // and what is far from all fields or has nothing behind its colon.
-std::string WhyMeantForField(std::string_view text);
-
-// The same of "--draft", which would find what is to be left out. "--" alone is a sign.
-std::string WhyLeftOutTwice(std::string_view text);
+// So is "--draft", which would find what is to be left out; "--" alone is a sign.
+std::string WhyMeantOtherwise(std::string_view text);
 
 // Behind an answer without hits, what may have been meant for an operator: the first "or", "and" or
 // "not" in small letters that stands where one would. Empty: there is none.

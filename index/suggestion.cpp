@@ -7,6 +7,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/utf8.h"
 #include "index/contents_schema.h"
 #include "index/name_text.h"
 #include "index/text_tokenizer.h"

@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <set>
 
-#include "index/asked.h"
+#include "base/utf8.h"
 #include "index/edit_distance.h"
 #include "index/text_stems.h"
 #include "index/text_tokenizer.h"
@@ -39,14 +39,13 @@ std::string BehindAll(const std::string& beginning) {
 
 }  // namespace
 
-bool NearWords::Takes(int distance, bool is_shorter) const {
-  return words.size() < MOST || std::pair(distance, is_shorter) <=
-                                    std::pair(words.back().distance, words.back().is_shorter);
+bool NearWords::Takes(const Nearness& nearness) const {
+  return words.size() < MOST || nearness <= words.back().nearness;
 }
 
 // Several vocabularies may have one word.
-void NearWords::Add(int distance, bool is_shorter, int64_t frequency, std::string word) {
-  Word added = {distance, is_shorter, -frequency, std::move(word)};
+void NearWords::Add(const Nearness& nearness, int64_t documents, std::string word) {
+  Word added = {nearness, -documents, std::move(word)};
   const auto known = std::find_if(words.begin(), words.end(),
                                   [&added](const Word& other) { return other.text == added.text; });
   if (known != words.end()) {
@@ -74,12 +73,11 @@ int Vocabulary::Open(sqlite3* db, const char* database, const char* table,
                            database + ", " + table + ", '" + type + "')";
   // Temporary tables are changes too.
   (void)sqlite3_exec(db, "PRAGMA query_only = 0", nullptr, nullptr, nullptr);
-  int code = sqlite3_exec(db, make.c_str(), nullptr, nullptr, nullptr);
+  const int code = sqlite3_exec(db, make.c_str(), nullptr, nullptr, nullptr);
   (void)sqlite3_exec(db, "PRAGMA query_only = 1", nullptr, nullptr, nullptr);
   const std::string read = "SELECT term, doc, cnt" + std::string(column.empty() ? "" : ", col") +
                            " FROM temp." + name + " WHERE term >= ?1 AND term <= ?2";
-  code = code == SQLITE_OK ? terms.Prepare(db, read.c_str()) : code;
-  return code;
+  return code == SQLITE_OK ? terms.Prepare(db, read.c_str()) : code;
 }
 
 void Vocabulary::Look(const std::string& word, const std::string& language, NearWords& near_words) {
@@ -97,14 +95,14 @@ void Vocabulary::Look(const std::string& word, const std::string& language, Near
   });
   const FormsByStem forms = FormsOf(word, found, language);
   for (const auto& [nearness, term] : found) {
-    if (!near_words.Takes(nearness.first, nearness.second)) {
+    if (!near_words.Takes(nearness)) {
       break;
     }
     const auto of_term = forms.find(term.text);
     const bool is_word = of_term == forms.end() || of_term->second.times < term.times;
     const Term& written = is_word ? term : of_term->second.best;
     if (!written.text.empty()) {
-      near_words.Add(nearness.first, nearness.second, written.documents, written.text);
+      near_words.Add(nearness, written.documents, written.text);
     }
   }
 }

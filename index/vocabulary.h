@@ -16,6 +16,9 @@
 
 namespace fileindexd {
 
+// How many slips of the fingers lie between, and whether the word is shorter than the asked one.
+using Nearness = std::pair<int, bool>;
+
 // The words of vocabularies that are nearest to one, and rather not shorter than it, as stems are.
 // Of those as near the most frequent, and of these the first.
 class NearWords {
@@ -23,16 +26,16 @@ class NearWords {
   static constexpr size_t MOST = 4;
 
   // Whether a word as near as that may be among them.
-  bool Takes(int distance, bool is_shorter) const;
+  bool Takes(const Nearness& nearness) const;
 
-  void Add(int distance, bool is_shorter, int64_t frequency, std::string word);
+  // `documents`: that have it.
+  void Add(const Nearness& nearness, int64_t documents, std::string word);
 
   std::vector<std::string> Texts() const;  // the best first
 
  private:
   struct Word {
-    int distance = 0;
-    bool is_shorter = false;
+    Nearness nearness;
     int64_t rarity = 0;
     std::string text;
     auto operator<=>(const Word&) const = default;
@@ -58,7 +61,7 @@ class Vocabulary {
     int64_t times = 0;
   };
   struct Near {
-    std::pair<int, bool> nearness;
+    Nearness nearness;
     Term term;
   };
   // What stands under one stem: how often, and of what the slips leave half the most frequent.

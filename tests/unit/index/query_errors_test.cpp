@@ -29,9 +29,8 @@ TEST_F(QueryErrorsTest, AreLinesForPeople) {
        "a colon is missing behind 'size', as in size:>1M (a word with > stands in quotes) "
        "(character 1, at: size>1M)"},
       {"size > 1M",
-       "behind the field 'size' stands a colon and no blank, as in size:>1M (as a word it stands "
-       "in "
-       "quotes) (character 1, at: size > 1M)"},
+       "behind the field 'size' stands a colon and no blank, as in size:>1M "
+       "(as a word it stands in quotes) (character 1, at: size > 1M)"},
       {"size=",
        "a colon is missing behind 'size' (a word with = stands in quotes) (character 1, "
        "at: size=)"},

@@ -192,6 +192,7 @@ TEST_F(QueryRefusedTest, WhatIsNotSeenIsNothingToSearchFor) {
         {sign, "?0"},
         {sign + "*", "?0"},
         {"\"" + sign + "\"", "?1"},
+        {"\"*" + sign + "\"", "?1"},
         {"report " + sign, "?7"},
         {"report -" + sign, "?8"},
         {"kind:document -(a OR " + sign + ")", "?21"},
