@@ -2,6 +2,8 @@
 #include "index/snippet.h"
 
 #include <algorithm>
+#include <cstddef>
+#include <deque>
 #include <map>
 #include <optional>
 #include <set>
@@ -19,7 +21,7 @@ namespace {
 constexpr size_t WIDTH = 160;          // bytes
 constexpr size_t BEFORE = 40;          // of them before the first word
 constexpr size_t MOST_TEXT = 1 << 18;  // looked at
-constexpr size_t MOST_PLACES = 256;    // of a word
+constexpr size_t MOST_PLACES = 256;    // of a word, or of a row of them
 
 struct Wanted {
   std::string token;
@@ -34,9 +36,6 @@ struct Place {
   size_t start;
   size_t end;
   size_t number;
-  size_t first;
-  size_t last;
-  size_t at;  // how many words stand before it
 };
 
 std::vector<Wanted> TokensOf(const std::vector<const QueryNode*>& words, TextCutter& cutter) {
@@ -108,73 +107,116 @@ class Completeness {
   size_t end = NOWHERE;
 };
 
-// Whether all tokens of its word stand in a row there.
-bool IsWhole(const std::vector<Place>& places, size_t i) {
-  const Place& place = places[i];
-  const size_t before = place.number - place.first;
-  if (before > i || i - before + (place.last - place.first) >= places.size()) {
-    return false;
+// Finds what is looked for in a text that is read word by word. Of a word with several tokens those
+// count that stand in a row; where none do, each one.
+class PlaceFinder {
+ public:
+  explicit PlaceFinder(const std::vector<Wanted>& wanted) : tokens(wanted), shown(wanted) {
+    for (const Wanted& token : tokens) {
+      if (rows.empty() || rows.back().first != token.first) {
+        rows.push_back({token.first, token.last, {}, {}, 0});
+        longest = std::max(longest, token.last - token.first + 1);
+      }
+    }
   }
-  const Place* row = &places[i - before];
-  for (size_t k = 0; k <= place.last - place.first; ++k) {
-    if (row[k].number != place.first + k || row[k].at != row->at + k) {
+
+  // False: what stands there or behind is not shown.
+  bool Add(std::string_view token, size_t start, size_t end) {
+    if (shown.IsBehind(start)) {
       return false;
     }
+    if (recent.empty() || start != recent.back().start) {  // several may stand in one place
+      EndWord();
+      recent.push_back({start, end, 0});
+      if (recent.size() > longest) {
+        recent.pop_front();
+      }
+    }
+    for (const Wanted& wanted : tokens) {
+      if (wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token) {
+        recent.back().end = met.empty() ? end : recent.back().end;
+        met.insert(wanted.number);
+      }
+    }
+    return true;
   }
-  return true;
-}
 
-// Of a word with several tokens those count that stand in a row; where none do, each one.
-std::vector<Place> WithoutParts(const std::vector<Place>& places) {
-  std::vector<bool> is_whole;
-  std::set<size_t> whole;  // by the first number
-  for (size_t i = 0; i < places.size(); ++i) {
-    is_whole.push_back(IsWhole(places, i));
-    if (is_whole[i] && places[i].first < places[i].last) {
-      whole.insert(places[i].first);
+  // All, in order.
+  std::vector<Place> Places() {
+    EndWord();
+    for (const Row& row : rows) {
+      for (const Place& part : row.count == 0 ? row.parts : std::vector<Place>()) {
+        places.try_emplace(part.start, part);
+      }
+    }
+    std::vector<Place> all;
+    for (const auto& [start, place] : places) {
+      all.push_back(place);
+    }
+    return all;
+  }
+
+ private:
+  // The tokens of one word.
+  struct Row {
+    size_t first;
+    size_t last;
+    std::set<size_t> begun;    // numbers up to which it stands in front of the next word
+    std::vector<Place> parts;  // as long as it stands nowhere whole
+    size_t count;              // how often it does
+  };
+
+  // All is known of the last word.
+  void EndWord() {
+    for (Row& row : rows) {
+      std::set<size_t> begun;
+      for (auto number = met.lower_bound(row.first); number != met.upper_bound(row.last);
+           ++number) {
+        if (*number == row.first || row.begun.contains(*number - 1)) {
+          begun.insert(*number);
+        }
+        if (row.count == 0 && ++part_counts[*number] <= MOST_PLACES) {
+          row.parts.push_back({recent.back().start, recent.back().end, *number});
+        }
+      }
+      row.begun = std::move(begun);
+      if (row.begun.contains(row.last) && ++row.count <= MOST_PLACES) {
+        TakeLast(row);
+      }
+    }
+    met.clear();
+  }
+
+  void TakeLast(const Row& row) {
+    auto place = recent.end() - static_cast<std::ptrdiff_t>(row.last - row.first + 1);
+    for (size_t number = row.first; number <= row.last; ++number, ++place) {
+      const Place taken = {place->start, place->end, number};
+      places.try_emplace(taken.start, taken);
+      shown.Add(taken);
     }
   }
-  std::vector<Place> left;
-  for (size_t i = 0; i < places.size(); ++i) {
-    if (is_whole[i] || !whole.contains(places[i].first)) {
-      left.push_back(places[i]);
-    }
-  }
-  return left;
-}
+
+  const std::vector<Wanted>& tokens;
+  Completeness shown;
+  std::vector<Row> rows;
+  size_t longest = 0;
+  std::deque<Place> recent;  // the last words, as many as the longest row has
+  std::set<size_t> met;      // numbers, at the last of them
+  std::map<size_t, size_t> part_counts;
+  std::map<size_t, Place> places;  // by start
+};
 
 // All, or as far as those behind do not count.
 std::vector<Place> PlacesIn(std::string_view text, const std::vector<Wanted>& tokens,
                             TextCutter& cutter) {
-  std::vector<Place> places;
   if (tokens.empty()) {
-    return places;
+    return {};
   }
-  Completeness shown(tokens);
-  std::map<size_t, size_t> counts;  // a common word does not hide a rare one
-  size_t at = 0;
-  size_t last_start = 0;
-  cutter.Cut(text, false, [&](std::string_view token, size_t start, size_t end) {
-    if (shown.IsBehind(start)) {
-      return false;
-    }
-    at += start == last_start ? 0 : 1;  // several may stand in one place
-    last_start = start;
-    for (const Wanted& wanted : tokens) {
-      const bool same =
-          wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token;
-      const bool known = !places.empty() && places.back().start == start;
-      if (same && known && places.back().first != wanted.first) {
-        places.back().first = places.back().last = places.back().number;  // it counts alone, too
-      }
-      if (same && !known && ++counts[wanted.number] <= MOST_PLACES) {
-        places.push_back({start, end, wanted.number, wanted.first, wanted.last, at});
-        shown.Add(places.back());
-      }
-    }
-    return true;
+  PlaceFinder finder(tokens);
+  cutter.Cut(text, false, [&finder](std::string_view token, size_t start, size_t end) {
+    return finder.Add(token, start, end);
   });
-  return WithoutParts(places);
+  return finder.Places();
 }
 
 // The place from which on most different words are shown.

@@ -146,6 +146,26 @@ TEST_F(SnippetMarksTest, OfAPhraseOnlyWholeOnesAreMarked) {
       << "what is asked for alone is marked there, too";
   EXPECT_EQ(Marked({"white whale"}, "a white coat, a whale"), Texts({"white", "whale"}))
       << "it stands further down";
+  EXPECT_EQ(Marked({"new york new york"}, "new new york new york, york"),
+            Texts({"new", "york", "new", "york"}));
+  EXPECT_EQ(Marked({"very very"}, "a very very very old, very old"),
+            Texts({"very", "very", "very"}));
+  EXPECT_EQ(Marked({"white whale", "whale"}, "white"), Texts({"white"}));
+}
+
+TEST_F(SnippetMarksTest, APhraseIsShownThatStandsFarBehindItsWords) {
+  std::string text = "Whale hunters wore white clothes, ";
+  for (int word = 0; word < 1000; ++word) {
+    text += "white " + std::to_string(word) + " ";
+  }
+  EXPECT_EQ(Marked({"white whale"}, text + "and then the white whale came."),
+            Texts({"white", "whale"}));
+}
+
+TEST_F(SnippetMarksTest, APhraseOfWhichNoWholeOneIsReadIsShownByItsWords) {
+  std::string text = "Whale hunters wore white clothes, ";
+  text.append(1 << 18, '.');
+  EXPECT_EQ(Marked({"white whale"}, text + "white whale"), Texts({"Whale", "white"}));
 }
 
 INSTANTIATE_TEST_SUITE_P(Lengths, SnippetTest, testing::Values(5, 50, 200));
