@@ -123,7 +123,7 @@ struct Asker::Impl {
   CutterPool cutters;
   SideBySide side_by_side;
   bool AskAll(const Question& question, Answer& answer, std::string& error);
-  bool HasHits(Question question, const std::string& text);
+  std::string FirstWithHits(Question question, const std::vector<std::string>& texts);
   void Choose(const std::vector<std::string>& wanted);
   Answer Gather(const HitOrder& order, uint64_t offset, uint64_t wanted);
   void Complete(std::vector<Hit>& hits);
@@ -153,17 +153,26 @@ void Asker::Impl::Complete(std::vector<Hit>& hits) {
   side_by_side.Run(shown.size(), [&](size_t i) { shown[i]->Complete(hits, cutters); });
 }
 
-// A suggestion that has no hit either is none.
-bool Asker::Impl::HasHits(Question question, const std::string& text) {
-  question.text = text;
+// A suggestion that has no hit either is none. Empty: all are, or a share does not answer: nobody
+// waits for it once for each suggestion.
+std::string Asker::Impl::FirstWithHits(Question question, const std::vector<std::string>& texts) {
   question.offset = 0;
   question.limit = 1;
   question.count_all = false;
   question.suggests = false;
   question.shows = false;
-  Answer answer;
-  std::string error;
-  return AskAll(question, answer, error) && !answer.hits.empty();
+  for (const std::string& text : texts) {
+    question.text = text;
+    Answer answer;
+    std::string error;
+    if (AskAll(question, answer, error) && !answer.hits.empty()) {
+      return text;
+    }
+    if (!answer.failures.empty()) {
+      break;
+    }
+  }
+  return "";
 }
 
 // What all shares have found, but for the first `offset` hits.
@@ -218,7 +227,7 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
         QueryError{"the shares that are asked know no such folder", folder->start}.Line(asked.text);
     return false;
   }
-  const bool suggests = made.knows_under && made.total == 0 && question.suggests &&
+  const bool suggests = made.knows_under && is_empty && question.suggests &&
                         (question.limit > 0 || question.count_all);
   std::vector<std::string> suggestions;
   if (suggests) {
@@ -228,12 +237,8 @@ bool Asker::Impl::AskAll(const Question& question, Answer& answer, std::string& 
     share.Release();
   }
   made.small_operator = suggests ? SmallOperator(asked.tree) : "";
-  const auto suggestion =
-      std::find_if(suggestions.begin(), suggestions.end(),
-                   [&](const std::string& text) { return HasHits(question, text); });
-  if (suggestion != suggestions.end()) {
-    made.suggestion = *suggestion;
-  } else if (suggests) {
+  made.suggestion = FirstWithHits(question, suggestions);
+  if (suggests && made.suggestion.empty()) {
     made.word_like_field = WordLikeField(asked.tree);
   }
   answer = std::move(made);

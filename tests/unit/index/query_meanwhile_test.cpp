@@ -100,7 +100,7 @@ TEST_F(QueryMeanwhileTest, ShareThatTakesTooLongIsNamedBesideOneThatAnswers) {
 
 TEST_F(QueryMeanwhileTest, ShareWhoseDatabaseIsHeldIsNamedBesideOneThatAnswers) {
   Fill("a", {"x"});
-  Fill("b", {"x"});
+  Fill("b", {"x", "whale"});
   sqlite3* holder = nullptr;
   ASSERT_EQ(sqlite3_open((IndexPath("a") + "/entries.db").c_str(), &holder), SQLITE_OK);
   ASSERT_EQ(sqlite3_exec(holder, "PRAGMA locking_mode = EXCLUSIVE; BEGIN EXCLUSIVE", nullptr,
@@ -111,7 +111,12 @@ TEST_F(QueryMeanwhileTest, ShareWhoseDatabaseIsHeldIsNamedBesideOneThatAnswers) 
 
   EXPECT_EQ(Paths("x"), Names({"/b/x"}));
   EXPECT_EQ(answer.failures, Names({"share a: no answer within 0 seconds"}));
+  question.suggests = true;
+  EXPECT_EQ(Paths("whaxe"), Names());
+  EXPECT_EQ(answer.suggestion, "") << "nobody waits once more for what may be in that share";
   sqlite3_close(holder);
+  EXPECT_EQ(Paths("whaxe"), Names());
+  EXPECT_EQ(answer.suggestion, "whale");
   EXPECT_EQ(Paths("x"), Names({"/a/x", "/b/x"}));
   EXPECT_EQ(answer.failures, Names());
 }
