@@ -43,8 +43,13 @@ std::string SplitLast(std::string& path) {
   return name;
 }
 
-// Whether it is the user who is kept out of the state, or from making it.
-bool IsForOthers(const std::string& root) {
+bool IsAbsent(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) != 0 && errno == ENOENT;
+}
+
+// Whether rights alone keep the user out of the state, or from making it.
+bool IsKeptOut(const std::string& root) {
   struct stat status = {};
   std::string existing = root;
   while (stat(existing.c_str(), &status) != 0) {
@@ -103,7 +108,7 @@ bool MakeAbsolute(const std::string& given, std::string& path) {
 bool Session::Open() {
   std::string error;
   store = StateStore::Open(error);
-  if (!store && IsForOthers(StateRoot())) {
+  if (!store && IsKeptOut(StateRoot())) {
     (void)Fail(EXIT_FAILED, "cannot read the state folder %s: root is needed", StateRoot().c_str());
     return false;
   }
@@ -121,9 +126,8 @@ bool Session::Open() {
 }
 
 bool Session::OpenToAsk() {
-  struct stat status = {};
-  const std::string root = StateRoot();
-  if (lstat(root.c_str(), &status) != 0 && errno == ENOENT && !IsForOthers(root)) {
+  const std::string database = StateDatabasePath();
+  if (IsAbsent(database) && IsAbsent(database + ".copy") && !IsKeptOut(StateRoot())) {
     settings = std::make_shared<const Settings>();
     return true;
   }

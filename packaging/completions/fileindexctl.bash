@@ -60,7 +60,7 @@ _fileindexctl_value() {
   esac
 }
 
-# Lines of `$1 share list`. Asked where there is no state, it would make one.
+# Lines of `$1 share list`, which has none where there is no state.
 _fileindexctl_shares() {
   [[ -e ${FILEINDEXD_STATE_DIR:-/var/lib/fileindexd}/state.db ]] && "$1" share list 2>/dev/null
 }

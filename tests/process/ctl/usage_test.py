@@ -99,6 +99,8 @@ class UsageTest(IndexTest):
 
     def test_a_question_makes_no_state_and_answers_as_without_shares(self):
         nowhere = f"{namespace.RUN}/no/state"
+        empty = f"{namespace.RUN}/empty"
+        os.mkdir(empty)
         self.ctl("share", "remove", "alpha", code=1)  # makes one
         for arguments in (("search", "x"), ("search", "--count", "x"), ("search", "x", "share:a"),
                           ("search", "--json", "x"), ("search", "--share", "a", "x"),
@@ -112,6 +114,9 @@ class UsageTest(IndexTest):
                 self.assertEqual(self.try_ctl(*arguments, FILEINDEXD_STATE_DIR=nowhere),
                                  self.try_ctl(*arguments))
                 self.assertFalse(os.path.lexists(f"{namespace.RUN}/no"))
+                self.assertEqual(self.try_ctl(*arguments, FILEINDEXD_STATE_DIR=empty),
+                                 self.try_ctl(*arguments))
+                self.assertEqual(os.listdir(empty), [])
 
         self.ctl("resume", FILEINDEXD_STATE_DIR=nowhere)
         self.assertTrue(os.path.exists(f"{nowhere}/state.db"))
