@@ -83,6 +83,6 @@ class ExtractPool {
 };
 
 // Of the readers as a whole: a higher one reads anew what failed, and later, what was read.
-constexpr int64_t EXTRACTOR_VERSION = 5;
+constexpr int64_t EXTRACTOR_VERSION = 6;
 
 }  // namespace fileindexd
