@@ -201,7 +201,7 @@ int Search(const Arguments& arguments) {
   if (has_more) {
     TellOfMore(USUAL_HITS, screen);
   } else if (is_behind_all && answer.failures.empty()) {
-    TellOfFewer(question, answer, screen);
+    TellNothingBehind(question, answer, screen);
   } else if (answer.total == 0 && answer.failures.empty() &&
              (question.limit > 0 || question.count_all)) {
     TellNothingFound(question, answer, screen);

@@ -72,8 +72,8 @@ void TellOfWords(const Settings& settings, const Answer& answer,
   }
 }
 
-void TellOfFewer(const Question& question, const Answer& answer,
-                 const std::optional<Screen>& screen) {
+void TellNothingBehind(const Question& question, const Answer& answer,
+                       const std::optional<Screen>& screen) {
   if (screen.has_value()) {
     PutNote("Nothing behind the first " + std::to_string(question.offset) + ": there " +
                 (answer.total == 1 ? "is " : "are ") + std::to_string(answer.total) + " in all.",

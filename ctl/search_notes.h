@@ -21,8 +21,8 @@ void TellOfWords(const Settings& settings, const Answer& answer,
                  const std::optional<Screen>& screen);
 
 // There are hits, and the question leaves them all out. On a screen alone.
-void TellOfFewer(const Question& question, const Answer& answer,
-                 const std::optional<Screen>& screen);
+void TellNothingBehind(const Question& question, const Answer& answer,
+                       const std::optional<Screen>& screen);
 
 // Nobody has said how many were wanted.
 void TellOfMore(uint64_t shown, const std::optional<Screen>& screen);

@@ -28,7 +28,8 @@ struct ContentWords {
 };
 ContentWords WordsOf(const Content& content);
 
-// A bit for each text field that is there, 1 << number, and NO_TEXT where the text is empty.
+// A bit for each text field that is there, 1 << number, and NO_TEXT where the text is empty: no
+// field has the number 0.
 constexpr int64_t NO_TEXT = 1;
 int64_t FieldBits(const Content& content);
 

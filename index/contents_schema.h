@@ -25,7 +25,7 @@
 //                       or waits
 //     text              rowid in `texts` and `words`; 0: there is none
 //     length            bytes of its words
-//     fields            a bit for each text field that it has, 1 << number; 1: it has no text
+//     fields            FieldBits of content_text.h
 //     pages … rating    the number fields; NULL: not known
 //   texts     the text fields and the text, packed (see content_text.h). Rowids ascend in the order
 //             of reading: the full-text table collects changes in memory only while they do

@@ -93,8 +93,8 @@ class ContentsWriter {
   // Where much is new, one step of some hundredths of a second towards smaller words: for when
   // there is nothing else to do. `more`: call again, after a commit.
   bool Merge(bool& more);
-  // Makes the log on disk, which may hold 12 MiB, small again. Whoever opens the database when
-  // nobody has it open reads all of that first.
+  // Empties the log on disk. Whoever opens the database when nobody has it open reads all of it
+  // first.
   void CutLog();
 
   bool HasChanges() const;

@@ -33,8 +33,9 @@ bool EndsInOnePaired(std::string_view word) {
       }
       last = joined == 0 ? plain : joined;
     } else {
-      const bool counts = type != CharacterClass::SEPARATOR && type != CharacterClass::MARK;
-      count = counts ? 0 : count;
+      if (type != CharacterClass::SEPARATOR && type != CharacterClass::MARK) {
+        count = 0;
+      }
       last = 0;
     }
     at += character.size;

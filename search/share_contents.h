@@ -72,8 +72,8 @@ class ShareContents {
   bool TakesRoom(Time now) const;
   // What came of a file that was given out under that id; of one that was taken back: nothing.
   void End(ExtractOutcome&& outcome, Time now);
-  // Takes back what was given out, and closes. For pauses: it goes on as it was. With `cuts_log`
-  // the database is left as questions like to find it.
+  // Takes back what was given out, and closes. For pauses: it goes on as it was. `cuts_log`: the
+  // log is emptied too, as nobody may have the database open for long.
   void Halt(bool cuts_log = false);
 
   // What tells that an answer of the file system is there: Work wants to be called.
@@ -172,7 +172,6 @@ class ShareContents {
   void Forget();
 
   ContentsWriter writer;  // the other thread's while it is committing, as is `committed`
-  SideWork committing;    // goes before the writer
   std::shared_ptr<const Settings> in_force;   // null: the writer has them
   std::shared_ptr<ContentPreparer> preparer;  // null until it is needed
   Opener opener;
@@ -219,6 +218,7 @@ class ShareContents {
   std::map<uint64_t, Running> running;   // by the id of the job
   std::map<int64_t, Patience> patience;  // by file
   std::multimap<Time, int64_t> patient;  // files that the writer has given out and that wait here
+  SideWork committing;                   // last: it goes before all that its thread works on
 };
 
 }  // namespace fileindexd

@@ -265,10 +265,11 @@ class RepairTest(IndexTest):
     def test_an_update_that_waits_does_the_work_of_what_it_swallows(self):
         for name, replace in (("a.txt", None), ("d", None), ("x", os.mkfifo)):
             with self.subTest(name=name):
-                self.ctl("event", "alpha", "CUSTOM_EVENT_UPDATE", self.path(name),
-                         "--data", '{"audio":true}')
                 path = self.path(name)
-                shutil.rmtree(path) if os.path.isdir(path) else os.unlink(path)
+                self.ctl("event", "alpha", "CUSTOM_EVENT_UPDATE", path,
+                         "--data", '{"audio":true}')
+                remove = shutil.rmtree if os.path.isdir(path) else os.unlink
+                remove(path)
                 if replace:
                     replace(path)
 

@@ -44,16 +44,14 @@ class SearchTest(IndexTest):
         )
 
     def test_a_share_that_holds_nothing_yet_may_be_named(self):
-        os.mkdir(f"{namespace.DATA}/gamma")
-        self.ctl("share", "add", "gamma", f"{namespace.DATA}/gamma")
+        self.make_share("gamma", folders=())
 
         self.assertEqual(self.hits("share:gamma", "beach"), [])
         self.assertEqual(self.hits("share:gamma,beta", "beach"), ["beta/beach.txt"])
         self.ctl("search", "share:delta", "beach", code=2)
 
     def test_a_share_with_a_comma_in_its_name_is_named_in_quotes(self):
-        os.mkdir(f"{namespace.DATA}/gamma")
-        self.ctl("share", "add", "alpha,old", f"{namespace.DATA}/gamma")
+        self.make_share("alpha,old", folders=())
 
         self.assertEqual(self.hits('share:"alpha,old"', "beach"), [])
         self.assertEqual(self.hits('share:"alpha,old",beta', "beach"), ["beta/beach.txt"])

@@ -191,6 +191,8 @@ TEST_F(TokenizerTest, QuestionsFindWords) {
       {"\u304b\u304f", "\u304b\u304f\u3082", true},
       {"\u6587 \u5b57", "\u6587 \u5b57\u5178", true},
       {"\u6587abc", "\u6587abcd", false},
+      {"\u6587\u3002", "\u6587\u5b57", true},
+      {"\u6587\u20dd", "\u6587\u5b57", true},
       {"AND", "and", true},
       {"\"", "quote", false},
       {"a\"b", "a b", true},

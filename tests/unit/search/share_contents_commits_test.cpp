@@ -15,11 +15,14 @@ using testing::SizeIs;
 class CommitBesideTest : public ShareContentsTest {
  protected:
   // Some are given out, the first one is read, and its result is being committed.
-  void BeginCommit() {
+  void AddFiles() {
     for (int64_t row = 1; row <= 8; ++row) {
       AddFile(row);
     }
     Settle();
+  }
+  void BeginCommit() {
+    AddFiles();
     ids = GiveOut(3);
     ASSERT_THAT(ids, SizeIs(3));
     SideWorkTakesTime() = true;
@@ -30,6 +33,15 @@ class CommitBesideTest : public ShareContentsTest {
     Pass(milliseconds(500));
     ASSERT_EQ(Count("Finish"), 1U);
     calls = Scripted().calls.size();
+  }
+  // Of the first four one is given out and then the others; the tries of the next ones are being
+  // put on record meanwhile.
+  void BeginTries() {
+    AddFiles();
+    ids = GiveOut(1);
+    ASSERT_THAT(ids, SizeIs(1));
+    SideWorkTakesTime() = true;
+    ASSERT_THAT(GiveOut(), SizeIs(3));
   }
   void EndCommit() {
     SideWorkTakesTime() = false;
@@ -92,14 +104,7 @@ TEST_F(CommitBesideTest, WhatNeedsTheWriterWaitsForIt) {
 }
 
 TEST_F(CommitBesideTest, TriesAreOnRecordBeforeTheirFilesAreGivenOut) {
-  for (int64_t row = 1; row <= 8; ++row) {
-    AddFile(row);
-  }
-  Settle();
-  ids = GiveOut(1);  // of four; the next ones are opened behind it
-  ASSERT_THAT(ids, SizeIs(1));
-  SideWorkTakesTime() = true;
-  EXPECT_THAT(GiveOut(), SizeIs(3));
+  BeginTries();
   EXPECT_EQ(Count("NextJobs 8"), 1U);
   contents.Work(now, Wall());
   EXPECT_FALSE(contents.MayHaveJobs(Turn::NEW, now));
@@ -111,13 +116,7 @@ TEST_F(CommitBesideTest, TriesAreOnRecordBeforeTheirFilesAreGivenOut) {
 }
 
 TEST_F(CommitBesideTest, TriesThatAreBeingRecordedAreTakenBackByAPause) {
-  for (int64_t row = 1; row <= 8; ++row) {
-    AddFile(row);
-  }
-  Settle();
-  ids = GiveOut(1);
-  SideWorkTakesTime() = true;
-  EXPECT_THAT(GiveOut(), SizeIs(3));
+  BeginTries();
   EXPECT_EQ(Kept(8).tries, 1);
   contents.Halt();
 
@@ -200,13 +199,7 @@ TEST_F(CommitBesideTest, OneThatFailsBesideAPauseLosesNothing) {
 }
 
 TEST_F(CommitBesideTest, SettingsWaitForItsEndAndTakeNothingOfIt) {
-  for (int64_t row = 1; row <= 8; ++row) {
-    AddFile(row);
-  }
-  Settle();
-  ids = GiveOut(1);
-  SideWorkTakesTime() = true;
-  EXPECT_THAT(GiveOut(), SizeIs(3));
+  BeginTries();
   const size_t begun = Count("BeginTries");
   contents.Use(std::make_shared<Settings>());
   EXPECT_EQ(contents.Due(), Time::max());

@@ -148,7 +148,6 @@ TEST_F(StoreDamageTest, AChangeToAnOpenDatabaseThatIsDamagedIsMadeAgainInTheCopy
   const auto store = OpenStore();
   ASSERT_TRUE(store->SetMarker("m"));
   Sql(database, "PRAGMA wal_checkpoint(TRUNCATE)");
-  std::string bytes = ReadFile(database);
   int64_t page = 0;
   sqlite3* db = nullptr;
   ASSERT_EQ(sqlite3_open(database.c_str(), &db), SQLITE_OK);
