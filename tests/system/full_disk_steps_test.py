@@ -81,16 +81,6 @@ class FullDiskSteps:
         events.append({"event": RENAME, "path": f"{new}/moved", "path_old": f"{old}/d5"})
         return events
 
-    def settle(self, after):
-        """Until nothing is queued and no reindex is asked for."""
-        while True:
-            self.await_drained("alpha")
-            (share,) = self.ctl("status", "--json").json()["shares"]
-            if not share["needs_reindex"]:
-                self.assertIs(share["no_space"], False)
-                return
-            after = self.await_line(ENDED, after)
-
     def fill_and_free(self, number, free):
         """One batch with `free` bytes of space, made good afterwards. What its pass said."""
         self.hold_in_pause("alpha", *self.make_batch(number))

@@ -2,16 +2,13 @@
 """Full disks: nothing is lost for good, and the index is whole once there is space again."""
 
 import os
-import re
 
 from harness import main, namespace
 from harness.awaiting import await_in_folder
+from harness.batch_load import ENDED
 from harness.filesystems import CREATE, REINDEX, FilesystemTest
 
 FILES = 3000
-ENDED = re.compile(
-    r"Worker\[alpha\] (finished all task, stopping|stopped while processing command queue)"
-)
 
 
 class FullStateDiskTest(FilesystemTest):
@@ -50,15 +47,17 @@ class FullStateDiskTest(FilesystemTest):
         self.start()
         self.await_drained("alpha")
         self.make_files(self.root, *(f"d{n % 40}/name of file {n}.txt" for n in range(FILES)))
+        after = self.log.mark()
         self.append("alpha", {"event": REINDEX, "path": self.root})
         self.fill(namespace.DISK)
-        self.await_line(f"IndexDirAdd: {self.root}")
+        self.await_line(ENDED, after)
         os.unlink(f"{namespace.DISK}/filler")
 
         self.make_files(self.root, "late.txt")
+        after = self.log.mark()
         self.event(CREATE, "late.txt")
 
-        self.await_drained("alpha")
+        self.settle(after)
         self.check()
 
     def test_tools_say_so(self):

@@ -10,6 +10,7 @@ import time
 
 from harness import namespace
 from harness.awaiting import IN_CLOSE, LIMIT, FolderWatch
+from harness.batch_load import ENDED
 from harness.checks import IndexTest
 from harness.scale import IS_LONG
 
@@ -38,13 +39,17 @@ def run(*command):
     assert done.returncode == 0, f"{command}: {done.stderr + done.stdout!r}"
 
 
-def _is_mounted_somewhere(folder):
-    mounted = f" {folder} ".encode()
-    for process in filter(str.isdigit, os.listdir("/proc")):
-        with contextlib.suppress(OSError), open(f"/proc/{process}/mountinfo", "rb") as mounts:
-            if mounted in mounts.read():
-                return True
-    return False
+def _mounts(process):
+    """(device, mount point) of each."""
+    with contextlib.suppress(OSError), open(f"/proc/{process}/mountinfo", "rb") as mounts:
+        return [(fields[2], fields[4]) for fields in map(bytes.split, mounts)]
+    return []
+
+
+def _is_mounted_somewhere(device):
+    """Other tests may have other disks at the same place, each in its own namespace."""
+    processes = filter(str.isdigit, os.listdir("/proc"))
+    return any(device == mounted for process in processes for mounted, _ in _mounts(process))
 
 
 def unmount(folder):
@@ -54,15 +59,20 @@ def unmount(folder):
     own; nothing tells of the end of that.
     """
     deadline = time.monotonic() + LIMIT
+    device = dict(map(reversed, _mounts("self")))[os.fsencode(folder)]  # the last one at this place
     with FolderWatch(*(path for path, _, _ in os.walk(folder)), mask=IN_CLOSE) as watch:
         while True:
             try:
                 namespace.unmount(folder)
                 break
             except OSError as error:
-                if error.errno != errno.EBUSY or not watch.wait(deadline - time.monotonic()):
+                left = deadline - time.monotonic()
+                if error.errno != errno.EBUSY or left <= 0:
                     raise
-    while _is_mounted_somewhere(folder) and time.monotonic() < deadline:
+                # A close is told before the mount is let go, a look at a path not at all.
+                watch.wait(min(left, 0.1))
+    while _is_mounted_somewhere(device):
+        assert time.monotonic() < deadline, f"still mounted somewhere: {folder}"
         time.sleep(0.01)
 
 
@@ -116,6 +126,16 @@ class FilesystemTest(IndexTest):
         path = os.fsencode(self.root) + (b"/" + os.fsencode(name) if name else b"")
         self.ctl("event", "alpha", str(code), path, *more)
         self.await_drained("alpha")
+
+    def settle(self, after):
+        """Until nothing is queued and no reindex is asked for."""
+        while True:
+            self.await_drained("alpha")
+            (share,) = self.ctl("status", "--json").json()["shares"]
+            if not share["needs_reindex"]:
+                self.assertIs(share["no_space"], False)
+                return
+            after = self.await_line(ENDED, after)
 
     def check(self, **more):
         self.assert_index(self.root, **more)
