@@ -33,8 +33,8 @@ namespace {
 
 constexpr const char* LOG_SOCKET = "/dev/log";
 constexpr const char* PID_FILE = "/run/fileindexd.pid";
-constexpr size_t LOG_LINES = 40;       // the last ones are kept
-constexpr int LIMIT_MS = 1800 * 1000;  // for anything that is waited for
+constexpr size_t LOG_LINES = 40;      // the last ones are kept
+constexpr int LIMIT_MS = 900 * 1000;  // for anything that is waited for
 constexpr double LIMIT = LIMIT_MS / 1000.0;
 
 bool Exists(const std::string& path) {

@@ -27,7 +27,7 @@ namespace {
 constexpr uint64_t SMALL_INDEX = 10000;
 constexpr uint64_t LARGE_INDEX = 1000000;
 constexpr uint64_t CHANGES = 40;  // for each round
-constexpr double LIMIT = 30;      // seconds for one change
+constexpr double LIMIT = 600;     // seconds for one change
 
 // A share whose index holds so many entries.
 class FilledShare {

@@ -172,13 +172,16 @@ int pthread_create(pthread_t* thread, const pthread_attr_t* kind, void* (*entry)
   return error ? *error : Library("pthread_create", pthread_create)(thread, kind, entry, argument);
 }
 
-// Any answer: the wait for a thread ends at once when the thread has not ended.
+// Any answer: the wait for a thread ends at once when the thread has not ended. Without one it is
+// longer than what was asked for: on a busy machine a thread may take as long.
 int pthread_timedjoin_np(pthread_t thread, void** result, const timespec* until) {
   TheScript().RecordWait("pthread_timedjoin_np", until->tv_sec);
   const auto at_once = TheScript().EnterUnrecorded("pthread_timedjoin_np", "");
   timespec limit = *until;
   if (at_once) {
     clock_gettime(CLOCK_REALTIME, &limit);
+  } else {
+    limit.tv_sec += fileindexd::scripted::AWAIT_LIMIT_S;
   }
   return Library("pthread_timedjoin_np", pthread_timedjoin_np)(thread, result, &limit);
 }

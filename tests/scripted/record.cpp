@@ -18,12 +18,12 @@ bool Holds(const std::string& text, const std::string& part) {
 
 bool Script::Await(const std::function<bool()>& reached) {
   timespec limit{};
-  clock_gettime(CLOCK_REALTIME, &limit);
+  clock_gettime(CLOCK_MONOTONIC, &limit);
   limit.tv_sec += AWAIT_LIMIT_S;
 
   const MutexGuard lock(&mutex);
   while (!reached()) {
-    if (pthread_cond_timedwait(&changed, &mutex, &limit) == ETIMEDOUT) {
+    if (pthread_cond_clockwait(&changed, &mutex, CLOCK_MONOTONIC, &limit) == ETIMEDOUT) {
       return reached();
     }
   }

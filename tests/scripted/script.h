@@ -33,7 +33,7 @@ namespace fileindexd::scripted {
 
 constexpr int EVERY_CALL = 0;
 // How long anything is awaited before a test gives it up.
-constexpr int AWAIT_LIMIT_S = 60;
+constexpr int AWAIT_LIMIT_S = 600;
 
 struct Share {
   std::string name;

@@ -4,7 +4,7 @@
 import os
 
 from harness import main, namespace
-from harness.filesystems import CREATE, DELETE, REINDEX, FilesystemTest, on_each
+from harness.filesystems import CREATE, DELETE, REINDEX, FilesystemTest, on_each, unmount
 
 
 @on_each("ext4", "btrfs", "tmpfs")
@@ -87,7 +87,7 @@ class Mounts(FilesystemTest):
         self.make_files(self.root, "in/point/hidden.txt")
         self.mount_tmpfs("in/point")
         self.begin()
-        namespace.unmount(f"{self.root}/in/point")
+        unmount(f"{self.root}/in/point")
 
         self.event(REINDEX, "in")
 
@@ -96,7 +96,7 @@ class Mounts(FilesystemTest):
     def test_mount_point_removed(self):
         self.mount_tmpfs("in/point")
         self.begin()
-        namespace.unmount(f"{self.root}/in/point")
+        unmount(f"{self.root}/in/point")
         os.rmdir(f"{self.root}/in/point")
 
         self.event(DELETE, "in/point")

@@ -18,7 +18,7 @@ import signal
 
 from harness import LoadTest, main, namespace
 from harness.awaiting import children
-from harness.filesystems import CREATE, REINDEX, need_loop_devices, on_each, run
+from harness.filesystems import CREATE, REINDEX, need_loop_devices, on_each, run, unmount
 from harness.scale import IS_LONG
 
 CUTS = 34 if IS_LONG else 4
@@ -79,7 +79,7 @@ class PowerCut(LoadTest):
         for name in ("fileindexd.pid", "fileindexd.sock", "talocontentsearchd.pid"):
             with contextlib.suppress(FileNotFoundError):
                 os.unlink(f"{namespace.RUN}/{name}")
-        run("umount", namespace.DISK)
+        unmount(namespace.DISK)
         os.unlink(self.image)
         self.image = copy
         self.mount_image()

@@ -154,7 +154,7 @@ class FollowTest(IndexTest):
     def test_end_of_a_pause_is_shown(self):
         follower = Follower("--json")
         follower.await_status(lambda status: True)
-        self.ctl("pause", "--for", "5s")
+        self.ctl("pause", "--for", "20s")
 
         follower.await_status(lambda status: status["paused_until"])
         follower.await_status(lambda status: status["paused_until"] is None)

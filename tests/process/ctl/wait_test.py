@@ -8,6 +8,7 @@ import signal
 import socket
 import subprocess
 import threading
+import time
 
 from harness import IndexTest, main, namespace
 from harness.awaiting import LIMIT
@@ -41,7 +42,7 @@ class FakeService:
         self.listener = socket.socket(socket.AF_UNIX, socket.SOCK_STREAM)
         self.listener.bind(SOCKET)
         self.listener.listen(16)
-        self.thread = threading.Thread(target=self._serve)
+        self.thread = threading.Thread(target=self._serve, daemon=True)
         self.thread.start()
 
     def _serve(self):
@@ -50,7 +51,12 @@ class FakeService:
                 client, _ = self.listener.accept()
             except OSError:
                 return  # closed
-            request = json.loads(client.makefile("rb").readline())
+            client.settimeout(LIMIT)
+            line = client.makefile("rb").readline()
+            if not line:  # who asks was ended before
+                client.close()
+                continue
+            request = json.loads(line)
             self.requests.append(request)
             reply = self.answer(request)
             if reply is None:
@@ -162,7 +168,7 @@ class WaitTest(IndexTest):
             searching = self.begin("fresh")
             self.await_file(self.asked(1))
             self.assertIsNone(searching.poll())
-            self.command("resume")
+            self.ctl("resume")
             self.await_drained("alpha")
 
             self.assertEqual(self.finish(searching), Result(0, found, b""))
@@ -178,7 +184,7 @@ class WaitTest(IndexTest):
         self.make_new_file(root)
         self.lines = []
         with self.service():
-            held = self.ctl("search", "--wait", "--timeout", "1", "fresh", code=1)
+            held = self.ctl("search", "--wait", "--timeout", "5", "fresh", code=1)
             self.assertIn(b"share alpha", held.err)
             searching = self.begin("fresh")
             self.append("alpha", b"")
@@ -193,10 +199,10 @@ class WaitTest(IndexTest):
             self.assertEqual(self.ctl("search", "--wait", "nothing").out, b"")
             os.kill(pid, signal.SIGSTOP)
             self.make_new_file(root)
-            held = self.ctl("search", "--wait", "--timeout", "1", "fresh", code=1)
+            held = self.ctl("search", "--wait", "--timeout", "5", "fresh", code=1)
             os.kill(pid, signal.SIGCONT)
 
-        self.assertIn(b"not done within 1 s: share alpha: lines wait in its queue", held.err)
+        self.assertIn(b"not done within 5 s: share alpha: lines wait in its queue", held.err)
 
     def test_reason_is_told(self):
         root = self.make_share()
@@ -205,7 +211,7 @@ class WaitTest(IndexTest):
         self.ctl("pause")
         self.make_new_file(root)
         with self.service():
-            held = self.ctl("search", "--wait", "--timeout", "1", "fresh", code=1)
+            held = self.ctl("search", "--wait", "--timeout", "5", "fresh", code=1)
 
         self.assertIn(b"indexing is paused", held.err)
 
@@ -349,11 +355,16 @@ class WatchedTest(IndexTest):
             )
             first = json.loads(following.stdout.readline())
             asked = len(service.requests)
+            deadline = time.monotonic() + LIMIT
             while len(service.requests) == asked:  # it looks whenever something happens here
+                self.assertIsNone(following.poll())
+                self.assertLess(time.monotonic(), deadline)
                 self.make_files(root, "x")
                 os.unlink(f"{root}/x")
             self.ctl("pause")
             second = json.loads(following.stdout.readline())
+            while second["paused_until"] is None:  # the service was too slow for it
+                second = json.loads(following.stdout.readline())
             following.send_signal(signal.SIGTERM)
             self.assertEqual(following.communicate(timeout=LIMIT)[0], b"")
 

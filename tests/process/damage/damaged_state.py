@@ -1,11 +1,14 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """What is done to a state database, and what has to become of it."""
 
+import contextlib
 import os
 import re
 import signal
+import time
 
 from harness import IndexTest, namespace
+from harness.awaiting import LIMIT
 from harness.standing_in import remove
 
 CREATE = 0x40
@@ -25,8 +28,9 @@ def truncate(part):
 
 def thread_states(pid):
     for thread in os.listdir(f"/proc/{pid}/task"):
-        with open(f"/proc/{pid}/task/{thread}/stat", encoding="utf-8") as file:
-            yield file.read().rpartition(") ")[2]
+        with contextlib.suppress(OSError):  # a thread that has ended meanwhile
+            with open(f"/proc/{pid}/task/{thread}/stat", encoding="utf-8") as file:
+                yield file.read().rpartition(") ")[2]
 
 
 class StateDamageTest(IndexTest):
@@ -66,7 +70,9 @@ class StateDamageTest(IndexTest):
         """In one step, to the content service: it opens the database when it likes."""
         service = self.service_pid()
         os.kill(service, signal.SIGSTOP)
+        deadline = time.monotonic() + LIMIT
         while not all(state.startswith("T") for state in thread_states(service)):
+            self.assertLess(time.monotonic(), deadline)
             os.sched_yield()
         damage()
         os.kill(service, signal.SIGCONT)

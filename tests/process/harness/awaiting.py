@@ -9,7 +9,9 @@ import time
 
 from harness.scale import IS_LONG
 
-LIMIT = 1200.0 if IS_LONG else 60.0  # seconds; far beyond what anything takes that works
+LIMIT = 1200.0 if IS_LONG else 300.0  # seconds; far beyond what anything takes that works
+
+LOOK_SECONDS = 1.0
 
 IN_ANY = 0x00000FFE  # all changes of a folder and of what is in it, but reading
 IN_CHANGE = 0x00000FC2  # the same without opening and closing: what a look itself does not raise
@@ -73,12 +75,19 @@ def await_in_folder(path, condition, limit=LIMIT, mask=IN_ANY):
     deadline = time.monotonic() + limit
     while True:
         folder = _deepest_folder(os.path.dirname(path))
-        with FolderWatch(folder, mask=mask) as watch:
+        try:
+            watch = FolderWatch(folder, mask=mask)
+        except FileNotFoundError:
+            continue  # it has gone meanwhile
+        with watch:
             while folder == _deepest_folder(os.path.dirname(path)):
                 if condition():
                     return True
-                if not watch.wait(deadline - time.monotonic()):
+                left = deadline - time.monotonic()
+                if left <= 0:
                     return False
+                # Not all that changes is told, nor is it always to be seen when it is told.
+                watch.wait(min(left, LOOK_SECONDS))
 
 
 def await_exit(pid, limit=LIMIT):

@@ -271,7 +271,8 @@ class MachineTest(unittest.TestCase):
 
     def await_drained(self, share):
         """Until all that was queued is executed and committed."""
-        self._await_queue(share, ["", ".tmp"])
+        # The queue may be made between the two looks, while its copy is still there.
+        self._await_queue(share, ["", ".tmp", "", ".tmp"])
 
     def _await_queue(self, share, endings):
         """Until the queue file and its copy, or one of them, are gone.
@@ -307,8 +308,8 @@ class MachineTest(unittest.TestCase):
             self.assertRegex(result.err, rb"\Afileindexctl: [^\n]+\n\Z", arguments)
         return result
 
-    def try_ctl(self, *arguments, **more):
-        """Runs the command, whatever comes of it."""
+    def try_ctl(self, *arguments, limit=LIMIT * 2, **more):
+        """Runs the command, whatever comes of it, for `limit` seconds at most."""
         command = [os.fsencode(program("fileindexctl")), *map(os.fsencode, arguments)]
         done = subprocess.run(
             command,
@@ -316,7 +317,7 @@ class MachineTest(unittest.TestCase):
             stdin=subprocess.DEVNULL,
             capture_output=True,
             check=False,
-            timeout=LIMIT * 2,
+            timeout=limit,
         )
         return Result(done.returncode, done.stdout, done.stderr)
 

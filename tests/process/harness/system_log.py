@@ -116,6 +116,7 @@ class SystemLog:
         self.marks += 1
         number = str(self.marks)
         with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
+            sender.settimeout(LIMIT)
             sender.connect(self.path)
             sender.send(f"<{MARK_PRIORITY}>{MARK_PROGRAM}: {number}".encode())
         with self.changed:

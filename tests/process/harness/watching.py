@@ -99,7 +99,8 @@ class WatchedTest(IndexTest):
     def sync(self, *shares, seconds=int(LIMIT)):
         """Until all that happened before is in the index."""
         for share in shares or ("alpha",):
-            self.ctl("search", "--share", share, "--wait", "--timeout", str(seconds), "--count", "x")
+            self.ctl("search", "--share", share, "--wait", "--timeout", str(seconds), "--count", "x",
+                     limit=seconds + LIMIT)
 
     def begin(self, **more):
         """Daemon and service, both at work, and the first index done."""

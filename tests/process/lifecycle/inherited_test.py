@@ -141,7 +141,7 @@ class RelativeStateTest(MachineTest):
                     env=environment(FILEINDEXD_STATE_DIR="state"),
                     capture_output=True,
                     check=False,
-                    timeout=5,
+                    timeout=LIMIT,
                 )
                 self.assertEqual((done.returncode, done.stdout), (1, b""))
                 self.assertIn(self.error, done.stderr.decode())

@@ -30,7 +30,7 @@ class Emptied(WatchedTest):
 
         empty(root)
         self.await_file(self.queue("alpha"))
-        self.assertEqual(self.command("resume"), 0)
+        self.ctl("resume")
 
         self.assert_emptied(root)
 

@@ -77,9 +77,11 @@ class Service(WatchedTest):
         self.assertEqual(self.command("pause"), 0)
 
         # Held back for its close, which does not come before the end.
+        self.notifier.send_signal(signal.SIGSTOP)  # it reads both at once
         with open(f"{root}/held.txt", "w", encoding="ascii") as file:
             file.write("x")
             file.flush()
+            self.notifier.send_signal(signal.SIGCONT)
             self.stop_notifier()
 
         with open(self.queue("alpha"), encoding="ascii") as file:
@@ -104,7 +106,9 @@ class Service(WatchedTest):
             with self.subTest(name):
                 if os.path.exists(self.queue("alpha")):
                     os.unlink(self.queue("alpha"))
-                subprocess.run(["sh", "-c", script], check=True)
+                self.notifier.send_signal(signal.SIGSTOP)  # it reads all of it at once
+                subprocess.run(["sh", "-c", script], check=True, timeout=LIMIT)
+                self.notifier.send_signal(signal.SIGCONT)
                 self.await_file(self.queue("alpha"))
                 self.assertTrue(
                     await_in_folder(

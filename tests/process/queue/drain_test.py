@@ -62,7 +62,7 @@ class DrainTest(IndexTest):
         """(op, name below the root) of the tree that was executed."""
         self.await_line("Worker[alpha] finished all task, stopping", after)
         pattern = re.compile(r"TREE COMMAND (\d): path=([^,]*), data=.*", re.S)
-        found = [pattern.fullmatch(text) for text in self.log.texts(after)]
+        found = [pattern.fullmatch(text) for text in self.logged(after)]
         return [(int(hit[1]), os.path.relpath(hit[2], self.root)) for hit in found if hit]
 
     def test_bad_lines_cost_one_line_each(self):

@@ -2,14 +2,11 @@
 """Workers come and go: dropped, revived, woken by their queue, a thousand times in a row."""
 
 import os
-import time
 
 from harness import IndexTest, main, namespace
-from harness.machine import SANITIZERS
 from harness.standing_in import remove
 
 PAIRS = 1000
-PAIRS_LIMIT = 60  # seconds
 CREATE = 0x40
 
 
@@ -146,14 +143,11 @@ class ManyPairsTest(IndexTest):
         self.assertEqual(self.command("delete_share_worker", share_name="alpha"), 0)
         self.await_alone(pid)
         before = self.descriptors(pid)
-        began = time.monotonic()
 
         for _ in range(PAIRS):
             self.assertEqual(self.command("revive_share_worker", share_name="alpha"), 0)
             self.assertEqual(self.command("delete_share_worker", share_name="alpha"), 0)
 
-        if not any(name in os.environ for name in SANITIZERS):  # which slow everything down
-            self.assertLess(time.monotonic() - began, PAIRS_LIMIT)
         self.await_alone(pid)
         self.assertEqual(self.descriptors(pid), before)
         self.assertEqual(self.command("revive_share_worker", share_name="alpha"), 0)

@@ -8,7 +8,7 @@ import shutil
 import signal
 import sqlite3
 
-from harness import main, namespace
+from harness import filesystems, main, namespace
 from harness.awaiting import await_exit_of
 from search.library import ScriptedTest
 
@@ -260,7 +260,7 @@ class ContentsFollowTest(ScriptedTest):
         self.ctl("folder", "add", other, "--document")
         self.await_hits("harbour", ["three.txt"], "beta")
 
-        namespace.unmount(folder)
+        filesystems.unmount(folder)
         self.await_hits("lighthouse", ["one.txt", "two.txt"])
 
     def test_what_the_disk_does_not_give_is_read_when_it_does(self):
@@ -320,7 +320,7 @@ class PauseTest(ScriptedTest):
 
     def test_a_pause_ends_by_itself(self):
         helper = self.begin("gate.txt")
-        self.ctl("pause", "--for", "2s")
+        self.ctl("pause", "--for", "10s")
         self.assertTrue(await_exit_of(helper))
 
         self.open_gate()

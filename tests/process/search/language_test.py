@@ -4,6 +4,7 @@
 import subprocess
 
 from harness import main
+from harness.awaiting import LIMIT
 from harness.machine import environment, program
 from search.library import ContentsTest
 
@@ -36,7 +37,8 @@ class LanguageTest(ContentsTest):
     def said_by_search(self):
         """On standard error."""
         command = [program("fileindexctl"), "search", "text:walks"]
-        done = subprocess.run(command, env=environment(), capture_output=True, check=True)
+        done = subprocess.run(command, env=environment(), capture_output=True, check=True,
+                              timeout=LIMIT)
         return done.stderr
 
     def test_english_unless_said_otherwise(self):

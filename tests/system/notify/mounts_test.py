@@ -4,9 +4,11 @@
 import os
 import shutil
 import signal
+import time
 
 from harness import main, namespace
-from harness.filesystems import make_image, run
+from harness.awaiting import LIMIT
+from harness.filesystems import make_image, run, unmount
 from harness.watched_disks import WatchedDiskTest
 
 
@@ -25,7 +27,7 @@ class Mounts(WatchedDiskTest):
         self.assert_converged(self.root)
         self.assertNotIn(f"{self.root}/d/in".encode(), self.dump())
 
-        namespace.unmount(f"{self.root}/d")
+        unmount(f"{self.root}/d")
         self.assert_converged(self.root)
         self.assertIn(f"{self.root}/d/in/x.txt".encode(), self.dump())
 
@@ -112,8 +114,10 @@ class Mounts(WatchedDiskTest):
             self.assert_converged(self.root)
 
     def await_problem(self, text):
+        deadline = time.monotonic() + LIMIT
         while text not in self.watched()["problem"]:
             self.assertIsNone(self.notifier.poll())
+            self.assertLess(time.monotonic(), deadline)
 
     def test_moves_between_shares_and_file_systems(self):
         self.begin()
@@ -195,7 +199,9 @@ class ForcedComparison(WatchedDiskTest):
 
     def await_entry(self, path):
         """Without asking the service, which would compare at once."""
+        deadline = time.monotonic() + LIMIT
         while os.fsencode(path) not in self.dump():
+            self.assertLess(time.monotonic(), deadline)
             self.await_taken("alpha")
 
 

@@ -42,6 +42,7 @@ class Programs:
             env={**os.environ, "GIT_CONFIG_GLOBAL": "/dev/null", "ELSEWHERE": self.elsewhere},
             capture_output=True,
             check=False,
+            timeout=LIMIT,
         )
         self.assertEqual(done.returncode, 0, done.stderr)
 

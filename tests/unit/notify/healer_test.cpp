@@ -24,7 +24,7 @@ namespace fileindexd {
 
 namespace {
 
-constexpr int GENEROUS = 60000;  // milliseconds
+constexpr int GENEROUS = 600000;  // milliseconds
 // More than are compared in one piece.
 constexpr int MANY_FILES = 2000;
 

@@ -8,6 +8,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <memory>
+#include <vector>
+
 #include "base/scoped_fd.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
@@ -193,8 +196,10 @@ TEST_F(KeeperRoundTest, QueueThatGrowsAndIsNeverTakenGetsAWorkerToo) {
 }
 
 TEST_F(KeeperRoundTest, QueueThatIsTakenAndWrittenAnewNeedsNoWorker) {
+  std::vector<std::unique_ptr<ScopedFd>> held;  // whose inodes are given to no other file
   for (int i = 0; i < 6; ++i) {
     MakeOld(QueuePath("s"), 100);
+    held.push_back(std::make_unique<ScopedFd>(open(QueuePath("s").c_str(), O_RDONLY | O_CLOEXEC)));
     round->Run(NOW + i * ROUND);
     ASSERT_EQ(unlink(QueuePath("s").c_str()), 0);
   }

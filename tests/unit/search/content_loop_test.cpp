@@ -4,6 +4,7 @@
 
 #include <gmock/gmock.h>
 #include <poll.h>
+#include <sched.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/wait.h>
@@ -55,9 +56,11 @@ class ContentLoopTest : public MountTest {
     std::string time = "1000";
     char* const arguments[] = {name.data(), time.data(), nullptr};
     ASSERT_EQ(posix_spawn(&daemon, path.c_str(), nullptr, nullptr, arguments, environ), 0);
-    // Its pid file is believed once it is that program.
+    // Its pid file is believed once it is that program, a moment after the call has returned.
     const std::string link = "/proc/" + std::to_string(daemon) + "/exe";
-    ASSERT_EQ(std::filesystem::read_symlink(link), path);
+    while (std::filesystem::read_symlink(link) != path) {
+      sched_yield();
+    }
     WriteFile(DAEMON_PID_FILE, std::to_string(daemon) + "\n");
   }
   void KillDaemon() {

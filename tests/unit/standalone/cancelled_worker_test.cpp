@@ -29,7 +29,7 @@ namespace {
 namespace fs = std::filesystem;
 using Microseconds = std::chrono::microseconds;
 
-constexpr int JOIN_LIMIT = 120;  // seconds; far beyond what a pass takes
+constexpr int JOIN_LIMIT = 1200;  // seconds; far beyond what a pass takes
 constexpr int FOLDERS = 12;
 constexpr int FILES = 20;   // in each folder
 constexpr int EVENTS = 60;  // of a round

@@ -278,8 +278,9 @@ TEST_F(WorkerDocumentsTest, APauseHoldsEachOperationBeforeItsFirstFilter) {
   for (int nth = 0; nth < OPERATIONS; ++nth) {
     script.Forget();
     daemon.resume_time = 0;
+    const int waits = script.CallCount("pthread_cond_wait");
     std::thread waiting([&] { Operate(nth); });
-    ASSERT_TRUE(script.AwaitCount("pthread_cond_wait", nth + 1));
+    ASSERT_TRUE(script.AwaitCount("pthread_cond_wait", waits + 1));
     {
       const MutexGuard guard(&daemon.pause_mutex);  // free: the thread waits
       EXPECT_THAT(script.Calls(), IsEmpty()) << nth;

@@ -3,6 +3,7 @@
 
 #include <fstream>
 
+#include "base/mutex_guard.h"
 #include "platform/log.h"
 
 namespace fileindexd {
@@ -26,6 +27,11 @@ WorkerFixture::WorkerFixture() {
 
 WorkerFixture::~WorkerFixture() {
   script.Release();
+  {
+    const MutexGuard guard(&daemon.pause_mutex);
+    daemon.resume_time = -1;
+    pthread_cond_broadcast(&daemon.pause_cond);
+  }
   if (running) {
     JoinThread(false);
   }
