@@ -134,7 +134,6 @@ class PlaceFinder {
     }
     for (const Wanted& wanted : tokens) {
       if (wanted.is_beginning ? token.starts_with(wanted.token) : token == wanted.token) {
-        recent.back().end = met.empty() ? end : recent.back().end;
         met.insert(wanted.number);
       }
     }
@@ -161,26 +160,31 @@ class PlaceFinder {
   struct Row {
     size_t first;
     size_t last;
-    std::set<size_t> begun;    // numbers up to which it stands in front of the next word
-    std::vector<Place> parts;  // as long as it stands nowhere whole
-    size_t count;              // how often it does
+    std::vector<size_t> begun;  // numbers up to which it stands in front of the next word
+    std::vector<Place> parts;   // as long as it stands nowhere whole
+    size_t count;               // how often it does
   };
 
   // All is known of the last word.
   void EndWord() {
     for (Row& row : rows) {
-      std::set<size_t> begun;
+      if (row.count == MOST_PLACES) {
+        continue;
+      }
+      std::vector<size_t> begun;  // ascending
       for (auto number = met.lower_bound(row.first); number != met.upper_bound(row.last);
            ++number) {
-        if (*number == row.first || row.begun.contains(*number - 1)) {
-          begun.insert(*number);
+        if (*number == row.first ||
+            std::binary_search(row.begun.begin(), row.begun.end(), *number - 1)) {
+          begun.push_back(*number);
         }
         if (row.count == 0 && ++part_counts[*number] <= MOST_PLACES) {
           row.parts.push_back({recent.back().start, recent.back().end, *number});
         }
       }
       row.begun = std::move(begun);
-      if (row.begun.contains(row.last) && ++row.count <= MOST_PLACES) {
+      if (!row.begun.empty() && row.begun.back() == row.last) {
+        ++row.count;
         TakeLast(row);
       }
     }
