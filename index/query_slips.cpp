@@ -16,13 +16,15 @@ namespace {
 
 // What was compared with: a quoted text, or up to a blank or a bracket. Empty where that would not
 // do as a value either.
-std::string ValueAt(std::string_view text) {
+std::string ValueAt(const NamedField& field, std::string_view text) {
   if (text.starts_with('"')) {
-    return std::string(text.substr(0, text.find('"', 1))) + '"';
+    const std::string quoted(text.substr(0, text.find('"', 1)));
+    return HoldsWords(quoted) ? quoted + '"' : "";
   }
   std::string_view value = text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
-  value = value.substr(0, value.find_last_not_of("<>=") + 1);  // "from <bob@home>"
-  const bool has_sign = value.find_first_of("-<>=:") == 0;
+  value = value.substr(0, value.find_last_not_of("<>=") + 1);   // "from <bob@home>"
+  const bool is_ago = IsTime(field) && value.starts_with('-');  // "modified > -7d"
+  const bool has_sign = !is_ago && value.find_first_of("-<>=:") == 0;
   return HoldsWords(value) && !has_sign ? std::string(value) : "";
 }
 
@@ -71,7 +73,7 @@ std::string WhyColonIsMissing(std::string_view text) {
   }
   const size_t value_at = SkipBlanksAt(text, start + size);
   const std::string_view compared = text.substr(start, size);
-  const std::string value = ValueAt(text.substr(value_at));
+  const std::string value = ValueAt(*field, text.substr(value_at));
   const std::string example =
       value.empty() ? "" : ", as in " + WrittenForm(*field, compared, value);
   const std::string name = Cited(text.substr(0, letters));

@@ -147,11 +147,13 @@ TEST_F(QuerySlipsTest, BlanksDoNotPartAFieldFromItsColonOrComparison) {
                {"text : whale", "text:whale"},
                {"text :\"a b\"", "text:\"a b\""},
                {"text =x", "text:x"},
-               {"from <bob@home>", "from:bob@home"}});
+               {"from <bob@home>", "from:bob@home"},
+               {"modified > -7d", "modified:>-7d"}});
 }
 
 TEST_F(QuerySlipsTest, NoExampleIsGivenThatWouldBeRefusedItself) {
-  for (const char* text : {"size=", "size = -5", "text : :", "title < -moby", "size > ("}) {
+  for (const char* text :
+       {"size=", "size = -5", "title=\"\"", "title=\"", "text : :", "title < -moby", "size > ("}) {
     const std::string what = ErrorOf(text).what;
     EXPECT_EQ(what.find("as in"), std::string::npos) << what;
     EXPECT_NE(what.find("in quotes"), std::string::npos) << text << ": " << what;
