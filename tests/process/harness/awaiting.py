@@ -40,6 +40,7 @@ class FolderWatch:
         for folder in folders:
             if _libc.inotify_add_watch(self.fd, os.fsencode(folder), mask) < 0:
                 error = ctypes.get_errno()
+                os.close(self.fd)
                 raise OSError(error, os.strerror(error), folder)
 
     def wait(self, seconds):

@@ -46,10 +46,9 @@ def _mounts(process):
     return []
 
 
-def _is_mounted_somewhere(device):
-    """Other tests may have other disks at the same place, each in its own namespace."""
-    processes = filter(str.isdigit, os.listdir("/proc"))
-    return any(device == mounted for process in processes for mounted, _ in _mounts(process))
+def _is_mounted_somewhere(mount):
+    """Another disk may stand at this place, and this one be bound elsewhere."""
+    return any(mount in _mounts(process) for process in filter(str.isdigit, os.listdir("/proc")))
 
 
 def unmount(folder):
@@ -59,7 +58,8 @@ def unmount(folder):
     own; nothing tells of the end of that.
     """
     deadline = time.monotonic() + LIMIT
-    device = dict(map(reversed, _mounts("self")))[os.fsencode(folder)]  # the last one at this place
+    place = os.fsencode(folder)
+    mount = [mount for mount in _mounts("self") if mount[1] == place][-1]  # the uppermost
     with FolderWatch(*(path for path, _, _ in os.walk(folder)), mask=IN_CLOSE) as watch:
         while True:
             try:
@@ -71,7 +71,7 @@ def unmount(folder):
                     raise
                 # A close is told before the mount is let go, a look at a path not at all.
                 watch.wait(min(left, 0.1))
-    while _is_mounted_somewhere(device):
+    while _is_mounted_somewhere(mount):
         assert time.monotonic() < deadline, f"still mounted somewhere: {folder}"
         time.sleep(0.01)
 

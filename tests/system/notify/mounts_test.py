@@ -8,7 +8,7 @@ import time
 
 from harness import main, namespace
 from harness.awaiting import LIMIT
-from harness.filesystems import make_image, run, unmount
+from harness.filesystems import run, unmount
 from harness.watched_disks import WatchedDiskTest
 
 
