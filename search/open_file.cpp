@@ -8,14 +8,11 @@
 #include <cstring>
 
 #include "state/open_path.h"
+#include "state/statx_look.h"
 
 namespace fileindexd {
 
 namespace {
-
-int64_t Nanoseconds(const statx_timestamp& time) {
-  return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
-}
 
 // By way of the descriptor that was looked at: nothing can come between.
 int OpenSeen(int seen) {
@@ -30,7 +27,6 @@ int OpenSeen(int seen) {
 
 bool IsStill(int file, const FileIdentity& identity) {
   struct statx st {};
-  constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME;
   if (statx(file, "", AT_EMPTY_PATH, WANTED, &st) != 0 || !S_ISREG(st.stx_mode)) {
     return false;
   }

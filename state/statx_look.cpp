@@ -9,10 +9,6 @@ namespace fileindexd {
 
 namespace {
 
-int64_t Nanoseconds(const statx_timestamp& time) {
-  return static_cast<int64_t>(time.tv_sec) * 1'000'000'000 + time.tv_nsec;
-}
-
 // Whether a file's name may have been left open, because a directory of that name is taken in.
 bool IsFileOpen(const Settings& settings, const std::string& normal) {
   const IndexedFolder* folder = settings.FolderOfPath(normal);
@@ -20,6 +16,16 @@ bool IsFileOpen(const Settings& settings, const std::string& normal) {
 }
 
 }  // namespace
+
+int64_t Nanoseconds(const statx_timestamp& time) {
+  constexpr int64_t SECOND = 1'000'000'000;
+  int64_t nanoseconds = 0;
+  if (__builtin_mul_overflow(time.tv_sec, SECOND, &nanoseconds) ||
+      __builtin_add_overflow(nanoseconds, static_cast<int64_t>(time.tv_nsec), &nanoseconds)) {
+    return time.tv_sec < 0 ? INT64_MIN : INT64_MAX;
+  }
+  return nanoseconds;
+}
 
 bool HasMountId(const struct statx& st) {
   if ((st.stx_mask & (STATX_MNT_ID | UNIQUE_MOUNT_ID)) != 0) {

@@ -12,6 +12,9 @@ namespace fileindexd {
 constexpr unsigned UNIQUE_MOUNT_ID = 0x4000;
 constexpr unsigned WANTED = STATX_BASIC_STATS | STATX_BTIME | STATX_MNT_ID | UNIQUE_MOUNT_ID;
 
+// Since the epoch. What lies beyond 64 bits, in 2262 and in 1677, is the last one, or the first.
+int64_t Nanoseconds(const statx_timestamp& time);
+
 // False with errno ENOSYS on a kernel without mount ids.
 bool HasMountId(const struct statx& st);
 

@@ -108,6 +108,22 @@ TEST(JudgeNameTest, PatternsOfTheDeepestFolderKeepOut) {
 }
 
 // The time that it is kept for begins when it was seen, not when it was asked for.
+int64_t At(int64_t seconds, uint32_t nanoseconds) {
+  statx_timestamp time{};
+  time.tv_sec = seconds;
+  time.tv_nsec = nanoseconds;
+  return Nanoseconds(time);
+}
+
+TEST(StatxLookTest, TimesBeyondSixtyFourBitsAreTheLastAndTheFirst) {
+  constexpr int64_t LAST_SECOND = 9'223'372'036;  // in April 2262
+  EXPECT_EQ(At(LAST_SECOND, 854'775'807), INT64_MAX);
+  EXPECT_EQ(At(LAST_SECOND, 854'775'808), INT64_MAX);
+  EXPECT_EQ(At(253'402'300'799, 0), INT64_MAX);
+  EXPECT_EQ(At(-LAST_SECOND - 2, 0), INT64_MIN);
+  EXPECT_EQ(At(-1, 5), -999'999'995);
+}
+
 TEST_F(BelongingTest, AFolderThatWasSeenSlowlyIsKept) {
   MakeFile(root + "/d/a");
   MakeFile(root + "/d/b");
