@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "index/query_times.h"
 
+#include <algorithm>
 #include <charconv>
 #include <string>
 
@@ -71,6 +72,21 @@ std::optional<TimeSpan> Day(tm broken, int days, bool utc) {
   return TimeSpan{first, next - 1, false};
 }
 
+// The hour that comes twice, when the clock is put back, is all that it shows so.
+void SpanBothHours(const tm& shown, TimeSpan& span) {
+  constexpr int64_t MINUTE = 60;
+  for (const int is_summer : {0, 1}) {
+    tm broken = shown;
+    broken.tm_isdst = is_summer;
+    const int64_t first = mktime(&broken);
+    if (broken.tm_isdst == is_summer && broken.tm_hour == shown.tm_hour &&
+        broken.tm_min == shown.tm_min) {
+      span.first = std::min(span.first, first);
+      span.last = std::max(span.last, first + MINUTE - 1);
+    }
+  }
+}
+
 // "2024", "2024-01", "2024-01-05", "2024-01-05T12:30".
 std::optional<TimeSpan> Calendar(std::string_view text, bool utc) {
   int year = 0;
@@ -112,6 +128,9 @@ std::optional<TimeSpan> Calendar(std::string_view text, bool utc) {
   end.tm_isdst = -1;
   const int64_t next = utc ? timegm(&end) : mktime(&end);
   span.last = next - 1;
+  if (has_time && !utc) {
+    SpanBothHours(start, span);
+  }
   return span;
 }
 

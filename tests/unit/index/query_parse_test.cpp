@@ -299,6 +299,10 @@ TEST_F(QueryParseTest, TimesAreThoseOfTheZone) {
   Zone("Europe/Berlin");
   EXPECT_EQ(Parsed("sent:2024-01-05"), "sent[1704409200..1704495599]");
   EXPECT_EQ(Parsed("sent:2024-03-31"), "sent[1711839600..1711922399]") << "has 23 hours";
+  EXPECT_EQ(Parsed("sent:2024-10-27T02:30"), "sent[1729989000..1729992659]") << "it comes twice";
+  EXPECT_EQ(Parsed("sent:>=2024-10-27T02:00"), "sent[1729987200..]");
+  EXPECT_EQ(Parsed("sent:2024-10-27T03:00"), "sent[1729994400..1729994459]");
+  EXPECT_EQ(Parsed("sent:2024-06-01T12:00"), "sent[1717236000..1717236059]");
   EXPECT_EQ(Parsed("taken:2024-01-05"), "taken[1704412800..1704499199]") << "a clock without zone";
 }
 
