@@ -4,15 +4,19 @@
 #include <json/reader.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <exception>
 #include <memory>
 #include <string_view>
 
 #include "base/scoped_fd.h"
+#include "index/reader.h"
 #include "state/event_codes.h"
 #include "state/layout.h"
+#include "state/progress.h"
 #include "state/queue_files.h"
+#include "state/queue_writer.h"
 
 namespace fileindexd {
 
@@ -88,6 +92,20 @@ Pending ReadPending(const std::string& share_name, const std::string& path) {
   ForEachQueueLine(files.drained, [&](std::string_view line) { reader.Read(line, true); });
   ForEachQueueLine(files.queue, [&](std::string_view line) { reader.Read(line, false); });
   return pending;
+}
+
+bool IsIndexLost(StateStore& store, const Settings& settings, const std::string& share_name) {
+  if (!EntryReader::IsMissing(share_name)) {
+    return false;
+  }
+  const bool has_folders = std::any_of(
+      settings.folders.begin(), settings.folders.end(),
+      [&share_name](const IndexedFolder& folder) { return folder.share == share_name; });
+  ShareStatus status;
+  ProgressRecord work;
+  return has_folders && WaitingLines(share_name) == 0 && store.GetStatus(share_name, status) &&
+         !status.needs_reindex && !status.reindex_begun &&
+         !ReadProgress(WorkerProgressPath(share_name), work) && EntryReader::IsMissing(share_name);
 }
 
 }  // namespace fileindexd

@@ -6,6 +6,9 @@
 #include <string>
 #include <vector>
 
+#include "state/settings.h"
+#include "state/store.h"
+
 namespace fileindexd {
 
 struct PendingEvent {
@@ -24,5 +27,9 @@ struct Pending {
 // Reads the queue and its drained copy without a lock: a line that is being written is passed over,
 // and one that is taken meanwhile may be missed. `path` is normal.
 Pending ReadPending(const std::string& share_name, const std::string& path);
+
+// Whether a share has indexed folders and no index, and nothing is on the way that makes one: no
+// line in its queue, no reindex that was asked for, and no Worker at work.
+bool IsIndexLost(StateStore& store, const Settings& settings, const std::string& share_name);
 
 }  // namespace fileindexd

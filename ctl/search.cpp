@@ -12,6 +12,7 @@
 #include "ctl/commands.h"
 #include "ctl/hit_output.h"
 #include "ctl/output.h"
+#include "ctl/pending.h"
 #include "ctl/places.h"
 #include "ctl/search_notes.h"
 #include "ctl/terminal/screen.h"
@@ -74,6 +75,9 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
     if (!arguments.in_share || share.name == *arguments.in_share) {
       question.shares.push_back(share.name);
       question.roots.emplace(share.name, share.path);
+      if (IsIndexLost(*session.store, *session.settings, share.name)) {
+        question.lost.push_back(share.name);
+      }
     }
     question.known.push_back(share.name);
   }

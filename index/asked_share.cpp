@@ -130,7 +130,11 @@ void AskedShare::AskTries(const Question& question, const Asked& asked, const Hi
   deadline = std::chrono::steady_clock::now() + question.patience;
   has_index = !EntryReader::IsMissing(name);
   if (!has_index) {
-    return;  // it holds nothing to find yet: that is no failure
+    // One that is to be made yet holds nothing to find: that is no failure.
+    if (std::find(question.lost.begin(), question.lost.end(), name) != question.lost.end()) {
+      Fail(IndexErrorText(IndexError::PATH_NOT_FOUND));
+    }
+    return;
   }
   IndexError of_contents = IndexError::NONE;
   int failed_with_contents = 0;

@@ -6,6 +6,7 @@ import os
 from harness import IndexTest, main, namespace
 from harness.machine import full_path
 
+ENTRIES = f"{namespace.STATE}/shares/alpha/index/entries.db"
 FILES = [
     "holiday/beach.jpg",
     "holiday/beach.mp4",
@@ -21,7 +22,7 @@ class SearchTest(IndexTest):
         super().setUp()
         self.root = self.make_share(files=FILES)
         self.other = self.make_share("beta", files=("beach.txt",))
-        self.start()
+        self.pid = self.start()
         for share in ("alpha", "beta"):
             self.await_drained(share)
 
@@ -49,6 +50,18 @@ class SearchTest(IndexTest):
         self.assertEqual(self.hits("share:gamma", "beach"), [])
         self.assertEqual(self.hits("share:gamma,beta", "beach"), ["beta/beach.txt"])
         self.ctl("search", "share:delta", "beach", code=2)
+
+    def test_a_share_whose_index_is_gone_is_named_beside_those_that_answer(self):
+        self.stop(self.pid)
+        index = os.path.dirname(ENTRIES)
+        os.rename(index, f"{index}.away")
+
+        answer = self.ctl("search", "beach", code=1)
+
+        self.assertEqual(answer.out, f"{self.other}/beach.txt\n".encode())
+        self.assertEqual(answer.err, b"fileindexctl: share alpha: there is no index\n")
+        self.append("alpha", {"event": 0x10000, "path": self.root})  # which makes a new one
+        self.assertEqual(self.hits("share:alpha", "beach"), [])
 
     def test_a_share_with_a_comma_in_its_name_is_named_in_quotes(self):
         self.make_share("alpha,old", folders=())
