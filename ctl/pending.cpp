@@ -11,7 +11,6 @@
 #include <string_view>
 
 #include "base/scoped_fd.h"
-#include "index/reader.h"
 #include "state/event_codes.h"
 #include "state/layout.h"
 #include "state/progress.h"
@@ -94,10 +93,7 @@ Pending ReadPending(const std::string& share_name, const std::string& path) {
   return pending;
 }
 
-bool IsIndexLost(StateStore& store, const Settings& settings, const std::string& share_name) {
-  if (!EntryReader::IsMissing(share_name)) {
-    return false;
-  }
+bool IsIndexExpected(StateStore& store, const Settings& settings, const std::string& share_name) {
   const bool has_folders = std::any_of(
       settings.folders.begin(), settings.folders.end(),
       [&share_name](const IndexedFolder& folder) { return folder.share == share_name; });
@@ -105,7 +101,7 @@ bool IsIndexLost(StateStore& store, const Settings& settings, const std::string&
   ProgressRecord work;
   return has_folders && WaitingLines(share_name) == 0 && store.GetStatus(share_name, status) &&
          !status.needs_reindex && !status.reindex_begun &&
-         !ReadProgress(WorkerProgressPath(share_name), work) && EntryReader::IsMissing(share_name);
+         !ReadProgress(WorkerProgressPath(share_name), work);
 }
 
 }  // namespace fileindexd

@@ -18,6 +18,7 @@
 #include "ctl/terminal/screen.h"
 #include "ctl/values.h"
 #include "ctl/wait.h"
+#include "index/reader.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -75,7 +76,8 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
     if (!arguments.in_share || share.name == *arguments.in_share) {
       question.shares.push_back(share.name);
       question.roots.emplace(share.name, share.path);
-      if (IsIndexLost(*session.store, *session.settings, share.name)) {
+      if (EntryReader::IsMissing(share.name) &&
+          IsIndexExpected(*session.store, *session.settings, share.name)) {
         question.lost.push_back(share.name);
       }
     }

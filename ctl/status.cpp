@@ -7,6 +7,7 @@
 #include "ctl/commands.h"
 #include "ctl/follow.h"
 #include "ctl/output.h"
+#include "ctl/pending.h"
 #include "ctl/root_problem.h"
 #include "ctl/status_report.h"
 #include "ctl/watches.h"
@@ -22,12 +23,11 @@ namespace fileindexd {
 namespace {
 
 // An index that is not there is a problem where nothing is on the way that makes it.
-void ReadIndex(ShareReport& report) {
+void ReadIndex(Session& session, ShareReport& report) {
   EntryReader reader;
   const IndexError opened = OpenAndTell(reader.database, report.share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {
-    const bool comes = report.waiting > 0 || report.needs_reindex || report.work.has_value();
-    if (report.has_folders && !comes) {
+    if (IsIndexExpected(*session.store, *session.settings, report.share.name)) {
       report.index_problem =
           "missing; to make it anew: fileindexctl reindex " + OneLine(report.share.path);
     }
@@ -76,7 +76,7 @@ bool ReportShare(Session& session, const Share& share, pid_t daemon, ShareReport
   report.work = WorkAt(WorkerProgressPath(share.name));
   report.comparison = WorkAt(ComparisonProgressPath(share.name));
   LookAtFolders(*session.settings, report);
-  ReadIndex(report);
+  ReadIndex(session, report);
   report.contents = ReportContents(share, report.index.wanted);
   report.unwatched =
       report.has_folders && daemon > 0 && IsUnwatched(daemon, ShareFolder(share.name));
