@@ -204,10 +204,10 @@ class PlaceFinder {
   Completeness shown;
   std::vector<Row> rows;
   size_t longest = 0;
-  std::deque<Place> recent;  // the last words, as many as the longest row has
-  std::set<size_t> met;      // numbers, at the last of them
-  std::map<size_t, size_t> part_counts;
-  std::map<size_t, Place> places;  // by start
+  std::deque<Place> recent;              // the last words, as many as the longest row has
+  std::set<size_t> met;                  // numbers, at the last of them
+  std::map<size_t, size_t> part_counts;  // by number: a common word does not hide a rare one
+  std::map<size_t, Place> places;        // by start
 };
 
 // All, or as far as those behind do not count.

@@ -14,13 +14,13 @@ using testing::SizeIs;
 
 class CommitBesideTest : public ShareContentsTest {
  protected:
-  // Some are given out, the first one is read, and its result is being committed.
   void AddFiles() {
     for (int64_t row = 1; row <= 8; ++row) {
       AddFile(row);
     }
     Settle();
   }
+  // Some are given out, the first one is read, and its result is being committed.
   void BeginCommit() {
     AddFiles();
     ids = GiveOut(3);

@@ -107,7 +107,6 @@ TEST(JudgeNameTest, PatternsOfTheDeepestFolderKeepOut) {
   EXPECT_FALSE(settings.HasFolderBelow("/v/s/buil"));
 }
 
-// The time that it is kept for begins when it was seen, not when it was asked for.
 int64_t At(int64_t seconds, uint32_t nanoseconds) {
   statx_timestamp time{};
   time.tv_sec = seconds;
@@ -124,6 +123,7 @@ TEST(StatxLookTest, TimesBeyondSixtyFourBitsAreTheLastAndTheFirst) {
   EXPECT_EQ(At(-1, 5), -999'999'995);
 }
 
+// The time that it is kept for begins when it was seen, not when it was asked for.
 TEST_F(BelongingTest, AFolderThatWasSeenSlowlyIsKept) {
   MakeFile(root + "/d/a");
   MakeFile(root + "/d/b");
