@@ -12,6 +12,7 @@
 
 #include "state/layout.h"
 #include "state/queue_file.h"
+#include "state/queue_files.h"
 #include "state/queue_folding.h"
 
 namespace fileindexd {
@@ -57,6 +58,7 @@ bool QueueAppender::Count(const ScopedFd& locked, std::string& error) {
   const bool known = IsSameFile(file);
   file_number += known ? 0 : 1;
   const off_t offset = known ? counted.size : 0;
+  file.met = known ? counted.met : 0;
   file.lines = known ? counted.lines : 0;
   file.open_end = known && counted.open_end;
   if (file.size > offset) {
@@ -92,6 +94,9 @@ Appended QueueAppender::Append(const Give& give, std::string& error) {
     return Appended::FULL;
   }
 
+  if (meet && counted.met < counted.size) {
+    counted.met = ForEachQueueLine(queue, meet, counted.met);
+  }
   const std::vector<std::string> lines = give(QUEUE_LINE_LIMIT - counted.lines);
   if (lines.empty()) {
     return Appended::FULL;
@@ -105,6 +110,7 @@ Appended QueueAppender::Append(const Give& give, std::string& error) {
   // the lines are counted the next time.
   struct stat written {};
   if (fstat(queue.fd, &written) == 0) {
+    counted.met = counted.open_end ? counted.met : written.st_size;
     counted.size = written.st_size;
     counted.lines += lines.size();
     counted.open_end = false;

@@ -11,6 +11,7 @@
 #include <cstdint>
 #include <functional>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -27,7 +28,12 @@ enum class Appended {
 
 class QueueAppender {
  public:
-  explicit QueueAppender(std::string name_of_share) : share_name(std::move(name_of_share)) {}
+  // Called with each line that another program has written into the file that lines are about to be
+  // given to, once, in their order. (One of ours may be among them behind another's half line.)
+  using Meet = std::function<void(std::string_view line)>;
+
+  explicit QueueAppender(std::string name_of_share, Meet meet_line = {})
+      : share_name(std::move(name_of_share)), meet(std::move(meet_line)) {}
 
   // Asks `give`, with the file locked, for at most as many lines as it takes, at least one, and
   // appends them. Giving none means that those that there are do not fit: FULL. Unless the result
@@ -39,7 +45,7 @@ class QueueAppender {
   // Does not open it: every close of the file makes the daemon look.
   bool IsWaiting() const;
 
-  // Of the file that lines were given to last: another number, another file.
+  // Of the file that lines were met in or given to last: another number, another file.
   uint64_t FileNumber() const { return file_number; }
 
  private:
@@ -50,6 +56,7 @@ class QueueAppender {
     ino_t inode = 0;
     int64_t birth_time = 0;
     off_t size = 0;  // bytes that are counted
+    off_t met = 0;   // bytes whose lines were met, or are ours
     uint64_t lines = 0;
     bool open_end = false;  // the last line has no newline yet
   };
@@ -59,6 +66,7 @@ class QueueAppender {
   bool Count(const ScopedFd& locked, std::string& error);
 
   const std::string share_name;
+  const Meet meet;
   Counted counted;
   uint64_t file_number = 0;
   ScopedFd waiting;  // opened while another program held the lock

@@ -39,19 +39,21 @@ void OpenQueueFiles(const std::string& share_name, QueueFiles& files) {
   }
 }
 
-void ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit) {
+off_t ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit,
+                       off_t offset) {
   constexpr size_t BUFFER = 65536;
   std::string text;
   std::string buffer(BUFFER, '\0');
   while (file.fd >= 0) {
-    const ssize_t length = read(file.fd, buffer.data(), buffer.size());
+    const ssize_t length = pread(file.fd, buffer.data(), buffer.size(), offset);
     if (length < 0 && errno == EINTR) {
       continue;
     }
     if (length <= 0) {
-      return;
+      break;
     }
     text.append(buffer, 0, static_cast<size_t>(length));
+    offset += length;
     size_t begin = 0;
     for (size_t end = text.find('\n'); end != std::string::npos; end = text.find('\n', begin)) {
       visit(std::string_view(text).substr(begin, end - begin));
@@ -59,6 +61,7 @@ void ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string
     }
     text.erase(0, begin);
   }
+  return offset - static_cast<off_t>(text.size());
 }
 
 }  // namespace fileindexd

@@ -2,6 +2,8 @@
 // A share's queue file and its drained copy, for whoever only reads them.
 #pragma once
 
+#include <sys/types.h>
+
 #include <functional>
 #include <string>
 #include <string_view>
@@ -20,8 +22,10 @@ struct QueueFiles {
 // drained copy alone.
 void OpenQueueFiles(const std::string& share_name, QueueFiles& files);
 
-// Calls `visit` with each whole line, without its newline. What stands behind the last newline is
-// being written, and is passed over. Nothing is read of a file that is -1.
-void ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit);
+// Calls `visit` with each whole line from byte `offset` on, without its newline. What stands behind
+// the last newline is being written, and is passed over: returns where it begins. Nothing is read
+// of a file that is -1.
+off_t ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit,
+                       off_t offset = 0);
 
 }  // namespace fileindexd

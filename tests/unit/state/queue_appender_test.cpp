@@ -140,6 +140,54 @@ TEST_F(QueueAppenderTest, ANewFileIsCountedAnewWhateverItsInode) {
   }
 }
 
+TEST_F(QueueAppenderTest, LinesOfOthersAreMetBeforeThoseThatAreGiven) {
+  Texts met;
+  QueueAppender meeting("s", [&met](std::string_view line) { met.emplace_back(line); });
+  const auto append = [&] {
+    return meeting.Append(
+        [&met](size_t) {
+          met.emplace_back("given");
+          return Texts{"ours"};
+        },
+        error);
+  };
+  ASSERT_TRUE(AppendToQueue("s", {"one", "two"}, error)) << error;
+  ASSERT_EQ(append(), Appended::DONE);
+  ASSERT_EQ(append(), Appended::DONE);
+  ASSERT_TRUE(AppendToQueue("s", {"three"}, error)) << error;
+  ASSERT_EQ(append(), Appended::DONE);
+  EXPECT_EQ(met, Texts({"one", "two", "given", "given", "three", "given"}));
+  EXPECT_EQ(meeting.FileNumber(), 1U);
+
+  met.clear();
+  WriteFile(queue, ReadFile(queue) + "ha");
+  ASSERT_EQ(append(), Appended::DONE);
+  EXPECT_EQ(met, Texts({"given"}));
+  ASSERT_EQ(append(), Appended::DONE);
+  EXPECT_EQ(met, Texts({"given", "ha", "ours", "given"}));
+
+  met.clear();
+  ASSERT_EQ(unlink(queue.c_str()), 0);
+  ASSERT_TRUE(AppendToQueue("s", {"anew"}, error)) << error;
+  ASSERT_EQ(append(), Appended::DONE);
+  EXPECT_EQ(met, Texts({"anew", "given"}));
+  EXPECT_EQ(meeting.FileNumber(), 2U);
+}
+
+TEST_F(QueueAppenderTest, LinesOfAFullFileAreMetOnceThereIsRoom) {
+  Texts met;
+  QueueAppender meeting("s", [&met](std::string_view line) { met.emplace_back(line); });
+  const auto append = [&] { return meeting.Append([](size_t) { return Texts{"ours"}; }, error); };
+  ASSERT_TRUE(AppendToQueue("s", Texts(QUEUE_LINE_LIMIT, "x"), error)) << error;
+  EXPECT_EQ(append(), Appended::FULL);
+  EXPECT_TRUE(met.empty());
+
+  ASSERT_EQ(unlink(queue.c_str()), 0);
+  ASSERT_TRUE(AppendToQueue("s", {"anew"}, error)) << error;
+  EXPECT_EQ(append(), Appended::DONE);
+  EXPECT_EQ(met, Texts({"anew"}));
+}
+
 TEST_F(QueueAppenderTest, HalfALineIsEndedAndCounted) {
   ASSERT_EQ(Append({"one"}), Appended::DONE);
   WriteFile(queue, "one\nha");
