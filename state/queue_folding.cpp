@@ -109,7 +109,8 @@ void QueueFolding::AddAtRename(LineMap::iterator rename, uint32_t event, const s
     const QueueLine was{0, rename->first, {}, rename->second.path_old};
     Place(was.path, {event, data, {}});
     FoldUnlessTakenIn(was.path_old);
-  } else if (IsUpdateOfAll(event)) {
+  } else if (IsUpdateOfAll(event) || event == QLIB_NOTIFY_MODIFY) {
+    // A modify may be about what is gone, as a comparison found it: a rename passes over that.
     FoldInto(std::string(rename->first));
   }
 }

@@ -157,7 +157,9 @@ TEST_F(QueueFoldingTest, RenameIsOneLineWithBothPaths) {
   folding.Add(QLIB_NOTIFY_MODIFY, "/s/new");
   folding.AddRename("/s/new", "/s/old");
   folding.AddRename("/s/b", "/s/c");
-  folding.Add(QLIB_NOTIFY_MODIFY, "/s/new");
+  for (const uint32_t event : {QLIB_NOTIFY_ATTRIB, QLIB_NOTIFY_CREATE, QLIB_NOTIFY_CLOSE_WRITE}) {
+    folding.Add(event, "/s/new");
+  }
 
   EXPECT_EQ(Shown(folding, 100),
             Texts({"rename /s/c /s/b", "rename /s/old /s/new", "modify /s/b/x"}));
@@ -199,10 +201,13 @@ TEST_F(QueueFoldingTest, WhatARenameCannotSayWithItsLineIsAReindexOfItsFormerPat
   folding.Add(CUSTOM_EVENT_UPDATE, "/s/update", "{1}");
   folding.Add(CUSTOM_EVENT_UPDATE, "/s/updated", "{1}");
   folding.AddRename("/s/updated", "/s/5");
+  folding.AddRename("/s/modified", "/s/6");
+  folding.Add(QLIB_NOTIFY_MODIFY, "/s/modified");  // as it is gone, perhaps
 
   EXPECT_EQ(Shown(folding, 100),
-            Texts({"reindex /s/1", "reindex /s/2", "reindex /s/4", "reindex /s/5", "delete /s/gone",
-                   "rename /s/3 /s/twice", "reindex /s/update", "reindex /s/updated"}));
+            Texts({"reindex /s/1", "reindex /s/2", "reindex /s/4", "reindex /s/5", "reindex /s/6",
+                   "delete /s/gone", "reindex /s/modified", "rename /s/3 /s/twice",
+                   "reindex /s/update", "reindex /s/updated"}));
 }
 
 TEST_F(QueueFoldingTest, ALineFromALookNeverDisplacesAReindex) {
