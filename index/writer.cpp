@@ -160,6 +160,9 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
       return FromSqlite(code);
     }
     changes_begun = table->changes;
+    // What was seen before may be gone by now, and whoever compares awaits the end of what is being
+    // written, not of a Worker that is about to begin.
+    seen = nullptr;
   }
   // Single deletions are told of one by one, and believed. A refresh is refused as well: where
   // another folder stands in the root's place, it would look at all that was below.

@@ -37,7 +37,7 @@ class EntryWriter {
   // `wanted`: the flags in force for it. `decide`: for which kinds it is decided anew whether
   // content is wanted; an entry that is new has it decided in any case.
   // `seen`: what the caller saw there a moment ago, or null to look here. It has to be younger than
-  // whatever the operation tells of.
+  // whatever the operation tells of. The first operation after a commit looks in any case.
   bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide,
                const Seen* seen = nullptr);
   // Like Refresh with every kind decided, of what somebody wrote to: where only its change time is

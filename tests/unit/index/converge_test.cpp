@@ -40,6 +40,25 @@ TEST_P(ConvergeTest, UpdateAddsWhatIsMissingAndRefreshesWhatIsKnown) {
   EXPECT_EQ(Find("a").size, 6);
 }
 
+// A comparison in between would have found nobody to wait for.
+TEST_P(ConvergeTest, WhatWasSeenBeforeATransactionIsLookedAtInIt) {
+  AddAll();
+  std::shared_ptr<const Settings> settings;
+  ASSERT_TRUE(store->GetSettings(settings));
+  WriteFile(At("a"), "");
+  const Seen seen = {settings, LookAt(*settings, At("a"))};
+  ASSERT_EQ(unlink(At("a").c_str()), 0);
+
+  EXPECT_TRUE(writer->Add(At("a"), wanted, &seen));
+  ExpectClean();
+
+  WriteFile(At("b"), "");
+  Add("b");
+  EXPECT_TRUE(writer->Refresh(At("a"), wanted, {}, &seen));  // the transaction runs: it is believed
+  Commit();
+  EXPECT_EQ(Differences(), Names({"left-over a"}));
+}
+
 TEST_P(ConvergeTest, UpdateOfWhatIsGoneTakesAlongWhatLayBelow) {
   Folder("d/e", {"f", "g"});
   AddAll();
