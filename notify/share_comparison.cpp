@@ -5,7 +5,7 @@
 #include <ctime>
 
 #include "notify/log.h"
-#include "notify/sent_deletes.h"
+#include "notify/sent_lines.h"
 #include "state/queue_writer.h"
 
 namespace fileindexd {

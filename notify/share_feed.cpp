@@ -8,7 +8,7 @@
 
 #include "base/event_codes.h"
 #include "index/reader.h"
-#include "notify/sent_deletes.h"
+#include "notify/sent_lines.h"
 #include "state/queue_appender.h"
 #include "state/queue_writer.h"
 
@@ -34,7 +34,10 @@ QueueLine LookedAtAgain(const Settings& settings, const QueueLine& line) {
 }  // namespace
 
 struct ShareFeed::Impl {
-  explicit Impl(std::string name) : share(std::move(name)), gatherer(share), appender(share) {
+  explicit Impl(std::string name)
+      : share(std::move(name)),
+        gatherer(share),
+        appender(share, [this](std::string_view line) { Meet(line); }) {
     Clear();
   }
 
@@ -45,6 +48,8 @@ struct ShareFeed::Impl {
   void Queue(const Settings& settings, const std::vector<QueueLine>& lines);
   void QueueRootReindex(const std::string& root);
   void FoldCrowds(const Settings& settings);
+  void Meet(std::string_view text);
+  void ForgetTaken();
   std::vector<QueueLine> TakeLines(const Settings& settings, size_t most);
   void Write(const Settings& settings, Clock::time_point now, bool at_once, FeedCounts& counts);
   void CheckBounds();
@@ -53,8 +58,9 @@ struct ShareFeed::Impl {
   Gatherer gatherer;
   std::unique_ptr<QueueFolding> backlog;
   QueueAppender appender;
-  uint64_t file_number = 0;  // of the appender, that `deletes` is about
-  SentDeletes deletes;
+  uint64_t file_number = 0;  // of the appender, that `sent` is about
+  SentLines sent;            // or written by others, an earlier service among them
+  const LineReader line_reader;
   // The root, where its reindex waits before the backlog. Not that of the settings: they may know
   // no such share any more.
   std::optional<std::string> root_reindex;
@@ -134,12 +140,24 @@ void ShareFeed::Impl::FoldCrowds(const Settings& settings) {
   }
 }
 
-// As many lines from the backlog as fit, each with those that have to stand behind it.
-std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size_t most) {
+void ShareFeed::Impl::ForgetTaken() {
   if (appender.FileNumber() != file_number) {
     file_number = appender.FileNumber();
-    deletes.Forget();
+    sent.Forget();
   }
+}
+
+void ShareFeed::Impl::Meet(std::string_view text) {
+  ForgetTaken();
+  QueueLine line;
+  if (line_reader.Read(text, line)) {
+    sent.Note(line);
+  }
+}
+
+// As many lines from the backlog as fit, each with those that have to stand behind it.
+std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size_t most) {
+  ForgetTaken();
   if (root_reindex.has_value()) {
     if (most < QUEUE_LINE_LIMIT) {
       return {};  // the file holds lines, of whomever
@@ -155,7 +173,8 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
       // It may have waited for long.
       line = LookedAtAgain(settings, line);
     }
-    std::vector<QueueLine> returned = deletes.LinesBehind(settings, line);
+    line = sent.WithDisplaced(line);
+    std::vector<QueueLine> returned = sent.LinesBehind(settings, line);
     if (fitting + 1 + behind.size() + returned.size() > most) {
       break;
     }
@@ -199,7 +218,7 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
     root_reindex.reset();
     counts.lines += taken.size();
     for (const QueueLine& line : taken) {
-      deletes.Note(line);
+      sent.Note(line);
     }
     error.clear();
   } else if (result == Appended::FAILED) {

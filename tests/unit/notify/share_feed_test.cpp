@@ -201,6 +201,51 @@ TEST_F(ShareFeedTest, LinesOfOthersNeedNoLook) {
                             EventLine(QLIB_NOTIFY_RENAME, Path("x"), Path("y"))}));
 }
 
+TEST_F(ShareFeedTest, AnUpdateOfWhatWasRenamedHasItWalkedUntilTheQueueIsTaken) {
+  MakeDirectory("attributes");
+  for (const char* name : {"attributes", "modified", "written", "twice"}) {
+    feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path(name), {}, Path("from")}});
+  }
+  Work();
+  const Texts renames = Queue();
+  ASSERT_EQ(renames.size(), 4U);
+  Make("written");
+  Add(Directory(ATTRIBUTES, "attributes"));
+  Add(File(WRITTEN, "written"));
+  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("modified"), {}},
+                           {QLIB_NOTIFY_RENAME, Path("twice"), {}, Path("elsewhere")},
+                           {QLIB_NOTIFY_ATTRIB, Path("other"), {}}});
+  Work();
+  Texts all = renames;
+  all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "attributes"),
+                         Line(CUSTOM_EVENT_REINDEX, "modified"), Line(QLIB_NOTIFY_ATTRIB, "other"),
+                         EventLine(QLIB_NOTIFY_RENAME, Path("twice"), Path("elsewhere")),
+                         Line(QLIB_NOTIFY_CLOSE_WRITE, "written")});
+  EXPECT_EQ(Queue(), all);
+
+  TakeQueue();
+  Add(Directory(ATTRIBUTES, "attributes"));
+  Work();
+  EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_ATTRIB, "attributes")}));
+}
+
+// As one that was stopped meanwhile has left it.
+TEST_F(ShareFeedTest, ADeleteOfAnotherWriterThatWaitsIsLookedAtAgainBehindAReindexAboveIt) {
+  MakeDirectory("d/again");
+  const Texts others = {Line(QLIB_NOTIFY_DELETE, "d/again"), Line(QLIB_NOTIFY_DELETE, "d/gone"),
+                        "no event", EventLine(QLIB_NOTIFY_RENAME, Path("to"), Path("from"))};
+  std::string error;
+  ASSERT_TRUE(AppendToQueue("s", others, error)) << error;
+  feed.AddLines(settings,
+                {{CUSTOM_EVENT_REINDEX, Path("d"), {}}, {QLIB_NOTIFY_MODIFY, Path("to"), {}}});
+  Work();
+
+  Texts all = others;
+  all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "d"), Line(CUSTOM_EVENT_REINDEX, "to"),
+                         Line(CUSTOM_EVENT_REINDEX, "d/again")});
+  EXPECT_EQ(Queue(), all);
+}
+
 TEST_F(ShareFeedTest, ACrowdBecomesOneReindexIfTheIndexHoldsFew) {
   MakeDirectory("crowd");
   Make("crowd/0");
