@@ -9,6 +9,7 @@ import time
 
 from harness import IndexTest, namespace
 from harness.awaiting import LIMIT
+from harness.pages import try_to_copy_log_back
 from harness.standing_in import remove
 
 CREATE = 0x40
@@ -66,16 +67,34 @@ class StateDamageTest(IndexTest):
         self.assertEqual(len(self.told(USED, after)), 1)
         self.check_works()
 
+    @contextlib.contextmanager
+    def stopped(self, *pids):
+        """While the block runs, with all their threads."""
+        try:
+            for pid in pids:
+                os.kill(pid, signal.SIGSTOP)
+            deadline = time.monotonic() + LIMIT
+            while not all(state.startswith("T") for pid in pids for state in thread_states(pid)):
+                self.assertLess(time.monotonic(), deadline)
+                os.sched_yield()
+            yield
+        finally:
+            for pid in pids:
+                os.kill(pid, signal.SIGCONT)
+
     def at_once(self, damage):
         """In one step, to the content service: it opens the database when it likes."""
-        service = self.service_pid()
-        os.kill(service, signal.SIGSTOP)
-        deadline = time.monotonic() + LIMIT
-        while not all(state.startswith("T") for state in thread_states(service)):
-            self.assertLess(time.monotonic(), deadline)
-            os.sched_yield()
-        damage()
-        os.kill(service, signal.SIGCONT)
+        with self.stopped(self.service_pid()):
+            damage()
+
+    def in_place(self, damage):
+        """To the file that the programs have open and have to read again, as its log is in it."""
+        done = False
+        while not done:
+            with self.stopped(self.pid, self.service_pid()):
+                done = try_to_copy_log_back(FILE)  # one was stopped as it used it
+                if done:
+                    damage()
 
     def damaged_while_running(self, damage):
         self.prepare()

@@ -17,7 +17,7 @@ from damaged_state import (
     truncate,
 )
 from harness import main, namespace
-from harness.pages import copy_log_back, scribble
+from harness.pages import scribble
 from harness.standing_in import make_full_folder, remove, replace
 
 NEWER = re.compile(r".*state\.db has version 99, made by a newer program; .*")
@@ -105,9 +105,8 @@ class StateTest(StateDamageTest):
 
     def damaged_in_place(self, damage):
         self.prepare()
-        copy_log_back(FILE)
         after = self.log.mark()
-        damage()
+        self.in_place(damage)
 
         # No tool comes to its help.
         self.append("alpha", {"event": REINDEX, "path": self.root})
@@ -202,10 +201,8 @@ class StateTest(StateDamageTest):
 
     def test_both_damaged_while_running_is_told_once(self):
         self.prepare()
-        copy_log_back(FILE)
         after = self.log.mark()
-        scribble(COPY)
-        scribble(FILE)
+        self.in_place(lambda: (scribble(COPY), scribble(FILE)))
 
         for _ in range(2):
             ended = self.log.mark()

@@ -8,12 +8,17 @@ PAGE = 4096
 LEAVES = (10, 13)  # of an index, and of a table
 
 
-def copy_log_back(path):
+def try_to_copy_log_back(path):
     """So that the main file alone holds it all, for those too who have it open."""
     with sqlite3.connect(path) as db:
-        while db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] != 0:
-            pass  # a reader was in the way
+        done = db.execute("PRAGMA wal_checkpoint(TRUNCATE)").fetchone()[0] == 0
     db.close()
+    return done
+
+
+def copy_log_back(path):
+    while not try_to_copy_log_back(path):
+        pass  # a reader was in the way
 
 
 def scribble(path, start=0, end=None):
