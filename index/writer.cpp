@@ -96,6 +96,11 @@ IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& opera
   }
   operation.path = std::move(*normal);
 
+  // What was seen before a transaction began may be gone by now, and whoever compares awaits the end
+  // of what is being written, not of a Worker that is about to begin.
+  if (!database.IsOpen() || sqlite3_get_autocommit(database.db) != 0) {
+    seen = nullptr;
+  }
   IndexError error = EnsureOpen(false);
   if (error == IndexError::NONE) {
     error = EnsureApplied(false);
@@ -160,9 +165,6 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
       return FromSqlite(code);
     }
     changes_begun = table->changes;
-    // What was seen before may be gone by now, and whoever compares awaits the end of what is being
-    // written, not of a Worker that is about to begin.
-    seen = nullptr;
   }
   // Single deletions are told of one by one, and believed. A refresh is refused as well: where
   // another folder stands in the root's place, it would look at all that was below.

@@ -43,10 +43,10 @@ TEST_P(ConvergeTest, UpdateAddsWhatIsMissingAndRefreshesWhatIsKnown) {
 // A comparison in between would have found nobody to wait for.
 TEST_P(ConvergeTest, WhatWasSeenBeforeATransactionIsLookedAtInIt) {
   AddAll();
-  std::shared_ptr<const Settings> settings;
-  ASSERT_TRUE(store->GetSettings(settings));
+  std::shared_ptr<const Settings> in_force;
+  ASSERT_TRUE(store->GetSettings(in_force));
   WriteFile(At("a"), "");
-  const Seen seen = {settings, LookAt(*settings, At("a"))};
+  const Seen seen = {in_force, LookAt(*in_force, At("a"))};
   ASSERT_EQ(unlink(At("a").c_str()), 0);
 
   EXPECT_TRUE(writer->Add(At("a"), wanted, &seen));
