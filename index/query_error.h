@@ -10,6 +10,10 @@ namespace fileindexd {
 struct QueryError {
   std::string what;
   size_t at = 0;  // byte of the question
+  // How it could have been written; empty: nobody knows. ParseQuery puts it into `what` at that
+  // byte, if it is no mistake itself.
+  std::string example = {};
+  size_t example_at = 0;
 
   // One line: the question, or of a long one a piece around the place; what, and where. Control
   // characters are shown in digits. `question` is valid UTF-8.

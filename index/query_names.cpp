@@ -91,14 +91,14 @@ bool BeginsAsWord(const Value& value, const std::string& field, QueryError& erro
       std::string_view("-<>=").find(sign) == std::string_view::npos) {
     return true;
   }
-  std::string why = field + ": compares nothing";
+  error = {field + ": compares nothing", value.at};
   if (sign == '-') {
-    const std::string left_out = value.text.substr(value.text.find_first_not_of("-<>="));
-    why = "a '-' that leaves out stands in front of the field";
-    why += left_out.find('"') == std::string::npos ? ", as in -" + field + ":" + Shortened(left_out)
-                                                   : "";
+    error.what = "a '-' that leaves out stands in front of the field";
+    error.example = "-" + field + ":" + value.text.substr(value.text.find_first_not_of("-<>="));
+    error.example_at = error.what.size();
   }
-  return Fail(error, why + " (a value that begins with " + sign + " stands in quotes)", value.at);
+  error.what += std::string(" (a value that begins with ") + sign + " stands in quotes)";
+  return false;
 }
 
 // In quotes a star says nothing, nor is it part of any word.

@@ -73,6 +73,18 @@ class Parser {
   size_t leaves = 0;
 };
 
+void ShowExample(time_t now, QueryError& error) {
+  if (error.example.empty()) {
+    return;
+  }
+  QueryError wrong;
+  QueryNode ignored;
+  const std::string asked = "a " + error.example;  // alone, what leaves out is refused
+  if (Parser(asked, now, wrong).Run(ignored)) {
+    error.what.insert(error.example_at, ", as in " + Shortened(error.example));
+  }
+}
+
 bool Parser::Fail(const std::string& what, size_t where) {
   error = {what, where};
   return false;
@@ -283,9 +295,11 @@ bool Parser::ReadLeaf(QueryNode& node, int depth) {
     return Fail("too many words", start);
   }
   if (field == nullptr) {
-    const std::string why = WhyMeantOtherwise(std::string_view(text).substr(start));
-    if (!why.empty()) {
-      return Fail(why, start);
+    QueryError slip = MeantOtherwise(std::string_view(text).substr(start));
+    if (!slip.what.empty()) {
+      slip.at = start;
+      error = std::move(slip);
+      return false;
     }
   }
   node.start = start;
@@ -318,7 +332,11 @@ bool IsPositive(const QueryNode& node) {
 }
 
 bool ParseQuery(const std::string& text, time_t now, QueryNode& query, QueryError& error) {
-  return Parser(text, now, error).Run(query);
+  if (Parser(text, now, error).Run(query)) {
+    return true;
+  }
+  ShowExample(now, error);
+  return false;
 }
 
 }  // namespace fileindexd

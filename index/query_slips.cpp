@@ -5,7 +5,6 @@
 
 #include "index/letter_case.h"
 #include "index/query.h"
-#include "index/query_error.h"
 #include "index/query_fields.h"
 #include "index/query_names.h"
 #include "index/query_piece.h"
@@ -14,18 +13,14 @@ namespace fileindexd {
 
 namespace {
 
-// What was compared with: a quoted text, or up to a blank or a bracket. Empty where that would not
-// do as a value either.
-std::string ValueAt(const NamedField& field, std::string_view text) {
+// What was compared with: a quoted text, or up to a blank or a bracket.
+std::string ValueAt(std::string_view text) {
   if (text.starts_with('"')) {
-    const std::string quoted(text.substr(0, text.find('"', 1)));
-    return HoldsWords(quoted) ? quoted + '"' : "";
+    return std::string(text.substr(0, text.find('"', 1))) + '"';
   }
-  std::string_view value = text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
-  value = value.substr(0, value.find_last_not_of("<>=") + 1);   // "from <bob@home>"
-  const bool is_ago = IsTime(field) && value.starts_with('-');  // "modified > -7d"
-  const bool has_sign = !is_ago && value.find_first_of("-<>=:") == 0;
-  return HoldsWords(value) && !has_sign ? std::string(value) : "";
+  const std::string_view value =
+      text.substr(0, std::min(NextBlank(text, 0), text.find_first_of("()")));
+  return std::string(value.substr(0, value.find_last_not_of("<>=") + 1));  // "from <bob@home>"
 }
 
 // ":)", ":-(". What ":(" begins may be what is meant for a field.
@@ -48,8 +43,7 @@ size_t SignAt(std::string_view text, size_t at, bool is_apart) {
 }
 
 // As it should have been written: "size:>10M".
-std::string WrittenForm(const NamedField& field, std::string_view compared,
-                        std::string_view value) {
+std::string WrittenForm(const NamedField& field, std::string_view compared, std::string_view text) {
   std::string form = compared == "!=" ? "-" : "";
   form.append(field.name).append(":");
   if (TakesRange(field.field)) {
@@ -58,29 +52,29 @@ std::string WrittenForm(const NamedField& field, std::string_view compared,
     form += is_compared ? std::string(1, compared[sign]) : "";
     form += is_compared && compared.find('=') != std::string_view::npos ? "=" : "";
   }
-  return form + Shortened(value);
+  return form + ValueAt(text);
 }
 
 // "size>10M", "size > 10M", "text : whale".
-std::string WhyColonIsMissing(std::string_view text) {
+QueryError ColonIsMissing(std::string_view text) {
   const size_t letters = LettersAtStart(text);
   const size_t start = SkipBlanksAt(text, letters);
   const bool is_apart = start > letters;
   const size_t size = letters > 0 && start < text.size() ? SignAt(text, start, is_apart) : 0;
   const NamedField* field = size > 0 ? FindField(text.substr(0, letters)) : nullptr;
   if (field == nullptr) {
-    return "";
+    return {};
   }
-  const size_t value_at = SkipBlanksAt(text, start + size);
   const std::string_view compared = text.substr(start, size);
-  const std::string value = ValueAt(*field, text.substr(value_at));
-  const std::string example =
-      value.empty() ? "" : ", as in " + WrittenForm(*field, compared, value);
   const std::string name = Cited(text.substr(0, letters));
-  return is_apart ? "behind the field " + name + " stands a colon and no blank" + example +
-                        " (as a word it stands in quotes)"
-                  : "a colon is missing behind " + name + example + " (a word with " +
-                        compared.front() + " stands in quotes)";
+  QueryError error;
+  error.what = is_apart ? "behind the field " + name + " stands a colon and no blank"
+                        : "a colon is missing behind " + name;
+  error.example = WrittenForm(*field, compared, text.substr(SkipBlanksAt(text, start + size)));
+  error.example_at = error.what.size();
+  error.what += is_apart ? " (as a word it stands in quotes)"
+                         : std::string(" (a word with ") + compared.front() + " stands in quotes)";
+  return error;
 }
 
 // "sise:10M", "foo:>3".
@@ -116,10 +110,15 @@ std::string WhyLeftOutTwice(std::string_view text) {
 
 }  // namespace
 
-std::string WhyMeantOtherwise(std::string_view text) {
-  std::string why = WhyColonIsMissing(text);
-  why = why.empty() ? WhyNoField(text) : why;
-  return why.empty() ? WhyLeftOutTwice(text) : why;
+QueryError MeantOtherwise(std::string_view text) {
+  QueryError error = ColonIsMissing(text);
+  if (error.what.empty()) {
+    error.what = WhyNoField(text);
+  }
+  if (error.what.empty()) {
+    error.what = WhyLeftOutTwice(text);
+  }
+  return error;
 }
 
 // Between two others, "not" in front of one at least. What an option says was not written there.

@@ -153,7 +153,9 @@ TEST_F(QuerySlipsTest, BlanksDoNotPartAFieldFromItsColonOrComparison) {
 
 TEST_F(QuerySlipsTest, NoExampleIsGivenThatWouldBeRefusedItself) {
   for (const char* text :
-       {"size=", "size = -5", "title=\"\"", "title=\"", "text : :", "title < -moby", "size > ("}) {
+       {"size=", "size = -5", "title=\"\"", "title=\"", "text : :", "title < -moby", "size > (",
+        "size > abc", "size = \"10 M\"", "kind = foo", "from <a*b>", "under = srv", "year : x,y",
+        "title:-(a b)", "title:-moby*x", "name:-a/b", "ext:-*.pdf"}) {
     const std::string what = ErrorOf(text).what;
     EXPECT_EQ(what.find("as in"), std::string::npos) << what;
     EXPECT_NE(what.find("in quotes"), std::string::npos) << text << ": " << what;
