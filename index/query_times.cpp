@@ -13,6 +13,7 @@ namespace fileindexd {
 namespace {
 
 constexpr std::string_view UNITS = "smhdwy";
+constexpr int64_t MINUTE = 60;
 constexpr int64_t LONGEST = int64_t{100000} * 24 * 60 * 60;  // safe to calculate with
 
 // Exactly `count` digits, and not one of what else a library takes for a number.
@@ -39,13 +40,42 @@ bool Take(std::string_view& text, char c) {
   return true;
 }
 
-// A day that does not exist, as February 30, comes out as another one.
-bool ToSeconds(tm broken, bool utc, int64_t& seconds) {
-  const tm given = broken;
-  broken.tm_isdst = -1;
-  seconds = utc ? timegm(&broken) : mktime(&broken);
-  return broken.tm_year == given.tm_year && broken.tm_mon == given.tm_mon &&
-         broken.tm_mday == given.tm_mday;
+// February 30 comes out as another day.
+bool IsDay(const tm& given) {
+  tm broken = given;
+  (void)timegm(&broken);
+  return broken.tm_mon == given.tm_mon && broken.tm_mday == given.tm_mday;
+}
+
+bool ShowsSame(const tm& a, const tm& b) {
+  return a.tm_mday == b.tm_mday && a.tm_hour == b.tm_hour && a.tm_min == b.tm_min;
+}
+
+// When the clock shows that time: where it is put back these are two moments, and where it is put
+// forward, and never shows it, one as if it had not been.
+struct Moments {
+  int64_t first = INT64_MAX;
+  int64_t last = INT64_MIN;
+};
+
+// What is beyond its range, as the day after a month's last, goes on in the next.
+Moments MomentsOf(tm shown, bool utc) {
+  const int64_t in_utc = timegm(&shown);
+  if (utc) {
+    return {in_utc, in_utc};
+  }
+  Moments moments;
+  int64_t winter = 0;
+  for (const int is_summer : {1, 0}) {
+    tm broken = shown;
+    broken.tm_isdst = is_summer;
+    winter = mktime(&broken);
+    if (ShowsSame(broken, shown)) {
+      moments.first = std::min(moments.first, winter);
+      moments.last = std::max(moments.last, winter);
+    }
+  }
+  return moments.first <= moments.last ? moments : Moments{winter, winter};
 }
 
 tm Broken(time_t time, bool utc) {
@@ -59,32 +89,14 @@ tm Broken(time_t time, bool utc) {
 }
 
 // A day is as long as the clock says, also where it is put forward or back.
-std::optional<TimeSpan> Day(tm broken, int days, bool utc) {
+TimeSpan Day(const tm& broken, int days, bool utc) {
   tm start{};
   start.tm_year = broken.tm_year;
   start.tm_mon = broken.tm_mon;
   start.tm_mday = broken.tm_mday + days;
   tm end = start;
   end.tm_mday += 1;
-  start.tm_isdst = end.tm_isdst = -1;
-  const int64_t first = utc ? timegm(&start) : mktime(&start);
-  const int64_t next = utc ? timegm(&end) : mktime(&end);
-  return TimeSpan{first, next - 1, false};
-}
-
-// The hour that comes twice, when the clock is put back, is all that it shows so.
-void SpanBothHours(const tm& shown, TimeSpan& span) {
-  constexpr int64_t MINUTE = 60;
-  for (const int is_summer : {0, 1}) {
-    tm broken = shown;
-    broken.tm_isdst = is_summer;
-    const int64_t first = mktime(&broken);
-    if (broken.tm_isdst == is_summer && broken.tm_hour == shown.tm_hour &&
-        broken.tm_min == shown.tm_min) {
-      span.first = std::min(span.first, first);
-      span.last = std::max(span.last, first + MINUTE - 1);
-    }
-  }
+  return TimeSpan{MomentsOf(start, utc).first, MomentsOf(end, utc).first - 1, false};
 }
 
 // "2024", "2024-01", "2024-01-05", "2024-01-05T12:30".
@@ -120,18 +132,13 @@ std::optional<TimeSpan> Calendar(std::string_view text, bool utc) {
   start.tm_hour = hour;
   start.tm_min = minute;
   tm end = start;
-  (has_time ? end.tm_min : has_day ? end.tm_mday : has_month ? end.tm_mon : end.tm_year) += 1;
-  TimeSpan span;
-  if (!ToSeconds(start, utc, span.first)) {
+  (has_day ? end.tm_mday : has_month ? end.tm_mon : end.tm_year) += 1;
+  if (!IsDay(start)) {
     return std::nullopt;
   }
-  end.tm_isdst = -1;
-  const int64_t next = utc ? timegm(&end) : mktime(&end);
-  span.last = next - 1;
-  if (has_time && !utc) {
-    SpanBothHours(start, span);
-  }
-  return span;
+  const Moments moments = MomentsOf(start, utc);
+  const int64_t last = has_time ? moments.last + MINUTE - 1 : MomentsOf(end, utc).first - 1;
+  return TimeSpan{moments.first, last, false};
 }
 
 }  // namespace

@@ -304,6 +304,15 @@ TEST_F(QueryParseTest, TimesAreThoseOfTheZone) {
   EXPECT_EQ(Parsed("sent:2024-10-27T03:00"), "sent[1729994400..1729994459]");
   EXPECT_EQ(Parsed("sent:2024-06-01T12:00"), "sent[1717236000..1717236059]");
   EXPECT_EQ(Parsed("taken:2024-01-05"), "taken[1704412800..1704499199]") << "a clock without zone";
+
+  Zone("America/Havana");  // the clock is put forward and back at midnight
+  for (const char* before : {"sent:2024-06-01", "sent:2024-12-01"}) {
+    (void)Parsed(before);
+    EXPECT_EQ(Parsed("sent:2024-11-02"), "sent[1730520000..1730606399]") << before;
+    EXPECT_EQ(Parsed("sent:2024-11-03"), "sent[1730606400..1730696399]") << before;
+    EXPECT_EQ(Parsed("sent:2024-03-10"), "sent[1710046800..1710129599]") << before;
+    EXPECT_EQ(Parsed("sent:2024-03-10T00:30"), "sent[1710048600..1710048659]") << before;
+  }
 }
 
 }  // namespace fileindexd
