@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-// What waits in a share's queue for a path.
+// What is on the way to a share's index: what waits in its queue for a path, and whether something
+// makes an index that is not there.
 #pragma once
 
 #include <cstdint>

@@ -76,14 +76,19 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
     if (!arguments.in_share || share.name == *arguments.in_share) {
       question.shares.push_back(share.name);
       question.roots.emplace(share.name, share.path);
-      if (EntryReader::IsMissing(share.name) &&
-          IsIndexExpected(*session.store, *session.settings, share.name)) {
-        question.lost.push_back(share.name);
-      }
     }
     question.known.push_back(share.name);
   }
   return true;
+}
+
+void FindLost(const Session& session, Question& question) {
+  for (const std::string& share : question.shares) {
+    if (EntryReader::IsMissing(share) &&
+        IsIndexExpected(*session.store, *session.settings, share)) {
+      question.lost.push_back(share);
+    }
+  }
 }
 
 bool ReadSeconds(const Arguments& arguments, std::chrono::seconds& patience) {
@@ -195,6 +200,7 @@ int Search(const Arguments& arguments) {
     }
   }
 
+  FindLost(session, question);
   Answer answer;
   if (!Ask(question, answer, error)) {
     return Refuse(question, error);

@@ -99,8 +99,8 @@ const DatabaseForm CONTENTS_FORM = {
     .probed = "meta WHERE id = 1",
     .last_commit = nullptr,  // a text that is missing is read again
     .prepare = RegisterTextTokenizer,
-    // Merging writes the same pages again and again: in a long log most are copied back once. No
-    // longer, as whoever opens the database alone reads the whole log first.
+    // Merging writes the same pages again and again: in a long log most are copied back once. The
+    // log is no longer than that, as whoever opens the database alone reads the whole of it first.
     .most_log_frames = 3 * LEAST_LOG_FRAMES,
 };
 

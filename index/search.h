@@ -25,8 +25,8 @@ struct Question {
   std::optional<Kind> kind;
   std::string under;                // normal path, or empty: everywhere
   std::vector<std::string> shares;  // names to ask; one without an index folder yet holds nothing
-  std::vector<std::string>
-      lost;  // of those, whose index would have to be there: without it they fail
+  // Of those, the ones whose index would have to be there: without it they fail.
+  std::vector<std::string> lost;
   // Their folders, by name: a folder there may be asked for, though no index knows it yet.
   std::map<std::string, std::string> roots;
   std::vector<std::string> known;  // names that the text may say as well, though they are not asked
