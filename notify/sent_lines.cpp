@@ -23,8 +23,8 @@ bool LineReader::Read(std::string_view text, QueueLine& line) const {
   try {
     Json::Value value;
     if (!reader->parse(text.data(), text.data() + text.size(), &value, nullptr) ||
-        !value.isObject() || !value["event"].isConvertibleTo(Json::uintValue) ||
-        !value["path"].isString()) {
+        !value.isObject() || !value.isMember("event") ||
+        !value["event"].isConvertibleTo(Json::uintValue) || !value["path"].isString()) {
       return false;
     }
     auto path = NormalPath(value["path"].asString());
@@ -45,7 +45,9 @@ void SentLines::Forget() {
 
 void SentLines::Note(const QueueLine& line) {
   deleted.erase(line.path);
-  renamed.erase(line.path);
+  if (!IsLook(line.event)) {
+    renamed.erase(line.path);
+  }
   if ((line.event & QLIB_NOTIFY_RENAME) != 0) {
     renamed.insert(line.path);
   } else if ((line.event & QLIB_NOTIFY_DELETE) != 0) {

@@ -14,6 +14,7 @@
 #include "state/queue_file.h"
 #include "state/queue_files.h"
 #include "state/queue_folding.h"
+#include "state/statx_look.h"
 
 namespace fileindexd {
 
@@ -33,7 +34,7 @@ bool QueueAppender::Identify(int directory, const char* path, int flags, Counted
   file.inode = seen.stx_ino;
   file.size = static_cast<off_t>(seen.stx_size);
   if ((seen.stx_mask & STATX_BTIME) != 0) {
-    file.birth_time = seen.stx_btime.tv_sec * 1'000'000'000 + seen.stx_btime.tv_nsec;
+    file.birth_time = Nanoseconds(seen.stx_btime);
   }
   return true;
 }
@@ -110,7 +111,8 @@ Appended QueueAppender::Append(const Give& give, std::string& error) {
   // the lines are counted the next time.
   struct stat written {};
   if (fstat(queue.fd, &written) == 0) {
-    counted.met = counted.open_end ? counted.met : written.st_size;
+    const bool all_met = !meet || counted.met == counted.size;
+    counted.met = all_met ? written.st_size : counted.met;
     counted.size = written.st_size;
     counted.lines += lines.size();
     counted.open_end = false;

@@ -29,7 +29,8 @@ enum class Appended {
 class QueueAppender {
  public:
   // Called with each line that another program has written into the file that lines are about to be
-  // given to, once, in their order. (One of ours may be among them behind another's half line.)
+  // given to, once, in their order. (Ours may be among them behind a half line, or after a failure
+  // to read.)
   using Meet = std::function<void(std::string_view line)>;
 
   explicit QueueAppender(std::string name_of_share, Meet meet_line = {})

@@ -232,8 +232,12 @@ TEST_F(ShareFeedTest, AnUpdateOfWhatWasRenamedHasItWalkedUntilTheQueueIsTaken) {
 // As one that was stopped meanwhile has left it.
 TEST_F(ShareFeedTest, ADeleteOfAnotherWriterThatWaitsIsLookedAtAgainBehindAReindexAboveIt) {
   MakeDirectory("d/again");
-  const Texts others = {Line(QLIB_NOTIFY_DELETE, "d/again"), Line(QLIB_NOTIFY_DELETE, "d/gone"),
-                        "no event", EventLine(QLIB_NOTIFY_RENAME, Path("to"), Path("from"))};
+  const Texts others = {Line(QLIB_NOTIFY_DELETE, "d/again"),
+                        Line(QLIB_NOTIFY_DELETE, "d/gone"),
+                        "no event",
+                        EventLine(QLIB_NOTIFY_RENAME, Path("to"), Path("from")),
+                        Line(QLIB_NOTIFY_ATTRIB, "to"),
+                        "{\"path\":\"" + Path("d/again") + "\"}"};
   std::string error;
   ASSERT_TRUE(AppendToQueue("s", others, error)) << error;
   feed.AddLines(settings,
