@@ -1,16 +1,13 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """What is done to a state database, and what has to become of it."""
 
-import contextlib
 import os
 import re
-import signal
-import time
 
 from harness import IndexTest, namespace
-from harness.awaiting import LIMIT
 from harness.pages import try_to_copy_log_back
 from harness.standing_in import remove
+from harness.stopped import stopped
 
 CREATE = 0x40
 FILE = f"{namespace.STATE}/state.db"
@@ -25,13 +22,6 @@ def remove_all_of(path):
 
 def truncate(part):
     os.truncate(FILE, int(os.path.getsize(FILE) * part))
-
-
-def thread_states(pid):
-    for thread in os.listdir(f"/proc/{pid}/task"):
-        with contextlib.suppress(OSError):  # a thread that has ended meanwhile
-            with open(f"/proc/{pid}/task/{thread}/stat", encoding="utf-8") as file:
-                yield file.read().rpartition(") ")[2]
 
 
 class StateDamageTest(IndexTest):
@@ -67,31 +57,16 @@ class StateDamageTest(IndexTest):
         self.assertEqual(len(self.told(USED, after)), 1)
         self.check_works()
 
-    @contextlib.contextmanager
-    def stopped(self, *pids):
-        """While the block runs, with all their threads."""
-        try:
-            for pid in pids:
-                os.kill(pid, signal.SIGSTOP)
-            deadline = time.monotonic() + LIMIT
-            while not all(state.startswith("T") for pid in pids for state in thread_states(pid)):
-                self.assertLess(time.monotonic(), deadline)
-                os.sched_yield()
-            yield
-        finally:
-            for pid in pids:
-                os.kill(pid, signal.SIGCONT)
-
     def at_once(self, damage):
         """In one step, to the content service: it opens the database when it likes."""
-        with self.stopped(self.service_pid()):
+        with stopped(self.service_pid()):
             damage()
 
     def in_place(self, damage):
         """To the file that the programs have open and have to read again, as its log is in it."""
         done = False
         while not done:
-            with self.stopped(self.pid, self.service_pid()):
+            with stopped(self.pid, self.service_pid()):
                 done = try_to_copy_log_back(FILE)  # one was stopped as it used it
                 if done:
                     damage()

@@ -79,7 +79,9 @@ def await_in_folder(path, condition, limit=LIMIT, mask=IN_ANY):
         try:
             watch = FolderWatch(folder, mask=mask)
         except FileNotFoundError:
-            continue  # it has gone meanwhile
+            if time.monotonic() < deadline:
+                continue  # it has gone meanwhile
+            raise
         with watch:
             while folder == _deepest_folder(os.path.dirname(path)):
                 if condition():

@@ -29,6 +29,16 @@ def ask_notifier(**request):
     return json.loads(received)
 
 
+def raise_more_events_than_are_kept(folder):
+    """For a service that watches by fanotify and is stopped: the last are lost."""
+    with open("/proc/sys/fs/fanotify/max_queued_events", encoding="ascii") as kept:
+        number = int(kept.read()) + 600
+    # Each event has a name of its own, or they would become one.
+    os.mknod(f"{folder}/0", 0o600)
+    for i in range(number):
+        os.rename(f"{folder}/{i}", f"{folder}/{i + 1}")
+
+
 class WatchedTest(IndexTest):
     """Programs change files, the service tells the daemon, and the index follows."""
 

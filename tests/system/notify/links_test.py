@@ -2,10 +2,10 @@
 """Files with several hard links that change by a name of which nobody tells their index."""
 
 import os
-import signal
 
 from harness import main
 from harness.awaiting import await_in_folder
+from harness.stopped import stopped
 from harness.watched_disks import WatchedDiskTest
 
 
@@ -42,7 +42,7 @@ class LinkedFiles(WatchedDiskTest):
 
     def held_back(self):
         """The service reads what happens in the block when all of it has happened."""
-        return HeldBack(self.notifier)
+        return stopped(self.notifier.pid)
 
     def assert_followed(self):
         self.assert_converged(self.root, left_out=self.excluded(self.root))
@@ -166,17 +166,6 @@ class LinkedFiles(WatchedDiskTest):
 
 class LinkedFilesOnBtrfs(LinkedFiles):
     kind = "btrfs"
-
-
-class HeldBack:
-    def __init__(self, process):
-        self.process = process
-
-    def __enter__(self):
-        self.process.send_signal(signal.SIGSTOP)
-
-    def __exit__(self, *ignored):
-        self.process.send_signal(signal.SIGCONT)
 
 
 del WatchedDiskTest

@@ -4,30 +4,13 @@
 import fcntl
 import os
 import shutil
-import signal
 import time
 
 from harness import main, namespace
 from harness.awaiting import LIMIT, await_in_folder
+from harness.stopped import stopped
 from harness.watched_disks import WatchedDiskTest
-from harness.watching import ask_notifier
-
-with open("/proc/sys/fs/fanotify/max_queued_events", encoding="ascii") as limit:
-    MORE_THAN_KEPT = int(limit.read()) + 600
-
-
-class Stopped:
-    """A process that does nothing in the block."""
-
-    def __init__(self, pid):
-        self.pid = pid
-
-    def __enter__(self):
-        os.kill(self.pid, signal.SIGSTOP)
-
-    def __exit__(self, *ignored):
-        os.kill(self.pid, signal.SIGCONT)
-
+from harness.watching import ask_notifier, raise_more_events_than_are_kept
 
 class WaitingLines(WatchedDiskTest):
     kind = "ext4"
@@ -52,7 +35,7 @@ class WaitingLines(WatchedDiskTest):
     def test_a_renamed_folder_that_is_changed_before_it_was_indexed(self):
         self.begin_with("q/deep/x.txt")
 
-        with Stopped(self.daemon_pid()):
+        with stopped(self.daemon_pid()):
             os.rename(self.at("q"), self.at("p"))
             self.await_written()
             os.chmod(self.at("p"), 0o700)
@@ -63,16 +46,16 @@ class WaitingLines(WatchedDiskTest):
     def test_deletes_that_an_earlier_service_queued_and_that_came_back_with_their_folder(self):
         self.begin_with("d/a.txt", "z.txt")
 
-        with Stopped(self.daemon_pid()):
+        with stopped(self.daemon_pid()):
             os.unlink(self.at("z.txt"))
-            with Stopped(self.notifier.pid):
+            with stopped(self.notifier.pid):
                 self.make_files(self.root, "d/x.txt")
                 os.unlink(self.at("d/x.txt"))
             self.await_written()
             self.stop_notifier()
             self.start_notifier()
             self.await_written()
-            with Stopped(self.notifier.pid):
+            with stopped(self.notifier.pid):
                 shutil.rmtree(self.at("d"))
                 self.make_files(self.root, "d/x.txt")
             self.await_written()
@@ -86,10 +69,8 @@ class WaitingLines(WatchedDiskTest):
             fcntl.flock(queue, fcntl.LOCK_EX)
             os.rename(self.at("q.txt"), self.at("p.txt"))
             self.await_backlog(1)
-            with Stopped(self.notifier.pid):
-                os.mknod(f"{self.elsewhere}/0", 0o600)
-                for number in range(MORE_THAN_KEPT):  # each with a name of its own
-                    os.rename(f"{self.elsewhere}/{number}", f"{self.elsewhere}/{number + 1}")
+            with stopped(self.notifier.pid):
+                raise_more_events_than_are_kept(self.elsewhere)
                 os.unlink(self.at("p.txt"))
             self.await_backlog(2)
             self.assertGreater(self.watched()["overflows"], 0)
