@@ -29,6 +29,10 @@ constexpr uint64_t CROWD_SHARE = 10;  // entries looked at for each line that is
 bool IsReindex(uint32_t event) {
   return (event & CUSTOM_EVENT_REINDEX) != 0 && (event & CUSTOM_EVENT_UPDATE) == 0;
 }
+// Has the file's content read anew, whatever its attributes tell.
+bool IsWrite(uint32_t event) {
+  return event == QLIB_NOTIFY_CLOSE_WRITE || event == QLIB_NOTIFY_CREATE;
+}
 bool IsUpdateOfAll(uint32_t event) {
   return (event & CUSTOM_EVENT_UPDATE) != 0;
 }
@@ -97,7 +101,9 @@ void QueueFolding::Add(uint32_t event, const std::string& path, const std::strin
     FoldInto(path);
   } else if (before == QLIB_NOTIFY_RENAME) {
     AddAtRename(at, event, data);
-  } else if (!IsUpdateOfAll(before)) {
+  } else if (IsWrite(before) && event == QLIB_NOTIFY_MODIFY) {
+    FoldInto(path);  // the file is to be read anew if it is there, and it may be gone
+  } else if (!IsUpdateOfAll(before) && !(IsWrite(before) && event == QLIB_NOTIFY_ATTRIB)) {
     Place(path, {event, data, {}});
   }
   FoldIfTooMany();

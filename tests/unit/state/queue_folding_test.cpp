@@ -210,6 +210,24 @@ TEST_F(QueueFoldingTest, WhatARenameCannotSayWithItsLineIsAReindexOfItsFormerPat
                    "reindex /s/update", "reindex /s/updated"}));
 }
 
+TEST_F(QueueFoldingTest, AFileThatWasWrittenToIsReadAnewWhateverFollows) {
+  QueueFolding folding = Folding(100);
+  for (const uint32_t write : {QLIB_NOTIFY_CLOSE_WRITE, QLIB_NOTIFY_CREATE}) {
+    const std::string name = write == QLIB_NOTIFY_CREATE ? "/s/made" : "/s/written";
+    folding.Add(write, name);
+    folding.Add(QLIB_NOTIFY_ATTRIB, name);
+    folding.Add(write, name + "-and-modified");
+    folding.Add(QLIB_NOTIFY_MODIFY, name + "-and-modified");  // as it is gone, perhaps
+    folding.Add(write, name + "-and-gone");
+    folding.Add(QLIB_NOTIFY_DELETE, name + "-and-gone");
+  }
+
+  EXPECT_EQ(
+      Shown(folding, 100),
+      Texts({"64 /s/made", "delete /s/made-and-gone", "reindex /s/made-and-modified",
+             "8 /s/written", "delete /s/written-and-gone", "reindex /s/written-and-modified"}));
+}
+
 TEST_F(QueueFoldingTest, ALineFromALookNeverDisplacesAReindex) {
   QueueFolding folding = Folding(100);
   folding.Add(CUSTOM_EVENT_REINDEX, "/s/a");
