@@ -11,6 +11,7 @@
 #include "ctl/places.h"
 #include "state/event_codes.h"
 #include "state/queue_writer.h"
+#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -54,7 +55,8 @@ int Reindex(const Arguments& arguments) {
     return EXIT_FAILED;
   }
 
-  return Queue(session.settings->ShareOfPath(path)->name, EventLine(CUSTOM_EVENT_REINDEX, path));
+  const std::string& share = session.settings->ShareOfPath(path)->name;
+  return Queue(share, EventLine(CUSTOM_EVENT_REINDEX, ReindexPath(share, path)));
 }
 
 int Event(const Arguments& arguments) {

@@ -19,6 +19,7 @@
 #include "state/event_codes.h"
 #include "state/layout.h"
 #include "state/queue_writer.h"
+#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -189,7 +190,7 @@ int FolderAdd(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
 
-  const std::string line = EventLine(CUSTOM_EVENT_REINDEX, folder.path);
+  const std::string line = EventLine(CUSTOM_EVENT_REINDEX, ReindexPath(folder.share, folder.path));
   int queued = first ? Queue(session, folder.share, line) : EXIT_DONE;
   const int told = CodeOfReply(TellDaemon("upsert_folder_setting", folder.path), folder.path);
   if (!first) {
@@ -237,9 +238,10 @@ int FolderSet(const Arguments& arguments) {
 
   const int told = CodeOfReply(TellDaemon("upsert_folder_setting", folder->path), folder->path);
   // A reindex sets everything anew, the flags too.
-  const std::string line = other_excludes ? EventLine(CUSTOM_EVENT_REINDEX, folder->path)
-                                          : EventLine(CUSTOM_EVENT_UPDATE, folder->path,
-                                                      std::nullopt, ToText(FlagsObject(changed)));
+  const std::string line =
+      other_excludes ? EventLine(CUSTOM_EVENT_REINDEX, ReindexPath(folder->share, folder->path))
+                     : EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt,
+                                 ToText(FlagsObject(changed)));
   const int queued = Queue(session, folder->share, line);
   return told != EXIT_DONE ? told : queued;
 }

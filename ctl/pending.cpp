@@ -1,21 +1,16 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "ctl/pending.h"
 
-#include <json/reader.h>
-#include <unistd.h>
-
 #include <algorithm>
-#include <cerrno>
-#include <exception>
-#include <memory>
 #include <string_view>
+#include <utility>
 
-#include "base/scoped_fd.h"
 #include "state/event_codes.h"
 #include "state/layout.h"
 #include "state/progress.h"
 #include "state/queue_files.h"
 #include "state/queue_writer.h"
+#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -37,28 +32,18 @@ Relation RelationOf(const std::string& written, const std::string& path) {
   return Covers(path, *normal) ? Relation::BELOW : Relation::NONE;
 }
 
-class LineReader {
+class PendingFinder {
  public:
-  LineReader(const std::string& of_path, Pending& found) : path(of_path), pending(found) {
-    Json::CharReaderBuilder builder;
-    builder["collectComments"] = false;
-    reader.reset(builder.newCharReader());
-  }
+  PendingFinder(const std::string& of_path, Pending& found) : path(of_path), pending(found) {}
 
-  void Read(std::string_view line, bool begun) {
-    try {
-      Json::Value value;
-      if (!reader->parse(line.data(), line.data() + line.size(), &value, nullptr) ||
-          !value.isObject() || !value["event"].isUInt() || !value["path"].isString()) {
-        return;
-      }
-      const Json::Value old = value.get("path_old", "");
-      Add({.event = EventNames(value["event"].asUInt()),
-           .path = value["path"].asString(),
-           .path_old = old.isString() ? old.asString() : "",
+  void Read(std::string_view text, bool begun) {
+    QueuedLine line;
+    if (reader.Read(text, line)) {
+      Add({.event = EventNames(line.event),
+           .path = std::move(line.path),
+           .path_old = std::move(line.path_old),
            .above = false,
            .begun = begun});
-    } catch (const std::exception&) {  // nesting beyond the reader's limit: no event of ours
     }
   }
 
@@ -78,7 +63,7 @@ class LineReader {
 
   const std::string& path;
   Pending& pending;
-  std::unique_ptr<Json::CharReader> reader;
+  const QueuedLineReader reader;
 };
 
 }  // namespace
@@ -87,9 +72,9 @@ Pending ReadPending(const std::string& share_name, const std::string& path) {
   QueueFiles files;
   OpenQueueFiles(share_name, files);
   Pending pending;
-  LineReader reader(path, pending);
-  ForEachQueueLine(files.drained, [&](std::string_view line) { reader.Read(line, true); });
-  ForEachQueueLine(files.queue, [&](std::string_view line) { reader.Read(line, false); });
+  PendingFinder finder(path, pending);
+  ForEachQueueLine(files.drained, [&](std::string_view line) { finder.Read(line, true); });
+  ForEachQueueLine(files.queue, [&](std::string_view line) { finder.Read(line, false); });
   return pending;
 }
 

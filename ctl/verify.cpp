@@ -1,13 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // verify: an index against the disk, and the events that mend it.
-#include <json/reader.h>
-
 #include <algorithm>
-#include <exception>
-#include <fstream>
-#include <memory>
 #include <optional>
-#include <set>
 
 #include "base/event_codes.h"
 #include "ctl/commands.h"
@@ -15,9 +9,11 @@
 #include "ctl/places.h"
 #include "index/compare.h"
 #include "index/repair.h"
+#include "state/belonging.h"
 #include "state/layout.h"
 #include "state/progress.h"
 #include "state/queue_writer.h"
+#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -37,46 +33,14 @@ bool PutDifference(Difference difference, const std::string& path, const Argumen
   return PutJson(object);
 }
 
-// What waits in the queue file. Its drained copy is a batch of its own.
-struct Waiting {
-  size_t lines = 0;
-  std::set<std::string> updated;  // paths of updates of a subtree
-};
-
-Waiting ReadWaiting(const std::string& share_name) {
-  Json::CharReaderBuilder builder;
-  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
-  Waiting waiting;
-  std::ifstream queue(QueuePath(share_name), std::ios::binary);
-  for (std::string line; std::getline(queue, line);) {
-    ++waiting.lines;
-    try {
-      Json::Value value;
-      if (reader->parse(line.data(), line.data() + line.size(), &value, nullptr) &&
-          value.isObject() && (value["event"].asUInt() & CUSTOM_EVENT_UPDATE) != 0) {
-        waiting.updated.insert(value["path"].asString());
-      }
-    } catch (const std::exception&) {
-      continue;  // no event, and of no consequence here
-    }
-  }
-  return waiting;
-}
-
-// An update of a subtree that waits at the same path would swallow a reindex, and it does not drop
-// what is gone below. With a slash behind it the path names the same directory, and the reindex is
-// carried out after the update.
-std::string QueuedPath(const QueueLine& line, const Waiting& waiting) {
-  const bool swallowed = line.event == CUSTOM_EVENT_REINDEX && waiting.updated.contains(line.path);
-  return swallowed ? line.path + "/" : line.path;
-}
-
 int QueueRepair(const std::string& share_name, Repair& repair) {
-  const Waiting waiting = ReadWaiting(share_name);
-  const size_t room = QUEUE_LINE_LIMIT - std::min(waiting.lines, QUEUE_LINE_LIMIT);
+  const Queued queued = ReadQueued(share_name);
+  const size_t room = QUEUE_LINE_LIMIT - std::min(queued.lines, QUEUE_LINE_LIMIT);
   std::vector<std::string> lines;
   for (const QueueLine& line : repair.Lines(room)) {
-    lines.push_back(EventLine(line.event, QueuedPath(line, waiting), std::nullopt, line.data));
+    const bool is_reindex = line.event == CUSTOM_EVENT_REINDEX;
+    const std::string path = is_reindex ? queued.updates.ReindexPath(line.path) : line.path;
+    lines.push_back(EventLine(line.event, path, std::nullopt, line.data));
   }
 
   std::string error;
@@ -125,6 +89,17 @@ int TellUnreadable(const Comparison& counts) {
   return Fail(EXIT_FAILED, "%s", text.c_str());
 }
 
+// Deletes that wait take away what is there again, whatever the index holds by now.
+void AddReturned(const Settings& settings, const std::vector<std::string>& deletes,
+                 Repair& repair) {
+  for (const std::string& path : deletes) {
+    const Look look = LookAt(settings, path);
+    if (look.verdict == Verdict::BELONGS) {
+      (void)repair.Add({Difference::MISSING, path, Thing::NONE, look.thing});
+    }
+  }
+}
+
 // For an index that is to be made: what is missing comes with its folder.
 void ReindexFolders(const Settings& settings, const Share& share, Repair& repair) {
   for (const IndexedFolder& folder : settings.folders) {
@@ -146,6 +121,7 @@ int Verify(const Arguments& arguments) {
     return EXIT_FAILED;
   }
 
+  const std::vector<std::string> deletes = ReadQueued(share->name).deletes;
   Comparer comparer(*session.store, share->name);
   EntryReader reader;  // counts for the repair, beside the comparison's own
   comparer.missing_is_empty = true;
@@ -175,6 +151,7 @@ int Verify(const Arguments& arguments) {
     return is_read ? code : TellUnreadable(comparer.counts);
   }
 
+  AddReturned(*session.settings, deletes, repair);
   const int queued = QueueRepair(share->name, repair);
   if (queued == EXIT_DONE && !mended) {
     return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",

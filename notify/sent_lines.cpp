@@ -1,65 +1,65 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 #include "notify/sent_lines.h"
 
-#include <exception>
-#include <utility>
-
 #include "base/event_codes.h"
 #include "notify/change.h"
 #include "notify/look_lines.h"
 #include "state/belonging.h"
 #include "state/layout.h"
-#include "state/queue_files.h"
 
 namespace fileindexd {
 
-LineReader::LineReader() {
-  Json::CharReaderBuilder builder;
-  builder["collectComments"] = false;
-  reader.reset(builder.newCharReader());
+namespace {
+
+QueueLine ReindexOf(const std::string& path) {
+  return {CUSTOM_EVENT_REINDEX, path, {}, {}};
 }
 
-bool LineReader::Read(std::string_view text, QueueLine& line) const {
-  try {
-    Json::Value value;
-    if (!reader->parse(text.data(), text.data() + text.size(), &value, nullptr) ||
-        !value.isObject() || !value.isMember("event") ||
-        !value["event"].isConvertibleTo(Json::uintValue) || !value["path"].isString()) {
-      return false;
-    }
-    auto path = NormalPath(value["path"].asString());
-    if (!path.has_value()) {
-      return false;
-    }
-    line = {value["event"].asUInt(), std::move(*path), {}, {}};
-    return true;
-  } catch (const std::exception&) {  // nesting beyond the reader's limit: no event of ours
-    return false;
-  }
-}
+}  // namespace
 
 void SentLines::Forget() {
   deleted.clear();
   renamed.clear();
+  written.clear();
+  updates.Forget();
 }
 
-void SentLines::Note(const QueueLine& line) {
-  deleted.erase(line.path);
+void SentLines::Note(const QueuedLine& line) {
+  updates.Note(line.event, line.path);
+  const auto path = NormalPath(line.path);
+  if (!path.has_value()) {
+    return;
+  }
+  deleted.erase(*path);
   if (!IsLook(line.event)) {
-    renamed.erase(line.path);
+    renamed.erase(*path);
+    written.erase(*path);
   }
   if ((line.event & QLIB_NOTIFY_RENAME) != 0) {
-    renamed.insert(line.path);
+    renamed.insert(*path);
   } else if ((line.event & QLIB_NOTIFY_DELETE) != 0) {
-    deleted.insert(line.path);
+    deleted.insert(*path);
+  } else if ((line.event & (QLIB_NOTIFY_CLOSE_WRITE | QLIB_NOTIFY_CREATE)) != 0) {
+    written.insert(*path);
   }
 }
 
-QueueLine SentLines::WithDisplaced(const QueueLine& line) const {
-  const bool is_update = line.event == QLIB_NOTIFY_MODIFY || line.event == QLIB_NOTIFY_ATTRIB;
-  return is_update && renamed.contains(line.path)
-             ? QueueLine{CUSTOM_EVENT_REINDEX, line.path, {}, {}}
-             : line;
+std::vector<QueueLine> SentLines::WithDisplaced(const QueueLine& line) const {
+  if (line.event == QLIB_NOTIFY_RENAME && updates.Holds(line.path)) {
+    return {ReindexOf(line.path), ReindexOf(line.path_old)};
+  }
+  if (line.event != QLIB_NOTIFY_MODIFY && line.event != QLIB_NOTIFY_ATTRIB) {
+    return {line};
+  }
+  if (renamed.contains(line.path)) {
+    return {ReindexOf(line.path)};
+  }
+  if (!written.contains(line.path)) {
+    return {line};
+  }
+  // A modify may be about what is gone, which a close passes over.
+  const bool is_there = line.event == QLIB_NOTIFY_ATTRIB;
+  return {is_there ? QueueLine{QLIB_NOTIFY_CLOSE_WRITE, line.path, {}, {}} : ReindexOf(line.path)};
 }
 
 std::vector<QueueLine> SentLines::LinesBehind(const Settings& settings,
@@ -74,20 +74,9 @@ std::vector<QueueLine> SentLines::LinesBehind(const Settings& settings,
   return LinesOfReturned(settings, below);
 }
 
-std::vector<std::string> QueuedDeletes(const std::string& share_name) {
-  QueueFiles files;
-  OpenQueueFiles(share_name, files);
-  const LineReader reader;
-  std::set<std::string, ByComponents> paths;
-  for (const ScopedFd* file : {&files.drained, &files.queue}) {
-    ForEachQueueLine(*file, [&](std::string_view text) {
-      QueueLine line;
-      if (reader.Read(text, line) && (line.event & QLIB_NOTIFY_DELETE) != 0) {
-        paths.insert(std::move(line.path));
-      }
-    });
-  }
-  return {paths.begin(), paths.end()};
+QueuedLine SentLines::Written(const QueueLine& line) const {
+  const bool is_reindex = line.event == CUSTOM_EVENT_REINDEX;
+  return {line.event, is_reindex ? updates.ReindexPath(line.path) : line.path, line.path_old};
 }
 
 std::vector<QueueLine> LinesOfReturned(const Settings& settings,

@@ -60,7 +60,7 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `sent` is about
   SentLines sent;            // or written by others, an earlier service among them
-  const LineReader line_reader;
+  const QueuedLineReader line_reader;
   // The root, where its reindex waits before the backlog. Not that of the settings: they may know
   // no such share any more.
   std::optional<std::string> root_reindex;
@@ -149,7 +149,7 @@ void ShareFeed::Impl::ForgetTaken() {
 
 void ShareFeed::Impl::Meet(std::string_view text) {
   ForgetTaken();
-  QueueLine line;
+  QueuedLine line;
   if (line_reader.Read(text, line)) {
     sent.Note(line);
   }
@@ -165,6 +165,7 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
     return {{CUSTOM_EVENT_REINDEX, *root_reindex, {}, {}}};
   }
   std::vector<QueueLine> waiting = backlog->Take(most);
+  std::vector<QueueLine> taken;
   std::vector<QueueLine> behind;
   size_t fitting = 0;
   for (; fitting < waiting.size(); ++fitting) {
@@ -173,18 +174,21 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
       // It may have waited for long.
       line = LookedAtAgain(settings, line);
     }
-    line = sent.WithDisplaced(line);
-    std::vector<QueueLine> returned = sent.LinesBehind(settings, line);
-    if (fitting + 1 + behind.size() + returned.size() > most) {
+    std::vector<QueueLine> lines = sent.WithDisplaced(line);
+    std::vector<QueueLine> returned;
+    for (const QueueLine& asked : lines) {
+      std::ranges::move(sent.LinesBehind(settings, asked), std::back_inserter(returned));
+    }
+    if (taken.size() + lines.size() + behind.size() + returned.size() > most) {
       break;
     }
-    std::move(returned.begin(), returned.end(), std::back_inserter(behind));
+    std::ranges::move(lines, std::back_inserter(taken));
+    std::ranges::move(returned, std::back_inserter(behind));
   }
 
   Queue(settings, {waiting.begin() + static_cast<std::ptrdiff_t>(fitting), waiting.end()});
-  waiting.resize(fitting);
-  std::move(behind.begin(), behind.end(), std::back_inserter(waiting));
-  return waiting;
+  std::ranges::move(behind, std::back_inserter(taken));
+  return taken;
 }
 
 void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, bool at_once,
@@ -205,7 +209,7 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
     texts.reserve(taken.size());
     for (const QueueLine& line : taken) {
       const bool is_rename = line.event == QLIB_NOTIFY_RENAME;
-      texts.push_back(EventLine(line.event, line.path,
+      texts.push_back(EventLine(line.event, sent.Written(line).path,
                                 is_rename ? std::optional(line.path_old) : std::nullopt,
                                 line.data));
     }
@@ -218,7 +222,7 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
     root_reindex.reset();
     counts.lines += taken.size();
     for (const QueueLine& line : taken) {
-      sent.Note(line);
+      sent.Note(sent.Written(line));
     }
     error.clear();
   } else if (result == Appended::FAILED) {

@@ -12,6 +12,7 @@
 #include "state/filesystem.h"
 #include "state/layout.h"
 #include "state/queue_writer.h"
+#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -93,7 +94,9 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
 
     const auto code = static_cast<uint32_t>(event);
     const std::string text = data.isNull() ? std::string() : data.toString();
-    const std::vector<std::string> lines = {EventLine(code, path, std::nullopt, text)};
+    const std::string queued_path =
+        code == CUSTOM_EVENT_REINDEX ? ReindexPath(share->name, path) : path;
+    const std::vector<std::string> lines = {EventLine(code, queued_path, std::nullopt, text)};
     const bool refills = code == CUSTOM_EVENT_REINDEX && NormalPath(path) == share->path;
     std::string error;
     const bool queued = refills ? AppendToQueueDurably(share->name, lines, error)

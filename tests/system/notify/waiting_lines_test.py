@@ -28,9 +28,36 @@ class WaitingLines(WatchedDiskTest):
             self.assertLess(time.monotonic(), deadline, self.watched())
             await_in_folder(namespace.RUN, lambda: False, 0.05)  # nothing tells of it
 
-    def begin_with(self, *files):
+    def begin_with(self, *files, folders=()):
         self.make_files(self.root, *files)
+        self.folders = [self.at(folder) for folder in folders] or None
+        self.add_share(*folders, flags=("--all",))
         self.begin()
+
+    def begin_with_update(self, *files, folders=("f",)):
+        """Of the first folder: it waits, and the daemon does not run."""
+        self.begin_with(*files, folders=folders)
+        self.stop(self.daemon_pid())
+        self.ctl("folder", "set", self.at(folders[0]), "--audio=off")
+        self.await_written()
+
+    def assert_converges_once_started(self):
+        self.start(debug=False)
+        self.assert_converged(self.root, folders=self.folders)
+
+    def go_and_come_back(self, away):
+        os.rename(self.at("f"), away)
+        self.await_written()
+        os.unlink(f"{away}/x.txt")
+        os.rename(away, self.at("f"))
+        self.await_written()
+        self.assert_converges_once_started()
+
+    def await_found(self, word):
+        deadline = time.monotonic() + LIMIT
+        while self.ctl("search", "--count", word).out != b"1\n":
+            self.assertLess(time.monotonic(), deadline)
+            await_in_folder(namespace.RUN, lambda: False, 0.05)  # nothing tells of it
 
     def test_a_renamed_folder_that_is_changed_before_it_was_indexed(self):
         self.begin_with("q/deep/x.txt")
@@ -61,6 +88,48 @@ class WaitingLines(WatchedDiskTest):
             self.await_written()
 
         self.assert_converged(self.root)
+
+    def test_a_crowd_that_is_removed_behind_an_update_of_its_folder(self):
+        self.begin_with_update(*(f"f/{n}.txt" for n in range(1500)))
+        with stopped(self.notifier.pid):
+            for n in range(1400):
+                os.unlink(self.at(f"f/{n}.txt"))
+        self.await_written()
+        self.assert_converges_once_started()
+
+    def test_a_folder_that_is_away_for_a_while_behind_an_update_of_it(self):
+        self.begin_with_update("f/x.txt", "f/y.txt")
+        self.go_and_come_back(f"{self.elsewhere}/f")
+
+    def test_a_folder_that_is_elsewhere_in_the_share_behind_an_update_of_it(self):
+        self.begin_with_update("f/x.txt", "f/y.txt", "g/z.txt", folders=("f", "g"))
+        self.go_and_come_back(self.at("g/f"))
+
+    def test_a_folder_within_another_that_comes_back_behind_an_update_of_that(self):
+        self.begin_with("f/g/x.txt", "f/y.txt", folders=("f", "f/g"))
+        os.rename(self.at("f"), f"{self.elsewhere}/f")
+        self.sync()
+        self.stop(self.daemon_pid())
+        self.ctl("folder", "set", self.at("f"), "--audio=off")
+        self.await_written()
+        os.rename(f"{self.elsewhere}/f", self.at("f"))
+        self.await_written()
+        self.assert_converges_once_started()
+
+    def test_a_text_that_is_written_and_then_set_back_to_its_old_time(self):
+        self.begin_with("x.txt")
+        path = self.at("x.txt")
+        with open(path, "w", encoding="ascii") as file:
+            file.write("aardvark")
+        self.await_found("aardvark")
+        before = os.stat(path)
+        with stopped(self.daemon_pid()):
+            with open(path, "r+", encoding="ascii") as file:
+                file.write("buffalos")
+            self.await_written()
+            os.utime(path, ns=(before.st_atime_ns, before.st_mtime_ns))
+            self.await_written()
+        self.await_found("buffalos")
 
     def test_the_target_of_a_rename_that_waits_is_removed_and_the_event_is_lost(self):
         self.begin_with("p.txt", "q.txt", "stays.txt")

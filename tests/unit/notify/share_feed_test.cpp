@@ -229,6 +229,41 @@ TEST_F(ShareFeedTest, AnUpdateOfWhatWasRenamedHasItWalkedUntilTheQueueIsTaken) {
   EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_ATTRIB, "attributes")}));
 }
 
+TEST_F(ShareFeedTest, AFileThatWasWrittenToIsReadAnewWhateverFollowsInTheSameFile) {
+  Make("a");
+  Make("m");
+  Add(File(WRITTEN, "a"));
+  Add(File(WRITTEN, "m"));
+  Work();
+  Texts lines = Queue();
+  ASSERT_EQ(lines.size(), 2U);
+  Add(File(ATTRIBUTES, "a"));
+  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("m"), {}}});
+  Work();
+
+  lines.insert(lines.end(), {Line(QLIB_NOTIFY_CLOSE_WRITE, "a"), Line(CUSTOM_EVENT_REINDEX, "m")});
+  EXPECT_EQ(Queue(), lines);
+}
+
+TEST_F(ShareFeedTest, NoReindexIsSwallowedByAnUpdateOfTheSameFolder) {
+  const Texts others = {EventLine(CUSTOM_EVENT_UPDATE, Path("d"), {}, "{\"photo\":true}")};
+  std::string error;
+  ASSERT_TRUE(AppendToQueue("s", others, error)) << error;
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, Path("d"), {}}});
+  Work();
+  feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path("d"), {}, Path("from")}});
+  Work();
+  Texts all = others;
+  all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "d/"), Line(CUSTOM_EVENT_REINDEX, "d/"),
+                         Line(CUSTOM_EVENT_REINDEX, "from")});
+  EXPECT_EQ(Queue(), all);
+
+  TakeQueue();
+  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, Path("d"), {}}});
+  Work();
+  EXPECT_EQ(Queue(), Texts({Line(CUSTOM_EVENT_REINDEX, "d")}));
+}
+
 // As one that was stopped meanwhile has left it.
 TEST_F(ShareFeedTest, ADeleteOfAnotherWriterThatWaitsIsLookedAtAgainBehindAReindexAboveIt) {
   MakeDirectory("d/again");
