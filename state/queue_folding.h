@@ -52,8 +52,8 @@ class QueueFolding {
 
   // `path` is normal, at or below the root. Of two lines at one path the wider stays: a reindex,
   // then an update of a subtree; else the later one, but that a change of attributes does not
-  // displace a write. Two such updates with different data become a reindex, and so do a write and a
-  // modify behind it.
+  // displace a write. Two such updates with different data become a reindex, and so do a write and
+  // a modify behind it.
   void Add(uint32_t event, const std::string& path, const std::string& data = {});
 
   // A rename: one line at `path`, normal, with the former path, whatever stands below either. A
