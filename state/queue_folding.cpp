@@ -97,12 +97,12 @@ void QueueFolding::Add(uint32_t event, const std::string& path, const std::strin
   const uint32_t before = at == lines.end() ? 0 : at->second.event;
   const bool are_two_updates =
       IsUpdateOfAll(before) && IsUpdateOfAll(event) && at->second.data != data;
-  if (IsReindex(event) || are_two_updates) {
+  // The file is to be read anew if it is there, and it may be gone.
+  const bool is_modified_again = IsWrite(before) && event == QLIB_NOTIFY_MODIFY;
+  if (IsReindex(event) || are_two_updates || is_modified_again) {
     FoldInto(path);
   } else if (before == QLIB_NOTIFY_RENAME) {
     AddAtRename(at, event, data);
-  } else if (IsWrite(before) && event == QLIB_NOTIFY_MODIFY) {
-    FoldInto(path);  // the file is to be read anew if it is there, and it may be gone
   } else if (!IsUpdateOfAll(before) && !(IsWrite(before) && event == QLIB_NOTIFY_ATTRIB)) {
     Place(path, {event, data, {}});
   }
