@@ -10,20 +10,12 @@
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "state/event_codes.h"
+#include "state/queue_content.h"
 #include "state/queue_writer.h"
-#include "state/queued_lines.h"
 
 namespace fileindexd {
 
 namespace {
-
-int Queue(const std::string& share, const std::string& line) {
-  std::string error;
-  if (!AppendToQueue(share, {line}, error)) {
-    return Fail(EXIT_FAILED, "%s", error.c_str());
-  }
-  return EXIT_DONE;
-}
 
 // The same JSON on one line. None when it is none.
 std::optional<std::string> CompactJson(const std::string& text) {
@@ -55,8 +47,11 @@ int Reindex(const Arguments& arguments) {
     return EXIT_FAILED;
   }
 
-  const std::string& share = session.settings->ShareOfPath(path)->name;
-  return Queue(share, EventLine(CUSTOM_EVENT_REINDEX, ReindexPath(share, path)));
+  std::string error;
+  return AppendEvent(session.settings->ShareOfPath(path)->name, CUSTOM_EVENT_REINDEX, path, {},
+                     Durability::NONE, error)
+             ? EXIT_DONE
+             : Fail(EXIT_FAILED, "%s", error.c_str());
 }
 
 int Event(const Arguments& arguments) {
@@ -81,7 +76,10 @@ int Event(const Arguments& arguments) {
   if (share == nullptr) {
     return EXIT_FAILED;
   }
-  return Queue(share->name, EventLine(*code, arguments.path, arguments.path_old, data));
+  std::string error;
+  const std::string line = EventLine(*code, arguments.path, arguments.path_old, data);
+  return AppendToQueue(share->name, {line}, error) ? EXIT_DONE
+                                                   : Fail(EXIT_FAILED, "%s", error.c_str());
 }
 
 }  // namespace fileindexd

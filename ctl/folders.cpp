@@ -18,8 +18,8 @@
 #include "state/belonging.h"
 #include "state/event_codes.h"
 #include "state/layout.h"
+#include "state/queue_content.h"
 #include "state/queue_writer.h"
-#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -32,14 +32,16 @@ Reply TellDaemon(const char* type, const std::string& path) {
 }
 
 // Where the line cannot be written, the share's flag has all of it indexed again.
-int Queue(Session& session, const std::string& share, const std::string& line) {
+int Queue(Session& session, const IndexedFolder& folder, uint32_t event,
+          const std::string& data = {}) {
   std::string error;
-  if (AppendToQueue(share, {line}, error)) {
+  if (AppendEvent(folder.share, event, folder.path, data, Durability::NONE, error)) {
     return EXIT_DONE;
   }
 
-  (void)session.store->UpdateStatus(
-      share, [](ShareStatus& status) { status.needs_reindex = true; });  // one line tells enough
+  (void)session.store->UpdateStatus(folder.share, [](ShareStatus& status) {
+    status.needs_reindex = true;
+  });  // one line tells enough
   return Fail(EXIT_FAILED, "%s", error.c_str());
 }
 
@@ -190,11 +192,10 @@ int FolderAdd(const Arguments& arguments) {
     return Fail(EXIT_FAILED, "%s", session.store->Error().c_str());
   }
 
-  const std::string line = EventLine(CUSTOM_EVENT_REINDEX, ReindexPath(folder.share, folder.path));
-  int queued = first ? Queue(session, folder.share, line) : EXIT_DONE;
+  int queued = first ? Queue(session, folder, CUSTOM_EVENT_REINDEX) : EXIT_DONE;
   const int told = CodeOfReply(TellDaemon("upsert_folder_setting", folder.path), folder.path);
   if (!first) {
-    queued = Queue(session, folder.share, line);
+    queued = Queue(session, folder, CUSTOM_EVENT_REINDEX);
   }
   return told != EXIT_DONE ? told : queued;
 }
@@ -238,11 +239,9 @@ int FolderSet(const Arguments& arguments) {
 
   const int told = CodeOfReply(TellDaemon("upsert_folder_setting", folder->path), folder->path);
   // A reindex sets everything anew, the flags too.
-  const std::string line =
-      other_excludes ? EventLine(CUSTOM_EVENT_REINDEX, ReindexPath(folder->share, folder->path))
-                     : EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt,
-                                 ToText(FlagsObject(changed)));
-  const int queued = Queue(session, folder->share, line);
+  const int queued =
+      other_excludes ? Queue(session, *folder, CUSTOM_EVENT_REINDEX)
+                     : Queue(session, *folder, CUSTOM_EVENT_UPDATE, ToText(FlagsObject(changed)));
   return told != EXIT_DONE ? told : queued;
 }
 
@@ -264,9 +263,7 @@ int FolderRemove(const Arguments& arguments) {
 
   const int told = CodeOfReply(TellDaemon("delete_folder_setting", folder->path), folder->path);
   const ContentFlags every = {.document = true, .audio = true, .video = true, .photo = true};
-  const std::string line =
-      EventLine(CUSTOM_EVENT_UPDATE, folder->path, std::nullopt, ToText(FlagsObject(every)));
-  const int queued = Queue(session, folder->share, line);
+  const int queued = Queue(session, *folder, CUSTOM_EVENT_UPDATE, ToText(FlagsObject(every)));
   return told != EXIT_DONE ? told : queued;
 }
 

@@ -8,9 +8,9 @@
 #include "state/event_codes.h"
 #include "state/layout.h"
 #include "state/progress.h"
+#include "state/queue_content.h"
 #include "state/queue_files.h"
 #include "state/queue_writer.h"
-#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -37,7 +37,7 @@ class PendingFinder {
   PendingFinder(const std::string& of_path, Pending& found) : path(of_path), pending(found) {}
 
   void Read(std::string_view text, bool begun) {
-    QueuedLine line;
+    LineInFile line;
     if (reader.Read(text, line)) {
       Add({.event = EventNames(line.event),
            .path = std::move(line.path),
@@ -63,7 +63,7 @@ class PendingFinder {
 
   const std::string& path;
   Pending& pending;
-  const QueuedLineReader reader;
+  const QueueLineReader reader;
 };
 
 }  // namespace

@@ -84,8 +84,9 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
 
 void FindLost(const Session& session, Question& question) {
   for (const std::string& share : question.shares) {
-    if (EntryReader::IsMissing(share) &&
-        IsIndexExpected(*session.store, *session.settings, share)) {
+    // In this order: it may just be made.
+    if (IsIndexExpected(*session.store, *session.settings, share) &&
+        EntryReader::IsMissing(share)) {
       question.lost.push_back(share);
     }
   }

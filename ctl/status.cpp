@@ -27,7 +27,9 @@ void ReadIndex(Session& session, ShareReport& report) {
   EntryReader reader;
   const IndexError opened = OpenAndTell(reader.database, report.share.name);
   if (opened == IndexError::PATH_NOT_FOUND) {
-    if (IsIndexExpected(*session.store, *session.settings, report.share.name)) {
+    // It may just have been made.
+    if (IsIndexExpected(*session.store, *session.settings, report.share.name) &&
+        EntryReader::IsMissing(report.share.name)) {
       report.index_problem =
           "missing; to make it anew: fileindexctl reindex " + OneLine(report.share.path);
     }

@@ -12,8 +12,8 @@
 #include "state/belonging.h"
 #include "state/layout.h"
 #include "state/progress.h"
+#include "state/queue_content.h"
 #include "state/queue_writer.h"
-#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -34,20 +34,23 @@ bool PutDifference(Difference difference, const std::string& path, const Argumen
 }
 
 int QueueRepair(const std::string& share_name, Repair& repair) {
-  const Queued queued = ReadQueued(share_name);
-  const size_t room = QUEUE_LINE_LIMIT - std::min(queued.lines, QUEUE_LINE_LIMIT);
-  std::vector<std::string> lines;
-  for (const QueueLine& line : repair.Lines(room)) {
-    const bool is_reindex = line.event == CUSTOM_EVENT_REINDEX;
-    const std::string path = is_reindex ? queued.updates.ReindexPath(line.path) : line.path;
-    lines.push_back(EventLine(line.event, path, std::nullopt, line.data));
+  if (repair.Lines(QUEUE_LINE_LIMIT).empty()) {
+    return EXIT_DONE;
   }
-
+  const auto make = [&] {
+    const QueueContent queued = ReadQueueContent(share_name);
+    std::vector<std::string> lines;
+    for (const QueueLine& line :
+         repair.Lines(QUEUE_LINE_LIMIT - std::min(queued.lines, QUEUE_LINE_LIMIT))) {
+      lines.push_back(EventLine(line.event, queued.updates.PathInFile(line.event, line.path),
+                                std::nullopt, line.data));
+    }
+    return lines;
+  };
   std::string error;
-  if (!lines.empty() && !AppendToQueue(share_name, lines, error)) {
-    return Fail(EXIT_FAILED, "%s", error.c_str());
-  }
-  return EXIT_DONE;
+  return AppendToQueue(share_name, make, Durability::NONE, error)
+             ? EXIT_DONE
+             : Fail(EXIT_FAILED, "%s", error.c_str());
 }
 
 // Compares to the end, or until `report` wants no more, and says meanwhile how far it is.
@@ -94,7 +97,7 @@ void AddReturned(const Settings& settings, const std::vector<std::string>& delet
                  Repair& repair) {
   for (const std::string& path : deletes) {
     const Look look = LookAt(settings, path);
-    if (look.verdict == Verdict::BELONGS) {
+    if (look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN) {
       (void)repair.Add({Difference::MISSING, path, Thing::NONE, look.thing});
     }
   }
@@ -121,7 +124,7 @@ int Verify(const Arguments& arguments) {
     return EXIT_FAILED;
   }
 
-  const std::vector<std::string> deletes = ReadQueued(share->name).deletes;
+  const std::vector<std::string> deletes = ReadQueueContent(share->name).deletes;
   Comparer comparer(*session.store, share->name);
   EntryReader reader;  // counts for the repair, beside the comparison's own
   comparer.missing_is_empty = true;

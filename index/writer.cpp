@@ -96,8 +96,8 @@ IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& opera
   }
   operation.path = std::move(*normal);
 
-  // What was seen before a transaction began may be gone by now, and whoever compares awaits the
-  // end of what is being written, not of a Worker that is about to begin.
+  // A comparison awaits the end of what is being written. One that begins between the look and the
+  // transaction awaits nobody, and misses what is gone by then.
   if (!database.IsOpen() || sqlite3_get_autocommit(database.db) != 0) {
     seen = nullptr;
   }

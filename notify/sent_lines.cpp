@@ -24,13 +24,14 @@ void SentLines::Forget() {
   updates.Forget();
 }
 
-void SentLines::Note(const QueuedLine& line) {
+void SentLines::Note(const LineInFile& line) {
   updates.Note(line.event, line.path);
   const auto path = NormalPath(line.path);
   if (!path.has_value()) {
     return;
   }
   deleted.erase(*path);
+  // What a look of others has displaced is still to be asked for.
   if (!IsLook(line.event)) {
     renamed.erase(*path);
     written.erase(*path);
@@ -44,8 +45,11 @@ void SentLines::Note(const QueuedLine& line) {
   }
 }
 
-std::vector<QueueLine> SentLines::WithDisplaced(const QueueLine& line) const {
-  if (line.event == QLIB_NOTIFY_RENAME && updates.Holds(line.path)) {
+// Also where an update waits at a rename's former path: the reindex of that, by its plain name,
+// takes one along that was queued behind the update.
+std::vector<QueueLine> SentLines::InPlaceOf(const QueueLine& line) const {
+  if (line.event == QLIB_NOTIFY_RENAME &&
+      (updates.Holds(line.path) || updates.Holds(line.path_old))) {
     return {ReindexOf(line.path), ReindexOf(line.path_old)};
   }
   if (line.event != QLIB_NOTIFY_MODIFY && line.event != QLIB_NOTIFY_ATTRIB) {
@@ -74,9 +78,8 @@ std::vector<QueueLine> SentLines::LinesBehind(const Settings& settings,
   return LinesOfReturned(settings, below);
 }
 
-QueuedLine SentLines::Written(const QueueLine& line) const {
-  const bool is_reindex = line.event == CUSTOM_EVENT_REINDEX;
-  return {line.event, is_reindex ? updates.ReindexPath(line.path) : line.path, line.path_old};
+std::string SentLines::PathInFile(const QueueLine& line) const {
+  return updates.PathInFile(line.event, line.path);
 }
 
 std::vector<QueueLine> LinesOfReturned(const Settings& settings,

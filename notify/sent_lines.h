@@ -6,18 +6,18 @@
 // above it is executed after it, and takes away what came back with that directory. So whoever
 // queues such a line has the deletes below it looked at again, and so does whoever compared.
 //
-// Of two lines at one path mostly the later is executed alone. An update displaces the walk of a
-// directory that a rename brought, and the reading anew of a file that was written to: it has to
-// ask for that as well. An update of a subtree is the other way: it swallows whatever comes behind
-// it.
+// Of two lines at one path mostly the later is executed alone. A modify, or a change of attributes,
+// displaces the walk of a directory that a rename brought, and the reading anew of a file that was
+// written to: a line that asks for that takes its place. An update of a subtree is the other way:
+// it swallows whatever comes behind it.
 #pragma once
 
 #include <set>
 #include <string>
 #include <vector>
 
+#include "state/queue_content.h"
 #include "state/queue_folding.h"
-#include "state/queued_lines.h"
 #include "state/settings.h"
 
 namespace fileindexd {
@@ -28,23 +28,23 @@ class SentLines {
   // The lines were taken, or there is a new queue file.
   void Forget();
   // In the order of the file.
-  void Note(const QueuedLine& line);
+  void Note(const LineInFile& line);
 
-  // Lines that ask for what `line` does and for what it would displace, or be swallowed with.
-  std::vector<QueueLine> WithDisplaced(const QueueLine& line) const;
+  // Lines in the place of `line`, that ask for what it does and for what it would displace, or for
+  // what would be swallowed.
+  std::vector<QueueLine> InPlaceOf(const QueueLine& line) const;
   // For a line that has the daemon look at a directory and all below it: the lines to be queued
   // behind it, for what is there again.
   std::vector<QueueLine> LinesBehind(const Settings& settings, const QueueLine& line) const;
-  // As it is to stand in the file.
-  QueuedLine Written(const QueueLine& line) const;
+  std::string PathInFile(const QueueLine& line) const;
 
  private:
   using Paths = std::set<std::string, ByComponents>;
 
   Paths deleted;
   Paths renamed;  // to there
-  Paths written;
-  QueuedUpdates updates;
+  Paths written;  // made, or closed after writing: to be read anew
+  WaitingUpdates updates;
 };
 
 // Lines for those of the paths that are there, sorted paths being the quickest.

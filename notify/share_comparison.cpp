@@ -6,8 +6,8 @@
 
 #include "notify/log.h"
 #include "notify/sent_lines.h"
+#include "state/queue_content.h"
 #include "state/queue_writer.h"
-#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -68,7 +68,7 @@ bool ShareComparison::MayBegin() {
 
 bool ShareComparison::Begin() {
   // Deletes that wait may be executed behind the comparison's back, on what it finds in order.
-  deletes = ReadQueued(healing.share).deletes;
+  deletes = ReadQueueContent(healing.share).deletes;
   // Whose first lines wait has its index soon; where none wait nobody else would have it made.
   comparer.missing_is_empty = WaitingLines(healing.share) == 0;
   if (!comparer.Start()) {

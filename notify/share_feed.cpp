@@ -60,7 +60,7 @@ struct ShareFeed::Impl {
   QueueAppender appender;
   uint64_t file_number = 0;  // of the appender, that `sent` is about
   SentLines sent;            // or written by others, an earlier service among them
-  const QueuedLineReader line_reader;
+  const QueueLineReader line_reader;
   // The root, where its reindex waits before the backlog. Not that of the settings: they may know
   // no such share any more.
   std::optional<std::string> root_reindex;
@@ -149,7 +149,7 @@ void ShareFeed::Impl::ForgetTaken() {
 
 void ShareFeed::Impl::Meet(std::string_view text) {
   ForgetTaken();
-  QueuedLine line;
+  LineInFile line;
   if (line_reader.Read(text, line)) {
     sent.Note(line);
   }
@@ -174,7 +174,7 @@ std::vector<QueueLine> ShareFeed::Impl::TakeLines(const Settings& settings, size
       // It may have waited for long.
       line = LookedAtAgain(settings, line);
     }
-    std::vector<QueueLine> lines = sent.WithDisplaced(line);
+    std::vector<QueueLine> lines = sent.InPlaceOf(line);
     std::vector<QueueLine> returned;
     for (const QueueLine& asked : lines) {
       std::ranges::move(sent.LinesBehind(settings, asked), std::back_inserter(returned));
@@ -209,7 +209,7 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
     texts.reserve(taken.size());
     for (const QueueLine& line : taken) {
       const bool is_rename = line.event == QLIB_NOTIFY_RENAME;
-      texts.push_back(EventLine(line.event, sent.Written(line).path,
+      texts.push_back(EventLine(line.event, sent.PathInFile(line),
                                 is_rename ? std::optional(line.path_old) : std::nullopt,
                                 line.data));
     }
@@ -222,7 +222,7 @@ void ShareFeed::Impl::Write(const Settings& settings, Clock::time_point now, boo
     root_reindex.reset();
     counts.lines += taken.size();
     for (const QueueLine& line : taken) {
-      sent.Note(sent.Written(line));
+      sent.Note({line.event, sent.PathInFile(line), line.path_old});
     }
     error.clear();
   } else if (result == Appended::FAILED) {

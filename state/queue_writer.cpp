@@ -22,8 +22,6 @@ namespace {
 
 constexpr std::chrono::seconds LOCK_WAIT(5);
 
-enum class Durability { NONE, SYNCED };
-
 bool SyncFolder(const std::string& folder, std::string& error) {
   const ScopedFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   if (opened.fd < 0 || fsync(opened.fd) != 0) {
@@ -31,36 +29,6 @@ bool SyncFolder(const std::string& folder, std::string& error) {
     return false;
   }
   return true;
-}
-
-bool Append(const std::string& share_name, const std::vector<std::string>& lines,
-            Durability durability, std::string& error) {
-  std::string text;
-  if (!JoinLines(lines, text, error) || !MakeShareFolder(share_name, error)) {
-    return false;
-  }
-
-  const std::string path = QueuePath(share_name);
-  ScopedFd queue;
-  if (lines.empty()) {
-    return OpenQueue(path, queue, error);
-  }
-  struct stat held {};
-  if (LockQueue(path, LOCK_WAIT, queue, held, error) != QueueLock::TAKEN ||
-      !WriteLines(queue, path, std::move(text), held.st_size, error)) {
-    return false;
-  }
-  if (durability == Durability::SYNCED && fsync(queue.fd) != 0) {
-    error = QueueReason("sync", path);
-    return false;
-  }
-
-  // The one unlock. Whoever waits for the lock must find the lines written.
-  if (close(queue.Release()) != 0 && errno != EINTR) {
-    error = QueueReason("close", path);
-    return false;
-  }
-  return durability == Durability::NONE || SyncFolder(ShareFolder(share_name), error);
 }
 
 }  // namespace
@@ -82,14 +50,43 @@ std::string EventLine(uint32_t event, std::string_view path,
   return line;
 }
 
-bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
+bool AppendToQueue(const std::string& share_name, const MakeLines& make, Durability durability,
                    std::string& error) {
-  return Append(share_name, lines, Durability::NONE, error);
+  if (!MakeShareFolder(share_name, error)) {
+    return false;
+  }
+  const std::string path = QueuePath(share_name);
+  ScopedFd queue;
+  struct stat held {};
+  std::string text;
+  if (LockQueue(path, LOCK_WAIT, queue, held, error) != QueueLock::TAKEN ||
+      !JoinLines(make(), text, error) ||
+      !WriteLines(queue, path, std::move(text), held.st_size, error)) {
+    return false;
+  }
+  if (durability == Durability::SYNCED && fsync(queue.fd) != 0) {
+    error = QueueReason("sync", path);
+    return false;
+  }
+
+  // The one unlock. Whoever waits for the lock must find the lines written.
+  if (close(queue.Release()) != 0 && errno != EINTR) {
+    error = QueueReason("close", path);
+    return false;
+  }
+  return durability == Durability::NONE || SyncFolder(ShareFolder(share_name), error);
 }
 
-bool AppendToQueueDurably(const std::string& share_name, const std::vector<std::string>& lines,
-                          std::string& error) {
-  return Append(share_name, lines, Durability::SYNCED, error);
+bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
+                   std::string& error) {
+  if (lines.empty()) {
+    ScopedFd queue;
+    return MakeShareFolder(share_name, error) && OpenQueue(QueuePath(share_name), queue, error);
+  }
+  std::string text;
+  return JoinLines(lines, text, error) &&
+         AppendToQueue(
+             share_name, [&lines] { return lines; }, Durability::NONE, error);
 }
 
 bool TouchQueue(const std::string& share_name, std::string& error) {

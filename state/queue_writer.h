@@ -6,6 +6,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -24,10 +25,14 @@ std::string EventLine(uint32_t event, std::string_view path,
 bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
                    std::string& error);
 
-// The same, and true only once a power cut cannot take the lines away again. Costs two syncs. After
-// false the lines may be queued all the same.
-bool AppendToQueueDurably(const std::string& share_name, const std::vector<std::string>& lines,
-                          std::string& error);
+// SYNCED: true only once a power cut cannot take the lines away again. Costs two syncs. After false
+// the lines may be queued all the same.
+enum class Durability { NONE, SYNCED };
+
+// The same with lines, one at least, that are made while the lock is held.
+using MakeLines = std::function<std::vector<std::string>()>;
+bool AppendToQueue(const std::string& share_name, const MakeLines& make, Durability durability,
+                   std::string& error);
 
 // Opens the queue file as a writer does, creating it where it is missing, takes its lock without
 // waiting and closes it: the daemon looks at the queue again. True also while another program holds

@@ -11,8 +11,8 @@
 #include "state/belonging.h"
 #include "state/filesystem.h"
 #include "state/layout.h"
+#include "state/queue_content.h"
 #include "state/queue_writer.h"
-#include "state/queued_lines.h"
 
 namespace fileindexd {
 
@@ -94,14 +94,10 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
 
     const auto code = static_cast<uint32_t>(event);
     const std::string text = data.isNull() ? std::string() : data.toString();
-    const std::string queued_path =
-        code == CUSTOM_EVENT_REINDEX ? ReindexPath(share->name, path) : path;
-    const std::vector<std::string> lines = {EventLine(code, queued_path, std::nullopt, text)};
     const bool refills = code == CUSTOM_EVENT_REINDEX && NormalPath(path) == share->path;
     std::string error;
-    const bool queued = refills ? AppendToQueueDurably(share->name, lines, error)
-                                : AppendToQueue(share->name, lines, error);
-    if (!queued) {
+    if (!AppendEvent(share->name, code, path, text, refills ? Durability::SYNCED : Durability::NONE,
+                     error)) {
       FI_LOG("Failed to queue event for share[%s]: %s", share->name.c_str(), error.c_str());
       if (!RequestReindex(share->name)) {
         return false;

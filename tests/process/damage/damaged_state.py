@@ -1,10 +1,14 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """What is done to a state database, and what has to become of it."""
 
+import contextlib
 import os
 import re
+import sqlite3
+import time
 
 from harness import IndexTest, namespace
+from harness.awaiting import LIMIT
 from harness.pages import try_to_copy_log_back
 from harness.standing_in import remove
 from harness.stopped import stopped
@@ -65,9 +69,12 @@ class StateDamageTest(IndexTest):
     def in_place(self, damage):
         """To the file that the programs have open and have to read again, as its log is in it."""
         done = False
+        deadline = time.monotonic() + LIMIT
         while not done:
-            with stopped(self.pid, self.service_pid()):
-                done = try_to_copy_log_back(FILE)  # one was stopped as it used it
+            self.assertLess(time.monotonic(), deadline)
+            # One may have been stopped as it used the file.
+            with stopped(self.pid, self.service_pid()), contextlib.suppress(sqlite3.OperationalError):
+                done = try_to_copy_log_back(FILE)
                 if done:
                     damage()
 

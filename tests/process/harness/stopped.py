@@ -29,4 +29,5 @@ def stopped(*pids):
         yield
     finally:
         for pid in pids:
-            os.kill(pid, signal.SIGCONT)
+            with contextlib.suppress(ProcessLookupError):
+                os.kill(pid, signal.SIGCONT)

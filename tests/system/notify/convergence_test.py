@@ -195,7 +195,7 @@ class Convergence(WatchedDiskTest):
             self.assertLess(looks, LOOKS, f"{name}: {result}\n{self.watched(name)}")
             await_in_folder(self.queue(name), lambda: False, 0.5)
         self.longest = max(self.longest, looks)
-        self.assertEqual(self.watched(name)["compared"], compared)
+        self.assertEqual(self.watched(name)["compared"], compared, self.watched(name))
 
     def quiet(self):
         self.mend()

@@ -12,6 +12,7 @@ from harness.stopped import stopped
 from harness.watched_disks import WatchedDiskTest
 from harness.watching import ask_notifier, raise_more_events_than_are_kept
 
+
 class WaitingLines(WatchedDiskTest):
     kind = "ext4"
 
@@ -105,6 +106,21 @@ class WaitingLines(WatchedDiskTest):
         self.begin_with_update("f/x.txt", "f/y.txt", "g/z.txt", folders=("f", "g"))
         self.go_and_come_back(self.at("g/f"))
 
+    def test_folders_that_change_places_behind_an_update_of_one(self):
+        self.begin_with_update("f/x.txt", "f/y.txt", "g/k/k.txt", folders=("f", "g"))
+        for step in (
+            lambda: os.rename(self.at("f"), self.at("g/a")),
+            lambda: os.unlink(self.at("g/a/x.txt")),
+            lambda: os.rename(self.at("g/k"), self.at("f")),
+        ):
+            step()
+            self.await_written()
+        with stopped(self.notifier.pid):
+            os.rename(self.at("f"), self.at("g/z"))
+            os.rename(self.at("g/a"), self.at("f"))
+        self.await_written()
+        self.assert_converges_once_started()
+
     def test_a_folder_within_another_that_comes_back_behind_an_update_of_that(self):
         self.begin_with("f/g/x.txt", "f/y.txt", folders=("f", "f/g"))
         os.rename(self.at("f"), f"{self.elsewhere}/f")
@@ -122,6 +138,7 @@ class WaitingLines(WatchedDiskTest):
         with open(path, "w", encoding="ascii") as file:
             file.write("aardvark")
         self.await_found("aardvark")
+        self.sync()
         before = os.stat(path)
         with stopped(self.daemon_pid()):
             with open(path, "r+", encoding="ascii") as file:

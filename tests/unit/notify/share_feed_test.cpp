@@ -253,9 +253,12 @@ TEST_F(ShareFeedTest, NoReindexIsSwallowedByAnUpdateOfTheSameFolder) {
   Work();
   feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path("d"), {}, Path("from")}});
   Work();
+  feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path("to"), {}, Path("d")}});
+  Work();
   Texts all = others;
   all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "d/"), Line(CUSTOM_EVENT_REINDEX, "d/"),
-                         Line(CUSTOM_EVENT_REINDEX, "from")});
+                         Line(CUSTOM_EVENT_REINDEX, "from"), Line(CUSTOM_EVENT_REINDEX, "to"),
+                         Line(CUSTOM_EVENT_REINDEX, "d/")});
   EXPECT_EQ(Queue(), all);
 
   TakeQueue();

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
-#include "state/queued_lines.h"
+#include "state/queue_content.h"
 
 #include <json/json.h>
 
@@ -13,15 +13,15 @@
 
 namespace fileindexd {
 
-QueuedLineReader::QueuedLineReader() {
+QueueLineReader::QueueLineReader() {
   Json::CharReaderBuilder builder;
   builder["collectComments"] = false;
   reader.reset(builder.newCharReader());
 }
 
-QueuedLineReader::~QueuedLineReader() = default;
+QueueLineReader::~QueueLineReader() = default;
 
-bool QueuedLineReader::Read(std::string_view text, QueuedLine& line) const {
+bool QueueLineReader::Read(std::string_view text, LineInFile& line) const {
   try {
     Json::Value value;
     if (!reader->parse(text.data(), text.data() + text.size(), &value, nullptr) ||
@@ -38,27 +38,27 @@ bool QueuedLineReader::Read(std::string_view text, QueuedLine& line) const {
   }
 }
 
-void QueuedUpdates::Note(uint32_t event, const std::string& path) {
+void WaitingUpdates::Note(uint32_t event, const std::string& path) {
   constexpr uint32_t RENAMES = QLIB_NOTIFY_RENAME | QLIB_NOTIFY_RENAME_FULL;
   if ((event & CUSTOM_EVENT_UPDATE) != 0 && (event & RENAMES) == 0) {
     paths.insert(path);
   }
 }
 
-std::string QueuedUpdates::ReindexPath(std::string path) const {
-  while (paths.contains(path)) {
+std::string WaitingUpdates::PathInFile(uint32_t event, std::string path) const {
+  while (event == CUSTOM_EVENT_REINDEX && paths.contains(path)) {
     path += '/';
   }
   return path;
 }
 
-Queued ReadQueued(const std::string& share_name) {
+QueueContent ReadQueueContent(const std::string& share_name) {
   QueueFiles files;
   OpenQueueFiles(share_name, files);
-  const QueuedLineReader reader;
-  Queued queued;
+  const QueueLineReader reader;
+  QueueContent queued;
   std::set<std::string, ByComponents> deletes;
-  QueuedLine line;
+  LineInFile line;
   const auto note_delete = [&] {
     auto path = NormalPath(line.path);
     if ((line.event & QLIB_NOTIFY_DELETE) != 0 && path.has_value()) {
@@ -81,8 +81,14 @@ Queued ReadQueued(const std::string& share_name) {
   return queued;
 }
 
-std::string ReindexPath(const std::string& share_name, const std::string& path) {
-  return ReadQueued(share_name).updates.ReindexPath(path);
+bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
+                 const std::string& data, Durability durability, std::string& error) {
+  const auto make = [&] {
+    const WaitingUpdates updates = ReadQueueContent(share_name).updates;
+    return std::vector<std::string>{
+        EventLine(event, updates.PathInFile(event, path), std::nullopt, data)};
+  };
+  return AppendToQueue(share_name, make, durability, error);
 }
 
 }  // namespace fileindexd

@@ -1,0 +1,72 @@
+// SPDX-License-Identifier: GPL-2.0-or-later
+// What stands in a share's queue file and its drained copy, whoever wrote it. Only who holds the
+// queue's lock keeps others from adding to it meanwhile.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <set>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "state/queue_writer.h"
+
+namespace Json {
+class CharReader;
+}
+
+namespace fileindexd {
+
+// The paths as they stand in the line.
+struct LineInFile {
+  uint32_t event = 0;
+  std::string path;
+  std::string path_old;  // empty: none
+};
+
+// One thread.
+class QueueLineReader {
+ public:
+  QueueLineReader();
+  ~QueueLineReader();
+  QueueLineReader(const QueueLineReader&) = delete;
+  QueueLineReader& operator=(const QueueLineReader&) = delete;
+
+  // False for what is no event.
+  bool Read(std::string_view text, LineInFile& line) const;
+
+ private:
+  std::unique_ptr<::Json::CharReader> reader;
+};
+
+// Updates of subtrees in one queue file. Such an update swallows a reindex of its path in the same
+// batch, and does less: it neither drops what is gone below nor goes into a folder of its own.
+class WaitingUpdates {
+ public:
+  void Forget() { paths.clear(); }
+  void Note(uint32_t event, const std::string& path);
+  bool Holds(const std::string& path) const { return paths.contains(path); }
+
+  // How a line of that event has to name the path: for a reindex, with a slash behind it where an
+  // update waits. So it names the same directory, and is carried out after the update, unless a
+  // delete or a reindex of the plain path follows in the file.
+  std::string PathInFile(uint32_t event, std::string path) const;
+
+ private:
+  std::set<std::string> paths;  // as they stand in the file
+};
+
+struct QueueContent {
+  size_t lines = 0;                  // of the queue file
+  WaitingUpdates updates;            // of the queue file; its drained copy is a batch of its own
+  std::vector<std::string> deletes;  // normal paths of delete lines in both, sorted
+};
+// Reads all of both: some 20 ms for as many lines as are queued at most.
+QueueContent ReadQueueContent(const std::string& share_name);
+
+// Appends one line, as AppendToQueue, its path named by what waits at that moment.
+bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
+                 const std::string& data, Durability durability, std::string& error);
+
+}  // namespace fileindexd
