@@ -2,6 +2,7 @@
 // dump: a whole index, entry by entry.
 #include "ctl/commands.h"
 #include "ctl/output.h"
+#include "ctl/pending.h"
 #include "ctl/places.h"
 #include "index/found_kind.h"
 #include "index/reader.h"
@@ -39,9 +40,12 @@ int Dump(const Arguments& arguments) {
   }
 
   EntryReader reader;
-  const IndexError opened = OpenAndTell(reader.database, share->name);
-  if (opened == IndexError::PATH_NOT_FOUND) {  // nothing was indexed yet
-    return EXIT_DONE;
+  IndexError opened = OpenAndTell(reader.database, share->name);
+  if (opened == IndexError::PATH_NOT_FOUND) {
+    if (!IsIndexExpected(*session.store, *session.settings, share->name)) {
+      return EXIT_DONE;  // nothing was indexed yet
+    }
+    opened = OpenAndTell(reader.database, share->name);  // it may just have been made
   }
   if (opened != IndexError::NONE) {
     return Fail(EXIT_FAILED, "%s: index: %s", share->name.c_str(), IndexErrorText(opened));

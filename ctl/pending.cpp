@@ -5,6 +5,7 @@
 #include <string_view>
 #include <utility>
 
+#include "index/reader.h"
 #include "state/event_codes.h"
 #include "state/layout.h"
 #include "state/progress.h"
@@ -87,6 +88,11 @@ bool IsIndexExpected(StateStore& store, const Settings& settings, const std::str
   return has_folders && WaitingLines(share_name) == 0 && store.GetStatus(share_name, status) &&
          !status.needs_reindex && !status.reindex_begun &&
          !ReadProgress(WorkerProgressPath(share_name), work);
+}
+
+// Looked for last: it may just have been made.
+bool IsIndexLost(StateStore& store, const Settings& settings, const std::string& share_name) {
+  return IsIndexExpected(store, settings, share_name) && EntryReader::IsMissing(share_name);
 }
 
 }  // namespace fileindexd

@@ -32,5 +32,7 @@ Pending ReadPending(const std::string& share_name, const std::string& path);
 // Whether a share's index would have to be there: it has indexed folders, and nothing is on the way
 // that makes one, no line in its queue, no reindex that was asked for, and no Worker at work.
 bool IsIndexExpected(StateStore& store, const Settings& settings, const std::string& share_name);
+// Whether that share has no folder for one.
+bool IsIndexLost(StateStore& store, const Settings& settings, const std::string& share_name);
 
 }  // namespace fileindexd

@@ -18,7 +18,6 @@
 #include "ctl/terminal/screen.h"
 #include "ctl/values.h"
 #include "ctl/wait.h"
-#include "index/reader.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -84,9 +83,7 @@ bool ChooseShares(const Session& session, const Arguments& arguments, Question& 
 
 void FindLost(const Session& session, Question& question) {
   for (const std::string& share : question.shares) {
-    // In this order: it may just be made.
-    if (IsIndexExpected(*session.store, *session.settings, share) &&
-        EntryReader::IsMissing(share)) {
+    if (IsIndexLost(*session.store, *session.settings, share)) {
       question.lost.push_back(share);
     }
   }

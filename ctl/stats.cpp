@@ -2,12 +2,16 @@
 // stats: numbers and bytes, from the index alone.
 #include <chrono>
 #include <optional>
+#include <string>
+#include <vector>
 
 #include "ctl/commands.h"
 #include "ctl/output.h"
+#include "ctl/pending.h"
 #include "ctl/places.h"
 #include "ctl/stats_output.h"
 #include "ctl/values.h"
+#include "index/database.h"
 
 namespace fileindexd {
 
@@ -62,8 +66,14 @@ int Stats(const Arguments& arguments) {
   if (arguments.in_share && session.FindShare(*arguments.in_share) == nullptr) {
     return EXIT_FAILED;
   }
+  std::vector<std::string> failures;
   for (const Share& share : session.settings->shares) {
-    if (!arguments.in_share || share.name == *arguments.in_share) {
+    if (arguments.in_share && share.name != *arguments.in_share) {
+      continue;
+    }
+    if (IsIndexLost(*session.store, *session.settings, share.name)) {
+      failures.push_back("share " + share.name + ": " + IndexErrorText(IndexError::PATH_NOT_FOUND));
+    } else {
       wish.shares.push_back(share);
     }
   }
@@ -73,7 +83,8 @@ int Stats(const Arguments& arguments) {
     const Progress progress("counting");
     Gather(wish, statistics);
   }
-  const bool is_answered = statistics.failures.empty() || statistics.answered > 0;
+  failures.insert(failures.end(), statistics.failures.begin(), statistics.failures.end());
+  const bool is_answered = failures.empty() || statistics.answered > 0;
   if (is_answered && arguments.json) {
     (void)PutJson(StatisticsObject(wish, statistics));
   } else if (is_answered) {
@@ -81,7 +92,7 @@ int Stats(const Arguments& arguments) {
       (void)PutLine(line);
     }
   }
-  return FailAll(statistics.failures);
+  return FailAll(failures);
 }
 
 }  // namespace fileindexd

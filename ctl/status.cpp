@@ -29,7 +29,7 @@ void ReadIndex(Session& session, ShareReport& report) {
   if (opened == IndexError::PATH_NOT_FOUND) {
     // It may just have been made.
     if (IsIndexExpected(*session.store, *session.settings, report.share.name) &&
-        EntryReader::IsMissing(report.share.name)) {
+        reader.Open(report.share.name) == IndexError::PATH_NOT_FOUND) {
       report.index_problem =
           "missing; to make it anew: fileindexctl reindex " + OneLine(report.share.path);
     }

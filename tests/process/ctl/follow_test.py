@@ -377,6 +377,10 @@ class MissingIndexTest(IndexTest):
 
         self.assertRegex(self.share()["index_problem"], "missing")
         self.assertIn(b"index: missing", self.ctl("status").out)
+        for question in (("dump", "alpha"), ("stats",), ("stats", "--duplicates"), ("search", "a")):
+            asked = self.ctl(*question, code=1)
+            self.assertEqual(asked.out, b"")
+            self.assertIn(b"there is no index", asked.err)
 
     def test_share_without_folders_needs_none(self):
         self.make_share(folders=())
