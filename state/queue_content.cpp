@@ -84,9 +84,11 @@ QueueContent ReadQueueContent(const std::string& share_name) {
 bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
                  const std::string& data, Durability durability, std::string& error) {
   const auto make = [&] {
-    const WaitingUpdates updates = ReadQueueContent(share_name).updates;
-    return std::vector<std::string>{
-        EventLine(event, updates.PathInFile(event, path), std::nullopt, data)};
+    // Only a reindex may be named otherwise.
+    const std::string named = event == CUSTOM_EVENT_REINDEX
+                                  ? ReadQueueContent(share_name).updates.PathInFile(event, path)
+                                  : path;
+    return std::vector<std::string>{EventLine(event, named, std::nullopt, data)};
   };
   return AppendToQueue(share_name, make, durability, error);
 }

@@ -31,6 +31,34 @@ bool SyncFolder(const std::string& folder, std::string& error) {
   return true;
 }
 
+using MakeText = std::function<bool(std::string& text)>;
+
+bool Append(const std::string& share_name, const MakeText& make, Durability durability,
+            std::string& error) {
+  if (!MakeShareFolder(share_name, error)) {
+    return false;
+  }
+  const std::string path = QueuePath(share_name);
+  ScopedFd queue;
+  struct stat held {};
+  std::string text;
+  if (LockQueue(path, LOCK_WAIT, queue, held, error) != QueueLock::TAKEN || !make(text) ||
+      !WriteLines(queue, path, std::move(text), held.st_size, error)) {
+    return false;
+  }
+  if (durability == Durability::SYNCED && fsync(queue.fd) != 0) {
+    error = QueueReason("sync", path);
+    return false;
+  }
+
+  // The one unlock. Whoever waits for the lock must find the lines written.
+  if (close(queue.Release()) != 0 && errno != EINTR) {
+    error = QueueReason("close", path);
+    return false;
+  }
+  return durability == Durability::NONE || SyncFolder(ShareFolder(share_name), error);
+}
+
 }  // namespace
 
 std::string EventLine(uint32_t event, std::string_view path,
@@ -52,29 +80,8 @@ std::string EventLine(uint32_t event, std::string_view path,
 
 bool AppendToQueue(const std::string& share_name, const MakeLines& make, Durability durability,
                    std::string& error) {
-  if (!MakeShareFolder(share_name, error)) {
-    return false;
-  }
-  const std::string path = QueuePath(share_name);
-  ScopedFd queue;
-  struct stat held {};
-  std::string text;
-  if (LockQueue(path, LOCK_WAIT, queue, held, error) != QueueLock::TAKEN ||
-      !JoinLines(make(), text, error) ||
-      !WriteLines(queue, path, std::move(text), held.st_size, error)) {
-    return false;
-  }
-  if (durability == Durability::SYNCED && fsync(queue.fd) != 0) {
-    error = QueueReason("sync", path);
-    return false;
-  }
-
-  // The one unlock. Whoever waits for the lock must find the lines written.
-  if (close(queue.Release()) != 0 && errno != EINTR) {
-    error = QueueReason("close", path);
-    return false;
-  }
-  return durability == Durability::NONE || SyncFolder(ShareFolder(share_name), error);
+  const auto join = [&](std::string& text) { return JoinLines(make(), text, error); };
+  return Append(share_name, join, durability, error);
 }
 
 bool AppendToQueue(const std::string& share_name, const std::vector<std::string>& lines,
@@ -83,10 +90,12 @@ bool AppendToQueue(const std::string& share_name, const std::vector<std::string>
     ScopedFd queue;
     return MakeShareFolder(share_name, error) && OpenQueue(QueuePath(share_name), queue, error);
   }
-  std::string text;
-  return JoinLines(lines, text, error) &&
-         AppendToQueue(
-             share_name, [&lines] { return lines; }, Durability::NONE, error);
+  std::string joined;
+  const auto take = [&joined](std::string& text) {
+    text.swap(joined);
+    return true;
+  };
+  return JoinLines(lines, joined, error) && Append(share_name, take, Durability::NONE, error);
 }
 
 bool TouchQueue(const std::string& share_name, std::string& error) {
