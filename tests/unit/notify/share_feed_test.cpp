@@ -7,7 +7,6 @@
 #include <unistd.h>
 
 #include <csignal>
-#include <sstream>
 
 #include "base/event_codes.h"
 #include "base/scoped_fd.h"
@@ -15,39 +14,20 @@
 #include "state/filesystem.h"
 #include "state/layout.h"
 #include "state/queue_writer.h"
-#include "tests/unit/notify/feed_fixture.h"
+#include "tests/unit/notify/queue_feed_fixture.h"
 
 namespace fileindexd {
 namespace {
 
 using std::chrono::milliseconds;
 using std::chrono::seconds;
-using Texts = std::vector<std::string>;
 
-class ShareFeedTest : public FeedTest {
+class ShareFeedTest : public QueueFeedTest {
  protected:
-  ShareFeedTest() : queue(QueuePath("s")) {}
-
-  void Add(const Change& change) { feed.Add(settings, change, now); }
-  void Work(bool everything = false) { feed.Work(settings, now, everything); }
   void AddWritten(int files, const std::string& below = "") {
     for (int i = 0; i < files; ++i) {
       Add(File(WRITTEN, below + std::to_string(i)));
     }
-  }
-  // As when the daemon takes it.
-  void TakeQueue() const { ASSERT_EQ(rename(queue.c_str(), DrainedPath("s").c_str()), 0); }
-
-  Texts Queue() const {
-    std::istringstream text(ReadFile(queue));
-    Texts lines;
-    for (std::string line; std::getline(text, line);) {
-      lines.push_back(line);
-    }
-    return lines;
-  }
-  std::string Line(uint32_t event, const std::string& name) const {
-    return EventLine(event, Path(name));
   }
 
   // Instead of the one folder in it.
@@ -66,9 +46,6 @@ class ShareFeedTest : public FeedTest {
     }
     ASSERT_TRUE(writer.Commit());
   }
-
-  const std::string queue;
-  ShareFeed feed{"s"};
 };
 
 TEST_F(ShareFeedTest, LinesAreSortedByDirectoryAndKeepEveryByte) {
@@ -199,93 +176,6 @@ TEST_F(ShareFeedTest, LinesOfOthersNeedNoLook) {
   EXPECT_EQ(Queue(), Texts({Line(CUSTOM_EVENT_REINDEX, "d"),
                             EventLine(CUSTOM_EVENT_UPDATE, Path("u"), {}, "{\"photo\":true}"),
                             EventLine(QLIB_NOTIFY_RENAME, Path("x"), Path("y"))}));
-}
-
-TEST_F(ShareFeedTest, AnUpdateOfWhatWasRenamedHasItWalkedUntilTheQueueIsTaken) {
-  MakeDirectory("attributes");
-  for (const char* name : {"attributes", "modified", "written", "twice"}) {
-    feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path(name), {}, Path("from")}});
-  }
-  Work();
-  const Texts renames = Queue();
-  ASSERT_EQ(renames.size(), 4U);
-  Make("written");
-  Add(Directory(ATTRIBUTES, "attributes"));
-  Add(File(WRITTEN, "written"));
-  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("modified"), {}},
-                           {QLIB_NOTIFY_RENAME, Path("twice"), {}, Path("elsewhere")},
-                           {QLIB_NOTIFY_ATTRIB, Path("other"), {}}});
-  Work();
-  Texts all = renames;
-  all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "attributes"),
-                         Line(CUSTOM_EVENT_REINDEX, "modified"), Line(QLIB_NOTIFY_ATTRIB, "other"),
-                         EventLine(QLIB_NOTIFY_RENAME, Path("twice"), Path("elsewhere")),
-                         Line(QLIB_NOTIFY_CLOSE_WRITE, "written")});
-  EXPECT_EQ(Queue(), all);
-
-  TakeQueue();
-  Add(Directory(ATTRIBUTES, "attributes"));
-  Work();
-  EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_ATTRIB, "attributes")}));
-}
-
-TEST_F(ShareFeedTest, AFileThatWasWrittenToIsReadAnewWhateverFollowsInTheSameFile) {
-  Make("a");
-  Make("m");
-  Add(File(WRITTEN, "a"));
-  Add(File(WRITTEN, "m"));
-  Work();
-  Texts lines = Queue();
-  ASSERT_EQ(lines.size(), 2U);
-  Add(File(ATTRIBUTES, "a"));
-  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("m"), {}}});
-  Work();
-
-  lines.insert(lines.end(), {Line(QLIB_NOTIFY_CLOSE_WRITE, "a"), Line(CUSTOM_EVENT_REINDEX, "m")});
-  EXPECT_EQ(Queue(), lines);
-}
-
-TEST_F(ShareFeedTest, NoReindexIsSwallowedByAnUpdateOfTheSameFolder) {
-  const Texts others = {EventLine(CUSTOM_EVENT_UPDATE, Path("d"), {}, "{\"photo\":true}")};
-  std::string error;
-  ASSERT_TRUE(AppendToQueue("s", others, error)) << error;
-  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, Path("d"), {}}});
-  Work();
-  feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path("d"), {}, Path("from")}});
-  Work();
-  feed.AddLines(settings, {{QLIB_NOTIFY_RENAME, Path("to"), {}, Path("d")}});
-  Work();
-  Texts all = others;
-  all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "d/"), Line(CUSTOM_EVENT_REINDEX, "d/"),
-                         Line(CUSTOM_EVENT_REINDEX, "from"), Line(CUSTOM_EVENT_REINDEX, "to"),
-                         Line(CUSTOM_EVENT_REINDEX, "d/")});
-  EXPECT_EQ(Queue(), all);
-
-  TakeQueue();
-  feed.AddLines(settings, {{CUSTOM_EVENT_REINDEX, Path("d"), {}}});
-  Work();
-  EXPECT_EQ(Queue(), Texts({Line(CUSTOM_EVENT_REINDEX, "d")}));
-}
-
-// As one that was stopped meanwhile has left it.
-TEST_F(ShareFeedTest, ADeleteOfAnotherWriterThatWaitsIsLookedAtAgainBehindAReindexAboveIt) {
-  MakeDirectory("d/again");
-  const Texts others = {Line(QLIB_NOTIFY_DELETE, "d/again"),
-                        Line(QLIB_NOTIFY_DELETE, "d/gone"),
-                        "no event",
-                        EventLine(QLIB_NOTIFY_RENAME, Path("to"), Path("from")),
-                        Line(QLIB_NOTIFY_ATTRIB, "to"),
-                        "{\"path\":\"" + Path("d/again") + "\"}"};
-  std::string error;
-  ASSERT_TRUE(AppendToQueue("s", others, error)) << error;
-  feed.AddLines(settings,
-                {{CUSTOM_EVENT_REINDEX, Path("d"), {}}, {QLIB_NOTIFY_MODIFY, Path("to"), {}}});
-  Work();
-
-  Texts all = others;
-  all.insert(all.end(), {Line(CUSTOM_EVENT_REINDEX, "d"), Line(CUSTOM_EVENT_REINDEX, "to"),
-                         Line(CUSTOM_EVENT_REINDEX, "d/again")});
-  EXPECT_EQ(Queue(), all);
 }
 
 TEST_F(ShareFeedTest, ACrowdBecomesOneReindexIfTheIndexHoldsFew) {
