@@ -33,9 +33,9 @@ TEST_F(SentLinesTest, AnUpdateOfWhatWasRenamedHasItWalkedUntilTheQueueIsTaken) {
   EXPECT_EQ(Queue(), all);
 
   TakeQueue();
-  Add(Directory(ATTRIBUTES, "attributes"));
+  feed.AddLines(settings, {{QLIB_NOTIFY_MODIFY, Path("twice"), {}}});
   Work();
-  EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_ATTRIB, "attributes")}));
+  EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_MODIFY, "twice")}));
 }
 
 TEST_F(SentLinesTest, AFileThatWasWrittenToIsReadAnewWhateverFollowsInTheSameFile) {
@@ -52,6 +52,11 @@ TEST_F(SentLinesTest, AFileThatWasWrittenToIsReadAnewWhateverFollowsInTheSameFil
 
   lines.insert(lines.end(), {Line(QLIB_NOTIFY_CLOSE_WRITE, "a"), Line(CUSTOM_EVENT_REINDEX, "m")});
   EXPECT_EQ(Queue(), lines);
+
+  TakeQueue();
+  Add(File(ATTRIBUTES, "a"));
+  Work();
+  EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_ATTRIB, "a")}));
 }
 
 TEST_F(SentLinesTest, NoReindexIsSwallowedByAnUpdateOfTheSameFolder) {
