@@ -145,21 +145,22 @@ IndexError EntryReader::Find(const std::string& path, std::optional<Entry>& entr
 }
 
 // There is one writer at a time: once anybody has committed, or nobody writes at this moment, the
-// one of then has ended. Nothing is written here.
+// one of then has ended. Nothing is written here. (SQLite's own data_version also changes when a
+// writer begins its log anew, before it has committed.)
 bool EntryReader::HasWriterEnded(int milliseconds) {
   sqlite3* db = database.db;
   Statement ask;
-  int64_t version = 0;
+  int64_t written = 0;
   bool found = false;
-  const int code = ask.Prepare(db, "PRAGMA data_version");
-  if (code != SQLITE_OK || ask.ReadOne(found, [&] { version = ask.Int(0); }) != SQLITE_OK ||
+  const int code = ask.Prepare(db, "SELECT last_written FROM meta WHERE id = 1");
+  if (code != SQLITE_OK || ask.ReadOne(found, [&] { written = ask.Int(0); }) != SQLITE_OK ||
       !found) {
     return true;
   }
-  if (first_version.value_or(version) != version) {
+  if (first_written.value_or(written) != written) {
     return true;
   }
-  first_version = version;
+  first_written = written;
 
   sqlite3_busy_timeout(db, milliseconds);
   (void)Execute(db, "PRAGMA query_only = 0");

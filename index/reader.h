@@ -62,7 +62,7 @@ class EntryReader {
  private:
   bool Ends(bool is_read);  // sets read_error
 
-  std::optional<int64_t> first_version;  // of the data, when HasWriterEnded was first asked
+  std::optional<int64_t> first_written;  // `last_written` when HasWriterEnded was first asked
 };
 
 }  // namespace fileindexd

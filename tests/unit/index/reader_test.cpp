@@ -6,6 +6,7 @@
 
 #include "index/schema.h"
 #include "state/layout.h"
+#include "state/sqlite.h"
 #include "tests/unit/index/fixture.h"
 
 namespace fileindexd {
@@ -24,6 +25,31 @@ TEST_F(ReaderTest, EntryTellsWhatTheDiskShows) {
   EXPECT_GT(entry.mtime, 0);
   EXPECT_GE(entry.first_seen, entry.mtime);
   EXPECT_EQ(entry.mode & 0777U, ModeOf(At("a.txt")));
+}
+
+// What a writer puts into its log before it commits is no commit, though the log begins anew.
+TEST_F(ReaderTest, AWriterThatHasBegunALogHasNotEnded) {
+  AddAll();
+  EntryReader reader;
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  IndexDatabase other;
+  ASSERT_EQ(other.OpenForWriting(IndexPath("s"), false), IndexError::NONE);
+  // All of the log is copied back: the next writer begins it anew.
+  ASSERT_EQ(Execute(other.db,
+                    "PRAGMA wal_checkpoint(RESTART); PRAGMA cache_size = 1;"
+                    "BEGIN IMMEDIATE"),
+            SQLITE_OK);
+  EXPECT_FALSE(reader.HasWriterEnded(0));
+
+  ASSERT_EQ(Execute(other.db,
+                    "CREATE TABLE filling AS WITH RECURSIVE n(i) AS"
+                    " (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 2000)"
+                    " SELECT i, randomblob(400) AS more FROM n"),
+            SQLITE_OK);
+  EXPECT_FALSE(reader.HasWriterEnded(0));
+
+  ASSERT_EQ(Execute(other.db, "ROLLBACK"), SQLITE_OK);
+  EXPECT_TRUE(reader.HasWriterEnded(0));
 }
 
 TEST_F(ReaderTest, DirectoryHasNoSizeAndNoTime) {
