@@ -90,9 +90,10 @@ bool IsIndexExpected(StateStore& store, const Settings& settings, const std::str
          !ReadProgress(WorkerProgressPath(share_name), work);
 }
 
-// Looked for last: it may just have been made.
+// Looked for first, as it mostly is there, and last: it may just have been made.
 bool IsIndexLost(StateStore& store, const Settings& settings, const std::string& share_name) {
-  return IsIndexExpected(store, settings, share_name) && EntryReader::IsMissing(share_name);
+  return EntryReader::IsMissing(share_name) && IsIndexExpected(store, settings, share_name) &&
+         EntryReader::IsMissing(share_name);
 }
 
 }  // namespace fileindexd
