@@ -339,8 +339,8 @@ class WrittenMeanwhileTest : public HealerTest {
     ASSERT_EQ(sqlite3_open(file.c_str(), &other), SQLITE_OK);
     int keep = 1;
     sqlite3_file_control(other, "main", SQLITE_FCNTL_PERSIST_WAL, &keep);
-    const std::string sql =
-        "BEGIN IMMEDIATE; DELETE FROM entries WHERE path = CAST('" + At("a") + "' AS BLOB)";
+    const std::string sql = "BEGIN IMMEDIATE; DELETE FROM entries WHERE path = CAST('" + At("a") +
+                            "' AS BLOB); UPDATE meta SET last_written = last_written + 1";
     ASSERT_EQ(Execute(other, sql.c_str()), SQLITE_OK);
   }
   ~WrittenMeanwhileTest() override { sqlite3_close(other); }
