@@ -29,8 +29,8 @@ enum class Appended {
 class QueueAppender {
  public:
   // Called with each line that another program has written into the file that lines are about to be
-  // given to, once, in their order. (Ours may be among them behind a half line, or after a failure
-  // to read.)
+  // given to, once, in their order. (Where the last has no newline it comes again, with ours behind
+  // it, as do lines after a failure to read.)
   using Meet = std::function<void(std::string_view line)>;
 
   explicit QueueAppender(std::string name_of_share, Meet meet_line = {})

@@ -61,6 +61,9 @@ off_t ForEachQueueLine(const ScopedFd& file, const std::function<void(std::strin
     }
     text.erase(0, begin);
   }
+  if (!text.empty()) {
+    visit(text);
+  }
   return offset - static_cast<off_t>(text.size());
 }
 

@@ -22,9 +22,9 @@ struct QueueFiles {
 // drained copy alone.
 void OpenQueueFiles(const std::string& share_name, QueueFiles& files);
 
-// Calls `visit` with each whole line from byte `offset` on, without its newline. What stands behind
-// the last newline is being written, and is passed over, as is what cannot be read: returns where
-// it begins. Nothing is read of a file that is -1.
+// Calls `visit` with each line from byte `offset` on, without its newline, in the end with what
+// stands behind the last newline: it may be half a line, so where it begins is returned. What
+// cannot be read is passed over. Nothing is read of a file that is -1.
 off_t ForEachQueueLine(const ScopedFd& file, const std::function<void(std::string_view)>& visit,
                        off_t offset = 0);
 
