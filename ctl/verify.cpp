@@ -33,24 +33,36 @@ bool PutDifference(Difference difference, const std::string& path, const Argumen
   return PutJson(object);
 }
 
-int QueueRepair(const std::string& share_name, Repair& repair) {
-  if (repair.Lines(QUEUE_LINE_LIMIT).empty()) {
+// Behind what mends the differences stand the lines for what deletes take away that wait, whatever
+// the index holds by now.
+int QueueRepair(const std::string& share_name, Repair& repair, std::vector<QueueLine> returned) {
+  if (repair.IsEmpty() && returned.empty()) {
     return EXIT_DONE;
+  }
+  const bool is_cut = returned.size() >= QUEUE_LINE_LIMIT;
+  if (is_cut) {
+    returned.resize(QUEUE_LINE_LIMIT - 1);
   }
   const auto make = [&] {
     const QueueContent queued = ReadQueueContent(share_name);
-    std::vector<std::string> lines;
-    for (const QueueLine& line :
-         repair.Lines(QUEUE_LINE_LIMIT - std::min(queued.lines, QUEUE_LINE_LIMIT))) {
-      lines.push_back(EventLine(line.event, queued.updates.PathInFile(line.event, line.path),
-                                std::nullopt, line.data));
+    const size_t others = std::min(queued.lines + returned.size(), QUEUE_LINE_LIMIT);
+    std::vector<std::string> texts;
+    for (const auto& lines : {repair.Lines(QUEUE_LINE_LIMIT - others), returned}) {
+      for (const QueueLine& line : lines) {
+        texts.push_back(queued.TextOf(line));
+      }
     }
-    return lines;
+    return texts;
   };
   std::string error;
-  return AppendToQueue(share_name, make, Durability::NONE, error)
-             ? EXIT_DONE
-             : Fail(EXIT_FAILED, "%s", error.c_str());
+  if (!AppendToQueue(share_name, make, Durability::NONE, error)) {
+    return Fail(EXIT_FAILED, "%s", error.c_str());
+  }
+  return is_cut ? Fail(EXIT_FAILED,
+                       "%s: more deletes wait than can be mended at once; verify again once they"
+                       " are worked off",
+                       share_name.c_str())
+                : EXIT_DONE;
 }
 
 // Compares to the end, or until `report` wants no more, and says meanwhile how far it is.
@@ -92,17 +104,6 @@ int TellUnreadable(const Comparison& counts) {
   return Fail(EXIT_FAILED, "%s", text.c_str());
 }
 
-// Deletes that wait take away what is there again, whatever the index holds by now.
-void AddReturned(const Settings& settings, const std::vector<std::string>& deletes,
-                 Repair& repair) {
-  for (const std::string& path : deletes) {
-    const Look look = LookAt(settings, path);
-    if (look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN) {
-      (void)repair.Add({Difference::MISSING, path, Thing::NONE, look.thing});
-    }
-  }
-}
-
 // For an index that is to be made: what is missing comes with its folder.
 void ReindexFolders(const Settings& settings, const Share& share, Repair& repair) {
   for (const IndexedFolder& folder : settings.folders) {
@@ -124,7 +125,11 @@ int Verify(const Arguments& arguments) {
     return EXIT_FAILED;
   }
 
-  const std::vector<std::string> deletes = ReadQueueContent(share->name).deletes;
+  // Read before the comparison, which may find in order what they then take away.
+  std::vector<std::string> deletes;
+  if (arguments.repair) {
+    deletes = ReadQueueContent(share->name).deletes;
+  }
   Comparer comparer(*session.store, share->name);
   EntryReader reader;  // counts for the repair, beside the comparison's own
   comparer.missing_is_empty = true;
@@ -154,8 +159,7 @@ int Verify(const Arguments& arguments) {
     return is_read ? code : TellUnreadable(comparer.counts);
   }
 
-  AddReturned(*session.settings, deletes, repair);
-  const int queued = QueueRepair(share->name, repair);
+  const int queued = QueueRepair(share->name, repair, LinesOfReturned(*session.settings, deletes));
   if (queued == EXIT_DONE && !mended) {
     return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",
                 share->name.c_str());

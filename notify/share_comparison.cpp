@@ -5,7 +5,6 @@
 #include <ctime>
 
 #include "notify/log.h"
-#include "notify/sent_lines.h"
 #include "state/queue_content.h"
 #include "state/queue_writer.h"
 

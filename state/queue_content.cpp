@@ -3,13 +3,15 @@
 
 #include <json/json.h>
 
+#include <algorithm>
 #include <exception>
+#include <iterator>
 #include <utility>
 
 #include "base/event_codes.h"
+#include "state/belonging.h"
 #include "state/layout.h"
 #include "state/queue_files.h"
-#include "state/queue_folding.h"
 
 namespace fileindexd {
 
@@ -81,14 +83,44 @@ QueueContent ReadQueueContent(const std::string& share_name) {
   return queued;
 }
 
-bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
-                 const std::string& data, Durability durability, std::string& error) {
+std::string QueueContent::TextOf(const QueueLine& line) const {
+  return EventLine(line.event, updates.PathInFile(line.event, line.path), std::nullopt, line.data);
+}
+
+// A reindex removes what is gone by then, which an add passes over. Of what nobody can look at the
+// daemon shall keep the entry.
+std::vector<QueueLine> LinesOfReturned(const Settings& settings,
+                                       const std::vector<std::string>& deletes) {
+  std::vector<QueueLine> lines;
+  FolderView folder;
+  for (const std::string& path : deletes) {
+    const Verdict verdict = LookNear(settings, path, folder).verdict;
+    if (verdict == Verdict::BELONGS) {
+      lines.push_back({CUSTOM_EVENT_REINDEX, path, {}, {}});
+    } else if (verdict == Verdict::UNKNOWN) {
+      lines.push_back({QLIB_NOTIFY_MODIFY, path, {}, {}});
+    }
+  }
+  return lines;
+}
+
+bool AppendEvent(const Settings& settings, const std::string& share_name, uint32_t event,
+                 const std::string& path, const std::string& data, Durability durability,
+                 std::string& error) {
   const auto make = [&] {
-    // Only a reindex may be named otherwise.
-    const std::string named = event == CUSTOM_EVENT_REINDEX
-                                  ? ReadQueueContent(share_name).updates.PathInFile(event, path)
-                                  : path;
-    return std::vector<std::string>{EventLine(event, named, std::nullopt, data)};
+    // Of no other event the content of the queue matters.
+    const QueueContent queued =
+        event == CUSTOM_EVENT_REINDEX ? ReadQueueContent(share_name) : QueueContent{};
+    const std::string directory = NormalPath(path).value_or(path);
+    std::vector<std::string> below;
+    std::ranges::copy_if(queued.deletes, std::back_inserter(below), [&](const auto& deleted) {
+      return deleted != directory && Covers(directory, deleted);
+    });
+    std::vector<std::string> lines = {queued.TextOf({event, path, data, {}})};
+    for (const QueueLine& line : LinesOfReturned(settings, below)) {
+      lines.push_back(queued.TextOf(line));
+    }
+    return lines;
   };
   return AppendToQueue(share_name, make, durability, error);
 }

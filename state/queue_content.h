@@ -10,7 +10,9 @@
 #include <string_view>
 #include <vector>
 
+#include "state/queue_folding.h"
 #include "state/queue_writer.h"
+#include "state/settings.h"
 
 namespace Json {
 class CharReader;
@@ -61,12 +63,27 @@ struct QueueContent {
   size_t lines = 0;                  // of the queue file
   WaitingUpdates updates;            // of the queue file; its drained copy is a batch of its own
   std::vector<std::string> deletes;  // normal paths of delete lines in both, sorted
+
+  // A line that names its path by what waits. No rename.
+  std::string TextOf(const QueueLine& line) const;
 };
 // Reads all of both: some 20 ms for as many lines as are queued at most.
 QueueContent ReadQueueContent(const std::string& share_name);
 
-// Appends one line, as AppendToQueue, its path named by what waits at that moment.
-bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
-                 const std::string& data, Durability durability, std::string& error);
+// Lines for those of the deleted paths that are there again, in their order; sorted paths are the
+// quickest.
+//
+// A delete takes the entry away whatever the disk holds by then, and the daemon executes a batch
+// from the top of its tree downwards: a delete that was queued before the reindex of a directory
+// above it is executed after it, and takes away what came back with that directory. These lines
+// take its place: they are not to be taken in by any reindex.
+std::vector<QueueLine> LinesOfReturned(const Settings& settings,
+                                       const std::vector<std::string>& deletes);
+
+// Appends the line of one event, as AppendToQueue, its path named by what waits at that moment, and
+// behind a reindex what it needs to be complete.
+bool AppendEvent(const Settings& settings, const std::string& share_name, uint32_t event,
+                 const std::string& path, const std::string& data, Durability durability,
+                 std::string& error);
 
 }  // namespace fileindexd

@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Lines that wait for a daemon that does not run: none of them swallows what is asked for later."""
 
+import json
 import os
 import shutil
 
@@ -18,6 +19,12 @@ class WaitingTest(IndexTest):
 
     def at(self, name):
         return f"{self.root}/{name}"
+
+    def delete(self, *names):
+        """Of what is there, or came back. With the one elsewhere a reindex above them is executed
+        before them, and not behind."""
+        for name in ("elsewhere.txt", *names):
+            self.ctl("event", "alpha", str(DELETE), self.at(name))
 
     def assert_mended(self):
         self.start(debug=False)
@@ -53,9 +60,41 @@ class WaitingTest(IndexTest):
 
     def test_a_repair_behind_a_delete_of_what_came_back(self):
         self.prepare("x.txt", "d/y.txt")
-        for name in ("x.txt", "d", "gone.txt"):
-            self.ctl("event", "alpha", str(DELETE), self.at(name))
+        self.delete("x.txt", "d")
         self.assertEqual(self.ctl("verify", "alpha", "--repair").out, b"")
+        self.assert_mended()
+
+    def test_a_repair_of_a_folder_above_a_delete_of_what_came_back(self):
+        self.prepare("z.txt")
+        self.make_files(self.root, "d/x.txt", "d/y.txt")
+        self.delete("d/x.txt")
+        self.ctl("verify", "alpha", "--repair")
+        self.assert_mended()
+
+    def test_a_reindex_above_a_delete_of_what_came_back(self):
+        self.prepare("d/x.txt", "d/e/y.txt", "d/z.txt")
+        self.delete("d/x.txt", "d/e", "d/gone.txt")
+        self.ctl("reindex", self.at("d"))
+        self.assert_mended()
+
+    def test_other_excludes_above_a_delete_of_what_came_back(self):
+        self.prepare("f/x.txt", "f/y.o", folders=("f",))
+        self.delete("f/x.txt", "f/y.o")
+        self.ctl("folder", "set", self.at("f"), "--exclude", "*.o")
+        self.assert_mended()
+
+    def test_a_folder_that_is_added_above_a_delete_of_what_came_back(self):
+        self.prepare("f/x.txt", "g/y.txt", folders=("g",))
+        self.delete("f/x.txt")
+        self.ctl("folder", "add", self.at("f"))
+        self.assert_mended()
+
+    def test_a_delete_whose_line_has_no_newline(self):
+        self.prepare("d/x.txt", "d/y.txt")
+        with open(self.queue("alpha"), "w", encoding="ascii") as queue:
+            lines = [{"event": DELETE, "path": self.at(n)} for n in ("elsewhere.txt", "d/x.txt")]
+            queue.write("\n".join(map(json.dumps, lines)))
+        self.ctl("reindex", self.at("d"))
         self.assert_mended()
 
 

@@ -2,6 +2,10 @@
 #include "state/queue_content.h"
 
 #include <gmock/gmock.h>
+#include <sys/stat.h>
+
+#include <filesystem>
+#include <sstream>
 
 #include "base/event_codes.h"
 #include "state/layout.h"
@@ -12,12 +16,21 @@ namespace fileindexd {
 namespace {
 
 using testing::ElementsAre;
+using testing::IsEmpty;
 
 class QueueContentTest : public StateTest {
  protected:
   void Append(const std::vector<std::string>& lines) {
     std::string error;
     ASSERT_TRUE(AppendToQueue("s", lines, error)) << error;
+  }
+  static std::vector<std::string> Queue() {
+    std::istringstream text(ReadFile(QueuePath("s")));
+    std::vector<std::string> lines;
+    for (std::string line; std::getline(text, line);) {
+      lines.push_back(line);
+    }
+    return lines;
   }
   // What a reindex is queued as.
   static std::string Named(const std::string& path) {
@@ -47,7 +60,7 @@ TEST_F(QueueContentTest, OneLineIsAppendedByWhatWaitsThen) {
   std::string error;
   Append({EventLine(CUSTOM_EVENT_UPDATE, "/s/f")});
   for (const uint32_t event : {CUSTOM_EVENT_UPDATE, CUSTOM_EVENT_REINDEX}) {
-    EXPECT_TRUE(AppendEvent("s", event, "/s/f", "{}", Durability::SYNCED, error)) << error;
+    EXPECT_TRUE(AppendEvent({}, "s", event, "/s/f", "{}", Durability::SYNCED, error)) << error;
   }
 
   EXPECT_EQ(ReadFile(QueuePath("s")), EventLine(CUSTOM_EVENT_UPDATE, "/s/f") + "\n" +
@@ -56,8 +69,56 @@ TEST_F(QueueContentTest, OneLineIsAppendedByWhatWaitsThen) {
                                           "\n");
 }
 
+TEST_F(QueueContentTest, BehindAReindexStandsWhatDeletesBelowItWouldTakeAway) {
+  Settings settings;
+  settings.state_root = state_root;
+  settings.shares = {{"s", folder + "/s", ""}};
+  settings.folders = {{"s", folder + "/s", {}}};
+  const auto path = [this](const std::string& name) { return folder + "/s/" + name; };
+  std::filesystem::create_directories(path("d/again"));
+  std::filesystem::create_directories(path("d/updated"));
+  for (const char* name : {"d/file", "da", "beside"}) {
+    WriteFile(path(name), "");
+  }
+  ASSERT_EQ(mkfifo(path("d/pipe").c_str(), 0600), 0);
+  Append({EventLine(QLIB_NOTIFY_DELETE, path("d/file"))});
+  Drain();
+  std::vector<std::string> lines = {EventLine(CUSTOM_EVENT_UPDATE, path("d/updated"))};
+  for (const char* name : {"d/updated", "d/again", "d/gone", "d/pipe", "d", "da", "beside"}) {
+    lines.push_back(EventLine(QLIB_NOTIFY_DELETE, path(name)));
+  }
+  Append(lines);
+
+  std::string error;
+  const auto append = [&](uint32_t event, const std::string& at) {
+    return AppendEvent(settings, "s", event, at, {}, Durability::NONE, error);
+  };
+  ASSERT_TRUE(append(CUSTOM_EVENT_REINDEX, path("/d/"))) << error;
+  for (const char* name : {"/d/", "d/again", "d/file", "d/updated/"}) {
+    lines.push_back(EventLine(CUSTOM_EVENT_REINDEX, path(name)));
+  }
+  EXPECT_EQ(Queue(), lines);
+
+  ASSERT_TRUE(append(CUSTOM_EVENT_UPDATE, path("d"))) << error;
+  lines.push_back(EventLine(CUSTOM_EVENT_UPDATE, path("d")));
+  EXPECT_EQ(Queue(), lines);
+}
+
+TEST_F(QueueContentTest, TheLastLineCountsThoughItHasNoNewline) {
+  Append({EventLine(QLIB_NOTIFY_CREATE, "/s/c")});
+  WriteFile(QueuePath("s"), ReadFile(QueuePath("s")) + EventLine(CUSTOM_EVENT_UPDATE, "/s/f"));
+  EXPECT_EQ(ReadQueueContent("s").lines, 2U);
+  EXPECT_EQ(Named("/s/f"), "/s/f/");
+
+  const std::string last = EventLine(QLIB_NOTIFY_DELETE, "/s/b");
+  WriteFile(QueuePath("s"), last);
+  EXPECT_THAT(ReadQueueContent("s").deletes, ElementsAre("/s/b"));
+  WriteFile(QueuePath("s"), last.substr(0, last.size() - 1));
+  EXPECT_THAT(ReadQueueContent("s").deletes, IsEmpty());
+}
+
 TEST_F(QueueContentTest, DeletesOfBothFilesAreMetByTheirNormalPaths) {
-  Append({EventLine(QLIB_NOTIFY_DELETE, "/s/b"), EventLine(QLIB_NOTIFY_CREATE, "/s/c"),
+  Append({EventLine(QLIB_NOTIFY_DELETE, "/s/c"), EventLine(QLIB_NOTIFY_CREATE, "/s/c"),
           EventLine(QLIB_NOTIFY_DELETE, "relative"), "{\"path\":\"/s/x\"}"});
   Drain();
   Append({EventLine(QLIB_NOTIFY_DELETE, "/s//a/"),
@@ -65,7 +126,7 @@ TEST_F(QueueContentTest, DeletesOfBothFilesAreMetByTheirNormalPaths) {
 
   const QueueContent queued = ReadQueueContent("s");
 
-  EXPECT_THAT(queued.deletes, ElementsAre("/s/a", "/s/b"));
+  EXPECT_THAT(queued.deletes, ElementsAre("/s/a", "/s/b", "/s/c"));
   EXPECT_EQ(queued.lines, 2U);
 }
 
