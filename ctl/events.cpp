@@ -48,8 +48,8 @@ int Reindex(const Arguments& arguments) {
   }
 
   std::string error;
-  return AppendEvent(*session.settings, session.settings->ShareOfPath(path)->name,
-                     CUSTOM_EVENT_REINDEX, path, {}, Durability::NONE, error)
+  return AppendEvent(session.settings->ShareOfPath(path)->name, CUSTOM_EVENT_REINDEX, path, {},
+                     Durability::NONE, error)
              ? EXIT_DONE
              : Fail(EXIT_FAILED, "%s", error.c_str());
 }

@@ -34,10 +34,8 @@ Reply TellDaemon(const char* type, const std::string& path) {
 // Where the line cannot be written, the share's flag has all of it indexed again.
 int Queue(Session& session, const IndexedFolder& folder, uint32_t event,
           const std::string& data = {}) {
-  std::shared_ptr<const Settings> settings = session.settings;
-  (void)session.store->GetSettings(settings);  // those just stored; the earlier ones know the share
   std::string error;
-  if (AppendEvent(*settings, folder.share, event, folder.path, data, Durability::NONE, error)) {
+  if (AppendEvent(folder.share, event, folder.path, data, Durability::NONE, error)) {
     return EXIT_DONE;
   }
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // verify: an index against the disk, and the events that mend it.
 #include <algorithm>
+#include <iterator>
 #include <optional>
 
 #include "base/event_codes.h"
@@ -33,36 +34,25 @@ bool PutDifference(Difference difference, const std::string& path, const Argumen
   return PutJson(object);
 }
 
-// Behind what mends the differences stand the lines for what deletes take away that wait, whatever
-// the index holds by now.
-int QueueRepair(const std::string& share_name, Repair& repair, std::vector<QueueLine> returned) {
-  if (repair.IsEmpty() && returned.empty()) {
+// `returned`: see QueueContent::TextsOf.
+int QueueRepair(const std::string& share_name, Repair& repair,
+                const std::vector<std::string>& returned) {
+  if (repair.IsEmpty()) {
     return EXIT_DONE;
-  }
-  const bool is_cut = returned.size() >= QUEUE_LINE_LIMIT;
-  if (is_cut) {
-    returned.resize(QUEUE_LINE_LIMIT - 1);
   }
   const auto make = [&] {
     const QueueContent queued = ReadQueueContent(share_name);
-    const size_t others = std::min(queued.lines + returned.size(), QUEUE_LINE_LIMIT);
+    const size_t room = QUEUE_LINE_LIMIT - std::min(queued.lines, QUEUE_LINE_LIMIT);
     std::vector<std::string> texts;
-    for (const auto& lines : {repair.Lines(QUEUE_LINE_LIMIT - others), returned}) {
-      for (const QueueLine& line : lines) {
-        texts.push_back(queued.TextOf(line));
-      }
+    for (const QueueLine& line : repair.Lines(returned.empty() ? room : room / 2)) {
+      std::ranges::move(queued.TextsOf(line, returned), std::back_inserter(texts));
     }
     return texts;
   };
   std::string error;
-  if (!AppendToQueue(share_name, make, Durability::NONE, error)) {
-    return Fail(EXIT_FAILED, "%s", error.c_str());
-  }
-  return is_cut ? Fail(EXIT_FAILED,
-                       "%s: more deletes wait than can be mended at once; verify again once they"
-                       " are worked off",
-                       share_name.c_str())
-                : EXIT_DONE;
+  return AppendToQueue(share_name, make, Durability::NONE, error)
+             ? EXIT_DONE
+             : Fail(EXIT_FAILED, "%s", error.c_str());
 }
 
 // Compares to the end, or until `report` wants no more, and says meanwhile how far it is.
@@ -102,6 +92,21 @@ int TellUnreadable(const Comparison& counts) {
     text += "; nor at " + std::to_string(counts.unreadable - 1) + " more";
   }
   return Fail(EXIT_FAILED, "%s", text.c_str());
+}
+
+// Deletes that wait take away what is there again, whatever the index holds by now. Returns those
+// paths.
+std::vector<std::string> AddReturned(const Settings& settings,
+                                     const std::vector<std::string>& deletes, Repair& repair) {
+  std::vector<std::string> returned;
+  for (const std::string& path : deletes) {
+    const Look look = LookAt(settings, path);
+    if (look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN) {
+      (void)repair.Add({Difference::MISSING, path, Thing::NONE, look.thing});
+      returned.push_back(path);
+    }
+  }
+  return returned;
 }
 
 // For an index that is to be made: what is missing comes with its folder.
@@ -159,7 +164,8 @@ int Verify(const Arguments& arguments) {
     return is_read ? code : TellUnreadable(comparer.counts);
   }
 
-  const int queued = QueueRepair(share->name, repair, LinesOfReturned(*session.settings, deletes));
+  const std::vector<std::string> returned = AddReturned(*session.settings, deletes, repair);
+  const int queued = QueueRepair(share->name, repair, returned);
   if (queued == EXIT_DONE && !mended) {
     return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",
                 share->name.c_str());

@@ -37,6 +37,7 @@ bool VisitAll(Statement& statement, const std::function<bool(const Entry&)>& vis
 }  // namespace
 
 IndexError EntryReader::Open(const std::string& share_name) {
+  first_written.reset();
   return database.OpenForReading(IndexPath(share_name));
 }
 
@@ -146,7 +147,8 @@ IndexError EntryReader::Find(const std::string& path, std::optional<Entry>& entr
 
 // There is one writer at a time: once anybody has committed, or nobody writes at this moment, the
 // one of then has ended. Nothing is written here. (SQLite's own data_version also changes when a
-// writer begins its log anew, before it has committed.)
+// writer begins its log anew, before it has committed.) What shrinks the file commits without a
+// note: it lets go of the lock after some tens of transactions.
 bool EntryReader::HasWriterEnded(int milliseconds) {
   sqlite3* db = database.db;
   Statement ask;

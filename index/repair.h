@@ -31,8 +31,8 @@ class Repair {
   Repair(const Settings& in_force, const Share& of_share, EntryReader& entries,
          size_t lines_kept = QUEUE_LINE_LIMIT);
 
-  // Differences come in byte order of the paths. False for an entry that lies outside the share,
-  // where no event reaches it.
+  // Differences come in byte order of the paths, but what is missing may come at any time. False
+  // for an entry that lies outside the share, where no event reaches it.
   bool Add(const Found& found);
 
   bool IsEmpty() const { return folding.Size() == 0; }

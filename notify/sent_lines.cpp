@@ -2,6 +2,9 @@
 #include "notify/sent_lines.h"
 
 #include "base/event_codes.h"
+#include "notify/change.h"
+#include "notify/look_lines.h"
+#include "state/belonging.h"
 #include "state/layout.h"
 
 namespace fileindexd {
@@ -77,6 +80,20 @@ std::vector<QueueLine> SentLines::LinesBehind(const Settings& settings,
 
 std::string SentLines::PathInFile(const QueueLine& line) const {
   return updates.PathInFile(line.event, line.path);
+}
+
+std::vector<QueueLine> LinesOfReturned(const Settings& settings,
+                                       const std::vector<std::string>& paths) {
+  std::vector<QueueLine> lines;
+  FolderView folder;
+  for (const std::string& path : paths) {
+    const size_t before = lines.size();
+    (void)LinesOfLook(settings, path, DELETED, {}, folder, lines);
+    if (lines.size() > before && lines.back().event == QLIB_NOTIFY_DELETE) {
+      lines.pop_back();
+    }
+  }
+  return lines;
 }
 
 }  // namespace fileindexd

@@ -1,8 +1,10 @@
 // SPDX-License-Identifier: GPL-2.0-or-later
 // Lines of a queue file that the daemon has not taken yet, and what becomes of them in one batch.
 //
-// Whoever queues the reindex of a directory has the deletes below it looked at again, see
-// LinesOfReturned, and so does whoever compared.
+// A delete takes the entry away whatever the disk holds by then, and the daemon executes a batch
+// from the top of its tree downwards: a delete that was queued before the reindex of a directory
+// above it is executed after it, and takes away what came back with that directory. So whoever
+// queues such a line has the deletes below it looked at again, and so does whoever compared.
 //
 // Of two lines at one path mostly the later is executed alone. A modify, or a change of attributes,
 // displaces the walk of a directory that a rename brought, and the reading anew of a file that was
@@ -44,5 +46,9 @@ class SentLines {
   Paths written;  // made, or closed after writing: to be read anew
   WaitingUpdates updates;
 };
+
+// Lines for those of the paths that are there, sorted paths being the quickest.
+std::vector<QueueLine> LinesOfReturned(const Settings& settings,
+                                       const std::vector<std::string>& paths);
 
 }  // namespace fileindexd

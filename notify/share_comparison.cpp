@@ -5,6 +5,7 @@
 #include <ctime>
 
 #include "notify/log.h"
+#include "notify/sent_lines.h"
 #include "state/queue_content.h"
 #include "state/queue_writer.h"
 

@@ -2,6 +2,7 @@
 #include "state/queue_content.h"
 
 #include <json/json.h>
+#include <sys/stat.h>
 
 #include <algorithm>
 #include <exception>
@@ -9,11 +10,26 @@
 #include <utility>
 
 #include "base/event_codes.h"
-#include "state/belonging.h"
 #include "state/layout.h"
 #include "state/queue_files.h"
 
 namespace fileindexd {
+
+namespace {
+
+// What is there again at or below the directory though it is deleted by what waits.
+std::vector<std::string> ReturnedBelow(const std::string& directory,
+                                       const std::string& share_name) {
+  const std::string normal = NormalPath(directory).value_or(directory);
+  std::vector<std::string> deletes = ReadQueueContent(share_name).deletes;
+  std::erase_if(deletes, [&normal](const std::string& path) {
+    struct stat status {};
+    return !Covers(normal, path) || lstat(path.c_str(), &status) != 0;
+  });
+  return deletes;
+}
+
+}  // namespace
 
 QueueLineReader::QueueLineReader() {
   Json::CharReaderBuilder builder;
@@ -61,66 +77,64 @@ QueueContent ReadQueueContent(const std::string& share_name) {
   QueueContent queued;
   std::set<std::string, ByComponents> deletes;
   LineInFile line;
-  const auto note_delete = [&] {
+  const auto note = [&] {
     auto path = NormalPath(line.path);
-    if ((line.event & QLIB_NOTIFY_DELETE) != 0 && path.has_value()) {
+    if (path.has_value() && (line.event & QLIB_NOTIFY_DELETE) != 0) {
       deletes.insert(std::move(*path));
+    } else if (path.has_value()) {
+      deletes.erase(*path);
     }
   };
   ForEachQueueLine(files.drained, [&](std::string_view text) {
     if (reader.Read(text, line)) {
-      note_delete();
+      note();
     }
   });
   ForEachQueueLine(files.queue, [&](std::string_view text) {
     ++queued.lines;
     if (reader.Read(text, line)) {
       queued.updates.Note(line.event, line.path);
-      note_delete();
+      note();
     }
   });
   queued.deletes.assign(deletes.begin(), deletes.end());
   return queued;
 }
 
-std::string QueueContent::TextOf(const QueueLine& line) const {
-  return EventLine(line.event, updates.PathInFile(line.event, line.path), std::nullopt, line.data);
-}
-
-// A reindex removes what is gone by then, which an add passes over. Of what nobody can look at the
-// daemon shall keep the entry.
-std::vector<QueueLine> LinesOfReturned(const Settings& settings,
-                                       const std::vector<std::string>& deletes) {
-  std::vector<QueueLine> lines;
-  FolderView folder;
-  for (const std::string& path : deletes) {
-    const Verdict verdict = LookNear(settings, path, folder).verdict;
-    if (verdict == Verdict::BELONGS) {
-      lines.push_back({CUSTOM_EVENT_REINDEX, path, {}, {}});
-    } else if (verdict == Verdict::UNKNOWN) {
-      lines.push_back({QLIB_NOTIFY_MODIFY, path, {}, {}});
-    }
+std::vector<std::string> QueueContent::TextsOf(const QueueLine& line,
+                                               const std::vector<std::string>& returned) const {
+  const std::string normal = NormalPath(line.path).value_or(line.path);
+  const bool is_above = std::ranges::any_of(
+      returned, [&normal](const std::string& path) { return Covers(normal, path); });
+  std::vector<std::string> texts;
+  if (line.event == CUSTOM_EVENT_REINDEX && is_above) {
+    texts.push_back(EventLine(line.event, line.path, std::nullopt, line.data));
   }
-  return lines;
+  texts.push_back(
+      EventLine(line.event, updates.PathInFile(line.event, line.path), std::nullopt, line.data));
+  return texts;
 }
 
-bool AppendEvent(const Settings& settings, const std::string& share_name, uint32_t event,
-                 const std::string& path, const std::string& data, Durability durability,
-                 std::string& error) {
+bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
+                 const std::string& data, Durability durability, std::string& error) {
+  // Of no other event the content of the queue matters.
+  const bool is_walk = event == CUSTOM_EVENT_REINDEX || event == CUSTOM_EVENT_UPDATE;
+  const std::vector<std::string> returned =
+      is_walk ? ReturnedBelow(path, share_name) : std::vector<std::string>{};
   const auto make = [&] {
-    // Of no other event the content of the queue matters.
-    const QueueContent queued =
-        event == CUSTOM_EVENT_REINDEX ? ReadQueueContent(share_name) : QueueContent{};
-    const std::string directory = NormalPath(path).value_or(path);
-    std::vector<std::string> below;
-    std::ranges::copy_if(queued.deletes, std::back_inserter(below), [&](const auto& deleted) {
-      return deleted != directory && Covers(directory, deleted);
-    });
-    std::vector<std::string> lines = {queued.TextOf({event, path, data, {}})};
-    for (const QueueLine& line : LinesOfReturned(settings, below)) {
-      lines.push_back(queued.TextOf(line));
+    const bool is_reindex = event == CUSTOM_EVENT_REINDEX;
+    std::vector<std::string> texts;
+    if (!is_reindex) {
+      texts.push_back(EventLine(event, path, std::nullopt, data));
     }
-    return lines;
+    if (is_reindex || !returned.empty()) {
+      QueueContent queued = ReadQueueContent(share_name);
+      queued.updates.Note(event, path);
+      std::ranges::move(
+          queued.TextsOf({CUSTOM_EVENT_REINDEX, path, is_reindex ? data : "", {}}, returned),
+          std::back_inserter(texts));
+    }
+    return texts;
   };
   return AppendToQueue(share_name, make, durability, error);
 }

@@ -12,7 +12,6 @@
 
 #include "state/queue_folding.h"
 #include "state/queue_writer.h"
-#include "state/settings.h"
 
 namespace Json {
 class CharReader;
@@ -62,28 +61,25 @@ class WaitingUpdates {
 struct QueueContent {
   size_t lines = 0;                  // of the queue file
   WaitingUpdates updates;            // of the queue file; its drained copy is a batch of its own
-  std::vector<std::string> deletes;  // normal paths of delete lines in both, sorted
+  std::vector<std::string> deletes;  // normal paths that one of both deletes last, sorted
 
-  // A line that names its path by what waits. No rename.
-  std::string TextOf(const QueueLine& line) const;
+  // The texts of a line that is no rename, named by what waits.
+  //
+  // A delete takes the entry away whatever the disk holds by then, and the daemon executes a batch
+  // from the top of its tree downwards: a delete that was queued before the reindex of a directory
+  // above it may be executed after it, and takes away what came back with that directory. A second
+  // reindex of the same path drops all that was queued below it. So there are two where one of
+  // `returned`, the normal paths of such deletes, lies at or below the path.
+  std::vector<std::string> TextsOf(const QueueLine& line,
+                                   const std::vector<std::string>& returned) const;
 };
 // Reads all of both: some 20 ms for as many lines as are queued at most.
 QueueContent ReadQueueContent(const std::string& share_name);
 
-// Lines for those of the deleted paths that are there again, in their order; sorted paths are the
-// quickest.
-//
-// A delete takes the entry away whatever the disk holds by then, and the daemon executes a batch
-// from the top of its tree downwards: a delete that was queued before the reindex of a directory
-// above it is executed after it, and takes away what came back with that directory. These lines
-// take its place: they are not to be taken in by any reindex.
-std::vector<QueueLine> LinesOfReturned(const Settings& settings,
-                                       const std::vector<std::string>& deletes);
-
-// Appends the line of one event, as AppendToQueue, its path named by what waits at that moment, and
-// behind a reindex what it needs to be complete.
-bool AppendEvent(const Settings& settings, const std::string& share_name, uint32_t event,
-                 const std::string& path, const std::string& data, Durability durability,
-                 std::string& error);
+// Appends the line of one event, as AppendToQueue, its path named by what waits at that moment. A
+// reindex, and an update of a subtree, comes with what it takes that no delete that waits undoes
+// it.
+bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
+                 const std::string& data, Durability durability, std::string& error);
 
 }  // namespace fileindexd

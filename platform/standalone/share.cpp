@@ -96,8 +96,8 @@ void AddCustomEvent(const int& event, const std::string& path, const Json::Value
     const std::string text = data.isNull() ? std::string() : data.toString();
     const bool refills = code == CUSTOM_EVENT_REINDEX && NormalPath(path) == share->path;
     std::string error;
-    if (!AppendEvent(*settings, share->name, code, path, text,
-                     refills ? Durability::SYNCED : Durability::NONE, error)) {
+    if (!AppendEvent(share->name, code, path, text, refills ? Durability::SYNCED : Durability::NONE,
+                     error)) {
       FI_LOG("Failed to queue event for share[%s]: %s", share->name.c_str(), error.c_str());
       if (!RequestReindex(share->name)) {
         return false;

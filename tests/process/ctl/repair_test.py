@@ -12,7 +12,7 @@ from harness.machine import full_path
 
 QUEUE_LINES = 5000
 MANY = 20000
-MODIFY, DELETE, REINDEX, UPDATE = 0x2, 0x80, 0x10000, 0x20000
+MODIFY, REINDEX, UPDATE = 0x2, 0x10000, 0x20000
 ODD_NAMES = (b"\xff\xfe", b"line\nend", b'quo"te', b"back\\slash", b"\x01\x7f", b" ", b"{}", b"a'b")
 
 
@@ -252,24 +252,6 @@ class RepairTest(IndexTest):
         lines = self.mend()
 
         self.assertEqual(lines[QUEUE_LINES:], [(REINDEX, b".")])
-
-    def test_deletes_that_wait_are_mended_as_far_as_lines_are_queued_at_once(self):
-        names = [f"d/{i:04}" for i in range(QUEUE_LINES + 100)]
-        for name in names:
-            self.write(name)
-        self.mend()
-        self.append("alpha", *[{"event": DELETE, "path": f"{self.root}/{n}"} for n in names])
-
-        failed = self.ctl("verify", "alpha", "--repair", code=1)
-        self.assertEqual(
-            failed.err,
-            b"fileindexctl: alpha: more deletes wait than can be mended at once; verify again once"
-            b" they are worked off\n",
-        )
-        behind = [(REINDEX, os.fsencode(name)) for name in names[: QUEUE_LINES - 1]]
-        self.assertEqual(self.queued()[len(names) :], behind)
-        self.drain()
-        self.assertEqual(len(self.mend()), len(names) - len(behind))
 
     def test_an_update_that_waits_at_the_same_path_does_not_swallow_the_reindex(self):
         self.ctl("folder", "set", self.root, "--document=off")

@@ -13,6 +13,9 @@ DELETE = 0x80
 class WaitingTest(IndexTest):
     def prepare(self, *files, folders=("",)):
         self.root = self.make_share(files=files, folders=folders, flags=("--all",))
+        self.drain()
+
+    def drain(self):
         pid = self.start(debug=False)
         self.await_drained("alpha")
         self.stop(pid)
@@ -27,8 +30,7 @@ class WaitingTest(IndexTest):
             self.ctl("event", "alpha", str(DELETE), self.at(name))
 
     def assert_mended(self):
-        self.start(debug=False)
-        self.await_drained("alpha")
+        self.drain()
         verified = self.ctl("verify", "alpha")
         self.assertEqual((verified.out, verified.err), (b"", b""))
 
@@ -75,6 +77,23 @@ class WaitingTest(IndexTest):
         self.prepare("d/x.txt", "d/e/y.txt", "d/z.txt")
         self.delete("d/x.txt", "d/e", "d/gone.txt")
         self.ctl("reindex", self.at("d"))
+        self.assert_mended()
+
+    def test_deletes_whose_paths_are_spelled_in_other_ways(self):
+        self.prepare("d/x.txt", "y.txt")
+        for below in ("d//x.txt", "d/"):
+            for command in (("verify", "alpha", "--repair"), ("reindex", self.at("d"))):
+                with self.subTest(below=below, command=command[0]):
+                    self.delete(below)
+                    self.ctl(*command)
+                    self.assert_mended()
+
+    def test_an_update_above_a_delete_of_what_belongs_again(self):
+        self.prepare("f/build/x.txt", "f/y.txt", folders=("", "f"))
+        self.ctl("folder", "set", self.at("f"), "--exclude", "build/")
+        self.drain()
+        self.delete("f/build", "f/gone.txt")
+        self.ctl("folder", "remove", self.at("f"))
         self.assert_mended()
 
     def test_other_excludes_above_a_delete_of_what_came_back(self):

@@ -2,7 +2,6 @@
 #include "state/queue_content.h"
 
 #include <gmock/gmock.h>
-#include <sys/stat.h>
 
 #include <filesystem>
 #include <sstream>
@@ -60,7 +59,7 @@ TEST_F(QueueContentTest, OneLineIsAppendedByWhatWaitsThen) {
   std::string error;
   Append({EventLine(CUSTOM_EVENT_UPDATE, "/s/f")});
   for (const uint32_t event : {CUSTOM_EVENT_UPDATE, CUSTOM_EVENT_REINDEX}) {
-    EXPECT_TRUE(AppendEvent({}, "s", event, "/s/f", "{}", Durability::SYNCED, error)) << error;
+    EXPECT_TRUE(AppendEvent("s", event, "/s/f", "{}", Durability::SYNCED, error)) << error;
   }
 
   EXPECT_EQ(ReadFile(QueuePath("s")), EventLine(CUSTOM_EVENT_UPDATE, "/s/f") + "\n" +
@@ -69,38 +68,48 @@ TEST_F(QueueContentTest, OneLineIsAppendedByWhatWaitsThen) {
                                           "\n");
 }
 
-TEST_F(QueueContentTest, BehindAReindexStandsWhatDeletesBelowItWouldTakeAway) {
-  Settings settings;
-  settings.state_root = state_root;
-  settings.shares = {{"s", folder + "/s", ""}};
-  settings.folders = {{"s", folder + "/s", {}}};
+// The second one drops the deletes below it.
+TEST_F(QueueContentTest, AReindexIsQueuedTwiceAboveADeleteOfWhatIsThereAgain) {
   const auto path = [this](const std::string& name) { return folder + "/s/" + name; };
   std::filesystem::create_directories(path("d/again"));
-  std::filesystem::create_directories(path("d/updated"));
-  for (const char* name : {"d/file", "da", "beside"}) {
-    WriteFile(path(name), "");
-  }
-  ASSERT_EQ(mkfifo(path("d/pipe").c_str(), 0600), 0);
-  Append({EventLine(QLIB_NOTIFY_DELETE, path("d/file"))});
-  Drain();
-  std::vector<std::string> lines = {EventLine(CUSTOM_EVENT_UPDATE, path("d/updated"))};
-  for (const char* name : {"d/updated", "d/again", "d/gone", "d/pipe", "d", "da", "beside"}) {
+  WriteFile(path("da"), "");
+  std::vector<std::string> lines;
+  for (const char* name : {"d//again/", "d/gone", "da", "e/gone"}) {
     lines.push_back(EventLine(QLIB_NOTIFY_DELETE, path(name)));
   }
   Append(lines);
 
   std::string error;
-  const auto append = [&](uint32_t event, const std::string& at) {
-    return AppendEvent(settings, "s", event, at, {}, Durability::NONE, error);
+  const auto append = [&](uint32_t event, const std::string& name) {
+    EXPECT_TRUE(AppendEvent("s", event, path(name), "{}", Durability::NONE, error)) << error;
   };
-  ASSERT_TRUE(append(CUSTOM_EVENT_REINDEX, path("/d/"))) << error;
-  for (const char* name : {"/d/", "d/again", "d/file", "d/updated/"}) {
-    lines.push_back(EventLine(CUSTOM_EVENT_REINDEX, path(name)));
-  }
+  const auto expect = [&](uint32_t event, const std::string& name, const std::string& data) {
+    lines.push_back(EventLine(event, path(name), {}, data));
+  };
+  append(CUSTOM_EVENT_REINDEX, "e");
+  expect(CUSTOM_EVENT_REINDEX, "e", "{}");
+  append(CUSTOM_EVENT_UPDATE, "e");
+  expect(CUSTOM_EVENT_UPDATE, "e", "{}");
+  append(QLIB_NOTIFY_MODIFY, "d");
+  expect(QLIB_NOTIFY_MODIFY, "d", "{}");
+  append(CUSTOM_EVENT_REINDEX, "d/");
+  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
+  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
   EXPECT_EQ(Queue(), lines);
 
-  ASSERT_TRUE(append(CUSTOM_EVENT_UPDATE, path("d"))) << error;
-  lines.push_back(EventLine(CUSTOM_EVENT_UPDATE, path("d")));
+  append(CUSTOM_EVENT_UPDATE, "d");
+  expect(CUSTOM_EVENT_UPDATE, "d", "{}");
+  expect(CUSTOM_EVENT_REINDEX, "d", "");
+  expect(CUSTOM_EVENT_REINDEX, "d/", "");
+  append(CUSTOM_EVENT_REINDEX, "d");
+  expect(CUSTOM_EVENT_REINDEX, "d", "{}");
+  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
+  EXPECT_EQ(Queue(), lines);
+
+  append(QLIB_NOTIFY_CREATE, "d/again");
+  expect(QLIB_NOTIFY_CREATE, "d/again", "{}");
+  append(CUSTOM_EVENT_REINDEX, "d");
+  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
   EXPECT_EQ(Queue(), lines);
 }
 
@@ -117,17 +126,20 @@ TEST_F(QueueContentTest, TheLastLineCountsThoughItHasNoNewline) {
   EXPECT_THAT(ReadQueueContent("s").deletes, IsEmpty());
 }
 
-TEST_F(QueueContentTest, DeletesOfBothFilesAreMetByTheirNormalPaths) {
-  Append({EventLine(QLIB_NOTIFY_DELETE, "/s/c"), EventLine(QLIB_NOTIFY_CREATE, "/s/c"),
-          EventLine(QLIB_NOTIFY_DELETE, "relative"), "{\"path\":\"/s/x\"}"});
+TEST_F(QueueContentTest, DeletesOfBothFilesAreMetByTheirNormalPathsUntilALaterLineIsAboutThem) {
+  Append({EventLine(QLIB_NOTIFY_DELETE, "/s/c"), EventLine(QLIB_NOTIFY_CREATE, "/s/e"),
+          EventLine(QLIB_NOTIFY_DELETE, "relative"), EventLine(QLIB_NOTIFY_DELETE, "/s/f"),
+          EventLine(QLIB_NOTIFY_DELETE, "/s/g"), EventLine(QLIB_NOTIFY_ATTRIB, "/s/g"),
+          "{\"path\":\"/s/x\"}"});
   Drain();
   Append({EventLine(QLIB_NOTIFY_DELETE, "/s//a/"),
-          EventLine(QLIB_NOTIFY_DELETE | QLIB_NOTIFY_MODIFY, "/s/b")});
+          EventLine(QLIB_NOTIFY_DELETE | QLIB_NOTIFY_MODIFY, "/s/b"),
+          EventLine(QLIB_NOTIFY_CREATE, "/s//f"), "{\"event\":64}"});
 
   const QueueContent queued = ReadQueueContent("s");
 
   EXPECT_THAT(queued.deletes, ElementsAre("/s/a", "/s/b", "/s/c"));
-  EXPECT_EQ(queued.lines, 2U);
+  EXPECT_EQ(queued.lines, 4U);
 }
 
 TEST_F(QueueContentTest, WhatTheDaemonTakesForAnEventIsOne) {
