@@ -12,7 +12,7 @@ from harness.machine import full_path
 
 QUEUE_LINES = 5000
 MANY = 20000
-MODIFY, REINDEX, UPDATE = 0x2, 0x10000, 0x20000
+MODIFY, DELETE, REINDEX, UPDATE = 0x2, 0x80, 0x10000, 0x20000
 ODD_NAMES = (b"\xff\xfe", b"line\nend", b'quo"te', b"back\\slash", b"\x01\x7f", b" ", b"{}", b"a'b")
 
 
@@ -243,6 +243,16 @@ class RepairTest(IndexTest):
         lines = self.mend()
 
         self.assertIn((REINDEX, b"d"), lines)
+
+    def test_lines_that_are_queued_twice_count_as_two(self):
+        names = [f"n{i}/x" for i in range(8)]
+        for name in names:
+            self.write(name)
+        waiting = [{"event": DELETE, "path": f"{self.root}/{name}"} for name in names]
+        waiting += [{"event": MODIFY, "path": f"{self.root}/none/{i}"} for i in range(4982)]
+        self.append("alpha", *waiting)
+
+        self.assertLessEqual(len(self.mend()), QUEUE_LINES)
 
     def test_a_full_queue_is_given_one_line(self):
         self.append("alpha", *[{"event": MODIFY, "path": f"{self.root}/none"}] * QUEUE_LINES)

@@ -50,6 +50,12 @@ TEST_F(ReaderTest, AWriterThatHasBegunALogHasNotEnded) {
 
   ASSERT_EQ(Execute(other.db, "ROLLBACK"), SQLITE_OK);
   EXPECT_TRUE(reader.HasWriterEnded(0));
+
+  // Another one, of whom it is asked after opening anew.
+  ASSERT_EQ(Execute(other.db, "UPDATE meta SET last_written = last_written + 1; BEGIN IMMEDIATE"),
+            SQLITE_OK);
+  ASSERT_EQ(reader.Open("s"), IndexError::NONE);
+  EXPECT_FALSE(reader.HasWriterEnded(0));
 }
 
 TEST_F(ReaderTest, DirectoryHasNoSizeAndNoTime) {

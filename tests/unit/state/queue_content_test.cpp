@@ -48,6 +48,8 @@ TEST_F(QueueContentTest, AReindexIsNamedSoThatNoUpdateThatWaitsSwallowsIt) {
   EXPECT_EQ(Named("/s/g"), "/s/g");
   EXPECT_EQ(Named("/s/h"), "/s/h");
   EXPECT_EQ(Named("/s/i"), "/s/i");
+  const std::vector<std::string> modify = {EventLine(QLIB_NOTIFY_MODIFY, "/s/f")};
+  EXPECT_EQ(ReadQueueContent("s").TextsOf({QLIB_NOTIFY_MODIFY, "/s/f", {}, {}}, {"/s/f"}), modify);
 
   Append({EventLine(CUSTOM_EVENT_UPDATE, "/s/f/")});
   EXPECT_EQ(Named("/s/f"), "/s/f//");
