@@ -117,7 +117,8 @@ std::vector<std::string> QueueContent::TextsOf(const QueueLine& line,
 
 bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
                  const std::string& data, Durability durability, std::string& error) {
-  // Of no other event the content of the queue matters.
+  // Of no other event the content of the queue matters. The disk, which may be slow, is looked at
+  // before others have to wait for the lock.
   const bool is_walk = event == CUSTOM_EVENT_REINDEX || event == CUSTOM_EVENT_UPDATE;
   const std::vector<std::string> returned =
       is_walk ? ReturnedBelow(path, share_name) : std::vector<std::string>{};

@@ -77,8 +77,7 @@ struct QueueContent {
 QueueContent ReadQueueContent(const std::string& share_name);
 
 // Appends the line of one event, as AppendToQueue, its path named by what waits at that moment. A
-// reindex, and an update of a subtree, comes with what it takes that no delete that waits undoes
-// it.
+// reindex, or an update of a subtree, comes with the lines that keep a delete from undoing it.
 bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
                  const std::string& data, Durability durability, std::string& error);
 
