@@ -3,7 +3,6 @@
 #pragma once
 
 #include <cstdio>
-#include <sstream>
 #include <string>
 #include <vector>
 
@@ -25,14 +24,7 @@ class QueueFeedTest : public FeedTest {
   // As when the daemon takes it.
   void TakeQueue() const { ASSERT_EQ(rename(queue.c_str(), DrainedPath("s").c_str()), 0); }
 
-  Texts Queue() const {
-    std::istringstream text(ReadFile(queue));
-    Texts lines;
-    for (std::string line; std::getline(text, line);) {
-      lines.push_back(line);
-    }
-    return lines;
-  }
+  Texts Queue() const { return ReadLines(queue); }
   std::string Line(uint32_t event, const std::string& name) const {
     return EventLine(event, Path(name));
   }

@@ -41,6 +41,15 @@ std::string ReadFile(const std::string& path) {
   return text.str();
 }
 
+std::vector<std::string> ReadLines(const std::string& path) {
+  std::istringstream text(ReadFile(path));
+  std::vector<std::string> lines;
+  for (std::string line; std::getline(text, line);) {
+    lines.push_back(line);
+  }
+  return lines;
+}
+
 void WriteFile(const std::string& path, const std::string& text) {
   std::ofstream file(path, std::ios::binary | std::ios::trunc);
   file << text;

@@ -8,6 +8,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "state/store.h"
 
@@ -25,6 +26,7 @@ class StateTest : public testing::Test {
 };
 
 std::string ReadFile(const std::string& path);
+std::vector<std::string> ReadLines(const std::string& path);
 void WriteFile(const std::string& path, const std::string& text);
 bool Exists(const std::string& path);
 mode_t ModeOf(const std::string& path);  // permission bits

@@ -4,7 +4,6 @@
 #include <gmock/gmock.h>
 
 #include <filesystem>
-#include <sstream>
 
 #include "base/event_codes.h"
 #include "state/layout.h"
@@ -22,14 +21,6 @@ class QueueContentTest : public StateTest {
   void Append(const std::vector<std::string>& lines) {
     std::string error;
     ASSERT_TRUE(AppendToQueue("s", lines, error)) << error;
-  }
-  static std::vector<std::string> Queue() {
-    std::istringstream text(ReadFile(QueuePath("s")));
-    std::vector<std::string> lines;
-    for (std::string line; std::getline(text, line);) {
-      lines.push_back(line);
-    }
-    return lines;
   }
   // What a reindex is queued as.
   static std::string Named(const std::string& path) {
@@ -81,38 +72,26 @@ TEST_F(QueueContentTest, AReindexIsQueuedTwiceAboveADeleteOfWhatIsThereAgain) {
   }
   Append(lines);
 
-  std::string error;
-  const auto append = [&](uint32_t event, const std::string& name) {
-    EXPECT_TRUE(AppendEvent("s", event, path(name), "{}", Durability::NONE, error)) << error;
+  const auto append = [&](uint32_t event, const std::string& name,
+                          const std::vector<std::string>& reindexed) {
+    std::string error;
+    EXPECT_TRUE(AppendEvent("s", event, path(name), {}, Durability::NONE, error)) << error;
+    if (event != CUSTOM_EVENT_REINDEX) {
+      lines.push_back(EventLine(event, path(name)));
+    }
+    for (const std::string& each : reindexed) {
+      lines.push_back(EventLine(CUSTOM_EVENT_REINDEX, path(each)));
+    }
+    EXPECT_EQ(ReadLines(QueuePath("s")), lines);
   };
-  const auto expect = [&](uint32_t event, const std::string& name, const std::string& data) {
-    lines.push_back(EventLine(event, path(name), {}, data));
-  };
-  append(CUSTOM_EVENT_REINDEX, "e");
-  expect(CUSTOM_EVENT_REINDEX, "e", "{}");
-  append(CUSTOM_EVENT_UPDATE, "e");
-  expect(CUSTOM_EVENT_UPDATE, "e", "{}");
-  append(QLIB_NOTIFY_MODIFY, "d");
-  expect(QLIB_NOTIFY_MODIFY, "d", "{}");
-  append(CUSTOM_EVENT_REINDEX, "d/");
-  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
-  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
-  EXPECT_EQ(Queue(), lines);
-
-  append(CUSTOM_EVENT_UPDATE, "d");
-  expect(CUSTOM_EVENT_UPDATE, "d", "{}");
-  expect(CUSTOM_EVENT_REINDEX, "d", "");
-  expect(CUSTOM_EVENT_REINDEX, "d/", "");
-  append(CUSTOM_EVENT_REINDEX, "d");
-  expect(CUSTOM_EVENT_REINDEX, "d", "{}");
-  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
-  EXPECT_EQ(Queue(), lines);
-
-  append(QLIB_NOTIFY_CREATE, "d/again");
-  expect(QLIB_NOTIFY_CREATE, "d/again", "{}");
-  append(CUSTOM_EVENT_REINDEX, "d");
-  expect(CUSTOM_EVENT_REINDEX, "d/", "{}");
-  EXPECT_EQ(Queue(), lines);
+  append(CUSTOM_EVENT_REINDEX, "e", {"e"});
+  append(CUSTOM_EVENT_UPDATE, "e", {});
+  append(QLIB_NOTIFY_MODIFY, "d", {});
+  append(CUSTOM_EVENT_REINDEX, "d/", {"d/", "d/"});
+  append(CUSTOM_EVENT_UPDATE, "d", {"d", "d/"});
+  append(CUSTOM_EVENT_REINDEX, "d", {"d", "d/"});
+  append(QLIB_NOTIFY_CREATE, "d/again", {});
+  append(CUSTOM_EVENT_REINDEX, "d", {"d/"});
 }
 
 TEST_F(QueueContentTest, TheLastLineCountsThoughItHasNoNewline) {

@@ -13,7 +13,6 @@
 #include <csignal>
 #include <filesystem>
 #include <set>
-#include <sstream>
 
 #include "base/scoped_fd.h"
 #include "state/layout.h"
@@ -176,10 +175,8 @@ void Drain(const std::string& queue, const std::string& drained,
     return;
   }
   ASSERT_EQ(rename(queue.c_str(), drained.c_str()), 0);
-  std::istringstream text(ReadFile(drained));
-  for (std::string line; std::getline(text, line);) {
-    lines.insert(line);
-  }
+  const std::vector<std::string> taken = ReadLines(drained);
+  lines.insert(taken.begin(), taken.end());
   ASSERT_EQ(unlink(drained.c_str()), 0);
 }
 
