@@ -34,20 +34,31 @@ bool PutDifference(Difference difference, const std::string& path, const Argumen
   return PutJson(object);
 }
 
-// `returned`: see QueueContent::TextsOf.
+// `returned`: what is there again though a delete waits for it, see QueueContent::TextsOf.
 int QueueRepair(const std::string& share_name, Repair& repair,
                 const std::vector<std::string>& returned) {
   if (repair.IsEmpty()) {
     return EXIT_DONE;
   }
+  (void)repair.Lines(QUEUE_LINE_LIMIT);  // counts in the index, before others wait for the lock
   const auto make = [&] {
     const QueueContent queued = ReadQueueContent(share_name);
     const size_t room = QUEUE_LINE_LIMIT - std::min(queued.lines, QUEUE_LINE_LIMIT);
-    std::vector<std::string> texts;
-    for (const QueueLine& line : repair.Lines(returned.empty() ? room : room / 2)) {
-      std::ranges::move(queued.TextsOf(line, returned), std::back_inserter(texts));
+    for (const std::string& path : returned) {
+      if (const std::string above = queued.ReindexedAbove(path); above != path) {
+        (void)repair.Add({Difference::MISSING, above, Thing::NONE, Thing::DIRECTORY});
+      }
     }
-    return texts;
+    const auto texts_of_at_most = [&](size_t most) {
+      std::vector<std::string> texts;
+      for (const QueueLine& line : repair.Lines(most)) {
+        std::ranges::move(queued.TextsOf(line, returned), std::back_inserter(texts));
+      }
+      return texts;
+    };
+    std::vector<std::string> texts = texts_of_at_most(room);
+    // A line has up to three texts. A queue that is full is given one line's.
+    return texts.size() <= room ? texts : texts_of_at_most(room / 3);
   };
   std::string error;
   return AppendToQueue(share_name, make, Durability::NONE, error)

@@ -3,8 +3,8 @@
 //
 // A delete takes the entry away whatever the disk holds by then, and the daemon executes a batch
 // from the top of its tree downwards: a delete that was queued before the reindex of a directory
-// above it is executed after it, and takes away what came back with that directory. So whoever
-// queues such a line has the deletes below it looked at again, and so does whoever compared.
+// above it may be executed after it, and takes away what came back with that directory. So the
+// service has the deletes below such a line looked at again, and those that wait when it compared.
 //
 // Of two lines at one path mostly the later is executed alone. A modify, or a change of attributes,
 // displaces the walk of a directory that a rename brought, and the reading anew of a file that was

@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <exception>
 #include <iterator>
 #include <utility>
@@ -17,14 +18,31 @@ namespace fileindexd {
 
 namespace {
 
-// What is there again at or below the directory though it is deleted by what waits.
+// What a line has the daemon reindex, or empty. Of a rename it is the former path.
+std::string ReindexedBy(const LineInFile& line) {
+  if ((line.event & QLIB_NOTIFY_RENAME) != 0) {
+    return line.path_old;
+  }
+  constexpr uint32_t DECISIVE =
+      QLIB_NOTIFY_RENAME_FULL | CUSTOM_EVENT_REINDEX | CUSTOM_EVENT_UPDATE;
+  return (line.event & DECISIVE) == CUSTOM_EVENT_REINDEX ? line.path : std::string();
+}
+
+// Whether one of the paths, sorted by components, lies at or below the directory.
+bool IsOneBelow(const std::vector<std::string>& paths, const std::string& directory) {
+  const auto first = std::ranges::lower_bound(paths, directory, ByComponents());
+  return first != paths.end() && Covers(directory, *first);
+}
+
+// What may be there again at or below the directory though it is deleted by what waits.
 std::vector<std::string> ReturnedBelow(const std::string& directory,
                                        const std::string& share_name) {
   const std::string normal = NormalPath(directory).value_or(directory);
   std::vector<std::string> deletes = ReadQueueContent(share_name).deletes;
   std::erase_if(deletes, [&normal](const std::string& path) {
     struct stat status {};
-    return !Covers(normal, path) || lstat(path.c_str(), &status) != 0;
+    return !Covers(normal, path) ||
+           (lstat(path.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR));
   });
   return deletes;
 }
@@ -94,6 +112,9 @@ QueueContent ReadQueueContent(const std::string& share_name) {
     ++queued.lines;
     if (reader.Read(text, line)) {
       queued.updates.Note(line.event, line.path);
+      if (std::string path = ReindexedBy(line); !path.empty()) {
+        queued.reindexed.insert(std::move(path));
+      }
       note();
     }
   });
@@ -101,17 +122,36 @@ QueueContent ReadQueueContent(const std::string& share_name) {
   return queued;
 }
 
+std::string QueueContent::ReindexedAbove(const std::string& path) const {
+  for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
+    std::string above = path.substr(0, end);
+    if (reindexed.contains(above)) {
+      return above;
+    }
+  }
+  return path;
+}
+
 std::vector<std::string> QueueContent::TextsOf(const QueueLine& line,
                                                const std::vector<std::string>& returned) const {
-  const std::string normal = NormalPath(line.path).value_or(line.path);
-  const bool is_above = std::ranges::any_of(
-      returned, [&normal](const std::string& path) { return Covers(normal, path); });
   std::vector<std::string> texts;
-  if (line.event == CUSTOM_EVENT_REINDEX && is_above) {
-    texts.push_back(EventLine(line.event, line.path, std::nullopt, line.data));
+  const auto put = [&](const std::string& path) {
+    texts.push_back(EventLine(line.event, path, std::nullopt, line.data));
+  };
+  if (line.event != CUSTOM_EVENT_REINDEX ||
+      !IsOneBelow(returned, NormalPath(line.path).value_or(line.path))) {
+    put(updates.PathInFile(line.event, line.path));
+    return texts;
   }
-  texts.push_back(
-      EventLine(line.event, updates.PathInFile(line.event, line.path), std::nullopt, line.data));
+
+  const std::string path = ReindexedAbove(line.path);
+  const std::string in_file = updates.PathInFile(line.event, path);
+  put(path);
+  if (in_file != path) {
+    // A later line may have dropped the update: then the first is new, and keeps what lies below.
+    put(path);
+  }
+  put(in_file);
   return texts;
 }
 

@@ -59,25 +59,35 @@ class WaitingUpdates {
 };
 
 struct QueueContent {
-  size_t lines = 0;                  // of the queue file
-  WaitingUpdates updates;            // of the queue file; its drained copy is a batch of its own
-  std::vector<std::string> deletes;  // normal paths that one of both deletes last, sorted
+  size_t lines = 0;  // of the queue file
+  // Of the queue file alone: its drained copy is a batch of its own.
+  WaitingUpdates updates;
+  std::set<std::string> reindexed;  // paths as they stand in the file
+  // Of both: normal paths, sorted, whose last line is a delete.
+  std::vector<std::string> deletes;
 
-  // The texts of a line that is no rename, named by what waits.
+  // The uppermost directory at or above the path for which a reindex waits, or else the path.
+  std::string ReindexedAbove(const std::string& path) const;
+
+  // The texts of a line that is no rename. A reindex is named by what waits.
   //
   // A delete takes the entry away whatever the disk holds by then, and the daemon executes a batch
   // from the top of its tree downwards: a delete that was queued before the reindex of a directory
   // above it may be executed after it, and takes away what came back with that directory. A second
-  // reindex of the same path drops all that was queued below it. So there are two where one of
-  // `returned`, the normal paths of such deletes, lies at or below the path.
+  // reindex of the same path drops all that was queued below it by names as they are usually
+  // spelled. So there are two where one of `returned`, the normal paths of such deletes, sorted by
+  // components, lies at or below the path.
+  //
+  // Where a reindex waits above, it holds those deletes, and passes over a reindex further down:
+  // so it is the one that is queued again.
   std::vector<std::string> TextsOf(const QueueLine& line,
                                    const std::vector<std::string>& returned) const;
 };
 // Reads all of both: some 20 ms for as many lines as are queued at most.
 QueueContent ReadQueueContent(const std::string& share_name);
 
-// Appends the line of one event, as AppendToQueue, its path named by what waits at that moment. A
-// reindex, or an update of a subtree, comes with the lines that keep a delete from undoing it.
+// Appends the line of one event, as AppendToQueue; a reindex is named by what waits at that moment.
+// A reindex, or an update of a subtree, comes with the lines that keep a delete from undoing it.
 bool AppendEvent(const std::string& share_name, uint32_t event, const std::string& path,
                  const std::string& data, Durability durability, std::string& error);
 

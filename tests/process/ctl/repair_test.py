@@ -254,6 +254,32 @@ class RepairTest(IndexTest):
 
         self.assertLessEqual(len(self.mend()), QUEUE_LINES)
 
+    def test_what_fits_beside_a_delete_of_what_came_back_is_queued_as_it_is(self):
+        waiting = [{"event": DELETE, "path": f"{self.root}/d/g"}]
+        waiting += [{"event": MODIFY, "path": f"{self.root}/none/{i}"} for i in range(4990)]
+        self.append("alpha", *waiting)
+        names = [b"1", b"2", b"d!/3", b"d/4", b"d/e/5", b"x/6", b"x/y/7"]
+        for name in names:
+            self.write(name)
+
+        lines = self.mend()
+
+        self.assertCountEqual(
+            lines[len(waiting) :], [(MODIFY, name) for name in (*names, b"d/g")]
+        )
+
+    def test_a_reindex_that_waits_above_such_deletes_takes_in_what_is_below_it(self):
+        names = ("d/1/x", "d/2/x")
+        waiting = [{"event": DELETE, "path": f"{self.root}/{name}"} for name in names]
+        waiting.append({"event": REINDEX, "path": f"{self.root}/d"})
+        self.append("alpha", *waiting)
+        for name in ("b", "d/3", *names):
+            self.write(name)
+
+        lines = self.mend()
+
+        self.assertEqual(lines[len(waiting) :], [(MODIFY, b"b"), *[(REINDEX, b"d")] * 2])
+
     def test_a_full_queue_is_given_one_line(self):
         self.append("alpha", *[{"event": MODIFY, "path": f"{self.root}/none"}] * QUEUE_LINES)
         self.write("d/new")

@@ -7,7 +7,10 @@ import shutil
 
 from harness import IndexTest, main, namespace
 
+MODIFY = 0x2
+CREATE = 0x40
 DELETE = 0x80
+UPDATE = 0x20000
 
 
 class WaitingTest(IndexTest):
@@ -77,6 +80,37 @@ class WaitingTest(IndexTest):
         self.prepare("d/x.txt", "d/e/y.txt", "d/z.txt")
         self.delete("d/x.txt", "d/e", "d/gone.txt")
         self.ctl("reindex", self.at("d"))
+        self.assert_mended()
+
+    def test_below_a_reindex_that_waits_above_a_delete_of_what_came_back(self):
+        self.prepare(*(f"{number}/d/y.txt" for number in range(4)), folders=("", "2/d", "3/d"))
+        for number, command in enumerate(
+            (
+                ("verify", "alpha", "--repair"),
+                ("reindex", self.at("1/d")),
+                ("folder", "set", self.at("2/d"), "--audio=off"),
+                ("folder", "remove", self.at("3/d")),
+            )
+        ):
+            with self.subTest(command=command):
+                self.delete(f"{number}/d/e/x.txt")
+                self.ctl("reindex", self.at(str(number)))
+                self.make_files(self.root, f"{number}/d/e/x.txt")
+                self.ctl(*command)
+                self.assert_mended()
+
+    def test_a_reindex_above_such_a_delete_behind_an_update_that_was_dropped(self):
+        self.prepare("q/p/x.txt", "q/o", "e")
+        for event, name in (
+            (UPDATE, "q/p"),
+            (MODIFY, "q/o"),
+            (MODIFY, "e"),
+            (DELETE, "q"),
+            (CREATE, "q"),
+            (DELETE, "q/p/x.txt"),
+        ):
+            self.ctl("event", "alpha", str(event), self.at(name))
+        self.ctl("reindex", self.at("q/p"))
         self.assert_mended()
 
     def test_deletes_whose_paths_are_spelled_in_other_ways(self):

@@ -88,10 +88,46 @@ TEST_F(QueueContentTest, AReindexIsQueuedTwiceAboveADeleteOfWhatIsThereAgain) {
   append(CUSTOM_EVENT_UPDATE, "e", {});
   append(QLIB_NOTIFY_MODIFY, "d", {});
   append(CUSTOM_EVENT_REINDEX, "d/", {"d/", "d/"});
-  append(CUSTOM_EVENT_UPDATE, "d", {"d", "d/"});
-  append(CUSTOM_EVENT_REINDEX, "d", {"d", "d/"});
+  append(CUSTOM_EVENT_UPDATE, "d", {"d", "d", "d/"});
+  append(CUSTOM_EVENT_REINDEX, "d", {"d", "d", "d/"});
   append(QLIB_NOTIFY_CREATE, "d/again", {});
   append(CUSTOM_EVENT_REINDEX, "d", {"d/"});
+}
+
+// Which passes over one further down.
+TEST_F(QueueContentTest, AReindexThatWaitsAboveIsQueuedTwiceInstead) {
+  const auto path = [this](const std::string& name) { return folder + "/s/" + name; };
+  std::filesystem::create_directories(path("a/b/c/again"));
+  const auto reindexed = [&] {
+    std::string error;
+    const size_t before = ReadLines(QueuePath("s")).size();
+    EXPECT_TRUE(AppendEvent("s", CUSTOM_EVENT_REINDEX, path("a/b/c"), {}, Durability::NONE, error));
+    std::vector<std::string> lines = ReadLines(QueuePath("s"));
+    lines.erase(lines.begin(), lines.begin() + static_cast<ptrdiff_t>(before));
+    return lines;
+  };
+  const auto texts = [&](const std::vector<std::string>& names) {
+    std::vector<std::string> lines;
+    for (const std::string& name : names) {
+      lines.push_back(EventLine(CUSTOM_EVENT_REINDEX, path(name)));
+    }
+    return lines;
+  };
+
+  Append({EventLine(CUSTOM_EVENT_REINDEX, path("a"))});
+  Drain();
+  Append({EventLine(CUSTOM_EVENT_REINDEX, path("a/b/c/again")),
+          EventLine(CUSTOM_EVENT_REINDEX, path("a/b/cc")),
+          EventLine(CUSTOM_EVENT_REINDEX | CUSTOM_EVENT_UPDATE, path("a")),
+          EventLine(CUSTOM_EVENT_REINDEX | QLIB_NOTIFY_RENAME_FULL, path("a")),
+          EventLine(QLIB_NOTIFY_RENAME, path("a"), path("e"))});
+  EXPECT_EQ(reindexed(), texts({"a/b/c"}));
+  Append({EventLine(QLIB_NOTIFY_DELETE, path("a/b/c/again"))});
+  EXPECT_EQ(reindexed(), texts({"a/b/c", "a/b/c"}));
+  Append({EventLine(QLIB_NOTIFY_RENAME, path("e"), path("a/b"))});
+  EXPECT_EQ(reindexed(), texts({"a/b", "a/b"}));
+  Append({EventLine(CUSTOM_EVENT_REINDEX, path("a"))});
+  EXPECT_EQ(reindexed(), texts({"a", "a", "a/"}));
 }
 
 TEST_F(QueueContentTest, TheLastLineCountsThoughItHasNoNewline) {
