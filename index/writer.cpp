@@ -114,10 +114,7 @@ IndexError EntryWriter::Impl::Do(const std::string& path, EntryOperation&& opera
   error = Apply(operation, seen);
   if (error == IndexError::NONE) {
     operation.applied = true;
-    // What changed nothing has nothing to repeat.
-    if (table->changes != before) {
-      Remember(std::move(operation));
-    }
+    Remember(std::move(operation));
     return error;
   }
 

@@ -2,12 +2,13 @@
 // The insides of EntryWriter.
 //
 // DESIGN: SQLite undoes a failed statement alone, but a full disk takes the whole transaction
-// along, and the next commit then finds nothing to do. So every operation that changed something
-// since the last good commit is on a list, and so is every one that failed for want of space, for
-// the disk or for the lock. When the transaction is lost, the list is carried out again in a new
-// one before anything else; each operation then writes what the disk shows at that time. What looks
-// failed on its own (a thing that cannot be looked at) is passed over, so that it holds nothing
-// else up, and stays on the list.
+// along, and the next commit then finds nothing to do. So every operation since the last good
+// commit is on a list, whether it was carried out or failed for want of space, for the disk or for
+// the lock. (One that changed nothing may have found its work done by another, which does not do it
+// again: by then the disk shows that one something else.) When the transaction is lost, the list is
+// carried out again in a new one before anything else; each operation then writes what the disk
+// shows at that time. What looks failed on its own (a thing that cannot be looked at) is passed
+// over, so that it holds nothing else up, and stays on the list.
 //
 // One transaction lasts from the first operation after a commit to the next commit. An operation
 // that fails half done takes it along.

@@ -85,6 +85,27 @@ TEST_F(FullDiskTest, OperationsOfAFullDiskAreReplayedByTheNextOnes) {
   EXPECT_EQ(Differences(), Names());
 }
 
+// A rename's second line finds nothing left to do. What it asked for is lost with the transaction
+// all the same, and by the time of the replay the first one's path is gone, which told of the
+// other.
+TEST_F(FullDiskTest, WhatFoundItsWorkDoneIsReplayedToo) {
+  AddAll();
+  ASSERT_EQ(rename(At("some picture of 0.jpg").c_str(), At("moved.jpg").c_str()), 0);
+  Refresh("moved.jpg");
+  Delete("some picture of 0.jpg");
+  FillBut(0);
+  for (int i = 1; i < FILES; ++i) {
+    WriteFile(At("some picture of " + std::to_string(i) + ".jpg"), "changed");
+  }
+  ASSERT_FALSE(Batch() && writer->Commit());
+
+  RemoveTree(At("moved.jpg"));
+  Free();
+  Delete("moved.jpg");
+  Commit();
+  EXPECT_EQ(Differences(), Names());
+}
+
 TEST_F(FullDiskTest, CreationOnAFullDiskSucceedsLater) {
   writer.reset();
   RemoveTree(state_root + "/shares/s");
