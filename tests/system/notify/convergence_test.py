@@ -192,12 +192,30 @@ class Convergence(WatchedDiskTest):
         looks = 0
         while (result := self.try_ctl("verify", name)).code != 0:
             looks += 1
-            self.assertLess(looks, LOOKS, f"{name}: {result}\n{self.watched(name)}")
+            if looks == LOOKS:
+                self.fail(f"{name}: {result}\n{self.watched(name)}\n{self.facts(name, result)}")
             await_in_folder(self.queue(name), lambda: False, 0.5)
         self.longest = max(self.longest, looks)
         self.assertEqual(self.watched(name)["compared"], compared, self.watched(name))
 
+    def facts(self, name, result):
+        """Of what differs, and of the folders above it: what the index holds, since when, and what
+        is on disk. The story's own times count from `began`."""
+        now = f"now {time.time():.6f} s since the epoch, {time.monotonic() - self.began:.6f} s here"
+        facts = [now]
+        for line in result.out.splitlines():
+            path = line.split(b"\t")[-1]
+            while path.startswith(os.fsencode(self.roots[name])):
+                try:
+                    on_disk = os.lstat(path)
+                except OSError as error:
+                    on_disk = error
+                facts += [str(self.try_ctl("info", path, "--json").out), str(on_disk)]
+                path = os.path.dirname(path)
+        return "\n".join(facts)
+
     def quiet(self):
+        print(f"{time.monotonic() - self.began:7.1f} s  quiet", flush=True)
         self.mend()
         self.await_backlog()
         self.count_overflows()
