@@ -46,7 +46,10 @@ Look LinesOfLook(const Settings& settings, const std::string& path, uint32_t wha
                  const std::string& from, FolderView& folder, std::vector<QueueLine>& lines) {
   const Look look = LookNear(settings, path, folder);
   const bool may_be_there = look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN;
-  if (!from.empty() && may_be_there) {
+  // A directory that comes to where one has left may be the same one, with less in it: to the
+  // daemon a rename only adds.
+  const bool came_back = look.thing == Thing::DIRECTORY && (what & (DELETED | MOVED_FROM)) != 0;
+  if (!from.empty() && may_be_there && !came_back) {
     lines.push_back({QLIB_NOTIFY_RENAME, path, {}, from});
     return look;
   }

@@ -129,7 +129,8 @@ void QueueFolding::AddRename(const std::string& path, const std::string& path_ol
   } else {
     const auto at = lines.find(path);
     const Line before = at == lines.end() ? Line{} : at->second;
-    if (IsUpdateOfAll(before.event)) {
+    // What comes to where something was deleted may be what went, with less in it.
+    if (IsUpdateOfAll(before.event) || before.event == QLIB_NOTIFY_DELETE) {
       FoldInto(path);
       FoldUnlessTakenIn(path_old);
     } else {

@@ -71,6 +71,22 @@ class WaitingLines(WatchedDiskTest):
 
         self.assert_converged(self.root)
 
+    def test_a_folder_that_returns_by_another_name_while_its_delete_waits(self):
+        self.begin_with("d/gone.txt", "d/kept.txt", "z.txt")
+        away = f"{self.elsewhere}/away"
+
+        with stopped(self.daemon_pid()):
+            os.unlink(self.at("z.txt"))
+            os.rename(self.at("d"), away)
+            os.unlink(f"{away}/gone.txt")
+            self.await_written()
+            with stopped(self.notifier.pid):
+                os.rename(away, self.at("t"))
+                os.rename(self.at("t"), self.at("d"))
+            self.await_written()
+
+        self.assert_converged(self.root)
+
     def test_deletes_that_an_earlier_service_queued_and_that_came_back_with_their_folder(self):
         self.begin_with("d/a.txt", "z.txt")
 
