@@ -34,9 +34,20 @@ bool PutDifference(Difference difference, const std::string& path, const Argumen
   return PutJson(object);
 }
 
-// `returned`: what is there again though a delete waits for it, see QueueContent::TextsOf.
-int QueueRepair(const std::string& share_name, Repair& repair,
-                const std::vector<std::string>& returned) {
+// What is there again though a delete waits for it: see QueueContent::TextsOf.
+using Returned = std::vector<std::string>;
+
+// Of at most `most` lines, or one.
+std::vector<std::string> TextsOf(const QueueContent& queued, Repair& repair,
+                                 const Returned& returned, size_t most) {
+  std::vector<std::string> texts;
+  for (const QueueLine& line : repair.Lines(most)) {
+    std::ranges::move(queued.TextsOf(line, returned), std::back_inserter(texts));
+  }
+  return texts;
+}
+
+int QueueRepair(const std::string& share_name, Repair& repair, const Returned& returned) {
   if (repair.IsEmpty()) {
     return EXIT_DONE;
   }
@@ -49,16 +60,9 @@ int QueueRepair(const std::string& share_name, Repair& repair,
         (void)repair.Add({Difference::MISSING, above, Thing::NONE, Thing::DIRECTORY});
       }
     }
-    const auto texts_of_at_most = [&](size_t most) {
-      std::vector<std::string> texts;
-      for (const QueueLine& line : repair.Lines(most)) {
-        std::ranges::move(queued.TextsOf(line, returned), std::back_inserter(texts));
-      }
-      return texts;
-    };
-    std::vector<std::string> texts = texts_of_at_most(room);
+    std::vector<std::string> texts = TextsOf(queued, repair, returned, room);
     // A line has up to three texts. A queue that is full is given one line's.
-    return texts.size() <= room ? texts : texts_of_at_most(room / 3);
+    return texts.size() <= room ? texts : TextsOf(queued, repair, returned, room / 3);
   };
   std::string error;
   return AppendToQueue(share_name, make, Durability::NONE, error)
@@ -105,11 +109,10 @@ int TellUnreadable(const Comparison& counts) {
   return Fail(EXIT_FAILED, "%s", text.c_str());
 }
 
-// Deletes that wait take away what is there again, whatever the index holds by now. Returns those
-// paths.
-std::vector<std::string> AddReturned(const Settings& settings,
-                                     const std::vector<std::string>& deletes, Repair& repair) {
-  std::vector<std::string> returned;
+// Deletes that wait take away what is there again, whatever the index holds by now.
+Returned AddReturned(const Settings& settings, const std::vector<std::string>& deletes,
+                     Repair& repair) {
+  Returned returned;
   for (const std::string& path : deletes) {
     const Look look = LookAt(settings, path);
     if (look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN) {
@@ -175,7 +178,7 @@ int Verify(const Arguments& arguments) {
     return is_read ? code : TellUnreadable(comparer.counts);
   }
 
-  const std::vector<std::string> returned = AddReturned(*session.settings, deletes, repair);
+  const Returned returned = AddReturned(*session.settings, deletes, repair);
   const int queued = QueueRepair(share->name, repair, returned);
   if (queued == EXIT_DONE && !mended) {
     return Fail(EXIT_FAILED, "%s: the index holds entries from outside the share",
