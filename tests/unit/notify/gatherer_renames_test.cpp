@@ -59,6 +59,12 @@ TEST_F(GathererTest, AFolderThatLeftAndReturnsByAnotherNameIsReindexed) {
   }
 
   EXPECT_EQ(Due(), Texts({"REINDEX d", "DELETE by-d", "RENAME by-file file"}));
+
+  MakeDirectory("last");
+  Add(Rename("first", "d", true));
+  Add(Rename("d", "last", true));
+  Add(Rename("other", "d", true));
+  EXPECT_EQ(Due(), Texts({"REINDEX d", "DELETE other", "RENAME first last"}));
 }
 
 TEST_F(GathererTest, RenameBackOverAnotherRenameLosesNoPath) {

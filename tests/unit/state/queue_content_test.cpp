@@ -130,6 +130,25 @@ TEST_F(QueueContentTest, AReindexThatWaitsAboveIsQueuedTwiceInstead) {
   EXPECT_EQ(reindexed(), texts({"a", "a", "a/"}));
 }
 
+TEST_F(QueueContentTest, WhatCannotBeLookedAtMayBeThereAgain) {
+  const std::string directory = folder + "/s/d";
+  std::filesystem::create_directories(directory);
+  std::filesystem::create_symlink("loop", directory + "/loop");
+  WriteFile(directory + "/file", "");
+  std::vector<std::string> lines;
+  const auto append = [&](const std::string& deleted, size_t reindexes) {
+    lines.push_back(EventLine(QLIB_NOTIFY_DELETE, directory + deleted));
+    Append({lines.back()});
+    std::string error;
+    EXPECT_TRUE(AppendEvent("s", CUSTOM_EVENT_REINDEX, directory, {}, Durability::NONE, error));
+    lines.insert(lines.end(), reindexes, EventLine(CUSTOM_EVENT_REINDEX, directory));
+    EXPECT_EQ(ReadLines(QueuePath("s")), lines) << deleted;
+  };
+  append("/gone", 1);
+  append("/file/below", 1);
+  append("/loop/below", 2);
+}
+
 TEST_F(QueueContentTest, TheLastLineCountsThoughItHasNoNewline) {
   Append({EventLine(QLIB_NOTIFY_CREATE, "/s/c")});
   WriteFile(QueuePath("s"), ReadFile(QueuePath("s")) + EventLine(CUSTOM_EVENT_UPDATE, "/s/f"));
