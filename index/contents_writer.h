@@ -32,7 +32,7 @@ struct ContentJob {
 class ContentsWriter {
  public:
   // Bigger transactions cost memory and gain nothing.
-  static constexpr size_t ENOUGH_PENDING = size_t{8} << 20;
+  static constexpr size_t ENOUGH_PENDING = size_t{6} << 20;
 
   ContentsWriter();
   ~ContentsWriter();
