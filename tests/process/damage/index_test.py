@@ -11,6 +11,7 @@ import sqlite3
 from harness import IndexTest, main, namespace
 from harness.pages import PAGE, copy_log_back, scribble, scribble_leaf
 from harness.standing_in import make_full_folder, remove, replace
+from harness.stopped import stopped
 
 CREATE = 0x40
 MS_RDONLY = 1
@@ -246,8 +247,9 @@ class DamagedIndexTest(IndexTest):
     def damaged_while_running(self, damage, fate):
         self.make_index()
         after = self.log.mark()
-        damage()
-        found = contents(FOLDER)
+        with stopped(self.daemon_pid()):  # whoever reads may tell it at once
+            damage()
+            found = contents(FOLDER)
         self.ask()
         self.settle(after)
 
