@@ -48,7 +48,12 @@ int Worker::ProcessQueue() {
     TALO::FILEINDEX::StatusMgr::ShareSetNeedReindex(share_name, false);
     // The whole share is indexed again: what is pending tells nothing new.
     QLIBCExec("/bin/rm", "-rf", queue_path.c_str(), nullptr, nullptr);
-    result = ReindexDirectory(share_path);
+    try {
+      result = ReindexDirectory(share_path);
+    } catch (const std::exception& failure) {
+      NoteThrown(failure, OP_REINDEX, share_path);
+      result = MustStop() ? PASS_STOPPED : PASS_DONE;
+    }
     CommitIndex();
   } else {
     WaitWhilePaused();
@@ -73,16 +78,13 @@ int Worker::ExecuteTree(OpTree* tree) {
     if (node == nullptr) {
       break;
     }
-    FI_DEBUG("TREE COMMAND %d: path=%s, data=%s", node->op, node->name.c_str(),
-             node->data.toString().c_str());
 
     try {
+      FI_DEBUG("TREE COMMAND %d: path=%s, data=%s", node->op, node->name.c_str(),
+               node->data.toString().c_str());
       Execute(*node);
     } catch (const std::exception& failure) {
-      FI_LOG("Failed to execute op %d, path=%s", node->op, node->name.c_str());
-      if (dynamic_cast<const std::bad_alloc*>(&failure) != nullptr) {
-        TALO::FILEINDEX::NoteLostChanges(share_path, ENOMEM);
-      }
+      NoteThrown(failure, node->op, node->name);
     }
 
     // One node, which may be a whole walk, is never interrupted. A stop does not commit.
@@ -93,6 +95,13 @@ int Worker::ExecuteTree(OpTree* tree) {
 
   CommitIndex();
   return PASS_DONE;
+}
+
+void Worker::NoteThrown(const std::exception& failure, int op, const std::string& path) {
+  FI_LOG("Failed to execute op %d, path=%s", op, path.c_str());
+  if (dynamic_cast<const std::bad_alloc*>(&failure) != nullptr) {
+    TALO::FILEINDEX::NoteLostChanges(share_path, ENOMEM);
+  }
 }
 
 // The results are dropped: a failed operation has said so itself, and never stops a pass.

@@ -14,6 +14,7 @@
 
 #include <atomic>
 #include <ctime>
+#include <exception>
 #include <string>
 #include <vector>
 
@@ -126,6 +127,7 @@ class Worker {
   void AdoptFolders();
   int ExecuteTree(OpTree* tree);
   void Execute(const OpNode& node);
+  void NoteThrown(const std::exception& failure, int op, const std::string& path);
   bool MustStop() const { return state == WORKER_OUT_OF_SPACE || state == WORKER_IDLE; }
 };
 

@@ -181,6 +181,30 @@ TEST_F(WorkerRunLoopTest, AReindexOfAShareThatCannotBeOpenedEndsThePassAsDone) {
   EXPECT_EQ(script.CallCount("Commit"), 1);
 }
 
+TEST_F(WorkerRunLoopTest, AReindexOfTheShareThatThrowsIsToldAndCommitted) {
+  script.need_reindex.insert("s");
+  script.Run("DelFSDocument", 1, [] { throw std::bad_alloc(); });
+
+  EXPECT_EQ(Pass(), PASS_DONE);
+
+  EXPECT_THAT(Log(), ElementsAre("Failed to execute op 6, path=" + share_path));
+  EXPECT_THAT(script.Calls(),
+              Contains("NoteLostChanges " + share_path + " " + std::to_string(ENOMEM)));
+  EXPECT_EQ(script.CallCount("Commit"), 1);
+}
+
+TEST_F(WorkerRunLoopTest, AReindexOfTheShareThatThrowsWhileAStopIsAskedForKeepsTheCopy) {
+  folder.Write("queue/TALO@file_index_queue.tmp", "rest");
+  script.need_reindex.insert("s");
+  script.Run("DelFSDocument", 1, [&] {
+    worker->state = WORKER_IDLE;
+    throw std::runtime_error("host");
+  });
+
+  EXPECT_EQ(Pass(), PASS_STOPPED);
+  EXPECT_TRUE(HasDrained());
+}
+
 TEST_F(WorkerRunLoopTest, ABatchOfNothingToDoIsCommittedToo) {
   Queue({Event(1024, In("a")), Event(1, In("b"))});
 
