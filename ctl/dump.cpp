@@ -12,7 +12,7 @@ namespace fileindexd {
 
 namespace {
 
-bool PutEntry(const Entry& entry, Kind kind, const Arguments& arguments) {
+bool PutEntry(const Entry& entry, Kind kind, const Settings& settings, const Arguments& arguments) {
   if (!arguments.json) {
     return arguments.nul_ended ? PutLine(entry.path, '\0') : PutLine(ShownName(entry.path));
   }
@@ -23,7 +23,7 @@ bool PutEntry(const Entry& entry, Kind kind, const Arguments& arguments) {
   object["kind"] = KindText(kind);
   object["size"] = static_cast<Json::Int64>(entry.size);
   object["mtime"] = static_cast<Json::Int64>(WholeSeconds(entry.mtime));
-  object["content"] = entry.content_wanted;
+  object["content"] = IsWantedAs(kind, entry, settings);
   return PutJson(object);
 }
 
@@ -59,7 +59,7 @@ int Dump(const Arguments& arguments) {
   const Progress progress("reading the index of " + share->name);
   bool written = true;
   const bool read = reader.ForEach(share->path, [&](const Entry& entry) {
-    written = PutEntry(entry, kinds.KindOf(entry), arguments);
+    written = PutEntry(entry, kinds.KindOf(entry), *session.settings, arguments);
     return written;
   });
   if (!read && written) {

@@ -13,6 +13,7 @@
 #include "ctl/root_problem.h"
 #include "index/compare.h"
 #include "index/entry_table.h"
+#include "index/found_kind.h"
 #include "index/reader.h"
 #include "index/suspicion.h"
 #include "state/filesystem.h"
@@ -110,10 +111,12 @@ void Explain(const Settings& settings, PathFacts& facts, int reason) {
   }
 }
 
-void AskIndex(const Settings& settings, PathFacts& facts) {
+void AskIndex(Session& session, PathFacts& facts) {
+  const Settings& settings = *session.settings;
+  const bool is_lost = IsIndexLost(*session.store, settings, facts.share->name);
   EntryReader reader;
   const IndexError opened = OpenAndTell(reader.database, facts.share->name);
-  if (opened == IndexError::PATH_NOT_FOUND) {
+  if (opened == IndexError::PATH_NOT_FOUND && !is_lost) {
     facts.index_problem = "the share is not indexed yet";
     return;
   }
@@ -196,7 +199,7 @@ bool FindFacts(Session& session, const std::string& given, PathFacts& facts) {
       return false;
     }
     facts.root = LookAtRoot(*facts.share);
-    AskIndex(settings, facts);
+    AskIndex(session, facts);
     if (facts.in_index && facts.entry.content_wanted) {
       facts.content = ContentOf(*facts.share, facts.entry);
     }
@@ -205,7 +208,9 @@ bool FindFacts(Session& session, const std::string& given, PathFacts& facts) {
   facts.agreement = Compare(facts);
   // Only now: the index has the kinds that names tell.
   if (facts.in_index && facts.entry.kind == Kind::OTHER && facts.content.is_known) {
-    facts.entry.kind = facts.content.stored.content.kind;
+    const Kind found = facts.content.stored.content.kind;
+    facts.entry.content_wanted = IsWantedAs(found, facts.entry, settings);
+    facts.entry.kind = found;
   }
   return true;
 }

@@ -2,14 +2,14 @@
 #include "ctl/root_problem.h"
 
 #include "ctl/output.h"
+#include "index/emptied.h"
 
 namespace fileindexd {
 
-// The root itself is an entry where it is an indexed folder; an index of that alone is as empty.
 bool IsRootEmptied(const Settings& settings, const Share& share, const ShareStatus& status,
                    RootState root, uint64_t entries) {
-  const uint64_t own = settings.FolderAt(share.path) != nullptr ? 1 : 0;
-  return !status.accept_empty && root == RootState::SOUND && entries > own && IsRootEmpty(share);
+  return !status.accept_empty && root == RootState::SOUND &&
+         HoldsMoreThanFolders(settings, share, entries) && IsRootEmpty(share);
 }
 
 std::string RootProblem(const std::string& subject, const Share& share, RootState root,

@@ -12,6 +12,7 @@
 #include "ctl/output.h"
 #include "ctl/places.h"
 #include "ctl/values.h"
+#include "index/emptied.h"
 #include "index/reader.h"
 #include "index/text_tokenizer.h"
 #include "state/belonging.h"
@@ -103,8 +104,8 @@ const IndexedFolder* FirstFolder(const Settings& settings, const Share& share) {
   return found == settings.folders.end() ? nullptr : &*found;
 }
 
-// Whether there is anything in the index but the share's root. False, with its line written, when
-// that cannot be told.
+// Whether there is anything in the index but the indexed folders themselves. False, with its line
+// written, when that cannot be told.
 bool HoldsSomething(const Settings& settings, const Share& share, bool& holds) {
   EntryReader reader;
   const IndexError opened = reader.Open(share.name);
@@ -115,7 +116,7 @@ bool HoldsSomething(const Settings& settings, const Share& share, bool& holds) {
                opened != IndexError::NONE ? IndexErrorText(opened) : "cannot be read");
     return false;
   }
-  holds = entries > (settings.FolderAt(share.path) != nullptr ? 1 : 0);
+  holds = HoldsMoreThanFolders(settings, share, entries);
   return true;
 }
 
@@ -150,8 +151,9 @@ bool FindAcceptance(const Settings& settings, const Share& share, Acceptance& fo
 // Puts on record that the share goes on with what is there. The reindex first: whatever comes
 // between, no single change is taken up before everything is looked at.
 bool RecordAcceptance(StateStore& store, const Share& share, bool reindex) {
-  const bool recorded = store.UpdateStatus(share.name, [reindex](ShareStatus& status) {
-    status.accept_empty = true;
+  const bool is_empty = IsRootEmpty(share);
+  const bool recorded = store.UpdateStatus(share.name, [reindex, is_empty](ShareStatus& status) {
+    status.accept_empty = is_empty;
     status.needs_reindex = status.needs_reindex || reindex;
   });
   const std::string filesystem = recorded ? FilesystemIdentity(share.path) : std::string();

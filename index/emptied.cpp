@@ -5,11 +5,15 @@
 
 namespace fileindexd {
 
-bool IsEmptied(StateStore& store, const Settings& settings, const Share& share, uint64_t entries) {
+bool HoldsMoreThanFolders(const Settings& settings, const Share& share, uint64_t entries) {
   const auto folders =
       std::count_if(settings.folders.begin(), settings.folders.end(),
                     [&share](const IndexedFolder& folder) { return folder.share == share.name; });
-  if (entries <= static_cast<uint64_t>(folders) || !IsRootEmpty(share)) {
+  return entries > static_cast<uint64_t>(folders);
+}
+
+bool IsEmptied(StateStore& store, const Settings& settings, const Share& share, uint64_t entries) {
+  if (!HoldsMoreThanFolders(settings, share, entries) || !IsRootEmpty(share)) {
     return false;
   }
   ShareStatus status;

@@ -27,4 +27,9 @@ Kind FoundKinds::KindOf(const Entry& entry) {
   return kind;
 }
 
+bool IsWantedAs(Kind kind, const Entry& entry, const Settings& settings) {
+  const IndexedFolder* folder = kind != entry.kind ? settings.FolderOfPath(entry.path) : nullptr;
+  return entry.content_wanted && (folder == nullptr || IsContentWanted(kind, folder->wanted));
+}
+
 }  // namespace fileindexd

@@ -6,6 +6,7 @@
 
 #include "index/database.h"
 #include "index/entry.h"
+#include "state/settings.h"
 #include "state/sqlite.h"
 
 namespace fileindexd {
@@ -28,5 +29,9 @@ class FoundKinds {
   IndexDatabase contents;
   Statement found;  // goes before its connection
 };
+
+// Whether the entry's content is wanted, when it is known to be of that kind. Before anybody has
+// looked inside, a name that tells nothing may be of any kind.
+bool IsWantedAs(Kind kind, const Entry& entry, const Settings& settings);
 
 }  // namespace fileindexd

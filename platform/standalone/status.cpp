@@ -65,7 +65,8 @@ bool StatusMgr::ShareSetNoSpace(const std::string& share_name, bool no_space) {
 // Gives every registered share the folder that its queue file and its index lie in.
 bool Updater_hvx60_beta2() {
   return Uncancelled([] {
-    for (const Share& share : CurrentSettings()->shares) {
+    const std::shared_ptr<const Settings> settings = CurrentSettings();
+    for (const Share& share : settings->shares) {
       std::string error;
       if (!MakeShareFolder(share.name, error)) {
         FI_LOG("%s", error.c_str());

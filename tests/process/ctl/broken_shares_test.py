@@ -1,6 +1,9 @@
 # SPDX-License-Identifier: GPL-2.0-or-later
 """Several shares of which some cannot be read: one line names these, the rest is answered."""
 
+import os
+import shutil
+
 from harness import main, namespace
 from search.library import ContentsTest
 
@@ -52,6 +55,14 @@ class BrokenSharesTest(ContentsTest):
                 if command[0] != "failed":
                     self.assertNotEqual(result.out, b"")
         self.assertEqual(self.ctl("failed", "--json", code=1).json(), [])
+
+    def test_an_index_that_is_gone_is_told_of_by_info(self):
+        shutil.rmtree(os.path.dirname(self.index("beta")))
+        for share, problem in (("alpha", ""), ("beta", "the index cannot be read: there is no index")):
+            path = f"{namespace.DATA}/{share}/lighthouse.txt"
+            told = self.ctl("info", path, "--json").json()
+            self.assertEqual(told["index_problem"], problem)
+            self.assertEqual(told["state"], "unknown" if problem else "current")
 
     def test_where_nobody_answers_there_is_no_document(self):
         for share in SHARES:

@@ -25,7 +25,7 @@ class IndexTest(MachineTest):
         self.assertEqual(len(shown), len(entries))
         for entry in shown:  # whether somebody has looked into a file by now is another matter
             path = full_path(entry)
-            if entry["content"] and kind_of_name(path) == "other":
+            if not entry["dir"] and kind_of_name(path) == "other":
                 entries[path]["kind"] = "other"
         return entries
 

@@ -174,6 +174,22 @@ class ContentsFollowTest(ScriptedTest):
         dumped = self.ctl("dump", "alpha", "--json").objects()
         self.assertEqual([e["kind"] for e in dumped if e["path"] == path], ["other"])
 
+    def test_content_of_a_found_kind_that_is_not_wanted_is_shown_as_such(self):
+        root = self.make_documents(one="lighthouse")
+        self.ctl("folder", "set", root, "--photo=on")
+        self.write(f"{root}/notes", "harbour")
+        self.change(root, "notes")
+        self.await_hits("harbour", ["notes"])
+        for flag, wanted in (("on", True), ("off", False)):
+            with self.subTest(document=flag):
+                self.ctl("folder", "set", root, f"--document={flag}")
+                self.await_drained("alpha")
+
+                self.assertIs(self.flags()[f"{root}/notes"], wanted)
+                told = self.ctl("info", f"{root}/notes", "--json").json()
+                self.assertIs(told["entry"]["content"], wanted)
+                self.assertEqual((told["entry"]["kind"], told["state"]), ("document", "current"))
+
     def test_dump_tells_of_contents_that_cannot_be_read(self):
         root = self.make_documents(one="lighthouse")
         self.await_counts(done=1)
