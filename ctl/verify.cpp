@@ -115,8 +115,10 @@ Returned AddReturned(const Settings& settings, const std::vector<std::string>& d
   Returned returned;
   for (const std::string& path : deletes) {
     const Look look = LookAt(settings, path);
-    if (look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN) {
-      (void)repair.Add({Difference::MISSING, path, Thing::NONE, look.thing});
+    const bool may_be_directory = look.verdict == Verdict::UNKNOWN;
+    if (look.verdict == Verdict::BELONGS || may_be_directory) {
+      const Thing seen = may_be_directory ? Thing::DIRECTORY : look.thing;
+      (void)repair.Add({Difference::MISSING, path, Thing::NONE, seen});
       returned.push_back(path);
     }
   }

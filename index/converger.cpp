@@ -98,7 +98,8 @@ IndexError Converger::CheckMount(const Look& look) {
 
 IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
                               const std::string& path, const ContentFlags& wanted,
-                              const ContentFlags& decide, const Look* seen, bool added) {
+                              const ContentFlags& decide, const Look* seen, bool added,
+                              Below below) {
   added_path = added ? &path : nullptr;
   settings = &in_force;
   share = &in_share;
@@ -108,7 +109,7 @@ IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
   IndexError error = IndexError::NONE;
   switch (look.verdict) {
     case Verdict::BELONGS:
-      error = Settle(path, look, wanted, decide);
+      error = Settle(path, look, wanted, decide, below);
       return error == IndexError::NONE ? SettleOtherPaths() : error;
     case Verdict::UNKNOWN:
       return IndexError::IO;
@@ -125,7 +126,7 @@ IndexError Converger::Refresh(const Settings& in_force, const Share& in_share,
 }
 
 IndexError Converger::Settle(const std::string& path, const Look& look, const ContentFlags& wanted,
-                             const ContentFlags& decide) {
+                             const ContentFlags& decide, Below below) {
   Outcome outcome = Outcome::SAME;
   IndexError error = Put(path, look, wanted, decide, outcome);
   const bool is_new = outcome == Outcome::NEW || outcome == Outcome::NEW_ABOVE;
@@ -142,9 +143,10 @@ IndexError Converger::Settle(const std::string& path, const Look& look, const Co
   if (look_below && look.thing == Thing::DIRECTORY) {
     walks.push_back(path);
   }
+  const bool is_known = look.thing == Thing::DIRECTORY && !is_new;
   // Without birth times, another directory with the inode of the old one looks the same.
-  const bool doubtful = look.thing == Thing::DIRECTORY && look.birth_time == 0 && !is_new;
-  if (look_below || (doubtful && !IsLookedAt(path))) {
+  const bool doubtful = is_known && look.birth_time == 0;
+  if (look_below || (is_known && below == Below::LOOKED_AT) || (doubtful && !IsLookedAt(path))) {
     error = LookBelow(path, walks);
   }
   for (size_t i = 0; i < walks.size() && error == IndexError::NONE; ++i) {
@@ -261,7 +263,7 @@ IndexError Converger::SettleOtherPaths() {
       error = RemoveAt(path, true);
       error = error == IndexError::NONE ? RemoveBelow(path, false) : error;
     } else if (IsOtherThing(known, EntryOf(path, look))) {
-      error = Settle(path, look, settings->FolderOfPath(path)->wanted, {});
+      error = Settle(path, look, settings->FolderOfPath(path)->wanted, {}, Below::KEPT);
     } else {
       error = Put(path, look, settings->FolderOfPath(path)->wanted, {}, ignored);
     }

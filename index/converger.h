@@ -25,11 +25,11 @@ class Converger {
       : table(rows), between(between_slices) {}
 
   // `path` is normal and lies in `in_share`, one of `in_force`; both stay for the length of the
-  // call. `seen` as for EntryWriter::Refresh. `added`: somebody wrote to it, so the content counts
-  // as another when anything about it is.
+  // call. `seen` and `below` as for EntryWriter::Refresh. `added`: somebody wrote to it, so the
+  // content counts as another when anything about it is.
   IndexError Refresh(const Settings& in_force, const Share& in_share, const std::string& path,
                      const ContentFlags& wanted, const ContentFlags& decide, const Look* seen,
-                     bool added);
+                     bool added, Below below);
   IndexError Delete(const Settings& in_force, const Share& in_share, const std::string& path,
                     DeleteMode mode);
 
@@ -45,7 +45,7 @@ class Converger {
   IndexError CheckMount(const Look& look);
 
   IndexError Settle(const std::string& path, const Look& look, const ContentFlags& wanted,
-                    const ContentFlags& decide);
+                    const ContentFlags& decide, Below below);
   IndexError Put(const std::string& path, const Look& look, const ContentFlags& wanted,
                  const ContentFlags& decide, Outcome& outcome);
   IndexError Change(const Entry& known, const Look& look, const ContentFlags& wanted,

@@ -42,16 +42,19 @@ bool EntryWriter::IsOpen() const {
 }
 
 bool EntryWriter::Refresh(const std::string& path, const ContentFlags& wanted,
-                          const ContentFlags& decide, const Seen* seen) {
+                          const ContentFlags& decide, const Seen* seen, Below below) {
   EntryOperation operation;
+  operation.below = below;
   operation.wanted = wanted;
   operation.decide = decide;
   last_error = impl->Guarded([&] { return impl->Do(path, std::move(operation), seen); });
   return last_error == IndexError::NONE;
 }
 
-bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted, const Seen* seen) {
+bool EntryWriter::Add(const std::string& path, const ContentFlags& wanted, const Seen* seen,
+                      Below below) {
   EntryOperation operation;
+  operation.below = below;
   operation.wanted = wanted;
   operation.decide = EVERY_KIND;
   operation.added = true;
@@ -174,7 +177,7 @@ IndexError EntryWriter::Impl::Apply(const EntryOperation& operation, const Seen*
              ? converger->Delete(*settings, *share, operation.path, operation.mode)
              : converger->Refresh(*settings, *share, operation.path, operation.wanted,
                                   operation.decide, seen != nullptr ? &seen->look : nullptr,
-                                  operation.added);
+                                  operation.added, operation.below);
 }
 
 // Gives the transaction up: whatever failed in it left it half done.
@@ -184,6 +187,7 @@ IndexError EntryWriter::Impl::Fail(IndexError error) {
     operation.applied = false;
   }
   replay_needed = !list.empty();
+  replay_error = error;
   if (error == IndexError::DAMAGED) {
     CloseDamaged();
   } else if (error == IndexError::OTHER || sqlite3_get_autocommit(database.db) == 0) {

@@ -20,6 +20,12 @@ namespace fileindexd {
 
 enum class DeleteMode { ENTRY = 0, STALE = 1, ALL = 2 };
 
+// What is known below a directory that still is the one that was known.
+enum class Below {
+  KEPT,       // stays as it is
+  LOOKED_AT,  // is brought in line with the disk as well
+};
+
 class EntryWriter {
  public:
   // `share_name` names the share whose index this is; `store` outlives the writer. Opens the
@@ -39,10 +45,11 @@ class EntryWriter {
   // `seen`: what the caller saw there a moment ago, or null to look here. It has to be younger than
   // whatever the operation tells of. The first operation after a commit looks in any case.
   bool Refresh(const std::string& path, const ContentFlags& wanted, const ContentFlags& decide,
-               const Seen* seen = nullptr);
+               const Seen* seen = nullptr, Below below = Below::KEPT);
   // Like Refresh with every kind decided, of what somebody wrote to: where only its change time is
   // another, its content counts as changed all the same.
-  bool Add(const std::string& path, const ContentFlags& wanted, const Seen* seen = nullptr);
+  bool Add(const std::string& path, const ContentFlags& wanted, const Seen* seen = nullptr,
+           Below below = Below::KEPT);
   bool Delete(const std::string& path, DeleteMode mode);
   // True when everything since the last good commit is durable.
   bool Commit();

@@ -31,6 +31,7 @@ struct EntryOperation {
   DeleteMode mode = DeleteMode::ENTRY;
   ContentFlags wanted;
   ContentFlags decide;
+  Below below = Below::KEPT;
   bool added = false;
   bool applied = false;      // in the transaction that runs
   bool passed_over = false;  // in the replay that runs
@@ -78,10 +79,10 @@ struct EntryWriter::Impl {
   int64_t next_open = 0;       // monotonic milliseconds
   int64_t next_replay = 0;     // the same
   IndexError open_error = IndexError::NONE;
-  IndexError replay_error = IndexError::NONE;
-  IndexError passed_error = IndexError::IO;  // of the operation that was last passed over
-  bool reindex_owed = false;                 // the share's flag could not be set yet
-  bool loss_told = false;                    // the system log says why the database is gone
+  IndexError replay_error = IndexError::NONE;  // while `replay_needed`: why it still is
+  IndexError passed_error = IndexError::IO;    // of the operation that was last passed over
+  bool reindex_owed = false;                   // the share's flag could not be set yet
+  bool loss_told = false;                      // the system log says why the database is gone
 
  private:
   IndexError TryOpen(bool create);

@@ -34,7 +34,8 @@ uint32_t EventOf(const Look& look, uint32_t what) {
     case Verdict::BELONGS:
       return look.thing == Thing::DIRECTORY ? EventOfDirectory(what) : EventOfFile(what);
     case Verdict::UNKNOWN:
-      return QLIB_NOTIFY_MODIFY;  // the daemon looks itself
+      // The daemon looks itself. What has come there may be a directory.
+      return (what & (REPLACED | CREATED)) != 0 ? CUSTOM_EVENT_REINDEX : QLIB_NOTIFY_MODIFY;
     default:
       return (what & REPLACED) != 0 ? QLIB_NOTIFY_DELETE : 0;
   }
@@ -46,10 +47,7 @@ Look LinesOfLook(const Settings& settings, const std::string& path, uint32_t wha
                  const std::string& from, FolderView& folder, std::vector<QueueLine>& lines) {
   const Look look = LookNear(settings, path, folder);
   const bool may_be_there = look.verdict == Verdict::BELONGS || look.verdict == Verdict::UNKNOWN;
-  // A directory that comes to where one has left may be the same one, with less in it: to the
-  // daemon a rename only adds.
-  const bool came_back = look.thing == Thing::DIRECTORY && (what & (DELETED | MOVED_FROM)) != 0;
-  if (!from.empty() && may_be_there && !came_back) {
+  if (!from.empty() && may_be_there) {
     lines.push_back({QLIB_NOTIFY_RENAME, path, {}, from});
     return look;
   }

@@ -46,12 +46,10 @@ void SentLines::Note(const LineInFile& line) {
 }
 
 // Also where an update waits at a rename's former path: the reindex of that, by its plain name,
-// takes one along that was queued behind the update. And where a delete waits at the new path: the
-// rename displaces it, with the deletes that it has displaced below, and what comes back may be the
-// very directory that went, with less in it.
+// takes one along that was queued behind the update.
 std::vector<QueueLine> SentLines::InPlaceOf(const QueueLine& line) const {
   if (line.event == QLIB_NOTIFY_RENAME &&
-      (deleted.contains(line.path) || updates.Holds(line.path) || updates.Holds(line.path_old))) {
+      (updates.Holds(line.path) || updates.Holds(line.path_old))) {
     return {ReindexOf(line.path), ReindexOf(line.path_old)};
   }
   if (line.event != QLIB_NOTIFY_MODIFY && line.event != QLIB_NOTIFY_ATTRIB) {

@@ -8,9 +8,8 @@
 //
 // Of two lines at one path mostly the later is executed alone. A modify, or a change of attributes,
 // displaces the walk of a directory that a rename brought, and the reading anew of a file that was
-// written to: a line that asks for that takes its place. A rename displaces a delete of what was
-// there, and only adds. An update of a subtree is the other way: it swallows whatever comes behind
-// it.
+// written to: a line that asks for that takes its place. An update of a subtree is the other way:
+// it swallows whatever comes behind it.
 #pragma once
 
 #include <set>

@@ -42,7 +42,7 @@ class QueueLineReader {
 };
 
 // Updates of subtrees in one queue file. Such an update swallows a reindex of its path in the same
-// batch, and does less: it neither drops what is gone below nor goes into a folder of its own.
+// batch, and does less: it goes into no folder with settings of its own.
 class WaitingUpdates {
  public:
   void Forget() { paths.clear(); }

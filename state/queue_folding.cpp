@@ -129,8 +129,7 @@ void QueueFolding::AddRename(const std::string& path, const std::string& path_ol
   } else {
     const auto at = lines.find(path);
     const Line before = at == lines.end() ? Line{} : at->second;
-    // What comes to where something was deleted may be what went, with less in it.
-    if (IsUpdateOfAll(before.event) || before.event == QLIB_NOTIFY_DELETE) {
+    if (IsUpdateOfAll(before.event)) {
       FoldInto(path);
       FoldUnlessTakenIn(path_old);
     } else {

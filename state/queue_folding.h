@@ -60,8 +60,7 @@ class QueueFolding {
   // reindex that takes one of both in leaves a reindex of the other; where it takes in only the
   // former path of a line that stands already, the line may stay. Of a rename and another line at
   // its path the rename stays, unless that is a delete, a modify that came later, an update of a
-  // subtree, or a rename from elsewhere; then a reindex of the former path is left, and where the
-  // rename came later than a delete or an update, one of its path.
+  // subtree, or a rename from elsewhere; then a reindex of the former path is left.
   void AddRename(const std::string& path, const std::string& path_old);
 
   // Whether a reindex stands at or above the path.

@@ -10,6 +10,7 @@
 #include "platform/standalone/glance.h"
 #include "platform/standalone/pass_progress.h"
 #include "platform/standalone/uncancelled.h"
+#include "platform/standalone/walk.h"
 
 namespace fileindexd::TALO::IR {
 
@@ -42,6 +43,10 @@ ContentFlags FlagsOf(const Json::Value& object) {
   FILEINDEX::RetrieveBoolFromJsonObj(flags.video, "video", object);
   FILEINDEX::RetrieveBoolFromJsonObj(flags.photo, "photo", object);
   return flags;
+}
+
+Below BelowOf(const std::string& path) {
+  return BeginsWalk(path) ? Below::LOOKED_AT : Below::KEPT;
 }
 
 }  // namespace
@@ -132,7 +137,7 @@ bool Indexer::AddFSDocument(const std::string& path, const Json::Value& cfg) {
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
     Seen kept;
     const Seen* seen = TakeGlance(path, kept) ? &kept : nullptr;
-    return writer.Add(path, FlagsOfConfiguration(cfg), seen);
+    return writer.Add(path, FlagsOfConfiguration(cfg), seen, BelowOf(path));
   });
 }
 
@@ -141,18 +146,25 @@ bool Indexer::UpdateFSDocument(const std::string& path, const Json::Value& cfg,
   return handle != nullptr && handle->Change([&](EntryWriter& writer) {
     Seen kept;
     const Seen* seen = TakeGlance(path, kept) ? &kept : nullptr;
-    return writer.Refresh(path, FlagsOfConfiguration(cfg), FlagsOf(data), seen);
+    // Only that of a subtree has data.
+    const Below below = data.isNull() ? Below::KEPT : BelowOf(path);
+    return writer.Refresh(path, FlagsOfConfiguration(cfg), FlagsOf(data), seen, below);
   });
 }
 
 bool Indexer::DelFSDocument(const std::string& path, _tag_delete_mode mode) {
   return handle != nullptr && handle->Do([&](EntryWriter& writer) {
-    if (static_cast<DeleteMode>(mode) == DeleteMode::STALE) {
-      handle->progress.BeginReindex(path);  // it comes before a directory is walked again
-    } else {
+    if (static_cast<DeleteMode>(mode) != DeleteMode::STALE) {
       handle->progress.Count();
+      return writer.Delete(path, static_cast<DeleteMode>(mode));
     }
-    return writer.Delete(path, static_cast<DeleteMode>(mode));
+    // It comes before a directory is walked again.
+    handle->progress.BeginReindex(path);
+    const bool done = writer.Delete(path, DeleteMode::STALE);
+    if (done) {
+      NoteLookedAt(path);
+    }
+    return done;
   });
 }
 

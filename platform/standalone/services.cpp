@@ -22,6 +22,7 @@
 #include "platform/standalone/process.h"
 #include "platform/standalone/shortage.h"
 #include "platform/standalone/uncancelled.h"
+#include "platform/standalone/walk.h"
 #include "platform/system.h"
 #include "state/belonging.h"
 #include "state/instance.h"
@@ -162,7 +163,8 @@ int StopService(const std::string& name) {
 
 // Name of the share whose drained copy this is; empty for any other path.
 std::string ShareOfDrainedCopy(const std::string& path) {
-  for (const Share& share : CurrentSettings()->shares) {
+  const std::shared_ptr<const Settings> settings = CurrentSettings();
+  for (const Share& share : settings->shares) {
     if (DrainedPath(share.name) == path) {
       return share.name;
     }
@@ -178,9 +180,11 @@ bool MayRemoveDrainedCopy(const std::string& share) {
 }
 
 // A pass that removes the copy was not stopped: a reindex that was begun, and not put off, has
-// ended, if the share could be looked at and its changes are durable.
+// ended, if the share could be looked at and its changes are durable. An empty root was accepted
+// until it holds something again.
 void EndReindex(const std::string& share_name) {
-  if (!StatusOf(share_name).reindex_begun || !WasLastCommitGood(share_name)) {
+  const ShareStatus now = StatusOf(share_name);
+  if ((!now.reindex_begun && !now.accept_empty) || !WasLastCommitGood(share_name)) {
     return;
   }
   const std::shared_ptr<const Settings> settings = CurrentSettings();
@@ -229,6 +233,7 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
     const std::string share = arg2 != nullptr ? ShareOfDrainedCopy(arg2) : std::string();
     if (!share.empty()) {
       ProgressOf(share).End();
+      EndWalks();
     }
     if (!share.empty() && !MayRemoveDrainedCopy(share)) {
       FI_LOG("Kept, as its changes are not stored: %s", arg2);

@@ -10,6 +10,7 @@ from harness.checks import IndexTest
 from harness.standing_in import empty
 
 ATTRIBUTES = 0x4
+CREATE = 0x40
 DELETE = 0x80
 
 
@@ -28,6 +29,14 @@ class EmptyRoot(IndexTest):
     def delete(self, *names):
         self.append("alpha", *({"event": DELETE, "path": f"{self.root}/{name}"} for name in names))
         self.await_drained("alpha")
+
+    def make_folders(self, names):
+        """Another share, of which only these are indexed; they are empty."""
+        self.other = self.make_share("beta", folders=())
+        for name in names:
+            os.mkdir(f"{self.other}/{name}")
+            self.ctl("folder", "add", f"{self.other}/{name}")
+        self.await_drained("beta")
 
     def share(self):
         (share,) = self.ctl("status", "--json").json()["shares"]
@@ -107,6 +116,33 @@ class EmptyRoot(IndexTest):
         self.ctl("share", "accept", "alpha")
 
         self.assert_in_step()
+
+    def test_acceptance_ends_when_something_is_in_the_folder_again(self):
+        empty(self.root)
+        self.ctl("share", "accept", "alpha")
+        self.assert_in_step()
+
+        self.make_files(self.root, "new.txt")
+        self.append("alpha", {"event": CREATE, "path": f"{self.root}/new.txt"})
+        self.await_drained("alpha")
+        empty(self.root)
+        self.reindex()
+
+        self.assert_paths(self.root, ["new.txt"])
+        self.assertEqual(self.share()["root"], "empty")
+
+    def test_of_folders_alone_nothing_is_missed(self):
+        self.make_folders(("p", "q"))
+        for name in ("p", "q"):
+            os.rmdir(f"{self.other}/{name}")
+
+        (share,) = [s for s in self.ctl("status", "--json").json()["shares"] if s["name"] == "beta"]
+        self.assertEqual(share["root"], "sound")
+        self.assertEqual(self.ctl("share", "accept", "beta").out, b"nothing to accept\n")
+
+        self.append("beta", *({"event": DELETE, "path": f"{self.other}/{n}"} for n in ("p", "q")))
+        self.await_drained("beta")
+        self.assertEqual(self.dump("beta"), [])
 
 
 if __name__ == "__main__":

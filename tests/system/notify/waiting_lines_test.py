@@ -87,6 +87,19 @@ class WaitingLines(WatchedDiskTest):
 
         self.assert_converged(self.root)
 
+    def test_a_folder_that_returns_while_an_update_of_it_has_swallowed_its_delete(self):
+        self.begin_with_update("f/x.txt", "f/y.txt")
+        away = f"{self.elsewhere}/f"
+        os.rename(self.at("f"), away)
+        self.await_written()
+        os.unlink(f"{away}/x.txt")
+        os.rename(self.queue("alpha"), self.queue("alpha") + ".tmp")  # as the daemon takes it
+        with stopped(self.notifier.pid):
+            os.rename(away, self.at("t"))
+            os.rename(self.at("t"), self.at("f"))
+        self.await_written()
+        self.assert_converges_once_started()
+
     def test_deletes_that_an_earlier_service_queued_and_that_came_back_with_their_folder(self):
         self.begin_with("d/a.txt", "z.txt")
 

@@ -140,6 +140,22 @@ TEST_P(ConvergeTest, ReplacedDirectoryHasEverythingBelowLookedAt) {
   }
 }
 
+TEST_P(ConvergeTest, WhatIsGoneBelowTheSameDirectoryLeavesWithAWalkThatBeginsThere) {
+  Folder("d/e", {"f", "old"});
+  Folder("d", {"g", "old"});
+  for (const bool is_added : {true, false}) {
+    AddAll();
+    OpenWriter();
+    RemoveTree(At("d/e/old"));
+    RemoveTree(At("d/old"));
+    EXPECT_TRUE(is_added ? writer->Add(At("d"), wanted, nullptr, Below::LOOKED_AT)
+                         : writer->Refresh(At("d"), wanted, {}, nullptr, Below::LOOKED_AT));
+    ExpectClean();
+    Folder("d/e", {"old"});
+    Folder("d", {"old"});
+  }
+}
+
 TEST_P(ConvergeTest, OtherDirectoryInTheSamePlaceIsWalked) {
   Folder("d", {"f"});
   Folder("new/sub", {"x"});

@@ -106,6 +106,26 @@ TEST_F(FullDiskTest, WhatFoundItsWorkDoneIsReplayedToo) {
   EXPECT_EQ(Differences(), Names());
 }
 
+// A long list is replayed once a second. Until then nothing is carried out before it: an older
+// delete would come behind a newer add.
+TEST_F(FullDiskTest, WhatComesBetweenTwoReplaysWaitsItsTurn) {
+  AddAll();
+  Delete("some picture of 0.jpg");
+  FillBut(0);
+  for (int i = 1; i < FILES; ++i) {
+    WriteFile(At("some picture of " + std::to_string(i) + ".jpg"), "changed");
+    Refresh("some picture of " + std::to_string(i) + ".jpg");
+  }
+  ASSERT_FALSE(writer->Commit());
+  Refresh("some picture of 1.jpg");
+  ASSERT_FALSE(writer->Commit());
+
+  (void)writer->Add(At("some picture of 0.jpg"), {});
+  Free();
+  Commit();
+  EXPECT_EQ(Differences(), Names());
+}
+
 TEST_F(FullDiskTest, CreationOnAFullDiskSucceedsLater) {
   writer.reset();
   RemoveTree(state_root + "/shares/s");

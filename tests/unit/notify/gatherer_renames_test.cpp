@@ -46,27 +46,6 @@ TEST_F(GathererTest, RenameThereAndBackIsALookAtBoth) {
   EXPECT_EQ(Due(), Texts({"REINDEX a", "DELETE b"}));
 }
 
-// To the daemon a rename only adds, and in the same directory something may be gone.
-TEST_F(GathererTest, AFolderThatLeftAndReturnsByAnotherNameIsReindexed) {
-  MakeDirectory("d");
-  Make("file");
-  for (const std::string& name : {std::string("d"), std::string("file")}) {
-    const bool directory = name == "d";
-    const std::string away = folder + "/other/" + name;
-    Add({MOVED_TO, directory, away, Path(name)});
-    Add({MOVED_TO, directory, Path("by-" + name), away});
-    Add(Rename("by-" + name, name, directory));
-  }
-
-  EXPECT_EQ(Due(), Texts({"REINDEX d", "DELETE by-d", "RENAME by-file file"}));
-
-  MakeDirectory("last");
-  Add(Rename("first", "d", true));
-  Add(Rename("d", "last", true));
-  Add(Rename("other", "d", true));
-  EXPECT_EQ(Due(), Texts({"REINDEX d", "DELETE other", "RENAME first last"}));
-}
-
 TEST_F(GathererTest, RenameBackOverAnotherRenameLosesNoPath) {
   Make("o");
   Add(Rename("o", "x"));

@@ -38,24 +38,6 @@ TEST_F(SentLinesTest, AnUpdateOfWhatWasRenamedHasItWalkedUntilTheQueueIsTaken) {
   EXPECT_EQ(Queue(), Texts({Line(QLIB_NOTIFY_MODIFY, "twice")}));
 }
 
-// It displaces the delete, and may bring the same directory back, with less in it.
-TEST_F(SentLinesTest, ARenameToWhereADeleteWaitsIsTwoReindexes) {
-  Add(File(DELETED, "a"));
-  Add(File(DELETED, "d"));
-  Work();
-  Texts lines = Queue();
-  ASSERT_EQ(lines.size(), 2U);
-  MakeDirectory("d");
-  Make("e");
-  Add(Rename("from", "d", true));
-  Add(Rename("other", "e"));
-  Work();
-
-  lines.insert(lines.end(), {Line(CUSTOM_EVENT_REINDEX, "d"), Line(CUSTOM_EVENT_REINDEX, "from"),
-                             EventLine(QLIB_NOTIFY_RENAME, Path("e"), Path("other"))});
-  EXPECT_EQ(Queue(), lines);
-}
-
 TEST_F(SentLinesTest, AFileThatWasWrittenToIsReadAnewWhateverFollowsInTheSameFile) {
   Make("a");
   Make("m");
