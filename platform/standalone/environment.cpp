@@ -78,18 +78,20 @@ bool IsNews(const char* what, const std::string& share, bool good, StateStore& s
   return std::exchange(process.failing[name], reason) != reason;
 }
 
+// Entries of the share's index; 0 when they cannot be counted.
+uint64_t EntriesOf(const std::string& share) {
+  EntryReader reader;
+  uint64_t entries = 0;
+  const bool counted = reader.Open(share) == IndexError::NONE && reader.Count(entries);
+  return counted ? entries : 0;
+}
+
 bool IsShareEmptied(const std::string& share) {
   StateStore* store = Store();
   const std::shared_ptr<const Settings> settings = CurrentSettings();
   const Share* found = settings->ShareByName(share);
-  if (store == nullptr || found == nullptr || LookAtRoot(*found) != RootState::SOUND ||
-      !IsRootEmpty(*found)) {
-    return false;
-  }
-  EntryReader reader;
-  uint64_t entries = 0;
-  return reader.Open(share) == IndexError::NONE && reader.Count(entries) &&
-         IsEmptied(*store, *settings, *found, entries);
+  return store != nullptr && found != nullptr && LookAtRoot(*found) == RootState::SOUND &&
+         IsRootEmpty(*found) && IsEmptied(*store, *settings, *found, EntriesOf(share));
 }
 
 }  // namespace
@@ -192,6 +194,12 @@ bool IsRootAway(const std::string& share) {
   const std::shared_ptr<const Settings> settings = CurrentSettings();
   const Share* found = settings->ShareByName(share);
   return found != nullptr && LookAtRoot(*found) != RootState::SOUND;
+}
+
+bool HoldsMoreThanFolders(const std::string& share) {
+  const std::shared_ptr<const Settings> settings = CurrentSettings();
+  const Share* found = settings->ShareByName(share);
+  return found != nullptr && HoldsMoreThanFolders(*settings, *found, EntriesOf(share));
 }
 
 bool PutReindexOff(const std::string& share) {

@@ -39,6 +39,10 @@ bool RecordReindex(const std::string& share);
 // Whether the share's root is anything but sound.
 bool IsRootAway(const std::string& share);
 
+// Whether the share's index holds anything but the indexed folders themselves. False as well when
+// that cannot be told.
+bool HoldsMoreThanFolders(const std::string& share);
+
 // Whether a whole reindex is to be put off although it is asked for: the root is empty where it was
 // not, so it would be refused, and take along the queue in which single deletions are told of.
 bool PutReindexOff(const std::string& share);

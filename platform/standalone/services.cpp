@@ -180,20 +180,24 @@ bool MayRemoveDrainedCopy(const std::string& share) {
 }
 
 // A pass that removes the copy was not stopped: a reindex that was begun, and not put off, has
-// ended, if the share could be looked at and its changes are durable. An empty root was accepted
-// until it holds something again.
+// ended, if the share could be looked at and its changes are durable.
 void EndReindex(const std::string& share_name) {
-  const ShareStatus now = StatusOf(share_name);
-  if ((!now.reindex_begun && !now.accept_empty) || !WasLastCommitGood(share_name)) {
+  if (!StatusOf(share_name).reindex_begun || !WasLastCommitGood(share_name)) {
     return;
   }
   const std::shared_ptr<const Settings> settings = CurrentSettings();
   const Share* share = settings->ShareByName(share_name);
   if (share != nullptr && LookAtRoot(*share) == RootState::SOUND) {
-    const bool is_empty = IsRootEmpty(*share);
-    ChangeStatus(share_name, [is_empty](ShareStatus& status) {
-      status.reindex_begun = false;
-      status.accept_empty = status.accept_empty && is_empty;
+    ChangeStatus(share_name, [](ShareStatus& status) { status.reindex_begun = false; });
+  }
+}
+
+// An empty root was accepted until the index holds something again; the folder may be empty by now
+// for another reason. Until the reindex that the acceptance asked for has ended, it stands.
+void EndAcceptance(const std::string& share) {
+  if (StatusOf(share).accept_empty && WasLastCommitGood(share) && HoldsMoreThanFolders(share)) {
+    ChangeStatus(share, [](ShareStatus& status) {
+      status.accept_empty = status.accept_empty && (status.needs_reindex || status.reindex_begun);
     });
   }
 }
@@ -253,6 +257,7 @@ int QLIBCExec(const char* program, const char* arg1, const char* arg2, const cha
       const bool was_put_off = TakeUpReindex(share);
       if (status == 0 && !was_put_off) {
         EndReindex(share);
+        EndAcceptance(share);
       }
       wait = std::max(wait, EndPass(share));
     }
